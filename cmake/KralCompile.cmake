@@ -1,0 +1,39 @@
+# How every target is compiled: language level, warnings, sanitizers, and the 32-bit Windows baseline.
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_C_STANDARD 90)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_C_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+
+add_library(kral_compile INTERFACE)
+target_compile_options(kral_compile INTERFACE
+  $<$<COMPILE_LANGUAGE:CXX>:-Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wsign-conversion
+    -Wnon-virtual-dtor -Wold-style-cast -Woverloaded-virtual -Wimplicit-fallthrough>
+  $<$<COMPILE_LANGUAGE:C>:-Wall -Wextra -Wpedantic>)
+if(KRAL_WERROR)
+  target_compile_options(kral_compile INTERFACE -Werror)
+endif()
+
+if(KRAL_SANITIZE)
+  add_compile_options(-fsanitize=${KRAL_SANITIZE} -fno-omit-frame-pointer)
+  add_link_options(-fsanitize=${KRAL_SANITIZE})
+  if(KRAL_SANITIZE MATCHES "undefined")
+    add_compile_options(-fno-sanitize-recover=all)
+  endif()
+endif()
+
+if(WIN32)
+  set(KRAL_HOME win32)
+  # SSE2 is the baseline, and SSE arithmetic gives the same doubles as on 64-bit Linux. Callers may keep
+  # only 4-byte stack alignment, hence -mstackrealign.
+  add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
+  add_compile_definitions(_WIN32_WINNT=0x0601 WIN32_LEAN_AND_MEAN NOMINMAX __USE_MINGW_ANSI_STDIO=1)
+  # The runtimes are linked in: every program and the DLL are one file.
+  add_link_options(-static)
+else()
+  set(KRAL_HOME posix)
+endif()

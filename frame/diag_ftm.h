@@ -1,0 +1,109 @@
+// The phone object: everything the library keeps for one handset. It owns the transport, the packet buffers, the
+// queues, the text log, the time-outs and the settings; the command families are functions over it.
+#ifndef KRAL_FRAME_DIAG_FTM_H
+#define KRAL_FRAME_DIAG_FTM_H
+
+#include <array>
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <span>
+#include <vector>
+
+#include "frame/base/diag_packet.h"
+#include "frame/base/text_log.h"
+#include "frame/base/time_outs.h"
+#include "frame/phone_settings.h"
+#include "platform/clock.h"
+#include "transport/kral_event_listener.h"
+#include "transport/kral_thread_interface.h"
+
+namespace kral {
+
+class OrbtServer;
+
+struct OpenArguments {
+  uint32_t port = 0;  // as given by the caller; the object's own port number is what is opened
+  uint32_t handle = 0;
+  UserTransport user;  // all empty: the COM port
+  bool handshake = false;
+  bool second_flag = false;
+};
+
+class Diag_FTM {
+ public:
+  // Direct mode: owns a transport over COM `port`.
+  explicit Diag_FTM(uint16_t port, Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
+  // Server mode: talks through the server, which outlives the object.
+  Diag_FTM(OrbtServer& server, uint16_t port, Clock& clock = SystemClock());
+  ~Diag_FTM();
+  Diag_FTM(const Diag_FTM&) = delete;
+  Diag_FTM& operator=(const Diag_FTM&) = delete;
+
+  // --- Connection -------------------------------------------------------------------------------------------------
+  bool OpenPort(const OpenArguments& arguments);
+  bool ClosePort();
+  bool IsPhoneConnected();
+  // Direct mode: reopens a closed port with the arguments of the last explicit open.
+  bool IsPortOpen();
+
+  // --- Requests ---------------------------------------------------------------------------------------------------
+  // Held for a whole operation by OnPhone; recursive, so that operations may be built from operations.
+  std::recursive_mutex& request_lock() { return request_lock_; }
+
+  // The default buffer of the core, FTM and NV commands. Index 0..2.
+  CDiagPacket& packet(size_t index = 0) { return packets_[index]; }
+
+  // Sends the buffer's request and awaits the reply that begins with the request's first byte, into the buffer's
+  // response. False after a time-out (which closes the port) and after any other first reply.
+  bool Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms = 0);
+  bool Send(CDiagPacket& packet) { return Send(packet, TimeOut(kTimeOutDefaultCommand)); }
+
+  // The same over the caller's memory; response_size as CKralThreadInterface::SendSync tells.
+  bool SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint8_t expected_code,
+                uint32_t time_out_ms, uint32_t delay_ms = 0);
+
+  // --- Time-outs --------------------------------------------------------------------------------------------------
+  bool ConfigureTimeOut(uint32_t id, int32_t milliseconds);  // logged
+  int32_t GetTimeOut(uint32_t id);                           // logged
+  uint32_t TimeOut(uint32_t id) const;                       // silent; 0 for an unknown id
+
+  // --- Owned parts ------------------------------------------------------------------------------------------------
+  DataLogFileHandler& log();
+  CKralThreadInterface& transport();  // direct mode only
+  CKralEventListener& sorter();
+  CKralEvents& dispatcher();
+  PacketQueue& responses();
+  PacketQueue& asynchronous();
+  BoundedQueue<EventRecord>& events();
+  Clock& clock() { return clock_; }
+
+  // --- Settings ---------------------------------------------------------------------------------------------------
+  bool server_mode() const;
+  OrbtServer* server_port();
+  bool connected() const;
+  uint16_t port() const;
+  uint8_t target_type() const;
+  void SetTargetType(uint8_t type);  // values above 1 are ignored
+  uint32_t handle() const;
+  void SetHandle(uint32_t handle);
+  void SetData2DiagSearch(uint8_t on);
+  bool framed() const;  // false in the unframed packet modes
+  void SetFramed(bool framed);
+
+  FtmSettings& ftm() { return ftm_; }
+  // The version response as last received: deliberately never cleared between calls.
+  std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
+
+ private:
+  std::recursive_mutex request_lock_;
+  Clock& clock_;
+  std::array<CDiagPacket, 3> packets_;
+  FtmSettings ftm_;
+  std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,31 @@
+/**
+ * @file kral.h
+ * The whole C interface of kral, the manufacturing and test support library for mobile handsets.
+ *
+ * Rules that hold for every function unless its own text says otherwise:
+ *
+ * - The handle comes first. It is what a connect function returned; 0 is never valid. An unknown or released handle
+ *   gives 0, causes no traffic and leaves the outputs untouched.
+ * - Results are uint8_t: 1 for success, 0 for failure. Why a call failed is told in the text log of the handset
+ *   (text_log.h). A status that the handset itself reports comes back through an output argument.
+ * - Outputs are written on success only. The caller owns all buffers; sizes are in bytes. Narrow integers are passed
+ *   and returned zero-extended.
+ * - Values that carry a caller's pointer are uintptr_t. Multi-byte fields of handset records are little-endian.
+ * - Calls that send a request may block for the time-out they name (KRAL_ConfigureTimeOut). A request that gets no
+ *   answer closes the port; the next request on the handle opens it again with the arguments of the last connect.
+ * - Any thread may call with any handle; requests of one handle are carried out one after the other. Connect,
+ *   disconnect and enumeration are made from one thread. Text-log, queue, time-out and abort calls never wait for a
+ *   running request. Callbacks come on the library's own threads and must not call functions that send requests.
+ * - No C++ exception leaves a function. Functions are __cdecl on Windows, with undecorated names.
+ */
+#ifndef KRAL_KRAL_H
+#define KRAL_KRAL_H
+
+#include "kral/types.h"
+
+#include "kral/connection.h"
+#include "kral/diag.h"
+#include "kral/text_log.h"
+#include "kral/transport.h"
+
+#endif

@@ -1,0 +1,91 @@
+// First-in-first-out queue of fixed capacity that drops its oldest record when full, in constant time.
+// Records are kept at their own length: capacity counts records, memory follows content.
+#ifndef KRAL_TRANSPORT_BOUNDED_QUEUE_H
+#define KRAL_TRANSPORT_BOUNDED_QUEUE_H
+
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <mutex>
+#include <optional>
+#include <utility>
+#include <vector>
+
+namespace kral {
+
+inline constexpr size_t kQueueCapacity = 4096;
+inline constexpr size_t kMaximumPacket = 4096;  // FCS bytes included
+
+using Packet = std::vector<uint8_t>;
+
+template <class Record>
+class BoundedQueue {
+ public:
+  explicit BoundedQueue(size_t capacity = kQueueCapacity) : capacity_(capacity) {}
+
+  // False when the oldest record had to be dropped to make room.
+  bool Push(Record record) {
+    bool kept_all = true;
+    {
+      const std::lock_guard lock(mutex_);
+      if (records_.size() >= capacity_) {
+        records_.pop_front();
+        ++dropped_;
+        kept_all = false;
+      }
+      records_.push_back(std::move(record));
+    }
+    not_empty_.notify_one();
+    return kept_all;
+  }
+
+  std::optional<Record> Pop() {
+    const std::lock_guard lock(mutex_);
+    return TakeFront();
+  }
+
+  // The oldest record, or nothing after the time-out. 0 does not wait.
+  std::optional<Record> PopWithin(std::chrono::milliseconds time_out) {
+    std::unique_lock lock(mutex_);
+    not_empty_.wait_for(lock, time_out, [this] { return !records_.empty(); });
+    return TakeFront();
+  }
+
+  void Clear() {
+    std::deque<Record> doomed;
+    const std::lock_guard lock(mutex_);
+    doomed.swap(records_);
+  }
+
+  size_t size() const {
+    const std::lock_guard lock(mutex_);
+    return records_.size();
+  }
+
+  uint64_t dropped() const {
+    const std::lock_guard lock(mutex_);
+    return dropped_;
+  }
+
+ private:
+  std::optional<Record> TakeFront() {
+    if (records_.empty()) return std::nullopt;
+    std::optional<Record> front(std::move(records_.front()));
+    records_.pop_front();
+    return front;
+  }
+
+  const size_t capacity_;
+  mutable std::mutex mutex_;
+  std::condition_variable not_empty_;
+  std::deque<Record> records_;
+  uint64_t dropped_ = 0;
+};
+
+using PacketQueue = BoundedQueue<Packet>;
+
+}  // namespace kral
+
+#endif
