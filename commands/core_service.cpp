@@ -1,0 +1,116 @@
+// Service requests without a shape of their own: keys, switches, service code, error log, status records, download.
+#include <algorithm>
+#include <array>
+#include <span>
+
+#include "commands/core_diag.h"
+#include "commands/core_diag_format.h"
+#include "commands/outputs.h"
+#include "frame/diag_ftm.h"
+
+namespace kral::diag {
+namespace {
+
+constexpr u8 kNvBackupSubsystem = 55;
+constexpr u32 kTimeOutNvBackup = 5;
+
+void LogEntry(Diag_FTM& phone, const char* name) {
+  phone.log().WriteLine(kLogFn, "%s()", name);
+}
+
+// Requests whose reply is handed to the caller as it came.
+template <class Row>
+bool ReadReply(Diag_FTM& phone, const char* name, const Row& row, uint16_t* size, uint8_t* reply) {
+  LogEntry(phone, name);
+  if (size == nullptr || reply == nullptr) {
+    phone.log().WriteLine(kLogErr, "%s() -- no reply buffer", name);
+    return false;
+  }
+  if (!Send(phone, row)) return false;
+  const auto response = phone.packet().response();
+  const auto copied = static_cast<uint16_t>(std::min<size_t>(response.size(), *size));
+  std::copy_n(response.begin(), copied, reply);
+  *size = copied;
+  return true;
+}
+
+}  // namespace
+
+bool PressKey(Diag_FTM& phone, uint8_t hold, uint8_t key) {
+  LogEntry(phone, "KRAL_DIAG_HS_KEY_F");
+  return Send(phone, kKeyPress, hold, key);
+}
+
+bool GetSwitches(Diag_FTM& phone, uint16_t* switches) {
+  LogEntry(phone, "KRAL_DIAG_GET_DIPSW_F");
+  if (!Send(phone, kGetSwitches)) return false;
+  uint16_t word = 0;
+  if (!phone.packet().ResponseAt16(1, word)) {
+    phone.log().WriteLine(kLogErr, "KRAL_DIAG_GET_DIPSW_F() -- reply without a switch word");
+    return false;
+  }
+  Put(switches, word);
+  return true;
+}
+
+bool SetSwitches(Diag_FTM& phone, uint16_t switches) {
+  LogEntry(phone, "KRAL_DIAG_SET_DIPSW_F");
+  return Send(phone, kSetSwitches, switches);
+}
+
+bool EnterDownload(Diag_FTM& phone) {
+  LogEntry(phone, "KRAL_DIAG_DLOAD_F");
+  return Send(phone, kEnterDownload);
+}
+
+bool SendServiceCode(Diag_FTM& phone, const char* code, uint8_t* result) {
+  if (code == nullptr) {
+    phone.log().WriteLine(kLogErr, "KRAL_SPC() -- no service programming code");
+    return false;
+  }
+  // The code goes to the log in clear, on purpose: a station's log must show what was tried.
+  phone.log().WriteLine(kLogFn, "KRAL_SPC( iSPC[6] = %c%c%c%c%c%c)", code[0], code[1], code[2], code[3], code[4],
+                        code[5]);
+  std::array<uint8_t, 6> digits{};
+  std::copy_n(code, digits.size(), digits.begin());
+  if (!Send(phone, kServiceCode, digits)) return false;
+  uint8_t accepted = 0;
+  if (!phone.packet().Read8(accepted)) return false;
+  Put(result, accepted);
+  return true;
+}
+
+bool FreezeSecurity(Diag_FTM& phone) {
+  LogEntry(phone, "KRAL_DIAG_SECURITY_FREEZE_F");
+  return Send(phone, kSecurityFreeze);
+}
+
+bool BackUpNv(Diag_FTM& phone) {
+  LogEntry(phone, "KRAL_DIAG_NV_CNV_DIAG_BACKUP_F");
+  return SendWithin(phone, kTimeOutNvBackup, kNvBackup, kNvBackupSubsystem, u16{0});
+}
+
+bool ClearErrorRecord(Diag_FTM& phone, uint8_t record) {
+  LogEntry(phone, "KRAL_DIAG_ERR_CLEAR_F");
+  return Send(phone, kErrorLogClear, record);
+}
+
+bool ReadErrorLog(Diag_FTM& phone, uint16_t* size, uint8_t* reply) {
+  return ReadReply(phone, "KRAL_DIAG_ERR_READ_F", kErrorLogRead, size, reply);
+}
+
+bool ReadStatus(Diag_FTM& phone, uint16_t* size, uint8_t* reply) {
+  return ReadReply(phone, "KRAL_DIAG_STATUS_F", kStatus, size, reply);
+}
+
+bool ReadIs2000Status(Diag_FTM& phone, uint16_t* size, uint8_t* reply) {
+  return ReadReply(phone, "KRAL_DIAG_IS2000_STATUS_F", kIs2000Status, size, reply);
+}
+
+bool RefuseGsmCallControl(Diag_FTM& phone, const char* name) {
+  LogEntry(phone, name);
+  phone.log().WriteLine(kLogErr, "%s() -- no request is defined for this function", name);
+  return false;
+}
+
+}  // namespace kral::diag

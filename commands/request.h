@@ -1,0 +1,147 @@
+// Requests as typed rows: a row names the fields behind its header, and Send appends exactly those, little-endian. A
+// missing, surplus or too wide field does not compile.
+//
+//   inline constexpr DiagRequest<u16> kSetDipsw{48};
+//   Send(phone, kSetDipsw, switches);              // 30 lo hi
+//
+// What stands in front of the fields, and how the packet goes out, is the row's header type. A header has
+//   key()            by which a table of rows is sorted
+//   Begin(phone)     resets the default packet buffer and writes the header into it
+//   Transmit(phone)  sends what the buffer holds and awaits the reply
+#ifndef KRAL_COMMANDS_REQUEST_H
+#define KRAL_COMMANDS_REQUEST_H
+
+#include <algorithm>
+#include <array>
+#include <concepts>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <type_traits>
+#include <utility>
+
+#include "frame/base/diag_packet.h"
+#include "frame/diag_ftm.h"
+
+namespace kral {
+
+using u8 = std::uint8_t;
+using u16 = std::uint16_t;
+using u32 = std::uint32_t;
+using s8 = std::int8_t;
+using s16 = std::int16_t;
+using s32 = std::int32_t;
+
+// Field types beside the integers: N bytes exactly, or a run of bytes, words or double words of any length.
+template <std::size_t N>
+using Block = std::span<const u8, N>;
+using Bytes = std::span<const u8>;
+using Words = std::span<const u16>;
+using DoubleWords = std::span<const u32>;
+
+template <class T>
+concept WireInteger = std::integral<T> && !std::same_as<T, bool>;
+
+// The value of one field. Integers convert only where every value of the source fits (u8 to u16, never back).
+template <class T>
+struct Field {
+  T value;
+
+  template <class Source>
+  requires(WireInteger<T>&& WireInteger<Source>&& requires { T{std::declval<Source>()}; }) ||
+      (!WireInteger<T> && std::convertible_to<const Source&, T>)constexpr Field(const Source& source) : value(source) {}
+};
+
+template <class T>
+void AppendField(CDiagPacket& packet, const Field<T>& field) {
+  if constexpr (WireInteger<T>) {
+    const auto bits = static_cast<std::make_unsigned_t<T>>(field.value);
+    if constexpr (sizeof(T) == 1) {
+      packet.Append8(bits);
+    } else if constexpr (sizeof(T) == 2) {
+      packet.Append16(bits);
+    } else {
+      static_assert(sizeof(T) == 4, "no request carries wider fields");
+      packet.Append32(bits);
+    }
+  } else if constexpr (sizeof(typename T::value_type) == 1) {
+    packet.AppendBlock(field.value);
+  } else {
+    for (const auto element : field.value) AppendField(packet, Field<typename T::value_type>(element));
+  }
+}
+
+template <class Header, class... Fields>
+struct Request {
+  Header header;
+};
+
+// Builds the request in the phone's default packet buffer without sending it.
+template <class Header, class... Fields>
+void Compose(Diag_FTM& phone, const Request<Header, Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
+  row.header.Begin(phone);
+  (AppendField(phone.packet(), fields), ...);
+}
+
+// True when the reply arrived; it is then the response of the phone's default packet buffer.
+template <class Header, class... Fields>
+bool Send(Diag_FTM& phone, const Request<Header, Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
+  Compose(phone, row, fields...);
+  return row.header.Transmit(phone);
+}
+
+// The same with another time-out than the default one.
+template <class Header, class... Fields>
+bool SendWithin(Diag_FTM& phone, u32 time_out_id, const Request<Header, Fields...>& row,
+                std::type_identity_t<Field<Fields>>... fields) {
+  Compose(phone, row, fields...);
+  return phone.Send(phone.packet(), phone.TimeOut(time_out_id));
+}
+
+// For the static_assert behind a table of rows.
+template <class... Rows>
+constexpr bool AreSorted(const Rows&... rows) {
+  const std::array<u32, sizeof...(Rows)> keys{rows.header.key()...};
+  return std::is_sorted(keys.begin(), keys.end());
+}
+
+// --- The two plain headers
+// --------------------------------------------------------------------------------------------
+
+// One byte, the command code.
+struct DiagHeader {
+  u8 code;
+
+  constexpr u32 key() const { return code; }
+  void Begin(Diag_FTM& phone) const {
+    phone.packet().Reset();
+    phone.packet().Append8(code);
+  }
+  bool Transmit(Diag_FTM& phone) const { return phone.Send(phone.packet()); }
+};
+
+inline constexpr u8 kSubsystemDispatch = 75;
+
+// The subsystem-dispatch form: 75, the subsystem, its 16-bit command.
+struct SubsystemHeader {
+  u8 subsystem;
+  u16 command;
+
+  constexpr u32 key() const { return u32{subsystem} << 16 | command; }
+  void Begin(Diag_FTM& phone) const {
+    phone.packet().Reset();
+    phone.packet().Append8(kSubsystemDispatch);
+    phone.packet().Append8(subsystem);
+    phone.packet().Append16(command);
+  }
+  bool Transmit(Diag_FTM& phone) const { return phone.Send(phone.packet()); }
+};
+
+template <class... Fields>
+using DiagRequest = Request<DiagHeader, Fields...>;
+template <class... Fields>
+using SubsystemRequest = Request<SubsystemHeader, Fields...>;
+
+}  // namespace kral
+
+#endif
