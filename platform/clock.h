@@ -15,8 +15,18 @@ class Clock {
   virtual void SleepMs(uint32_t milliseconds) = 0;
 };
 
-// The machine's clock. On Windows SleepMs(1) really takes about 1 ms (the timer resolution is raised while in use).
+// The machine's clock. Its sleeps and every timed wait are good to about 1 ms while a FineTimer lives.
 Clock& SystemClock();
+
+// Held while a connection is open. Windows rounds sleeps and waits up to its timer tick (15.6 ms by default), which
+// this raises to 1 ms for as long as somebody holds one; Linux needs nothing.
+class FineTimer {
+ public:
+  FineTimer();
+  ~FineTimer();
+  FineTimer(const FineTimer&) = delete;
+  FineTimer& operator=(const FineTimer&) = delete;
+};
 
 }  // namespace kral
 
