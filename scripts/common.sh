@@ -1,0 +1,38 @@
+# Shared by the scripts of this folder: where things are, installing packages, running programs as root.
+set -euo pipefail
+
+tree=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
+cache=${KRAL_CACHE_DIR:-${XDG_CACHE_HOME:-${HOME:-/root}/.cache}/kral}
+
+say() { printf '%s\n' "$*" >&2; }
+
+die() {
+  say "$(basename "$0"): $*"
+  exit 1
+}
+
+as_root() {
+  if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
+}
+
+# need_packages PACKAGE...: installs what is missing with apt-get, and does not touch apt when nothing is.
+need_packages() {
+  local missing=() package
+  for package in "$@"; do
+    dpkg-query -W -f '${Status}\n' "$package" 2>/dev/null | grep -q '^install ok installed$' || missing+=("$package")
+  done
+  [ ${#missing[@]} -eq 0 ] && return
+  say "installing: ${missing[*]}"
+  local log
+  log=$(mktemp)
+  # Others may be installing on this machine: wait for apt's own lock.
+  local apt=(env DEBIAN_FRONTEND=noninteractive apt-get -qq -o DPkg::Lock::Timeout=300)
+  { as_root "${apt[@]}" update && as_root "${apt[@]}" install -y --no-install-recommends "${missing[@]}"; } \
+    >"$log" 2>&1 || { cat "$log" >&2; rm -f "$log"; die "these packages could not be installed: ${missing[*]}"; }
+  rm -f "$log"
+}
+
+# What every build needs, and what the 32-bit Windows home needs beside it.
+build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev)
+windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
+wine_packages=(mmdebstrap util-linux)
