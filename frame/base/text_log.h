@@ -7,12 +7,12 @@
 #include <cstdio>
 #include <memory>
 #include <mutex>
-#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "frame/base/log_flags.h"
+#include "platform/clock.h"
 
 namespace kral {
 
@@ -21,7 +21,7 @@ using TextLogCallback = void (*)(uint32_t size, const void* record, uint32_t han
 
 class DataLogFileHandler {
  public:
-  DataLogFileHandler();
+  explicit DataLogFileHandler(Clock& clock = SystemClock());
   ~DataLogFileHandler();
   DataLogFileHandler(const DataLogFileHandler&) = delete;
   DataLogFileHandler& operator=(const DataLogFileHandler&) = delete;
@@ -37,11 +37,42 @@ class DataLogFileHandler {
   void SetFlags(uint32_t mask);       // stores and activates the mask
   void SetCallback(TextLogCallback callback, uint32_t handle);
 
-  bool started_result() const;   // what KRAL_IsLoggingStarted reports
-  bool logging_started() const;  // set by the first Start, never cleared (the formatting logger looks at it)
+  bool started_result() const { return started_result_; }    // what KRAL_IsLoggingStarted reports
+  bool logging_started() const { return logging_started_; }  // set by the first Start, never cleared
+
+  // Stamps lines with the milliseconds since the last stop instead of the clock.
+  void SetRelativeTimeStamps(bool on) { relative_time_stamps_ = on; }
+
+  // Named debug switches beside the mask; an unknown one is off.
+  void RegisterCategory(std::string_view name, bool on);
+  bool IsCategoryOn(std::string_view name) const;
 
  private:
-  std::atomic<uint32_t> active_mask_{0};
+  struct FileCloser {
+    void operator()(std::FILE* file) const { std::fclose(file); }
+  };
+  struct Category {
+    std::string name;
+    bool on;
+  };
+
+  void WriteToFile(uint32_t flag, const char* text);  // lock held
+  void CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text);
+
+  Clock& clock_;
+  std::atomic<uint32_t> active_mask_{0};  // nothing goes anywhere until SetFlags or Start
+  std::atomic<bool> logging_started_{false};
+  std::atomic<bool> started_result_{false};
+  std::atomic<bool> relative_time_stamps_{false};
+  std::atomic<uint32_t> start_tick_;
+
+  mutable std::mutex mutex_;  // guards what follows
+  std::string file_name_;     // empty when stopped
+  std::unique_ptr<std::FILE, FileCloser> file_;
+  uint32_t stored_mask_ = kDefaultLogMask;
+  TextLogCallback callback_ = nullptr;
+  uint32_t callback_handle_ = 0;
+  std::vector<Category> categories_;
 };
 
 }  // namespace kral
