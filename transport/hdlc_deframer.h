@@ -3,6 +3,8 @@
 #define KRAL_TRANSPORT_HDLC_DEFRAMER_H
 
 #include <array>
+#include <atomic>
+#include <cstddef>
 #include <cstdint>
 #include <span>
 
@@ -12,6 +14,7 @@ namespace kral {
 
 class DataLogFileHandler;
 
+// Fed by the receive thread only; the counters may be read from any thread.
 class HdlcDeframer {
  public:
   explicit HdlcDeframer(PacketListener& sink) : sink_(sink) {}
@@ -21,18 +24,24 @@ class HdlcDeframer {
   void DropPartial();  // forgets the unfinished packet
 
   // Lost traffic is known: frames dropped for a bad FCS, and for being oversized.
-  uint64_t bad_fcs() const { return bad_fcs_; }
-  uint64_t oversized() const { return oversized_; }
+  uint64_t bad_fcs() const { return bad_fcs_.load(std::memory_order_relaxed); }
+  uint64_t oversized() const { return oversized_.load(std::memory_order_relaxed); }
 
  private:
-  static constexpr uint16_t kCapacity = 4096;
+  static constexpr size_t kMaximumLength = 4094;
+
+  void FinishPacket(std::span<const uint8_t> packet);
+  void DeliverChecked(std::span<const uint8_t> packet);
+  void DropOverrun();
+  void EraseZeroTail();
+
   PacketListener& sink_;
   DataLogFileHandler* log_ = nullptr;
-  std::array<uint8_t, kCapacity> packet_{};
-  uint16_t length_ = 0;
+  std::array<uint8_t, 4096> packet_{};
+  size_t length_ = 0;
   bool escape_pending_ = false;
-  uint64_t bad_fcs_ = 0;  // read by other threads through the transport's counters
-  uint64_t oversized_ = 0;
+  std::atomic<uint64_t> bad_fcs_{0};
+  std::atomic<uint64_t> oversized_{0};
 };
 
 }  // namespace kral
