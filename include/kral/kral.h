@@ -23,6 +23,7 @@
 
 #include "kral/types.h"
 
+#include "kral/band.h"
 #include "kral/connection.h"
 #include "kral/diag.h"
 #include "kral/text_log.h"
