@@ -53,7 +53,7 @@ class SerialDevice {
 
 // Opens COM `number` exclusively at 115200 baud, 8 data bits, no parity, one stop bit, no flow control, binary, with
 // 4,096-byte driver buffers and reads that return at once. Null on failure, with the reason in `result`.
-// On Linux the number is mapped to a device as port_names.h tells.
+// The device is ComPortDevice(number).
 std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result);
 
 }  // namespace kral

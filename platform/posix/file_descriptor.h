@@ -16,7 +16,7 @@ class FileDescriptor {
   explicit FileDescriptor(int fd) : fd_(fd) {}
   FileDescriptor(FileDescriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
   FileDescriptor& operator=(FileDescriptor&& other) noexcept {
-    std::swap(fd_, other.fd_);
+    FileDescriptor old(std::exchange(fd_, std::exchange(other.fd_, -1)));
     return *this;
   }
   ~FileDescriptor() {

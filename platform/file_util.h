@@ -1,0 +1,40 @@
+// Whole files: read with a limit, replaced in one step.
+#ifndef KRAL_PLATFORM_FILE_UTIL_H
+#define KRAL_PLATFORM_FILE_UTIL_H
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+#include <system_error>
+#include <vector>
+
+namespace kral {
+
+// Reads a file of at most `limit` bytes; a longer one is std::errc::file_too_large, and nothing of it is given.
+std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes);
+
+// A file being written under a temporary name beside its target. Until Commit the target stays as it was; without a
+// Commit the destructor removes what was written. After a failed Write every later step fails.
+class AtomicFile {
+ public:
+  AtomicFile();
+  ~AtomicFile();
+  AtomicFile(const AtomicFile&) = delete;
+  AtomicFile& operator=(const AtomicFile&) = delete;
+
+  std::error_code Open(const std::string& path);
+  std::error_code Write(std::span<const uint8_t> bytes);
+  std::error_code Commit();  // on the disk and under the target's name, replacing what was there
+
+ private:
+  struct State;
+  std::unique_ptr<State> state_;
+};
+
+std::error_code ReplaceWholeFile(const std::string& path, std::span<const uint8_t> bytes);
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,59 @@
+// The terminal on Linux.
+#include "platform/console.h"
+
+#include <signal.h>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+namespace kral {
+namespace {
+
+constexpr int kDefaultWidth = 80;
+constexpr int kInterrupted = 130;
+
+// A signal handler reaches nothing but process-wide lock-free state.
+std::atomic<std::atomic<bool>*> interrupt_flag{nullptr};
+static_assert(std::atomic<std::atomic<bool>*>::is_always_lock_free && std::atomic<bool>::is_always_lock_free);
+
+void OnSignal(int) {
+  std::atomic<bool>* flag = interrupt_flag.load();
+  if (flag == nullptr || flag->exchange(true)) ::_exit(kInterrupted);
+}
+
+int Descriptor(StandardStream stream) {
+  switch (stream) {
+    case StandardStream::kInput:
+      return STDIN_FILENO;
+    case StandardStream::kOutput:
+      return STDOUT_FILENO;
+    default:
+      return STDERR_FILENO;
+  }
+}
+
+}  // namespace
+
+bool IsTerminal(StandardStream stream) {
+  return ::isatty(Descriptor(stream)) != 0;
+}
+
+int TerminalWidth(StandardStream stream) {
+  winsize size{};
+  if (::ioctl(Descriptor(stream), TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kDefaultWidth;
+  return size.ws_col;
+}
+
+void CatchInterrupts(std::atomic<bool>* flag) {
+  interrupt_flag = flag;
+  struct sigaction action {};
+  if (flag != nullptr) {
+    action.sa_handler = OnSignal;
+  } else {
+    action.sa_handler = SIG_DFL;
+  }
+  // Without SA_RESTART, so that a blocking read of the terminal ends.
+  ::sigaction(SIGINT, &action, nullptr);
+  ::sigaction(SIGTERM, &action, nullptr);
+}
+
+}  // namespace kral
