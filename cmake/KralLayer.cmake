@@ -7,7 +7,7 @@ function(kral_layer name)
   list(TRANSFORM LAYER_ARROWS PREPEND kral_)
   if(sources)
     add_library(kral_${name} OBJECT ${sources})
-    target_compile_definitions(kral_${name} PUBLIC KRAL_BUILDING)
+    target_compile_definitions(kral_${name} PRIVATE KRAL_BUILDING)
     target_link_libraries(kral_${name} PUBLIC ${LAYER_ARROWS} Threads::Threads
       PRIVATE kral_compile ${LAYER_LIBRARIES})
     target_include_directories(kral_${name} PUBLIC ${PROJECT_SOURCE_DIR})

@@ -1,18 +1,41 @@
 # The library itself: libkral.so.6 on Linux, kral.dll on Windows, from the objects of every layer.
 set(KRAL_LAYERS platform frame_base transport frame commands storage download rfcal)
 
-file(WRITE ${CMAKE_CURRENT_BINARY_DIR}/kral_library.cpp "// The library is made of the layers' objects only.\n")
-add_library(kral SHARED ${CMAKE_CURRENT_BINARY_DIR}/kral_library.cpp)
+add_library(kral SHARED)
 add_library(kral::kral ALIAS kral)
 kral_link_layers(kral ${KRAL_LAYERS})
 target_include_directories(kral INTERFACE
   $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
   $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
-set_target_properties(kral PROPERTIES VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR})
+set_target_properties(kral PROPERTIES LINKER_LANGUAGE CXX)
+
 if(WIN32)
-  # Undecorated, fixed names; a fixed base keeps two builds of one tree byte-identical.
-  set_target_properties(kral PROPERTIES PREFIX "" VERSION "" SOVERSION "")
-  target_link_options(kral PRIVATE -Wl,--image-base=0x63000000 -Wl,--kill-at)
+  # The DLL lies beside the programs that use it: Windows looks there first.
+  set_target_properties(kral PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/bin PREFIX ""
+    IMPORT_PREFIX lib)
+  enable_language(RC)
+  configure_file(cmake/kral.rc.in ${CMAKE_CURRENT_BINARY_DIR}/kral.rc @ONLY)
+  target_sources(kral PRIVATE ${CMAKE_CURRENT_BINARY_DIR}/kral.rc)
+  # A fixed base and no time stamp: two builds of one tree give the same bytes.
+  target_link_options(kral PRIVATE -Wl,--image-base=0x63000000 -Wl,--no-insert-timestamp
+    -Wl,--output-def=${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def)
+
+  # Visual C++ links through a short-form import library of its own. The ordinals are left out of it: they change
+  # with every added function, the names do not.
+  find_program(KRAL_DLLTOOL NAMES llvm-dlltool llvm-dlltool-14 REQUIRED)
+  set(KRAL_MSVC_IMPORT_LIBRARY ${CMAKE_CURRENT_BINARY_DIR}/kral.lib)
+  add_custom_command(TARGET kral POST_BUILD
+    COMMAND ${CMAKE_COMMAND} -DINPUT=${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def
+      -DOUTPUT=${CMAKE_CURRENT_BINARY_DIR}/kral.def -P ${PROJECT_SOURCE_DIR}/cmake/StripOrdinals.cmake
+    COMMAND ${KRAL_DLLTOOL} -m i386 -k -d kral.def -l ${KRAL_MSVC_IMPORT_LIBRARY}
+    WORKING_DIRECTORY ${CMAKE_CURRENT_BINARY_DIR}
+    BYPRODUCTS ${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def ${CMAKE_CURRENT_BINARY_DIR}/kral.def
+      ${KRAL_MSVC_IMPORT_LIBRARY}
+    VERBATIM)
 else()
-  target_link_options(kral PRIVATE -Wl,--no-undefined)
+  set_target_properties(kral PROPERTIES VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR})
+  # Visibility already hides our own symbols; the script also hides what templates of other libraries leave behind.
+  target_link_options(kral PRIVATE -Wl,--no-undefined
+    -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/kral.map)
+  set_target_properties(kral PROPERTIES LINK_DEPENDS ${PROJECT_SOURCE_DIR}/cmake/kral.map)
 endif()
