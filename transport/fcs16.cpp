@@ -92,7 +92,9 @@ WordPair Load(const uint8_t* data) {
 }
 
 // The words at the odd places before and behind a pair's border: the second of one and the first of the next.
-WordPair Straddle(WordPair pair, WordPair next) { return __builtin_shufflevector(pair, next, 1, 2); }
+WordPair Straddle(WordPair pair, WordPair next) {
+  return __builtin_shufflevector(pair, next, 1, 2);
+}
 
 // A word takes up the words 4, 11 and 16 places before it, which is 2, 5 1/2 and 8 pairs. The pair 8 before is the one
 // whose place in the window it takes.

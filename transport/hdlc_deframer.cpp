@@ -2,9 +2,12 @@
 #include "transport/hdlc_deframer.h"
 
 #include <algorithm>
+#include <bit>
+#include <utility>
 
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
+#include "transport/byte_block.h"
 #include "transport/fcs16.h"
 #include "transport/hdlc_frame.h"
 
@@ -31,22 +34,72 @@ void LogPacket(DataLogFileHandler* log, uint32_t flag, const char* format, std::
 }  // namespace
 
 void HdlcDeframer::Feed(std::span<const uint8_t> chunk) {
-  for (const uint8_t byte : chunk) {
-    if (byte == kFrameEscape) {
-      escape_pending_ = true;
-    } else if (byte == kFrameFlag) {
+  const uint8_t* in = chunk.data();
+  const uint8_t* const end = in + chunk.size();
+  while (in != end) {
+    in = Unstuff(in, end);
+    if (in == end) break;
+    if (*in == kFrameFlag) {
       // An escape pending here stays pending: it un-escapes the first byte of the next packet. Required.
       FinishPacket({packet_.data(), length_});
       length_ = 0;
-    } else if (length_ == kMaximumLength) {
-      escape_pending_ = false;
-      DropOverrun();
+      do ++in;
+      while (in != end && *in == kFrameFlag);
     } else {
-      packet_[length_++] = escape_pending_ ? byte ^ kEscapeBit : byte;
-      escape_pending_ = false;
+      DropOverrun();
+      ++in;
     }
   }
   EraseZeroTail();
+}
+
+// Appends bytes to the packet up to the next flag, or the byte that finds the packet full, or the end of the chunk.
+// Gives where it stopped.
+//
+// Blocks are copied whole as long as they hold nothing special, and up to a flag. A lone escape byte is jumped over;
+// where they stand close, the bytes go one by one without a branch.
+const uint8_t* HdlcDeframer::Unstuff(const uint8_t* in, const uint8_t* end) {
+  uint8_t* out = packet_.data() + length_;
+  uint8_t* const full = packet_.data() + kMaximumLength;
+  bool escape = escape_pending_;
+  for (;;) {
+    while (!escape && static_cast<size_t>(end - in) >= ByteBlock::kSize &&
+           static_cast<size_t>(full - out) >= ByteBlock::kSize) {
+      const ByteBlock block = ByteBlock::Load(in);
+      block.Store(out);
+      const uint32_t flags = block.Find(kFrameFlag);
+      const uint32_t until_flag = flags != 0 ? static_cast<uint32_t>(std::countr_zero(flags)) : ByteBlock::kSize;
+      const uint32_t escapes = block.Find(kFrameEscape) & ((1U << until_flag) - 1U);
+      const uint32_t plain = static_cast<uint32_t>(std::countr_zero(escapes));
+      if (escapes == 0) {
+        in += until_flag;
+        out += until_flag;
+        if (flags != 0) break;
+      } else if (std::has_single_bit(escapes) && plain + 1 < until_flag) {
+        out[plain] = in[plain + 1] ^ kEscapeBit;
+        in += plain + 2;
+        out += plain + 1;
+      } else {
+        for (const uint8_t* const stop = in + until_flag; in != stop; ++in) {
+          *out = escape ? *in ^ kEscapeBit : *in;
+          escape = *in == kFrameEscape;
+          out += escape ? 0 : 1;
+        }
+      }
+    }
+    if (in == end || *in == kFrameFlag) break;
+    if (*in == kFrameEscape) {
+      escape = true;
+    } else {
+      const bool was_escape = std::exchange(escape, false);
+      if (out == full) break;
+      *out++ = was_escape ? *in ^ kEscapeBit : *in;
+    }
+    ++in;
+  }
+  length_ = static_cast<size_t>(out - packet_.data());
+  escape_pending_ = escape;
+  return in;
 }
 
 void HdlcDeframer::DropPartial() {

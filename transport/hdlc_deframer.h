@@ -30,6 +30,7 @@ class HdlcDeframer {
  private:
   static constexpr size_t kMaximumLength = 4094;
 
+  const uint8_t* Unstuff(const uint8_t* in, const uint8_t* end);
   void FinishPacket(std::span<const uint8_t> packet);
   void DeliverChecked(std::span<const uint8_t> packet);
   void DropOverrun();

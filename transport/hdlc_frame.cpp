@@ -2,26 +2,45 @@
 #include "transport/hdlc_frame.h"
 
 #include <algorithm>
+#include <bit>
 
+#include "transport/byte_block.h"
 #include "transport/fcs16.h"
 
 namespace kral {
 namespace {
 
-constexpr bool IsSpecial(uint8_t byte) {
-  return byte == kFrameFlag || byte == kFrameEscape;
+// One byte without a branch: a plain byte's second write is overwritten by what comes next, the closing flag at last.
+uint8_t* StuffByte(uint8_t byte, uint8_t* out) {
+  const bool special = byte == kFrameFlag || byte == kFrameEscape;
+  out[0] = special ? kFrameEscape : byte;
+  out[1] = byte ^ kEscapeBit;
+  return out + 1 + (special ? 1 : 0);
 }
 
-// Gives the end of what was written.
+// Gives the end of what was written; the byte behind it may have been written too.
+//
+// Blocks are copied whole as long as they hold nothing special. Behind a lone special byte the search goes on; where
+// they stand close, jumping from one to the next would cost more than going byte by byte.
 uint8_t* Stuff(std::span<const uint8_t> bytes, uint8_t* out) {
-  for (const uint8_t byte : bytes) {
-    if (IsSpecial(byte)) {
-      *out++ = kFrameEscape;
-      *out++ = byte ^ kEscapeBit;
+  const uint8_t* in = bytes.data();
+  const uint8_t* const end = in + bytes.size();
+  while (static_cast<size_t>(end - in) >= ByteBlock::kSize) {
+    const ByteBlock block = ByteBlock::Load(in);
+    block.Store(out);
+    const uint32_t special = block.Find(kFrameFlag) | block.Find(kFrameEscape);
+    if (special == 0) {
+      in += ByteBlock::kSize;
+      out += ByteBlock::kSize;
+    } else if (std::has_single_bit(special)) {
+      const int before = std::countr_zero(special);
+      out = StuffByte(in[before], out + before);
+      in += before + 1;
     } else {
-      *out++ = byte;
+      for (const uint8_t* const block_end = in + ByteBlock::kSize; in != block_end; ++in) out = StuffByte(*in, out);
     }
   }
+  for (; in != end; ++in) out = StuffByte(*in, out);
   return out;
 }
 

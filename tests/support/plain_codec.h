@@ -14,9 +14,9 @@ using Bytes = std::vector<uint8_t>;
 
 // A shift register fed one bit at a time.
 inline uint16_t PlainFcs(const uint8_t* data, size_t bits) {
-  unsigned shift_register = 0xFFFF;
+  uint32_t shift_register = 0xFFFF;
   for (size_t i = 0; i < bits; ++i) {
-    const unsigned in = data[i / 8] >> (i % 8);
+    const unsigned in = static_cast<unsigned>(data[i / 8]) >> (i % 8);
     const bool out = ((shift_register ^ in) & 1U) != 0;
     shift_register >>= 1;
     if (out) shift_register ^= 0x8408;
