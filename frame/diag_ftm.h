@@ -9,7 +9,6 @@
 #include <memory>
 #include <mutex>
 #include <span>
-#include <vector>
 
 #include "frame/base/diag_packet.h"
 #include "frame/base/text_log.h"
@@ -35,18 +34,22 @@ class Diag_FTM {
  public:
   // Direct mode: owns a transport over COM `port`.
   explicit Diag_FTM(uint16_t port, Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
-  // Server mode: talks through the server, which outlives the object.
-  Diag_FTM(OrbtServer& server, uint16_t port, Clock& clock = SystemClock());
+  // Server mode: talks through the server.
+  Diag_FTM(std::shared_ptr<OrbtServer> server, uint16_t port, Clock& clock = SystemClock());
   ~Diag_FTM();
   Diag_FTM(const Diag_FTM&) = delete;
   Diag_FTM& operator=(const Diag_FTM&) = delete;
 
   // --- Connection -------------------------------------------------------------------------------------------------
+  // Remembers the arguments: a port that is closed later is reopened with those of the last explicit open.
   bool OpenPort(const OpenArguments& arguments);
   bool ClosePort();
   bool IsPhoneConnected();
-  // Direct mode: reopens a closed port with the arguments of the last explicit open.
+  // Direct mode: reopens a closed port.
   bool IsPortOpen();
+  // Closes the port for good, once a running request has ended: its context is being released, and a request of
+  // another thread that still holds the object must not open the port again.
+  void Retire();
 
   // --- Requests ---------------------------------------------------------------------------------------------------
   // Held for a whole operation by OnPhone; recursive, so that operations may be built from operations.
@@ -80,28 +83,61 @@ class Diag_FTM {
   Clock& clock() { return clock_; }
 
   // --- Settings ---------------------------------------------------------------------------------------------------
-  bool server_mode() const;
-  OrbtServer* server_port();
-  bool connected() const;
-  uint16_t port() const;
-  uint8_t target_type() const;
+  bool server_mode() const { return server_ != nullptr; }
+  OrbtServer* server_port() { return server_.get(); }
+  bool connected() const { return connected_; }
+  uint16_t port() const { return port_; }
+  uint8_t target_type() const { return target_type_; }
   void SetTargetType(uint8_t type);  // values above 1 are ignored
-  uint32_t handle() const;
-  void SetHandle(uint32_t handle);
-  void SetData2DiagSearch(uint8_t on);
-  bool framed() const;  // false in the unframed packet modes
-  void SetFramed(bool framed);
+  uint32_t handle() const { return handle_; }
+  void SetHandle(uint32_t handle) { handle_ = handle; }
+  bool SetReceiveMode(ReceiveMode mode);  // false in server mode, which has no receive thread
+  void SetData2DiagSearch(bool on) { data_to_diagnostic_search_ = on; }
+  bool data_to_diagnostic_search() const { return data_to_diagnostic_search_; }
+  bool framed() const { return framed_; }  // false in the unframed packet modes
+  void SetFramed(bool framed) { framed_ = framed; }
 
   FtmSettings& ftm() { return ftm_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
  private:
+  struct Parts;  // what the threads of the connection keep alive
+
+  void ApplyDefaults();
+  void ReadStationFile();
+  bool Open(const OpenArguments& arguments);
+  void OpenThroughServer();
+  void OpenDirect(const OpenArguments& arguments);
+  void UnregisterFromServer();
+  bool IsDiagServiceAlive();
+  bool IsLoopbackAnswered();
+  bool IsVersionAnswered();
+  bool SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> response, uint16_t& response_size,
+                         uint8_t expected_code, uint32_t time_out_ms);
+  void LogRefusal(uint8_t code);
+
   std::recursive_mutex request_lock_;
   Clock& clock_;
+  const std::shared_ptr<OrbtServer> server_;  // null in direct mode
+  const uint16_t port_;
+  std::shared_ptr<Parts> parts_;
   std::array<CDiagPacket, 3> packets_;
   FtmSettings ftm_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
+
+  OpenArguments last_open_;
+  bool null_port_ = false;
+  bool listener_registered_ = false;  // server mode
+  bool retired_ = false;
+
+  // Read and set without the request lock.
+  std::array<std::atomic<uint32_t>, kTimeOutCount> time_outs_{};
+  std::atomic<bool> connected_{false};
+  std::atomic<uint8_t> target_type_{kTargetModem};
+  std::atomic<uint32_t> handle_{0};
+  std::atomic<bool> data_to_diagnostic_search_{true};
+  std::atomic<bool> framed_{true};
 };
 
 }  // namespace kral

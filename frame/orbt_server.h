@@ -6,9 +6,11 @@
 #define KRAL_FRAME_ORBT_SERVER_H
 
 #include <cstdint>
+#include <exception>
 #include <functional>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <span>
 #include <string>
 #include <vector>
@@ -46,6 +48,7 @@ class SoftwareDownload {
   int32_t GetTimeOut(uint32_t id) const;
 
  private:
+  mutable std::mutex mutex_;
   std::map<uint32_t, int32_t> time_outs_;
 };
 
@@ -56,7 +59,7 @@ struct ServerFactory {
 
 // Library-wide; empty functions mean that there is no server.
 void SetServerFactory(ServerFactory factory);
-const ServerFactory& CurrentServerFactory();
+ServerFactory CurrentServerFactory();
 
 }  // namespace kral
 

@@ -18,7 +18,8 @@ class Diag_FTM;
 class OrbtServer;
 class SoftwareDownload;
 
-// An object of a command family owned by a context row: an NV tool, an EFS client, a download session.
+// An object of a command family owned by a context row: an NV tool, an EFS client, a download session. Objects of the
+// slots behind the phone object are destroyed after it, so their destructors must not use it.
 class FamilyObject {
  public:
   virtual ~FamilyObject() = default;
@@ -45,6 +46,9 @@ enum class FamilySlot {
 
 namespace Kral_ResourceManager {
 
+// Appends the machine's COM ports; false when they cannot be listed.
+using PortLister = std::function<bool(std::vector<uint16_t>& ports)>;
+
 inline constexpr uint16_t kAnyPort = 65535;
 inline constexpr size_t kContextCount = 50;
 
@@ -57,8 +61,9 @@ void ReleaseAllContexts();
 std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle);
 bool PortOf(KRAL_HANDLE handle, uint16_t& port);
 
-// The family object of a slot, made by `make` on the first call; null when there is no phone object, when `make` gives
-// null or throws, and, for the server-mode slots, in direct mode.
+// The family object of a slot, made by `make` on the first call, under the handset's request lock; null when there is
+// no phone object, when `make` gives null or throws, and, for the server-mode slots, in direct mode. An empty `make`
+// only looks and never waits. The pointer keeps the phone object alive too.
 using FamilyMaker = std::function<std::shared_ptr<FamilyObject>(Diag_FTM& phone, KRAL_HANDLE handle)>;
 std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make);
 
@@ -83,8 +88,10 @@ bool ResolvePortAlias(uint16_t logical, uint16_t& physical);  // the first match
 bool AllPorts(std::span<uint16_t> ports, uint16_t& count);
 bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<const uint16_t> ignored);
 
-// How phone objects open devices; tests install a fake.
+// How phone objects open devices and how the machine's ports are listed; tests install fakes, an empty function puts
+// the real one back.
 void SetDeviceOpener(DeviceOpener opener);
+void SetPortLister(PortLister lister);
 
 }  // namespace Kral_ResourceManager
 }  // namespace kral

@@ -1,0 +1,27 @@
+// The part of a phone object that its threads share. A thread that does not end in time keeps it alive, so that
+// nothing is freed under it.
+#ifndef KRAL_FRAME_DIAG_FTM_PARTS_H
+#define KRAL_FRAME_DIAG_FTM_PARTS_H
+
+#include <optional>
+
+#include "frame/diag_ftm.h"
+#include "transport/kral_events.h"
+
+namespace kral {
+
+struct Diag_FTM::Parts {
+  explicit Parts(Clock& clock) : log(clock) { sorter.SetLogger(&log); }
+
+  DataLogFileHandler log;
+  PacketQueue responses;
+  PacketQueue asynchronous;
+  BoundedQueue<EventRecord> events;
+  CKralEventListener sorter{responses, asynchronous, events};
+  CKralEvents dispatcher;
+  std::optional<CKralThreadInterface> transport;  // direct mode
+};
+
+}  // namespace kral
+
+#endif

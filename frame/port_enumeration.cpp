@@ -1,0 +1,137 @@
+// Lists the ports of the machine or of the phone server, finds those on which a handset answers, and keeps the port
+// aliases.
+#include <algorithm>
+#include <cstdlib>
+#include <utility>
+
+#include "frame/diag_ftm.h"
+#include "frame/library_state.h"
+#include "frame/orbt_server.h"
+#include "frame/resource_manager.h"
+#include "platform/port_list.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kPortPrefixLength = 3;  // as in COM12
+
+uint16_t PortNumber(const std::string& name) {
+  return name.size() <= kPortPrefixLength ? uint16_t{0}
+                                          : static_cast<uint16_t>(std::atoi(name.c_str() + kPortPrefixLength));
+}
+
+bool ListMachinePorts(std::vector<uint16_t>& ports) {
+  Kral_ResourceManager::PortLister lister;
+  {
+    const std::lock_guard lock(Library().mutex);
+    lister = Library().port_lister;
+  }
+  return lister ? lister(ports) : ListComPorts(ports);
+}
+
+// The proxy that answers for ports rather than for a handset; made on first use, kept until all is disconnected.
+std::shared_ptr<OrbtServer> PortInfo() {
+  auto& library = Library();
+  const std::lock_guard building(library.build_mutex);
+  {
+    const std::lock_guard lock(library.mutex);
+    if (library.port_info) return library.port_info;
+  }
+  auto made = MakeServer("KRAL-PortInfo");
+  const std::lock_guard lock(library.mutex);
+  library.port_info = made;
+  return made;
+}
+
+bool CopyServerPorts(std::vector<std::string> (OrbtServer::*list)(), std::span<uint16_t> ports, uint16_t& count) {
+  count = 0;
+  std::vector<std::string> names;
+  try {
+    const auto server = PortInfo();
+    if (server) names = (*server.*list)();
+  } catch (...) {
+    return false;
+  }
+  const size_t copied = std::min(names.size(), ports.size());
+  std::transform(names.begin(), names.begin() + static_cast<std::ptrdiff_t>(copied), ports.begin(), PortNumber);
+  count = static_cast<uint16_t>(copied);
+  return !names.empty();
+}
+
+// Opens the port, asks, and closes it again.
+bool AnswersOnPort(uint16_t port) {
+  const KRAL_HANDLE handle = Kral_ResourceManager::CreateContext(port);
+  if (handle == 0) return false;
+  bool answers = false;
+  if (const auto phone = Kral_ResourceManager::GetPhone(handle)) {
+    const std::lock_guard lock(phone->request_lock());
+    if (phone->OpenPort({})) {
+      answers = phone->IsPhoneConnected();
+      phone->ClosePort();
+    }
+  }
+  Kral_ResourceManager::ReleaseContext(handle, false);
+  return answers;
+}
+
+}  // namespace
+
+namespace Kral_ResourceManager {
+
+bool AllPorts(std::span<uint16_t> ports, uint16_t& count) {
+  if (server_mode()) return CopyServerPorts(&OrbtServer::AllPorts, ports, count);
+  std::vector<uint16_t> listed;
+  const bool succeeded = ListMachinePorts(listed);
+  if (!succeeded) listed.clear();
+  const size_t copied = std::min(listed.size(), ports.size());
+  std::copy_n(listed.begin(), copied, ports.begin());
+  count = static_cast<uint16_t>(copied);
+  return succeeded;
+}
+
+bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<const uint16_t> ignored) {
+  if (server_mode()) return CopyServerPorts(&OrbtServer::PortsWithPhone, ports, count);
+  // Each candidate is opened exclusively below, so every connection of the process is closed first.
+  ReleaseAllContexts();
+  std::vector<uint16_t> listed;
+  if (!ListMachinePorts(listed)) return false;
+  uint16_t found = 0;
+  for (const uint16_t port : listed) {
+    if (found >= ports.size()) break;
+    if (std::find(ignored.begin(), ignored.end(), port) != ignored.end()) continue;
+    if (AnswersOnPort(port)) ports[found++] = port;
+  }
+  count = found;
+  return true;
+}
+
+void AddPortAlias(uint16_t logical, uint16_t physical) {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  library.aliases.emplace_back(logical, physical);
+}
+
+void ClearPortAliases() {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  library.aliases.clear();
+}
+
+bool ResolvePortAlias(uint16_t logical, uint16_t& physical) {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  const auto found = std::find_if(library.aliases.begin(), library.aliases.end(),
+                                  [logical](const auto& alias) { return alias.first == logical; });
+  if (found == library.aliases.end()) return false;
+  physical = found->second;
+  return true;
+}
+
+void SetPortLister(PortLister lister) {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  library.port_lister = std::move(lister);
+}
+
+}  // namespace Kral_ResourceManager
+}  // namespace kral

@@ -1,0 +1,109 @@
+// Exports of the text log.
+#include <cstdio>
+#include <span>
+#include <string>
+
+#include "frame/base/hex_dump.h"
+#include "frame/export_call.h"
+#include "frame/version.h"
+#include "kral/text_log.h"
+
+namespace {
+
+using kral::Diag_FTM;
+using kral::LogFormatted;
+using kral::LogName;
+using kral::OnPhoneAtOnce;
+
+bool StartLog(Diag_FTM& phone, const char* file_name) {
+  phone.log().Start(file_name);
+  phone.log().WriteLine(kral::kLogFn, "VARN DLL Version: %s", kral::LibraryVersion().c_str());
+  return true;
+}
+
+bool AddMessage(Diag_FTM& phone, uint32_t flag, const char* text, bool echo) {
+  if (echo) {
+    std::fputs(text, stdout);
+    std::fflush(stdout);
+  }
+  phone.log().WriteLine(flag, "%s", text);
+  return true;
+}
+
+// What the first byte of an asynchronous packet says it is.
+const char* AsynchronousKind(uint8_t code) {
+  switch (code) {
+    case 16:
+      return "log packet";
+    case 31:
+      return "message";
+    case 96:
+      return "event report";
+    case 121:
+      return "extended message";
+    default:
+      return "asynchronous packet";
+  }
+}
+
+bool AddAsynchronous(Diag_FTM& phone, uint32_t flag, std::span<const uint8_t> message, bool with_code,
+                     bool with_bytes) {
+  if (message.empty()) return false;
+  if (!phone.log().Wants(flag)) return true;
+  std::string text = AsynchronousKind(message[0]);
+  if (with_code) text += " " + std::to_string(message[0]);
+  text += " (" + std::to_string(message.size()) + " bytes)";
+  if (with_bytes) text += ": " + kral::HexDump(message);
+  phone.log().WriteLine(flag, "%s", text.c_str());
+  return true;
+}
+
+}  // namespace
+
+extern "C" {
+
+uint8_t KRAL_CALL KRAL_StartLogging(KRAL_HANDLE handle, const char* file_name) {
+  LogName(handle, "KRAL_StartLogging");
+  return file_name == nullptr ? 0 : OnPhoneAtOnce(handle, StartLog, file_name);
+}
+
+uint8_t KRAL_CALL KRAL_StopLogging(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_StopLogging");
+  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) {
+    phone.log().Stop();
+    return true;
+  });
+}
+
+uint8_t KRAL_CALL KRAL_IsLoggingStarted(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_IsLoggingStarted");
+  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return phone.log().started_result(); });
+}
+
+uint8_t KRAL_CALL KRAL_SetLogFlags(KRAL_HANDLE handle, uint32_t mask) {
+  LogFormatted(handle, "KRAL_SetLogFlags( uiLogFlags = 0x%X )", mask);
+  return OnPhoneAtOnce(handle, [mask](Diag_FTM& phone) {
+    phone.log().SetFlags(mask);
+    return true;
+  });
+}
+
+uint8_t KRAL_CALL KRAL_AddUserMessageToTextLog(KRAL_HANDLE handle, uint32_t flag, const char* text, uint8_t echo) {
+  return text == nullptr ? 0 : OnPhoneAtOnce(handle, AddMessage, flag, text, echo == 1);
+}
+
+uint8_t KRAL_CALL KRAL_AddUserAsyncLogMessageToTextLog(KRAL_HANDLE handle, uint32_t flag, const uint8_t* message,
+                                                       uint16_t size, uint8_t with_code, uint8_t with_bytes) {
+  const size_t length = message == nullptr ? 0 : size;
+  return OnPhoneAtOnce(handle, AddAsynchronous, flag, std::span(message, length), with_code == 1, with_bytes == 1);
+}
+
+void KRAL_CALL KRAL_ConfigureLibraryTextLogCallBack(KRAL_HANDLE handle, KRAL_TEXT_LOG_CALLBACK callback) {
+  LogName(handle, "KRAL_ConfigureLibraryTextLogCallBack");
+  OnPhoneAtOnce(handle, [=](Diag_FTM& phone) {
+    phone.log().SetCallback(callback, handle);
+    return true;
+  });
+}
+
+}  // extern "C"

@@ -1,0 +1,262 @@
+/**
+ * @file connection.h
+ * Library settings, port lists, connecting to a handset and letting go of it, liveness, time-outs.
+ *
+ * Beside the rules of kral.h:
+ *
+ * - A connect takes one of 50 contexts, one per port. A second connect to the same port gives the same handle and
+ *   counts: the context and its connection live until every connect has been released.
+ * - Connect, disconnect and enumeration are made from one thread. A disconnect waits until a request that another
+ *   thread is running on the handset has ended.
+ * - Release every handle before the library is unloaded.
+ */
+#ifndef KRAL_CONNECTION_H
+#define KRAL_CONNECTION_H
+
+#include "kral/types.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** A connect to this port picks the first port on which a handset answers, and closes every open connection first. */
+#define KRAL_PORT_ANY 65535u
+/** A connect to this port moves no bytes: it always counts as connected, and every request fails. */
+#define KRAL_PORT_NULL 65534u
+
+/* --- Library-wide settings ---------------------------------------------------------------------------------------- */
+
+/**
+ * Chooses how handsets are reached by the connections made afterwards.
+ *
+ * @param mode  1: through the phone server; any other value: directly, the library drives the port (the default)
+ */
+KRAL_API void KRAL_CALL KRAL_SetLibraryMode(uint8_t mode);
+
+/**
+ * Chooses where the diagnostic service runs on the handsets connected afterwards.
+ *
+ * @param type  0: on the modem chip (the default); 1: on an application processor; other values are ignored
+ */
+KRAL_API void KRAL_CALL KRAL_SetTargetType(uint8_t type);
+
+/**
+ * Gives the version, such as "KRAL V6.0.29,VENTRIMS" (direct mode) or "KRAL V6.0.29,ORBT" (server mode).
+ *
+ * @param[out] text  terminated; the buffer must hold it (32 bytes do), nothing is tested
+ */
+KRAL_API void KRAL_CALL KRAL_GetLibraryVersion(char* text);
+
+/**
+ * Chooses how the receive threads of the connections made afterwards wait for bytes.
+ * An addition to the given interface.
+ *
+ * @param mode  as for KRAL_SetReceiveMode; other values are refused
+ * @return 1, or 0 for an unknown mode
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetDefaultReceiveMode(uint8_t mode);
+
+/* --- Ports -------------------------------------------------------------------------------------------------------- */
+
+/**
+ * Lists the serial ports of the machine without opening any; in server mode, those that the phone server knows.
+ *
+ * @param[in,out] count  in: entries of `ports`; out: entries written, also on failure
+ * @param[out]    ports  COM numbers, in the system's order
+ * @return 1 on success; 0 when the ports cannot be listed, and in server mode also when there are none
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetAllPortList(uint16_t* count, uint16_t* ports);
+
+/**
+ * Lists the ports on which a handset answers.
+ *
+ * In direct mode every open connection of the process is closed first and all handles become invalid, because each
+ * port is opened exclusively and asked. In server mode the server's list is given as it is.
+ *
+ * @param[in,out] count         in: entries of `ports`; out: entries written
+ * @param[out]    ports         COM numbers, in the system's order
+ * @param         ignore_count  entries of `ignore_list`
+ * @param         ignore_list   ports that are not to be touched; not consulted in server mode
+ * @return 1 when the ports could be listed, even if no handset answered; in server mode 0 when there are none
+ *
+ * Wait: twice time-out 1 (80 ms) for each port that opens.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetAvailablePhonesPortList(uint16_t* count, uint16_t* ports, uint16_t ignore_count,
+                                                           const uint16_t* ignore_list);
+
+/**
+ * Lets KRAL_ConnectServer_LogicalPort find `physical` under the number `logical`. Of several entries for one logical
+ * port the oldest counts.
+ *
+ * @return always 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_AddPortAliasEntry(uint16_t logical, uint16_t physical);
+
+/**
+ * Forgets all port aliases.
+ *
+ * @return always 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ClearPortAliasList(void);
+
+/**
+ * Gives the port of a handle.
+ *
+ * @param      handle  from a connect function
+ * @param[out] port    the COM number
+ * @return 1, or 0 for an unknown handle
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetComPortNumber(KRAL_HANDLE handle, uint16_t* port);
+
+/* --- Connecting --------------------------------------------------------------------------------------------------- */
+
+/**
+ * Connects to the handset on a port.
+ *
+ * The handle is returned whether or not the port could be opened: ask KRAL_IsPhoneConnected.
+ *
+ * @param port  COM number (the low 16 bits count), KRAL_PORT_ANY or KRAL_PORT_NULL
+ * @return the handle; 0 when all 50 contexts are taken, or when KRAL_PORT_ANY finds no handset
+ */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer(uint32_t port);
+
+/** As KRAL_ConnectServer, and writes a loopback frame twice when the port has been opened. */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithHandShake(uint32_t port);
+
+/**
+ * As KRAL_ConnectServer, but gives 0 when the port cannot be opened. The context then stays taken (its handle is
+ * found with another connect to the port) until KRAL_DisconnectAllServers.
+ */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithVerify(uint32_t port);
+
+/**
+ * As KRAL_ConnectServer, on the physical port that KRAL_AddPortAliasEntry has entered.
+ *
+ * @param logical_port  the low 16 bits count
+ * @return the handle; 0 also when there is no alias of that number
+ */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_LogicalPort(uint32_t logical_port);
+
+/**
+ * Connects again and again until the handset answers. Each attempt counts as a connect of its own, and a failure
+ * releases one of them.
+ *
+ * @param port     as for KRAL_ConnectServer
+ * @param wait_ms  no further attempt begins after this time; 0: exactly one attempt
+ * @return the handle; 0 when no handset answered in time
+ */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_t wait_ms);
+
+/**
+ * Functions of a caller-supplied transport. Each is given the caller's two values first and returns 0 for success.
+ * The send function runs on the thread that makes a request, the receive function on the receive thread of the
+ * connection; both may run at the same time.
+ */
+/** Writes `count` bytes; `*written` is preset to `count`. */
+typedef uint32_t(KRAL_CALL* KRAL_SEND_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t count,
+                                                const uint8_t* data, uint32_t* written);
+/** Reads what is there, at most `*count` bytes, and says how many; does not wait. */
+typedef uint32_t(KRAL_CALL* KRAL_RECEIVE_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t* count,
+                                                   uint8_t* buffer);
+/** Forgets what has been received; its result is ignored. */
+typedef uint32_t(KRAL_CALL* KRAL_FLUSH_FUNCTION)(uintptr_t context, uintptr_t transport);
+
+/**
+ * Connects to a handset through three functions of the caller instead of a COM port. Sets direct mode, as
+ * KRAL_SetLibraryMode(0) does. The functions must stay callable until the handle is released.
+ *
+ * @param port       number of the context; KRAL_PORT_NULL is the null port even here
+ * @param transport  the caller's handle of the transport, handed to each function
+ * @param context    another value of the caller, handed to each function in front
+ * @param send, receive, flush  all three are needed for the connection to open
+ * @return the handle; 0 when all 50 contexts are taken
+ */
+KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_UserDefinedTransport(uint32_t port, uintptr_t transport,
+                                                                       uintptr_t context, KRAL_SEND_FUNCTION send,
+                                                                       KRAL_RECEIVE_FUNCTION receive,
+                                                                       KRAL_FLUSH_FUNCTION flush);
+
+/**
+ * Closes the port and the text log, and releases one connect. While other connects of the port remain, the handle
+ * stays valid and the next request opens the port again.
+ */
+KRAL_API void KRAL_CALL KRAL_DisconnectServer(KRAL_HANDLE handle);
+
+/** Releases every handle of the process, however often it was connected. */
+KRAL_API void KRAL_CALL KRAL_DisconnectAllServers(void);
+
+/** Ends the process of the phone server, if it runs on this machine. */
+KRAL_API void KRAL_CALL KRAL_TerminateORBTServer(void);
+
+/**
+ * Asks whether the handset answers: opens a closed port, sends a loopback and a version request (target type 1: asks
+ * for the diagnostic service). Always 1 on the null port.
+ *
+ * Wait: twice time-out 1 (80 ms).
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
+
+/* --- Settings of a handset ---------------------------------------------------------------------------------------- */
+
+/**
+ * Sets a time-out. Never waits for a running request.
+ *
+ * | id | default | used for                                             |
+ * |----|---------|------------------------------------------------------|
+ * |  0 |    4000 | answers to commands                                  |
+ * |  1 |      80 | answers to the requests of KRAL_IsPhoneConnected     |
+ * |  2 |     200 | server mode: the server connects the port            |
+ * |  7 |     900 | direct mode: writing to the port                     |
+ * |  8 |     900 | direct mode: reads of the receive thread             |
+ * | 11 |     150 | delay after a switch to FTM mode                     |
+ * | 12 |     140 | delay after a switch to online mode                  |
+ * | 13 |    3000 | delay after a switch to an offline mode              |
+ * | 18 |     500 | reading the mode back                                |
+ * | 20 |         | server mode: software download                       |
+ *
+ * The others up to 19 belong to the families that read them: 3: 3000; 4: 6000; 5, 6, 10, 19: 10000; 9: 3000;
+ * 14, 15: 100; 16: 5000; 17: 2000. The word ConnectDelay and a number on a line of the file WLANEVKConfig.txt in the
+ * current directory set 1 and 2 for every handset connected afterwards.
+ *
+ * @param handle        from a connect function
+ * @param id            0 to 20
+ * @param milliseconds  the new value
+ * @return 1 on success; 0 for another id, for 20 in direct mode, and for 7 and 8 in server mode (which store the
+ *         value all the same)
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ConfigureTimeOut(KRAL_HANDLE handle, uint32_t id, int32_t milliseconds);
+
+/**
+ * Gives a time-out in milliseconds. Never waits for a running request.
+ *
+ * @return the value; 0 for an unknown handle or id
+ */
+KRAL_API int32_t KRAL_CALL KRAL_GetTimeOut(KRAL_HANDLE handle, uint32_t id);
+
+/**
+ * Chooses how the receive thread waits for bytes. Takes effect at once; never waits for a running request.
+ * An addition to the given interface.
+ *
+ * @param handle  from a connect function
+ * @param mode    0: sleeps 1 ms between reads, which costs each request about that much (the default);
+ *                1: waits in the port and wakes with the first byte (with a caller's transport: sleeps 1 ms only when
+ *                nothing came)
+ * @return 1 on success; 0 for another mode and in server mode
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetReceiveMode(KRAL_HANDLE handle, uint8_t mode);
+
+/**
+ * Keeps whether a modem port may be searched for the switch from AT commands to diagnostic mode. Turned off by a
+ * connect through functions of the caller.
+ *
+ * @param handle  from a connect function
+ * @param search  1: on (the default); other values: off
+ * @return 1, or 0 for an unknown handle
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetData2DiagSearch(KRAL_HANDLE handle, uint8_t search);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif
