@@ -50,11 +50,10 @@ bool AddAsynchronous(Diag_FTM& phone, uint32_t flag, std::span<const uint8_t> me
                      bool with_bytes) {
   if (message.empty()) return false;
   if (!phone.log().Wants(flag)) return true;
-  std::string text = AsynchronousKind(message[0]);
-  if (with_code) text += " " + std::to_string(message[0]);
-  text += " (" + std::to_string(message.size()) + " bytes)";
-  if (with_bytes) text += ": " + kral::HexDump(message);
-  phone.log().WriteLine(flag, "%s", text.c_str());
+  const std::string code = with_code ? std::to_string(message[0]).insert(0, 1, ' ') : "";
+  const std::string bytes = with_bytes ? kral::HexDump(message).insert(0, ": ") : "";
+  phone.log().WriteLine(flag, "%s%s (%d bytes)%s", AsynchronousKind(message[0]), code.c_str(),
+                        static_cast<int>(message.size()), bytes.c_str());
   return true;
 }
 
