@@ -32,6 +32,14 @@ need_packages() {
   rm -f "$log"
 }
 
+# machine_sources SUITE TYPE: the machine's own mirrors of a Debian suite, as sources.list lines. Updates and security
+# fixes are left out: the fewer indexes, the fewer mirrors that can be out of step.
+machine_sources() {
+  apt-get indextargets --format '$(CREATED_BY) $(REPO_URI) $(RELEASE) $(COMPONENT)' |
+    awk -v suite="$1" -v type="$2" '$1 == "Packages" && $4 == "main" && $3 == suite && !seen[$2]++ {
+      print type, $2, $3, $4 }'
+}
+
 # What every build needs, and what the 32-bit Windows home needs beside it.
 build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libgsf-1-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
