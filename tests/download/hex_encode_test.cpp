@@ -1,0 +1,131 @@
+// An image out as Intel HEX: the exact text, with the limits and shortcuts of the writer.
+#include <gtest/gtest.h>
+
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "download/hex_phone_image_decoder.h"
+#include "download/phone_image_binary.h"
+#include "download/phone_image_dpaged.h"
+#include "download/phone_image_raw.h"
+#include "tests/support/temp_folder.h"
+
+namespace kral {
+namespace {
+
+struct Flags {
+  bool start;
+  bool linear_start;
+  bool linear;
+};
+
+constexpr Flags kSegments{false, false, false};
+constexpr Flags kLinear{false, false, true};
+
+std::string Encode(PhoneImage& image, Flags flags) {
+  HexPhoneImageDecoder encoder(flags.start, flags.linear_start, flags.linear);
+  TextMemory file;
+  EXPECT_TRUE(encoder.Encode(image, file));
+  return file.text();
+}
+
+// An image of the given size whose bytes are all `fill`.
+void Fill(PhoneImage& image, uint32_t base, uint32_t size, char fill, uint32_t region = 0) {
+  image.SetBaseAddress(base, region);
+  const std::string bytes(size, fill);
+  image.Write(base, bytes.data(), size, region);
+}
+
+const std::string kEnd = ":00000001FF\n";
+
+TEST(HexEncoder, WritesTheExactText) {
+  PhoneImageDPaged image(64, nullptr);
+  image.SetBaseAddress(0x12340, 0);
+  image.Write(0x12340, "0123456789abcdefXYZ", 19, 0);
+  const std::string data = ":10000000303132333435363738396162636465668E\n:0300100058595AE2\n";
+  EXPECT_EQ(Encode(image, kSegments), ":020000021234B6\n" + data + kEnd);
+  // The linear record holds the upper half of the base only, and the offsets do not make up for it: required.
+  EXPECT_EQ(Encode(image, kLinear), ":020000040001F9\n" + data + kEnd);
+}
+
+TEST(HexEncoder, EmptyAndErasedImages) {
+  PhoneImageDPaged image(64, nullptr);
+  EXPECT_EQ(Encode(image, kSegments), ":020000020000FC\n" + kEnd);
+  // Erased chunks are left out but for the last, and the gap before it asks for a new extended record.
+  Fill(image, 0x1000, 0x28, '\xFF');
+  EXPECT_EQ(Encode(image, kSegments), ":020000020100FB\n:020000020102F9\n:08000000FFFFFFFFFFFFFFFF00\n" + kEnd);
+}
+
+TEST(HexEncoder, AGapStartsANewExtendedRecord) {
+  PhoneImageDPaged image(64, nullptr);
+  Fill(image, 0x20000, 0x30, '\xFF');
+  image.Write(0x20000, "\x01", 1, 0);
+  image.Write(0x20020, "\x02", 1, 0);
+  const std::string erased(30, 'F');
+  EXPECT_EQ(Encode(image, kSegments),
+            ":020000022000DC\n:1000000001" + erased + "FE\n:020000022002DA\n:1000000002" + erased + "FD\n" + kEnd);
+  EXPECT_EQ(Encode(image, kLinear),
+            ":020000040002F8\n:1000000001" + erased + "FE\n:020000040002F8\n:1000200002" + erased + "DD\n" + kEnd);
+}
+
+TEST(HexEncoder, ReachesAsFarAsTheModeAllows) {
+  const std::string zeros(32, '0');
+  PhoneImageDPaged image(256, nullptr);
+  Fill(image, 0, 0x10020, '\0');
+  const std::string segments = Encode(image, kSegments);
+  EXPECT_NE(segments.find(":10080000" + zeros +
+                          "E8\n:020000020081"
+                          "7B\n:10000000" +
+                          zeros + "F0\n"),
+            std::string::npos);
+  const std::string linear = Encode(image, kLinear);
+  EXPECT_NE(linear.find(":10FFF000" + zeros + "01\n:020000040001F9\n:10000000" + zeros + "F0\n"), std::string::npos);
+  EXPECT_EQ(linear.find(":02000004"), linear.rfind(":020000040000FA"));
+}
+
+TEST(HexEncoder, WritesBothRegions) {
+  PhoneImageDPaged image(64, nullptr);
+  Fill(image, 0x10000, 1, 'A');
+  Fill(image, 0x08000000, 2, 'B', 1);
+  EXPECT_EQ(Encode(image, kLinear), ":020000040001F9\n:0100000041BE\n:020000040800F2\n:0200000042427A\n" + kEnd);
+}
+
+TEST(HexEncoder, StartRecordsFollowTheFlags) {
+  PhoneImageDPaged image(64, nullptr);
+  image.SetStartAddress(0x12345678);
+  const std::string segment = ":0400000312345678E5\n" + kEnd;
+  const std::string linear = ":0400000512345678E3\n" + kEnd;
+  const std::pair<Flags, std::string> kCases[] = {
+      {{true, true, true}, ":020000040000FA\n" + linear},
+      {{true, false, true}, ":020000040000FA\n" + segment},
+      {{true, true, false}, ":020000020000FC\n" + segment},
+      {{false, true, true}, ":020000040000FA\n" + kEnd},
+  };
+  for (const auto& [flags, text] : kCases) EXPECT_EQ(Encode(image, flags), text);
+}
+
+TEST(HexEncoder, TakesImagesWithOneRegion) {
+  const tests::TempFolder folder;
+  PhoneImageBinary image;
+  ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789abcdefX")));
+  EXPECT_EQ(Encode(image, kLinear),
+            ":020000040000FA\n:10000000303132333435363738396162636465668E\n:0100100058"
+            "97\n" +
+                kEnd);
+}
+
+TEST(HexEncoder, ImageAndFileFailuresGiveFalse) {
+  HexPhoneImageDecoder encoder;
+  PhoneImageDPaged too_large(1, nullptr);
+  too_large.SetSize(2048, 0);
+  TextMemory memory;
+  EXPECT_FALSE(encoder.Encode(too_large, memory));
+
+  PhoneImageDPaged image(1, nullptr);
+  TextFile closed;
+  EXPECT_FALSE(encoder.Encode(image, closed));
+}
+
+}  // namespace
+}  // namespace kral
