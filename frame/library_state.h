@@ -14,6 +14,7 @@
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
 #include "platform/named_mutex.h"
+#include "platform/port_list.h"
 
 namespace kral {
 
@@ -47,7 +48,8 @@ struct LibraryState {
   std::shared_ptr<OrbtServer> port_info;
   std::vector<std::pair<uint16_t, uint16_t>> aliases;  // logical, physical
   DeviceOpener device_opener = OpenComPort;
-  Kral_ResourceManager::PortLister port_lister;
+  Kral_ResourceManager::PortLister port_lister = ListComPorts;
+  Kral_ResourceManager::MutexMaker mutex_maker = CreateNamedMutex;
   ServerFactory server_factory;
 
   // Held while a phone object or a server proxy is built, so that two threads do not build it twice. Taken before

@@ -2,13 +2,12 @@
 // aliases.
 #include <algorithm>
 #include <cstdlib>
-#include <utility>
+#include <string>
 
 #include "frame/diag_ftm.h"
 #include "frame/library_state.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
-#include "platform/port_list.h"
 
 namespace kral {
 namespace {
@@ -26,7 +25,7 @@ bool ListMachinePorts(std::vector<uint16_t>& ports) {
     const std::lock_guard lock(Library().mutex);
     lister = Library().port_lister;
   }
-  return lister ? lister(ports) : ListComPorts(ports);
+  return lister(ports);
 }
 
 // The proxy that answers for ports rather than for a handset; made on first use, kept until all is disconnected.
@@ -125,12 +124,6 @@ bool ResolvePortAlias(uint16_t logical, uint16_t& physical) {
   if (found == library.aliases.end()) return false;
   physical = found->second;
   return true;
-}
-
-void SetPortLister(PortLister lister) {
-  auto& library = Library();
-  const std::lock_guard lock(library.mutex);
-  library.port_lister = std::move(lister);
 }
 
 }  // namespace Kral_ResourceManager

@@ -66,7 +66,7 @@ KRAL_HANDLE CreateContext(uint16_t port) {
   if (free == rows.end()) return 0;
   const std::string name =
       "Kral_ResourceManager::CreateContext() - #" + std::to_string(static_cast<int32_t>(library.context_counter++));
-  auto mutex = CreateNamedMutex(name);
+  auto mutex = library.mutex_maker(name);
   if (!mutex) return 0;
   free->in_use = true;
   free->handle = mutex->value();
@@ -142,6 +142,18 @@ void SetDeviceOpener(DeviceOpener opener) {
   auto& library = Library();
   const std::lock_guard lock(library.mutex);
   library.device_opener = opener ? std::move(opener) : DeviceOpener(OpenComPort);
+}
+
+void SetPortLister(PortLister lister) {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  library.port_lister = lister ? std::move(lister) : PortLister(ListComPorts);
+}
+
+void SetMutexMaker(MutexMaker maker) {
+  auto& library = Library();
+  const std::lock_guard lock(library.mutex);
+  library.mutex_maker = maker ? std::move(maker) : MutexMaker(CreateNamedMutex);
 }
 
 }  // namespace Kral_ResourceManager

@@ -7,9 +7,11 @@
 #include <functional>
 #include <memory>
 #include <span>
+#include <string>
 #include <vector>
 
 #include "kral/types.h"
+#include "platform/named_mutex.h"
 #include "transport/kral_thread_interface.h"
 
 namespace kral {
@@ -48,6 +50,7 @@ namespace Kral_ResourceManager {
 
 // Appends the machine's COM ports; false when they cannot be listed.
 using PortLister = std::function<bool(std::vector<uint16_t>& ports)>;
+using MutexMaker = std::function<std::unique_ptr<NamedMutex>(const std::string& name)>;
 
 inline constexpr uint16_t kAnyPort = 65535;
 inline constexpr size_t kContextCount = 50;
@@ -88,10 +91,11 @@ bool ResolvePortAlias(uint16_t logical, uint16_t& physical);  // the first match
 bool AllPorts(std::span<uint16_t> ports, uint16_t& count);
 bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<const uint16_t> ignored);
 
-// How phone objects open devices and how the machine's ports are listed; tests install fakes, an empty function puts
-// the real one back.
+// How phone objects open devices, how the machine's ports are listed and how rows get their mutex; tests install
+// fakes, an empty function puts the real one back.
 void SetDeviceOpener(DeviceOpener opener);
 void SetPortLister(PortLister lister);
+void SetMutexMaker(MutexMaker maker);
 
 }  // namespace Kral_ResourceManager
 }  // namespace kral
