@@ -2,6 +2,7 @@
 #ifndef KRAL_COMMANDS_NV_ITEM_H
 #define KRAL_COMMANDS_NV_ITEM_H
 
+#include <cstddef>
 #include <cstdint>
 #include <span>
 
@@ -13,10 +14,14 @@ namespace nv {
 
 inline constexpr uint16_t kDone = 0;  // NV status: success
 inline constexpr uint16_t kEsnItem = 0;
+inline constexpr size_t kDataSize = 128;
 
 // Reads one item into `data`, whose present bytes, and the status, go out with the request. False when no reply
 // came or one shorter than the request. True with a non-zero status leaves the data untouched.
 bool Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status);
+
+// Writes one item: always 128 data bytes, the given ones zero-filled or cut. True whenever a reply with a status came.
+bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status);
 
 }  // namespace nv
 }  // namespace kral

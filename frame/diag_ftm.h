@@ -98,6 +98,7 @@ class Diag_FTM {
   void SetFramed(bool framed) { framed_ = framed; }
 
   FtmSettings& ftm() { return ftm_; }
+  const FtmSettings& ftm() const { return ftm_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
