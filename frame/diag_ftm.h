@@ -45,6 +45,8 @@ class Diag_FTM {
   bool OpenPort(const OpenArguments& arguments);
   bool ClosePort();
   bool IsPhoneConnected();
+  // Asks the diagnostic service of an application processor for a sign of life, with time-out 1.
+  bool IsDiagServiceAlive();
   // Direct mode: reopens a closed port.
   bool IsPortOpen();
   // Closes the port for good, once a running request has ended: its context is being released, and a request of
@@ -111,7 +113,6 @@ class Diag_FTM {
   void OpenThroughServer();
   void OpenDirect(const OpenArguments& arguments);
   void UnregisterFromServer();
-  bool IsDiagServiceAlive();
   bool IsLoopbackAnswered();
   bool IsVersionAnswered();
   bool SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> response, uint16_t& response_size,

@@ -30,9 +30,13 @@ enum Command : uint16_t {
 };
 
 // How much louder the front end is at a channel than at the lowest one: a tenth of a dB every 64 channels.
-int ChannelSlope(uint16_t channel) { return channel % 4096 / 64 * 10; }
+int ChannelSlope(uint16_t channel) {
+  return channel % 4096 / 64 * 10;
+}
 
-int16_t Signed(ByteView payload) { return static_cast<int16_t>(GetU16(payload, 0)); }
+int16_t Signed(ByteView payload) {
+  return static_cast<int16_t>(GetU16(payload, 0));
+}
 
 }  // namespace
 
@@ -41,7 +45,9 @@ int16_t Radio::AgcWord() const {
   return static_cast<int16_t>(-level / 10);
 }
 
-int8_t Radio::Rssi() const { return static_cast<int8_t>(std::clamp<int>(input_level, kNoiseFloor, 0) / 100); }
+int8_t Radio::Rssi() const {
+  return static_cast<int8_t>(std::clamp<int>(input_level, kNoiseFloor, 0) / 100);
+}
 
 uint16_t Radio::DetectorWord() const {
   if (!transmitting) return 12;
@@ -82,14 +88,14 @@ std::vector<FtmCommand> FtmService::commands() const {
 }
 
 void FtmService::OnRequest(ByteView request, Wire& wire) {
-  if (!in_ftm_()) return Refuse(Refusal::kBadMode, request, wire);
+  if (!InFtm()) return Refuse(Refusal::kBadMode, request, wire);
   const Bytes result = Carry(GetU16(request, 2), GetU16(request, 4), request.subspan(kHeaderSize));
   wire.Send(ByteWriter().Raw(request.first(kHeaderSize)).Raw(result).Take());
 }
 
 void FtmService::OnLegacyRequest(ByteView request, Wire& wire) {
   if (GetU16(request, 1) != kLegacySelector) return Refuse(Refusal::kBadParameter, request, wire);
-  if (!in_ftm_()) return Refuse(Refusal::kBadMode, request, wire);
+  if (!InFtm()) return Refuse(Refusal::kBadMode, request, wire);
   const Bytes result = Carry(0, GetU16(request, 5), request.subspan(kLegacyHeaderSize));
   wire.Send(ByteWriter().Raw(request.first(kLegacyHeaderSize)).Raw(result).Take());
 }

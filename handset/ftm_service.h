@@ -12,12 +12,12 @@
 #ifndef KRAL_HANDSET_FTM_SERVICE_H
 #define KRAL_HANDSET_FTM_SERVICE_H
 
-#include <functional>
 #include <map>
 #include <mutex>
 #include <vector>
 
 #include "handset/bytes.h"
+#include "handset/operating_mode.h"
 #include "handset/request_table.h"
 
 namespace kral::handset {
@@ -30,7 +30,7 @@ struct Radio {
   int16_t tx_power = -5000;     // what was asked for, hundredths of a dBm
   int16_t input_level = -9000;  // what the antenna port sees, hundredths of a dBm
 
-  int16_t AgcWord() const;      // falls as the input rises, with a slope over the channels
+  int16_t AgcWord() const;  // falls as the input rises, with a slope over the channels
   int8_t Rssi() const;
   uint16_t DetectorWord() const;  // rises with the power sent; noise while the transmitter is off
 };
@@ -41,9 +41,10 @@ struct FtmCommand {
   Bytes payload;
 };
 
-class FtmService : public Service {
+class FtmService final : public Service {
  public:
-  explicit FtmService(std::function<bool()> in_ftm) : in_ftm_(std::move(in_ftm)) {}
+  // Serves while the handset is in factory test mode.
+  explicit FtmService(const OperatingMode& mode) : mode_(mode) {}
 
   void Register(RequestTable& table) override;
   void OnReset() override;
@@ -58,7 +59,9 @@ class FtmService : public Service {
   // What stands in the reply behind the command id.
   Bytes Carry(uint16_t mode_id, uint16_t command, ByteView payload);
 
-  std::function<bool()> in_ftm_;
+  bool InFtm() const { return mode_.state() == ModeState::kFactoryTest; }
+
+  const OperatingMode& mode_;
   mutable std::mutex mutex_;
   std::map<uint16_t, Radio> radios_;
   std::vector<FtmCommand> commands_;

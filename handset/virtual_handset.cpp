@@ -31,11 +31,12 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       wire_(std::make_unique<HandsetWire>(*this)),
       nv_(std::make_shared<NvStore>(identity.serial_number)),
       mode_service_(std::make_shared<OperatingMode>(*nv_, clock)),
+      ftm_(std::make_shared<FtmService>(*mode_service_)),
       memory_(std::make_shared<Memory>()),
       maintenance_(std::make_shared<Maintenance>(identity.service_code)) {
   identity_ = std::make_shared<IdentityService>(std::move(identity));
   for (const std::shared_ptr<Service>& service :
-       std::initializer_list<std::shared_ptr<Service>>{identity_, nv_, mode_service_, memory_, maintenance_}) {
+       std::initializer_list<std::shared_ptr<Service>>{identity_, nv_, mode_service_, ftm_, memory_, maintenance_}) {
     AddServiceLocked(service);
   }
 }

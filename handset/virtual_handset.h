@@ -21,6 +21,7 @@
 #include "handset/bytes.h"
 #include "handset/faults.h"
 #include "handset/frame_codec.h"
+#include "handset/ftm_service.h"
 #include "handset/identity.h"
 #include "handset/maintenance.h"
 #include "handset/memory.h"
@@ -74,6 +75,7 @@ class VirtualHandset {
   // --- The model --------------------------------------------------------------------------------------------------
   IdentityService& identity() { return *identity_; }
   OperatingMode& mode() { return *mode_service_; }
+  FtmService& ftm() { return *ftm_; }
   Memory& memory() { return *memory_; }
   Maintenance& maintenance() { return *maintenance_; }
   NvStore& nv() { return *nv_; }
@@ -121,6 +123,7 @@ class VirtualHandset {
   std::shared_ptr<IdentityService> identity_;
   std::shared_ptr<NvStore> nv_;
   std::shared_ptr<OperatingMode> mode_service_;
+  std::shared_ptr<FtmService> ftm_;
   std::shared_ptr<Memory> memory_;
   std::shared_ptr<Maintenance> maintenance_;
 };
