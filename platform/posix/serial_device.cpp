@@ -117,7 +117,7 @@ bool Tty::WaitQueueBelow(size_t level, steady_clock::time_point deadline) const 
 size_t Tty::Write(std::span<const uint8_t> bytes) {
   const auto deadline = steady_clock::now() + milliseconds(bytes.size()) + kWriteConstant;
   size_t done = 0;
-  while (done < bytes.size()) {
+  while (done < bytes.size() && !gone_) {
     const ssize_t written = ::write(fd_.get(), bytes.data() + done, bytes.size() - done);
     if (written > 0) {
       done += static_cast<size_t>(written);
@@ -125,7 +125,7 @@ size_t Tty::Write(std::span<const uint8_t> bytes) {
     }
     if (written < 0 && errno == EINTR) continue;
     if (written < 0 && errno != EAGAIN) {
-      if (IsVanished(errno)) gone_ = true;
+      gone_ = gone_ || IsVanished(errno);
       break;
     }
     const auto left = std::chrono::ceil<milliseconds>(deadline - steady_clock::now()).count();

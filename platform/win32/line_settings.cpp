@@ -4,6 +4,8 @@
 namespace kral {
 namespace {
 
+constexpr DWORD kLongestRead = 3'600'000;
+
 // ERROR_GEN_FAILURE stands for a driver that refuses without a reason: a refusal must never read as success.
 DWORD Refusal() {
   const DWORD code = ::GetLastError();
@@ -18,6 +20,17 @@ DWORD ReadBlock(HANDLE port, DCB& block) {
 
 DWORD Apply(HANDLE port, DCB& block) {
   return ::SetCommState(port, &block) ? ERROR_SUCCESS : Refusal();
+}
+
+DWORD ApplyReadTimeOuts(HANDLE port, DWORD multiplier, DWORD constant) {
+  COMMTIMEOUTS time_outs{};
+  ::GetCommTimeouts(port, &time_outs);
+  time_outs.ReadIntervalTimeout = MAXDWORD;
+  time_outs.ReadTotalTimeoutMultiplier = multiplier;
+  time_outs.ReadTotalTimeoutConstant = constant;
+  time_outs.WriteTotalTimeoutMultiplier = 1;
+  time_outs.WriteTotalTimeoutConstant = 50;
+  return ::SetCommTimeouts(port, &time_outs) ? ERROR_SUCCESS : Refusal();
 }
 
 }  // namespace
@@ -55,14 +68,12 @@ DWORD ChangeBaudRate(HANDLE port, uint32_t baud_rate) {
 }
 
 DWORD ApplyTimeOuts(HANDLE port) {
-  COMMTIMEOUTS time_outs{};
-  ::GetCommTimeouts(port, &time_outs);
-  time_outs.ReadIntervalTimeout = MAXDWORD;
-  time_outs.ReadTotalTimeoutMultiplier = 0;
-  time_outs.ReadTotalTimeoutConstant = 0;
-  time_outs.WriteTotalTimeoutMultiplier = 1;
-  time_outs.WriteTotalTimeoutConstant = 50;
-  return ::SetCommTimeouts(port, &time_outs) ? ERROR_SUCCESS : Refusal();
+  return ApplyReadTimeOuts(port, 0, 0);
+}
+
+// The system knows this combination as "wait for the first byte", up to the constant, which then ends a read empty.
+DWORD ApplyWaitingTimeOuts(HANDLE port) {
+  return ApplyReadTimeOuts(port, MAXDWORD, kLongestRead);
 }
 
 }  // namespace kral

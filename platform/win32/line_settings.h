@@ -16,6 +16,9 @@ DWORD ChangeBaudRate(HANDLE port, uint32_t baud_rate);
 // Reads return at once with what the driver holds; writes end after 1 ms per byte and 50 ms.
 DWORD ApplyTimeOuts(HANDLE port);
 
+// A read returns at once when the driver holds bytes, and otherwise as soon as the first ones come.
+DWORD ApplyWaitingTimeOuts(HANDLE port);
+
 }  // namespace kral
 
 #endif

@@ -9,14 +9,16 @@
 #include <chrono>
 
 #include "platform/port_list.h"
-#include "platform/win32/comm_wait.h"
 #include "platform/win32/line_settings.h"
+#include "platform/win32/pending_read.h"
 #include "platform/win32/win_handle.h"
 
 namespace kral {
 namespace {
 
 constexpr DWORD kDriverBuffer = 4096;
+constexpr DWORD kLongestRead = 50;   // milliseconds
+constexpr DWORD kWriteGrace = 1050;  // milliseconds beyond 1 per byte
 constexpr uint32_t kFirstBaudRate = 115200;
 constexpr DWORD kPurgeInput = PURGE_RXCLEAR;
 constexpr DWORD kPurgeBoth = PURGE_TXABORT | PURGE_RXABORT | PURGE_TXCLEAR | PURGE_RXCLEAR;
@@ -77,11 +79,12 @@ bool IsVanished(DWORD code) {
 
 class ComPort final : public SerialDevice {
  public:
-  ComPort(WinHandle file, WinHandle read_event, WinHandle write_event)
+  ComPort(WinHandle file, WinHandle read_event, WinHandle write_event, WinHandle wake)
       : file_(std::move(file)),
         read_event_(std::move(read_event)),
         write_event_(std::move(write_event)),
-        wait_(file_.get()) {}
+        wake_(std::move(wake)),
+        pending_(file_.get()) {}
 
   size_t Write(std::span<const uint8_t> bytes) override;
   size_t OutputRoom() override;
@@ -89,60 +92,82 @@ class ComPort final : public SerialDevice {
   size_t InputWaiting() override;
   bool gone() const override { return gone_; }
   bool WaitReadable(uint32_t milliseconds) override;
-  void Wake() override { wait_.Wake(); }
+  void Wake() override { ::SetEvent(wake_.get()); }
   DeviceResult SetBaudRate(uint32_t rate) override;
   uint32_t BaudRate() const override { return baud_rate_; }
   DeviceResult SetDtr(bool high) override { return Escape(high ? SETDTR : CLRDTR); }
   DeviceResult SetRts(bool high) override { return Escape(high ? SETRTS : CLRRTS); }
-  void PurgeInput() override { ::PurgeComm(file_.get(), kPurgeInput); }
-  void PurgeBoth() override { ::PurgeComm(file_.get(), kPurgeBoth); }
+  void PurgeInput() override { Purge(kPurgeInput); }
+  void PurgeBoth() override { Purge(kPurgeBoth); }
 
  private:
-  size_t Finish(BOOL started, OVERLAPPED& overlapped);
+  size_t Finish(BOOL started, OVERLAPPED& overlapped, DWORD longest);
+  size_t ReadDriver(std::span<uint8_t> buffer);
+  size_t DriverWaiting();
   bool Queues(COMSTAT& queues);
+  void NoteFailure(DWORD code);
+  void Purge(DWORD what);
   DeviceResult Escape(DWORD function);
 
   WinHandle file_;
   WinHandle read_event_;
   WinHandle write_event_;
-  CommWait wait_;
+  WinHandle wake_;
+  PendingRead pending_;
   std::atomic<bool> gone_{false};
   uint32_t baud_rate_ = kFirstBaudRate;
 };
 
-// Waits for a started request; the port's time-outs bound it. The count transferred, 0 after a failure.
-size_t ComPort::Finish(BOOL started, OVERLAPPED& overlapped) {
-  DWORD transferred = 0;
-  if (started || ::GetLastError() == ERROR_IO_PENDING) {
-    if (::GetOverlappedResult(file_.get(), &overlapped, &transferred, TRUE)) return transferred;
-    const DWORD code = ::GetLastError();
-    ::CancelIoEx(file_.get(), &overlapped);
-    if (IsVanished(code)) gone_ = true;
-  } else if (IsVanished(::GetLastError())) {
-    gone_ = true;
+void ComPort::NoteFailure(DWORD code) {
+  if (IsVanished(code)) gone_ = true;
+}
+
+// Waits for a request just made. The count transferred, 0 after a failure. The port's time-outs end every request; a
+// driver that lost its device may forget to, so there is a longest wait.
+size_t ComPort::Finish(BOOL started, OVERLAPPED& overlapped, DWORD longest) {
+  if (!started && ::GetLastError() != ERROR_IO_PENDING) {
+    NoteFailure(::GetLastError());
+    return 0;
   }
+  if (::WaitForSingleObject(overlapped.hEvent, longest) != WAIT_OBJECT_0) ::CancelIoEx(file_.get(), &overlapped);
+  DWORD transferred = 0;
+  if (::GetOverlappedResult(file_.get(), &overlapped, &transferred, TRUE)) return transferred;
+  NoteFailure(::GetLastError());
   return 0;
 }
 
 size_t ComPort::Write(std::span<const uint8_t> bytes) {
+  if (gone_) return 0;
   OVERLAPPED overlapped{};
   overlapped.hEvent = write_event_.get();
-  const BOOL started = ::WriteFile(file_.get(), bytes.data(), static_cast<DWORD>(bytes.size()), nullptr, &overlapped);
-  return Finish(started, overlapped);
+  const auto count = static_cast<DWORD>(bytes.size());
+  const BOOL started = ::WriteFile(file_.get(), bytes.data(), count, nullptr, &overlapped);
+  return Finish(started, overlapped, count + kWriteGrace);
 }
 
 size_t ComPort::Read(std::span<uint8_t> buffer) {
+  const size_t count = pending_.Take(buffer);
+  // A read under way takes the next bytes; a second one beside it would take later ones, out of order.
+  if (count == buffer.size() || pending_.under_way()) return count;
+  return count + ReadDriver(buffer.subspan(count));
+}
+
+// Asks only for what is there: some drivers let an overlapped read of an empty queue wait in spite of the time-outs.
+// Should it be purged meanwhile, the read is cancelled.
+size_t ComPort::ReadDriver(std::span<uint8_t> buffer) {
+  const size_t count = std::min(DriverWaiting(), buffer.size());
+  if (count == 0) return 0;
   OVERLAPPED overlapped{};
   overlapped.hEvent = read_event_.get();
-  const BOOL started = ::ReadFile(file_.get(), buffer.data(), static_cast<DWORD>(buffer.size()), nullptr, &overlapped);
-  return Finish(started, overlapped);
+  const BOOL started = ::ReadFile(file_.get(), buffer.data(), static_cast<DWORD>(count), nullptr, &overlapped);
+  return Finish(started, overlapped, kLongestRead);
 }
 
 bool ComPort::Queues(COMSTAT& queues) {
   DWORD line_errors = 0;
   queues = {};
   if (::ClearCommError(file_.get(), &line_errors, &queues)) return true;
-  if (IsVanished(::GetLastError())) gone_ = true;
+  NoteFailure(::GetLastError());
   return false;
 }
 
@@ -152,22 +177,43 @@ size_t ComPort::OutputRoom() {
   return kDriverBuffer - std::min(queues.cbOutQue, kDriverBuffer);
 }
 
-size_t ComPort::InputWaiting() {
+size_t ComPort::DriverWaiting() {
   COMSTAT queues;
   return Queues(queues) ? queues.cbInQue : 0;
+}
+
+size_t ComPort::InputWaiting() {
+  const size_t taken = pending_.Waiting();
+  return pending_.under_way() ? taken : taken + DriverWaiting();
+}
+
+void ComPort::Purge(DWORD what) {
+  ::PurgeComm(file_.get(), what);
+  pending_.Drop();
 }
 
 bool ComPort::WaitReadable(uint32_t milliseconds) {
   using std::chrono::steady_clock;
   const auto deadline = steady_clock::now() + std::chrono::milliseconds(milliseconds);
   auto left = static_cast<DWORD>(milliseconds);
-  while (InputWaiting() == 0) {
-    // A vanished port can only wait to be woken: its driver would report events without end.
-    if ((gone_ ? wait_.WaitForWake(left) : wait_.Wait(left)) != CommWait::Outcome::kReceived) return false;
+  while (!gone_) {
+    switch (pending_.Wait(wake_.get(), left)) {
+      case PendingRead::Outcome::kReceived:
+        if (pending_.Waiting() > 0) return true;
+        break;
+      case PendingRead::Outcome::kFailed:
+        NoteFailure(::GetLastError());
+        ::Sleep(1);  // a driver that refuses at once must not keep the thread busy
+        break;
+      default:
+        return false;
+    }
     const auto rest = std::chrono::ceil<std::chrono::milliseconds>(deadline - steady_clock::now()).count();
     left = static_cast<DWORD>(std::clamp<int64_t>(rest, 0, milliseconds));
+    if (left == 0 && milliseconds != 0) return false;
   }
-  return true;
+  ::WaitForSingleObject(wake_.get(), left);
+  return false;
 }
 
 DeviceResult ComPort::SetBaudRate(uint32_t rate) {
@@ -193,7 +239,9 @@ std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
   if (!file.valid()) return fail(OpenFailure(::GetLastError()));
   WinHandle read_event(::CreateEventA(nullptr, TRUE, FALSE, nullptr));
   WinHandle write_event(::CreateEventA(nullptr, TRUE, FALSE, nullptr));
-  if (!read_event.valid() || !write_event.valid() || !::SetupComm(file.get(), kDriverBuffer, kDriverBuffer)) {
+  WinHandle wake(::CreateEventA(nullptr, FALSE, FALSE, nullptr));
+  if (!read_event.valid() || !write_event.valid() || !wake.valid() ||
+      !::SetupComm(file.get(), kDriverBuffer, kDriverBuffer)) {
     return fail(Failure(DeviceError::kBuffers, ::GetLastError()));
   }
   if (const DWORD code = ApplyTimeOuts(file.get())) return fail(Failure(DeviceError::kLineSettings, code));
@@ -201,7 +249,7 @@ std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
     return fail(Failure(DeviceError::kLineSettings, code));
   }
   result = {};
-  return std::make_unique<ComPort>(std::move(file), std::move(read_event), std::move(write_event));
+  return std::make_unique<ComPort>(std::move(file), std::move(read_event), std::move(write_event), std::move(wake));
 }
 
 }  // namespace kral
