@@ -1,4 +1,4 @@
-// A clock that stands still until it is told to move; sleeping moves it.
+// A clock that moves only when it is told to, or when somebody sleeps by it.
 #ifndef KRAL_TESTS_SUPPORT_FAKE_CLOCK_H
 #define KRAL_TESTS_SUPPORT_FAKE_CLOCK_H
 
@@ -9,14 +9,22 @@
 
 namespace kral::test {
 
-class FakeClock : public Clock {
+class FakeClock final : public Clock {
  public:
+  // Begins shortly before the tick wraps around, so that code which cannot stand that fails.
+  explicit FakeClock(uint32_t start = 0xFFFFFF00) : now_(start) {}
+
   uint32_t TickMs() override { return now_; }
-  void SleepMs(uint32_t milliseconds) override { Advance(milliseconds); }
+  void SleepMs(uint32_t milliseconds) override {
+    slept_ += milliseconds;
+    now_ += milliseconds;
+  }
   void Advance(uint32_t milliseconds) { now_ += milliseconds; }
+  uint32_t slept() const { return slept_; }
 
  private:
-  std::atomic<uint32_t> now_{1000};
+  std::atomic<uint32_t> now_;
+  std::atomic<uint32_t> slept_ = 0;
 };
 
 }  // namespace kral::test
