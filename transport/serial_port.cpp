@@ -58,6 +58,7 @@ CSerialPort::~CSerialPort() {
 uint32_t CSerialPort::Open(int32_t number) {
   DataLogFileHandler* log = log_;
   if (number < kFirstNumber || number > kLastNumber) {
+    open_result_ = {DeviceError::kNoSuchPort, 0, "ports are numbered 1 to 255"};
     if (log) log->WriteLine(kLogErr, "CSerialPort::Open(COM%d) refused: ports are numbered 1 to 255", number);
     return 0;
   }

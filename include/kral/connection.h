@@ -196,6 +196,28 @@ KRAL_API void KRAL_CALL KRAL_TerminateORBTServer(void);
  */
 KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
 
+/** States of a port, as KRAL_GetPortState gives them. */
+#define KRAL_PORT_OPEN 0          /* open */
+#define KRAL_PORT_CLOSED 1        /* closed, and nothing stood in the way when it was last opened */
+#define KRAL_PORT_NOT_FOUND 2     /* could not be opened: there is no such port */
+#define KRAL_PORT_BUSY 3          /* could not be opened: another program holds it */
+#define KRAL_PORT_NOT_PERMITTED 4 /* could not be opened: not allowed to this user */
+#define KRAL_PORT_FAILED 5        /* could not be opened for another reason; the text log tells which */
+#define KRAL_PORT_GONE 6          /* vanished while it was open */
+
+/**
+ * Tells whether the port of a handset is open, and if not why. Opens nothing and sends nothing. A connection through
+ * the phone server or through functions of the caller knows KRAL_PORT_OPEN and KRAL_PORT_CLOSED only.
+ * An addition to the given interface.
+ *
+ * @param      handle  from a connect function
+ * @param[out] state   one of the states above
+ * @return 1, or 0 for an unknown handle
+ *
+ * Wait: for a request that another thread is running on the handset.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state);
+
 /* --- Settings of a handset ---------------------------------------------------------------------------------------- */
 
 /**
