@@ -6,7 +6,6 @@
 #include <cstdint>
 #include <exception>
 #include <memory>
-#include <source_location>
 #include <string>
 #include <vector>
 
@@ -19,22 +18,21 @@ class PhoneImageException : public std::exception {
  public:
   enum class Kind : uint32_t { kRead = 0, kWriteOrAllocation = 1 };
 
-  static PhoneImageException ReadFailure(uint32_t address, uint32_t count,
-                                         std::source_location place = std::source_location::current()) {
-    return {"Read Failure", address, count, Kind::kRead, place};
+  // As a default argument: the line of the call. (std::source_location is not in every compiler we build with.)
+  static constexpr uint32_t CallersLine(int line = __builtin_LINE()) { return static_cast<uint32_t>(line); }
+
+  static PhoneImageException ReadFailure(uint32_t address, uint32_t count, uint32_t line = CallersLine()) {
+    return {"Read Failure", address, count, Kind::kRead, line};
   }
-  static PhoneImageException WriteFailure(uint32_t address, uint32_t count,
-                                          std::source_location place = std::source_location::current()) {
-    return {"Write Failure", address, count, Kind::kWriteOrAllocation, place};
+  static PhoneImageException WriteFailure(uint32_t address, uint32_t count, uint32_t line = CallersLine()) {
+    return {"Write Failure", address, count, Kind::kWriteOrAllocation, line};
   }
-  static PhoneImageException PagedAllocation(uint32_t address, uint32_t count,
-                                             std::source_location place = std::source_location::current()) {
-    return {"Paged Allocation", address, count, Kind::kWriteOrAllocation, place};
+  static PhoneImageException PagedAllocation(uint32_t address, uint32_t count, uint32_t line = CallersLine()) {
+    return {"Paged Allocation", address, count, Kind::kWriteOrAllocation, line};
   }
   // A raw binary refuses a read without saying why.
-  static PhoneImageException Unnamed(uint32_t address, uint32_t count,
-                                     std::source_location place = std::source_location::current()) {
-    return {"", address, count, Kind::kRead, place};
+  static PhoneImageException Unnamed(uint32_t address, uint32_t count, uint32_t line = CallersLine()) {
+    return {"", address, count, Kind::kRead, line};
   }
 
   const char* what() const noexcept override { return text_.c_str(); }
@@ -44,8 +42,8 @@ class PhoneImageException : public std::exception {
   Kind kind() const { return kind_; }
 
  private:
-  PhoneImageException(const char* text, uint32_t address, uint32_t count, Kind kind, std::source_location place)
-      : text_(text), address_(address), count_(count), line_(place.line()), kind_(kind) {}
+  PhoneImageException(const char* text, uint32_t address, uint32_t count, Kind kind, uint32_t line)
+      : text_(text), address_(address), count_(count), line_(line), kind_(kind) {}
 
   std::string text_;
   uint32_t address_;

@@ -74,11 +74,7 @@ TEST(HexEncoder, ReachesAsFarAsTheModeAllows) {
   PhoneImageDPaged image(256, nullptr);
   Fill(image, 0, 0x10020, '\0');
   const std::string segments = Encode(image, kSegments);
-  EXPECT_NE(segments.find(":10080000" + zeros +
-                          "E8\n:020000020081"
-                          "7B\n:10000000" +
-                          zeros + "F0\n"),
-            std::string::npos);
+  EXPECT_NE(segments.find(":10080000" + zeros + "E8\n:0200000200817B\n:10000000" + zeros + "F0\n"), std::string::npos);
   const std::string linear = Encode(image, kLinear);
   EXPECT_NE(linear.find(":10FFF000" + zeros + "01\n:020000040001F9\n:10000000" + zeros + "F0\n"), std::string::npos);
   EXPECT_EQ(linear.find(":02000004"), linear.rfind(":020000040000FA"));
@@ -110,9 +106,7 @@ TEST(HexEncoder, TakesImagesWithOneRegion) {
   PhoneImageBinary image;
   ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789abcdefX")));
   EXPECT_EQ(Encode(image, kLinear),
-            ":020000040000FA\n:10000000303132333435363738396162636465668E\n:0100100058"
-            "97\n" +
-                kEnd);
+            ":020000040000FA\n:10000000303132333435363738396162636465668E\n:010010005897\n" + kEnd);
 }
 
 TEST(HexEncoder, ImageAndFileFailuresGiveFalse) {
