@@ -10,6 +10,7 @@
 #include <deque>
 #include <mutex>
 #include <optional>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -17,6 +18,8 @@ namespace kral {
 
 inline constexpr size_t kQueueCapacity = 4096;
 inline constexpr size_t kMaximumPacket = 4096;  // FCS bytes included
+// A packet record whose length reads so is the fill of memory never written, not a packet: taken out, and absent.
+inline constexpr size_t kUnwrittenLength = 0xCDCD;
 
 using Packet = std::vector<uint8_t>;
 
@@ -46,7 +49,8 @@ class BoundedQueue {
     return TakeFront();
   }
 
-  // The oldest record, or nothing after the time-out. 0 does not wait.
+  // The oldest record, or nothing after the time-out. 0 does not wait. Any record that is there counts, also one that
+  // came before the call: no signal can be left over from a queue since cleared.
   std::optional<Record> PopWithin(std::chrono::milliseconds time_out) {
     std::unique_lock lock(mutex_);
     not_empty_.wait_for(lock, time_out, [this] { return !records_.empty(); });
@@ -74,6 +78,9 @@ class BoundedQueue {
     if (records_.empty()) return std::nullopt;
     std::optional<Record> front(std::move(records_.front()));
     records_.pop_front();
+    if constexpr (std::is_same_v<Record, Packet>) {
+      if (front->size() == kUnwrittenLength) return std::nullopt;
+    }
     return front;
   }
 

@@ -2,14 +2,20 @@
 #ifndef KRAL_TRANSPORT_KRAL_THREAD_INTERFACE_H
 #define KRAL_TRANSPORT_KRAL_THREAD_INTERFACE_H
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <vector>
 
 #include "platform/clock.h"
+#include "transport/chunk_splitter.h"
 #include "transport/hdlc_framer.h"
+#include "transport/receive_loop.h"
 #include "transport/serial_port.h"
+#include "transport/thread_control.h"
+#include "transport/traffic_counters.h"
+#include "transport/worker_thread.h"
 
 namespace kral {
 
@@ -19,13 +25,8 @@ class DataLogFileHandler;
 
 inline constexpr uint32_t kNullPort = 65534;
 
-enum class ReceiveMode : uint8_t {
-  kAsWritten = 0,   // the sleep rule of the receive loop
-  kWakeOnData = 1,  // waits in the port and sleeps nowhere
-};
-
-enum class PacketMode : uint32_t { kFramed = 0, kUnframed1 = 1, kUnframed2 = 2, kLengthPrefixed = 3 };
-
+// Opening, closing and the requests come from one thread at a time (the phone object's request lock); connected(),
+// counters() and the receive settings from any.
 class CKralThreadInterface {
  public:
   explicit CKralThreadInterface(Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
@@ -33,41 +34,96 @@ class CKralThreadInterface {
   CKralThreadInterface(const CKralThreadInterface&) = delete;
   CKralThreadInterface& operator=(const CKralThreadInterface&) = delete;
 
+  // Before the first Open. Both are kept by the owner that is given to Open.
   void Attach(CKralEvents* dispatcher, CKralEventListener* sorter);
   void SetLogger(DataLogFileHandler* log);
 
+  // --- Connection (kral_thread_interface.cpp) -----------------------------------------------------------------------
   // Opens the port (or binds the caller's functions) and starts or resumes the receive thread. `owner` is what the
-  // thread keeps alive: the object that holds this transport, its dispatcher, sorter and log.
+  // thread keeps alive: the object that holds this transport, its dispatcher, sorter and log. Fails as well while a
+  // thread that did not stop in time is still busy, in a caller's function or a callback.
   bool Open(uint32_t port_number, const UserTransport& user, std::shared_ptr<void> owner);
+  // A caller's transport stays connected: only StopThread ends that.
   bool Close();
+  // Waits at most 1,000 ms for the thread to end, after at most as much for the pause that goes with the closing.
+  // False when it did not; it then ends by itself as soon as it can, and keeps its owner alive until then.
   bool StopThread();
   bool PauseThread();
   void ResumeThread();
-  bool connected() const;
-  bool null_port() const;
+  bool connected() const { return connected_; }
+  bool null_port() const { return null_port_; }
 
   void SetOpenFlags(bool send_loopback, bool keep_buffers);
   void SetThreadReadTimeOut(uint32_t milliseconds);
   void SetReceiveMode(ReceiveMode mode);
   void SetSleepDivisor(uint32_t divisor);
 
-  // response_size: in, the room; out, what was received less the two FCS bytes, at most the room.
+  // --- Requests (kral_thread_requests.cpp) --------------------------------------------------------------------------
+  // response_size: in, the room; out, what was received less the two FCS bytes, at most the room. A reply with another
+  // first byte fails the request at once and is given out all the same. A time-out closes the port.
   bool SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint8_t expected_code,
                 uint32_t time_out_ms, uint32_t delay_ms);
+  // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
   bool SendRaw(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint32_t time_out_ms);
+  // Awaits no reply.
   bool SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
 
   bool SetPacketMode(uint32_t mode);
+  PacketMode packet_mode() const { return splitter_.mode(); }
   bool FlushRxBuffer();
   // The liveness check asks with code 4 whether the connection counts as alive without an answer: it does not, 0.
   uint32_t QueryState(uint32_t code) const;
+  std::span<const uint8_t> timed_out_request() const { return timed_out_request_; }
 
-  CProtAHDLC& framer();
-  CSerialPort& port();
+  TrafficCounters counters() const;
+
+  CProtAHDLC& framer() { return framer_; }
+  CSerialPort& port() { return port_; }
 
  private:
-  struct State;
-  std::shared_ptr<State> state_;
+  // Takes the splitter's packets on the receive thread.
+  class DispatcherFeed final : public PacketListener {
+   public:
+    void OnPacket(std::span<const uint8_t> packet) override;
+    CKralEvents* dispatcher = nullptr;
+    std::atomic<uint64_t> packets{0};
+  };
+
+  bool OpenPort(uint32_t port_number, const UserTransport& user);
+  bool BindUserTransport(const UserTransport& user);
+  bool QuietThread();
+  bool RunThread(std::shared_ptr<void> owner);
+  void WakeReceiver();
+
+  bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
+  bool AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
+                     uint8_t expected_code, uint32_t time_out_ms);
+  bool PollRecord(uint8_t* response, uint16_t& response_size, uint32_t time_out_ms);
+  void TimedOut(std::span<const uint8_t> request);
+  bool SwitchPhoneMode(PacketMode from, PacketMode to);
+  bool AskForUnframedMode();
+  bool ReturnToFramedMode();
+
+  void LogRequest(const char* format, std::span<const uint8_t> request);
+  void LogWritten(uint32_t time_out_ms, uint32_t start);
+
+  Clock& clock_;
+  DataLogFileHandler* log_ = nullptr;
+  CKralEventListener* sorter_ = nullptr;
+  std::atomic<bool> connected_{false};
+  std::atomic<bool> null_port_{false};
+  bool user_defined_ = false;
+  bool paused_ = false;
+  std::vector<uint8_t> timed_out_request_;
+
+  CSerialPort port_;
+  CProtAHDLC framer_;
+  UserTransport bound_;  // what the port is bound to while it is a caller's
+  DispatcherFeed feed_;
+  ChunkSplitter splitter_{feed_};
+  ThreadControl control_;
+  ReceiveLoop loop_{clock_, framer_, port_, control_, splitter_};
+  WorkerThread worker_;  // last: nothing above may be gone while it is parked
 };
 
 }  // namespace kral

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <span>
+#include <vector>
 
 namespace kral {
 
@@ -12,6 +13,8 @@ class PacketListener {
   virtual ~PacketListener() = default;
   // One whole packet, its two FCS bytes included; the bytes are valid during the call only.
   virtual void OnPacket(std::span<const uint8_t> packet) = 0;
+  // The same for a packet that nobody else needs any more: a listener that keeps packets keeps this one uncopied.
+  virtual void TakePacket(std::vector<uint8_t> packet) { OnPacket(packet); }
 };
 
 }  // namespace kral

@@ -1,0 +1,143 @@
+// The dispatcher's queue, thread and listener list. What packets mean is left to the listeners.
+#include "transport/kral_events.h"
+
+#include <algorithm>
+#include <thread>
+#include <utility>
+
+#include "platform/message_pump.h"
+
+namespace kral {
+namespace {
+
+constexpr uint32_t kStartMs = 1000;
+
+}  // namespace
+
+CKralEvents::~CKralEvents() {
+  Stop();
+}
+
+bool CKralEvents::RegisterListener(PacketListener* listener, const PacketFilter* filter, std::shared_ptr<void> owner) {
+  if (listener == nullptr) return false;
+  const std::lock_guard lock(listeners_mutex_);
+  if (!thread_.running() && !StartThread(std::move(owner))) return false;
+  listeners_.push_back({listener, filter});
+  return true;
+}
+
+bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
+  {
+    const std::lock_guard lock(queue_mutex_);
+    accepting_ = true;
+    stop_requested_ = false;
+  }
+  started_.Reset();
+  stopped_.Reset();
+  if (thread_.Start([this] { Run(); }, std::move(owner))) return started_.WaitFor(kStartMs);
+  EndAccepting();
+  return false;
+}
+
+void CKralEvents::UnregisterListener(PacketListener* listener) {
+  const std::lock_guard lock(listeners_mutex_);
+  const auto found = std::find_if(listeners_.begin(), listeners_.end(),
+                                  [listener](const Registration& entry) { return entry.listener == listener; });
+  if (found == listeners_.end()) return;
+  if (dispatching_) {
+    found->listener = nullptr;
+  } else {
+    listeners_.erase(found);
+  }
+}
+
+void CKralEvents::Push(std::span<const uint8_t> packet) {
+  Packet record(packet.begin(), packet.end());
+  // The queue is locked for moments only. The receive thread may be one that shows windows for the caller's
+  // transport, whose messages must not wait even so.
+  while (!queue_mutex_.try_lock()) {
+    PumpPendingMessages();
+    std::this_thread::yield();
+  }
+  bool was_empty = false;
+  {
+    const std::lock_guard lock(queue_mutex_, std::adopt_lock);
+    if (!accepting_) return;
+    was_empty = queue_.empty();
+    queue_.push_back(std::move(record));
+  }
+  // The dispatcher takes the whole queue at a time and waits only for an empty one.
+  if (was_empty) new_packet_.notify_one();
+}
+
+bool CKralEvents::Stop(uint32_t time_out_ms) {
+  EndAccepting();
+  if (!thread_.running()) {
+    thread_.Join();
+    return true;
+  }
+  if (!stopped_.WaitFor(time_out_ms)) return false;
+  thread_.Join();
+  return true;
+}
+
+// A notification under the lock: the thread may be the last to need this object.
+void CKralEvents::EndAccepting() {
+  const std::lock_guard lock(queue_mutex_);
+  accepting_ = false;
+  stop_requested_ = true;
+  queue_.clear();
+  new_packet_.notify_one();
+}
+
+void CKralEvents::Run() {
+  started_.Set();
+  if (OnThreadStart()) {
+    std::deque<Packet> batch;
+    while (TakeBatch(batch)) {
+      for (Packet& packet : batch) {
+        if (stop_requested_) break;
+        Dispatch(std::move(packet));
+      }
+      batch.clear();
+    }
+    OnThreadEnd();
+  } else {
+    EndAccepting();
+  }
+  stopped_.Set();
+}
+
+bool CKralEvents::TakeBatch(std::deque<Packet>& batch) {
+  std::unique_lock lock(queue_mutex_);
+  new_packet_.wait(lock, [this] { return stop_requested_ || !queue_.empty(); });
+  if (stop_requested_) return false;
+  batch.swap(queue_);
+  return true;
+}
+
+void CKralEvents::Dispatch(Packet packet) {
+  const std::lock_guard lock(listeners_mutex_);
+  dispatching_ = true;
+  const auto accepts = [&packet](const Registration& entry) {
+    return entry.listener != nullptr && (entry.filter == nullptr || entry.filter->Accepts(packet));
+  };
+  // By index: a listener may register another one, which begins with the next packet.
+  const size_t count = listeners_.size();
+  for (size_t i = 0; i < count; ++i) {
+    try {
+      if (!accepts(listeners_[i])) continue;
+      if (i + 1 == count) {
+        listeners_[i].listener->TakePacket(std::move(packet));
+      } else {
+        listeners_[i].listener->OnPacket(packet);
+      }
+    } catch (...) {
+      // A listener's failure costs it this packet, not the others theirs.
+    }
+  }
+  dispatching_ = false;
+  std::erase_if(listeners_, [](const Registration& entry) { return entry.listener == nullptr; });
+}
+
+}  // namespace kral

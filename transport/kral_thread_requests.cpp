@@ -1,0 +1,212 @@
+// Requests over a connection: sent, and answered or timed out; and the changes of packet mode, which begin with a
+// request. The connection itself is kral_thread_interface.cpp's.
+#include <algorithm>
+#include <array>
+#include <chrono>
+
+#include "frame/base/hex_dump.h"
+#include "frame/base/text_log.h"
+#include "transport/kral_event_listener.h"
+#include "transport/kral_thread_interface.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kFcsBytes = 2;  // at the end of every record of the response queue
+
+constexpr uint8_t kUnframedModeRequest = 68;
+constexpr uint32_t kUnframedModeMs = 80;
+constexpr uint8_t kTry115200 = 0x04;
+
+bool IsUnframed(PacketMode mode) {
+  return mode == PacketMode::kUnframed1 || mode == PacketMode::kUnframed2;
+}
+
+bool BeginsWithAt(std::span<const uint8_t> request) {
+  return request.size() >= 2 && request[0] == 'A' && request[1] == 'T';
+}
+
+size_t CopyRecord(const Packet& record, uint8_t* response, uint16_t room) {
+  const size_t count = std::min<size_t>(record.size(), room);
+  std::copy_n(record.begin(), count, response);
+  return count;
+}
+
+}  // namespace
+
+bool CKralThreadInterface::SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
+                                    uint8_t expected_code, uint32_t time_out_ms, uint32_t delay_ms) {
+  if (sorter_ == nullptr) return false;
+  LogRequest("SEND (%d bytes):%s", request);
+  sorter_->responses().Clear();
+  const uint32_t start = clock_.TickMs();
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return false;
+  }
+
+  bool succeeded = false;
+  if (Transmit(request, time_out_ms)) {
+    LogWritten(time_out_ms, start);
+    if (delay_ms != 0) clock_.SleepMs(delay_ms);
+    const uint32_t read_start = clock_.TickMs();
+    succeeded = AwaitResponse(request, response, response_size, expected_code, time_out_ms);
+    if (log_ && succeeded) {
+      log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
+    } else if (log_) {
+      log_->WriteLine(kLogErr, "Error. Send Sync Read failed.");
+    }
+  }
+  if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", succeeded ? 1 : 0);
+  return succeeded;
+}
+
+bool CKralThreadInterface::AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
+                                         uint8_t expected_code, uint32_t time_out_ms) {
+  const uint32_t start = clock_.TickMs();
+  const auto record = sorter_->responses().PopWithin(std::chrono::milliseconds(time_out_ms));
+  if (!record || record->empty()) {
+    TimedOut(request);
+    return false;
+  }
+  CopyRecord(*record, response, response_size);
+  const size_t length = record->size() > kFcsBytes ? record->size() - kFcsBytes : 0;
+  response_size = static_cast<uint16_t>(std::min<size_t>(length, response_size));
+  if (record->front() == expected_code) return true;
+
+  // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
+  if (log_) {
+    log_->WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
+                    record->front(), expected_code);
+  }
+  if (clock_.TickMs() - start > time_out_ms) TimedOut(request);
+  return false;
+}
+
+// A handset that does not answer is given up: the next request finds the port closed and opens it afresh.
+void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
+  timed_out_request_.assign(request.begin(), request.end());
+  if (log_) log_->WriteLine(kLogErr, "Request timed out");
+  Close();
+}
+
+bool CKralThreadInterface::SendRaw(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
+                                   uint32_t time_out_ms) {
+  if (sorter_ == nullptr) return false;
+  LogRequest("SEND RAW (%d bytes):%s", request);
+  sorter_->responses().Clear();
+  const uint32_t start = clock_.TickMs();
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return false;
+  }
+
+  if (IsUnframed(packet_mode()) && BeginsWithAt(request)) splitter_.SetAtReplyMode(true);
+  bool succeeded = false;
+  if (Transmit(request, time_out_ms)) {
+    LogWritten(time_out_ms, start);
+    succeeded = PollRecord(response, response_size, time_out_ms);
+    if (log_ && !succeeded) log_->WriteLine(kLogErr, "Error. Read failed.");
+  }
+  splitter_.SetAtReplyMode(false);
+  return succeeded;
+}
+
+bool CKralThreadInterface::PollRecord(uint8_t* response, uint16_t& response_size, uint32_t time_out_ms) {
+  const uint32_t start = clock_.TickMs();
+  for (;;) {
+    if (const auto record = sorter_->responses().Pop()) {
+      response_size = static_cast<uint16_t>(CopyRecord(*record, response, response_size));
+      if (log_) {
+        log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
+      }
+      return true;
+    }
+    if (clock_.TickMs() - start >= time_out_ms) return false;
+    clock_.SleepMs(1);
+  }
+}
+
+bool CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
+  LogRequest("SEND_ASYNC (%d bytes):%s", request);
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return false;
+  }
+  const uint32_t start = clock_.TickMs();
+  const auto size = static_cast<uint32_t>(request.size());
+  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) return false;
+  LogWritten(time_out_ms, start);
+  return true;
+}
+
+bool CKralThreadInterface::Transmit(std::span<const uint8_t> request, uint32_t time_out_ms) {
+  if (framer_.Send(request.data(), static_cast<uint32_t>(request.size()), time_out_ms, 0) == 1) return true;
+  if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+  Close();
+  return false;
+}
+
+bool CKralThreadInterface::SetPacketMode(uint32_t mode) {
+  if (mode > static_cast<uint32_t>(PacketMode::kLengthPrefixed)) {
+    if (log_) log_->WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
+    return false;
+  }
+  const auto wanted = static_cast<PacketMode>(mode);
+  if (!SwitchPhoneMode(packet_mode(), wanted)) return false;
+  framer_.SetRawDataFlag(mode);
+  splitter_.SetMode(wanted);
+  if (log_) log_->WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
+  return true;
+}
+
+// Only between these two modes has the handset a say.
+bool CKralThreadInterface::SwitchPhoneMode(PacketMode from, PacketMode to) {
+  if (from == PacketMode::kFramed && to == PacketMode::kUnframed1) return AskForUnframedMode();
+  if (from == PacketMode::kUnframed1 && to == PacketMode::kFramed) return ReturnToFramedMode();
+  return true;
+}
+
+bool CKralThreadInterface::AskForUnframedMode() {
+  std::array<uint8_t, kMaximumPacket> reply{};
+  uint16_t size = reply.size();
+  const uint8_t request = kUnframedModeRequest;
+  return SendSync({&request, 1}, reply.data(), size, request, kUnframedModeMs, 0) && size >= 2 && reply[1] == 1;
+}
+
+// The framer reads the handset's answer itself, so the receive thread must not.
+bool CKralThreadInterface::ReturnToFramedMode() {
+  const bool was_paused = paused_;
+  if (!PauseThread()) {
+    ResumeThread();
+    return false;
+  }
+  const bool switched = framer_.Data2DM(kTry115200) == 1;
+  if (!was_paused) ResumeThread();
+  return switched;
+}
+
+bool CKralThreadInterface::FlushRxBuffer() {
+  if (!connected_) return false;
+  // The purge's own result tells nothing: a caller's transport reports 0 for every flush it made.
+  if (!null_port_) port_.FlushPCBuffer();
+  splitter_.DropPartialPacket();
+  return true;
+}
+
+uint32_t CKralThreadInterface::QueryState(uint32_t) const {
+  return 0;
+}
+
+void CKralThreadInterface::LogRequest(const char* format, std::span<const uint8_t> request) {
+  if (log_ == nullptr || !log_->Wants(kLogIo)) return;
+  log_->WriteLine(kLogIo, format, static_cast<int>(request.size()), HexDump(request).c_str());
+}
+
+void CKralThreadInterface::LogWritten(uint32_t time_out_ms, uint32_t start) {
+  if (log_ == nullptr) return;
+  log_->WriteLine(kLogRet, "OK\t Timeout=%d", static_cast<int>(time_out_ms));
+  log_->WriteLine(kLogRet, "WRITE STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
+}
+
+}  // namespace kral

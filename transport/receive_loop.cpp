@@ -1,0 +1,102 @@
+// The receive thread's loop, in both receive modes. Starting, pausing and stopping it is the connection's affair.
+#include "transport/receive_loop.h"
+
+#include "frame/base/hex_dump.h"
+#include "frame/base/text_log.h"
+#include "transport/chunk_splitter.h"
+#include "transport/hdlc_framer.h"
+#include "transport/serial_port.h"
+#include "transport/thread_control.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kReadSize = 40960;
+
+// How long a wait goes without looking around. Everything that matters ends it at once.
+constexpr uint32_t kIdleWaitMs = 1000;
+
+}  // namespace
+
+void ReceiveLoop::Run() {
+  buffer_.resize(kReadSize);
+  acknowledged_pause_ = 0;
+  sleep_counter_ = 0;
+  while (!control_.stop_requested()) {
+    const uint32_t changes_seen = control_.changes();
+    const bool wake_on_data = mode_ == ReceiveMode::kWakeOnData;
+    if (!wake_on_data) SleepByRule();
+    if (IsPaused()) {
+      if (wake_on_data) control_.WaitForChange(changes_seen, kIdleWaitMs);
+    } else if (!wake_on_data) {
+      ReadChunk();
+    } else if (WaitForBytes(changes_seen) && !ReadChunk()) {
+      // Nothing came from where something was promised, or from a caller's function, which cannot be waited on.
+      clock_.SleepMs(1);
+    }
+  }
+  Leave();
+}
+
+// The counter moves only when the thread sleeps: with a divisor of 1 every turn sleeps, with a larger one only the
+// first. Kept exactly.
+void ReceiveLoop::SleepByRule() {
+  if (sleep_counter_ % sleep_divisor_ != 0) return;
+  clock_.SleepMs(1);
+  ++sleep_counter_;
+}
+
+bool ReceiveLoop::IsPaused() {
+  const uint32_t wanted = control_.pause_wanted();
+  if (wanted == 0) return false;
+  if (wanted != acknowledged_pause_) {
+    acknowledged_pause_ = wanted;
+    DataLogFileHandler* const log = log_;
+    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause Detected, Pause ACK event set attempt");
+    control_.AcknowledgePause();
+    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause ACK event set complete");
+  }
+  return true;
+}
+
+// True when the port is to be read.
+bool ReceiveLoop::WaitForBytes(uint32_t changes_seen) {
+  if (port_.IsOpen() == 0 || port_.gone()) {
+    control_.WaitForChange(changes_seen, kIdleWaitMs);
+    return false;
+  }
+  return !port_.CanWait() || port_.WaitReadable(kIdleWaitMs);
+}
+
+bool ReceiveLoop::ReadChunk() {
+  uint32_t count = static_cast<uint32_t>(buffer_.size());
+  if (framer_.ReceiveRaw(buffer_.data(), count, read_time_out_ms_) == 0 || count == 0) return false;
+  // A caller's function may come back long after the stop: nobody waits for these bytes any more.
+  if (control_.stop_requested()) return true;
+  bytes_received_.fetch_add(count, std::memory_order_relaxed);
+  try {
+    Split(count);
+  } catch (...) {
+    // Out of memory: the chunk is lost, and the thread must not be.
+    splitter_.DropPartialPacket();
+  }
+  return true;
+}
+
+void ReceiveLoop::Split(uint32_t count) {
+  const std::span<const uint8_t> chunk(buffer_.data(), count);
+  DataLogFileHandler* const log = log_;
+  if (log != nullptr && log->Wants(kLogIo)) {
+    log->WriteLine(kLogIo, "THREAD READ (%d bytes): %s ", static_cast<int>(count), HexDump(chunk).c_str());
+  }
+  splitter_.Feed(chunk);
+}
+
+void ReceiveLoop::Leave() {
+  if (DataLogFileHandler* const log = log_) {
+    log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
+  }
+  control_.AcknowledgeStop();
+}
+
+}  // namespace kral

@@ -1,0 +1,44 @@
+// A thread of the library: it keeps its owner alive while it runs, and nobody ever waits for it without a bound.
+#ifndef KRAL_TRANSPORT_WORKER_THREAD_H
+#define KRAL_TRANSPORT_WORKER_THREAD_H
+
+#include <atomic>
+#include <cstddef>
+#include <functional>
+#include <memory>
+#include <thread>
+
+namespace kral {
+
+class WorkerThread {
+ public:
+  WorkerThread() = default;
+  // Never waits. A thread that has not ended is parked: it goes on alone, to be joined once it has.
+  ~WorkerThread();
+  WorkerThread(const WorkerThread&) = delete;
+  WorkerThread& operator=(const WorkerThread&) = delete;
+
+  // Runs `body` on a thread of its own; `owner`, which holds this object, lives at least until the body has returned.
+  // False while an earlier body still runs, and when the system gives no thread.
+  bool Start(std::function<void()> body, std::shared_ptr<void> owner);
+  bool running() const { return thread_.joinable() && !progress_->body_ended.load(std::memory_order_acquire); }
+  // For a body that has announced its end: waits for the moment it takes to leave.
+  void Join();
+
+  struct Progress {
+    std::atomic<bool> body_ended{false};
+    std::atomic<bool> owner_released{false};  // the thread touches nothing of the library any more
+  };
+
+ private:
+  std::thread thread_;
+  std::shared_ptr<Progress> progress_;
+};
+
+// Joins the parked threads that have ended meanwhile and tells how many are left. Every start does so as well; at the
+// end of the process those still running are left alone.
+size_t ReapParkedThreads();
+
+}  // namespace kral
+
+#endif
