@@ -1,0 +1,176 @@
+// Every fault knob, seen from the host's end of the cable.
+#include "handset/faults.h"
+
+#include <gtest/gtest.h>
+
+#include <bitset>
+
+#include "tests/support/fake_clock.h"
+#include "tests/support/handset_host.h"
+
+namespace kral::handset {
+namespace {
+
+class HandsetFaults : public testing::Test {
+ protected:
+  std::string Ask() { return host_.Ask("2F"); }
+
+  const std::string reply_ = "2F 34 12";
+  const std::string wire_ = HexText(EncodeFrame(FromHex("2F 34 12")));
+
+  test::FakeClock clock_;
+  VirtualHandset handset_{Identity{}, clock_};
+  test::HandsetHost host_{handset_};
+};
+
+TEST_F(HandsetFaults, SplitReplyIsReadInPieces) {
+  handset_.faults().Add(Split(2), When::Nth(1));
+  host_.Send("2F");
+  for (size_t begin = 0; begin < wire_.size(); begin += 6) EXPECT_EQ(host_.Read(), wire_.substr(begin, 5));
+  EXPECT_EQ(host_.Read(), "");
+  EXPECT_EQ(Ask(), reply_);
+}
+
+TEST_F(HandsetFaults, PiecesOfOneReplyStayTogetherAndKeepTheirGap) {
+  handset_.faults().Add(Split(5, 10), When::Nth(1));
+  host_.Send("2F");
+  host_.Send("7B 01");
+  EXPECT_EQ(host_.Read(), wire_.substr(0, 14));
+  EXPECT_EQ(host_.Read(), "");
+  EXPECT_EQ(handset_.MillisecondsToOutput(), 10u);
+  clock_.Advance(10);
+  EXPECT_EQ(host_.Read(), wire_.substr(15));
+  EXPECT_EQ(host_.Packets(), std::vector<std::string>{"7B 01"});
+}
+
+TEST_F(HandsetFaults, MergedReplyComesWithTheNext) {
+  handset_.faults().Add(Merge(), When::Nth(1));
+  EXPECT_EQ(Ask(), "");
+  host_.Send("2F");
+  EXPECT_EQ(host_.Read(), wire_ + " " + wire_);
+}
+
+TEST_F(HandsetFaults, DelayedReplyMayBeOvertaken) {
+  handset_.faults().Add(Delay(50), When::Nth(1));
+  EXPECT_EQ(Ask(), "");
+  EXPECT_EQ(host_.Ask("7B 01"), "7B 01");
+  clock_.Advance(49);
+  EXPECT_TRUE(host_.Packets().empty());
+  clock_.Advance(1);
+  EXPECT_EQ(host_.Packets(), std::vector<std::string>{reply_});
+}
+
+TEST_F(HandsetFaults, LateReplyComesInFrontOfTheNext) {
+  handset_.faults().Add(AfterNextRequest(), When::Nth(1));
+  EXPECT_EQ(Ask(), "");
+  EXPECT_EQ(host_.Ask("7B 01"), reply_ + " | 7B 01");
+}
+
+TEST_F(HandsetFaults, LostReplyWasCarriedOutButRefusedAndIgnoredWereNot) {
+  struct Case {
+    Fault fault;
+    std::string reply;
+    uint16_t switches;
+  };
+  for (const Case& c : {Case{Lose(), "", 0x1111}, Case{Refuse(Refusal::kBadMode), "18 30 11 11", 0},
+                        Case{Refuse(19), "13 30 11 11", 0}, Case{Ignore(), "", 0}}) {
+    handset_.maintenance().SetSwitches(0);
+    handset_.faults().Add(c.fault, When::Nth(1));
+    EXPECT_EQ(host_.Ask("30 11 11"), c.reply);
+    EXPECT_EQ(handset_.maintenance().switches(), c.switches);
+    handset_.faults().Clear();
+  }
+}
+
+TEST_F(HandsetFaults, CorruptedReplyHasAWrongCheckOnly) {
+  handset_.faults().Add(Corrupt(), When::Nth(1));
+  host_.Send("2F");
+  const Bytes wire = host_.ReadBytes();
+  EXPECT_EQ(HexText(ByteView(wire).first(3)), reply_);
+  FrameDecoder decoder;
+  std::optional<Bytes> payload;
+  EXPECT_EQ(decoder.Feed(wire, payload), wire.size());
+  EXPECT_FALSE(payload);
+  EXPECT_EQ(decoder.damaged(), 1u);
+}
+
+TEST_F(HandsetFaults, DuplicateWrongCodeAndNoise) {
+  handset_.faults().Add(Duplicate(), When::Nth(1));
+  handset_.faults().Add(WrongCode(0x30), When::Nth(2));
+  handset_.faults().Add(LeadingNoise(4), When::Nth(3));
+  EXPECT_EQ(Ask(), reply_ + " | " + reply_);
+  EXPECT_EQ(Ask(), "30 34 12");
+  host_.Send("2F");
+  const Bytes wire = host_.ReadBytes();
+  EXPECT_EQ(wire[4], kFlag);
+  EXPECT_EQ(HexText(ByteView(wire).subspan(5)), wire_);
+  EXPECT_EQ(handset_.faults().struck(), 3u);
+}
+
+TEST_F(HandsetFaults, HungUpDeviceIsDeafAndDumbUntilPluggedIn) {
+  handset_.faults().Add(HangUp(), When::Nth(2));
+  EXPECT_EQ(Ask(), reply_);
+  EXPECT_EQ(Ask(), "");
+  EXPECT_TRUE(handset_.vanished());
+  EXPECT_FALSE(handset_.FromHost(FromHex("7E")));
+  handset_.SendPacket(FromHex("60 00"));
+  handset_.PlugIn();
+  EXPECT_EQ(Ask(), reply_);
+}
+
+TEST_F(HandsetFaults, SelectionCountsMatchingRequestsFromOne) {
+  handset_.faults().Add(Lose(), When::Every(3));
+  handset_.faults().Add(Refuse(Refusal::kBadLength), When::Nth(2).Of("7B 0A"));
+  std::string fates;
+  for (int i = 0; i < 7; ++i) fates += Ask().empty() ? 'x' : '.';
+  EXPECT_EQ(fates, "..x..x.");
+  EXPECT_EQ(host_.Ask("7B 0B"), "7B 0B");
+  handset_.faults().Clear();
+  handset_.faults().Add(Refuse(Refusal::kBadLength), When::Nth(2).Of("7B 0A"));
+  EXPECT_EQ(host_.Ask("7B 0A"), "7B 0A");
+  EXPECT_EQ(host_.Ask("7B 0B"), "7B 0B");
+  EXPECT_EQ(host_.Ask("7B 0A"), "15 7B 0A");
+  handset_.faults().Add(Ignore(), When::From(2));
+  fates.clear();
+  for (int i = 0; i < 4; ++i) fates += Ask().empty() ? 'x' : '.';
+  EXPECT_EQ(fates, ".xxx");
+}
+
+// The same on every home and in every run, so that a failure seen once can be seen again.
+TEST_F(HandsetFaults, ChanceAndBitErrorsFollowTheSeed) {
+  const auto run = [this](uint64_t seed) {
+    handset_.faults().Clear();
+    handset_.faults().SetSeed(seed);
+    handset_.faults().Add(Lose(), When::Chance(0.25));
+    handset_.faults().SetBitErrorRate(0.01);
+    Bytes heard;
+    for (int i = 0; i < 400; ++i) {
+      host_.Send("2F");
+      const Bytes chunk = host_.ReadBytes();
+      heard.insert(heard.end(), chunk.begin(), chunk.end());
+    }
+    return heard;
+  };
+  const Bytes first = run(3);
+  EXPECT_EQ(run(3), first);
+  EXPECT_NE(run(4), first);
+
+  const size_t frame = FromHex(wire_).size();
+  EXPECT_NEAR(static_cast<double>(first.size()) / static_cast<double>(frame), 300, 40);  // a quarter is lost
+  const Bytes intact = FromHex(wire_);
+  size_t flipped = 0;
+  for (size_t i = 0; i < first.size(); ++i) flipped += std::bitset<8>(first[i] ^ intact[i % frame]).count();
+  EXPECT_NEAR(static_cast<double>(flipped) / static_cast<double>(first.size() * 8), 0.01, 0.003);
+}
+
+TEST_F(HandsetFaults, UnsolicitedPacketsKnowBitErrorsOnly) {
+  handset_.faults().Add(Lose(), When::Always());
+  handset_.SendPacket(FromHex("60 00"));
+  EXPECT_EQ(host_.Packets(), std::vector<std::string>{"60 00"});
+  handset_.faults().SetBitErrorRate(1);
+  handset_.SendUnframed(FromHex("0F F0"));
+  EXPECT_EQ(host_.Read(), "F0 0F");
+}
+
+}  // namespace
+}  // namespace kral::handset
