@@ -1,0 +1,312 @@
+// Connecting, the liveness check, reopening, and what each way of connecting promises.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <string>
+#include <vector>
+
+#include "frame/diag_ftm.h"
+#include "frame/resource_manager.h"
+#include "handset/caller_transport.h"
+#include "kral/connection.h"
+#include "kral/text_log.h"
+#include "tests/support/handset_ports.h"
+#include "tests/support/phone_log.h"
+
+namespace kral {
+namespace {
+
+using handset::When;
+using Ports = std::vector<uint16_t>;
+
+constexpr uint16_t kPort = 12;
+constexpr uint16_t kNoHandset = 13;
+
+class Connection : public testing::Test {
+ protected:
+  ~Connection() override { KRAL_SetTargetType(0); }
+
+  static KRAL_HANDLE ConnectThrough(handset::CallerTransport& cable, uint16_t port = 200) {
+    return KRAL_ConnectServer_UserDefinedTransport(port, cable.handle_value(), cable.context(),
+                                                   handset::CallerTransport::Send, handset::CallerTransport::Receive,
+                                                   handset::CallerTransport::Flush);
+  }
+
+  // Whether the row of the port lives on after one release.
+  static bool IsSharedRow(KRAL_HANDLE handle) {
+    KRAL_DisconnectServer(handle);
+    uint16_t port = 0;
+    return KRAL_GetComPortNumber(handle, &port) == 1;
+  }
+
+  test::HandsetPorts ports_;
+  handset::VirtualHandset& handset_ = ports_.Add(kPort);
+};
+
+TEST_F(Connection, ConnectGivesItsHandleWhetherOrNotThePortOpened) {
+  const KRAL_HANDLE present = KRAL_ConnectServer(kPort);
+  const KRAL_HANDLE absent = KRAL_ConnectServer(kNoHandset);
+  EXPECT_NE(absent, 0u);
+  EXPECT_EQ(KRAL_IsPhoneConnected(present), 1);
+  EXPECT_EQ(KRAL_IsPhoneConnected(absent), 0);
+  const KRAL_HANDLE out_of_range = KRAL_ConnectServer(256);
+  EXPECT_NE(out_of_range, 0u);
+  EXPECT_EQ(KRAL_IsPhoneConnected(out_of_range), 0);
+}
+
+TEST_F(Connection, PortTakesItsLow16Bits) {
+  uint16_t port = 0;
+  EXPECT_EQ(KRAL_GetComPortNumber(KRAL_ConnectServer(0xABCD0000u + kPort), &port), 1);
+  EXPECT_EQ(port, kPort);
+}
+
+TEST_F(Connection, HandsetThatAppearsLaterIsFoundByTheLivenessCheck) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kNoHandset);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+  ports_.Add(kNoHandset);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+}
+
+TEST_F(Connection, HandShakeWritesTheLoopbackFrameTwice) {
+  const handset::Bytes frame = handset::FromHex("7B 00 01 02 03 04 05 06 07 08 09 9D 5F 7E");
+  handset::Bytes twice = frame;
+  twice.insert(twice.end(), frame.begin(), frame.end());
+  KRAL_ConnectServer(kPort);
+  EXPECT_TRUE(handset_.received().empty());
+  KRAL_DisconnectAllServers();
+  KRAL_ConnectServerWithHandShake(kPort);
+  EXPECT_EQ(handset_.received(), twice);
+}
+
+TEST_F(Connection, VerifyGivesZeroAndKeepsTheContextWhenThePortDoesNotOpen) {
+  EXPECT_EQ(KRAL_ConnectServerWithVerify(kNoHandset), 0u);
+  EXPECT_TRUE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "the failed connect still counts";
+  const KRAL_HANDLE handle = KRAL_ConnectServerWithVerify(kPort);
+  EXPECT_NE(handle, 0u);
+  EXPECT_FALSE(IsSharedRow(handle));
+}
+
+TEST_F(Connection, WaitOfZeroMakesOneAttempt) {
+  EXPECT_EQ(KRAL_ConnectServerWithWait(kNoHandset, 0), 0u);
+  EXPECT_GT(ports_.opens().size(), 0u);
+  EXPECT_FALSE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "its only connect was released";
+}
+
+TEST_F(Connection, EachAttemptOfAWaitCounts) {
+  EXPECT_EQ(KRAL_ConnectServerWithWait(kNoHandset, 35), 0u);
+  EXPECT_TRUE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "one release for several attempts";
+}
+
+TEST_F(Connection, WaitEndsWithTheFirstAnswer) {
+  handset_.faults().Add(handset::Ignore(), When::Nth(1));  // the first attempt gets no answer
+  const KRAL_HANDLE handle = KRAL_ConnectServerWithWait(kPort, 5000);
+  EXPECT_NE(handle, 0u);
+  EXPECT_TRUE(IsSharedRow(handle));
+  EXPECT_EQ(handset_.request_count(), 3u) << "loopback; loopback and version";
+}
+
+TEST_F(Connection, NullPortCountsAsConnectedAndEveryRequestFails) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(KRAL_PORT_NULL);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  auto& phone = *Kral_ResourceManager::GetPhone(handle);
+  phone.packet().Reset();
+  phone.packet().Append8(0);
+  test::PhoneLog log(handle);
+  EXPECT_FALSE(phone.Send(phone.packet()));
+  EXPECT_TRUE(log.Has("1 Send Sync skipped for NULL port") || log.Has("16 Send Sync skipped for NULL port") ||
+              log.Has("2 Send Sync skipped for NULL port") || log.Has("4 Send Sync skipped for NULL port"));
+  EXPECT_TRUE(ports_.opens().empty());
+}
+
+// --- Liveness
+// ---------------------------------------------------------------------------------------------------------
+
+struct Liveness {
+  const char* name;
+  const char* loopback;  // the reply; null: silence
+  const char* version;
+  uint8_t connected;
+};
+
+const Liveness kLiveness[] = {
+    {"a whole loopback", "7B 00 01 02 03 04 05 06 07 08 09", "00 31", 1},
+    {"only the third byte counts", "7B FF 01 FF FF FF FF FF FF FF FF", "00 31", 1},
+    {"the third byte differs", "7B 00 02 02 03 04 05 06 07 08 09", nullptr, 0},
+    {"a byte short", "7B 00 01 02 03 04 05 06 07 08", nullptr, 0},
+    {"a byte long", "7B 00 01 02 03 04 05 06 07 08 09 0A", nullptr, 0},
+    {"refused", "13 7B 00 01 02 03 04 05 06 07 08 09", nullptr, 0},
+    {"silence", nullptr, nullptr, 0},
+    {"a version of one byte", "7B 00 01 02 03 04 05 06 07 08 09", "00", 0},
+    {"version refused", "7B 00 01 02 03 04 05 06 07 08 09", "13 00", 0},
+};
+
+TEST_F(Connection, LivenessAsksForLoopbackAndVersion) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  for (const auto& row : kLiveness) {
+    SCOPED_TRACE(row.name);
+    auto loopback = handset_.Expect("7B 00 01 02 03 04 05 06 07 08 09");
+    if (row.loopback != nullptr) loopback.Reply(row.loopback);
+    if (row.version != nullptr) handset_.Expect("00").Reply(row.version);
+    EXPECT_EQ(KRAL_IsPhoneConnected(handle), row.connected);
+    EXPECT_TRUE(handset_.ScriptConsumed());
+    EXPECT_EQ(handset_.script().Problems(), "");
+  }
+}
+
+TEST_F(Connection, LivenessTellsWhatItAsks) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  const test::PhoneLog log(handle, KRAL_LOG_RET | KRAL_LOG_C_HIGH_LEVEL_START);
+  KRAL_IsPhoneConnected(handle);
+  EXPECT_TRUE(log.Has("512 KRAL_IsPhoneConnected"));
+  EXPECT_TRUE(log.Has("4 KRAL_IsPhoneConnected() -- pinging phone with loopback command, 0x7B"));
+  EXPECT_TRUE(log.Has("4 KRAL_IsPhoneConnected() -- pinging phone with version command, 0x0"));
+}
+
+const std::pair<const char*, uint8_t> kServiceReplies[] = {
+    {"4B 32 03 00 01", 1},
+    {"4B 32 03 00", 0},  // not longer than the echo
+    {"4B 32 04 00 01", 0},
+    {"13 4B 32 03 00", 0},
+};
+
+TEST_F(Connection, ApplicationTargetAsksForTheDiagnosticService) {
+  KRAL_SetTargetType(1);
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  const test::PhoneLog log(handle, KRAL_LOG_IO);
+  for (const auto& [reply, connected] : kServiceReplies) {
+    handset_.Expect("4B 32 03 00 00 00 00 00 00 00 00 00").Reply(reply);
+    EXPECT_EQ(KRAL_IsPhoneConnected(handle), connected) << reply;
+    EXPECT_TRUE(handset_.ScriptConsumed());
+  }
+  EXPECT_TRUE(log.Has("1 Diag_FTM::IsDiagServiceAlive() -- pinging phone with version command, 0x4B 0x32 0x3 0x0"));
+}
+
+// --- Requests
+// ---------------------------------------------------------------------------------------------------------
+
+const std::pair<const char*, const char*> kRefusals[] = {
+    {"13 26", "16 ERROR:\tDIAG_BAD_CMD_F (19) received, bad command"},
+    {"14 26", "16 ERROR:\tDIAG_BAD_PARM_F (20) received, bad parameter"},
+    {"15 26", "16 ERROR:\tDIAG_BAD_LEN_F (21) received, bad request length"},
+    {"18 26", "16 ERROR:\tDIAG_BAD_MODE_F (24) received, command is invalid for the current mode"},
+};
+
+TEST_F(Connection, RefusalsAreNamedAndNothingElseIs) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  auto& phone = *Kral_ResourceManager::GetPhone(handle);
+  test::PhoneLog log(handle, KRAL_LOG_ERR);
+  const auto send = [&](uint8_t code, uint32_t time_out) {
+    phone.packet().Reset();
+    phone.packet().Append8(code);
+    return phone.Send(phone.packet(), time_out);
+  };
+  for (const auto& [reply, line] : kRefusals) {
+    handset_.Expect("26").Reply(reply);
+    EXPECT_FALSE(send(0x26, 1000));
+    EXPECT_EQ(log.Count(line), 1u) << line;
+  }
+  log.Take();
+  handset_.Expect("13").Reply("13");  // a request of that code: an answer, no refusal
+  EXPECT_TRUE(send(0x13, 1000));
+  EXPECT_EQ(log.Take(), test::PhoneLog::Lines{});
+  // The caller's buffer may hold anything: a time-out is not taken for a refusal.
+  handset_.Expect("26");
+  std::array<uint8_t, 4> response = {19, 19, 19, 19};
+  uint16_t size = 4;
+  EXPECT_FALSE(phone.SendSync(std::array<uint8_t, 1>{0x26}, response.data(), size, 0x26, 20));
+  EXPECT_EQ(log.Count(kRefusals[0].second), 0u);
+}
+
+TEST_F(Connection, EmptyRequestFailsWithoutTraffic) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  auto& phone = *Kral_ResourceManager::GetPhone(handle);
+  phone.packet().Reset();
+  EXPECT_FALSE(phone.Send(phone.packet()));
+  EXPECT_EQ(handset_.request_count(), 0u);
+}
+
+TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
+  const KRAL_HANDLE handle = KRAL_ConnectServerWithHandShake(kPort);
+  KRAL_ConfigureTimeOut(handle, 1, 20);
+  handset_.faults().Add(handset::Ignore(), When::Nth(1));
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+  EXPECT_FALSE(ports_.IsOpen(kPort));
+  KRAL_ConfigureTimeOut(handle, 1, 1000);
+  const size_t before = handset_.received().size();
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  EXPECT_EQ(ports_.opens(), (Ports{kPort, kPort}));
+  const auto received = handset_.received();
+  EXPECT_EQ(received.at(before), 0x7B) << "opened with the arguments of the connect: the handshake frame comes first";
+  EXPECT_GE(received.size() - before, 4 * 14u - 10) << "two handshake frames, loopback and version";
+}
+
+TEST_F(Connection, CallersTransportIsReopenedWithTheSameFunctions) {
+  handset::CallerTransport cable(handset_);
+  const KRAL_HANDLE handle = ConnectThrough(cable);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  KRAL_ConfigureTimeOut(handle, 1, 20);
+  handset_.faults().Add(handset::Ignore(), When::Nth(1));
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+  KRAL_ConfigureTimeOut(handle, 1, 1000);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  EXPECT_TRUE(ports_.opens().empty()) << "no COM port is touched";
+}
+
+TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt) {
+  handset::CallerTransport cable(handset_);
+  const KRAL_HANDLE com = KRAL_ConnectServer(kPort);
+  KRAL_ConnectServer(kPort);
+  KRAL_DisconnectServer(com);
+  EXPECT_FALSE(ports_.IsOpen(kPort));
+  EXPECT_EQ(KRAL_IsPhoneConnected(com), 1);
+  EXPECT_TRUE(ports_.IsOpen(kPort));
+  KRAL_DisconnectServer(com);
+
+  const KRAL_HANDLE callers = ConnectThrough(cable);
+  EXPECT_EQ(ConnectThrough(cable), callers);
+  KRAL_DisconnectServer(callers);
+  EXPECT_EQ(KRAL_IsPhoneConnected(callers), 1);
+}
+
+TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {
+  handset::CallerTransport cable(handset_);
+  KRAL_SetLibraryMode(1);
+  const KRAL_HANDLE handle = ConnectThrough(cable);
+  EXPECT_FALSE(Kral_ResourceManager::server_mode());
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  const auto phone = Kral_ResourceManager::GetPhone(handle);
+  EXPECT_FALSE(phone->data_to_diagnostic_search());
+  EXPECT_EQ(KRAL_SetData2DiagSearch(handle, 1), 1);
+  EXPECT_TRUE(phone->data_to_diagnostic_search());
+}
+
+TEST_F(Connection, CallersTransportNeedsAllItsFunctions) {
+  handset::CallerTransport cable(handset_);
+  const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(200, cable.handle_value(), cable.context(),
+                                                                     handset::CallerTransport::Send, nullptr, nullptr);
+  EXPECT_NE(handle, 0u);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+}
+
+TEST_F(Connection, LibraryModeChangesDoNotTouchOpenConnections) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  KRAL_SetLibraryMode(1);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  KRAL_SetLibraryMode(0);
+}
+
+TEST_F(Connection, OpenAndCloseAreTold) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  KRAL_ConnectServer(kPort);
+  const test::PhoneLog log(handle, KRAL_LOG_FN);
+  KRAL_ConnectServer(kPort);
+  EXPECT_EQ(log.Count("2 VARN Internal: OpenPort()"), 1u);
+  KRAL_DisconnectServer(handle);
+  EXPECT_EQ(log.Count("2 VARN Internal: ClosePort()"), 1u);
+  KRAL_DisconnectServer(handle);
+  EXPECT_EQ(log.Count("2 VARN Internal: ClosePort()"), 1u) << "it was closed already";
+}
+
+}  // namespace
+}  // namespace kral
