@@ -25,10 +25,13 @@ constexpr uint16_t kNoHandset = 13;
 
 class Connection : public testing::Test {
  protected:
-  ~Connection() override { KRAL_SetTargetType(0); }
+  ~Connection() override {
+    KRAL_DisconnectAllServers();
+    KRAL_SetTargetType(0);
+  }
 
-  static KRAL_HANDLE ConnectThrough(handset::CallerTransport& cable, uint16_t port = 200) {
-    return KRAL_ConnectServer_UserDefinedTransport(port, cable.handle_value(), cable.context(),
+  KRAL_HANDLE ConnectThroughCable() {
+    return KRAL_ConnectServer_UserDefinedTransport(200, cable_.handle_value(), cable_.context(),
                                                    handset::CallerTransport::Send, handset::CallerTransport::Receive,
                                                    handset::CallerTransport::Flush);
   }
@@ -42,6 +45,7 @@ class Connection : public testing::Test {
 
   test::HandsetPorts ports_;
   handset::VirtualHandset& handset_ = ports_.Add(kPort);
+  handset::CallerTransport cable_{handset_};
 };
 
 TEST_F(Connection, ConnectGivesItsHandleWhetherOrNotThePortOpened) {
@@ -114,8 +118,9 @@ TEST_F(Connection, NullPortCountsAsConnectedAndEveryRequestFails) {
   phone.packet().Append8(0);
   test::PhoneLog log(handle);
   EXPECT_FALSE(phone.Send(phone.packet()));
-  EXPECT_TRUE(log.Has("1 Send Sync skipped for NULL port") || log.Has("16 Send Sync skipped for NULL port") ||
-              log.Has("2 Send Sync skipped for NULL port") || log.Has("4 Send Sync skipped for NULL port"));
+  const auto lines = log.Take();
+  EXPECT_TRUE(std::any_of(lines.begin(), lines.end(),
+                          [](const std::string& line) { return line.ends_with(" Send Sync skipped for NULL port"); }));
   EXPECT_TRUE(ports_.opens().empty());
 }
 
@@ -227,23 +232,23 @@ TEST_F(Connection, EmptyRequestFailsWithoutTraffic) {
 }
 
 TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
+  handset_.faults().Add(handset::Ignore(), When::Always());
   const KRAL_HANDLE handle = KRAL_ConnectServerWithHandShake(kPort);
   KRAL_ConfigureTimeOut(handle, 1, 20);
-  handset_.faults().Add(handset::Ignore(), When::Nth(1));
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
   EXPECT_FALSE(ports_.IsOpen(kPort));
+  handset_.faults().Clear();
   KRAL_ConfigureTimeOut(handle, 1, 1000);
   const size_t before = handset_.received().size();
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
   EXPECT_EQ(ports_.opens(), (Ports{kPort, kPort}));
   const auto received = handset_.received();
   EXPECT_EQ(received.at(before), 0x7B) << "opened with the arguments of the connect: the handshake frame comes first";
-  EXPECT_GE(received.size() - before, 4 * 14u - 10) << "two handshake frames, loopback and version";
+  EXPECT_EQ(received.size() - before, 3 * 14u + 4) << "two handshake frames, loopback and version";
 }
 
 TEST_F(Connection, CallersTransportIsReopenedWithTheSameFunctions) {
-  handset::CallerTransport cable(handset_);
-  const KRAL_HANDLE handle = ConnectThrough(cable);
+  const KRAL_HANDLE handle = ConnectThroughCable();
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
   KRAL_ConfigureTimeOut(handle, 1, 20);
   handset_.faults().Add(handset::Ignore(), When::Nth(1));
@@ -254,7 +259,6 @@ TEST_F(Connection, CallersTransportIsReopenedWithTheSameFunctions) {
 }
 
 TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt) {
-  handset::CallerTransport cable(handset_);
   const KRAL_HANDLE com = KRAL_ConnectServer(kPort);
   KRAL_ConnectServer(kPort);
   KRAL_DisconnectServer(com);
@@ -263,16 +267,15 @@ TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt
   EXPECT_TRUE(ports_.IsOpen(kPort));
   KRAL_DisconnectServer(com);
 
-  const KRAL_HANDLE callers = ConnectThrough(cable);
-  EXPECT_EQ(ConnectThrough(cable), callers);
+  const KRAL_HANDLE callers = ConnectThroughCable();
+  EXPECT_EQ(ConnectThroughCable(), callers);
   KRAL_DisconnectServer(callers);
   EXPECT_EQ(KRAL_IsPhoneConnected(callers), 1);
 }
 
 TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {
-  handset::CallerTransport cable(handset_);
   KRAL_SetLibraryMode(1);
-  const KRAL_HANDLE handle = ConnectThrough(cable);
+  const KRAL_HANDLE handle = ConnectThroughCable();
   EXPECT_FALSE(Kral_ResourceManager::server_mode());
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
   const auto phone = Kral_ResourceManager::GetPhone(handle);
@@ -282,8 +285,7 @@ TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {
 }
 
 TEST_F(Connection, CallersTransportNeedsAllItsFunctions) {
-  handset::CallerTransport cable(handset_);
-  const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(200, cable.handle_value(), cable.context(),
+  const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(200, cable_.handle_value(), cable_.context(),
                                                                      handset::CallerTransport::Send, nullptr, nullptr);
   EXPECT_NE(handle, 0u);
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);

@@ -183,6 +183,7 @@ class Noted : public FamilyObject {
 
 class Families : public ContextTable {
  protected:
+  ~Families() override { KRAL_DisconnectAllServers(); }  // the objects write into the notes
   table::FamilyMaker Maker(std::string name) { return Maker(std::move(name), notes_); }
   table::FamilyMaker Maker(std::string name, std::vector<std::string>& notes) {
     return [this, name, &notes](Diag_FTM&, KRAL_HANDLE) {
