@@ -41,6 +41,11 @@ class PhoneLog {
     return std::exchange(Registry().lines[handle_], {});
   }
 
+  Lines lines() const {
+    const std::lock_guard lock(Registry().mutex);
+    return Registry().lines[handle_];
+  }
+
   // Whether the line has been written since the last Take.
   bool Has(std::string_view line) const { return Count(line) > 0; }
   size_t Count(std::string_view line) const {
