@@ -3,6 +3,7 @@
 
 #include <windows.h>
 
+#include <algorithm>
 #include <array>
 #include <cstdlib>
 #include <optional>
@@ -23,7 +24,8 @@ std::optional<std::string> ValueText(HKEY key, DWORD index) {
       ERROR_SUCCESS) {
     return std::nullopt;
   }
-  return std::string(data.begin(), data.begin() + data_size);
+  const auto end = data.begin() + data_size;
+  return std::string(data.begin(), std::find(data.begin(), end, BYTE{0}));
 }
 
 }  // namespace

@@ -1,0 +1,98 @@
+// Whole files: limits of reading, and a target that changes in one step or not at all.
+#include "platform/file_util.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "tests/support/temp_folder.h"
+
+namespace kral {
+namespace {
+
+using Bytes = std::vector<uint8_t>;
+
+Bytes Of(std::string_view text) {
+  return {text.begin(), text.end()};
+}
+
+size_t FilesIn(const std::string& folder) {
+  const std::filesystem::directory_iterator entries(folder);
+  return static_cast<size_t>(std::distance(begin(entries), end(entries)));
+}
+
+TEST(ReadWholeFileTest, GivesFilesUpToTheLimitAndNothingOfLongerOnes) {
+  const tests::TempFolder folder;
+  const std::string large(200000, 'x');
+  struct Case {
+    std::string content;
+    size_t limit;
+    bool read;
+  };
+  for (const Case& c :
+       {Case{"", 0, true}, Case{"a\r\n\x1A z", 6, true}, Case{"abc", 2, false}, Case{"abc", 3, true},
+        Case{large, large.size(), true}, Case{large, large.size() - 1, false}, Case{large, SIZE_MAX, true}}) {
+    const std::string path = folder.Add("file", c.content);
+    Bytes bytes = Of("kept");
+    const std::error_code error = ReadWholeFile(path, c.limit, bytes);
+    EXPECT_EQ(error, c.read ? std::error_code() : std::make_error_code(std::errc::file_too_large));
+    EXPECT_EQ(bytes, Of(c.read ? c.content : "kept"));
+  }
+}
+
+TEST(ReadWholeFileTest, AMissingFileIsNoSuchFile) {
+  const tests::TempFolder folder;
+  Bytes bytes;
+  EXPECT_EQ(ReadWholeFile(folder.Path("none"), 10, bytes), std::errc::no_such_file_or_directory);
+}
+
+TEST(AtomicFileTest, TheTargetChangesWithTheCommitOnly) {
+  const tests::TempFolder folder;
+  const std::string path = folder.Add("target", "old");
+  AtomicFile file;
+  ASSERT_FALSE(file.Open(path));
+  ASSERT_FALSE(file.Write(Of("new ")));
+  ASSERT_FALSE(file.Write(Of("content")));
+  EXPECT_EQ(folder.Content("target"), "old");
+  ASSERT_FALSE(file.Commit());
+  EXPECT_EQ(folder.Content("target"), "new content");
+  EXPECT_EQ(FilesIn(folder.Path("")), 1u);
+  EXPECT_TRUE(file.Write(Of("late")));
+  EXPECT_TRUE(file.Commit());
+}
+
+TEST(AtomicFileTest, WithoutACommitNothingIsLeft) {
+  const tests::TempFolder folder;
+  {
+    AtomicFile file;
+    ASSERT_FALSE(file.Open(folder.Path("target")));
+    ASSERT_FALSE(file.Write(Of("half")));
+  }
+  EXPECT_EQ(FilesIn(folder.Path("")), 0u);
+}
+
+TEST(AtomicFileTest, TwoWritersOfOneTargetDoNotMix) {
+  const tests::TempFolder folder;
+  AtomicFile first;
+  AtomicFile second;
+  ASSERT_FALSE(first.Open(folder.Path("target")));
+  ASSERT_FALSE(second.Open(folder.Path("target")));
+  ASSERT_FALSE(first.Write(Of("first")));
+  ASSERT_FALSE(second.Write(Of("second")));
+  ASSERT_FALSE(second.Commit());
+  ASSERT_FALSE(first.Commit());
+  EXPECT_EQ(folder.Content("target"), "first");
+}
+
+TEST(AtomicFileTest, ATargetThatCannotBeReplacedStaysAndLeavesNoRest) {
+  const tests::TempFolder folder;
+  std::filesystem::create_directories(folder.Path("target/inner"));
+  EXPECT_TRUE(ReplaceWholeFile(folder.Path("target"), Of("text")));
+  EXPECT_EQ(FilesIn(folder.Path("")), 1u);
+  EXPECT_EQ(ReplaceWholeFile(folder.Path("none/target"), Of("text")), std::errc::no_such_file_or_directory);
+}
+
+}  // namespace
+}  // namespace kral

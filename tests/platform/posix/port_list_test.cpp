@@ -1,0 +1,138 @@
+// COM numbers from folders and names of the test's own.
+#include "platform/port_list.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <vector>
+
+#include "platform/environment.h"
+#include "platform/posix/port_sources.h"
+#include "tests/support/temp_folder.h"
+
+namespace kral {
+namespace {
+
+namespace fs = std::filesystem;
+
+class PortListTest : public testing::Test {
+ protected:
+  PortListTest() {
+    fs::create_directories(folder_.Path("tty"));
+    fs::create_directories(folder_.Path("first"));
+    fs::create_directories(folder_.Path("second"));
+    sources_.tty_class = folder_.Path("tty");
+    sources_.link_folders = {folder_.Path("first"), folder_.Path("second")};
+  }
+
+  // A tty of the system; `type` as the kernel tells it for serial chips.
+  void AddTty(const std::string& name, bool device, const std::string& type = "") {
+    fs::create_directories(folder_.Path("tty/" + name + (device ? "/device" : "")));
+    if (!type.empty()) folder_.Add("tty/" + name + "/type", type + "\n");
+  }
+  void AddLink(const std::string& name) { fs::create_symlink("/dev/null", folder_.Path(name)); }
+
+  std::vector<uint16_t> Listed() {
+    std::vector<uint16_t> ports = {999};
+    EXPECT_TRUE(ListComPorts(sources_, ports));
+    return ports;
+  }
+
+  tests::TempFolder folder_;
+  PortSources sources_;
+};
+
+TEST_F(PortListTest, TtysWithHardwareAreListedInTheirRanges) {
+  EXPECT_TRUE(Listed().empty());
+  AddTty("tty1", false);
+  AddTty("ttyS0", true, "4");
+  AddTty("ttyS1", true, "0");   // the kernel's entry for a chip that is not there
+  AddTty("ttyS2", false, "4");  // nothing behind it
+  AddTty("ttyS63", true, "4");
+  AddTty("ttyS64", true, "4");  // would run into the next range
+  AddTty("ttyUSB0", true);
+  AddTty("ttyUSB64", true);
+  AddTty("ttyUSB01", true);  // not a name of the kernel's
+  AddTty("ttyACM2", true);
+  AddTty("ttyACM127", true);
+  AddTty("ttyAMA0", true);
+  EXPECT_EQ(Listed(), (std::vector<uint16_t>{1, 64, 65, 131}));
+}
+
+TEST_F(PortListTest, NamesAndLinksAreListedOnceAndInOrder) {
+  AddTty("ttyS4", true, "4");
+  AddLink("first/com12");
+  AddLink("second/com12");
+  AddLink("second/com3");
+  for (const char* other : {"first/com", "first/com0", "first/com256", "first/com07", "first/com9x", "first/COM8"}) {
+    AddLink(other);
+  }
+  sources_.variables = {{200, "/dev/x"}, {12, "/dev/y"}};
+  EXPECT_EQ(Listed(), (std::vector<uint16_t>{3, 5, 12, 200}));
+}
+
+TEST_F(PortListTest, WithoutTheSystemsListNamedPortsAreListedAlone) {
+  sources_.tty_class = folder_.Path("missing");
+  std::vector<uint16_t> ports;
+  EXPECT_FALSE(ListComPorts(sources_, ports));
+  sources_.variables = {{7, "/dev/x"}};
+  EXPECT_EQ(Listed(), std::vector<uint16_t>{7});
+}
+
+TEST_F(PortListTest, TheFirstNameOfANumberWins) {
+  const std::vector<std::pair<int, std::string>> plain = {{1, "/dev/ttyS0"},
+                                                          {64, "/dev/ttyS63"},
+                                                          {65, "/dev/ttyUSB0"},
+                                                          {128, "/dev/ttyUSB63"},
+                                                          {129, "/dev/ttyACM0"},
+                                                          {255, "/dev/ttyACM126"},
+                                                          {0, ""},
+                                                          {256, ""}};
+  for (const auto& [number, device] : plain) EXPECT_EQ(ComPortDevice(sources_, number), device);
+  AddLink("second/com1");
+  EXPECT_EQ(ComPortDevice(sources_, 1), folder_.Path("second/com1"));
+  AddLink("first/com1");
+  EXPECT_EQ(ComPortDevice(sources_, 1), folder_.Path("first/com1"));
+  sources_.variables = {{1, "/dev/pts/7"}};
+  EXPECT_EQ(ComPortDevice(sources_, 1), "/dev/pts/7");
+}
+
+// Puts variables back as they were.
+class Variables {
+ public:
+  explicit Variables(std::vector<std::pair<const char*, std::optional<std::string>>> values) {
+    for (auto& [name, value] : values) {
+      old_.emplace_back(name, EnvironmentValue(name));
+      SetEnvironmentValue(name, value);
+    }
+  }
+  ~Variables() {
+    for (const auto& [name, value] : old_) SetEnvironmentValue(name, value);
+  }
+
+ private:
+  std::vector<std::pair<const char*, std::optional<std::string>>> old_;
+};
+
+TEST(PortSourcesTest, TheEnvironmentNamesPortsAndFolders) {
+  const Variables variables({{"KRAL_COM31", "/dev/x"},
+                             {"KRAL_COM32", ""},
+                             {"KRAL_COM033", "/dev/y"},
+                             {"KRAL_COM256", "/dev/z"},
+                             {"KRAL_PORT_DIR", "/ports"}});
+  const PortSources sources = CurrentPortSources();
+  EXPECT_EQ(sources.variables.count(31), 1u);
+  for (const int number : {32, 33, 256}) EXPECT_EQ(sources.variables.count(number), 0u) << number;
+  EXPECT_EQ(sources.link_folders, std::vector<fs::path>{"/ports"});
+  EXPECT_EQ(ComPortDevice(31), "/dev/x");
+}
+
+TEST(PortSourcesTest, WithoutAChosenFolderTheUsersComesBeforeTheSystems) {
+  const Variables variables({{"KRAL_PORT_DIR", std::nullopt}, {"XDG_CONFIG_HOME", "/c"}, {"HOME", "/h"}});
+  EXPECT_EQ(CurrentPortSources().link_folders, (std::vector<fs::path>{"/c/kral/ports", "/etc/kral/ports"}));
+  SetEnvironmentValue("XDG_CONFIG_HOME", std::nullopt);
+  EXPECT_EQ(CurrentPortSources().link_folders, (std::vector<fs::path>{"/h/.config/kral/ports", "/etc/kral/ports"}));
+}
+
+}  // namespace
+}  // namespace kral

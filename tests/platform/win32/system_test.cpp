@@ -1,0 +1,102 @@
+// Registry, window messages and processes of Windows.
+#include <gtest/gtest.h>
+#include <windows.h>
+
+#include <algorithm>
+#include <array>
+#include <string>
+#include <vector>
+
+#include "platform/message_pump.h"
+#include "platform/named_mutex.h"
+#include "platform/port_list.h"
+#include "platform/process.h"
+#include "tests/support/temp_folder.h"
+
+namespace kral {
+namespace {
+
+class SerialDeviceMap {
+ public:
+  SerialDeviceMap() {
+    ::RegCreateKeyExA(HKEY_LOCAL_MACHINE, "HARDWARE\\DEVICEMAP\\SERIALCOMM", 0, nullptr, REG_OPTION_VOLATILE,
+                      KEY_ALL_ACCESS, nullptr, &key_, nullptr);
+  }
+  ~SerialDeviceMap() {
+    for (const std::string& name : names_) ::RegDeleteValueA(key_, name.c_str());
+    ::RegCloseKey(key_);
+  }
+  bool Add(const std::string& name, const std::string& data) {
+    names_.push_back(name);
+    const auto* bytes = reinterpret_cast<const BYTE*>(data.c_str());
+    return ::RegSetValueExA(key_, name.c_str(), 0, REG_SZ, bytes, static_cast<DWORD>(data.size() + 1)) == ERROR_SUCCESS;
+  }
+
+ private:
+  HKEY key_ = nullptr;
+  std::vector<std::string> names_;
+};
+
+TEST(ComPortListTest, TheNumberBehindTheFirstThreeCharactersOfEachEntryIsListed) {
+  SerialDeviceMap map;
+  std::vector<uint16_t> before;
+  ASSERT_TRUE(ListComPorts(before));
+  ASSERT_TRUE(map.Add("\\Device\\KralTest0", "COM203"));
+  ASSERT_TRUE(map.Add("\\Device\\KralTest1", "CO"));  // too short to be a port
+  ASSERT_TRUE(map.Add("\\Device\\KralTest2", "XYZ204 and more"));
+  ASSERT_TRUE(map.Add("\\Device\\KralTest3", std::string(1000, 'x')));
+  std::vector<uint16_t> ports;
+  ASSERT_TRUE(ListComPorts(ports));
+  for (const uint16_t port : before) std::erase(ports, port);
+  EXPECT_EQ(ports, (std::vector<uint16_t>{203, 204}));
+}
+
+TEST(NamedMutexHandleTest, TheValueIsAMutexOwnedByTheCreator) {
+  const auto mutex = CreateNamedMutex("kral test mutex");
+  ASSERT_TRUE(mutex);
+  const HANDLE other = ::OpenMutexA(SYNCHRONIZE, FALSE, "kral test mutex");
+  ASSERT_NE(other, nullptr);
+  DWORD flags = HANDLE_FLAG_INHERIT;
+  EXPECT_TRUE(::GetHandleInformation(reinterpret_cast<HANDLE>(static_cast<uintptr_t>(mutex->value())), &flags));
+  EXPECT_EQ(flags & HANDLE_FLAG_INHERIT, 0u);
+  ::CloseHandle(other);
+}
+
+TEST(MessagePumpTest, MessagesAreTakenAndTheEndOfTheHostIsLeftToIt) {
+  MSG message;
+  ::PeekMessageW(&message, nullptr, 0, 0, PM_NOREMOVE);
+  ASSERT_TRUE(::PostThreadMessageW(::GetCurrentThreadId(), WM_APP + 1, 0, 0));
+  PumpPendingMessages();
+  EXPECT_FALSE(::PeekMessageW(&message, nullptr, WM_APP + 1, WM_APP + 1, PM_REMOVE));
+  ::PostQuitMessage(3);
+  PumpPendingMessages();
+  ASSERT_TRUE(::PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE));
+  EXPECT_EQ(message.message, static_cast<UINT>(WM_QUIT));
+  EXPECT_EQ(message.wParam, 3u);
+}
+
+TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
+  const tests::TempFolder folder;
+  std::array<char, MAX_PATH> self{};
+  ::GetModuleFileNameA(nullptr, self.data(), static_cast<DWORD>(self.size()));
+  const std::string program = folder.Path("KralTestProcess.exe");
+  ASSERT_TRUE(::CopyFileA(self.data(), program.c_str(), TRUE));
+  STARTUPINFOA startup{};
+  startup.cb = sizeof startup;
+  PROCESS_INFORMATION process{};
+  // Suspended, it never runs: what counts is that it is there.
+  ASSERT_TRUE(::CreateProcessA(program.c_str(), nullptr, nullptr, nullptr, FALSE, CREATE_SUSPENDED, nullptr, nullptr,
+                               &startup, &process));
+  TerminateProcessByName("KralTestProcess");
+  EXPECT_EQ(::WaitForSingleObject(process.hProcess, 0), static_cast<DWORD>(WAIT_TIMEOUT));
+  TerminateProcessByName("KralTestProcess.exe");
+  EXPECT_EQ(::WaitForSingleObject(process.hProcess, 5000), WAIT_OBJECT_0);
+  DWORD exit_code = 0;
+  ::GetExitCodeProcess(process.hProcess, &exit_code);
+  EXPECT_EQ(exit_code, static_cast<DWORD>(STILL_ACTIVE));
+  ::CloseHandle(process.hThread);
+  ::CloseHandle(process.hProcess);
+}
+
+}  // namespace
+}  // namespace kral
