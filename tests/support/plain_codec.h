@@ -3,14 +3,17 @@
 #ifndef KRAL_TESTS_SUPPORT_PLAIN_CODEC_H
 #define KRAL_TESTS_SUPPORT_PLAIN_CODEC_H
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <random>
+#include <utility>
 #include <vector>
 
 namespace kral::test {
 
 using Bytes = std::vector<uint8_t>;
+using Packets = std::vector<Bytes>;
 
 // A shift register fed one bit at a time.
 inline uint16_t PlainFcs(const uint8_t* data, size_t bits) {
@@ -46,6 +49,54 @@ inline Bytes PlainFrame(const Bytes& payload, bool leading_flag = false) {
   frame.push_back(0x7E);
   return frame;
 }
+
+// The splitter once more, one byte after the other, with what it would count.
+class PlainDeframer {
+ public:
+  void Feed(const Bytes& chunk) {
+    for (const uint8_t byte : chunk) Take(byte);
+    const bool zeros = std::all_of(packet_.begin(), packet_.end(), [](uint8_t byte) { return byte == 0; });
+    if (zeros) packet_.clear();
+  }
+
+  Packets packets;
+  uint64_t bad_fcs = 0;
+  uint64_t oversized = 0;
+
+ private:
+  void Take(uint8_t byte) {
+    if (byte == 0x7D) {
+      escape_ = true;
+    } else if (byte == 0x7E) {
+      if (!packet_.empty()) End();
+      packet_.clear();
+    } else {
+      if (std::exchange(escape_, false)) byte ^= 0x20;
+      if (packet_.size() == 4094) {
+        ++oversized;
+        packet_.clear();
+      } else {
+        packet_.push_back(byte);
+      }
+    }
+  }
+
+  void End() {
+    const uint8_t code = packet_[0];
+    if (code == 0x92) return;
+    const bool unchecked = code == 0x10 || code == 0x1F || code == 0x60 || code == 0x79;
+    if (!unchecked && packet_.size() >= 4094) {
+      ++oversized;
+    } else if (!unchecked && PlainFcs(packet_.data(), packet_.size() * 8) != 0x0F47) {
+      ++bad_fcs;
+    } else {
+      packets.push_back(packet_);
+    }
+  }
+
+  Bytes packet_;
+  bool escape_ = false;
+};
 
 // Random bytes of which about one in `one_special_in` is a flag or an escape byte.
 inline Bytes RandomBytes(std::mt19937& random, size_t size, unsigned one_special_in) {

@@ -14,9 +14,9 @@ namespace kral {
 namespace {
 
 using test::Bytes;
+using test::Packets;
 using test::PlainFrame;
 using test::WithFcs;
-using Packets = std::vector<Bytes>;
 using Lines = test::LogLines::Lines;
 
 struct Collector : PacketListener {
@@ -29,53 +29,6 @@ Bytes Joined(std::initializer_list<Bytes> parts) {
   for (const Bytes& part : parts) joined.insert(joined.end(), part.begin(), part.end());
   return joined;
 }
-
-// The splitter once more, one byte after the other, with what it would count.
-class PlainDeframer {
- public:
-  void Feed(const Bytes& chunk) {
-    for (const uint8_t byte : chunk) Take(byte);
-    if (!packet_.empty() && std::count(packet_.begin(), packet_.end(), 0) == std::ssize(packet_)) packet_.clear();
-  }
-
-  Packets packets;
-  uint64_t bad_fcs = 0;
-  uint64_t oversized = 0;
-
- private:
-  void Take(uint8_t byte) {
-    if (byte == 0x7D) {
-      escape_ = true;
-    } else if (byte == 0x7E) {
-      if (!packet_.empty()) End();
-      packet_.clear();
-    } else {
-      if (std::exchange(escape_, false)) byte ^= 0x20;
-      if (packet_.size() == 4094) {
-        ++oversized;
-        packet_.clear();
-      } else {
-        packet_.push_back(byte);
-      }
-    }
-  }
-
-  void End() {
-    const uint8_t code = packet_[0];
-    if (code == 0x92) return;
-    const bool unchecked = code == 0x10 || code == 0x1F || code == 0x60 || code == 0x79;
-    if (!unchecked && packet_.size() >= 4094) {
-      ++oversized;
-    } else if (!unchecked && test::PlainFcs(packet_.data(), packet_.size() * 8) != 0x0F47) {
-      ++bad_fcs;
-    } else {
-      packets.push_back(packet_);
-    }
-  }
-
-  Bytes packet_;
-  bool escape_ = false;
-};
 
 class HdlcDeframerTest : public testing::Test {
  protected:
@@ -211,9 +164,9 @@ TEST_F(HdlcDeframerTest, DeliversWithoutALog) {
 TEST_F(HdlcDeframerTest, AgreesWithPlainCodeOnAnyStreamInAnyChunks) {
   deframer_.SetLogger(nullptr);
   std::mt19937 random(50);
-  PlainDeframer plain;
+  test::PlainDeframer plain;
   uint64_t delivered = 0;
-  for (int round = 0; round < 3000; ++round) {
+  for (int round = 0; round < 1000; ++round) {
     Bytes stream;
     const unsigned one_special_in = 1U << (random() % 9);
     for (size_t part = random() % 6; part > 0; --part) {
@@ -235,9 +188,9 @@ TEST_F(HdlcDeframerTest, AgreesWithPlainCodeOnAnyStreamInAnyChunks) {
       at += size;
     }
   }
-  EXPECT_GT(delivered, 3000U);
-  EXPECT_GT(plain.bad_fcs, 1000U);
-  EXPECT_GT(plain.oversized, 20U);
+  EXPECT_GT(delivered, 1000U);
+  EXPECT_GT(plain.bad_fcs, 300U);
+  EXPECT_GT(plain.oversized, 7U);
 }
 
 }  // namespace
