@@ -5,12 +5,13 @@
 //
 //   G^64 = x^1024 + x^768 + x^320 + 1, so that x^1024 leaves the same remainder as x^768 + x^320 + 1.
 //
-// An 8-byte word stands for itself times x^(64 x words behind it), and 1024, 768 and 320 are 16, 12 and 5 words. Word i
-// may thus be removed if it is XORed into the words 16 - 12 = 4, 16 - 5 = 11 and 16 - 0 = 16 places behind it. No
-// multiplication and no table takes part, and two words are handled at once.
+// An 8-byte word counts as itself times x^64 for each word behind it, and 1024, 768 and 320 bits are 16, 12 and 5
+// words. So a word may be removed if it is XORed into the words 16 - 12 = 4, 16 - 5 = 11 and 16 - 0 = 16 places later:
+// neither a multiplication nor a table takes part. Words are handled in pairs, with vectors that any compiler target
+// can do.
 //
-// Nothing here depends on where a message begins: zeros in front of it change no remainder, and the initial value is
-// XORed into its first two bytes.
+// Where a message begins does not matter: zeros in front of it change no remainder. A check value computed so far
+// counts as if it were XORed into the next two bytes; so does the initial value.
 #include "transport/fcs16.h"
 
 #include <array>
@@ -91,13 +92,13 @@ WordPair Load(const uint8_t* data) {
   return pair;
 }
 
-// The words at the odd places before and behind a pair's border: the second of one and the first of the next.
+// The two words around the border between two pairs: the second of one and the first of the next.
 WordPair Straddle(WordPair pair, WordPair next) {
   return __builtin_shufflevector(pair, next, 1, 2);
 }
 
-// A word takes up the words 4, 11 and 16 places before it, which is 2, 5 1/2 and 8 pairs. The pair 8 before is the one
-// whose place in the window it takes.
+// Each word takes up the words 4, 11 and 16 places before it. For pairs these are the pair 2 before; the words between
+// the pairs 6 and 5 before; and the pair 8 before, the one whose place in the window the new pair takes.
 template <size_t... I>
 void FoldWindow(Window& w, const uint8_t* data, std::index_sequence<I...>) {
   ((w[I] ^= Load(data + I * sizeof(WordPair)) ^ w[(I + kPairs - 2) % kPairs] ^
@@ -105,7 +106,8 @@ void FoldWindow(Window& w, const uint8_t* data, std::index_sequence<I...>) {
    ...);
 }
 
-// The last 16 words stay, so what they took up from each other comes out again: last first, from unchanged words.
+// The last 16 words are not removed, so what they took up from each other comes out again: the last pair first, so that
+// those before it are still as they were taken up.
 void UndoWithin(Window& w) {
   constexpr WordPair kNone = {0, 0};
   for (size_t i = kPairs - 1; i >= 2; --i) {

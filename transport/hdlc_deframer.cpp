@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <bit>
-#include <utility>
 
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
@@ -31,6 +30,52 @@ void LogPacket(DataLogFileHandler* log, uint32_t flag, const char* format, std::
   log->WriteLine(flag, format, static_cast<int>(packet.size()), HexDump(packet).c_str());
 }
 
+// Where unstuffing is; whole in registers.
+struct Cursor {
+  const uint8_t* in;
+  uint8_t* out;
+  bool escape;
+};
+
+// One byte that is not a flag, without a branch: behind an escape byte `out` stays and is written again.
+void TakeByte(Cursor& at) {
+  const uint8_t byte = *at.in++;
+  *at.out = at.escape ? byte ^ kEscapeBit : byte;
+  at.escape = byte == kFrameEscape;
+  at.out += at.escape ? 0 : 1;
+}
+
+// Takes whole blocks of up to `room` bytes, and ends with the first that holds a flag or an escape byte; true when a
+// flag is next. No escape is pending at the start, and there is room for a block.
+//
+// Blocks are copied whole and what should not have been is written again. A lone escape byte is jumped over; where they
+// stand close, jumping from one to the next would cost more than going byte by byte.
+bool TakeBlocks(Cursor& at, size_t room) {
+  uint32_t flags = 0;
+  uint32_t escapes = 0;
+  for (;; at.in += ByteBlock::kSize, at.out += ByteBlock::kSize, room -= ByteBlock::kSize) {
+    if (room < ByteBlock::kSize) return false;
+    const ByteBlock block = ByteBlock::Load(at.in);
+    block.Store(at.out);
+    flags = block.Find(kFrameFlag);
+    escapes = block.Find(kFrameEscape);
+    if ((flags | escapes) != 0) break;
+  }
+  const uint32_t until_flag = flags != 0 ? static_cast<uint32_t>(std::countr_zero(flags)) : ByteBlock::kSize;
+  escapes &= (1U << until_flag) - 1U;
+  const uint32_t before = escapes != 0 ? static_cast<uint32_t>(std::countr_zero(escapes)) : until_flag;
+  if (HasSingleBit(escapes) && before + 1 < until_flag) {
+    at.in += before + 1;
+    at.out += before;
+    *at.out++ = *at.in++ ^ kEscapeBit;
+    return false;
+  }
+  at.in += before;
+  at.out += before;
+  for (uint32_t i = before; i < until_flag; ++i) TakeByte(at);
+  return flags != 0;
+}
+
 }  // namespace
 
 void HdlcDeframer::Feed(std::span<const uint8_t> chunk) {
@@ -55,51 +100,26 @@ void HdlcDeframer::Feed(std::span<const uint8_t> chunk) {
 
 // Appends bytes to the packet up to the next flag, or the byte that finds the packet full, or the end of the chunk.
 // Gives where it stopped.
-//
-// Blocks are copied whole as long as they hold nothing special, and up to a flag. A lone escape byte is jumped over;
-// where they stand close, the bytes go one by one without a branch.
 const uint8_t* HdlcDeframer::Unstuff(const uint8_t* in, const uint8_t* end) {
-  uint8_t* out = packet_.data() + length_;
+  Cursor at{in, packet_.data() + length_, escape_pending_};
   uint8_t* const full = packet_.data() + kMaximumLength;
-  bool escape = escape_pending_;
   for (;;) {
-    while (!escape && static_cast<size_t>(end - in) >= ByteBlock::kSize &&
-           static_cast<size_t>(full - out) >= ByteBlock::kSize) {
-      const ByteBlock block = ByteBlock::Load(in);
-      block.Store(out);
-      const uint32_t flags = block.Find(kFrameFlag);
-      const uint32_t until_flag = flags != 0 ? static_cast<uint32_t>(std::countr_zero(flags)) : ByteBlock::kSize;
-      const uint32_t escapes = block.Find(kFrameEscape) & ((1U << until_flag) - 1U);
-      const uint32_t plain = static_cast<uint32_t>(std::countr_zero(escapes));
-      if (escapes == 0) {
-        in += until_flag;
-        out += until_flag;
-        if (flags != 0) break;
-      } else if (std::has_single_bit(escapes) && plain + 1 < until_flag) {
-        out[plain] = in[plain + 1] ^ kEscapeBit;
-        in += plain + 2;
-        out += plain + 1;
-      } else {
-        for (const uint8_t* const stop = in + until_flag; in != stop; ++in) {
-          *out = escape ? *in ^ kEscapeBit : *in;
-          escape = *in == kFrameEscape;
-          out += escape ? 0 : 1;
-        }
-      }
+    while (!at.escape) {
+      const size_t room = static_cast<size_t>(std::min(end - at.in, full - at.out));
+      if (room < ByteBlock::kSize || TakeBlocks(at, room)) break;
     }
-    if (in == end || *in == kFrameFlag) break;
-    if (*in == kFrameEscape) {
-      escape = true;
+    if (at.in == end || *at.in == kFrameFlag) break;
+    if (*at.in == kFrameEscape) {
+      at.escape = true;
+      ++at.in;
     } else {
-      const bool was_escape = std::exchange(escape, false);
-      if (out == full) break;
-      *out++ = was_escape ? *in ^ kEscapeBit : *in;
+      if (at.out == full) break;
+      TakeByte(at);
     }
-    ++in;
   }
-  length_ = static_cast<size_t>(out - packet_.data());
-  escape_pending_ = escape;
-  return in;
+  length_ = static_cast<size_t>(at.out - packet_.data());
+  escape_pending_ = at.escape;
+  return at.in;
 }
 
 void HdlcDeframer::DropPartial() {

@@ -32,7 +32,7 @@ uint8_t* Stuff(std::span<const uint8_t> bytes, uint8_t* out) {
     if (special == 0) {
       in += ByteBlock::kSize;
       out += ByteBlock::kSize;
-    } else if (std::has_single_bit(special)) {
+    } else if (HasSingleBit(special)) {
       const int before = std::countr_zero(special);
       out = StuffByte(in[before], out + before);
       in += before + 1;
