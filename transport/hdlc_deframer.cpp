@@ -159,6 +159,7 @@ void HdlcDeframer::DropOverrun() {
                     static_cast<int>(kMaximumLength));
   }
   length_ = 0;
+  escape_pending_ = false;  // it belonged to the byte that is lost
 }
 
 // A handset that starts up, or a line that idles low, sends zeros: an unfinished packet of nothing else is noise.
