@@ -196,6 +196,7 @@ bool ComPort::WaitReadable(uint32_t milliseconds) {
   using std::chrono::steady_clock;
   const auto deadline = steady_clock::now() + std::chrono::milliseconds(milliseconds);
   auto left = static_cast<DWORD>(milliseconds);
+  if (InputWaiting() > 0) return true;
   while (!gone_) {
     switch (pending_.Wait(wake_.get(), left)) {
       case PendingRead::Outcome::kReceived:
