@@ -9,8 +9,7 @@
 #include "kral/text_log.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
-#include "tests/support/temp_folder.h"
-#include "tests/support/text_lines.h"
+#include "tests/support/temporary_folder.h"
 
 namespace kral {
 namespace {
@@ -20,20 +19,20 @@ using Lines = std::vector<std::string>;
 class TextLogExports : public testing::Test {
  protected:
   static std::string Body(const std::string& line) { return line.substr(line.find('\t') + 2); }
-  Lines Bodies(const std::string& name) const {
-    Lines lines = tests::TextLines(folder_.Content(name));
+  Lines Bodies(std::string_view name) const {
+    Lines lines = folder_.Lines(name);
     for (auto& line : lines) line = Body(line);
     return lines;
   }
 
   test::HandsetPorts ports_;
-  tests::TempFolder folder_;
+  test::TemporaryFolder folder_;
   const KRAL_HANDLE handle_ = KRAL_ConnectServer(3);
 };
 
 TEST_F(TextLogExports, StartStopAndWhatStandsBetween) {
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 0);
-  EXPECT_EQ(KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str()), 1);
+  EXPECT_EQ(KRAL_StartLogging(handle_, folder_.File("log.txt").c_str()), 1);
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 1);
   EXPECT_EQ(KRAL_AddUserMessageToTextLog(handle_, KRAL_LOG_ERR, "100%s", 0), 1);
   EXPECT_EQ(KRAL_StopLogging(handle_), 1);
@@ -55,7 +54,7 @@ TEST_F(TextLogExports, FormattedLinesNeedAStartedLogAndPlainOnesOnlyTheMask) {
   LogName(handle_, "plain");
   LogFormatted(handle_, "formatted %d", 1);
   EXPECT_EQ(log.Take(), Lines{"512 plain"});
-  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
   KRAL_StopLogging(handle_);
   log.Take();
   LogFormatted(handle_, "formatted %d", 2);
@@ -63,7 +62,7 @@ TEST_F(TextLogExports, FormattedLinesNeedAStartedLogAndPlainOnesOnlyTheMask) {
 }
 
 TEST_F(TextLogExports, LongFormattedLineIsCut) {
-  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
   LogFormatted(handle_, "%s", std::string(20000, 'm').c_str());
   EXPECT_EQ(Bodies("log.txt").back(), "LOG_C_HIGH_LEVEL_START," + std::string(8015, 'm'));
 }
@@ -80,7 +79,7 @@ TEST_F(TextLogExports, SetLogFlagsIsToldUnderTheMaskBefore) {
 
 TEST_F(TextLogExports, DisconnectStopsTheLog) {
   KRAL_ConnectServer(3);
-  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
   KRAL_DisconnectServer(handle_);
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 0);
   const auto lines = Bodies("log.txt");
