@@ -28,6 +28,7 @@ struct Identity {
   std::string software_revision = "VHS-1.0.105-R2";
   std::string model = "VH-1";
 
+  // Taken over when the handset is made: NV item 0, and what request 65 compares with.
   uint32_t serial_number = 0x80C0FFEE;
   std::string service_code = "000000";  // six digits
 };

@@ -69,6 +69,8 @@ class CKralThreadInterface {
   bool SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
 
   bool SetPacketMode(uint32_t mode);
+  // Whether that change is the handset's as well as ours.
+  bool NeedsPhoneFor(uint32_t mode) const;
   PacketMode packet_mode() const { return splitter_.mode(); }
   bool FlushRxBuffer();
   // The liveness check asks with code 4 whether the connection counts as alive without an answer: it does not, 0.
@@ -100,7 +102,6 @@ class CKralThreadInterface {
                      uint8_t expected_code, uint32_t time_out_ms);
   bool PollRecord(uint8_t* response, uint16_t& response_size, uint32_t time_out_ms);
   void TimedOut(std::span<const uint8_t> request);
-  bool SwitchPhoneMode(PacketMode from, PacketMode to);
   bool AskForUnframedMode();
   bool ReturnToFramedMode();
 

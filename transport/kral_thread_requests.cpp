@@ -152,19 +152,19 @@ bool CKralThreadInterface::SetPacketMode(uint32_t mode) {
     if (log_) log_->WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
     return false;
   }
-  const auto wanted = static_cast<PacketMode>(mode);
-  if (!SwitchPhoneMode(packet_mode(), wanted)) return false;
+  if (NeedsPhoneFor(mode) && !(mode == 0 ? ReturnToFramedMode() : AskForUnframedMode())) return false;
   framer_.SetRawDataFlag(mode);
-  splitter_.SetMode(wanted);
+  splitter_.SetMode(static_cast<PacketMode>(mode));
   if (log_) log_->WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
   return true;
 }
 
-// Only between these two modes has the handset a say.
-bool CKralThreadInterface::SwitchPhoneMode(PacketMode from, PacketMode to) {
-  if (from == PacketMode::kFramed && to == PacketMode::kUnframed1) return AskForUnframedMode();
-  if (from == PacketMode::kUnframed1 && to == PacketMode::kFramed) return ReturnToFramedMode();
-  return true;
+// Only between the framed and the first unframed mode.
+bool CKralThreadInterface::NeedsPhoneFor(uint32_t mode) const {
+  const auto from = packet_mode();
+  const auto to = static_cast<PacketMode>(mode);
+  return (from == PacketMode::kFramed && to == PacketMode::kUnframed1) ||
+         (from == PacketMode::kUnframed1 && to == PacketMode::kFramed);
 }
 
 bool CKralThreadInterface::AskForUnframedMode() {

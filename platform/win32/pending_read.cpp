@@ -45,7 +45,10 @@ PendingRead::Outcome PendingRead::Wait(HANDLE wake, DWORD milliseconds) {
 DWORD PendingRead::Start() {
   if (under_way_ || received_) return ERROR_SUCCESS;
   if (!ended_.valid()) return ERROR_INVALID_HANDLE;
-  if (const DWORD error = ApplyWaitingTimeOuts(port_)) return error;
+  if (!prepared_) {
+    if (const DWORD error = ApplyWaitingTimeOuts(port_)) return error;
+    prepared_ = true;
+  }
   overlapped_ = {};
   overlapped_.hEvent = ended_.get();
   ::ResetEvent(ended_.get());

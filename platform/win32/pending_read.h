@@ -41,6 +41,7 @@ class PendingRead {
   std::mutex mutex_;
   OVERLAPPED overlapped_{};
   uint8_t byte_ = 0;
+  bool prepared_ = false;  // from the first wait on, the port's time-outs are those for waiting
   bool under_way_ = false;
   bool received_ = false;
 };

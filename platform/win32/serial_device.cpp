@@ -196,6 +196,7 @@ bool ComPort::WaitReadable(uint32_t milliseconds) {
   using std::chrono::steady_clock;
   const auto deadline = steady_clock::now() + std::chrono::milliseconds(milliseconds);
   auto left = static_cast<DWORD>(milliseconds);
+  if (InputWaiting() > 0) return true;
   while (!gone_) {
     switch (pending_.Wait(wake_.get(), left)) {
       case PendingRead::Outcome::kReceived:
@@ -210,7 +211,7 @@ bool ComPort::WaitReadable(uint32_t milliseconds) {
     }
     const auto rest = std::chrono::ceil<std::chrono::milliseconds>(deadline - steady_clock::now()).count();
     left = static_cast<DWORD>(std::clamp<int64_t>(rest, 0, milliseconds));
-    if (left == 0 && milliseconds != 0) return false;
+    if (left == 0) return false;
   }
   ::WaitForSingleObject(wake_.get(), left);
   return false;

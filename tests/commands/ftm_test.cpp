@@ -10,7 +10,7 @@
 #include "frame/resource_manager.h"
 #include "tests/support/ftm_command_rows.h"
 #include "tests/support/ftm_fixture.h"
-#include "tests/support/temporary_folder.h"
+#include "tests/support/temp_folder.h"
 
 namespace kral {
 namespace {
@@ -191,8 +191,8 @@ TEST_F(FtmTest, SettingsAreKeptPerHandleAndSendNothing) {
 }
 
 TEST_F(FtmTest, ModeIdsAreLoggedWithTheirNames) {
-  test::TemporaryFolder folder;
-  ASSERT_EQ(KRAL_StartLogging(handle(), folder.File("ftm.log").c_str()), 1);
+  test::TempFolder folder;
+  ASSERT_EQ(KRAL_StartLogging(handle(), folder.Path("ftm.log").c_str()), 1);
   struct Row {
     uint16_t id;
     const char* set;

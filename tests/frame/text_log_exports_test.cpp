@@ -9,7 +9,8 @@
 #include "kral/text_log.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
-#include "tests/support/temporary_folder.h"
+#include "tests/support/temp_folder.h"
+#include "tests/support/text_lines.h"
 
 namespace kral {
 namespace {
@@ -19,20 +20,20 @@ using Lines = std::vector<std::string>;
 class TextLogExports : public testing::Test {
  protected:
   static std::string Body(const std::string& line) { return line.substr(line.find('\t') + 2); }
-  Lines Bodies(std::string_view name) const {
-    Lines lines = folder_.Lines(name);
+  Lines Bodies(const std::string& name) const {
+    Lines lines = tests::TextLines(folder_.Content(name));
     for (auto& line : lines) line = Body(line);
     return lines;
   }
 
   test::HandsetPorts ports_;
-  test::TemporaryFolder folder_;
+  tests::TempFolder folder_;
   const KRAL_HANDLE handle_ = KRAL_ConnectServer(3);
 };
 
 TEST_F(TextLogExports, StartStopAndWhatStandsBetween) {
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 0);
-  EXPECT_EQ(KRAL_StartLogging(handle_, folder_.File("log.txt").c_str()), 1);
+  EXPECT_EQ(KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str()), 1);
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 1);
   EXPECT_EQ(KRAL_AddUserMessageToTextLog(handle_, KRAL_LOG_ERR, "100%s", 0), 1);
   EXPECT_EQ(KRAL_StopLogging(handle_), 1);
@@ -54,7 +55,7 @@ TEST_F(TextLogExports, FormattedLinesNeedAStartedLogAndPlainOnesOnlyTheMask) {
   LogName(handle_, "plain");
   LogFormatted(handle_, "formatted %d", 1);
   EXPECT_EQ(log.Take(), Lines{"512 plain"});
-  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
   KRAL_StopLogging(handle_);
   log.Take();
   LogFormatted(handle_, "formatted %d", 2);
@@ -62,7 +63,7 @@ TEST_F(TextLogExports, FormattedLinesNeedAStartedLogAndPlainOnesOnlyTheMask) {
 }
 
 TEST_F(TextLogExports, LongFormattedLineIsCut) {
-  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
   LogFormatted(handle_, "%s", std::string(20000, 'm').c_str());
   EXPECT_EQ(Bodies("log.txt").back(), "LOG_C_HIGH_LEVEL_START," + std::string(8015, 'm'));
 }
@@ -79,7 +80,7 @@ TEST_F(TextLogExports, SetLogFlagsIsToldUnderTheMaskBefore) {
 
 TEST_F(TextLogExports, DisconnectStopsTheLog) {
   KRAL_ConnectServer(3);
-  KRAL_StartLogging(handle_, folder_.File("log.txt").c_str());
+  KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
   KRAL_DisconnectServer(handle_);
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 0);
   const auto lines = Bodies("log.txt");

@@ -3,6 +3,7 @@
 
 #include <array>
 #include <cstring>
+#include <filesystem>
 #include <string>
 #include <vector>
 
@@ -10,7 +11,8 @@
 #include "frame/base/text_log.h"
 #include "frame/base/text_log_format.h"
 #include "tests/support/fake_clock.h"
-#include "tests/support/temporary_folder.h"
+#include "tests/support/temp_folder.h"
+#include "tests/support/text_lines.h"
 
 namespace kral {
 namespace {
@@ -36,9 +38,11 @@ class TextLog : public testing::Test {
   // The line without its time stamp and the comma behind that.
   static std::string Body(const std::string& line) { return line.substr(line.find('\t') + 2); }
 
+  std::vector<std::string> FileLines(const std::string& name) const { return tests::TextLines(folder_.Content(name)); }
+
   static inline TextLog* current_ = nullptr;
   test::FakeClock clock_;
-  test::TemporaryFolder folder_;
+  tests::TempFolder folder_;
   DataLogFileHandler log_{clock_};
   std::vector<Record> records_;
 };
@@ -76,9 +80,9 @@ const Category kCategories[] = {
 
 TEST_F(TextLog, LinesShowTheNameOfTheLowestBitAndTheIndentationOfTheWholeFlag) {
   log_.SetFlags(0xFFFFFFFF);
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   for (const auto& category : kCategories) log_.WriteLine(category.flag, "x");
-  const auto lines = folder_.Lines("log.txt");
+  const auto lines = FileLines("log.txt");
   ASSERT_EQ(lines.size(), std::size(kCategories));
   for (size_t i = 0; i < lines.size(); ++i) EXPECT_EQ(Body(lines[i]), kCategories[i].line);
 }
@@ -94,28 +98,28 @@ TEST_F(TextLog, NothingIsWrittenBeforeAMaskIsSet) {
 }
 
 TEST_F(TextLog, StartActivatesTheStoredMask) {
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogIoAhdlc, "not in the default mask");
   log_.WriteLine(kLogIoAhdlc | kLogErr, "either bit will do");
   log_.SetFlags(kLogIoAhdlc);  // its own line is still under the old mask
   log_.WriteLine(kLogIoAhdlc, "now it is");
   log_.WriteLine(kLogErr, "and this is not");
   log_.Stop();
-  log_.Start(folder_.File("log2.txt").c_str());
+  log_.Start(folder_.Path("log2.txt").c_str());
   log_.WriteLine(kLogIoAhdlc, "later starts keep it");
 
-  const auto lines = folder_.Lines("log.txt");
+  const auto lines = FileLines("log.txt");
   ASSERT_EQ(lines.size(), 3u);
   EXPECT_EQ(Body(lines[0]), "LOG_ERR,either bit will do");
   EXPECT_EQ(Body(lines[1]), "LOG_FN,KRAL_SetLogFlags(uiLogFlags=0x0020)");
   EXPECT_EQ(Body(lines[2]), "LOG_IO_AHDLC,  now it is");
-  EXPECT_EQ(folder_.Lines("log2.txt").size(), 1u);
+  EXPECT_EQ(FileLines("log2.txt").size(), 1u);
 }
 
 TEST_F(TextLog, ClockStampIsMinutesSecondsAndMillisecondsAndATab) {
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogFn, "text");
-  const std::string line = folder_.Lines("log.txt").at(0);
+  const std::string line = FileLines("log.txt").at(0);
   ASSERT_EQ(line.substr(9), "\t,LOG_FN,text");
   const std::string stamp = line.substr(0, 9);
   for (size_t i = 0; i < stamp.size(); ++i) {
@@ -134,9 +138,9 @@ TEST_F(TextLog, RelativeStampCountsFromTheLastStop) {
   clock_.Advance(500);
   log_.Stop();
   clock_.Advance(42);
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogFn, "text");
-  EXPECT_EQ(folder_.Lines("log.txt").at(0), "42\t,LOG_FN,text");
+  EXPECT_EQ(FileLines("log.txt").at(0), "42\t,LOG_FN,text");
 }
 
 TEST_F(TextLog, RecordHoldsFlagMillisecondsAndText) {
@@ -156,52 +160,52 @@ TEST_F(TextLog, RecordHoldsFlagMillisecondsAndText) {
 
 TEST_F(TextLog, LongMessageReachesTheFileWholeAndTheCallbackCut) {
   const std::string message(2000, 'm');
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogFn, "%s", message.c_str());
-  EXPECT_EQ(Body(folder_.Lines("log.txt").at(0)), "LOG_FN," + message);
+  EXPECT_EQ(Body(FileLines("log.txt").at(0)), "LOG_FN," + message);
   EXPECT_EQ(Text(0), message.substr(0, 999));
   EXPECT_EQ(records_[0][1007], 0);
 }
 
 TEST_F(TextLog, MessageLongerThanTheBufferIsCut) {
   log_.SetFlags(0xFFFFFFFF);
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogIoDev, "%s", std::string(20000, 'm').c_str());
-  EXPECT_EQ(Body(folder_.Lines("log.txt").at(0)), "LOG_IO_DEV,    " + std::string(12295 - 4, 'm'));
+  EXPECT_EQ(Body(FileLines("log.txt").at(0)), "LOG_IO_DEV,    " + std::string(12295 - 4, 'm'));
 }
 
 TEST_F(TextLog, FileIsOpenedByTheFirstLineOnly) {
-  folder_.Write("log.txt", "what was there\n");
-  log_.Start(folder_.File("log.txt").c_str());
-  EXPECT_EQ(folder_.Lines("log.txt").at(0), "what was there");
+  folder_.Add("log.txt", "what was there\n");
+  log_.Start(folder_.Path("log.txt").c_str());
+  EXPECT_EQ(FileLines("log.txt").at(0), "what was there");
   log_.WriteLine(kLogFn, "first");
-  ASSERT_EQ(folder_.Lines("log.txt").size(), 1u);
-  EXPECT_EQ(Body(folder_.Lines("log.txt")[0]), "LOG_FN,first");
+  ASSERT_EQ(FileLines("log.txt").size(), 1u);
+  EXPECT_EQ(Body(FileLines("log.txt")[0]), "LOG_FN,first");
 }
 
 TEST_F(TextLog, SecondStartFinishesTheOldFileAndTruncatesTheNewOne) {
-  const std::string second = folder_.File("second.txt");
-  folder_.Write("second.txt", "what was there\n");
-  log_.Start(folder_.File("first.txt").c_str());
+  const std::string second = folder_.Path("second.txt");
+  folder_.Add("second.txt", "what was there\n");
+  log_.Start(folder_.Path("first.txt").c_str());
   log_.WriteLine(kLogFn, "one");
   log_.Start(second.c_str());
   log_.WriteLine(kLogFn, "two");
 
-  const auto first = folder_.Lines("first.txt");
+  const auto first = FileLines("first.txt");
   ASSERT_EQ(first.size(), 3u);
   EXPECT_EQ(Body(first[1]), "LOG_FN,KRAL_StartLogging( sLogFile = " + second + ")");
   EXPECT_EQ(Body(first[2]).size(), std::strlen("LOG_FN,2024-05-31, 23:59:01"));
-  ASSERT_EQ(folder_.Lines("second.txt").size(), 1u);
-  EXPECT_EQ(Body(folder_.Lines("second.txt")[0]), "LOG_FN,two");
+  ASSERT_EQ(FileLines("second.txt").size(), 1u);
+  EXPECT_EQ(Body(FileLines("second.txt")[0]), "LOG_FN,two");
 
   log_.Start(second.c_str());
   log_.WriteLine(kLogFn, "three");
-  ASSERT_EQ(folder_.Lines("second.txt").size(), 1u) << "the same name is truncated too";
-  EXPECT_EQ(Body(folder_.Lines("second.txt")[0]), "LOG_FN,three");
+  ASSERT_EQ(FileLines("second.txt").size(), 1u) << "the same name is truncated too";
+  EXPECT_EQ(Body(FileLines("second.txt")[0]), "LOG_FN,three");
 }
 
 TEST_F(TextLog, StopClosesTheFileButNotTheCallback) {
-  log_.Start(folder_.File("log.txt").c_str());
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogFn, "before");
   EXPECT_TRUE(log_.started_result());
   log_.Stop();
@@ -210,15 +214,15 @@ TEST_F(TextLog, StopClosesTheFileButNotTheCallback) {
   log_.WriteLine(kLogFn, "after");
   EXPECT_EQ(Text(records_.size() - 1), "after");
 
-  const auto lines = folder_.Lines("log.txt");
+  const auto lines = FileLines("log.txt");
   ASSERT_EQ(lines.size(), 2u);
   EXPECT_EQ(Body(lines[1]), "LOG_FN,KRAL_StopLogging()");
   std::error_code error;
-  EXPECT_TRUE(std::filesystem::remove(folder_.File("log.txt"), error)) << "the file is still open";
+  EXPECT_TRUE(std::filesystem::remove(folder_.Path("log.txt"), error)) << "the file is still open";
 }
 
 TEST_F(TextLog, FileThatCannotBeOpenedCostsTheCallbackNothing) {
-  log_.Start(folder_.File("no/such/folder/log.txt").c_str());
+  log_.Start(folder_.Path("no/such/folder/log.txt").c_str());
   log_.WriteLine(kLogFn, "text");
   EXPECT_EQ(Text(0), "text");
   EXPECT_TRUE(log_.started_result());

@@ -9,7 +9,7 @@
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/scripted_server.h"
-#include "tests/support/temporary_folder.h"
+#include "tests/support/temp_folder.h"
 
 namespace kral {
 namespace {
@@ -115,11 +115,11 @@ const StationFile kStationFiles[] = {
 };
 
 TEST_F(TimeOuts, StationFileSetsTheConnectDelay) {
-  const test::TemporaryFolder folder;
+  const tests::TempFolder folder;
   const auto home = std::filesystem::current_path();
-  std::filesystem::current_path(folder.path());
+  std::filesystem::current_path(std::filesystem::path(folder.Path("here")).parent_path());
   for (const auto& file : kStationFiles) {
-    folder.Write("WLANEVKConfig.txt", file.text);
+    folder.Add("WLANEVKConfig.txt", file.text);
     const KRAL_HANDLE handle = KRAL_ConnectServer(3);
     EXPECT_EQ(KRAL_GetTimeOut(handle, 1), file.liveness) << file.name;
     EXPECT_EQ(KRAL_GetTimeOut(handle, 2), file.server_connect) << file.name;

@@ -1,0 +1,169 @@
+/**
+ * @file transport.h
+ * Requests of the caller's own making, packet modes, and the lines of the port.
+ *
+ * Beside the rules of kral.h:
+ *
+ * - A request is framed by the library: flag bytes, escapes and FCS are not part of what is given here.
+ * - A closed port is opened again by the three send functions and by a packet mode that the handset must agree to;
+ *   the other functions give 0 while the port is closed.
+ * - One request of a handle is on its way at a time: a call waits until one of another thread has ended.
+ */
+#ifndef KRAL_TRANSPORT_H
+#define KRAL_TRANSPORT_H
+
+#include "kral/types.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/* --- Requests ----------------------------------------------------------------------------------------------------- */
+
+/**
+ * Sends a request and awaits the reply that begins with the request's first byte.
+ *
+ * Replies that came before are thrown away. The first reply decides: one with another first byte (a refusal, for
+ * example) fails the call at once, and is given out all the same, so that its reason can be read.
+ *
+ * @param         handle         from a connect function
+ * @param         request_size   1 to 16,381 bytes
+ * @param         request        command code first
+ * @param[in,out] response_size  in: bytes of room; out: bytes of the reply without its two FCS bytes, at most the room
+ * @param[out]    response       the reply, cut at the room; where there is room its FCS bytes follow. Written, as the
+ *                               size is, whenever a reply came; untouched when none did
+ * @param         time_out_ms    for the reply, after the request has been written
+ * @return 1 when the reply came; 0 also after the time-out, which closes the port
+ *
+ * Wait: the time-out, and time-out 7 for the writing.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SendSync(KRAL_HANDLE handle, uint16_t request_size, const uint8_t* request,
+                                         uint16_t* response_size, uint8_t* response, uint32_t time_out_ms);
+
+/**
+ * Sends a request and awaits nothing. What the handset answers stays in the response queue until the next request.
+ *
+ * @param handle        from a connect function
+ * @param request_size  1 to 16,381 bytes
+ * @param request       command code first
+ * @param time_out_ms   only told in the text log
+ * @param start_flag    1: a flag byte goes before the frame, whatever KRAL_SetStartFlag says
+ * @return 1 when the request was written; always 0 through a phone server
+ *
+ * Wait: time-out 7.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SendASync(KRAL_HANDLE handle, uint16_t request_size, const uint8_t* request,
+                                          uint32_t time_out_ms, uint8_t start_flag);
+
+/**
+ * Sends bytes as the packet mode has it and takes whatever packet comes next.
+ *
+ * In packet modes 1 and 2 a request that begins with "AT" lets the reply end with "OK" or "ERROR" instead of with the
+ * bytes that were read at once.
+ *
+ * @param         handle         from a connect function
+ * @param         request_size   1 to 16,381 bytes
+ * @param         request        framed in packet mode 0, written as it is in the others
+ * @param[in,out] response_size  in: bytes of room; out: bytes of the packet, FCS included where it has one, at most
+ *                               the room; untouched when nothing came
+ * @param[out]    response       the packet, cut at the room
+ * @param         time_out_ms    for the packet; a time-out leaves the port open
+ * @return 1 when a packet came. Through a phone server always 1, although nothing is sent
+ *
+ * Wait: the time-out, and time-out 7 for the writing.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SendRAW(KRAL_HANDLE handle, uint16_t request_size, const uint8_t* request,
+                                        uint16_t* response_size, uint8_t* response, uint32_t time_out_ms);
+
+/* --- Packets ------------------------------------------------------------------------------------------------------ */
+
+/**
+ * Lets every frame begin with a flag byte, or not (the default).
+ *
+ * @param handle      from a connect function
+ * @param start_flag  1: on; 0: off
+ * @return whether the setting was on before the call, not whether the call worked: 0 for the first call on a
+ *         connection. Always 0 through a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetStartFlag(KRAL_HANDLE handle, uint8_t start_flag);
+
+/**
+ * Chooses how packets are told apart on the port.
+ *
+ * Going from 0 to 1 asks the handset (command 68) and needs its consent; going from 1 to 0 brings its port back into
+ * diagnostic mode with an AT command. Every other change is made at once and the handset is not asked.
+ *
+ * @param handle  from a connect function
+ * @param mode    0: framed; 1 and 2: unframed, what is read at once is one packet; 3: each packet begins with its
+ *                length, big-endian in bytes 1 and 2
+ * @return 1 when the mode is set; always 0 through a phone server
+ *
+ * Wait: 80 ms from 0 to 1, about 500 ms from 1 to 0.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetPacketMode(KRAL_HANDLE handle, uint32_t mode);
+
+/**
+ * Throws away the bytes that wait in the port, and the packet of which only a part has been read.
+ *
+ * @return 1, or 0 while the port is closed
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_FlushRxBuffer(KRAL_HANDLE handle);
+
+/**
+ * Called for every packet of 2 to 4,096 bytes as it was de-framed, FCS bytes included, before it is put into a queue.
+ *
+ * Comes on a thread of the library and must not call functions that send requests. The bytes are valid during the
+ * call only. Packets wait while it runs.
+ *
+ * @param length  bytes of the packet
+ * @param bytes   the packet
+ * @param value   as given to KRAL_ConfigureCallBacks
+ */
+typedef void(KRAL_CALL* KRAL_RAW_PACKET_CALLBACK)(uint32_t length, const uint8_t* bytes, uintptr_t value);
+
+/**
+ * Sets the function that sees every packet.
+ *
+ * @param handle    from a connect function
+ * @param callback  replaces the former one; null: none. A call to the former one that is under way still ends
+ * @param value     handed to the callback
+ * @return 1, or 0 for an unknown handle
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCallBacks(KRAL_HANDLE handle, KRAL_RAW_PACKET_CALLBACK callback,
+                                                   uintptr_t value);
+
+/* --- The port ----------------------------------------------------------------------------------------------------- */
+
+/**
+ * Raises or clears the DTR line.
+ *
+ * @param handle  from a connect function
+ * @param state   0: clear; other values: raise
+ * @return 1 while the port is open, even when the line could not be changed; 0 through a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetDTR_State(KRAL_HANDLE handle, uint8_t state);
+
+/**
+ * Raises or clears the RTS line.
+ *
+ * @param handle  from a connect function
+ * @param state   0: clear; other values: raise
+ * @return 1 while a COM port is open, even when the line could not be changed; 0 on a caller's transport and through
+ *         a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetRTS_State(KRAL_HANDLE handle, uint8_t state);
+
+/**
+ * Limits how many bytes are given to the port's driver at a time (4,099 at first).
+ *
+ * @param handle  from a connect function
+ * @param bytes   at least 1
+ * @return 1, or 0 for a limit of 0 and through a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetSendDataSerialWriteSizeLimit(KRAL_HANDLE handle, uint32_t bytes);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

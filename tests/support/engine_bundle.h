@@ -1,0 +1,72 @@
+// A connection as a phone object holds it, without the phone object.
+#ifndef KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
+#define KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
+
+#include <chrono>
+#include <memory>
+#include <thread>
+#include <utility>
+
+#include "tests/support/log_lines.h"
+#include "transport/kral_event_listener.h"
+#include "transport/kral_events.h"
+#include "transport/kral_thread_interface.h"
+
+namespace kral::test {
+
+struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
+  static std::shared_ptr<EngineBundle> Make(DeviceOpener opener = {}, Clock& clock = SystemClock(),
+                                            uint32_t log_flags = 0xFFFFFFFF) {
+    auto bundle = std::make_shared<EngineBundle>(std::move(opener), clock, log_flags);
+    bundle->sorter.SetLogger(bundle->log.log());
+    bundle->transport.SetLogger(bundle->log.log());
+    bundle->dispatcher.RegisterListener(&bundle->sorter, nullptr, bundle);
+    bundle->transport.Attach(&bundle->dispatcher, &bundle->sorter);
+    return bundle;
+  }
+
+  EngineBundle(DeviceOpener opener, Clock& clock, uint32_t log_flags)
+      : log(log_flags), transport(clock, std::move(opener)) {}
+
+  bool OpenDevice() { return transport.Open(7, {}, shared_from_this()); }
+  bool OpenUser(const UserTransport& user) { return transport.Open(7, user, shared_from_this()); }
+  bool Shut() {
+    const bool stopped = transport.StopThread();
+    return dispatcher.Stop() && stopped;
+  }
+
+  LogLines log;
+  PacketQueue responses;
+  PacketQueue asynchronous;
+  BoundedQueue<EventRecord> events;
+  CKralEventListener sorter{responses, asynchronous, events};
+  CKralEvents dispatcher;
+  CKralThreadInterface transport;
+};
+
+// Ends the threads with the test, whatever its outcome.
+class EngineGuard {
+ public:
+  explicit EngineGuard(std::shared_ptr<EngineBundle> bundle) : bundle_(std::move(bundle)) {}
+  ~EngineGuard() { bundle_->Shut(); }
+  EngineGuard(const EngineGuard&) = delete;
+  EngineGuard& operator=(const EngineGuard&) = delete;
+  EngineBundle* operator->() const { return bundle_.get(); }
+
+ private:
+  std::shared_ptr<EngineBundle> bundle_;
+};
+
+template <class Condition>
+bool Eventually(Condition condition, std::chrono::milliseconds limit = std::chrono::seconds(5)) {
+  const auto deadline = std::chrono::steady_clock::now() + limit;
+  while (!condition()) {
+    if (std::chrono::steady_clock::now() > deadline) return false;
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  return true;
+}
+
+}  // namespace kral::test
+
+#endif

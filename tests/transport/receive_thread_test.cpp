@@ -1,0 +1,214 @@
+// The receive thread's life: both receive modes, pausing, stopping, and a caller's function that does not come back.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <string>
+
+#include "tests/support/engine_bundle.h"
+#include "tests/support/fake_clock.h"
+#include "tests/support/test_wire.h"
+
+namespace kral {
+namespace {
+
+using std::chrono::milliseconds;
+using test::Bytes;
+using test::EngineBundle;
+using test::EngineGuard;
+using test::Eventually;
+using test::FakeClock;
+using test::LogLines;
+using test::PlainFrame;
+using test::TestWire;
+
+constexpr uint32_t kNoTraffic = 0xFFFFFFFF & ~(kLogIo | kLogInfAhdlc);
+
+bool Has(const LogLines::Lines& lines, const std::string& line) {
+  return std::find(lines.begin(), lines.end(), line) != lines.end();
+}
+
+struct Modes : testing::TestWithParam<std::tuple<ReceiveMode, bool>> {
+  Modes() { engine->transport.SetReceiveMode(std::get<0>(GetParam())); }
+  bool Open() { return std::get<1>(GetParam()) ? engine->OpenUser(wire.AsUserTransport()) : engine->OpenDevice(); }
+  bool Answers() {
+    wire.OnWrite([](const Bytes&) { return PlainFrame({5, 6}); });
+    Bytes response(8);
+    uint16_t size = 8;
+    return engine->transport.SendSync(Bytes{5}, response.data(), size, 5, 5000, 0);
+  }
+
+  TestWire wire;
+  EngineGuard engine{EngineBundle::Make(wire.AsDevice(), SystemClock(), kNoTraffic)};
+};
+
+INSTANTIATE_TEST_SUITE_P(ReceiveThread, Modes,
+                         testing::Combine(testing::Values(ReceiveMode::kAsWritten, ReceiveMode::kWakeOnData),
+                                          testing::Bool()),
+                         [](const auto& instance) {
+                           return std::string(std::get<0>(instance.param) == ReceiveMode::kAsWritten ? "AsWritten"
+                                                                                                     : "WakeOnData") +
+                                  (std::get<1>(instance.param) ? "CallersTransport" : "Device");
+                         });
+
+TEST_P(Modes, PauseStopsTheReadingUntilResume) {
+  ASSERT_TRUE(Open());
+  ASSERT_TRUE(Answers());
+  engine->log.Take();
+  ASSERT_TRUE(engine->transport.PauseThread());
+  const uint64_t reads = wire.reads();
+  wire.ToHost(PlainFrame({1, 2}));
+  std::this_thread::sleep_for(milliseconds(20));
+  EXPECT_EQ(wire.reads(), reads);
+  EXPECT_TRUE(engine->transport.PauseThread());
+  const auto lines = engine->log.Take();
+  EXPECT_TRUE(Has(lines, "2 THREAD: Pause Detected, Pause ACK event set attempt"));
+  EXPECT_TRUE(Has(lines, "2 CKralThreadInterface::PauseThread - Thread Pause event ack succeeded"));
+  EXPECT_EQ(lines.back(), "2 CKralThreadInterface::PauseThread - thread is already paused");
+  engine->transport.ResumeThread();
+  EXPECT_TRUE(Eventually([this] { return engine->responses.size() == 1; }));
+}
+
+TEST_P(Modes, PauseAfterPauseIsAcknowledgedEachTime) {
+  ASSERT_TRUE(Open());
+  for (int i = 0; i < 50; ++i) {
+    ASSERT_TRUE(engine->transport.PauseThread()) << i;
+    engine->transport.ResumeThread();
+  }
+  EXPECT_TRUE(Answers());
+}
+
+TEST_P(Modes, StopsAtOnceAndStartsAgain) {
+  for (int i = 0; i < 10; ++i) {
+    ASSERT_TRUE(Open());
+    ASSERT_TRUE(Answers());
+    const auto start = std::chrono::steady_clock::now();
+    ASSERT_TRUE(engine->transport.StopThread());
+    EXPECT_LT(std::chrono::steady_clock::now() - start, milliseconds(500));
+    EXPECT_FALSE(engine->transport.connected());
+  }
+  EXPECT_TRUE(Has(engine->log.Take(), "2 CKralThreadInterface::StopThread - thread stop event was received"));
+  EXPECT_TRUE(engine->transport.StopThread()) << "nothing runs";
+}
+
+TEST_P(Modes, ModeChangesWhileTheThreadRuns) {
+  ASSERT_TRUE(Open());
+  for (const ReceiveMode mode : {ReceiveMode::kWakeOnData, ReceiveMode::kAsWritten, ReceiveMode::kWakeOnData}) {
+    engine->transport.SetReceiveMode(mode);
+    EXPECT_TRUE(Answers());
+  }
+}
+
+TEST_P(Modes, FrameInPiecesAcrossReadsIsOnePacket) {
+  ASSERT_TRUE(Open());
+  for (const uint8_t byte : PlainFrame({1, 0x7E, 0x7D, 2})) wire.ToHost({byte});
+  EXPECT_TRUE(Eventually([this] { return engine->responses.size() == 1; }));
+  EXPECT_EQ(engine->responses.Pop(), test::WithFcs({1, 0x7E, 0x7D, 2}));
+}
+
+// --- Sleeping and waiting -------------------------------------------------------------------------------------------
+
+TEST(ReceiveThread, SleepRuleSleepsEveryTurnOrOnlyOnce) {
+  for (const uint32_t divisor : {1u, 7u}) {
+    TestWire wire;
+    FakeClock clock;
+    EngineGuard engine(EngineBundle::Make(wire.AsDevice(), clock, 0));
+    engine->transport.SetSleepDivisor(divisor);
+    ASSERT_TRUE(engine->OpenDevice());
+    ASSERT_TRUE(Eventually([&wire] { return wire.reads() > 100; }));
+    ASSERT_TRUE(engine->transport.StopThread());
+    if (divisor == 1) {
+      EXPECT_GE(clock.slept(), wire.reads());
+    } else {
+      EXPECT_EQ(clock.slept(), 1u);
+    }
+  }
+}
+
+TEST(ReceiveThread, WakeOnDataReadsOnlyWhatIsThere) {
+  TestWire wire;
+  EngineGuard engine(EngineBundle::Make(wire.AsDevice(), SystemClock(), 0));
+  engine->transport.SetReceiveMode(ReceiveMode::kWakeOnData);
+  ASSERT_TRUE(engine->OpenDevice());
+  std::this_thread::sleep_for(milliseconds(20));
+  EXPECT_LE(wire.reads(), 1u);
+  wire.ToHost(PlainFrame({1, 2}));
+  ASSERT_TRUE(Eventually([&] { return engine->responses.size() == 1; }));
+  EXPECT_LE(wire.reads(), 3u);
+}
+
+TEST(ReceiveThread, VanishedDeviceIsLeftAloneAndTheReopenedOneRead) {
+  TestWire wire;
+  EngineGuard engine(EngineBundle::Make(wire.AsDevice(), SystemClock(), 0));
+  engine->transport.SetReceiveMode(ReceiveMode::kWakeOnData);
+  ASSERT_TRUE(engine->OpenDevice());
+  wire.Vanish(true);
+  std::this_thread::sleep_for(milliseconds(20));
+  EXPECT_LE(wire.reads(), 2u);
+  wire.Vanish(false);
+  ASSERT_TRUE(engine->OpenDevice());
+  wire.ToHost(PlainFrame({1, 2}));
+  EXPECT_TRUE(Eventually([&] { return engine->responses.size() == 1; }));
+}
+
+// --- Opening --------------------------------------------------------------------------------------------------------
+
+TEST(ReceiveThread, FailedOpenLeavesThePortClosedAndSaysSo) {
+  const auto refuse = [](int, DeviceResult& result) {
+    result.error = DeviceError::kBusy;
+    return std::unique_ptr<SerialDevice>();
+  };
+  const auto explode = [](int, DeviceResult&) -> std::unique_ptr<SerialDevice> { throw 1; };
+  const std::pair<DeviceOpener, const char*> cases[] = {{refuse, "16 Port open failed"},
+                                                        {explode, "16 Port open failed with exception"}};
+  for (const auto& [opener, line] : cases) {
+    EngineGuard engine(EngineBundle::Make(opener));
+    EXPECT_FALSE(engine->OpenDevice());
+    EXPECT_FALSE(engine->transport.connected());
+    EXPECT_TRUE(Has(engine->log.Take(), line)) << line;
+  }
+}
+
+TEST(ReceiveThread, TransportWithoutAllThreeFunctionsIsRefused) {
+  TestWire wire;
+  EngineGuard engine(EngineBundle::Make());
+  UserTransport user = wire.AsUserTransport();
+  user.flush = nullptr;
+  EXPECT_FALSE(engine->OpenUser(user));
+  EXPECT_TRUE(engine->OpenUser(wire.AsUserTransport()));
+}
+
+TEST(ReceiveThread, BlockedReceiveFunctionBoundsTheStopAndTheThreadEndsLater) {
+  TestWire wire;
+  auto bundle = EngineBundle::Make();
+  ASSERT_TRUE(bundle->OpenUser(wire.AsUserTransport()));
+  wire.HoldReceive(true);
+  ASSERT_TRUE(wire.WaitUntilHeld());
+
+  EXPECT_TRUE(bundle->OpenUser(wire.AsUserTransport())) << "a second connect with the same functions";
+  EXPECT_TRUE(bundle->transport.Close());
+  EXPECT_FALSE(bundle->transport.StopThread());
+  EXPECT_TRUE(Has(bundle->log.Take(), "16 CKralThreadInterface::StopThread - thread stop event was not received"));
+  EXPECT_FALSE(bundle->OpenUser(wire.AsUserTransport())) << "the former thread is still inside";
+
+  wire.ToHost(PlainFrame({1, 2}));
+  wire.HoldReceive(false);
+  EXPECT_TRUE(Eventually([&] { return bundle->OpenUser(wire.AsUserTransport()); })) << "it has ended meanwhile";
+  EXPECT_EQ(bundle->transport.counters().bytes_received, 0u) << "nobody waits for what came after the stop";
+  EXPECT_TRUE(bundle->Shut());
+
+  // The owner goes while the thread is held: it lives until the thread ends.
+  ASSERT_TRUE(bundle->OpenUser(wire.AsUserTransport()));
+  wire.HoldReceive(true);
+  ASSERT_TRUE(wire.WaitUntilHeld());
+  EXPECT_FALSE(bundle->transport.StopThread());
+  bundle->dispatcher.Stop();
+  const std::weak_ptr<EngineBundle> watched = bundle;
+  bundle.reset();
+  EXPECT_FALSE(watched.expired());
+  wire.HoldReceive(false);
+  EXPECT_TRUE(Eventually([&] { return watched.expired(); }));
+  EXPECT_TRUE(Eventually([] { return ReapParkedThreads() == 0; }));
+}
+
+}  // namespace
+}  // namespace kral
