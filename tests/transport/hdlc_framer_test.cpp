@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "tests/support/fake_clock.h"
 #include "tests/support/log_lines.h"
 #include "tests/support/plain_codec.h"
 #include "transport/serial_port.h"
@@ -22,12 +23,6 @@ using Steps = std::vector<std::string>;
 
 const std::string kCommand = "AT$XJDMG\r";
 
-struct HandClock : Clock {
-  uint32_t TickMs() override { return now; }
-  void SleepMs(uint32_t milliseconds) override { now += milliseconds; }
-  uint32_t now = 0xFFFFFFF0;  // soon over its end
-};
-
 // Remembers what is asked of it, and gives its answers piece by piece, one per read.
 struct ScriptedPort : CSerialPort {
   uint32_t Send(const uint8_t* bytes, uint32_t count) override {
@@ -38,7 +33,7 @@ struct ScriptedPort : CSerialPort {
   }
   uint32_t Receive(uint8_t* buffer, uint32_t count) override {
     largest_read = std::max(largest_read, count);
-    if (read_takes_ms != 0) clock->now += read_takes_ms;
+    if (read_takes_ms != 0) clock->Advance(read_takes_ms);
     if (answers_from_write > 0 || answers.empty()) return 0;
     const std::string answer = std::exchange(answers.front(), {});
     answers.pop_front();
@@ -58,7 +53,7 @@ struct ScriptedPort : CSerialPort {
     return 1;
   }
 
-  HandClock* clock = nullptr;
+  test::FakeClock* clock = nullptr;
   uint32_t read_takes_ms = 0;
   uint32_t accepts = 0xFFFFFFFF;
   int answers_from_write = 0;  // silent until the command has been written so often
@@ -81,7 +76,7 @@ class HdlcFramer : public testing::Test {
   }
 
   test::LogLines lines_;
-  HandClock clock_;
+  test::FakeClock clock_;
   ScriptedPort port_;
   CProtAHDLC framer_{clock_};
 };
@@ -172,19 +167,17 @@ TEST_F(HdlcFramer, RawReadFillsTheBufferAndGivesWhatArrived) {
 
 TEST_F(HdlcFramer, SwitchToDiagnosticModeStopsAtTheFirstRateThatAnswers) {
   port_.answers = {"\r\n", "O", "K\r\n"};
-  const uint32_t start = clock_.now;
   EXPECT_EQ(framer_.Data2DM(0xFF), 1U);
   EXPECT_EQ(port_.steps, (Steps{"19200", "purge", "flag", kCommand, "57600", "purge", "flag", "purge"}));
-  EXPECT_EQ(clock_.now - start, 50U) << "settles before it reports success";
+  EXPECT_EQ(clock_.slept(), 50U) << "settles before it reports success";
   EXPECT_EQ(lines_.Take()[0], "64 CProtAHDLC::Data2DM(baudrate_mask=255)");
 }
 
 TEST_F(HdlcFramer, SwitchTriesEachRateTwiceForABoundedTime) {
-  const uint32_t start = clock_.now;
   EXPECT_EQ(framer_.Data2DM(0x05), 0U);
   EXPECT_EQ(port_.steps, (Steps{"19200", "purge", "flag", kCommand, kCommand, "115200", "purge", "flag", kCommand,
                                 kCommand, "57600", "purge", "flag", "purge"}));
-  EXPECT_EQ(clock_.now - start, 4 * 200U);
+  EXPECT_EQ(clock_.slept(), 4 * 200U);
   EXPECT_EQ(port_.largest_read, 20U);
 }
 
@@ -210,7 +203,7 @@ TEST_F(HdlcFramer, SwitchWithRawDataLeavesTheRateAtWhichItAsked) {
 TEST_F(HdlcFramer, SwitchReadsNoFurtherThanItsAreaWhateverThePortClaims) {
   port_.answers = {std::string(19, 'x'), std::string(4000, 'x'), "OK"};
   EXPECT_EQ(framer_.Data2DM(0x04), 1U) << "the second attempt begins with an empty area";
-  EXPECT_EQ(clock_.now, 0xFFFFFFF0U + 50U);
+  EXPECT_EQ(clock_.slept(), 50U);
 }
 
 }  // namespace
