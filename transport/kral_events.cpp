@@ -2,6 +2,7 @@
 #include "transport/kral_events.h"
 
 #include <algorithm>
+#include <chrono>
 #include <thread>
 #include <utility>
 
@@ -31,6 +32,8 @@ bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
     const std::lock_guard lock(queue_mutex_);
     accepting_ = true;
     stop_requested_ = false;
+    pushed_ = 0;
+    dispatched_ = 0;
   }
   started_.Reset();
   stopped_.Reset();
@@ -65,9 +68,16 @@ void CKralEvents::Push(std::span<const uint8_t> packet) {
     if (!accepting_) return;
     was_empty = queue_.empty();
     queue_.push_back(std::move(record));
+    ++pushed_;
   }
   // The dispatcher takes the whole queue at a time and waits only for an empty one.
   if (was_empty) new_packet_.notify_one();
+}
+
+bool CKralEvents::WaitUntilDispatched(uint32_t time_out_ms) {
+  std::unique_lock lock(queue_mutex_);
+  return batch_done_.wait_for(lock, std::chrono::milliseconds(time_out_ms),
+                              [this, last = pushed_] { return dispatched_ >= last || !accepting_; });
 }
 
 bool CKralEvents::Stop(uint32_t time_out_ms) {
@@ -88,6 +98,7 @@ void CKralEvents::EndAccepting() {
   stop_requested_ = true;
   queue_.clear();
   new_packet_.notify_one();
+  batch_done_.notify_all();
 }
 
 void CKralEvents::Run() {
@@ -99,7 +110,6 @@ void CKralEvents::Run() {
         if (stop_requested_) break;
         Dispatch(std::move(packet));
       }
-      batch.clear();
     }
     OnThreadEnd();
   } else {
@@ -110,6 +120,11 @@ void CKralEvents::Run() {
 
 bool CKralEvents::TakeBatch(std::deque<Packet>& batch) {
   std::unique_lock lock(queue_mutex_);
+  if (!batch.empty()) {
+    dispatched_ += batch.size();
+    batch.clear();
+    batch_done_.notify_all();
+  }
   new_packet_.wait(lock, [this] { return stop_requested_ || !queue_.empty(); });
   if (stop_requested_) return false;
   batch.swap(queue_);

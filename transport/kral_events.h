@@ -43,6 +43,9 @@ class CKralEvents {
   // dispatcher thread the packet is dropped.
   void Push(std::span<const uint8_t> packet);
 
+  // Waits until every packet pushed before the call has been through its listeners; false when that takes longer.
+  bool WaitUntilDispatched(uint32_t time_out_ms);
+
   // False when the thread, busy in a listener, did not end in time. It ends after that call and keeps its owner alive
   // until then. Packets not yet dispatched are dropped.
   bool Stop(uint32_t time_out_ms = 1000);
@@ -65,8 +68,11 @@ class CKralEvents {
 
   std::mutex queue_mutex_;
   std::condition_variable new_packet_;
+  std::condition_variable batch_done_;
   std::deque<Packet> queue_;
   bool accepting_ = false;
+  uint64_t pushed_ = 0;
+  uint64_t dispatched_ = 0;
   std::atomic<bool> stop_requested_{false};
 
   // Recursive: a listener may register and unregister from its call.

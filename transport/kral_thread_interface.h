@@ -97,6 +97,7 @@ class CKralThreadInterface {
   bool RunThread(std::shared_ptr<void> owner);
   void WakeReceiver();
 
+  void ForgetReplies();
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
   bool AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
                      uint8_t expected_code, uint32_t time_out_ms);

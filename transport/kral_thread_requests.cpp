@@ -7,12 +7,16 @@
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
 #include "transport/kral_event_listener.h"
+#include "transport/kral_events.h"
 #include "transport/kral_thread_interface.h"
 
 namespace kral {
 namespace {
 
 constexpr size_t kFcsBytes = 2;  // at the end of every record of the response queue
+
+// A bound for what takes microseconds, unless a listener or a log callback holds the threads up.
+constexpr uint32_t kSettleMs = 20;
 
 constexpr uint8_t kUnframedModeRequest = 68;
 constexpr uint32_t kUnframedModeMs = 80;
@@ -38,7 +42,7 @@ bool CKralThreadInterface::SendSync(std::span<const uint8_t> request, uint8_t* r
                                     uint8_t expected_code, uint32_t time_out_ms, uint32_t delay_ms) {
   if (sorter_ == nullptr) return false;
   LogRequest("SEND (%d bytes):%s", request);
-  sorter_->responses().Clear();
+  ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
     if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
@@ -59,6 +63,14 @@ bool CKralThreadInterface::SendSync(std::span<const uint8_t> request, uint8_t* r
   }
   if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", succeeded ? 1 : 0);
   return succeeded;
+}
+
+// Only replies to the request that follows shall count. What has been read already answers an earlier one: it is let
+// through to the queue before that is cleared, or a reply that came twice would fail the next request.
+void CKralThreadInterface::ForgetReplies() {
+  loop_.WaitForChunk(kSettleMs);
+  if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
+  sorter_->responses().Clear();
 }
 
 bool CKralThreadInterface::AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
@@ -94,7 +106,7 @@ bool CKralThreadInterface::SendRaw(std::span<const uint8_t> request, uint8_t* re
                                    uint32_t time_out_ms) {
   if (sorter_ == nullptr) return false;
   LogRequest("SEND RAW (%d bytes):%s", request);
-  sorter_->responses().Clear();
+  ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
     if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");

@@ -1,6 +1,8 @@
 // The receive thread's loop, in both receive modes. Starting, pausing and stopping it is the connection's affair.
 #include "transport/receive_loop.h"
 
+#include <chrono>
+
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
 #include "transport/chunk_splitter.h"
@@ -74,13 +76,29 @@ bool ReceiveLoop::ReadChunk() {
   // A caller's function may come back long after the stop: nobody waits for these bytes any more.
   if (control_.stop_requested()) return true;
   bytes_received_.fetch_add(count, std::memory_order_relaxed);
+  SetSplitting(true);
   try {
     Split(count);
   } catch (...) {
     // Out of memory: the chunk is lost, and the thread must not be.
     splitter_.DropPartialPacket();
   }
+  SetSplitting(false);
   return true;
+}
+
+void ReceiveLoop::SetSplitting(bool splitting) {
+  const std::lock_guard lock(chunk_mutex_);
+  splitting_ = splitting;
+  if (splitting) return;
+  ++chunks_;
+  chunk_done_.notify_all();
+}
+
+bool ReceiveLoop::WaitForChunk(uint32_t time_out_ms) {
+  std::unique_lock lock(chunk_mutex_);
+  return chunk_done_.wait_for(lock, std::chrono::milliseconds(time_out_ms),
+                              [this, chunk = chunks_] { return !splitting_ || chunks_ != chunk; });
 }
 
 void ReceiveLoop::Split(uint32_t count) {

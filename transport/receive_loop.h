@@ -3,7 +3,9 @@
 #define KRAL_TRANSPORT_RECEIVE_LOOP_H
 
 #include <atomic>
+#include <condition_variable>
 #include <cstdint>
+#include <mutex>
 #include <vector>
 
 #include "platform/clock.h"
@@ -34,6 +36,9 @@ class ReceiveLoop {
 
   void Run();
 
+  // Waits until the chunk that is being made packets of is through; false when that takes longer.
+  bool WaitForChunk(uint32_t time_out_ms);
+
   uint64_t bytes_received() const { return bytes_received_.load(std::memory_order_relaxed); }
 
  private:
@@ -42,6 +47,7 @@ class ReceiveLoop {
   bool WaitForBytes(uint32_t changes_seen);
   bool ReadChunk();
   void Split(uint32_t count);
+  void SetSplitting(bool splitting);
   void Leave();
 
   Clock& clock_;
@@ -54,6 +60,11 @@ class ReceiveLoop {
   std::atomic<uint32_t> read_time_out_ms_{500};
   std::atomic<uint32_t> sleep_divisor_{1};
   std::atomic<uint64_t> bytes_received_{0};
+
+  std::mutex chunk_mutex_;
+  std::condition_variable chunk_done_;
+  bool splitting_ = false;
+  uint64_t chunks_ = 0;
 
   // The thread's own.
   std::vector<uint8_t> buffer_;

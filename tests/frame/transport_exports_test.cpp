@@ -4,6 +4,7 @@
 
 #include <array>
 
+#include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/transport.h"
 #include "tests/support/handset_connection.h"

@@ -128,6 +128,19 @@ TEST_F(Engine, LateReplyIsNotTakenForTheNextOnes) {
   EXPECT_EQ(reply.bytes[1], 1);
 }
 
+TEST_F(Engine, ReplyThatCameTwiceDoesNotFailTheNextRequest) {
+  Open();
+  wire_.OnWrite([](const Bytes& written) {
+    Bytes replies;
+    for (int i = 0; i < 20; ++i) {
+      const Bytes reply = PlainFrame({written[0], 1});
+      replies.insert(replies.end(), reply.begin(), reply.end());
+    }
+    return replies;
+  });
+  for (uint8_t code = 1; code < 15; ++code) EXPECT_TRUE(Ask({code}).succeeded) << int{code};
+}
+
 TEST_F(Engine, TimeOutClosesThePortAndKeepsTheRequest) {
   Open();
   engine_->log.Take();
