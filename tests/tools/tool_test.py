@@ -1,0 +1,271 @@
+#!/usr/bin/env python3
+"""The built tool against the handset it simulates, each in a process of its own, joined by a pseudo terminal.
+
+usage: tool_test.py KRAL [unittest arguments]. The last line is "kral_tool: N passed, M failed".
+"""
+import contextlib
+import fcntl
+import json
+import os
+import signal
+import subprocess
+import sys
+import tempfile
+import termios
+import time
+import unittest
+
+KRAL = None
+PATIENCE = 30  # seconds; far more than anything here takes
+
+
+def clean_environment(ports):
+    """An environment in which exactly these COM numbers have devices of ours."""
+    env = {name: value for name, value in os.environ.items() if not name.startswith("KRAL_")}
+    env["KRAL_PORT_DIR"] = "/nonexistent"
+    env.update({f"KRAL_COM{number}": device for number, device in ports.items()})
+    return env
+
+
+def start(*words, ports=None):
+    return subprocess.Popen([KRAL, *words], env=clean_environment(ports or {}), stdin=subprocess.DEVNULL,
+                            stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
+
+
+def run(*words, ports=None):
+    process = start(*words, ports=ports)
+    process.out, process.err = process.communicate(timeout=PATIENCE)
+    return process
+
+
+@contextlib.contextmanager
+def handset(*options):
+    """A simulated handset; gives its process, whose `device` is where it answers."""
+    sim = start("sim", *options)
+    try:
+        sim.device = sim.stdout.readline().strip()
+        if not os.path.exists(sim.device):
+            raise AssertionError(f"kral sim {options}: no device: {sim.communicate()[1]}")
+        yield sim
+    finally:
+        if sim.poll() is None:
+            sim.terminate()
+        sim.communicate(timeout=PATIENCE)
+
+
+@contextlib.contextmanager
+def tool_waiting_for_an_answer(device, *options):
+    """The tool, with the request 7C sent and its answer outstanding."""
+    with tempfile.TemporaryDirectory() as folder:
+        log = os.path.join(folder, "log")
+        tool = start("-p", "7", "--time-out", "2000", "--log", log, "raw", "7C", *options, ports={7: device})
+        try:
+            deadline = time.monotonic() + PATIENCE
+            while tool.poll() is None and time.monotonic() < deadline:
+                with contextlib.suppress(FileNotFoundError), open(log, encoding="latin-1") as file:
+                    if "SEND (1 bytes):7C" in file.read():
+                        break
+                time.sleep(0.01)
+            yield tool
+        finally:
+            if tool.poll() is None:
+                tool.kill()
+                tool.communicate()
+
+
+class ToolTest(unittest.TestCase):
+    def expect(self, code, *words, ports=None):
+        """Runs the tool and checks its exit code."""
+        done = run(*words, ports=ports)
+        self.assertEqual(done.returncode, code, f"kral {' '.join(words)}\n{done.out}{done.err}")
+        return done
+
+    def expect_json(self, code, *words, ports=None):
+        """The same with --json: one object, nothing else, whose error agrees with the exit code."""
+        done = self.expect(code, *words, "--json", ports=ports)
+        answer = json.loads(done.out)
+        self.assertEqual(done.out.count("\n"), 1)
+        self.assertEqual(answer["ok"], code == 0)
+        if code != 0:
+            self.assertEqual(answer["error"]["code"], code)
+            for member in ("name", "text", "hint"):
+                self.assertTrue(answer["error"][member], member)
+        return answer
+
+
+class Identity(ToolTest):
+    OPTIONS = ("--esn", "0x1A2B3C4D", "--model", "TESTER-9", "--software", "R7.1 build 42")
+
+    def test_info_prints_what_the_handset_was_given(self):
+        with handset(*self.OPTIONS) as sim:
+            text = self.expect(0, "-p", "7", "info", ports={7: sim.device}).out
+            answer = self.expect_json(0, "-p", "7", "info", ports={7: sim.device})
+        for part in (f"COM7 ({sim.device})", "TESTER-9", "R7.1 build 42", "0x1A2B3C4D", "online"):
+            self.assertIn(part, text)
+        self.assertEqual(answer["port"], 7)
+        self.assertEqual(answer["esn"], "1A2B3C4D")
+        self.assertEqual(answer["build"]["model"], "TESTER-9")
+        self.assertEqual(answer["build"]["software_revision"], "R7.1 build 42")
+        self.assertEqual(answer["mode"], "online")
+        self.assertTrue(answer["version"]["compiled"]["date"])
+
+    def test_info_leaves_out_what_the_handset_refuses(self):
+        with handset("--fault", "refuse=19,of=7C") as sim:
+            done = self.expect(0, "-p", "7", "info", "--json", ports={7: sim.device})
+        answer = json.loads(done.out)
+        self.assertIsNone(answer["build"])
+        self.assertIn("bad command", done.err)
+        self.assertTrue(answer["esn"])
+
+    def test_log_holds_every_step(self):
+        with handset() as sim, tempfile.TemporaryDirectory() as folder:
+            log = os.path.join(folder, "station.log")
+            self.expect(0, "info", "-p", "7", "--log", log, "--log-flags", "0x421F", ports={7: sim.device})
+            with open(log, encoding="latin-1") as file:
+                lines = file.read()
+        self.assertRegex(lines, r"(?m)^\d\d:\d\d:\d\d\d\t,LOG_C_HIGH_LEVEL_START,KRAL_DIAG_VERNO_F$")
+        self.assertRegex(lines, r"LOG_FN,KRAL_DIAG_EXT_BUILD_ID_F\(\)")
+        self.assertRegex(lines, r"LOG_IO,SEND \(1 bytes\):7C ")
+        self.assertIn("DIAG_READ_ESN_F() -- completed", lines)
+
+    def test_unwritable_log_is_a_bad_file(self):
+        with handset() as sim:
+            answer = self.expect_json(10, "-p", "7", "info", "--log", "/nonexistent/x.log", ports={7: sim.device})
+        self.assertIn("/nonexistent/x.log", answer["error"]["text"])
+
+
+class Ports(ToolTest):
+    def test_ports_are_listed_with_their_devices_and_probed_on_request(self):
+        with handset() as sim, handset("--fault", "ignore") as mute:
+            ports = {7: sim.device, 9: mute.device}
+            listed = {row["port"]: row for row in self.expect_json(0, "ports", ports=ports)["ports"]}
+            probed = {row["port"]: row for row in self.expect_json(0, "ports", "--probe", ports=ports)["ports"]}
+        self.assertEqual(listed[7]["device"], sim.device)
+        self.assertNotIn("handset", listed[7])
+        self.assertTrue(probed[7]["handset"])
+        self.assertFalse(probed[9]["handset"])
+
+    def test_only_port_with_a_handset_needs_no_number(self):
+        with handset() as sim, handset("--fault", "ignore") as mute:
+            ports = {12: sim.device, 13: mute.device}
+            self.assertEqual(self.expect_json(0, "info", ports=ports)["port"], 12)
+
+    def test_several_handsets_are_listed_and_none_is_chosen(self):
+        with handset() as one, handset() as two:
+            error = self.expect_json(2, "info", ports={12: one.device, 13: two.device})["error"]
+        self.assertIn("COM12", error["text"])
+        self.assertIn("COM13", error["text"])
+        self.assertIn("-p", error["hint"])
+
+    def test_missing_and_impossible_ports_are_no_port(self):
+        for number, ports in (("7", {7: "/nonexistent/tty"}), ("0", {}), ("300", {})):
+            with self.subTest(port=number):
+                self.assertIn(f"COM{number}", self.expect_json(3, "-p", number, "info", ports=ports)["error"]["text"])
+
+    def test_busy_port_is_told_from_a_missing_one(self):
+        with handset() as sim:
+            taken = os.open(sim.device, os.O_RDWR | os.O_NOCTTY)
+            try:
+                fcntl.flock(taken, fcntl.LOCK_EX | fcntl.LOCK_NB)
+                fcntl.ioctl(taken, termios.TIOCEXCL)
+                error = self.expect_json(4, "-p", "7", "info", ports={7: sim.device})["error"]
+            finally:
+                os.close(taken)
+        self.assertIn("in use", error["text"])
+
+
+class Failures(ToolTest):
+    def test_silent_handset_gives_no_answer(self):
+        with handset("--fault", "ignore") as sim:
+            error = self.expect_json(5, "-p", "7", "info", ports={7: sim.device})["error"]
+        self.assertIn("COM7", error["text"])
+
+    def test_request_without_answer_is_told_from_a_dead_handset(self):
+        with handset("--fault", "lose,of=7C") as sim:
+            error = self.expect_json(5, "-p", "7", "--time-out", "300", "raw", "7C", ports={7: sim.device})["error"]
+        self.assertIn("command 7C", error["text"])
+        self.assertIn("still answers", error["hint"])
+
+    def test_handset_that_vanishes_is_lost(self):
+        with handset("--fault", "lose,of=7C") as sim, tool_waiting_for_an_answer(sim.device) as tool:
+            sim.kill()
+            _, err = tool.communicate(timeout=PATIENCE)
+            self.assertEqual(tool.returncode, 9, err)
+
+    def test_refusal_names_its_reason(self):
+        with handset("--fault", "refuse=24,of=29") as sim:
+            ports = {7: sim.device}
+            answer = self.expect_json(7, "-p", "7", "raw", "29 05 00", ports=ports)
+            self.assertEqual(answer["reply"][:2], "18")
+            self.assertIn("invalid for the current mode", answer["error"]["text"])
+
+    def test_foreign_answer_is_a_link_error(self):
+        with handset("--fault", "wrong=0x55,of=7C") as sim:
+            self.expect_json(6, "-p", "7", "raw", "7C", ports={7: sim.device})
+
+    def test_mistakes_on_the_command_line_are_usage(self):
+        for words in (["frobnicate"], ["info", "--frobnicate"], [], ["raw", "4B0"], ["raw", "xyz"],
+                      ["-p", "seven", "info"], ["mode", "sideways"], ["--time-out", "0", "info"]):
+            with self.subTest(words=words):
+                self.expect_json(2, *words)
+
+    def test_result_that_cannot_be_written_is_not_a_success(self):
+        with handset() as sim, open("/dev/full", "w", encoding="ascii") as full:
+            done = subprocess.run([KRAL, "-p", "7", "info"], env=clean_environment({7: sim.device}), stdout=full,
+                                  stderr=subprocess.PIPE, text=True, timeout=PATIENCE, check=False)
+        self.assertEqual(done.returncode, 1, done.stderr)
+
+    def test_interrupted_verb_disconnects_and_says_so(self):
+        with handset("--fault", "lose,of=7C") as sim, tool_waiting_for_an_answer(sim.device, "--json") as tool:
+            tool.send_signal(signal.SIGINT)
+            out, _ = tool.communicate(timeout=PATIENCE)
+            self.assertEqual(tool.returncode, 130)
+            self.assertEqual(json.loads(out)["error"]["name"], "interrupted")
+
+
+class Requests(ToolTest):
+    def test_raw_shows_the_reply_as_it_came(self):
+        with handset("--switches", "0x1234") as sim:
+            ports = {7: sim.device}
+            self.assertEqual(self.expect(0, "-p", "7", "raw", "2F", ports=ports).out.split()[:4],
+                             ["0000", "2F", "34", "12"])
+            for words in (["30", "78", "56"], ["307856"], ["0x30,0x78,0x56"]):
+                self.assertEqual(self.expect_json(0, "-p", "7", "raw", *words, ports=ports)["request"], "30 78 56")
+            self.assertEqual(self.expect_json(0, "-p", "7", "raw", "2f", ports=ports)["reply"], "2F 78 56")
+
+    def test_modes_are_switched_and_read_back(self):
+        with handset() as sim:
+            ports = {7: sim.device}
+            self.assertEqual(self.expect(0, "-p", "7", "mode", "get", ports=ports).out, "online\n")
+            for mode in ("ftm", "lpm", "online"):
+                self.assertEqual(self.expect_json(0, "-p", "7", "mode", mode, ports=ports)["mode"], mode)
+                self.assertEqual(self.expect(0, "-p", "7", "mode", "get", ports=ports).out, f"{mode}\n")
+
+
+class Simulation(ToolTest):
+    def test_sim_ends_cleanly_on_request(self):
+        for number in (signal.SIGINT, signal.SIGTERM):
+            with self.subTest(signal=number), handset() as sim:
+                sim.send_signal(number)
+                self.assertEqual(sim.wait(timeout=PATIENCE), 0)
+                self.assertFalse(os.path.exists(sim.device))
+
+    def test_mistyped_faults_are_usage(self):
+        self.expect_json(2, "sim", "--fault", "frobnicate")
+
+
+class Counting(unittest.TextTestResult):
+    passed = 0
+
+    def addSuccess(self, test):
+        super().addSuccess(test)
+        self.passed += 1
+
+
+if __name__ == "__main__":
+    KRAL = os.path.abspath(sys.argv[1])
+    suite = unittest.main(argv=[sys.argv[0], *sys.argv[2:]], exit=False,
+                          testRunner=unittest.TextTestRunner(resultclass=Counting, verbosity=1))
+    bad = len(suite.result.failures) + len(suite.result.errors)
+    print(f"kral_tool: {suite.result.passed} passed, {bad} failed")
+    sys.exit(0 if suite.result.passed > 0 and bad == 0 else 1)

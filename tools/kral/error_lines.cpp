@@ -1,0 +1,50 @@
+// Receives the text-log records of the connection and keeps those that explain failures.
+#include "tools/kral/error_lines.h"
+
+#include <cstddef>
+#include <cstring>
+#include <deque>
+#include <mutex>
+
+namespace kral::tool {
+namespace {
+
+// A record of the callback: flag at 0, text at 8.
+constexpr std::size_t kTextOffset = 8;
+constexpr std::size_t kMostLines = 64;
+
+std::mutex mutex;
+std::deque<std::string> lines;
+
+void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
+  if (record == nullptr || size <= kTextOffset) return;
+  const auto* bytes = static_cast<const char*>(record);
+  std::uint16_t flag = 0;
+  std::memcpy(&flag, bytes, sizeof flag);
+  if ((flag & kExplainingLines) == 0) return;
+  const auto room = size - kTextOffset;
+  const void* end = std::memchr(bytes + kTextOffset, 0, room);
+  const auto length =
+      end == nullptr ? room : static_cast<std::size_t>(static_cast<const char*>(end) - (bytes + kTextOffset));
+  const std::lock_guard lock(mutex);
+  if (lines.size() == kMostLines) lines.pop_front();
+  lines.emplace_back(bytes + kTextOffset, length);
+}
+
+}  // namespace
+
+void CollectErrorLines(KRAL_HANDLE handle) {
+  KRAL_ConfigureLibraryTextLogCallBack(handle, OnLine);
+}
+
+void ForgetErrorLines() {
+  const std::lock_guard lock(mutex);
+  lines.clear();
+}
+
+std::vector<std::string> ErrorLines() {
+  const std::lock_guard lock(mutex);
+  return {lines.begin(), lines.end()};
+}
+
+}  // namespace kral::tool

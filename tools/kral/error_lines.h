@@ -1,0 +1,21 @@
+// The error lines of a handset's text log, kept for the request that is running: the library says there why a call
+// gave 0.
+#ifndef KRAL_TOOLS_ERROR_LINES_H
+#define KRAL_TOOLS_ERROR_LINES_H
+
+#include <string>
+#include <vector>
+
+#include "kral/kral.h"
+
+namespace kral::tool {
+
+inline constexpr std::uint32_t kExplainingLines = KRAL_LOG_ERR | KRAL_LOG_RET;
+
+void CollectErrorLines(KRAL_HANDLE handle);  // from now on, through the text-log callback of the handle
+void ForgetErrorLines();                     // before a request
+std::vector<std::string> ErrorLines();       // errors and results since then
+
+}  // namespace kral::tool
+
+#endif

@@ -1,0 +1,88 @@
+// Writes results, notes and failures; knows nothing of what they are about.
+#include "tools/kral/output.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <iterator>
+
+namespace kral::tool {
+namespace {
+
+constexpr std::size_t kDumpWidth = 16;
+
+bool IsPrintable(char character) {
+  return character >= ' ' && character <= '~';
+}
+
+void WriteData(std::string_view text) {
+  const bool written = std::fwrite(text.data(), 1, text.size(), stdout) == text.size() && std::fflush(stdout) == 0;
+  if (!written) {
+    throw ToolError(ExitCode::kInternal, "the result cannot be written to the standard output",
+                    "check the disk or the program at the other end of the pipe");
+  }
+}
+
+}  // namespace
+
+void Output::Result(const Json& members, std::string_view text) const {
+  if (json_) {
+    WriteObject(true, members);
+  } else {
+    WriteData(text);
+  }
+}
+
+void Output::Note(std::string_view text) const {
+  fmt::print(stderr, "kral: {}\n", text);
+}
+
+void Output::Failure(const ToolError& error, const Json& members) const {
+  if (!json_) {
+    fmt::print(stderr, "kral: {}\n", error.what());
+    if (!error.hint().empty()) fmt::print(stderr, "      {}\n", error.hint());
+    return;
+  }
+  Json object = members;
+  object["error"] = {{"code", static_cast<int>(error.code())},
+                     {"name", NameOf(error.code())},
+                     {"text", error.what()},
+                     {"hint", error.hint()}};
+  WriteObject(false, object);
+}
+
+void Output::WriteObject(bool ok, const Json& members) const {
+  Json object{{"ok", ok}};
+  object.update(members);
+  // Texts may come from command lines and from the system: an invalid UTF-8 byte is replaced, never fatal.
+  WriteData(object.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n");
+}
+
+std::string Printable(std::string_view text) {
+  const auto end = text.find_last_not_of(std::string_view(" \0", 2));
+  std::string shown(text.substr(0, end == std::string_view::npos ? 0 : end + 1));
+  std::replace_if(
+      shown.begin(), shown.end(), [](char character) { return !IsPrintable(character); }, '?');
+  return shown;
+}
+
+std::string HexText(std::span<const std::uint8_t> bytes) {
+  return fmt::format("{:02X}", fmt::join(bytes, " "));
+}
+
+std::string HexDump(std::span<const std::uint8_t> bytes) {
+  std::string dump;
+  for (std::size_t offset = 0; offset < bytes.size(); offset += kDumpWidth) {
+    const auto line = bytes.subspan(offset, std::min(kDumpWidth, bytes.size() - offset));
+    std::string characters;
+    std::transform(line.begin(), line.end(), std::back_inserter(characters), [](std::uint8_t byte) {
+      const auto character = static_cast<char>(byte);
+      return IsPrintable(character) ? character : '.';
+    });
+    dump += fmt::format("{:04X}  {:<{}}  {}\n", offset, HexText(line), kDumpWidth * 3 - 1, characters);
+  }
+  return dump;
+}
+
+}  // namespace kral::tool

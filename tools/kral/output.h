@@ -1,0 +1,47 @@
+// What the tool prints: data on stdout, as text or as one JSON object, and everything else on stderr.
+#ifndef KRAL_TOOLS_OUTPUT_H
+#define KRAL_TOOLS_OUTPUT_H
+
+#include <cstdint>
+#include <nlohmann/json.hpp>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "tools/kral/exit_codes.h"
+
+namespace kral::tool {
+
+using Json = nlohmann::ordered_json;
+
+class Output {
+ public:
+  void UseJson() { json_ = true; }
+  bool json() const { return json_; }
+
+  // The result of a verb: `members` join "ok" in the object; `text` is what a person reads, with its line ends.
+  void Result(const Json& members, std::string_view text) const;
+
+  // Something worth knowing that is not the result.
+  void Note(std::string_view text) const;
+
+  // The end of a failed verb. `members` is what was found out before it failed, if anything.
+  void Failure(const ToolError& error, const Json& members = Json::object()) const;
+
+ private:
+  void WriteObject(bool ok, const Json& members) const;
+
+  bool json_ = false;
+};
+
+// A text of the handset made fit for a terminal and for JSON: padding cut, anything but printable ASCII shown as '?'.
+std::string Printable(std::string_view text);
+
+// Two upper-case digits per byte, separated by blanks.
+std::string HexText(std::span<const std::uint8_t> bytes);
+// Sixteen bytes a line: offset, hex, characters.
+std::string HexDump(std::span<const std::uint8_t> bytes);
+
+}  // namespace kral::tool
+
+#endif

@@ -1,0 +1,216 @@
+// Finds the port, connects, and turns a failed request into an error that says what happened and what to try next.
+#include "tools/kral/session.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cstdio>
+#include <memory>
+
+#include "platform/port_list.h"
+#include "tools/kral/error_lines.h"
+#include "tools/kral/exit_codes.h"
+#include "tools/kral/interrupt.h"
+#include "tools/kral/output.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint16_t kMostPorts = 256;
+constexpr std::uint32_t kTimeOutCommand = 0;
+constexpr std::uint32_t kTimeOutLiveness = 1;
+constexpr std::uint8_t kWakeOnData = 1;
+
+std::string Describe(const std::vector<std::uint16_t>& ports) {
+  std::string text;
+  for (const auto port : ports) text += (text.empty() ? "" : ", ") + DescribePort(port);
+  return text;
+}
+
+std::uint16_t TheOnlyPort() {
+  const auto answering = ListPortsWithHandset();
+  if (answering.size() == 1) return answering.front();
+  if (answering.size() > 1) {
+    throw ToolError(ExitCode::kUsage, fmt::format("handsets answer on several ports: {}", Describe(answering)),
+                    fmt::format("choose one: -p {}", answering.front()));
+  }
+  const auto ports = ListPorts();
+  if (ports.empty()) {
+    throw ToolError(ExitCode::kNoPort, "this machine has no serial port",
+                    "plug the handset in, or name its port with -p N");
+  }
+  throw ToolError(ExitCode::kNoPort, fmt::format("no handset answers on {}", Describe(ports)),
+                  "check cable and power of the handset and that no other program uses its port, or name it with -p N");
+}
+
+// An unwritable log is noticed here: the library drops the lines of a file that it cannot open without a word.
+void CheckLogFile(const std::string& name) {
+  const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(name.c_str(), "w"), std::fclose);
+  if (!file) {
+    throw ToolError(ExitCode::kBadFile, fmt::format("the log file {} cannot be written", name),
+                    "check folder and permissions of the file named by --log");
+  }
+}
+
+// The state when it stands in the way of every request; nothing when the port is open, or closed by a time-out only.
+std::optional<std::int32_t> PortTrouble(KRAL_HANDLE handle) {
+  std::int32_t state = KRAL_PORT_OPEN;
+  if (KRAL_GetPortState(handle, &state) == 0 || state == KRAL_PORT_OPEN || state == KRAL_PORT_CLOSED) {
+    return std::nullopt;
+  }
+  return state;
+}
+
+ToolError ExplainPort(std::uint16_t port, std::int32_t state, bool was_connected) {
+  const auto name = DescribePort(port);
+  switch (state) {
+    case KRAL_PORT_BUSY:
+      return {ExitCode::kPortInUse, fmt::format("{} is in use by another program", name),
+              "close the program that holds the port, then run the command again"};
+    case KRAL_PORT_NOT_PERMITTED:
+      return {ExitCode::kPortInUse, fmt::format("{} may not be opened by this user", name),
+              "on Linux, join the group of the device (often dialout) and log in again"};
+    case KRAL_PORT_NOT_FOUND:
+      if (was_connected) break;
+      return {ExitCode::kNoPort, fmt::format("there is no port {}", name), "kral ports lists the ports there are"};
+    default:
+      if (was_connected) break;
+      return {ExitCode::kNoPort, fmt::format("{} cannot be opened as a serial port", name),
+              "kral ports lists the ports there are; --log FILE tells what the system said"};
+  }
+  return {ExitCode::kLost, fmt::format("the handset on {} went away", name),
+          "check the cable; a handset that restarts comes back on its port after a while"};
+}
+
+}  // namespace
+
+std::uint16_t ParsePort(std::string_view text) {
+  auto digits = text;
+  if (digits.size() > 3 && (digits.substr(0, 3) == "COM" || digits.substr(0, 3) == "com")) digits.remove_prefix(3);
+  std::uint16_t port = 0;
+  const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), port);
+  if (error != std::errc() || end != digits.data() + digits.size()) {
+    throw ToolError(ExitCode::kUsage, fmt::format("{} is not a port number", text),
+                    "give the number of a COM port, such as -p 7");
+  }
+  return port;
+}
+
+std::string DescribePort(std::uint16_t port) {
+  const std::string name = fmt::format("COM{}", port);
+  const std::string device = ComPortDevice(port);
+  return device.empty() || device.find(name) != std::string::npos ? name : fmt::format("{} ({})", name, device);
+}
+
+std::vector<std::uint16_t> ListPorts() {
+  std::vector<std::uint16_t> ports(kMostPorts);
+  std::uint16_t count = kMostPorts;
+  if (KRAL_GetAllPortList(&count, ports.data()) == 0) count = 0;
+  ports.resize(count);
+  return ports;
+}
+
+std::vector<std::uint16_t> ListPortsWithHandset() {
+  std::vector<std::uint16_t> ports(kMostPorts);
+  std::uint16_t count = kMostPorts;
+  if (KRAL_GetAvailablePhonesPortList(&count, ports.data(), 0, nullptr) == 0) count = 0;
+  ports.resize(count);
+  return ports;
+}
+
+Session::Session(const SessionOptions& options) : port_(0), handle_(0) {
+  if (!options.log_file.empty()) CheckLogFile(options.log_file);
+  KRAL_SetDefaultReceiveMode(kWakeOnData);
+  port_ = options.port.empty() ? TheOnlyPort() : ParsePort(options.port);
+  ThrowIfInterrupted();
+  handle_ = KRAL_ConnectServer(port_);
+  if (handle_ == 0) {
+    throw ToolError(ExitCode::kInternal, fmt::format("no connection to {} could be made", DescribePort(port_)),
+                    "close other programs that use the library, then run the command again");
+  }
+  try {
+    StartLog(options);
+    if (options.time_out_ms) {
+      const auto milliseconds = static_cast<std::int32_t>(*options.time_out_ms);
+      KRAL_ConfigureTimeOut(handle_, kTimeOutCommand, milliseconds);
+      KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, milliseconds);
+    }
+    CheckAnswers();
+  } catch (...) {
+    KRAL_DisconnectServer(handle_);
+    throw;
+  }
+}
+
+Session::~Session() {
+  KRAL_ConfigureLibraryTextLogCallBack(handle_, nullptr);
+  KRAL_DisconnectServer(handle_);
+}
+
+void Session::StartLog(const SessionOptions& options) const {
+  CollectErrorLines(handle_);
+  const bool to_file = !options.log_file.empty();
+  // What failures are explained from is always on.
+  if (options.log_flags || !to_file) KRAL_SetLogFlags(handle_, options.log_flags.value_or(0) | kExplainingLines);
+  if (to_file) KRAL_StartLogging(handle_, options.log_file.c_str());
+}
+
+void Session::CheckAnswers() const {
+  if (KRAL_IsPhoneConnected(handle_) != 0) return;
+  ThrowIfInterrupted();
+  if (const auto trouble = PortTrouble(handle_)) throw ExplainPort(port_, *trouble, false);
+  throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
+                  "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
+                  "longer, --log FILE shows what came");
+}
+
+void Session::Begin() {
+  ThrowIfInterrupted();
+  ForgetErrorLines();
+}
+
+ToolError Session::Explain(std::string_view what) const {
+  if (Interrupted()) return InterruptedError();
+  const auto lines = ErrorLines();
+  const auto find = [&lines](std::string_view part) {
+    return std::find_if(lines.rbegin(), lines.rend(),
+                        [part](const std::string& line) { return line.find(part) != std::string::npos; });
+  };
+  const auto where = fmt::format("{} on {}", what, DescribePort(port_));
+
+  if (const auto refusal = find("ERROR:\tDIAG_BAD_"); refusal != lines.rend()) {
+    return {ExitCode::kRefused, fmt::format("the handset refused {}: {}", where, refusal->substr(7)),
+            "the command may need another mode (kral mode), an unlock, or other firmware"};
+  }
+  if (find("Received different response command byte") != lines.rend()) {
+    return {ExitCode::kLink, fmt::format("{} was answered with something else", where),
+            "check that no other program talks to the handset; --log FILE shows the traffic"};
+  }
+  // The connection may have ended for a time-out, or because there is no handset any more: asking tells.
+  const bool answers = KRAL_IsPhoneConnected(handle_) != 0;
+  const auto trouble = PortTrouble(handle_);
+  if (!answers && trouble) return ExplainPort(port_, *trouble, true);
+  if (find("mode switching status polling has timeout") != lines.rend()) {
+    return {ExitCode::kNoAnswer, fmt::format("the handset took {} but does not report the new mode", where),
+            "it may still be switching: ask with kral mode get"};
+  }
+  if (find("Request timed out") != lines.rend()) {
+    return {ExitCode::kNoAnswer, fmt::format("no answer in time to {}", where),
+            answers ? "the handset still answers other requests; --time-out MS waits longer"
+                    : "the handset answers nothing any more: check cable and power"};
+  }
+  if (find("Error. Send data failed.") != lines.rend()) {
+    return {ExitCode::kLink, fmt::format("{} could not be written", where), "check the cable and try again"};
+  }
+  return {ExitCode::kLink,
+          fmt::format("{} failed{}{}", where, lines.empty() ? "" : ": ", lines.empty() ? "" : Printable(lines.back())),
+          "--log FILE shows the traffic"};
+}
+
+void Session::Fail(std::string_view what) const {
+  throw Explain(what);
+}
+
+}  // namespace kral::tool

@@ -1,0 +1,65 @@
+// One connection to one handset for the length of a verb, and why things went wrong on it.
+#ifndef KRAL_TOOLS_SESSION_H
+#define KRAL_TOOLS_SESSION_H
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "kral/kral.h"
+#include "tools/kral/exit_codes.h"
+
+namespace kral::tool {
+
+struct SessionOptions {
+  std::string port;  // empty: the only port on which a handset answers
+  std::string log_file;
+  std::optional<std::uint32_t> log_flags;
+  std::optional<std::uint32_t> time_out_ms;  // of every request
+};
+
+// "7", "COM7"; ToolError kUsage for anything else.
+std::uint16_t ParsePort(std::string_view text);
+// "COM7", with the device behind it where that is a different name.
+std::string DescribePort(std::uint16_t port);
+
+std::vector<std::uint16_t> ListPorts();
+std::vector<std::uint16_t> ListPortsWithHandset();
+
+class Session {
+ public:
+  // Connects and checks that a handset answers; ToolError when not.
+  explicit Session(const SessionOptions& options);
+  ~Session();
+  Session(const Session&) = delete;
+  Session& operator=(const Session&) = delete;
+
+  KRAL_HANDLE handle() const { return handle_; }
+  std::uint16_t port() const { return port_; }
+
+  // To be called before a request, so that Explain speaks of that request only; also the place where Ctrl-C takes
+  // effect.
+  void Begin();
+  // Why the request that has just failed did so, in an error that names the port and `what`.
+  ToolError Explain(std::string_view what) const;
+  // Begin, the request, and the error if it gives 0.
+  template <class Request>
+  void Run(std::string_view what, Request&& request) {
+    Begin();
+    if (request() == 0) Fail(what);
+  }
+
+ private:
+  [[noreturn]] void Fail(std::string_view what) const;
+  void StartLog(const SessionOptions& options) const;
+  void CheckAnswers() const;
+
+  std::uint16_t port_;
+  KRAL_HANDLE handle_;
+};
+
+}  // namespace kral::tool
+
+#endif

@@ -1,0 +1,121 @@
+// kral sim: a virtual handset on a pseudo terminal, for as long as it is wanted.
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <cctype>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "handset/pty_cable.h"
+#include "handset/virtual_handset.h"
+#include "platform/clock.h"
+#include "tools/kral/interrupt.h"
+#include "tools/kral/sim_faults.h"
+#include "tools/kral/verbs.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint32_t kWatchIntervalMs = 20;
+constexpr std::size_t kServiceCodeSize = 6;
+
+struct SimOptions {
+  handset::Identity identity;
+  std::uint16_t switches = 0;
+  bool switches_given = false;
+  std::uint32_t switching_delay_ms = 0;
+  std::uint32_t reset_time_ms = 0;
+  std::uint32_t back_after_ms = 0;  // 0: a handset that hung up stays away
+  std::vector<std::string> faults;
+  double bit_errors = 0;
+  std::uint64_t seed = 1;
+  std::string link;
+};
+
+void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
+  if (options.switches_given) handset.maintenance().SetSwitches(options.switches);
+  handset.mode().SetSwitchingDelay(options.switching_delay_ms);
+  handset.mode().SetResetTime(options.reset_time_ms);
+  handset.faults().SetSeed(options.seed);
+  handset.faults().SetBitErrorRate(options.bit_errors);
+  for (const auto& fault : options.faults) AddFault(handset.faults(), fault);
+  handset.KeepTrace(false);  // nobody asks for it, and it would grow without end
+}
+
+// Until Ctrl-C; what hung up is plugged in again when that was asked for.
+void Serve(handset::VirtualHandset& handset, const SimOptions& options) {
+  Clock& clock = SystemClock();
+  bool away = false;
+  std::uint32_t since = 0;
+  while (!Interrupted()) {
+    clock.SleepMs(kWatchIntervalMs);
+    if (!handset.vanished()) {
+      away = false;
+    } else if (!away) {
+      away = true;
+      since = clock.TickMs();
+    } else if (options.back_after_ms != 0 && clock.TickMs() - since >= options.back_after_ms) {
+      handset.PlugIn();
+    }
+  }
+}
+
+void Simulate(const Context& context, const SimOptions& options) {
+  handset::VirtualHandset handset(options.identity);
+  Prepare(handset, options);
+  std::string error;
+  const auto cable = handset::PtyCable::Attach(handset, options.link, error);
+  if (!cable) {
+    throw ToolError(ExitCode::kUsage, fmt::format("the handset cannot be put on a pseudo terminal: {}", error),
+                    "kral sim needs Linux, and a --link that can be made");
+  }
+  context.out.Result({{"device", cable->device_path()}}, cable->device_path() + "\n");
+  Serve(handset, options);
+}
+
+bool IsServiceCode(const std::string& text) {
+  return text.size() == kServiceCodeSize &&
+         std::all_of(text.begin(), text.end(), [](unsigned char character) { return std::isdigit(character) != 0; });
+}
+
+void AddOptions(CLI::App& sim, SimOptions& options) {
+  auto& identity = options.identity;
+  sim.add_option("--esn", identity.serial_number, "Electronic serial number")->capture_default_str();
+  sim.add_option("--model", identity.model, "Model text of the build identity")->capture_default_str();
+  sim.add_option("--software", identity.software_revision, "Software revision text")->capture_default_str();
+  sim.add_option("--hardware", identity.hardware_version, "Hardware version")->capture_default_str();
+  sim.add_option("--directory", identity.version_directory, "Version directory, 8 characters")->capture_default_str();
+  sim.add_option("--spc", identity.service_code, "Service programming code, six digits")
+      ->capture_default_str()
+      ->check([](const std::string& text) { return IsServiceCode(text) ? "" : "six digits are needed"; });
+  sim.add_option_function<std::uint16_t>(
+      "--switches",
+      [&options](std::uint16_t switches) {
+        options.switches = switches;
+        options.switches_given = true;
+      },
+      "Switch word");
+  sim.add_option("--switching-delay", options.switching_delay_ms, "Milliseconds until a new mode is reported");
+  sim.add_option("--reset-time", options.reset_time_ms, "Milliseconds of silence after a reset");
+  sim.add_option("--fault", options.faults, "Misbehaviour, see below; may be given several times")
+      ->take_all()
+      ->allow_extra_args(false);
+  sim.add_option("--bit-errors", options.bit_errors, "Probability of an error per bit sent")->check(CLI::Range(0., 1.));
+  sim.add_option("--seed", options.seed, "Of everything random")->capture_default_str();
+  sim.add_option("--back-after", options.back_after_ms, "Milliseconds after which a handset that hung up is back");
+  sim.add_option("--link", options.link, "Keep a symbolic link of this name to the device");
+}
+
+}  // namespace
+
+void AddSimVerbs(CLI::App& app, Context& context) {
+  const auto options = std::make_shared<SimOptions>();
+  auto* sim = app.add_subcommand("sim", "Simulate a handset; its device is the first line of the output");
+  AddOptions(*sim, *options);
+  sim->footer(DescribeFaults);
+  sim->callback([&context, options] { context.run = [&context, options] { Simulate(context, *options); }; });
+}
+
+}  // namespace kral::tool
