@@ -101,6 +101,7 @@ class Diag_FTM {
 
   FtmSettings& ftm() { return ftm_; }
   const FtmSettings& ftm() const { return ftm_; }
+  EfsSettings& efs() { return efs_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
@@ -126,6 +127,7 @@ class Diag_FTM {
   std::shared_ptr<Parts> parts_;
   std::array<CDiagPacket, 3> packets_;
   FtmSettings ftm_;
+  EfsSettings efs_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
 
   OpenArguments last_open_;

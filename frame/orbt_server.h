@@ -15,6 +15,7 @@
 #include <string>
 #include <vector>
 
+#include "frame/efs_server.h"
 #include "transport/packet_listener.h"
 
 namespace kral {
@@ -55,6 +56,7 @@ class SoftwareDownload {
 struct ServerFactory {
   std::function<std::unique_ptr<OrbtServer>(const char* name)> make_server;
   std::function<std::unique_ptr<SoftwareDownload>(const char* name, OrbtServer& server)> make_software_download;
+  std::function<std::unique_ptr<EfsServer>(const char* name)> make_efs_server = {};
 };
 
 // Library-wide; empty functions mean that there is no server.

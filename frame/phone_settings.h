@@ -2,7 +2,10 @@
 #ifndef KRAL_FRAME_PHONE_SETTINGS_H
 #define KRAL_FRAME_PHONE_SETTINGS_H
 
+#include <atomic>
 #include <cstdint>
+
+#include "kral/efs.h"
 
 namespace kral {
 
@@ -19,6 +22,17 @@ struct FtmSettings {
   uint32_t queue_mode = 0;            // 1: requests are collected by the sequencer instead of being sent
   uint16_t sequence_id = 0;           // given to the request collected last
   FtmSequencer* sequencer = nullptr;  // not owned; none: every request goes out at once
+};
+
+// Set from any thread, also while a transfer runs.
+struct EfsSettings {
+  std::atomic<uint16_t> read_packet_size{536};
+  std::atomic<uint16_t> write_packet_size{524};
+  std::atomic<bool> abort{false};
+  std::atomic<KRAL_EFS_TRANSFER_CALLBACK> transfer_callback{nullptr};
+  std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
+  std::atomic<KRAL_HANDLE> callback_context{0};
+  uint32_t packet_time_out_ms = 2000;  // of writes, listings and mkdir; shorter in tests only
 };
 
 }  // namespace kral

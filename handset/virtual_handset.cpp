@@ -30,13 +30,14 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       line_(clock),
       wire_(std::make_unique<HandsetWire>(*this)),
       nv_(std::make_shared<NvStore>(identity.serial_number)),
+      efs_(std::make_shared<EfsService>()),
       mode_service_(std::make_shared<OperatingMode>(*nv_, clock)),
       ftm_(std::make_shared<FtmService>(*mode_service_)),
       memory_(std::make_shared<Memory>()),
       maintenance_(std::make_shared<Maintenance>(identity.service_code)) {
   identity_ = std::make_shared<IdentityService>(std::move(identity));
-  for (const std::shared_ptr<Service>& service :
-       std::initializer_list<std::shared_ptr<Service>>{identity_, nv_, mode_service_, ftm_, memory_, maintenance_}) {
+  for (const std::shared_ptr<Service>& service : std::initializer_list<std::shared_ptr<Service>>{
+           identity_, nv_, efs_, mode_service_, ftm_, memory_, maintenance_}) {
     AddServiceLocked(service);
   }
 }

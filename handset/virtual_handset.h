@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "handset/bytes.h"
+#include "handset/efs_service.h"
 #include "handset/faults.h"
 #include "handset/frame_codec.h"
 #include "handset/ftm_service.h"
@@ -79,6 +80,7 @@ class VirtualHandset {
   Memory& memory() { return *memory_; }
   Maintenance& maintenance() { return *maintenance_; }
   NvStore& nv() { return *nv_; }
+  EfsService& efs() { return *efs_; }
   Clock& clock() { return clock_; }
 
   // --- What it has heard ------------------------------------------------------------------------------------------
@@ -122,6 +124,7 @@ class VirtualHandset {
 
   std::shared_ptr<IdentityService> identity_;
   std::shared_ptr<NvStore> nv_;
+  std::shared_ptr<EfsService> efs_;
   std::shared_ptr<OperatingMode> mode_service_;
   std::shared_ptr<FtmService> ftm_;
   std::shared_ptr<Memory> memory_;

@@ -26,6 +26,7 @@
 #include "kral/band.h"
 #include "kral/connection.h"
 #include "kral/diag.h"
+#include "kral/efs.h"
 #include "kral/ftm.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"

@@ -1,0 +1,111 @@
+// What the file system and the memory under it tell about themselves, and its golden copy.
+#include <algorithm>
+#include <array>
+#include <cstring>
+
+#include "commands/outputs.h"
+#include "storage/efs_client.h"
+#include "storage/efs_request.h"
+
+namespace kral::efs {
+namespace {
+
+// False also when the reply is too short for its fields.
+bool AskStatus(Diag_FTM& phone, const char* path, u32& error, KRAL_EFS_STATFS& status) {
+  if (!Ask(phone, kFileSystemStatus, PathField(path))) return false;
+  CDiagPacket& reply = phone.packet();
+  // From the end of the reply backwards.
+  for (u32* field : {&status.max_file_count, &status.file_count, &status.max_file_size, &status.free_blocks,
+                     &status.available_blocks, &status.total_blocks, &status.block_size, &status.type,
+                     &status.file_system_id, &error}) {
+    if (!reply.Read32(*field)) return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+bool FileSystemStatus(Diag_FTM& phone, const char* path, u32* error_number, KRAL_EFS_STATFS* status) {
+  u32 error = 0;
+  KRAL_EFS_STATFS answer{};
+  if (!AskStatus(phone, path, error, answer)) return false;
+  if (error == kDone) Put(status, answer);
+  Put(error_number, error);
+  return true;
+}
+
+bool UsedSpace(Diag_FTM& phone, const char* path, uint64_t* used) {
+  u32 error = 0;
+  KRAL_EFS_STATFS status{};
+  if (!AskStatus(phone, path, error, status)) return false;
+  if (error != kDone) {
+    phone.log().WriteLine(kLogErr, "EFS Command Returned Error Number: %d, Verify file/directory exists",
+                          static_cast<int>(error));
+    return false;
+  }
+  // A handset that counts more free blocks than it has uses none.
+  const u32 used_blocks = status.total_blocks - std::min(status.free_blocks, status.total_blocks);
+  const uint64_t bytes = uint64_t{used_blocks} * status.block_size;
+  phone.log().WriteLine(kLogRet, "Space used is: %lld bytes", static_cast<long long>(bytes));
+  Put(used, bytes);
+  return true;
+}
+
+bool DeviceInfo(Diag_FTM& phone, u32* error_number, KRAL_EFS_DEVICE_INFO* info) {
+  u32 error = 0;
+  if (!Ask(phone, kDeviceInfo) || !phone.packet().ResponseAt32(kErrorBehindHeader, error)) return false;
+  if (error == kDone) {
+    KRAL_EFS_DEVICE_INFO answer{};
+    size_t offset = device_info::kFields;
+    for (u32* field : {&answer.total_blocks, &answer.pages_per_block, &answer.page_size, &answer.total_page_size,
+                       &answer.maker_id, &answer.device_id, &answer.device_type}) {
+      if (!phone.packet().ResponseAt32(offset, *field)) return false;
+      offset += sizeof(u32);
+    }
+    const auto name = TextAt(phone.packet().response(), device_info::kName);
+    if (!name) return false;
+    name->copy(answer.name, sizeof(answer.name) - 1);
+    Put(info, answer);
+  }
+  Put(error_number, error);
+  return true;
+}
+
+bool ExtendedInfo(Diag_FTM& phone, u32 query, u32* error_number, u32* data_type, u32* number, char* text,
+                  u32 text_size) {
+  u32 error = 0;
+  if (!Ask(phone, kExtendedInfo, query)) return false;
+  const CDiagPacket& reply = phone.packet();
+  if (!reply.ResponseAt32(kErrorBehindHeader, error)) return false;
+  if (error == kDone) {
+    u32 type = 0;
+    u32 value = 0;
+    std::optional<std::string> answer;
+    if (!reply.ResponseAt32(extended_info::kDataType, type)) return false;
+    if (type == extended_info::kNumber) {
+      if (!reply.ResponseAt32(extended_info::kData, value)) return false;
+      Put(number, value);
+    } else if (type == extended_info::kText) {
+      answer = TextAt(reply.response(), extended_info::kData);
+      if (!answer || (text != nullptr && answer->size() >= text_size)) return false;
+      if (text != nullptr) std::memcpy(text, answer->c_str(), answer->size() + 1);
+    } else {
+      phone.log().WriteLine(kLogErr, "KRAL_EFS2_DIAG_EXTENDED_INFO( ) -- Error: invalid data return type");
+      return false;
+    }
+    Put(data_type, type);
+  }
+  Put(error_number, error);
+  return true;
+}
+
+bool MakeGoldenCopy(Diag_FTM& phone, const char* path, u32* error_number) {
+  u32 error = 0;
+  if (!Ask(phone, kMakeGoldenCopy, PathField(path)) || !phone.packet().Read32(error)) return false;
+  phone.log().WriteLine(error == kDone ? kLogRet : kLogErr, "KRAL_EFS2_EFS2_DIAG_MAKE_GOLDEN_COPY: ERRNO=%d",
+                        static_cast<int>(error));
+  Put(error_number, error);
+  return true;
+}
+
+}  // namespace kral::efs

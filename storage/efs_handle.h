@@ -1,0 +1,51 @@
+// An open file or directory of the handset. The handset has few of them, so each is closed on every way out.
+#ifndef KRAL_STORAGE_EFS_HANDLE_H
+#define KRAL_STORAGE_EFS_HANDLE_H
+
+#include "storage/efs_format.h"
+
+namespace kral::efs {
+
+class RemoteHandle {
+ public:
+  ~RemoteHandle() { Close(); }
+  RemoteHandle(const RemoteHandle&) = delete;
+  RemoteHandle& operator=(const RemoteHandle&) = delete;
+
+  bool Close();  // true when the handset confirmed it, and when nothing is open
+  u32 value() const { return value_; }
+
+ protected:
+  RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 time_out_ms)
+      : phone_(phone), close_(close), time_out_ms_(time_out_ms) {}
+
+  // Sends the opening request that the phone's packet buffer holds.
+  bool OpenWithRequest();
+
+  Diag_FTM& phone_;
+
+ private:
+  void CloseStrays(int unanswered);
+  bool CloseValue(u32 value);
+
+  const EfsRequest<u32> close_;
+  const u32 time_out_ms_;
+  u32 value_ = 0;
+  bool open_ = false;
+};
+
+class RemoteFile final : public RemoteHandle {
+ public:
+  explicit RemoteFile(Diag_FTM& phone);
+  bool Open(const char* path, u32 flags, u32 mode);  // a failure is logged
+};
+
+class RemoteDirectory final : public RemoteHandle {
+ public:
+  explicit RemoteDirectory(Diag_FTM& phone);
+  bool Open(const char* path);
+};
+
+}  // namespace kral::efs
+
+#endif

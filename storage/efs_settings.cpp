@@ -1,0 +1,26 @@
+// The EFS settings of a phone object. They are read by a transfer as it goes, so none of this waits for one.
+#include "storage/efs_client.h"
+
+namespace kral::efs {
+
+bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size) {
+  // Not tested here: a size that cannot work fails the transfer that uses it.
+  phone.efs().read_packet_size = read_size;
+  phone.efs().write_packet_size = write_size;
+  return true;
+}
+
+bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
+                  KRAL_EFS_DIRECTORY_CALLBACK directory) {
+  phone.efs().callback_context = context;
+  phone.efs().transfer_callback = transfer;
+  phone.efs().directory_callback = directory;
+  return true;
+}
+
+bool Abort(Diag_FTM& phone) {
+  phone.efs().abort = true;
+  return true;
+}
+
+}  // namespace kral::efs
