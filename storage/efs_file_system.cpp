@@ -13,14 +13,9 @@ namespace {
 // False also when the reply is too short for its fields.
 bool AskStatus(Diag_FTM& phone, const char* path, u32& error, KRAL_EFS_STATFS& status) {
   if (!Ask(phone, kFileSystemStatus, PathField(path))) return false;
-  CDiagPacket& reply = phone.packet();
-  // From the end of the reply backwards.
-  for (u32* field : {&status.max_file_count, &status.file_count, &status.max_file_size, &status.free_blocks,
-                     &status.available_blocks, &status.total_blocks, &status.block_size, &status.type,
-                     &status.file_system_id, &error}) {
-    if (!reply.Read32(*field)) return false;
-  }
-  return true;
+  return ReadFromEnd(phone, {&status.max_file_count, &status.file_count, &status.max_file_size, &status.free_blocks,
+                             &status.available_blocks, &status.total_blocks, &status.block_size, &status.type,
+                             &status.file_system_id, &error});
 }
 
 }  // namespace
@@ -101,7 +96,7 @@ bool ExtendedInfo(Diag_FTM& phone, u32 query, u32* error_number, u32* data_type,
 
 bool MakeGoldenCopy(Diag_FTM& phone, const char* path, u32* error_number) {
   u32 error = 0;
-  if (!Ask(phone, kMakeGoldenCopy, PathField(path)) || !phone.packet().Read32(error)) return false;
+  if (!Ask(phone, kMakeGoldenCopy, PathField(path)) || !ReadFromEnd(phone, {&error})) return false;
   phone.log().WriteLine(error == kDone ? kLogRet : kLogErr, "KRAL_EFS2_EFS2_DIAG_MAKE_GOLDEN_COPY: ERRNO=%d",
                         static_cast<int>(error));
   Put(error_number, error);

@@ -28,7 +28,7 @@ bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const u8* buffer, 
   if (!IsPathWithinLimit(phone, path)) return false;
   Compose(phone, kPutItem, size, kItemFlags, kItemSequence, Bytes(buffer, size), path);
   u32 error = 0;
-  return Exchange(phone, DefaultTimeOut(phone)) && phone.packet().Read32(error) && error == kDone;
+  return Exchange(phone, DefaultTimeOut(phone)) && ReadFromEnd(phone, {&error}) && error == kDone;
 }
 
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {

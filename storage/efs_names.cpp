@@ -13,7 +13,7 @@ template <class... Fields>
 bool AskForError(Diag_FTM& phone, u32* error_number, const EfsRequest<Fields...>& row,
                  std::type_identity_t<Field<Fields>>... fields) {
   u32 error = 0;
-  if (!Ask(phone, row, fields...) || !phone.packet().Read32(error)) return false;
+  if (!Ask(phone, row, fields...) || !ReadFromEnd(phone, {&error})) return false;
   Put(error_number, error);
   return true;
 }
@@ -27,11 +27,9 @@ bool FileStatus::is_item_file() const {
 bool Stat(Diag_FTM& phone, const char* path, FileStatus& status) {
   if (!Ask(phone, kStat, PathField(path))) return false;
   FileStatus s;
-  CDiagPacket& reply = phone.packet();
-  // From the end of the reply backwards.
-  for (u32* field :
-       {&s.change_time, &s.modify_time, &s.access_time, &s.link_count, &s.size, &s.mode, &s.error_number}) {
-    if (!reply.Read32(*field)) return false;
+  if (!ReadFromEnd(
+          phone, {&s.change_time, &s.modify_time, &s.access_time, &s.link_count, &s.size, &s.mode, &s.error_number})) {
+    return false;
   }
   status = s;
   phone.log().WriteLine(kLogRet,

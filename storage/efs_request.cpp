@@ -55,6 +55,12 @@ bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const std::function<bool(st
   return false;
 }
 
+bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields) {
+  CDiagPacket& packet = phone.packet();
+  if (packet.response_length() < kHeaderSize + fields.size() * sizeof(u32)) return false;
+  return std::all_of(fields.begin(), fields.end(), [&](u32* field) { return packet.Read32(*field); });
+}
+
 u8 LastRefusal(Diag_FTM& phone) {
   constexpr u8 kRefusals[] = {kBadCommand, 20, 21, 24};
   u8 code = 0;

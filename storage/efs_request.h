@@ -3,6 +3,7 @@
 #define KRAL_STORAGE_EFS_REQUEST_H
 
 #include <functional>
+#include <initializer_list>
 #include <optional>
 #include <string>
 
@@ -25,6 +26,9 @@ bool IsWithinLimit(Diag_FTM& phone);
 bool Exchange(Diag_FTM& phone, u32 time_out_ms);
 // Sends until a reply is accepted. Each try opens a port that an earlier one's time-out has closed.
 bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const std::function<bool(std::span<const u8> reply)>& accepts);
+
+// Reads double words from the end of the reply backwards; false when it does not hold that many behind its header.
+bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields);
 
 // The code by which the handset refused the last try (19, 20, 21, 24); 0 when it did not.
 u8 LastRefusal(Diag_FTM& phone);
