@@ -209,7 +209,7 @@ class FloodSource {
 };
 
 void Flood(benchmark::State& state) {
-  constexpr size_t kPackets = 100000;
+  constexpr int64_t kPackets = 100000;
   KRAL_SetDefaultReceiveMode(static_cast<uint8_t>(state.range(0)));
   FloodSource source;
   const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(
@@ -218,16 +218,16 @@ void Flood(benchmark::State& state) {
   phone->sorter().SetCollection(true);
   PacketQueue& queue = phone->asynchronous();
   for (auto _ : state) {
-    source.Release(kPackets);
+    source.Release(static_cast<size_t>(kPackets));
     // The reader drains as the flood comes; what it is late for counts as arrived, and is told.
-    size_t taken = 0;
+    uint64_t taken = 0;
     const uint64_t dropped = queue.dropped();
-    while (taken + (queue.dropped() - dropped) < kPackets) {
+    while (taken + (queue.dropped() - dropped) < static_cast<uint64_t>(kPackets)) {
       if (queue.PopWithin(std::chrono::milliseconds(100))) ++taken;
     }
     state.counters["dropped"] = static_cast<double>(queue.dropped() - dropped);
   }
-  state.SetItemsProcessed(static_cast<int64_t>(state.iterations() * kPackets));
+  state.SetItemsProcessed(static_cast<int64_t>(state.iterations()) * kPackets);
   KRAL_DisconnectServer(handle);
 }
 BENCHMARK(Flood)->ArgName("mode")->Arg(0)->Arg(1)->UseRealTime();
