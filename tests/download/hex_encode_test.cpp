@@ -102,7 +102,7 @@ TEST(HexEncoder, StartRecordsFollowTheFlags) {
 }
 
 TEST(HexEncoder, TakesImagesWithOneRegion) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   PhoneImageBinary image;
   ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789abcdefX")));
   EXPECT_EQ(Encode(image, kLinear),

@@ -56,7 +56,7 @@ class HexOracle : public testing::Test {
     return bytes;
   }
 
-  const tests::TempFolder folder_;
+  const test::TempFolder folder_;
   std::mt19937 random_{2024};
 };
 

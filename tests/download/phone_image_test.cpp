@@ -120,7 +120,7 @@ TEST(PagedMemory, ASecondReservationMayNotBeLarger) {
 }
 
 TEST(BinaryImage, ShowsTheFileWithinItsBounds) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   PhoneImageBinary image;
   ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789")));
   EXPECT_EQ(image.GetTotalSize(), 10u);
@@ -145,7 +145,7 @@ TEST(BinaryImage, ShowsTheFileWithinItsBounds) {
 }
 
 TEST(BinaryImage, RefusesWritesAndOtherRegions) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   PhoneImageBinary image;
   ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789")));
   ExpectThrow("Write Failure", 0, 10, Kind::kWriteOrAllocation, [&] { image.Clear(); });
@@ -159,7 +159,7 @@ TEST(BinaryImage, RefusesWritesAndOtherRegions) {
 }
 
 TEST(BinaryImage, MissingAndEmptyFilesAreRefused) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   PhoneImageBinary image;
   EXPECT_FALSE(image.Open(folder.Path("missing.bin")));
   EXPECT_NE(image.last_error(), 0u);
@@ -170,7 +170,7 @@ TEST(BinaryImage, MissingAndEmptyFilesAreRefused) {
 }
 
 TEST(MappedFile, AWritableViewChangesTheFile) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   const std::string path = folder.Add("file", "before");
   CMapFileToMemory file;
   EXPECT_EQ(file.Size(), 0u);

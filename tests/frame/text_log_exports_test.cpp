@@ -21,13 +21,13 @@ class TextLogExports : public testing::Test {
  protected:
   static std::string Body(const std::string& line) { return line.substr(line.find('\t') + 2); }
   Lines Bodies(const std::string& name) const {
-    Lines lines = tests::TextLines(folder_.Content(name));
+    Lines lines = test::TextLines(folder_.Content(name));
     for (auto& line : lines) line = Body(line);
     return lines;
   }
 
   test::HandsetPorts ports_;
-  tests::TempFolder folder_;
+  test::TempFolder folder_;
   const KRAL_HANDLE handle_ = KRAL_ConnectServer(3);
 };
 

@@ -38,11 +38,11 @@ class TextLog : public testing::Test {
   // The line without its time stamp and the comma behind that.
   static std::string Body(const std::string& line) { return line.substr(line.find('\t') + 2); }
 
-  std::vector<std::string> FileLines(const std::string& name) const { return tests::TextLines(folder_.Content(name)); }
+  std::vector<std::string> FileLines(const std::string& name) const { return test::TextLines(folder_.Content(name)); }
 
   static inline TextLog* current_ = nullptr;
   test::FakeClock clock_;
-  tests::TempFolder folder_;
+  test::TempFolder folder_;
   DataLogFileHandler log_{clock_};
   std::vector<Record> records_;
 };

@@ -115,7 +115,7 @@ const StationFile kStationFiles[] = {
 };
 
 TEST_F(TimeOuts, StationFileSetsTheConnectDelay) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   const auto home = std::filesystem::current_path();
   std::filesystem::current_path(std::filesystem::path(folder.Path("here")).parent_path());
   for (const auto& file : kStationFiles) {

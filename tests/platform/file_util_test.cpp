@@ -24,7 +24,7 @@ size_t FilesIn(const std::string& folder) {
 }
 
 TEST(ReadWholeFileTest, GivesFilesUpToTheLimitAndNothingOfLongerOnes) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   const std::string large(200000, 'x');
   struct Case {
     std::string content;
@@ -43,13 +43,13 @@ TEST(ReadWholeFileTest, GivesFilesUpToTheLimitAndNothingOfLongerOnes) {
 }
 
 TEST(ReadWholeFileTest, AMissingFileIsNoSuchFile) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   Bytes bytes;
   EXPECT_EQ(ReadWholeFile(folder.Path("none"), 10, bytes), std::errc::no_such_file_or_directory);
 }
 
 TEST(AtomicFileTest, TheTargetChangesWithTheCommitOnly) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   const std::string path = folder.Add("target", "old");
   AtomicFile file;
   ASSERT_FALSE(file.Open(path));
@@ -64,7 +64,7 @@ TEST(AtomicFileTest, TheTargetChangesWithTheCommitOnly) {
 }
 
 TEST(AtomicFileTest, WithoutACommitNothingIsLeft) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   {
     AtomicFile file;
     ASSERT_FALSE(file.Open(folder.Path("target")));
@@ -74,7 +74,7 @@ TEST(AtomicFileTest, WithoutACommitNothingIsLeft) {
 }
 
 TEST(AtomicFileTest, TwoWritersOfOneTargetDoNotMix) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   AtomicFile first;
   AtomicFile second;
   ASSERT_FALSE(first.Open(folder.Path("target")));
@@ -87,7 +87,7 @@ TEST(AtomicFileTest, TwoWritersOfOneTargetDoNotMix) {
 }
 
 TEST(AtomicFileTest, ATargetThatCannotBeReplacedStaysAndLeavesNoRest) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   std::filesystem::create_directories(folder.Path("target/inner"));
   EXPECT_TRUE(ReplaceWholeFile(folder.Path("target"), Of("text")));
   EXPECT_EQ(FilesIn(folder.Path("")), 1u);

@@ -5,7 +5,7 @@
 
 #include <cstdint>
 
-namespace kral::tests {
+namespace kral::test {
 
 struct EdgePair {
   int32_t first;
@@ -133,6 +133,6 @@ inline constexpr BandEdges kBandEdges[] = {
     {1007, {11500, 12000, 2300, 2400}, {11500, 12000, 2300, 2400}},
 };
 
-}  // namespace kral::tests
+}  // namespace kral::test
 
 #endif

@@ -15,9 +15,9 @@
 namespace kral {
 namespace {
 
-using tests::BandEdges;
-using tests::EdgePair;
-using tests::kBandEdges;
+using test::BandEdges;
+using test::EdgePair;
+using test::kBandEdges;
 
 struct Side {
   const char* name;

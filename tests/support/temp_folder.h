@@ -10,7 +10,7 @@
 #include <string_view>
 #include <system_error>
 
-namespace kral::tests {
+namespace kral::test {
 
 class TempFolder {
  public:
@@ -44,6 +44,6 @@ class TempFolder {
   std::filesystem::path path_;
 };
 
-}  // namespace kral::tests
+}  // namespace kral::test
 
 #endif

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-namespace kral::tests {
+namespace kral::test {
 
 inline std::vector<std::string> TextLines(const std::string& text) {
   std::vector<std::string> lines;
@@ -18,6 +18,6 @@ inline std::vector<std::string> TextLines(const std::string& text) {
   return lines;
 }
 
-}  // namespace kral::tests
+}  // namespace kral::test
 
 #endif

@@ -38,7 +38,7 @@ class PortListTest : public testing::Test {
     return ports;
   }
 
-  tests::TempFolder folder_;
+  test::TempFolder folder_;
   PortSources sources_;
 };
 

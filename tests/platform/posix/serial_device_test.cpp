@@ -98,7 +98,7 @@ TEST_F(SerialDeviceTest, ASecondOpenerIsBusyUntilTheFirstCloses) {
 }
 
 TEST_F(SerialDeviceTest, WhatIsNoSerialDeviceIsNoSuchPort) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   for (const auto& path : {folder.Add("file", "text"), folder.Path("missing"), std::string("/dev/null")}) {
     SetEnvironmentValue(kVariable, path);
     EXPECT_FALSE(Open()) << path;

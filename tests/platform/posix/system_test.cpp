@@ -40,7 +40,7 @@ TEST(NamedMutexMarkTest, AReleasedValueDoesNotComeBackWithTheNext) {
 }
 
 TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   const std::string name = "kral-test-process-of-its-own";
   std::filesystem::copy_file("/bin/sleep", folder.Path(name));
   std::string seconds = "60";

@@ -76,7 +76,7 @@ TEST(MessagePumpTest, MessagesAreTakenAndTheEndOfTheHostIsLeftToIt) {
 }
 
 TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
-  const tests::TempFolder folder;
+  const test::TempFolder folder;
   std::array<char, MAX_PATH> self{};
   ::GetModuleFileNameA(nullptr, self.data(), static_cast<DWORD>(self.size()));
   const std::string program = folder.Path("KralTestProcess.exe");
