@@ -243,6 +243,33 @@ class Requests(ToolTest):
 
 
 class Simulation(ToolTest):
+    def test_ftm_commands_need_factory_test_mode_and_answer_in_it(self):
+        with handset() as sim:
+            ports = {7: sim.device}
+            self.expect(7, "-p", "7", "ftm", "chan", "9612", ports=ports)
+            self.expect(0, "-p", "7", "mode", "ftm", ports=ports)
+            answer = self.expect_json(0, "-p", "7", "ftm", "mode", "10", ports=ports)
+            self.assertEqual((answer["rf_mode"], answer["mode_id"]), (10, 2))
+            self.expect(0, "-p", "7", "ftm", "chan", "9750", "--rf-mode", "9", ports=ports)
+            self.expect(0, "-p", "7", "ftm", "tx", "on", ports=ports)
+            self.expect(0, "-p", "7", "ftm", "cmd", "SET_TX_POWER_DBM", "D0", "07", ports=ports)
+            answer = self.expect_json(0, "-p", "7", "ftm", "cmd", "GET_HDET_FROM_TX_SWEEP_CAL", ports=ports)
+            self.assertEqual(len(answer["response"].split()), 2)
+            self.expect(0, "-p", "7", "ftm", "--code", "59", "cmd", "53", ports=ports)
+            self.expect(2, "-p", "7", "ftm", "cmd", "NO_SUCH_COMMAND", ports=ports)
+            self.expect(2, "-p", "7", "ftm", "mode", "9", "--code", "60", ports=ports)
+
+    def test_ftm_list_and_bands_need_no_handset(self):
+        commands = self.expect_json(0, "ftm", "list")["commands"]
+        self.assertIn({"id": 53, "name": "GET_RX_AGC"}, commands)
+        self.assertEqual(commands, sorted(commands, key=lambda row: row["id"]))
+        bands = self.expect_json(0, "band", "list")["bands"]
+        egsm = [row for row in bands if row["band"] == 0 and row["direction"] == "uplink"]
+        self.assertEqual([(row["first"], row["last"]) for row in egsm], [(0, 124), (975, 1023)])
+        self.assertEqual(self.expect(0, "band", "ul", "0", "1000").out, "885.2000 MHz\n")
+        self.assertAlmostEqual(self.expect_json(0, "band", "dl", "0", "1000")["mhz"], 930.2)
+        self.expect(2, "band", "ul", "101", "100")
+
     def test_sim_ends_cleanly_on_request(self):
         for number in (signal.SIGINT, signal.SIGTERM):
             with self.subTest(signal=number), handset() as sim:

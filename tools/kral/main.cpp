@@ -60,6 +60,8 @@ int Run(int argc, char** argv) {
   AddPortVerbs(app, context);
   AddInfoVerbs(app, context);
   AddModeVerbs(app, context);
+  AddFtmVerbs(app, context);
+  AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);
   AllowOptionsAnywhere(app);

@@ -20,6 +20,8 @@ struct Context {
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure
 };
 
+void AddBandVerbs(CLI::App& app, Context& context);
+void AddFtmVerbs(CLI::App& app, Context& context);
 void AddPortVerbs(CLI::App& app, Context& context);
 void AddInfoVerbs(CLI::App& app, Context& context);
 void AddModeVerbs(CLI::App& app, Context& context);

@@ -1,0 +1,104 @@
+// kral band: bands, their channels and carrier frequencies. Pure arithmetic: no handset is needed.
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <array>
+#include <memory>
+#include <vector>
+
+#include "tools/kral/verbs.h"
+
+namespace kral::tool {
+namespace {
+
+struct Direction {
+  std::uint8_t list;
+  const char* name;
+  double(KRAL_CALL* frequency)(std::uint16_t band, std::int32_t channel);
+};
+constexpr std::array<Direction, 2> kDirections{{
+    {KRAL_BAND_UPLINK, "uplink", KRAL_Band_Helper_CalculateULFrequency},
+    {KRAL_BAND_DOWNLINK, "downlink", KRAL_Band_Helper_CalculateDLFrequency},
+}};
+
+struct ChannelRange {
+  std::int32_t first;
+  std::int32_t last;
+};
+
+std::vector<ChannelRange> RangesOf(std::uint16_t band, std::uint8_t list) {
+  std::vector<ChannelRange> ranges;
+  ChannelRange range{};
+  for (std::uint32_t i = 0; KRAL_Band_Helper_GetBandRange(band, list, i, &range.first, &range.last) != 0; ++i) {
+    ranges.push_back(range);
+  }
+  return ranges;
+}
+
+std::string NameOfBand(std::uint16_t band) {
+  std::array<char, 128> name{};
+  return KRAL_Band_Helper_GetBandName(band, name.data(), static_cast<std::uint32_t>(name.size())) != 0 ? name.data()
+                                                                                                       : "";
+}
+
+void List(const Context& context) {
+  Json rows = Json::array();
+  std::string text = fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}  {:>11} {:>11}\n", "id", "band", "direction", "first",
+                                 "last", "MHz", "MHz");
+  for (std::uint32_t i = 0; i < KRAL_Band_Helper_GetBandCount(); ++i) {
+    std::uint16_t band = 0;
+    if (KRAL_Band_Helper_GetBand(i, &band) == 0) continue;
+    for (const auto& direction : kDirections) {
+      for (const auto& [first, last] : RangesOf(band, direction.list)) {
+        const double low = direction.frequency(band, first);
+        const double high = direction.frequency(band, last);
+        rows.push_back({{"band", band},
+                        {"name", NameOfBand(band)},
+                        {"direction", direction.name},
+                        {"first", first},
+                        {"last", last},
+                        {"first_mhz", low},
+                        {"last_mhz", high}});
+        text += fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}  {:>11.4f} {:>11.4f}\n", band, NameOfBand(band),
+                            direction.name, first, last, low, high);
+      }
+    }
+  }
+  context.out.Result({{"bands", rows}}, text);
+}
+
+void Convert(const Context& context, const Direction& direction, std::uint16_t band, std::int32_t channel) {
+  const double frequency = direction.frequency(band, channel);
+  if (frequency == 0.0) {
+    throw ToolError(ExitCode::kUsage,
+                    fmt::format("band {} has no {} frequency for channel {}", band, direction.name, channel),
+                    "kral band list shows the bands and their channels");
+  }
+  context.out.Result({{"band", band}, {"channel", channel}, {"direction", direction.name}, {"mhz", frequency}},
+                     fmt::format("{:.4f} MHz\n", frequency));
+}
+
+void AddConversion(CLI::App& parent, Context& context, const char* verb, const Direction& direction) {
+  const auto band = std::make_shared<std::uint16_t>();
+  const auto channel = std::make_shared<std::int32_t>();
+  auto* conversion = parent.add_subcommand(verb, fmt::format("Print the {} carrier of a channel", direction.name));
+  conversion->add_option("band", *band, "Band id, as in the list")->required();
+  conversion->add_option("channel", *channel, "Channel number")->required();
+  conversion->callback([&context, &direction, band, channel] {
+    context.run = [&context, &direction, band, channel] { Convert(context, direction, *band, *channel); };
+  });
+}
+
+}  // namespace
+
+void AddBandVerbs(CLI::App& app, Context& context) {
+  auto* band = app.add_subcommand("band", "Convert bands and channels to carrier frequencies");
+  band->require_subcommand(1);
+  band->add_subcommand("list", "Print every band with its channel ranges and edge frequencies")->callback([&context] {
+    context.run = [&context] { List(context); };
+  });
+  AddConversion(*band, context, "ul", kDirections[0]);
+  AddConversion(*band, context, "dl", kDirections[1]);
+}
+
+}  // namespace kral::tool
