@@ -27,7 +27,7 @@ class EfsTransfer : public test::EfsTest {
     return result;
   }
 
-  tests::TempFolder folder_;
+  test::TempFolder folder_;
 };
 
 // The calls of the transfer callback, as "operation done/total".
