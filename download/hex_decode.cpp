@@ -83,13 +83,11 @@ void HexPhoneImageDecoder::FindBase(PhoneImage& image, LineReader& lines) {
   image.SetBaseAddress(kUnknown, 0);
 
   LineReader::Line line;
-  std::optional<uint32_t> extended_base;  // of the line before
+  uint32_t extended_base = kUnknown;  // of the line before; the unknown one is never the lower
   while (lines.Next(line)) {
     const char type = TypeAt(line.text, hex::kSecondTypeAt);
-    if (extended_base && type == '0' && *extended_base < image.GetBaseAddress(0)) {
-      image.SetBaseAddress(*extended_base, 0);
-    }
-    extended_base.reset();
+    if (type == '0' && extended_base < image.GetBaseAddress(0)) image.SetBaseAddress(extended_base, 0);
+    extended_base = kUnknown;
     if (type == '2') extended_base = SegmentBase(line.text);
     if (type == '4') extended_base = LinearBase(line.text);
   }
