@@ -239,7 +239,7 @@ TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
   EXPECT_FALSE(ports_.IsOpen(kPort));
   handset_.faults().Clear();
   // Late answers to the handshake would be taken for those to the requests behind it.
-  for (const uint64_t n : {1, 2}) handset_.faults().Add(handset::Ignore(), When::Nth(n));
+  for (const uint64_t n : {1u, 2u}) handset_.faults().Add(handset::Ignore(), When::Nth(n));
   KRAL_ConfigureTimeOut(handle, 1, 1000);
   const size_t before = handset_.received().size();
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
