@@ -27,13 +27,18 @@ def clean_environment(ports):
     return env
 
 
-def start(*words, ports=None):
-    return subprocess.Popen([KRAL, *words], env=clean_environment(ports or {}), stdin=subprocess.DEVNULL,
+def without_override():
+    """What goes in front of a command, so that permissions bind it even if we are root."""
+    return ["setpriv", "--bounding-set=-dac_override,-dac_read_search"] if os.geteuid() == 0 else []
+
+
+def start(*words, ports=None, before=()):
+    return subprocess.Popen([*before, KRAL, *words], env=clean_environment(ports or {}), stdin=subprocess.DEVNULL,
                             stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
 
 
-def run(*words, ports=None):
-    process = start(*words, ports=ports)
+def run(*words, ports=None, before=()):
+    process = start(*words, ports=ports, before=before)
     process.out, process.err = process.communicate(timeout=PATIENCE)
     return process
 
@@ -173,6 +178,13 @@ class Ports(ToolTest):
                 os.close(taken)
         self.assertIn("in use", error["text"])
 
+    def test_port_that_is_not_permitted_says_so(self):
+        with handset() as sim:
+            os.chmod(sim.device, 0)
+            done = run("-p", "7", "info", "--json", ports={7: sim.device}, before=without_override())
+        self.assertEqual(done.returncode, 4, done.err)
+        self.assertIn("may not be opened", json.loads(done.out)["error"]["text"])
+
 
 class Failures(ToolTest):
     def test_silent_handset_gives_no_answer(self):
@@ -191,6 +203,16 @@ class Failures(ToolTest):
             sim.kill()
             _, err = tool.communicate(timeout=PATIENCE)
             self.assertEqual(tool.returncode, 9, err)
+
+    def test_handset_that_comes_back_is_served_again(self):
+        with tempfile.TemporaryDirectory() as folder:
+            link = os.path.join(folder, "port")
+            with handset("--fault", "hang-up,nth=1,of=7C", "--back-after", "300", "--link", link):
+                self.expect_json(9, "-p", "7", "--time-out", "200", "raw", "7C", ports={7: link})
+                deadline = time.monotonic() + PATIENCE
+                while not os.path.lexists(link) and time.monotonic() < deadline:
+                    time.sleep(0.01)
+                self.expect_json(0, "-p", "7", "raw", "7C", ports={7: link})
 
     def test_refusal_names_its_reason(self):
         with handset("--fault", "refuse=24,of=29") as sim:
