@@ -37,7 +37,7 @@ std::string Hex(uint32_t value) {
 class HexOracle : public testing::Test {
  protected:
   void SetUp() override {
-    if (!Runs("srec_cat --version") || !Runs("objcopy --version")) GTEST_SKIP() << "srec_cat or objcopy is missing";
+    ASSERT_TRUE(Runs("srec_cat --version") && Runs("objcopy --version")) << "the scripts install srecord and binutils";
   }
 
   bool Runs(const std::string& command) const {
