@@ -55,9 +55,7 @@ TEST_F(ContextTable, FiftyFirstPortGivesZero) {
   EXPECT_EQ(KRAL_ConnectServer(1050), 0u);
   EXPECT_EQ(table::CreateContext(1007), handles[7]) << "a port that has its row already";
   table::ReleaseContext(handles[20], false);
-  const KRAL_HANDLE again = table::CreateContext(1050);
-  EXPECT_NE(again, 0u);
-  EXPECT_NE(again, handles[20]);
+  EXPECT_NE(table::CreateContext(1050), 0u);  // maybe the released value: Windows hands mutex handles out again
 }
 
 TEST_F(ContextTable, ReleasedForeignAndZeroHandlesGiveZeroAndNoTraffic) {

@@ -53,8 +53,8 @@ void UseHandset(handset::VirtualHandset& handset, uint8_t name, const std::funct
     handset.faults().Add(handset::Ignore(), When::Nth(1));
     EXPECT_FALSE(AnswersAs(handle, name, kShortMs)) << int{name};
     EXPECT_TRUE(AnswersAs(handle, name, kPatientMs)) << int{name} << " after a time-out";
+    // From here on the value may be that of another thread's connection: Windows hands mutex handles out again.
     KRAL_DisconnectServer(handle);
-    EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
   }
 }
 
