@@ -159,6 +159,7 @@ u16 RequestDataLength(u16 mode_id, u16 command) {
 
 bool Transmit(Diag_FTM& phone) {
   if (phone.ftm().command_code == kCommandCode59) return TransmitLegacy(phone);
+  phone.packet().set_response_length(0);  // a request that the sequencer keeps has none
   if (phone.ftm().queue_mode != 0 && phone.ftm().sequencer != nullptr) return Enqueue(phone, *phone.ftm().sequencer);
   return ProcessClientRequestPacket(phone) == kLayerSent;
 }

@@ -97,6 +97,7 @@ bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<c
   uint16_t found = 0;
   for (const uint16_t port : listed) {
     if (found >= ports.size()) break;
+    if (port >= kNullPort) continue;  // no device: one would always answer, the other picks a port by coming here
     if (std::find(ignored.begin(), ignored.end(), port) != ignored.end()) continue;
     if (AnswersOnPort(port)) ports[found++] = port;
   }

@@ -58,7 +58,8 @@ bool SetStartFlag(Diag_FTM& phone, uint8_t start_flag) {
 bool SetPacketMode(Diag_FTM& phone, uint32_t mode) {
   if (IsRefused(phone, "KRAL_SetPacketMode")) return false;
   auto& transport = phone.transport();
-  if (transport.NeedsPhoneFor(mode)) phone.IsPortOpen();
+  // A closed port fails here, before anything of a caller's transport is called that may be gone by now.
+  if (transport.NeedsPhoneFor(mode) && !phone.IsPortOpen()) return false;
   if (!transport.SetPacketMode(mode)) return false;
   phone.SetFramed(mode == 0);
   return true;

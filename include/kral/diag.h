@@ -60,7 +60,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char *compile_d
  * @param[out] mobile_model       number of the mobile model
  * @param[out] software_revision  4,096 bytes, NUL-terminated
  * @param[out] model              4,096 bytes, NUL-terminated; empty when the handset sent no second text
- * @return 1 on success; 0 also when the answer ends before the texts
+ * @return 1 on success; 0 also when the answer ends before the mobile model. Texts that were not sent are empty
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t *hardware_version,
                                                     uint32_t *mobile_model, char *software_revision, char *model);

@@ -94,11 +94,13 @@ TEST_F(SequencerTest, HeldBackRequestIsNotSentAndCountsAsFailed) {
 
 TEST_F(SequencerTest, SequencerCommandsGoToTheSequencerOrOnToTheHandsetWithoutOne) {
   std::array<uint8_t, 8> response{};
+  uint16_t size = 0;
   const auto send = [&] {
-    uint16_t size = response.size();
+    size = response.size();
     return KRAL_FTM_SendCommandTo(handle(), 37, 0, 5, nullptr, 0, response.data(), &size);
   };
   EXPECT_EQ(send(), 1);
+  EXPECT_EQ(size, 0) << "nothing was received";
   EXPECT_EQ(sequencer_.processed, std::vector<std::string>{"4B 0B 25 00 05 00"});
   sequencer_.process_result = 3;
   EXPECT_EQ(send(), 0);

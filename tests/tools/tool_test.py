@@ -288,6 +288,7 @@ class Simulation(ToolTest):
         bands = self.expect_json(0, "band", "list")["bands"]
         egsm = [row for row in bands if row["band"] == 0 and row["direction"] == "uplink"]
         self.assertEqual([(row["first"], row["last"]) for row in egsm], [(0, 124), (975, 1023)])
+        self.assertEqual([row["direction"] for row in bands if row["band"] == 700], ["any"])
         self.assertEqual(self.expect(0, "band", "ul", "0", "1000").out, "885.2000 MHz\n")
         self.assertAlmostEqual(self.expect_json(0, "band", "dl", "0", "1000")["mhz"], 930.2)
         self.expect(2, "band", "ul", "101", "100")

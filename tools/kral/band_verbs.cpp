@@ -16,7 +16,8 @@ struct Direction {
   const char* name;
   double(KRAL_CALL* frequency)(std::uint16_t band, std::int32_t channel);
 };
-constexpr std::array<Direction, 2> kDirections{{
+constexpr std::array<Direction, 3> kDirections{{
+    {KRAL_BAND_ANY_DIRECTION, "any", nullptr},  // numbers in use, some without a carrier of their own
     {KRAL_BAND_UPLINK, "uplink", KRAL_Band_Helper_CalculateULFrequency},
     {KRAL_BAND_DOWNLINK, "downlink", KRAL_Band_Helper_CalculateDLFrequency},
 }};
@@ -50,17 +51,20 @@ void List(const Context& context) {
     if (KRAL_Band_Helper_GetBand(i, &band) == 0) continue;
     for (const auto& direction : kDirections) {
       for (const auto& [first, last] : RangesOf(band, direction.list)) {
-        const double low = direction.frequency(band, first);
-        const double high = direction.frequency(band, last);
-        rows.push_back({{"band", band},
-                        {"name", NameOfBand(band)},
-                        {"direction", direction.name},
-                        {"first", first},
-                        {"last", last},
-                        {"first_mhz", low},
-                        {"last_mhz", high}});
-        text += fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}  {:>11.4f} {:>11.4f}\n", band, NameOfBand(band),
-                            direction.name, first, last, low, high);
+        Json row{{"band", band},
+                 {"name", NameOfBand(band)},
+                 {"direction", direction.name},
+                 {"first", first},
+                 {"last", last}};
+        text += fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}", band, NameOfBand(band), direction.name, first, last);
+        if (direction.frequency != nullptr) {
+          row["first_mhz"] = direction.frequency(band, first);
+          row["last_mhz"] = direction.frequency(band, last);
+          text +=
+              fmt::format("  {:>11.4f} {:>11.4f}", direction.frequency(band, first), direction.frequency(band, last));
+        }
+        text += '\n';
+        rows.push_back(std::move(row));
       }
     }
   }
@@ -97,8 +101,8 @@ void AddBandVerbs(CLI::App& app, Context& context) {
   band->add_subcommand("list", "Print every band with its channel ranges and edge frequencies")->callback([&context] {
     context.run = [&context] { List(context); };
   });
-  AddConversion(*band, context, "ul", kDirections[0]);
-  AddConversion(*band, context, "dl", kDirections[1]);
+  AddConversion(*band, context, "ul", kDirections[1]);
+  AddConversion(*band, context, "dl", kDirections[2]);
 }
 
 }  // namespace kral::tool
