@@ -1,7 +1,6 @@
 // Intel HEX into an image. The first pass finds the base address, the second loads the data.
 #include <array>
 #include <limits>
-#include <optional>
 #include <span>
 
 #include "download/hex_format.h"
