@@ -1,0 +1,164 @@
+// Decides when and how progress is shown. What the work is, and its end, are the verb's affair.
+#include "tools/kral/progress.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <cstdio>
+#include <utility>
+
+#include "platform/console.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint64_t kBarIntervalMs = 100;
+constexpr std::uint64_t kObjectIntervalMs = 500;
+constexpr std::uint64_t kLineIntervalMs = 5000;  // short work leaves a log file without any
+constexpr std::uint64_t kSettledMs = 300;        // a rate told earlier would only jump about
+constexpr std::size_t kWidestBar = 40;
+constexpr std::size_t kNarrowestBar = 5;
+
+// The end of a name tells more than its beginning.
+std::string Shortened(const std::string& text, std::size_t room) {
+  if (text.size() <= room) return text;
+  if (room <= 3) return text.substr(text.size() - room);
+  return "..." + text.substr(text.size() - (room - 3));
+}
+
+}  // namespace
+
+std::string SizeText(std::uint64_t bytes) {
+  constexpr std::array<const char*, 4> kUnits{"KiB", "MiB", "GiB", "TiB"};
+  if (bytes < 1024) return fmt::format("{} B", bytes);
+  double value = static_cast<double>(bytes) / 1024;
+  std::size_t unit = 0;
+  for (; value >= 1023.95 && unit + 1 < kUnits.size(); ++unit) value /= 1024;
+  return fmt::format("{:.1f} {}", value, kUnits[unit]);
+}
+
+std::string DurationText(std::uint64_t seconds) {
+  const auto minutes = seconds / 60;
+  if (minutes < 60) return fmt::format("{}:{:02}", minutes, seconds % 60);
+  return fmt::format("{}:{:02}:{:02}", minutes / 60, minutes % 60, seconds % 60);
+}
+
+Progress::Progress(const Output& out, std::string work, std::uint64_t total, Unit unit, Clock& clock)
+    : out_(out),
+      work_(std::move(work)),
+      unit_(unit),
+      style_(out.json()                           ? Style::kJson
+             : IsTerminal(StandardStream::kError) ? Style::kBar
+                                                  : Style::kLines),
+      clock_(clock),
+      total_(total),
+      last_tick_(clock.TickMs()),
+      next_ms_(style_ == Style::kLines  ? kLineIntervalMs
+               : style_ == Style::kJson ? kObjectIntervalMs
+                                        : kBarIntervalMs) {}
+
+Progress::~Progress() {
+  Wipe();
+}
+
+void Progress::Describe(std::string_view subject) {
+  subject_ = Printable(subject);
+}
+
+void Progress::Update(std::uint64_t done) {
+  done_ = done;
+  const auto tick = clock_.TickMs();
+  elapsed_ms_ += tick - last_tick_;
+  last_tick_ = tick;
+  if (elapsed_ms_ >= next_ms_) Show();
+}
+
+void Progress::Note(std::string_view text) {
+  Wipe();
+  out_.Note(text);
+}
+
+void Progress::Show() {
+  switch (style_) {
+    case Style::kBar:
+      next_ms_ = elapsed_ms_ + kBarIntervalMs;
+      return DrawBar();
+    case Style::kLines:
+      next_ms_ = elapsed_ms_ + kLineIntervalMs;
+      return WriteLine();
+    case Style::kJson:
+      next_ms_ = elapsed_ms_ + kObjectIntervalMs;
+      return WriteObject();
+  }
+}
+
+double Progress::Rate() const {
+  return elapsed_ms_ < kSettledMs ? 0 : static_cast<double>(done_) * 1000 / static_cast<double>(elapsed_ms_);
+}
+
+std::uint64_t Progress::SecondsLeft(double rate) const {
+  return static_cast<std::uint64_t>(std::ceil(static_cast<double>(total_ - std::min(done_, total_)) / rate));
+}
+
+std::string Progress::Figures() const {
+  std::string text;
+  if (total_ > 0) {
+    text = fmt::format("{:.0f} %", 100 * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
+  } else {
+    text = unit_ == Unit::kBytes ? SizeText(done_) : fmt::format("{}", done_);
+  }
+  const double rate = Rate();
+  if (rate <= 0) return text;
+  text += unit_ == Unit::kBytes ? fmt::format("  {}/s", SizeText(static_cast<std::uint64_t>(rate)))
+                                : fmt::format("  {:.1f}/s", rate);
+  if (total_ > 0) text += fmt::format("  {} left", DurationText(SecondsLeft(rate)));
+  return text;
+}
+
+void Progress::DrawBar() {
+  const auto figures = Figures();
+  // The last column stays free: a terminal may wrap behind it.
+  const auto width = static_cast<std::size_t>(std::max(TerminalWidth(StandardStream::kError) - 1, 1));
+  auto title = subject_.empty() ? work_ : work_ + " " + subject_;
+  std::string bar;
+  const auto taken = figures.size() + 2;
+  auto room = width - std::min(width, taken);
+  if (total_ > 0 && room > title.size() + kNarrowestBar + 4) {
+    const auto cells = std::min(room - title.size() - 4, kWidestBar);
+    const auto full = static_cast<std::size_t>(
+        static_cast<double>(cells) * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
+    bar = fmt::format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
+    room -= bar.size();
+  }
+  title = Shortened(title, room);
+  fmt::print(stderr, "\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width);
+  std::fflush(stderr);
+  drawn_width_ = width;
+}
+
+void Progress::WriteLine() const {
+  out_.Note(fmt::format("{}{}{}: {}", work_, subject_.empty() ? "" : " ", subject_, Figures()));
+}
+
+void Progress::WriteObject() const {
+  Json object{{"event", "progress"}, {"work", work_}};
+  if (!subject_.empty()) object["subject"] = subject_;
+  object["unit"] = unit_ == Unit::kBytes ? "bytes" : "items";
+  object["done"] = done_;
+  if (total_ > 0) object["total"] = total_;
+  if (const double rate = Rate(); rate > 0) {
+    object["per_second"] = std::round(rate * 10) / 10;
+    if (total_ > 0) object["seconds_left"] = SecondsLeft(rate);
+  }
+  fmt::print(stderr, "{}\n", object.dump());
+}
+
+void Progress::Wipe() {
+  if (drawn_width_ == 0) return;
+  fmt::print(stderr, "\r{:<{}}\r", "", std::exchange(drawn_width_, 0));
+  std::fflush(stderr);
+}
+
+}  // namespace kral::tool
