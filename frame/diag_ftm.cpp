@@ -34,6 +34,8 @@ Diag_FTM::Diag_FTM(uint16_t port, Clock& clock, DeviceOpener opener)
     : clock_(clock), port_(port), parts_(std::make_shared<Parts>(clock)) {
   parts_->transport.emplace(clock, std::move(opener));
   parts_->transport->SetLogger(&parts_->log);
+  // The dispatcher's thread shares the parts: only a stop ends it, and so it must be, should the rest of this fail.
+  dispatching_.reset(&parts_->dispatcher);
   if (!parts_->dispatcher.RegisterListener(&parts_->sorter, nullptr, parts_)) return;
   parts_->transport->Attach(&parts_->dispatcher, &parts_->sorter);
   ApplyDefaults();
@@ -47,7 +49,10 @@ Diag_FTM::Diag_FTM(std::shared_ptr<OrbtServer> server, uint16_t port, Clock& clo
 
 Diag_FTM::~Diag_FTM() {
   Retire();
-  parts_->dispatcher.Stop();
+}
+
+void Diag_FTM::StopDispatching::operator()(CKralEvents* dispatcher) const {
+  dispatcher->Stop();
 }
 
 void Diag_FTM::ApplyDefaults() {

@@ -125,6 +125,10 @@ class Diag_FTM {
   const std::shared_ptr<OrbtServer> server_;  // null in direct mode
   const uint16_t port_;
   std::shared_ptr<Parts> parts_;
+  struct StopDispatching {
+    void operator()(CKralEvents* dispatcher) const;
+  };
+  std::unique_ptr<CKralEvents, StopDispatching> dispatching_;  // null in server mode
   std::array<CDiagPacket, 3> packets_;
   FtmSettings ftm_;
   EfsSettings efs_;

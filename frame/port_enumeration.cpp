@@ -57,19 +57,31 @@ bool CopyServerPorts(std::vector<std::string> (OrbtServer::*list)(), std::span<u
   return !names.empty();
 }
 
+// A context for as long as one question takes; releasing it closes the port.
+class PassingContext {
+ public:
+  explicit PassingContext(uint16_t port) : handle_(Kral_ResourceManager::CreateContext(port)) {}
+  ~PassingContext() {
+    if (handle_ != 0) Kral_ResourceManager::ReleaseContext(handle_, false);
+  }
+  PassingContext(const PassingContext&) = delete;
+  PassingContext& operator=(const PassingContext&) = delete;
+
+  KRAL_HANDLE handle() const { return handle_; }
+
+ private:
+  const KRAL_HANDLE handle_;
+};
+
 // Opens the port, asks, and closes it again.
 bool AnswersOnPort(uint16_t port) {
-  const KRAL_HANDLE handle = Kral_ResourceManager::CreateContext(port);
-  if (handle == 0) return false;
-  bool answers = false;
-  if (const auto phone = Kral_ResourceManager::GetPhone(handle)) {
-    const std::lock_guard lock(phone->request_lock());
-    if (phone->OpenPort({})) {
-      answers = phone->IsPhoneConnected();
-      phone->ClosePort();
-    }
-  }
-  Kral_ResourceManager::ReleaseContext(handle, false);
+  const PassingContext context(port);
+  const auto phone = Kral_ResourceManager::GetPhone(context.handle());
+  if (!phone) return false;
+  const std::lock_guard lock(phone->request_lock());
+  if (!phone->OpenPort({})) return false;
+  const bool answers = phone->IsPhoneConnected();
+  phone->ClosePort();
   return answers;
 }
 
