@@ -1,47 +1,82 @@
-// Reads and writes single NV items with the plain diagnostic requests; knows nothing of what an item means.
+// Reads and writes single NV items with the diagnostic requests; knows nothing of what an item means.
 #include "commands/nv_item.h"
 
 #include <algorithm>
 #include <array>
+#include <optional>
 
-#include "commands/request.h"
+#include "commands/nv_format.h"
 #include "frame/base/little_endian.h"
 
 namespace kral::nv {
 namespace {
 
-// Item id, data, status. In the reply the data stand at the same offset; the status is its last two bytes.
-constexpr DiagRequest<u16, Bytes, u16> kRead{38};
-constexpr size_t kDataOffset = 3;
+using DataBlock = std::array<u8, kDataSize>;
 
-// Item id and exactly 128 data bytes; deliberately no status behind them, unlike the read.
-constexpr DiagRequest<u16, Block<kDataSize>> kWrite{39};
+DataBlock Filled(std::span<const uint8_t> data) {
+  DataBlock block{};
+  std::copy_n(data.begin(), std::min(data.size(), block.size()), block.begin());
+  return block;
+}
+
+std::optional<uint16_t> StatusAtEnd(std::span<const uint8_t> reply) {
+  if (reply.size() < sizeof(uint16_t)) return std::nullopt;
+  return LoadLe<uint16_t>(reply, reply.size() - sizeof(uint16_t));
+}
+
+// The status and, when it is 0, the data of the reply that the packet buffer holds.
+bool TakeRead(Diag_FTM& phone, size_t offset, std::span<uint8_t> data, uint16_t& status) {
+  const auto reply = phone.packet().response();
+  const auto reported = StatusAtEnd(reply);
+  if (!reported) return false;
+  if (*reported == kDone) {
+    if (reply.size() < offset || reply.size() - offset < data.size()) return false;
+    std::copy_n(reply.begin() + static_cast<std::ptrdiff_t>(offset), data.size(), data.begin());
+  }
+  status = *reported;
+  return true;
+}
+
+bool AnswersInFull(Diag_FTM& phone) {
+  return phone.packet().response().size() >= phone.packet().request_length();
+}
+
+bool TakeStatus(Diag_FTM& phone, uint16_t& status) {
+  const auto reported = StatusAtEnd(phone.packet().response());
+  if (reported) status = *reported;
+  return reported.has_value();
+}
 
 }  // namespace
 
 bool Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status) {
-  if (!Send(phone, kRead, item, Bytes(data), status)) return false;
-  const auto reply = phone.packet().response();
-  if (reply.size() < phone.packet().request_length()) return false;
-  const auto reported = LoadLe<uint16_t>(reply, reply.size() - sizeof status);
-  if (!reported) return false;
-  // A request cut at the packet buffer's end says nothing about the room that the reply needs.
-  if (*reported == kDone && reply.size() < kDataOffset + data.size()) return false;
-  status = *reported;
-  if (status == kDone) std::copy_n(reply.begin() + kDataOffset, data.size(), data.begin());
-  return true;
+  return Send(phone, kReadItem, item, Bytes(data), status) && AnswersInFull(phone) &&
+         TakeRead(phone, kItemData, data, status);
+}
+
+bool ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status) {
+  return Send(phone, kReadExtended, item, context, Bytes(data), status) && AnswersInFull(phone) &&
+         TakeRead(phone, kExtendedData, data, status);
+}
+
+bool ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status) {
+  return Send(phone, kReadElement, item, index) && TakeRead(phone, kElementData, data, status);
 }
 
 bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
-  std::array<u8, kDataSize> block{};
-  std::copy_n(data.begin(), std::min(data.size(), block.size()), block.begin());
-  if (!Send(phone, kWrite, item, Block<kDataSize>(block))) return false;
-  const auto reply = phone.packet().response();
-  if (reply.size() < sizeof status) return false;
-  const auto reported = LoadLe<uint16_t>(reply, reply.size() - sizeof status);
-  if (!reported) return false;
-  status = *reported;
-  return true;
+  const DataBlock block = Filled(data);
+  return Send(phone, kWriteItem, item, Block<kDataSize>(block)) && TakeStatus(phone, status);
+}
+
+bool WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status) {
+  const DataBlock block = Filled(data);
+  return Send(phone, kWriteExtended, item, context, Block<kDataSize>(block), status) && TakeStatus(phone, status);
+}
+
+bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status) {
+  DataBlock block{index};
+  std::copy_n(data.begin(), std::min(data.size(), block.size() - 1), block.begin() + 1);
+  return Write(phone, item, block, status);
 }
 
 }  // namespace kral::nv

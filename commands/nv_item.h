@@ -1,4 +1,5 @@
-// NV items: the handset's numbered non-volatile settings, up to 128 bytes each.
+// NV items: the handset's numbered non-volatile settings, up to 128 bytes each. Every function is one request. They
+// give true when the handset answered, and hand out its status, which the caller has to look at.
 #ifndef KRAL_COMMANDS_NV_ITEM_H
 #define KRAL_COMMANDS_NV_ITEM_H
 
@@ -12,16 +13,24 @@ class Diag_FTM;
 
 namespace nv {
 
-inline constexpr uint16_t kDone = 0;  // NV status: success
+inline constexpr uint16_t kDone = 0;      // NV status: success
+inline constexpr uint16_t kReadOnly = 7;  // ... the item cannot be written
 inline constexpr uint16_t kEsnItem = 0;
 inline constexpr size_t kDataSize = 128;
 
 // Reads one item into `data`, whose present bytes, and the status, go out with the request. False when no reply
 // came or one shorter than the request. True with a non-zero status leaves the data untouched.
 bool Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status);
+bool ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status);
+
+// Reads one element of an array item; the status goes out only.
+bool ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status);
 
 // Writes one item: always 128 data bytes, the given ones zero-filled or cut. True whenever a reply with a status came.
 bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status);
+bool WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status);
+// The element's index stands in front of its data, which are cut at 127 bytes.
+bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status);
 
 }  // namespace nv
 }  // namespace kral

@@ -102,6 +102,7 @@ class Diag_FTM {
   FtmSettings& ftm() { return ftm_; }
   const FtmSettings& ftm() const { return ftm_; }
   EfsSettings& efs() { return efs_; }
+  NvBatch& nv_batch() { return nv_batch_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
@@ -132,6 +133,7 @@ class Diag_FTM {
   std::array<CDiagPacket, 3> packets_;
   FtmSettings ftm_;
   EfsSettings efs_;
+  NvBatch nv_batch_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
 
   OpenArguments last_open_;

@@ -4,6 +4,8 @@
 
 #include <atomic>
 #include <cstdint>
+#include <deque>
+#include <vector>
 
 #include "kral/efs.h"
 
@@ -33,6 +35,18 @@ struct EfsSettings {
   std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
   std::atomic<KRAL_HANDLE> callback_context{0};
   uint32_t packet_time_out_ms = 2000;  // of writes, listings and mkdir; shorter in tests only
+};
+
+struct NvQueueItem {
+  uint16_t item;
+  std::vector<uint8_t> data;  // at most 128 bytes
+};
+
+// NV writes collected for few packets; commands/nv_batch.h.
+struct NvBatch {
+  bool on = false;
+  std::deque<NvQueueItem> queue;
+  std::vector<uint16_t> read_only;  // items whose refusal as read-only is no error
 };
 
 }  // namespace kral

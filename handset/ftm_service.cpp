@@ -105,6 +105,9 @@ Bytes FtmService::Carry(uint16_t mode_id, uint16_t command, ByteView payload) {
   if (commands_.size() == kRememberedCommands) commands_.erase(commands_.begin());
   commands_.push_back({mode_id, command, Bytes(payload.begin(), payload.end())});
 
+  if (const auto dispatcher = dispatchers_.find(mode_id); dispatcher != dispatchers_.end()) {
+    return dispatcher->second(command, payload);
+  }
   Radio& radio = radios_[mode_id];
   ByteWriter result;
   switch (command) {

@@ -12,6 +12,7 @@
 #ifndef KRAL_HANDSET_FTM_SERVICE_H
 #define KRAL_HANDSET_FTM_SERVICE_H
 
+#include <functional>
 #include <map>
 #include <mutex>
 #include <vector>
@@ -49,6 +50,11 @@ class FtmService final : public Service {
   void Register(RequestTable& table) override;
   void OnReset() override;
 
+  // Gives the commands of a mode id to something else than a transceiver: it returns what stands in the reply behind
+  // the command id. To be called before the handset is connected.
+  using Dispatcher = std::function<Bytes(uint16_t command, ByteView payload)>;
+  void SetDispatcher(uint16_t mode_id, Dispatcher dispatcher) { dispatchers_[mode_id] = std::move(dispatcher); }
+
   Radio RadioOf(uint16_t mode_id) const;
   void SetInputLevel(uint16_t mode_id, int16_t hundredths_of_dbm);
   std::vector<FtmCommand> commands() const;  // all that were carried out, oldest first; the last 4,096 of them
@@ -63,6 +69,7 @@ class FtmService final : public Service {
 
   const OperatingMode& mode_;
   mutable std::mutex mutex_;
+  std::map<uint16_t, Dispatcher> dispatchers_;
   std::map<uint16_t, Radio> radios_;
   std::vector<FtmCommand> commands_;
 };

@@ -1,4 +1,4 @@
-// The handset's non-volatile items: numbered, 128 bytes each, per subscription.
+// The handset's non-volatile items: numbered, 128 bytes each, per subscription; arrays hold several elements.
 #ifndef KRAL_HANDSET_NV_STORE_H
 #define KRAL_HANDSET_NV_STORE_H
 
@@ -7,7 +7,7 @@
 #include <mutex>
 #include <optional>
 #include <set>
-#include <utility>
+#include <tuple>
 
 #include "handset/request_table.h"
 
@@ -24,10 +24,12 @@ enum class NvStatus : uint16_t {
   kReadOnly = 7,
 };
 
-// Item read (38) and write (39). It survives a restart. The requests act on subscription 0.
+// Item read (38) and write (39), and subsystem 48: batch write (0), read (1) and write (2) of a subscription. The plain
+// requests and the batch act on subscription 0. Items survive a restart.
 class NvStore final : public Service {
  public:
   static constexpr size_t kItemSize = 128;
+  static constexpr size_t kElementSize = kItemSize - 1;  // a write of an element begins with its index
   using Data = std::array<uint8_t, kItemSize>;
 
   explicit NvStore(uint32_t serial_number);
@@ -46,12 +48,24 @@ class NvStore final : public Service {
   // Reads and writes of the item answer this, whatever it holds; kDone takes it away.
   void SetStatus(uint16_t item, NvStatus status);
 
+  // Makes an item an array: reads and writes name one of its elements.
+  void MakeArray(uint16_t item, uint8_t count);
+  void SetElement(uint16_t item, uint8_t index, ByteView data);
+  std::optional<Bytes> Element(uint16_t item, uint8_t index) const;
+
  private:
-  using Key = std::pair<uint16_t, uint16_t>;  // item, subscription
+  using Key = std::tuple<uint16_t, uint16_t, uint8_t>;  // item, subscription, element
+
+  void ReadPlain(ByteView request, Wire& wire) const;
+  void ReadElement(ByteView request, Wire& wire) const;
+  void WriteBatch(ByteView request, Wire& wire);
+  NvStatus ReadLocked(const Key& key, Data& data) const;
+  std::optional<Bytes> ValueOf(const Key& key) const;
 
   mutable std::mutex mutex_;
   std::map<Key, Data> values_;
   std::map<uint16_t, NvStatus> statuses_;
+  std::map<uint16_t, uint8_t> arrays_;  // number of elements
   std::set<uint16_t> read_only_;
 };
 

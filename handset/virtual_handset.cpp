@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <chrono>
 
+#include "handset/rf_nv.h"
 #include "handset/wire_modes.h"
 
 namespace kral::handset {
@@ -35,6 +36,9 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       ftm_(std::make_shared<FtmService>(*mode_service_)),
       memory_(std::make_shared<Memory>()),
       maintenance_(std::make_shared<Maintenance>(identity.service_code)) {
+  ftm_->SetDispatcher(kRfNvModeId, [efs = efs_](uint16_t command, ByteView payload) {
+    return CarryOutRfNv(*efs, command, payload);
+  });
   identity_ = std::make_shared<IdentityService>(std::move(identity));
   for (const std::shared_ptr<Service>& service : std::initializer_list<std::shared_ptr<Service>>{
            identity_, nv_, efs_, mode_service_, ftm_, memory_, maintenance_}) {

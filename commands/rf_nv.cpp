@@ -1,0 +1,71 @@
+// Reads and writes RF NV items through the RF NV dispatcher of factory test mode.
+#include "commands/rf_nv.h"
+
+#include <array>
+#include <cstdio>
+
+#include "commands/ftm_frame.h"
+#include "commands/nv_item.h"
+#include "frame/base/little_endian.h"
+
+namespace kral::nv {
+namespace {
+
+constexpr u16 kModeIdRfNv = 36;
+constexpr u16 kRead = 0;
+constexpr u16 kWrite = 1;
+
+// Behind the FTM header of the reply.
+constexpr size_t kItem = 0;
+constexpr size_t kStatus = 2;
+constexpr size_t kSize = 4;
+constexpr size_t kData = 6;
+
+// Sends what the packet buffer holds; the reply behind its header, or nothing when it is not about the item.
+bool Exchange(Diag_FTM& phone, u16 item, std::span<const u8>& reply, u16& status) {
+  if (!ftm::Transmit(phone)) return false;
+  const auto response = phone.packet().response();
+  const size_t header = ftm::HeaderSize(phone);
+  if (response.size() < header) return false;
+  reply = response.subspan(header);
+  const auto reported = LoadLe<u16>(reply, kStatus);
+  if (!reported || LoadLe<u16>(reply, kItem) != item) return false;
+  status = *reported;
+  return true;
+}
+
+}  // namespace
+
+std::string RfPath(uint32_t item) {
+  std::array<char, 40> path{};
+  std::snprintf(path.data(), path.size(), "/nv/item_files/rfnv/%08u", static_cast<unsigned>(item));
+  return path.data();
+}
+
+bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t& status) {
+  ftm::BeginCommand(phone, kModeIdRfNv, ftm::HeaderForm::kPlain, kRead);
+  phone.packet().Append16(item);
+  std::span<const u8> reply;
+  u16 reported = 0;
+  if (!Exchange(phone, item, reply, reported)) return false;
+  if (reported == kDone) {
+    const auto size = LoadLe<u16>(reply, kSize);
+    if (!size || reply.size() - kData < *size) return false;
+    const auto content = reply.subspan(kData, *size);
+    data.assign(content.begin(), content.end());
+  }
+  status = reported;
+  return true;
+}
+
+bool WriteRf(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
+  if (data.size() > kRfDataSize) return false;
+  ftm::BeginCommand(phone, kModeIdRfNv, ftm::HeaderForm::kPlain, kWrite);
+  phone.packet().Append16(item);
+  phone.packet().Append16(static_cast<u16>(data.size()));
+  phone.packet().AppendBlock(data);
+  std::span<const u8> reply;
+  return Exchange(phone, item, reply, status);
+}
+
+}  // namespace kral::nv

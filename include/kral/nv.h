@@ -1,0 +1,123 @@
+/**
+ * @file nv.h
+ * NV items: the handset's numbered settings and calibration values, one by one and in batches. Whole sets of items with
+ * their definitions are in nv_tool.h.
+ *
+ * Beside the rules of kral.h:
+ *
+ * - An item has a 16-bit id and a data field of 128 bytes. The meaning of its bytes is the handset's.
+ * - The NV status is what the handset says to a request: 0 done, 7 the item is read-only, others as the handset defines
+ *   them. The functions with a `status` give 1 when the handset answered, whatever the status: look at it. It may be
+ *   null when it is not wanted.
+ * - Every request may wait for time-out 0 (4,000 ms).
+ */
+#ifndef KRAL_NV_H
+#define KRAL_NV_H
+
+#include "kral/types.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Bytes of an item's data field. */
+#define KRAL_NV_DATA_SIZE 128u
+
+/** Status of an item that was read or written. */
+#define KRAL_NV_STATUS_DONE 0u
+/** Status of a write to an item that cannot be written. */
+#define KRAL_NV_STATUS_READ_ONLY 7u
+
+/* --- One item ------------------------------------------------------------------------------------------------------ */
+
+/**
+ * Reads an item.
+ *
+ * @param         handle  from a connect function
+ * @param         item    the item's id
+ * @param[in,out] data    sent with the request as it stands; receives the item. Untouched unless the status is 0
+ * @param         length  bytes of `data`, normally KRAL_NV_DATA_SIZE
+ * @param[in,out] status  sent as it stands; the handset's answer
+ * @return 1 when an answer came that is at least as long as the request
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_F(KRAL_HANDLE handle, uint16_t item, uint8_t* data, uint16_t length,
+                                               uint16_t* status);
+
+/**
+ * Writes an item, or in batch mode puts it behind the queue with status 0.
+ *
+ * @param      data    what the data field begins with; the rest of it becomes 0
+ * @param      length  bytes of `data`; what is beyond 128 is not written
+ * @param[out] status  the handset's answer
+ * @return 1 when an answer with a status came
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_F(KRAL_HANDLE handle, uint16_t item, const uint8_t* data, uint16_t length,
+                                                uint16_t* status);
+
+/** Reads an item of one subscription, `context`; else as KRAL_DIAG_NV_READ_F. */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_EXT_F(KRAL_HANDLE handle, uint16_t item, uint8_t* data, uint16_t context,
+                                                   uint16_t length, uint16_t* status);
+
+/**
+ * Writes an item of one subscription, `context`; else as KRAL_DIAG_NV_WRITE_F, but that the status goes out with the
+ * request as it stands, and that it is never queued.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t item, const uint8_t* data,
+                                                    uint16_t context, uint16_t length, uint16_t* status);
+
+/**
+ * Reads one element of an array item.
+ *
+ * @param      index   of the element, from 0
+ * @param[out] data    the element; `length` bytes, which the answer must hold
+ * @param[out] status  the handset's answer, handed out with a refusal, too
+ * @return 1 when the status is 0
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index, uint8_t* data,
+                                                     uint16_t length, uint16_t* status);
+
+/**
+ * Writes one element of an array item: a plain write of the index byte and the data, of which 127 bytes at most are
+ * written. In batch mode it is queued like any other.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index,
+                                                      const uint8_t* data, uint16_t length, uint16_t* status);
+
+/* --- Many items ---------------------------------------------------------------------------------------------------- */
+
+/**
+ * Starts or leaves batch mode, in which writes are collected instead of sent. The queue is emptied either way.
+ *
+ * @param start  not 0: start; 0: leave
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_SetBatchMode(KRAL_HANDLE handle, uint8_t start);
+
+/**
+ * Replaces the list of items whose refusal as read-only (status 7) is no error in a flush.
+ *
+ * @param items  ids; may be null when `count` is 0, which empties the list
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE handle, const uint16_t* items,
+                                                                    uint16_t count);
+
+/**
+ * Writes the queued items, some nine full ones in a packet, and leaves batch mode, whatever happens. The first item that
+ * fails ends the flush behind its packet; items that are still queued are dropped.
+ *
+ * The outputs are written in every case, but for an unknown handle; each may be null.
+ *
+ * @param[out] last_error_item    id of the last item whose result was read: the failing one, if any; 65535 when none was
+ * @param[out] last_total_status  of the last packet, as the handset told
+ * @param[out] last_item_status   of that item; 0 when it is read-only and in the list
+ * @return 1 when every packet was answered and no item failed
+ *
+ * Wait: time-out 0 for each packet.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_FlushBatchQueue(KRAL_HANDLE handle, uint16_t* last_error_item,
+                                                              uint16_t* last_total_status, uint8_t* last_item_status);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif
