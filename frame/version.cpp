@@ -6,7 +6,9 @@
 namespace kral {
 
 std::string LibraryVersion() {
-  return Kral_ResourceManager::server_mode() ? "KRAL V6.0.29,ORBT" : "KRAL V6.0.29,VENTRIMS";
+  const std::string number =
+      std::to_string(kVersionMajor) + "." + std::to_string(kVersionMinor) + "." + std::to_string(kVersionPatch);
+  return "KRAL V" + number + (Kral_ResourceManager::server_mode() ? ",ORBT" : ",VENTRIMS");
 }
 
 }  // namespace kral

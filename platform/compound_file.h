@@ -5,7 +5,7 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <list>
 #include <span>
 #include <string>
 #include <string_view>
@@ -20,9 +20,9 @@ struct CompoundStream {
 };
 
 struct CompoundStorage {
-  std::string name;                      // empty in the root
-  std::deque<CompoundStorage> storages;  // deques: references stay valid while siblings are added
-  std::deque<CompoundStream> streams;
+  std::string name;                     // empty in the root
+  std::list<CompoundStorage> storages;  // lists: references stay valid while siblings are added
+  std::list<CompoundStream> streams;
 
   CompoundStorage* FindStorage(std::string_view wanted);
   const CompoundStorage* FindStorage(std::string_view wanted) const;

@@ -1,4 +1,4 @@
-// Marks that other programs see, and processes, on Linux.
+// Marks that other programs see, processes and station switches on Linux.
 #include <gtest/gtest.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -10,8 +10,10 @@
 #include <iterator>
 #include <string>
 
+#include "platform/environment.h"
 #include "platform/named_mutex.h"
 #include "platform/process.h"
+#include "storage/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -54,6 +56,14 @@ TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
   TerminateProcessByName(name.c_str());
   ASSERT_EQ(::waitpid(child, &status, 0), child);
   EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL);
+}
+
+TEST(StationSwitchTest, AnEnvironmentVariableChoosesTheWriterOfBackups) {
+  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
+  SetEnvironmentValue("KRAL_USE_PKV_FILE", "");
+  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kVarnPkvFile);
+  SetEnvironmentValue("KRAL_USE_PKV_FILE", std::nullopt);
+  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
 }
 
 }  // namespace

@@ -11,6 +11,7 @@
 #include "platform/named_mutex.h"
 #include "platform/port_list.h"
 #include "platform/process.h"
+#include "storage/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -96,6 +97,18 @@ TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
   EXPECT_EQ(exit_code, static_cast<DWORD>(STILL_ACTIVE));
   ::CloseHandle(process.hThread);
   ::CloseHandle(process.hProcess);
+}
+
+TEST(StationSwitchTest, ARegistryKeyChoosesTheWriterOfBackups) {
+  constexpr const char* kKey = "SOFTWARE\\Kral\\VARN\\UsePkvFile";
+  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
+  HKEY key = nullptr;
+  ASSERT_EQ(::RegCreateKeyExA(HKEY_LOCAL_MACHINE, kKey, 0, nullptr, REG_OPTION_VOLATILE, KEY_ALL_ACCESS, nullptr, &key,
+                              nullptr),
+            ERROR_SUCCESS);
+  ::RegCloseKey(key);
+  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kVarnPkvFile);
+  EXPECT_EQ(::RegDeleteKeyA(HKEY_LOCAL_MACHINE, kKey), ERROR_SUCCESS);
 }
 
 }  // namespace

@@ -1,0 +1,123 @@
+// Sets of items from and to PKV files, through the writer that the station has chosen.
+#include "storage/pkv_set.h"
+
+#include <algorithm>
+#include <map>
+#include <tuple>
+#include <utility>
+
+#include "frame/base/text_log.h"
+#include "platform/station_switch.h"
+#include "storage/nv_storage.h"
+#include "storage/varn_pkv_file.h"
+
+namespace kral {
+namespace {
+
+constexpr StationSwitch kUsePkvFile{.registry_key = "SOFTWARE\\Kral\\VARN\\UsePkvFile",
+                                    .variable = "KRAL_USE_PKV_FILE"};
+
+auto KeyOf(const PkvNvItem& item) {
+  return std::tuple(item.subscription, item.id, item.index);
+}
+
+// The first one of several with the same key stays.
+void Normalize(std::vector<PkvNvItem>& items) {
+  std::stable_sort(items.begin(), items.end(), [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); });
+  const auto same = [](const PkvNvItem& a, const PkvNvItem& b) { return KeyOf(a) == KeyOf(b); };
+  items.erase(std::unique(items.begin(), items.end(), same), items.end());
+}
+
+bool AppendItems(CompoundStorage& storage, std::vector<PkvNvItem>& items, std::string& problem) {
+  for (const uint16_t subscription : CNVStorage::Subscriptions(storage)) {
+    CNVStorage source(storage, subscription, pkv::Access::kRead);
+    source.OpenItemArray();
+    const std::vector<PkvNvItem> array = source.item_array().Items();
+    items.insert(items.end(), array.begin(), array.end());
+    if (!source.ReadNumbered(items, problem)) return false;
+  }
+  return true;
+}
+
+bool ReadConfiguration(CompoundStorage& configuration, PkvSet& set, std::string& problem) {
+  if (!AppendItems(configuration, set.items, problem)) return false;
+  CEFSItemBackup backup(configuration, pkv::Access::kRead);
+  // Behind the configuration's own items, which come first where both have one.
+  if (backup.items() != nullptr && !AppendItems(*backup.items(), set.items, problem)) return false;
+  Normalize(set.items);
+  return CItemFileStgAccess(configuration, pkv::Access::kRead).Read(set.files, problem) &&
+         backup.Read(set.files, problem);
+}
+
+// Plain items into the arrays; an array has one item per id, so indexed ones go beside it.
+void WriteWithStorageClasses(const std::string& path, const PkvSet& set) {
+  CPhoneStorageFile file;
+  CompoundStorage& configuration = file.configuration();
+  std::map<uint16_t, CNVStorage> arrays;
+  std::map<uint16_t, CNVStorage> numbered;
+  for (const PkvNvItem& item : set.items) {
+    auto& storages = item.index == 0 ? arrays : numbered;
+    const auto [place, added] =
+        storages.try_emplace(item.subscription, configuration, item.subscription, pkv::Access::kReadWrite);
+    if (added && item.index == 0) place->second.OpenItemArray();
+    place->second.Write(item);
+  }
+  WriteEfsFiles(configuration, set.files);
+  configuration.OpenOrAddStream(pkv::kPropertyInfo).bytes = CPhoneStorageFile::PropertyBytes(set.properties);
+  file.root().OpenOrAddStream(pkv::kFileVersion).bytes = CPhoneStorageFile::VersionBytes();
+  if (const std::string problem = file.Save(path); !problem.empty()) throw VARN_PkvFile::Exception(problem);
+}
+
+void WriteWithVarnPkvFile(const std::string& path, const PkvSet& set) {
+  VARN_PkvFile file(path);
+  for (const PkvNvItem& item : set.items) file << item;
+  for (const PkvEfsFile& entry : set.files) file << entry;
+  file.setProperties(set.properties);
+  file.writeToDisk();
+}
+
+void LogWritten(DataLogFileHandler* log, const std::string& path, const PkvSet& set) {
+  if (log == nullptr) return;
+  if (log->Wants(kLogNvManagerDebug)) {
+    for (const PkvNvItem& item : set.items) log->WriteLine(kLogNvManagerDebug, "Write NV %u", item.id);
+    for (const PkvEfsFile& file : set.files) log->WriteLine(kLogNvManagerDebug, "Write NV EFS %s", file.path.c_str());
+  }
+  log->WriteLine(kLogRet, "PKV File: %s written", path.c_str());
+}
+
+}  // namespace
+
+PkvOutcome ReadPkv(const std::string& path, PkvSet& set) {
+  CPhoneStorageFile file;
+  if (std::string problem = file.Open(path); !problem.empty()) return {PkvResult::kCannotOpen, std::move(problem)};
+  CompoundStorage* const configuration = file.FindConfiguration();
+  if (configuration == nullptr) return {PkvResult::kNoStorage, path + ": holds no phone configuration"};
+  PkvSet read{.items = {}, .files = {}, .properties = file.properties()};
+  std::string problem;
+  if (!ReadConfiguration(*configuration, read, problem)) return {PkvResult::kDamagedItem, path + ": " + problem};
+  set = std::move(read);
+  return {};
+}
+
+PkvWriter ChosenPkvWriter() {
+  return IsSwitchSet(kUsePkvFile) ? PkvWriter::kVarnPkvFile : PkvWriter::kStorageClasses;
+}
+
+PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandler* log, PkvWriter writer) {
+  PkvSet valid = set;
+  std::erase_if(valid.items, [](const PkvNvItem& item) { return item.status != 0; });
+  Normalize(valid.items);
+  try {
+    if (writer == PkvWriter::kVarnPkvFile) {
+      WriteWithVarnPkvFile(path, valid);
+    } else {
+      WriteWithStorageClasses(path, valid);
+    }
+  } catch (const VARN_PkvFile::Exception& exception) {
+    return {PkvResult::kCannotWrite, exception.what()};
+  }
+  LogWritten(log, path, valid);
+  return {};
+}
+
+}  // namespace kral
