@@ -38,6 +38,8 @@ bool RemoteHandle::OpenWithRequest() {
     if (opened && opened->error == kDone) {
       value_ = opened->value;
       open_ = true;
+    } else if (opened) {
+      phone_.log().WriteLine(kLogErr, "EFS Open error code %d", static_cast<int>(opened->error));
     }
   }
   if (unanswered > 0) CloseStrays(unanswered);

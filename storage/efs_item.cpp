@@ -28,7 +28,10 @@ bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const u8* buffer, 
   if (!IsPathWithinLimit(phone, path)) return false;
   Compose(phone, kPutItem, size, kItemFlags, kItemSequence, Bytes(buffer, size), path);
   u32 error = 0;
-  return Exchange(phone, DefaultTimeOut(phone)) && ReadFromEnd(phone, {&error}) && error == kDone;
+  if (!Exchange(phone, DefaultTimeOut(phone)) || !ReadFromEnd(phone, {&error})) return false;
+  if (error == kDone) return true;
+  phone.log().WriteLine(kLogErr, "EFS Put item error code %d", static_cast<int>(error));
+  return false;
 }
 
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {

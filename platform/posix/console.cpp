@@ -43,6 +43,8 @@ int TerminalWidth(StandardStream stream) {
   return size.ws_col;
 }
 
+void UseBinaryOutput() {}  // they always do
+
 void CatchInterrupts(std::atomic<bool>* flag) {
   interrupt_flag = flag;
   struct sigaction action {};

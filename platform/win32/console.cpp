@@ -1,6 +1,9 @@
 // The console on Windows.
 #include "platform/console.h"
 
+#include <fcntl.h>
+#include <io.h>
+#include <unistd.h>
 #include <windows.h>
 
 namespace kral {
@@ -41,6 +44,10 @@ int TerminalWidth(StandardStream stream) {
   CONSOLE_SCREEN_BUFFER_INFO info{};
   if (!::GetConsoleScreenBufferInfo(Handle(stream), &info)) return kDefaultWidth;
   return info.srWindow.Right - info.srWindow.Left + 1;
+}
+
+void UseBinaryOutput() {
+  ::_setmode(STDOUT_FILENO, _O_BINARY);
 }
 
 void CatchInterrupts(std::atomic<bool>* flag) {

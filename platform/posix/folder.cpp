@@ -1,0 +1,56 @@
+// Folders on Linux.
+#include "platform/folder.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <memory>
+
+namespace kral {
+namespace {
+
+std::error_code LastError() {
+  return {errno, std::generic_category()};
+}
+
+}  // namespace
+
+LocalFile LookAt(const std::string& path) {
+  struct stat status {};
+  if (::stat(path.c_str(), &status) != 0) return {};
+  if (S_ISREG(status.st_mode)) return {LocalKind::kFile, static_cast<uint64_t>(status.st_size)};
+  return {S_ISDIR(status.st_mode) ? LocalKind::kFolder : LocalKind::kOther};
+}
+
+std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& entries) {
+  const std::unique_ptr<DIR, int (*)(DIR*)> folder(::opendir(path.c_str()), ::closedir);
+  if (!folder) return LastError();
+  std::vector<FolderEntry> found;
+  for (;;) {
+    errno = 0;
+    const dirent* entry = ::readdir(folder.get());
+    if (entry == nullptr && errno != 0) return LastError();
+    if (entry == nullptr) break;
+    const std::string name = entry->d_name;
+    if (name == "." || name == "..") continue;
+    const std::string full = JoinPath(path, name);
+    LocalFile file = LookAt(full);
+    struct stat own {};
+    const bool is_link = ::lstat(full.c_str(), &own) == 0 && S_ISLNK(own.st_mode);
+    if (is_link && file.kind != LocalKind::kFile) file = {LocalKind::kOther};
+    found.push_back({name, file});
+  }
+  std::sort(found.begin(), found.end(), [](const auto& left, const auto& right) { return left.name < right.name; });
+  entries = std::move(found);
+  return {};
+}
+
+std::error_code MakeFolder(const std::string& path) {
+  if (::mkdir(path.c_str(), 0777) == 0) return {};
+  const auto error = LastError();
+  return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
+}
+
+}  // namespace kral

@@ -1,0 +1,73 @@
+// Folders on Windows. Names are in the system's ANSI code page, as callers pass them.
+#include "platform/folder.h"
+
+#include <windows.h>
+
+#include <algorithm>
+#include <memory>
+
+namespace kral {
+namespace {
+
+struct CloseSearch {
+  void operator()(void* search) const { ::FindClose(search); }
+};
+
+std::error_code LastError() {
+  switch (::GetLastError()) {
+    case ERROR_FILE_NOT_FOUND:
+    case ERROR_PATH_NOT_FOUND:
+    case ERROR_INVALID_NAME:
+    case ERROR_DIRECTORY:
+      return std::make_error_code(std::errc::no_such_file_or_directory);
+    case ERROR_ACCESS_DENIED:
+    case ERROR_WRITE_PROTECT:
+      return std::make_error_code(std::errc::permission_denied);
+    case ERROR_ALREADY_EXISTS:
+      return std::make_error_code(std::errc::file_exists);
+    default:
+      return std::make_error_code(std::errc::io_error);
+  }
+}
+
+LocalFile FileOf(DWORD attributes, DWORD size_high, DWORD size_low) {
+  if ((attributes & FILE_ATTRIBUTE_DIRECTORY) != 0) return {LocalKind::kFolder};
+  if ((attributes & FILE_ATTRIBUTE_DEVICE) != 0) return {LocalKind::kOther};
+  return {LocalKind::kFile, uint64_t{size_high} << 32 | size_low};
+}
+
+}  // namespace
+
+LocalFile LookAt(const std::string& path) {
+  WIN32_FILE_ATTRIBUTE_DATA data{};
+  if (!::GetFileAttributesExA(path.c_str(), GetFileExInfoStandard, &data)) return {};
+  return FileOf(data.dwFileAttributes, data.nFileSizeHigh, data.nFileSizeLow);
+}
+
+std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& entries) {
+  WIN32_FIND_DATAA data{};
+  const HANDLE search = ::FindFirstFileA(JoinPath(path, "*").c_str(), &data);
+  if (search == INVALID_HANDLE_VALUE) return LastError();
+  const std::unique_ptr<void, CloseSearch> owned(search);
+  std::vector<FolderEntry> found;
+  do {
+    const std::string name = data.cFileName;
+    if (name == "." || name == "..") continue;
+    LocalFile file = FileOf(data.dwFileAttributes, data.nFileSizeHigh, data.nFileSizeLow);
+    const bool is_link = (data.dwFileAttributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0;
+    if (is_link && file.kind != LocalKind::kFile) file = {LocalKind::kOther};
+    found.push_back({name, file});
+  } while (::FindNextFileA(search, &data));
+  if (::GetLastError() != ERROR_NO_MORE_FILES) return LastError();
+  std::sort(found.begin(), found.end(), [](const auto& left, const auto& right) { return left.name < right.name; });
+  entries = std::move(found);
+  return {};
+}
+
+std::error_code MakeFolder(const std::string& path) {
+  if (::CreateDirectoryA(path.c_str(), nullptr)) return {};
+  const auto error = LastError();
+  return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
+}
+
+}  // namespace kral
