@@ -128,7 +128,11 @@ Bytes EfsService::Write(ByteView request) {
   const auto file = descriptors_.find(descriptor);
   EfsError error = EfsError::kBadDescriptor;
   if (file != descriptors_.end() && IsWritable(file->second.flags)) {
+    Bytes& kept = file->second.node->data;
     error = tree_.Write(*file->second.node, offset, data);
+    if (error == EfsError::kDone && bad_offset_ && *bad_offset_ >= offset && *bad_offset_ - offset < data.size()) {
+      kept[*bad_offset_] ^= 0xFF;
+    }
   }
   const auto written = error == EfsError::kDone ? static_cast<uint32_t>(data.size()) : 0;
   return efs::Reply(request).U32(descriptor).U32(offset).U32(written).U32(efs::Number(error)).Take();
@@ -265,6 +269,16 @@ size_t EfsService::open_directories() const {
 void EfsService::SetWriteLimit(size_t bytes) {
   const std::lock_guard lock(mutex_);
   write_limit_ = bytes;
+}
+
+void EfsService::SetBadOffset(uint32_t offset) {
+  const std::lock_guard lock(mutex_);
+  bad_offset_ = offset;
+}
+
+void EfsService::ShowNameAs(std::string name, std::string shown) {
+  const std::lock_guard lock(mutex_);
+  shown_names_[std::move(name)] = std::move(shown);
 }
 
 void EfsService::SetSyncPolls(uint32_t polls) {

@@ -39,6 +39,10 @@ class EfsService final : public Service {
   // ------------------------------------------------------------------------------------------------------ A write
   // takes so many bytes at most; 0 takes none and tells no error.
   void SetWriteLimit(size_t bytes);
+  // Worn memory: files keep a wrong byte at this offset.
+  void SetBadOffset(uint32_t offset);
+  // A handset that is not to be trusted: its listings show one name as another.
+  void ShowNameAs(std::string name, std::string shown);
   // A sync is reported done with the n-th status request; 0: at once.
   void SetSyncPolls(uint32_t polls);
   void SetExtendedInfo(uint32_t query, std::variant<uint32_t, std::string> answer);
@@ -86,6 +90,8 @@ class EfsService final : public Service {
   size_t most_descriptors_ = 16;
   size_t most_directories_ = 4;
   size_t write_limit_ = SIZE_MAX;
+  std::optional<uint32_t> bad_offset_;
+  std::map<std::string, std::string> shown_names_;
   uint32_t sync_polls_ = 0;
   uint32_t polls_to_go_ = 0;
   uint32_t golden_copies_ = 0;

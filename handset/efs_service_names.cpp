@@ -122,8 +122,13 @@ Bytes EfsService::ReadDirectory(ByteView request) const {
     return reply.Raw(Bytes(24)).Terminated("").Take();
   }
   const auto& [name, node] = directory->second[sequence - 1];
+  const auto shown = shown_names_.find(name);
   reply.U32(0).U32(EntryType(node->kind)).U32(node->mode()).U32(node->size());
-  return reply.U32(node->accessed).U32(node->modified).U32(node->changed).Terminated(name).Take();
+  return reply.U32(node->accessed)
+      .U32(node->modified)
+      .U32(node->changed)
+      .Terminated(shown == shown_names_.end() ? name : shown->second)
+      .Take();
 }
 
 void EfsService::RegisterSystem(RequestTable& table) {

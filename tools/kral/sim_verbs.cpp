@@ -5,7 +5,9 @@
 #include <algorithm>
 #include <cctype>
 #include <memory>
+#include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "handset/pty_cable.h"
@@ -28,6 +30,9 @@ struct SimOptions {
   std::uint32_t switching_delay_ms = 0;
   std::uint32_t reset_time_ms = 0;
   std::uint32_t back_after_ms = 0;  // 0: a handset that hung up stays away
+  std::uint32_t efs_blocks = 0;     // 0: as many as there are
+  std::optional<std::uint32_t> efs_bad_offset;
+  std::vector<std::pair<std::string, std::string>> efs_shown_names;
   std::vector<std::string> faults;
   double bit_errors = 0;
   std::uint64_t seed = 1;
@@ -38,6 +43,9 @@ void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
   if (options.switches_given) handset.maintenance().SetSwitches(options.switches);
   handset.mode().SetSwitchingDelay(options.switching_delay_ms);
   handset.mode().SetResetTime(options.reset_time_ms);
+  if (options.efs_blocks != 0) handset.efs().SetTotalBlocks(options.efs_blocks);
+  if (options.efs_bad_offset) handset.efs().SetBadOffset(*options.efs_bad_offset);
+  for (const auto& [name, shown] : options.efs_shown_names) handset.efs().ShowNameAs(name, shown);
   handset.faults().SetSeed(options.seed);
   handset.faults().SetBitErrorRate(options.bit_errors);
   for (const auto& fault : options.faults) AddFault(handset.faults(), fault);
@@ -99,6 +107,9 @@ void AddOptions(CLI::App& sim, SimOptions& options) {
       "Switch word");
   sim.add_option("--switching-delay", options.switching_delay_ms, "Milliseconds until a new mode is reported");
   sim.add_option("--reset-time", options.reset_time_ms, "Milliseconds of silence after a reset");
+  sim.add_option("--efs-blocks", options.efs_blocks, "Size of the file system in blocks of 512 bytes");
+  sim.add_option("--efs-bad-offset", options.efs_bad_offset, "Files that are written keep a wrong byte at this offset");
+  sim.add_option("--efs-show", options.efs_shown_names, "NAME SHOWN: listings show one name as another")->take_all();
   sim.add_option("--fault", options.faults, "Misbehaviour, see below; may be given several times")
       ->take_all()
       ->allow_extra_args(false);
