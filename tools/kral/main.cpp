@@ -60,6 +60,7 @@ int Run(int argc, char** argv) {
   AddPortVerbs(app, context);
   AddInfoVerbs(app, context);
   AddModeVerbs(app, context);
+  AddFsVerbs(app, context);
   AddFtmVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);

@@ -21,6 +21,7 @@ struct Context {
 };
 
 void AddBandVerbs(CLI::App& app, Context& context);
+void AddFsVerbs(CLI::App& app, Context& context);
 void AddFtmVerbs(CLI::App& app, Context& context);
 void AddPortVerbs(CLI::App& app, Context& context);
 void AddInfoVerbs(CLI::App& app, Context& context);

@@ -1,0 +1,220 @@
+// Calls the library and turns its results, error numbers and log lines into errors that name the path.
+#include "tools/kral/fs_remote.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <utility>
+
+#include "tools/kral/error_lines.h"
+#include "tools/kral/fs_names.h"
+#include "tools/kral/interrupt.h"
+#include "tools/kral/output.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint32_t kNoSuchFile = 2;
+constexpr std::size_t kMostEntries = 1'000'000;  // of one directory; more is a handset gone wrong
+
+// The callbacks carry the handle and nothing else.
+RemoteFiles* current = nullptr;
+
+// What the library writes about a failed transfer, and what that means. A number may follow.
+struct Reason {
+  std::string_view line;
+  ExitCode code;
+  bool numbered;
+  std::string_view text;
+  std::string_view hint;
+};
+constexpr std::string_view kCheckPath = "kral fs stat and kral fs ls show what is there";
+constexpr std::array<Reason, 11> kReasons{{
+    {" error code ", ExitCode::kRefused, true, "", kCheckPath},
+    {"StatFSAvailSpace() returned ", ExitCode::kRefused, true, "", "kral fs df asks for the room by itself"},
+    {"Available size on local disk is insufficient.", ExitCode::kRefused, false, "no room left on the handset",
+     "kral fs df shows the room; kral fs rm makes some"},
+    {"received ERRNO ", ExitCode::kRefused, true, "", kCheckPath},
+    {"is not supported by target", ExitCode::kRefused, false, "the handset does not know the request",
+     "other firmware may"},
+    {"not in sync after", ExitCode::kNoAnswer, false, "not done in time", "--wait MS waits longer"},
+    {"too long", ExitCode::kUsage, false, "the path is too long for a request",
+     "a request has 256 bytes at most: shorten the names"},
+    {"fopen() failed to open PC file", ExitCode::kBadFile, false, "the local file cannot be written",
+     "check folder and permissions"},
+    {"Failed to write to the local file", ExitCode::kBadFile, false, "the local file cannot be written",
+     "check the disk"},
+    {"EFS Read ended at", ExitCode::kLink, false, "the handset gave fewer bytes than it had told",
+     "the file may be in use: try again"},
+    {"EFS Read needs more than", ExitCode::kLink, false, "the handset gave more bytes than it had told",
+     "the file may be in use: try again"},
+}};
+
+std::uint32_t NumberAfter(std::string_view line, std::size_t at) {
+  std::uint32_t number = 0;
+  std::from_chars(line.data() + at, line.data() + line.size(), number);
+  return number;
+}
+
+RemoteEntry::Kind KindOf(const KRAL_EFS_ENTRY& entry) {
+  if (entry.type == KRAL_EFS_ENTRY_FILE) return RemoteEntry::Kind::kFile;
+  if (entry.type == KRAL_EFS_ENTRY_LINK) return RemoteEntry::Kind::kLink;
+  // Kinds that the handset alone knows are reported as directories, too.
+  const auto kind = entry.mode & KRAL_EFS_MODE_KIND;
+  return kind == 0 || kind == 0x4000 ? RemoteEntry::Kind::kDirectory : RemoteEntry::Kind::kOther;
+}
+
+}  // namespace
+
+bool RemoteStatus::is_directory() const {
+  return (mode & KRAL_EFS_MODE_KIND) == 0x4000;
+}
+bool RemoteStatus::is_item() const {
+  return (mode & KRAL_EFS_MODE_KIND) == KRAL_EFS_MODE_ITEM_FILE;
+}
+
+RemoteFiles::RemoteFiles(const SessionOptions& options) : session_(options) {
+  current = this;
+  KRAL_ConfigureEfs2CallBacks(session_.handle(), &RemoteFiles::OnChunk, &RemoteFiles::OnEntry);
+}
+
+RemoteFiles::~RemoteFiles() {
+  KRAL_ConfigureEfs2CallBacks(session_.handle(), nullptr, nullptr);
+  current = nullptr;
+}
+
+void KRAL_CALL RemoteFiles::OnChunk(std::uintptr_t, std::uintptr_t, std::uint32_t, std::uint32_t, std::uint32_t done,
+                                    std::uint32_t, KRAL_HANDLE handle) {
+  if (Interrupted()) KRAL_AbortEFS_Operation(handle);
+  if (current != nullptr && current->watch_) current->watch_(done);
+}
+
+void KRAL_CALL RemoteFiles::OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle) {
+  if (current == nullptr || Interrupted() || current->entries_.size() >= kMostEntries) {
+    KRAL_AbortEFS_Operation(handle);
+    return;
+  }
+  // The full path begins with the directory; what follows is the handset's, slashes included.
+  std::string_view name = entry->name;
+  name.remove_prefix(std::min(name.size(), JoinEfs(current->listed_, "").size()));
+  current->entries_.push_back({KindOf(*entry), std::string(name), entry->mode, entry->size, entry->modify_time});
+}
+
+std::string RemoteFiles::Where(std::string_view path) const {
+  return fmt::format("{} on {}", Printable(path), DescribePort(session_.port()));
+}
+
+ToolError RemoteFiles::Refusal(std::string_view what, std::uint32_t error_number) const {
+  return {ExitCode::kRefused,
+          fmt::format("the handset refused {} on {}: {}", what, DescribePort(session_.port()), ErrorText(error_number)),
+          std::string(kCheckPath)};
+}
+
+ToolError RemoteFiles::Explain(std::string_view what) const {
+  if (Interrupted()) return InterruptedError();
+  const auto lines = ErrorLines();
+  // The last word counts: a try that was refused may have been followed by one that got no answer.
+  for (auto line = lines.rbegin(); line != lines.rend(); ++line) {
+    if (line->find("Request timed out") != std::string::npos) break;
+    if (line->find("Error. Send data failed.") != std::string::npos) break;
+    for (const auto& reason : kReasons) {
+      const auto at = line->find(reason.line);
+      if (at == std::string::npos) continue;
+      if (reason.numbered) return Refusal(what, NumberAfter(*line, at + reason.line.size()));
+      return {reason.code, fmt::format("{} failed on {}: {}", what, DescribePort(session_.port()), reason.text),
+              std::string(reason.hint)};
+    }
+  }
+  return session_.Explain(what);
+}
+
+template <class Request>
+void RemoteFiles::Transfer(std::string_view what, Request&& request) {
+  session_.Begin();
+  if (request() == 0) throw Explain(what);
+}
+
+void RemoteFiles::Ask(std::string_view what, const std::function<std::uint8_t(std::uint32_t*)>& request) {
+  std::uint32_t error = 0;
+  Transfer(what, [&] { return request(&error); });
+  if (error != 0) throw Refusal(what, error);
+}
+
+std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
+  RemoteStatus status;
+  std::uint32_t error = 0;
+  const auto what = fmt::format("the status of {}", Printable(path));
+  Transfer(what, [&] {
+    return KRAL_EFS2_DIAG_STAT(session_.handle(), path.c_str(), &error, &status.mode, &status.size, &status.links,
+                               &status.accessed, &status.modified, &status.changed);
+  });
+  if (error == kNoSuchFile) return std::nullopt;
+  if (error != 0) throw Refusal(what, error);
+  return status;
+}
+
+RemoteStatus RemoteFiles::Status(const std::string& path) {
+  if (const auto status = Find(path)) return *status;
+  throw Refusal(fmt::format("the status of {}", Printable(path)), kNoSuchFile);
+}
+
+std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
+  listed_ = path;
+  entries_.clear();
+  Transfer(fmt::format("the listing of {}", Printable(path)),
+           [&] { return KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr); });
+  std::sort(entries_.begin(), entries_.end(),
+            [](const RemoteEntry& left, const RemoteEntry& right) { return left.name < right.name; });
+  return std::move(entries_);
+}
+
+void RemoteFiles::MakeDirectory(const std::string& path) {
+  const auto what = fmt::format("the making of directory {}", Printable(path));
+  std::uint32_t error = 0;
+  session_.Begin();
+  if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) != 0) return;
+  throw error != 0 ? Refusal(what, error) : Explain(what);
+}
+
+void RemoteFiles::MakeParents(const std::string& path) {
+  for (std::size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    MakeDirectory(path.substr(0, end));
+  }
+  if (path != "/") MakeDirectory(path);
+}
+
+void RemoteFiles::ReadInto(const std::string& local, const std::string& path) {
+  Transfer(fmt::format("reading {}", Printable(path)),
+           [&] { return KRAL_EfsRead(session_.handle(), local.c_str(), path.c_str()); });
+}
+
+Bytes RemoteFiles::ReadAll(const std::string& path, std::uint32_t size) {
+  Bytes bytes(size);
+  Transfer(fmt::format("reading {}", Printable(path)),
+           [&] { return KRAL_EfsReadMem(session_.handle(), path.c_str(), bytes.data(), &size); });
+  bytes.resize(size);
+  return bytes;
+}
+
+void RemoteFiles::Write(const std::string& path, std::span<const std::uint8_t> bytes) {
+  Transfer(fmt::format("writing {}", Printable(path)), [&] {
+    return KRAL_EfsWriteMem(session_.handle(), bytes.data(), static_cast<std::uint32_t>(bytes.size()), path.c_str());
+  });
+}
+
+void RemoteFiles::WriteItem(const std::string& path, std::span<const std::uint8_t> bytes) {
+  if (bytes.size() > KRAL_EFS_ITEM_SIZE) {
+    throw ToolError(ExitCode::kBadFile,
+                    fmt::format("{} bytes are too many for the item file {}", bytes.size(), Where(path)),
+                    fmt::format("an item file holds {} bytes; remove it first to put an ordinary file in its place",
+                                KRAL_EFS_ITEM_SIZE));
+  }
+  Transfer(fmt::format("writing the item {}", Printable(path)), [&] {
+    return KRAL_EfsPutItemFromMem(session_.handle(), path.c_str(), bytes.data(),
+                                  static_cast<std::uint32_t>(bytes.size()));
+  });
+}
+
+}  // namespace kral::tool
