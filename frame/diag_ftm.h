@@ -103,6 +103,7 @@ class Diag_FTM {
   const FtmSettings& ftm() const { return ftm_; }
   EfsSettings& efs() { return efs_; }
   NvBatch& nv_batch() { return nv_batch_; }
+  PkvSettings& pkv() { return pkv_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
@@ -134,6 +135,7 @@ class Diag_FTM {
   FtmSettings ftm_;
   EfsSettings efs_;
   NvBatch nv_batch_;
+  PkvSettings pkv_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
 
   OpenArguments last_open_;

@@ -45,6 +45,11 @@ class OrbtServer {
 class SoftwareDownload {
  public:
   virtual ~SoftwareDownload() = default;
+
+  // PKV files to and from the handset, by the server's download agent. They may throw OrbtServerException.
+  virtual bool UploadPkvFile(const std::string& /*file*/, uint32_t /*options*/) { return false; }
+  virtual bool DownloadPkvFile(const std::string& /*file*/, uint32_t /*options*/) { return false; }
+
   bool ConfigureTimeOut(uint32_t id, int32_t milliseconds);
   int32_t GetTimeOut(uint32_t id) const;
 

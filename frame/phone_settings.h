@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "kral/efs.h"
+#include "kral/pkv.h"
 
 namespace kral {
 
@@ -47,6 +48,15 @@ struct NvBatch {
   bool on = false;
   std::deque<NvQueueItem> queue;
   std::vector<uint16_t> read_only;  // items whose refusal as read-only is no error
+};
+
+// What backups read, and what became of the last one's items.
+struct PkvSettings {
+  std::atomic<KRAL_PKV_CALLBACK> callback{nullptr};  // set from any thread
+  uint16_t first_item = 0;
+  uint16_t last_item = 9999;
+  uint16_t subscriptions = 1;
+  KRAL_PKV_COUNTS counts{};
 };
 
 }  // namespace kral

@@ -30,6 +30,7 @@
 #include "kral/efs.h"
 #include "kral/ftm.h"
 #include "kral/nv.h"
+#include "kral/pkv.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"
 

@@ -1,0 +1,161 @@
+// The files that belong to a backup: where the handset keeps them, reading them and writing them.
+#include <algorithm>
+#include <array>
+
+#include "frame/base/little_endian.h"
+#include "storage/efs_client.h"
+#include "storage/efs_request.h"
+#include "storage/efs_transfer.h"
+#include "storage/phone_items.h"
+
+namespace kral {
+namespace {
+
+// As they stand: some are without a slash in front.
+constexpr std::array<const char*, 5> kFolders = {"/nv/items", "nv/item_files/conf", "nv/reg_files/conf",
+                                                 "/nv/item_files/rfnv", "nv/item_store/rfnv"};
+
+// What a hostile handset may not exceed.
+constexpr int kDeepest = 8;
+constexpr uint32_t kMostEntries = 20000;  // of one folder, and files in all
+constexpr uint32_t kUsualEntries = 256;
+constexpr uint32_t kLargestFile = 1 << 20;
+
+constexpr uint32_t kDirectory = 0x4000;
+constexpr uint32_t kPermissions = 0777;
+
+}  // namespace
+
+PhoneItems::Answer PhoneItems::Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status) {
+  efs::FileStatus found;
+  const Answer answer = Try([&] { return efs::Stat(phone_, path, found); });
+  mode = found.mode;
+  size = found.size;
+  status = answer == Answer::kAnswered ? found.error_number : kRefusedStatus;
+  return answer;
+}
+
+bool PhoneItems::List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries) {
+  entries.resize(kUsualEntries);
+  for (;;) {
+    auto count = static_cast<uint32_t>(entries.size());
+    if (!efs::ListDirectory(phone_, folder.c_str(), KRAL_EFS_FILTER_ALL, entries.data(), &count)) return false;
+    if (count > kMostEntries) return false;
+    const bool complete = count <= entries.size();
+    entries.resize(count);
+    if (complete) return true;
+  }
+}
+
+PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::vector<FoundFile>& files) {
+  uint32_t mode = 0;
+  uint32_t size = 0;
+  uint32_t status = 0;
+  const Answer answer = Status(folder.c_str(), mode, size, status);
+  if (answer == Answer::kLost) return answer;
+  if (answer == Answer::kRefused || status != efs::kDone || (mode & efs::kModeKind) != kDirectory || depth > kDeepest)
+    return Answer::kAnswered;
+  std::vector<KRAL_EFS_ENTRY> entries;
+  if (!List(folder, entries)) return Answer::kLost;
+  for (const KRAL_EFS_ENTRY& entry : entries) {
+    if (entry.type == KRAL_EFS_ENTRY_FILE) {
+      if (files.size() >= kMostEntries) return Answer::kLost;
+      files.push_back({entry.name, entry.mode, entry.size});
+    } else if (entry.type == KRAL_EFS_ENTRY_DIRECTORY && Walk(entry.name, depth + 1, files) == Answer::kLost) {
+      return Answer::kLost;
+    }
+  }
+  return Answer::kAnswered;
+}
+
+PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {
+  for (const char* folder : kFolders) {
+    if (Walk(folder, 1, files) == Answer::kLost) return Answer::kLost;
+  }
+  return Answer::kAnswered;
+}
+
+// The error number of the item request that has just failed; nothing when it was not answered.
+std::optional<uint32_t> PhoneItems::ItemError(bool reading) const {
+  const auto request = phone_.packet().request();
+  const auto reply = phone_.packet().response();
+  if (reply.size() < efs::kHeaderSize + sizeof(uint32_t) || request.size() < efs::kHeaderSize ||
+      !std::equal(request.begin(), request.begin() + efs::kHeaderSize, reply.begin())) {
+    return std::nullopt;
+  }
+  const auto error = LoadLe<uint32_t>(reply, reading ? efs::kItemError : reply.size() - sizeof(uint32_t));
+  return error && *error != efs::kDone ? error : std::nullopt;
+}
+
+PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) {
+  return Try([&] {
+    status = efs::kDone;
+    if (efs::GetItem(phone_, file.path.c_str(), KRAL_EFS_ITEM_SIZE, {}, file.bytes)) return true;
+    const auto error = ItemError(true);
+    status = error.value_or(kRefusedStatus);
+    return error.has_value();
+  });
+}
+
+PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t& status) {
+  uint32_t mode = 0;
+  uint32_t size = 0;
+  const Answer answer = Status(file.path.c_str(), mode, size, status);
+  if (answer != Answer::kAnswered || status != efs::kDone) return answer;
+  if (size > kLargestFile) return Answer::kRefused;
+  file.bytes.resize(size);
+  if (efs::ReadToMemory(phone_, file.path.c_str(), file.bytes.data(), &size)) {
+    file.bytes.resize(size);
+    return Answer::kAnswered;
+  }
+  // Lost, or only not to be had: a handset that still answers tells.
+  return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
+}
+
+PhoneItems::Answer PhoneItems::ReadFile(PkvEfsFile& file, uint32_t& status) {
+  file.bytes.clear();
+  const Answer answer = file.is_item_file() ? ReadItemFile(file, status) : ReadPlainFile(file, status);
+  if (answer != Answer::kAnswered) status = kRefusedStatus;
+  return answer;
+}
+
+void PhoneItems::MakeFolders(const std::string& path) {
+  for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    const std::string folder = path.substr(0, end);
+    if (folders_.insert(folder).second) efs::MakeDirectory(phone_, folder.c_str(), nullptr);
+  }
+}
+
+PhoneItems::Answer PhoneItems::WriteItemFile(const PkvEfsFile& file, uint32_t& status) {
+  return Try([&] {
+    status = efs::kDone;
+    if (efs::PutItemFromMemory(phone_, file.path.c_str(), file.bytes.data(), static_cast<uint32_t>(file.bytes.size())))
+      return true;
+    const auto error = ItemError(false);
+    status = error.value_or(kRefusedStatus);
+    return error.has_value();
+  });
+}
+
+PhoneItems::Answer PhoneItems::WritePlainFile(const PkvEfsFile& file, uint32_t& status) {
+  status = efs::kDone;
+  const auto size = static_cast<uint32_t>(file.bytes.size());
+  if (efs::WriteFromMemory(phone_, file.bytes.data(), size, file.path.c_str())) return Answer::kAnswered;
+  uint32_t mode = 0;
+  uint32_t present = 0;
+  return Status(file.path.c_str(), mode, present, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
+}
+
+PhoneItems::Answer PhoneItems::WriteFile(const PkvEfsFile& file, uint32_t& status) {
+  MakeFolders(file.path);
+  const bool item = file.is_item_file() && file.bytes.size() <= KRAL_EFS_ITEM_SIZE;
+  const Answer answer = item ? WriteItemFile(file, status) : WritePlainFile(file, status);
+  if (answer != Answer::kAnswered) status = kRefusedStatus;
+  const auto permissions = static_cast<uint16_t>(file.mode & kPermissions);
+  if (status != efs::kDone || permissions == 0) return answer;
+  // A handset that does not let them be changed keeps its own.
+  const Answer changed = Try([&] { return efs::ChangeMode(phone_, file.path.c_str(), permissions, nullptr); });
+  return changed == Answer::kLost ? changed : answer;
+}
+
+}  // namespace kral

@@ -1,0 +1,80 @@
+// Single items and files on the handset, as backups need them: every request is tried again, and the late answer to an
+// earlier request is never taken for this one's.
+#ifndef KRAL_STORAGE_PHONE_ITEMS_H
+#define KRAL_STORAGE_PHONE_ITEMS_H
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <set>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "frame/diag_ftm.h"
+#include "storage/efs_backup.h"
+#include "storage/pkv_format.h"
+
+namespace kral {
+
+class PhoneItems {
+ public:
+  enum class Answer {
+    kAnswered,  // with a status
+    kRefused,   // as a request; the handset has no status for it
+    kLost,      // no answer, in spite of all tries
+  };
+  static constexpr uint32_t kRefusedStatus = 0xFFFF;
+  // As many full items as one packet of a batch takes.
+  static constexpr size_t kMostInBatch = 9;
+
+  // Takes the batch queue and the EFS callbacks away from the caller while it lives.
+  explicit PhoneItems(Diag_FTM& phone);
+  ~PhoneItems();
+  PhoneItems(const PhoneItems&) = delete;
+  PhoneItems& operator=(const PhoneItems&) = delete;
+
+  // --- NV items; an `element` is the one of an array item that the index word names ---------------------------------
+  Answer Read(PkvNvItem& item, bool element);                           // data and status
+  Answer Write(const PkvNvItem& item, bool element, uint16_t& status);  // one by one
+  // At most kMostInBatch of subscription 0, in one packet. Gives the statuses up to the first that is not 0.
+  Answer WriteBatch(std::span<const PkvNvItem> items, const std::function<bool(const PkvNvItem&)>& is_element,
+                    std::vector<uint16_t>& statuses);
+  // Whether the caller does not count the item's being read-only as a failure.
+  bool MayBeReadOnly(uint16_t id) const;
+
+  // --- Files; the status is the handset's error number
+  // ----------------------------------------------------------------
+  struct FoundFile {
+    std::string path;
+    uint32_t mode;
+    uint32_t size;
+  };
+  // Appends what the item folders hold. A handset without them, or without a file system, has none.
+  Answer FindFiles(std::vector<FoundFile>& files);
+  Answer ReadFile(PkvEfsFile& file, uint32_t& status);         // by path and mode
+  Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with folders and permissions
+
+ private:
+  Answer Try(const std::function<bool()>& ask);
+  bool Echoes16(size_t offset, uint16_t value) const;
+  Answer Walk(const std::string& folder, int depth, std::vector<FoundFile>& files);
+  bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
+  Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
+  Answer ReadItemFile(PkvEfsFile& file, uint32_t& status);
+  Answer ReadPlainFile(PkvEfsFile& file, uint32_t& status);
+  Answer WriteItemFile(const PkvEfsFile& file, uint32_t& status);
+  Answer WritePlainFile(const PkvEfsFile& file, uint32_t& status);
+  std::optional<uint32_t> ItemError(bool reading) const;
+  void MakeFolders(const std::string& path);
+
+  Diag_FTM& phone_;
+  NvBatch callers_batch_;
+  KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
+  KRAL_EFS_DIRECTORY_CALLBACK callers_directory_callback_;
+  std::set<std::string, std::less<>> folders_;  // that were made, or were there
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,110 @@
+// Reads items and files of the handset into a set and writes it at the end, so that nothing changes before all is read.
+#include <algorithm>
+#include <array>
+
+#include "commands/core_diag.h"
+#include "storage/phone_items.h"
+#include "storage/pkv_jobs.h"
+
+namespace kral::pkv {
+namespace {
+
+using Answer = PhoneItems::Answer;
+
+// A text of the handset as the value of a property: it must not end its line.
+std::string PropertyText(const char* text) {
+  std::string value = text;
+  std::replace_if(
+      value.begin(), value.end(), [](char c) { return static_cast<unsigned char>(c) < ' '; }, ' ');
+  value.erase(value.find_last_not_of(' ') + 1);
+  return value;
+}
+
+// Who the handset is, as far as it tells.
+void ReadIdentity(Diag_FTM& phone, PkvProperties& properties) {
+  uint32_t serial = 0;
+  if (diag::ReadSerialNumber(phone, &serial)) {
+    std::array<char, 16> text{};
+    std::snprintf(text.data(), text.size(), "%08X", static_cast<unsigned>(serial));
+    properties.values.emplace_back("ESN", text.data());
+  }
+  std::array<std::array<char, CDiagPacket::kCapacity>, 2> texts{};
+  uint32_t hardware = 0;
+  uint32_t model = 0;
+  if (diag::ReadExtendedBuildId(phone, &hardware, &model, texts[0].data(), texts[1].data())) {
+    properties.values.emplace_back("HardwareVersion", std::to_string(hardware));
+    properties.values.emplace_back("MobileModel", std::to_string(model));
+    properties.values.emplace_back("SoftwareRevision", PropertyText(texts[0].data()));
+    properties.values.emplace_back("Model", PropertyText(texts[1].data()));
+  }
+}
+
+class BackupJob {
+ public:
+  explicit BackupJob(Diag_FTM& phone) : phone_(phone), items_(phone) {}
+
+  uint32_t Run(PkvSet& set) {
+    std::vector<PhoneItems::FoundFile> files;
+    if (items_.FindFiles(files) == Answer::kLost) return KRAL_PKV_STATUS_LOST;
+    const PkvSettings& settings = phone_.pkv();
+    const size_t range = size_t{settings.last_item} - settings.first_item + 1;
+    JobReport report(phone_, range * settings.subscriptions + files.size());
+    for (uint16_t subscription = 0; subscription < settings.subscriptions; ++subscription) {
+      for (uint32_t id = settings.first_item; id <= settings.last_item; ++id) {
+        if (!ReadItem({.id = static_cast<uint16_t>(id), .subscription = subscription}, set, report)) return End(report);
+      }
+    }
+    for (const PhoneItems::FoundFile& file : files) {
+      if (!ReadFile({.path = file.path, .mode = file.mode, .bytes = {}}, set, report)) return End(report);
+    }
+    return set.items.empty() && set.files.empty() ? KRAL_PKV_STATUS_NOTHING_READ : KRAL_PKV_STATUS_DONE;
+  }
+
+ private:
+  static uint32_t End(const JobReport& report) {
+    return report.stopped() ? KRAL_PKV_STATUS_STOPPED : KRAL_PKV_STATUS_LOST;
+  }
+
+  // False when the job is over.
+  bool ReadItem(PkvNvItem item, PkvSet& set, JobReport& report) {
+    const Answer answer = items_.Read(item, false);
+    if (answer == Answer::kLost) return false;
+    if (answer == Answer::kRefused) {
+      report.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+    } else if (item.status != 0) {
+      report.Add(item, KRAL_PKV_SKIPPED, item.status);
+    } else {
+      set.items.push_back(item);
+      report.Add(item, KRAL_PKV_DONE, 0);
+    }
+    return !report.stopped();
+  }
+
+  bool ReadFile(PkvEfsFile file, PkvSet& set, JobReport& report) {
+    uint32_t status = 0;
+    if (items_.ReadFile(file, status) == Answer::kLost) return false;
+    report.Add(file, status == 0 ? KRAL_PKV_DONE : KRAL_PKV_REFUSED, status);
+    if (status == 0) set.files.push_back(std::move(file));
+    return !report.stopped();
+  }
+
+  Diag_FTM& phone_;
+  PhoneItems items_;
+};
+
+}  // namespace
+
+uint32_t Backup(Diag_FTM& phone, const std::string& path) {
+  PkvSet set;
+  phone.pkv().counts = {};
+  ReadIdentity(phone, set.properties);
+  if (const uint32_t status = BackupJob(phone).Run(set); status != KRAL_PKV_STATUS_DONE) {
+    phone.log().WriteLine(kLogErr, "KRAL_BackupNVFromMobileToPKV() - nothing written, status %u", status);
+    return status;
+  }
+  const PkvOutcome outcome = WritePkv(path, set, &phone.log());
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  return StatusOf(outcome.result);
+}
+
+}  // namespace kral::pkv

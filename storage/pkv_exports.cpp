@@ -1,0 +1,92 @@
+// Exports of PKV backups: name line, handle, operation.
+#include "commands/outputs.h"
+#include "frame/export_call.h"
+#include "frame/orbt_server.h"
+#include "kral/pkv.h"
+#include "storage/pkv_jobs.h"
+
+namespace pkv = kral::pkv;
+using kral::Diag_FTM;
+using kral::LogName;
+using kral::OnPhone;
+using kral::OnPhoneAtOnce;
+
+namespace {
+
+constexpr uint32_t kUnknownStatus = 0xFFFFFFFF;
+
+using Job = uint32_t (*)(Diag_FTM& phone, const std::string& path);
+
+bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
+  kral::Put(status, kUnknownStatus);
+  const uint32_t result = job(phone, file == nullptr ? "" : file);
+  kral::Put(status, result);
+  return result == KRAL_PKV_STATUS_DONE;
+}
+
+bool SetCallback(Diag_FTM& phone, KRAL_PKV_CALLBACK callback) {
+  phone.pkv().callback = callback;
+  return true;
+}
+
+bool GetCounts(Diag_FTM& phone, KRAL_PKV_COUNTS* counts) {
+  kral::Put(counts, phone.pkv().counts);
+  return true;
+}
+
+using ServerJob = bool (kral::SoftwareDownload::*)(const std::string& file, uint32_t options);
+
+uint8_t RunOnServer(KRAL_HANDLE handle, const char* name, ServerJob job, const char* file, uint32_t options) {
+  LogName(handle, name);
+  return OnPhone(handle, [&](Diag_FTM& phone) {
+    const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(handle);
+    if (server && ((*server).*job)(file == nullptr ? "" : file, options)) return true;
+    phone.log().WriteLine(kral::kLogErr, "%s() - %s", name, server ? "the download agent failed" : "no phone server");
+    return false;
+  });
+}
+
+}  // namespace
+
+extern "C" {
+
+uint8_t KRAL_CALL KRAL_PKV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_PKV_CALLBACK callback) {
+  LogName(handle, "KRAL_PKV_ConfigureCallBack");
+  return OnPhoneAtOnce(handle, SetCallback, callback);
+}
+
+uint8_t KRAL_CALL KRAL_PKV_ConfigureBackup(KRAL_HANDLE handle, uint16_t first_item, uint16_t last_item,
+                                           uint16_t subscriptions) {
+  LogName(handle, "KRAL_PKV_ConfigureBackup");
+  return OnPhone(handle, pkv::ConfigureBackup, first_item, last_item, subscriptions);
+}
+
+uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNTS* counts) {
+  LogName(handle, "KRAL_PKV_GetCounts");
+  return OnPhone(handle, GetCounts, counts);
+}
+
+uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
+  LogName(handle, "KRAL_NV_BackupNVFromMobile");  // deliberately not the function's own name
+  return OnPhone(handle, Run, pkv::Backup, file, status);
+}
+
+uint8_t KRAL_CALL KRAL_RestoreNVFromPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
+  LogName(handle, "KRAL_RestoreNVFromPKV");
+  return OnPhone(handle, Run, pkv::Restore, file, status);
+}
+
+uint8_t KRAL_CALL KRAL_PKV_Verify(KRAL_HANDLE handle, const char* file, uint32_t* status) {
+  LogName(handle, "KRAL_PKV_Verify");
+  return OnPhone(handle, Run, pkv::Verify, file, status);
+}
+
+uint8_t KRAL_CALL KRAL_UploadPkvFile(KRAL_HANDLE handle, const char* file, uint32_t options) {
+  return RunOnServer(handle, "KRAL_UploadPkvFile", &kral::SoftwareDownload::UploadPkvFile, file, options);
+}
+
+uint8_t KRAL_CALL KRAL_DownloadPkvFile(KRAL_HANDLE handle, const char* file, uint32_t options) {
+  return RunOnServer(handle, "KRAL_DownloadPkvFile", &kral::SoftwareDownload::DownloadPkvFile, file, options);
+}
+
+}  // extern "C"

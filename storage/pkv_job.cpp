@@ -1,0 +1,99 @@
+// The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
+#include "storage/pkv_jobs.h"
+
+namespace kral::pkv {
+namespace {
+
+uint32_t* CounterOf(KRAL_PKV_COUNTS& counts, uint32_t result) {
+  switch (result) {
+    case KRAL_PKV_DONE:
+      return &counts.done;
+    case KRAL_PKV_SKIPPED:
+      return &counts.skipped;
+    case KRAL_PKV_REFUSED:
+      return &counts.refused;
+    case KRAL_PKV_DIFFERENT:
+      return &counts.different;
+    case KRAL_PKV_NOT_READ_BACK:
+      return &counts.not_read_back;
+    default:
+      return &counts.not_reached;
+  }
+}
+
+}  // namespace
+
+bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions) {
+  constexpr uint16_t kMostSubscriptions = 16;
+  if (first_item > last_item || subscriptions < 1 || subscriptions > kMostSubscriptions) return false;
+  phone.pkv().first_item = first_item;
+  phone.pkv().last_item = last_item;
+  phone.pkv().subscriptions = subscriptions;
+  return true;
+}
+
+JobReport::JobReport(Diag_FTM& phone, size_t total) : phone_(phone) {
+  phone.pkv().counts = {};
+  phone.pkv().counts.total = static_cast<uint32_t>(total);
+}
+
+JobReport::~JobReport() {
+  phone_.pkv().counts.not_reached += phone_.pkv().counts.total - reported_;
+}
+
+const KRAL_PKV_COUNTS& JobReport::counts() const {
+  return phone_.pkv().counts;
+}
+
+void JobReport::Add(const PkvNvItem& item, uint32_t result, uint32_t status) {
+  KRAL_PKV_ITEM record{item.id, item.index, item.subscription, 0, status, result};
+  Add(record, nullptr);
+}
+
+void JobReport::Add(const PkvEfsFile& file, uint32_t result, uint32_t status) {
+  KRAL_PKV_ITEM record{0, 0, 0, 0, status, result};
+  Add(record, file.path.c_str());
+}
+
+void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
+  if (stopped_) return;
+  KRAL_PKV_COUNTS& counts = phone_.pkv().counts;
+  ++*CounterOf(counts, record.result);
+  ++reported_;
+  const auto callback = phone_.pkv().callback.load();
+  if (callback != nullptr && callback(&record, path, reported_, counts.total, phone_.handle()) == 0) stopped_ = true;
+}
+
+uint32_t StatusOf(PkvResult result) {
+  switch (result) {
+    case PkvResult::kDone:
+      return KRAL_PKV_STATUS_DONE;
+    case PkvResult::kNoStorage:
+      return KRAL_PKV_STATUS_NO_STORAGE;
+    case PkvResult::kDamagedItem:
+      return KRAL_PKV_STATUS_BAD_ITEM;
+    case PkvResult::kCannotOpen:
+    case PkvResult::kCannotWrite:
+      break;
+  }
+  return KRAL_PKV_STATUS_CANNOT_OPEN;
+}
+
+uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
+  phone.pkv().counts = {};
+  const PkvOutcome outcome = ReadPkv(path, set);
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  return StatusOf(outcome.result);
+}
+
+ArrayItems::ArrayItems(const PkvSet& set) {
+  for (const PkvNvItem& item : set.items) {
+    if (item.index != 0) arrays_.emplace(item.subscription, item.id);
+  }
+}
+
+bool ArrayItems::IsElement(const PkvNvItem& item) const {
+  return arrays_.contains({item.subscription, item.id});
+}
+
+}  // namespace kral::pkv

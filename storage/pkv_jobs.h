@@ -1,0 +1,59 @@
+// Backups to PKV files, restores from them, comparisons with them. Each gives KRAL_PKV_STATUS_...
+#ifndef KRAL_STORAGE_PKV_JOBS_H
+#define KRAL_STORAGE_PKV_JOBS_H
+
+#include <cstdint>
+#include <set>
+#include <string>
+#include <utility>
+
+#include "frame/diag_ftm.h"
+#include "storage/pkv_set.h"
+
+namespace kral::pkv {
+
+uint32_t Backup(Diag_FTM& phone, const std::string& path);   // pkv_backup.cpp
+uint32_t Restore(Diag_FTM& phone, const std::string& path);  // pkv_restore.cpp
+uint32_t Verify(Diag_FTM& phone, const std::string& path);   // pkv_verify.cpp
+
+bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions);
+
+// What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
+class JobReport {
+ public:
+  JobReport(Diag_FTM& phone, size_t total);
+  ~JobReport();  // what was not reported was not reached
+  JobReport(const JobReport&) = delete;
+  JobReport& operator=(const JobReport&) = delete;
+
+  // Each item and file is reported once. After the caller has stopped the job nothing counts any more.
+  void Add(const PkvNvItem& item, uint32_t result, uint32_t status);
+  void Add(const PkvEfsFile& file, uint32_t result, uint32_t status);
+  bool stopped() const { return stopped_; }
+  const KRAL_PKV_COUNTS& counts() const;
+
+ private:
+  void Add(KRAL_PKV_ITEM& record, const char* path);
+
+  Diag_FTM& phone_;
+  uint32_t reported_ = 0;
+  bool stopped_ = false;
+};
+
+// Reads the file of a restore or a comparison; what is wrong with it goes to the log.
+uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
+uint32_t StatusOf(PkvResult result);
+
+// Ids of which a set holds elements: index words other than 0 name them. Index 0 is then an element, too.
+class ArrayItems {
+ public:
+  explicit ArrayItems(const PkvSet& set);
+  bool IsElement(const PkvNvItem& item) const;
+
+ private:
+  std::set<std::pair<uint16_t, uint16_t>> arrays_;  // subscription, id
+};
+
+}  // namespace kral::pkv
+
+#endif

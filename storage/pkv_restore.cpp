@@ -1,0 +1,126 @@
+// Writes the items and files of a PKV file to the handset and reads back what it wrote: packet by packet, so that at
+// any moment it is known what became of each item.
+#include <algorithm>
+
+#include "commands/nv_item.h"
+#include "storage/phone_items.h"
+#include "storage/pkv_jobs.h"
+
+namespace kral::pkv {
+namespace {
+
+using Answer = PhoneItems::Answer;
+
+class RestoreJob {
+ public:
+  RestoreJob(Diag_FTM& phone, const PkvSet& set)
+      : items_(phone), set_(set), arrays_(set), report_(phone, set.items.size() + set.files.size()) {}
+
+  uint32_t Run() {
+    std::span<const PkvNvItem> rest(set_.items);  // subscription 0 comes first
+    while (!rest.empty() && !report_.stopped()) rest = rest.subspan(RestorePacket(rest));
+    for (const PkvEfsFile& file : set_.files) {
+      if (!report_.stopped()) RestoreFile(file);
+    }
+    const KRAL_PKV_COUNTS& counts = report_.counts();
+    if (report_.stopped()) return KRAL_PKV_STATUS_STOPPED;
+    if (lost_) return KRAL_PKV_STATUS_LOST;
+    return counts.done + counts.skipped == counts.total ? KRAL_PKV_STATUS_DONE : KRAL_PKV_STATUS_NOT_WRITTEN;
+  }
+
+ private:
+  // As many items as go together; gives how many these were.
+  size_t RestorePacket(std::span<const PkvNvItem> rest) {
+    size_t count = 0;
+    while (count < std::min(rest.size(), PhoneItems::kMostInBatch) && rest[count].subscription == 0) ++count;
+    const auto packet = rest.first(std::max<size_t>(count, 1));
+    if (count == 0 && IsInexpressible(packet.front())) {
+      report_.Add(packet.front(), KRAL_PKV_SKIPPED, 0);
+      return 1;
+    }
+    std::vector<uint16_t> statuses;
+    if (count > 0) WritePacket(packet, statuses);
+    WriteSingly(packet, statuses);
+    for (size_t i = 0; i < packet.size(); ++i) {
+      if (i < statuses.size()) {
+        Judge(packet[i], statuses[i]);
+      } else {
+        report_.Add(packet[i], KRAL_PKV_NOT_REACHED, 0);
+      }
+    }
+    return packet.size();
+  }
+
+  // No request names both a subscription and an element.
+  bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && arrays_.IsElement(item); }
+
+  // In batches, each of which ends with its first refused item.
+  void WritePacket(std::span<const PkvNvItem> packet, std::vector<uint16_t>& statuses) {
+    const auto is_element = [this](const PkvNvItem& item) { return arrays_.IsElement(item); };
+    while (statuses.size() < packet.size() && batches_work_ && !lost_) {
+      std::vector<uint16_t> more;
+      const Answer answer = items_.WriteBatch(packet.subspan(statuses.size()), is_element, more);
+      lost_ = answer == Answer::kLost;
+      batches_work_ = answer != Answer::kRefused;
+      if (answer == Answer::kAnswered) statuses.insert(statuses.end(), more.begin(), more.end());
+    }
+  }
+
+  // What the handset does not take in batches.
+  void WriteSingly(std::span<const PkvNvItem> packet, std::vector<uint16_t>& statuses) {
+    while (statuses.size() < packet.size() && !lost_) {
+      const PkvNvItem& item = packet[statuses.size()];
+      uint16_t status = 0;
+      const Answer answer = items_.Write(item, arrays_.IsElement(item), status);
+      lost_ = answer == Answer::kLost;
+      if (lost_) return;
+      statuses.push_back(answer == Answer::kRefused ? uint16_t{PhoneItems::kRefusedStatus} : status);
+    }
+  }
+
+  void Judge(const PkvNvItem& item, uint16_t status) {
+    if (status != nv::kDone && status != nv::kReadOnly) return report_.Add(item, KRAL_PKV_REFUSED, status);
+    PkvNvItem present = item;
+    const Answer answer = lost_ ? Answer::kLost : items_.Read(present, arrays_.IsElement(item));
+    lost_ = answer == Answer::kLost;
+    const bool read = answer == Answer::kAnswered && present.status == nv::kDone;
+    const bool equal = read && present.data == item.data;
+    if (status == nv::kReadOnly) {
+      return report_.Add(item, equal || items_.MayBeReadOnly(item.id) ? KRAL_PKV_SKIPPED : KRAL_PKV_REFUSED, status);
+    }
+    if (!read) return report_.Add(item, KRAL_PKV_NOT_READ_BACK, answer == Answer::kAnswered ? present.status : 0);
+    report_.Add(item, equal ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);
+  }
+
+  void RestoreFile(const PkvEfsFile& file) {
+    uint32_t status = 0;
+    const Answer written = lost_ ? Answer::kLost : items_.WriteFile(file, status);
+    lost_ = written == Answer::kLost;
+    if (lost_) return report_.Add(file, KRAL_PKV_NOT_REACHED, 0);
+    if (written == Answer::kRefused || status != 0) {
+      return report_.Add(file, KRAL_PKV_REFUSED, status != 0 ? status : PhoneItems::kRefusedStatus);
+    }
+    PkvEfsFile present{.path = file.path, .mode = file.mode, .bytes = {}};
+    const Answer read = items_.ReadFile(present, status);
+    lost_ = read == Answer::kLost;
+    if (read != Answer::kAnswered || status != 0) return report_.Add(file, KRAL_PKV_NOT_READ_BACK, status);
+    report_.Add(file, present.bytes == file.bytes ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);
+  }
+
+  PhoneItems items_;
+  const PkvSet& set_;
+  const ArrayItems arrays_;
+  JobReport report_;
+  bool batches_work_ = true;
+  bool lost_ = false;
+};
+
+}  // namespace
+
+uint32_t Restore(Diag_FTM& phone, const std::string& path) {
+  PkvSet set;
+  if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
+  return RestoreJob(phone, set).Run();
+}
+
+}  // namespace kral::pkv

@@ -1,0 +1,411 @@
+// Backups of a handset, their way back, and comparisons: what goes over the wire, what became of each item, and what
+// happens when the handset refuses, answers late or goes away.
+#include <gtest/gtest.h>
+
+#include <map>
+
+#include "kral/nv.h"
+#include "kral/pkv.h"
+#include "storage/pkv_set.h"
+#include "tests/support/efs_fixture.h"
+#include "tests/support/scripted_server.h"
+#include "tests/support/temp_folder.h"
+
+namespace kral {
+namespace {
+
+using handset::Bytes;
+using handset::Fault;
+using handset::NvStatus;
+using handset::When;
+
+constexpr const char* kRfFile = "/nv/item_files/rfnv/00020203";
+constexpr uint16_t kItems = 60;  // of the range that is backed up
+
+class PkvBackup : public test::EfsTest {
+ protected:
+  void SetUp() override {
+    EfsTest::SetUp();
+    Configure();
+  }
+  void TearDown() override {
+    g_stop_at = 0;
+    EfsTest::TearDown();
+  }
+
+  void Configure(uint16_t subscriptions = 1) {
+    ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, kItems - 1, subscriptions), 1);
+    ASSERT_EQ(KRAL_PKV_ConfigureCallBack(handle(), OnItem), 1);
+    g_results.clear();
+  }
+
+  // Every third item has a value; the files are an item, an empty item, and one that is no item, in a folder below.
+  void Furnish() {
+    for (uint16_t id = 0; id < kItems; id += 3) handset().nv().Set(id, RandomBytes(128, id));
+    handset().efs().AddItemFile(kRfFile, RandomBytes(300));
+    handset().efs().AddItemFile("/nv/items/empty", {});
+    handset().efs().AddFile("/nv/reg_files/conf/below/plain", RandomBytes(2000));
+  }
+  static constexpr uint32_t kValues = kItems / 3 + 3;
+
+  // A handset as it comes from the line: only what every handset has.
+  void MakeBlank() {
+    for (uint16_t id = 1; id < kItems; ++id) {
+      handset().nv().Erase(id);
+      handset().nv().Erase(id, 1);
+    }
+    for (const char* path : {kRfFile, "/nv/items/empty", "/nv/reg_files/conf/below/plain"}) Remove(path);
+  }
+  void Remove(const char* path) { KRAL_EfsDelete(handle(), path, nullptr); }
+
+  using Job = uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* file, uint32_t* status);
+  // The status; the result must be in step with it.
+  uint32_t Run(Job job, const char* name = "phone.pkv") {
+    g_results.clear();
+    uint32_t status = 0xAAAAAAAA;
+    const uint8_t result = job(handle(), folder_.Path(name).c_str(), &status);
+    EXPECT_EQ(result, status == 0 ? 1 : 0);
+    return status;
+  }
+  PkvSet Read(const char* name = "phone.pkv") {
+    PkvSet set;
+    const PkvOutcome outcome = ReadPkv(folder_.Path(name), set);
+    EXPECT_TRUE(outcome.done()) << outcome.text;
+    return set;
+  }
+  // "done skipped refused different not-read-back not-reached"
+  std::string Counts() {
+    KRAL_PKV_COUNTS counts{};
+    EXPECT_EQ(KRAL_PKV_GetCounts(handle(), &counts), 1);
+    const uint32_t all[] = {counts.done,      counts.skipped,       counts.refused,
+                            counts.different, counts.not_read_back, counts.not_reached};
+    std::string text;
+    uint32_t sum = 0;
+    for (const uint32_t count : all) {
+      text += (text.empty() ? "" : " ") + std::to_string(count);
+      sum += count;
+    }
+    EXPECT_EQ(sum, counts.total);
+    return text;
+  }
+  size_t RequestsOf(const Bytes& prefix) {
+    const auto requests = handset().requests();
+    return static_cast<size_t>(std::count_if(requests.begin(), requests.end(), [&](const Bytes& request) {
+      return request.size() >= prefix.size() && std::equal(prefix.begin(), prefix.end(), request.begin());
+    }));
+  }
+
+  // Result and status by "id", "id[index]" or path.
+  static inline std::map<std::string, std::pair<uint32_t, uint32_t>> g_results;
+  static inline uint32_t g_stop_at = 0;
+
+  static uint8_t KRAL_CALL OnItem(const KRAL_PKV_ITEM* item, const char* path, uint32_t done, uint32_t total,
+                                  KRAL_HANDLE) {
+    std::string name = path != nullptr ? path : std::to_string(item->id);
+    if (item->index != 0) name += "[" + std::to_string(item->index) + "]";
+    if (item->subscription != 0) name += "/" + std::to_string(item->subscription);
+    EXPECT_TRUE(g_results.emplace(name, std::pair(item->result, item->status)).second) << name << " reported twice";
+    EXPECT_EQ(done, g_results.size());
+    EXPECT_LE(done, total);
+    return done == g_stop_at ? 0 : 1;
+  }
+
+  test::TempFolder folder_;
+};
+
+using Result = std::pair<uint32_t, uint32_t>;
+
+TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
+  Configure(2);
+  Furnish();
+  handset().nv().Set(7, Bytes{1, 2, 3}, 1);
+  handset().nv().Set(8, Bytes{4}, 1);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  EXPECT_EQ(Counts(), "25 98 0 0 0 0");
+  EXPECT_EQ(g_results["3"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["4"], Result(KRAL_PKV_SKIPPED, 5));
+  EXPECT_TRUE(HasLine(KRAL_LOG_C_HIGH_LEVEL_START, "KRAL_NV_BackupNVFromMobile"));
+  const PkvSet first = Read();
+  EXPECT_EQ(first.items.size(), 22u);
+  EXPECT_EQ(first.properties.version, "VARN 6.0.29");
+  EXPECT_EQ(first.properties.values[0].first, "ESN");
+
+  MakeBlank();
+  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
+  EXPECT_EQ(Counts(), "1 0 0 24 0 0");  // the serial number is every handset's own
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(Counts(), "24 1 0 0 0 0");
+  EXPECT_EQ(g_results["0"], Result(KRAL_PKV_SKIPPED, 7));
+  EXPECT_EQ(handset().nv().Value(8, 1), Bytes([] {
+              Bytes data(128);
+              data[0] = 4;
+              return data;
+            }()));
+  EXPECT_EQ(handset().efs().Mode(kRfFile).value_or(0) & 0xF000u, 0xE000u);
+  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "again.pkv"), 0u);
+  const PkvSet again = Read("again.pkv");
+  EXPECT_EQ(again.items, first.items);
+  EXPECT_EQ(again.files, first.files);
+}
+
+TEST_F(PkvBackup, ItemsAreRestoredInPacketsOfNineAndReadBack) {
+  PkvSet set;
+  for (uint16_t id = 1; id <= 20; ++id) set.items.push_back({.id = id, .data = {static_cast<uint8_t>(id)}});
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  handset().ClearTrace();
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  std::vector<size_t> sizes;
+  for (const Bytes& request : handset().requests()) {
+    if (request[0] == 75) sizes.push_back(request[4]);
+  }
+  EXPECT_EQ(sizes, (std::vector<size_t>{9, 9, 2}));
+  EXPECT_EQ(handset().requests().size(), 3u + 20u);
+}
+
+TEST_F(PkvBackup, EveryRefusalIsTheItemsOwn) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  MakeBlank();
+  for (uint16_t id = 0; id < kItems; id += 6) handset().nv().SetStatus(id, NvStatus::kFailed);
+  handset().nv().SetReadOnly(9);
+  handset().nv().SetReadOnly(15);
+  const uint16_t kMayBeReadOnly[] = {15};
+  KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(handle(), kMayBeReadOnly, 1);
+  handset().efs().AddDirectory("/nv/items/empty");  // in the way
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(Counts(), "10 1 12 0 0 0");
+  EXPECT_EQ(g_results["3"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["6"], Result(KRAL_PKV_REFUSED, 4));
+  EXPECT_EQ(g_results["9"], Result(KRAL_PKV_REFUSED, 7));
+  EXPECT_EQ(g_results["15"], Result(KRAL_PKV_SKIPPED, 7));
+  EXPECT_EQ(g_results["/nv/items/empty"], Result(KRAL_PKV_REFUSED, 21));
+  EXPECT_EQ(g_results["/nv/reg_files/conf/below/plain"].first, KRAL_PKV_DONE);
+}
+
+TEST_F(PkvBackup, AHandsetWithoutBatchesTakesItemsOneByOne) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  MakeBlank();
+  handset().faults().Add(handset::Refuse(19), When::Always().Of("4B 30 00"));
+  handset().ClearTrace();
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(RequestsOf({75, 48}), 1u);
+  EXPECT_EQ(RequestsOf({39}), kItems / 3u);
+}
+
+TEST_F(PkvBackup, ElementsGoToTheElementsOfArrays) {
+  handset().nv().MakeArray(5, 3);
+  PkvSet set;
+  for (uint16_t index = 0; index < 4; ++index)
+    set.items.push_back({.id = 5, .index = index, .data = {uint8_t(index + 1)}});
+  set.items.push_back({.id = 5, .index = 1, .subscription = 1, .data = {9}});
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results["5"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["5[2]"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["5[3]"], Result(KRAL_PKV_REFUSED, 6));  // the array has three
+  EXPECT_EQ(g_results["5[1]/1"], Result(KRAL_PKV_SKIPPED, 0));
+  EXPECT_EQ(handset().nv().Element(5, 2).value_or(Bytes{0})[0], 3);
+  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
+  EXPECT_EQ(g_results["5[1]"], Result(KRAL_PKV_DONE, 0));
+}
+
+// --- Trouble on the line --------------------------------------------------------------------------------------------
+
+// One fault at every packet: the work is done all the same, with the right values, or fails and says so.
+TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
+  const struct {
+    const char* name;
+    Fault fault;
+  } kRows[] = {
+      {"lose", handset::Lose()},
+      {"after the next request", handset::AfterNextRequest()},
+      {"duplicate", handset::Duplicate()},
+      {"corrupt", handset::Corrupt()},
+      {"wrong code", handset::WrongCode(0x55)},
+      {"ignore", handset::Ignore()},
+  };
+  ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 11, 1), 1);
+  for (uint16_t id = 1; id < 12; ++id) handset().nv().Set(id, RandomBytes(128, id));
+  handset().efs().AddItemFile(kRfFile, RandomBytes(300));
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
+  const PkvSet good = Read("good.pkv");
+  ShortenTimeOuts(20);
+  for (const auto& row : kRows) {
+    for (uint64_t packet : {2, 8, 14}) {
+      SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
+      handset().faults().Add(row.fault, When::Nth(packet).Of("26"));
+      EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+      handset().faults().Clear();
+      EXPECT_EQ(Read().items, good.items);
+
+      for (uint16_t id = 1; id < 12; ++id) handset().nv().Erase(id);
+      handset().faults().Add(row.fault, When::Nth(packet % 2 + 1).Of("4B 30"));
+      handset().faults().Add(row.fault, When::Nth(packet).Of("26"));
+      handset().faults().Add(row.fault, When::Nth(1).Of("4B 13 26"));
+      EXPECT_EQ(Run(KRAL_RestoreNVFromPKV, "good.pkv"), 0u) << ErrorText();
+      handset().faults().Clear();
+      EXPECT_EQ(Counts(), "12 1 0 0 0 0");
+      ClearLog();
+    }
+  }
+}
+
+TEST_F(PkvBackup, AnUnpluggedCableLeavesTheOldFileAndTellsWhatWasReached) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
+  ShortenTimeOuts(20);
+  folder_.Add("phone.pkv", "precious");
+  handset().faults().Add(handset::HangUp(), When::Nth(30).Of("26"));
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_LOST);
+  EXPECT_EQ(folder_.Content("phone.pkv"), "precious");
+  EXPECT_EQ(Counts(), "10 18 0 0 0 35");
+  EXPECT_EQ(std::distance(std::filesystem::directory_iterator(std::filesystem::path(folder_.Path("x")).parent_path()),
+                          std::filesystem::directory_iterator()),
+            2);
+
+  // In the read-back of the second packet's third item: these nine are written.
+  handset().PlugIn();
+  handset().faults().Clear();
+  MakeBlank();
+  handset().faults().Add(handset::HangUp(), When::Nth(9 + 3).Of("26"));
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV, "good.pkv"), KRAL_PKV_STATUS_LOST);
+  EXPECT_EQ(Counts(), "10 1 0 0 7 5");
+  EXPECT_EQ(g_results.size(), kValues);
+  EXPECT_EQ(g_results["51"].first, KRAL_PKV_NOT_READ_BACK);
+  EXPECT_EQ(g_results["54"].first, KRAL_PKV_NOT_REACHED);
+  EXPECT_TRUE(handset().nv().Value(51).has_value());
+  EXPECT_FALSE(handset().nv().Value(54).has_value());
+  EXPECT_EQ(Run(KRAL_PKV_Verify, "good.pkv"), KRAL_PKV_STATUS_LOST);
+  EXPECT_EQ(Counts(), "0 0 0 0 0 23");
+  handset().PlugIn();
+}
+
+TEST_F(PkvBackup, ValuesThatAreNotKeptAreFound) {
+  PkvSet set;
+  for (uint16_t id = 1; id <= 3; ++id) set.items.push_back({.id = id, .data = {1}});
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  handset().On(38, handset::Length::AtLeast(3), [](handset::ByteView request, handset::Wire& wire) {
+    handset::ByteWriter reply;  // item 1 as written, item 2 otherwise, item 3 cannot be read
+    reply.Raw(request.first(3)).U8(request[1] == 2 ? 0xFF : 1).Raw(Bytes(127)).U16(request[1] == 3 ? 4 : 0);
+    wire.Send(reply.Take());
+  });
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results["1"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["2"], Result(KRAL_PKV_DIFFERENT, 0));
+  EXPECT_EQ(g_results["3"], Result(KRAL_PKV_NOT_READ_BACK, 4));
+}
+
+// --- The caller -----------------------------------------------------------------------------------------------------
+
+TEST_F(PkvBackup, TheCallbackEndsEachOfThem) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  const std::string before = folder_.Content("phone.pkv");
+  g_stop_at = 4;
+  for (const Job job : {KRAL_BackupNVFromMobileToPKV, KRAL_RestoreNVFromPKV, KRAL_PKV_Verify}) {
+    EXPECT_EQ(Run(job), KRAL_PKV_STATUS_STOPPED);
+    EXPECT_EQ(g_results.size(), 4u);
+    Counts();  // add up
+  }
+  EXPECT_EQ(folder_.Content("phone.pkv"), before);
+}
+
+TEST_F(PkvBackup, WhatTheCallerHadUnderWayStays) {
+  Furnish();
+  static int calls;
+  calls = 0;
+  KRAL_ConfigureEfs2CallBacks(
+      handle(), [](uintptr_t, uintptr_t, uint32_t, uint32_t, uint32_t, uint32_t, KRAL_HANDLE) { ++calls; },
+      [](const KRAL_EFS_ENTRY*, KRAL_HANDLE) { ++calls; });
+  KRAL_DIAG_NV_WRITE_SetBatchMode(handle(), 1);
+  uint8_t data = 0x77;
+  uint16_t status = 0;
+  KRAL_DIAG_NV_WRITE_F(handle(), 1000, &data, 1, &status);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u);
+  EXPECT_EQ(calls, 0);
+  EXPECT_EQ(KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle(), nullptr, nullptr, nullptr), 1);
+  EXPECT_TRUE(handset().nv().Value(1000).has_value());
+  KRAL_EfsPutItemFromMem(handle(), "/nv/items/x", &data, 1);
+  uint32_t size = 1;
+  KRAL_EfsReadMem(handle(), "/nv/items/x", &data, &size);
+  EXPECT_GT(calls, 0);
+}
+
+TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
+  folder_.Add("text.pkv", "no compound document");
+  CompoundStorage root;
+  root.OpenOrAddStorage("Other");
+  ASSERT_EQ(SaveCompoundFile(folder_.Path("other.pkv"), root), "");
+  root.OpenOrAddStorage("NV_NUMBERED_ITEMS").OpenOrAddStorage("00000001").OpenOrAddStream("00000000").bytes = {1};
+  ASSERT_EQ(SaveCompoundFile(folder_.Path("damaged.pkv"), root), "");
+  handset().ClearTrace();
+  for (const Job job : {KRAL_RestoreNVFromPKV, KRAL_PKV_Verify}) {
+    EXPECT_EQ(Run(job, "none.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
+    EXPECT_EQ(Run(job, "text.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
+    EXPECT_EQ(Run(job, "other.pkv"), KRAL_PKV_STATUS_NO_STORAGE);
+    EXPECT_EQ(Run(job, "damaged.pkv"), KRAL_PKV_STATUS_BAD_ITEM);
+    EXPECT_EQ(job(handle(), nullptr, nullptr), 0);
+    EXPECT_EQ(job(0, "none.pkv", nullptr), 0);
+  }
+  EXPECT_TRUE(handset().requests().empty());
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "no folder/phone.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
+  handset().nv().SetStatus(0, NvStatus::kInactive);
+  ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 0, 1), 1);
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_NOTHING_READ);
+  EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 2, 1, 1), 0);
+  EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 0), 0);
+  EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 17), 0);
+}
+
+TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
+  handset().efs().AddItemFile("/nv/items/good", Bytes{1});
+  handset().efs().AddFile("/nv/items/huge", Bytes((1 << 20) + 1));
+  std::string deep = "/nv/items";
+  for (int i = 0; i < 12; ++i) deep += "/d";
+  handset().efs().AddFile(deep + "/deep", Bytes{1});
+  handset().efs().AddLink("/nv/items/loop", "/nv/items");
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  EXPECT_EQ(g_results["/nv/items/huge"], Result(KRAL_PKV_REFUSED, 0xFFFF));
+  ASSERT_EQ(Read().files.size(), 1u);
+  EXPECT_EQ(Read().files[0].path, "/nv/items/good");
+}
+
+// --- The phone server -----------------------------------------------------------------------------------------------
+
+TEST(PkvServer, JobsGoToItsDownloadAgent) {
+  static std::vector<std::string> calls;
+  calls.clear();
+  class Agent : public SoftwareDownload {
+   public:
+    bool UploadPkvFile(const std::string& file, uint32_t options) override { return Note("up " + file, options); }
+    bool DownloadPkvFile(const std::string& file, uint32_t options) override { return Note("down " + file, options); }
+
+   private:
+    static bool Note(const std::string& call, uint32_t options) {
+      calls.push_back(call + " " + std::to_string(options));
+      if (options == 99) throw OrbtServerException();
+      return options != 98;
+    }
+  };
+  test::ScriptedServer server;
+  ServerFactory factory = CurrentServerFactory();
+  factory.make_software_download = [](const char*, OrbtServer&) { return std::make_unique<Agent>(); };
+  SetServerFactory(factory);
+  const KRAL_HANDLE handle = KRAL_ConnectServer(7);
+  EXPECT_EQ(KRAL_UploadPkvFile(handle, "a.pkv", 5), 1);
+  EXPECT_EQ(KRAL_DownloadPkvFile(handle, nullptr, 98), 0);
+  EXPECT_EQ(KRAL_DownloadPkvFile(handle, "b.pkv", 99), 0);
+  EXPECT_EQ(calls, (std::vector<std::string>{"up a.pkv 5", "down  98", "down b.pkv 99"}));
+}
+
+TEST_F(PkvBackup, WithoutAServerItsJobsGiveZero) {
+  EXPECT_EQ(KRAL_UploadPkvFile(handle(), "a.pkv", 0), 0);
+  EXPECT_EQ(KRAL_DownloadPkvFile(handle(), "a.pkv", 0), 0);
+  EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "KRAL_UploadPkvFile() - no phone server"));
+}
+
+}  // namespace
+}  // namespace kral
