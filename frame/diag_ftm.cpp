@@ -49,6 +49,7 @@ Diag_FTM::Diag_FTM(std::shared_ptr<OrbtServer> server, uint16_t port, Clock& clo
 
 Diag_FTM::~Diag_FTM() {
   Retire();
+  EndCollection();  // another thread may have started a capture since
 }
 
 void Diag_FTM::StopDispatching::operator()(CKralEvents* dispatcher) const {

@@ -15,11 +15,14 @@
 #include "frame/base/time_outs.h"
 #include "frame/phone_settings.h"
 #include "platform/clock.h"
+#include "transport/capture_player.h"
 #include "transport/kral_event_listener.h"
 #include "transport/kral_thread_interface.h"
 
 namespace kral {
 
+class CaptureWriter;
+class NameTables;
 class OrbtServer;
 
 struct OpenArguments {
@@ -69,6 +72,14 @@ class Diag_FTM {
   bool SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint8_t expected_code,
                 uint32_t time_out_ms, uint32_t delay_ms = 0);
 
+  // --- Collection (diag_ftm_collection.cpp) -----------------------------------------------------------------------
+  TrafficCounters counters();
+  // From now on collected packets go to this file as well.
+  bool StartCapture(const char* file_name);
+  bool StopCapture();  // true when everything collected is in the file
+  // A file's packets come as if the handset had sent them.
+  bool StartPlayback(const char* file_name, PlayPace pace);
+
   // --- Time-outs --------------------------------------------------------------------------------------------------
   bool ConfigureTimeOut(uint32_t id, int32_t milliseconds);  // logged
   int32_t GetTimeOut(uint32_t id);                           // logged
@@ -82,6 +93,9 @@ class Diag_FTM {
   PacketQueue& responses();
   PacketQueue& asynchronous();
   BoundedQueue<EventRecord>& events();
+  NameTables& names();
+  CaptureWriter& capture();
+  CapturePlayer& player();
   Clock& clock() { return clock_; }
 
   // --- Settings ---------------------------------------------------------------------------------------------------
@@ -116,6 +130,7 @@ class Diag_FTM {
   void OpenThroughServer();
   void OpenDirect(const OpenArguments& arguments);
   void UnregisterFromServer();
+  void EndCollection();
   bool IsLoopbackAnswered();
   bool IsVersionAnswered();
   bool SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> response, uint16_t& response_size,

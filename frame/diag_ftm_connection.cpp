@@ -94,6 +94,7 @@ void Diag_FTM::Retire() {
   if (retired_) return;
   retired_ = true;
   ClosePort();
+  EndCollection();
 }
 
 bool Diag_FTM::IsPhoneConnected() {

@@ -6,19 +6,30 @@
 #include <optional>
 
 #include "frame/diag_ftm.h"
+#include "transport/capture_player.h"
+#include "transport/capture_writer.h"
 #include "transport/kral_events.h"
+#include "transport/name_table.h"
 
 namespace kral {
 
 struct Diag_FTM::Parts {
-  explicit Parts(Clock& clock) : log(clock) { sorter.SetLogger(&log); }
+  explicit Parts(Clock& clock) : log(clock) {
+    sorter.SetLogger(&log);
+    sorter.SetNames(&names);
+    sorter.SetCapture(&capture);
+    capture.SetLogger(&log);
+  }
 
   DataLogFileHandler log;
   PacketQueue responses;
   PacketQueue asynchronous;
   BoundedQueue<EventRecord> events;
+  NameTables names;
+  CaptureWriter capture;
   CKralEventListener sorter{responses, asynchronous, events};
   CKralEvents dispatcher;
+  CapturePlayer player;
   std::optional<CKralThreadInterface> transport;  // direct mode
 };
 

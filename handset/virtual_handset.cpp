@@ -32,6 +32,7 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       wire_(std::make_unique<HandsetWire>(*this)),
       nv_(std::make_shared<NvStore>(identity.serial_number)),
       efs_(std::make_shared<EfsService>()),
+      logs_(std::make_shared<LogService>()),
       mode_service_(std::make_shared<OperatingMode>(*nv_, clock)),
       ftm_(std::make_shared<FtmService>(*mode_service_)),
       memory_(std::make_shared<Memory>()),
@@ -41,7 +42,7 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
   });
   identity_ = std::make_shared<IdentityService>(std::move(identity));
   for (const std::shared_ptr<Service>& service : std::initializer_list<std::shared_ptr<Service>>{
-           identity_, nv_, efs_, mode_service_, ftm_, memory_, maintenance_}) {
+           identity_, nv_, efs_, logs_, mode_service_, ftm_, memory_, maintenance_}) {
     AddServiceLocked(service);
   }
 }

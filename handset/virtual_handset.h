@@ -24,6 +24,7 @@
 #include "handset/frame_codec.h"
 #include "handset/ftm_service.h"
 #include "handset/identity.h"
+#include "handset/log_service.h"
 #include "handset/maintenance.h"
 #include "handset/memory.h"
 #include "handset/nv_store.h"
@@ -81,6 +82,7 @@ class VirtualHandset {
   Maintenance& maintenance() { return *maintenance_; }
   NvStore& nv() { return *nv_; }
   EfsService& efs() { return *efs_; }
+  LogService& logs() { return *logs_; }
   Clock& clock() { return clock_; }
 
   // --- What it has heard ------------------------------------------------------------------------------------------
@@ -125,6 +127,7 @@ class VirtualHandset {
   std::shared_ptr<IdentityService> identity_;
   std::shared_ptr<NvStore> nv_;
   std::shared_ptr<EfsService> efs_;
+  std::shared_ptr<LogService> logs_;
   std::shared_ptr<OperatingMode> mode_service_;
   std::shared_ptr<FtmService> ftm_;
   std::shared_ptr<Memory> memory_;

@@ -53,8 +53,15 @@ class BoundedQueue {
   // came before the call: no signal can be left over from a queue since cleared.
   std::optional<Record> PopWithin(std::chrono::milliseconds time_out) {
     std::unique_lock lock(mutex_);
-    not_empty_.wait_for(lock, time_out, [this] { return !records_.empty(); });
+    not_empty_.wait_for(lock, time_out, [this] { return closed_ || !records_.empty(); });
     return TakeFront();
+  }
+
+  // Nobody waits in this queue any more.
+  void Close() {
+    const std::lock_guard lock(mutex_);
+    closed_ = true;
+    not_empty_.notify_all();
   }
 
   void Clear() {
@@ -89,6 +96,7 @@ class BoundedQueue {
   std::condition_variable not_empty_;
   std::deque<Record> records_;
   uint64_t dropped_ = 0;
+  bool closed_ = false;
 };
 
 using PacketQueue = BoundedQueue<Packet>;

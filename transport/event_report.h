@@ -3,6 +3,7 @@
 #ifndef KRAL_TRANSPORT_EVENT_REPORT_H
 #define KRAL_TRANSPORT_EVENT_REPORT_H
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <span>
@@ -12,6 +13,7 @@
 namespace kral {
 
 inline constexpr uint8_t kEventReportCode = 96;
+inline constexpr size_t kSmallestEvent = 4;  // header and truncated time stamp
 
 struct Event {
   uint16_t id = 0;

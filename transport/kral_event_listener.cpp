@@ -3,33 +3,38 @@
 #include "transport/kral_event_listener.h"
 
 #include <algorithm>
+#include <cstring>
 #include <utility>
 
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
+#include "transport/capture_writer.h"
 #include "transport/event_report.h"
+#include "transport/name_table.h"
 
 namespace kral {
 namespace {
 
-// First bytes of what a handset sends unasked, beside event reports.
+// First bytes of what a handset sends unasked.
 constexpr uint8_t kLogCode = 16;
-constexpr uint8_t kAsynchronousCodes[] = {kLogCode, 31, 121, 146};
+constexpr uint8_t kAsynchronousCodes[] = {kLogCode, 31, kEventReportCode, 121, 146};
+
+static_assert(sizeof(KRAL_EVENT) == EventRecord::kSize);
 
 constexpr size_t kSmallestPacket = 2;
 
-// Until a table of event texts is loaded.
+// Where no table of event texts has one.
 constexpr char kNoEventText[] = "no text";
-
-bool IsAsynchronous(uint8_t code) {
-  return std::find(std::begin(kAsynchronousCodes), std::end(kAsynchronousCodes), code) != std::end(kAsynchronousCodes);
-}
 
 void Increment(std::atomic<uint64_t>& counter) {
   counter.fetch_add(1, std::memory_order_relaxed);
 }
 
 }  // namespace
+
+bool IsAsynchronousCode(uint8_t code) {
+  return std::find(std::begin(kAsynchronousCodes), std::end(kAsynchronousCodes), code) != std::end(kAsynchronousCodes);
+}
 
 CKralEventListener::CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous,
                                        BoundedQueue<EventRecord>& events)
@@ -49,7 +54,7 @@ void CKralEventListener::TakePacket(Packet packet) {
   if (code == kLogCode) OfferLog(packet);
   if (code == kEventReportCode && IsClaimed(packet)) {
     QueueResponse(std::move(packet), "ASYNC REC--listener--(%d bytes): %s");
-  } else if (code == kEventReportCode || IsAsynchronous(code)) {
+  } else if (IsAsynchronousCode(code)) {
     QueueAsynchronous(std::move(packet));
   } else {
     QueueResponse(std::move(packet), "SYNC REC--listener--(%d bytes): %s");
@@ -67,21 +72,52 @@ void CKralEventListener::QueueAsynchronous(Packet packet) {
     Increment(dropped_not_collecting_);
     return;
   }
-  if (packet[0] == kEventReportCode) QueueEvents(packet);
+  const CollectionCallbacks callbacks = collection_callbacks();
+  if (callbacks.packet != nullptr) {
+    callbacks.packet(static_cast<uint32_t>(packet.size()), packet.data(), callbacks.value);
+  }
+  if (packet[0] == kEventReportCode) QueueEvents(packet, callbacks);
+  if (capture_ != nullptr) capture_->Append(packet);
   asynchronous_.Push(std::move(packet));
+  Increment(collected_);
 }
 
-void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report) {
+void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks) {
   DataLogFileHandler* const log = log_;
   const bool logging = log != nullptr && log->Wants(kLogAsync);
   EventReportReader reader(event_report);
   while (const auto event = reader.Next()) {
     if (logging) {
-      log->WriteLine(kLogAsync, "Event ID: %d, %s", event->id, kNoEventText);
+      log->WriteLine(kLogAsync, "Event ID: %d, %s", event->id, EventText(event->id).c_str());
       log->WriteLine(kLogAsync, " Event payload data: %s", HexDump(event->payload).c_str());
     }
+    if (callbacks.event != nullptr) {
+      KRAL_EVENT record;
+      std::memcpy(&record, event->record.bytes.data(), sizeof(record));
+      callbacks.event(&record, callbacks.value);
+    }
     events_.Push(event->record);
+    Increment(event_count_);
   }
+}
+
+std::string CKralEventListener::EventText(uint16_t id) const {
+  if (names_ == nullptr) return kNoEventText;
+  const auto texts = names_->Get(NameTableKind::kEventTexts);
+  const std::string* const text = texts->Find(id);
+  return text != nullptr ? *text : kNoEventText;
+}
+
+TrafficCounters CKralEventListener::counters() const {
+  TrafficCounters counters;
+  counters.collected = collected_.load(std::memory_order_relaxed);
+  counters.events = event_count_.load(std::memory_order_relaxed);
+  counters.dropped_asynchronous = asynchronous_.dropped();
+  counters.dropped_events = events_.dropped();
+  counters.dropped_responses = responses_.dropped();
+  counters.dropped_not_collecting = dropped_not_collecting();
+  counters.oversized = dropped_by_size();
+  return counters;
 }
 
 void CKralEventListener::LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet) {
@@ -94,6 +130,16 @@ void CKralEventListener::SetRawPacketCallback(RawPacketCallback callback, uintpt
   const std::lock_guard lock(callback_mutex_);
   callback_ = callback;
   callback_value_ = value;
+}
+
+void CKralEventListener::SetCollectionCallbacks(const CollectionCallbacks& callbacks) {
+  const std::lock_guard lock(callback_mutex_);
+  collection_callbacks_ = callbacks;
+}
+
+CollectionCallbacks CKralEventListener::collection_callbacks() {
+  const std::lock_guard lock(callback_mutex_);
+  return collection_callbacks_;
 }
 
 void CKralEventListener::CallRawPacketCallback(std::span<const uint8_t> packet) {

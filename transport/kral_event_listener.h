@@ -7,18 +7,33 @@
 #include <memory>
 #include <mutex>
 #include <span>
+#include <string>
 #include <vector>
 
+#include "kral/log.h"
 #include "transport/bounded_queue.h"
 #include "transport/event_record.h"
 #include "transport/kral_events.h"
+#include "transport/traffic_counters.h"
 
 namespace kral {
 
+class CaptureWriter;
 class DataLogFileHandler;
+class NameTables;
+
+// Whether a packet that begins so is sent unasked: logs, messages, event reports and two further kinds.
+bool IsAsynchronousCode(uint8_t code);
 
 // Called with (length, bytes, caller's value) for every packet, before it is sorted.
 using RawPacketCallback = void (*)(uint32_t length, const uint8_t* bytes, uintptr_t value);
+
+// What takes collected traffic as it is queued. Each is called with the value, on the thread that brings the packet.
+struct CollectionCallbacks {
+  KRAL_RAW_PACKET_CALLBACK packet = nullptr;
+  KRAL_EVENT_CALLBACK event = nullptr;
+  uintptr_t value = 0;
+};
 
 // An internal handler that may claim an event report (first byte 96) as the answer to a command.
 class EventHandler {
@@ -47,11 +62,15 @@ class CKralEventListener : public PacketListener {
   BoundedQueue<EventRecord>& events() { return events_; }
 
   void SetLogger(DataLogFileHandler* log) { log_ = log; }
+  // Before the first packet; both outlive the sorter. The texts of events, and where collected packets go as well.
+  void SetNames(const NameTables* names) { names_ = names; }
+  void SetCapture(CaptureWriter* capture) { capture_ = capture; }
   // While collection is off, asynchronous packets are dropped.
   void SetCollection(bool on) { collecting_ = on; }
   bool collecting() const { return collecting_; }
   // A call that is under way when the callback is changed still ends on the former one.
   void SetRawPacketCallback(RawPacketCallback callback, uintptr_t value);
+  void SetCollectionCallbacks(const CollectionCallbacks& callbacks);
   // A handler is not called any more once it is removed.
   void AddEventHandler(EventHandler* handler);
   void RemoveEventHandler(EventHandler* handler);
@@ -60,6 +79,7 @@ class CKralEventListener : public PacketListener {
 
   uint64_t dropped_not_collecting() const { return dropped_not_collecting_.load(std::memory_order_relaxed); }
   uint64_t dropped_by_size() const { return dropped_by_size_.load(std::memory_order_relaxed); }
+  TrafficCounters counters() const;  // as far as the sorter knows them
 
  private:
   void CallRawPacketCallback(std::span<const uint8_t> packet);
@@ -67,7 +87,9 @@ class CKralEventListener : public PacketListener {
   void OfferLog(std::span<const uint8_t> log_packet);
   void QueueResponse(Packet packet, const char* format);
   void QueueAsynchronous(Packet packet);
-  void QueueEvents(std::span<const uint8_t> event_report);
+  void QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks);
+  CollectionCallbacks collection_callbacks();
+  std::string EventText(uint16_t id) const;
   void LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet);
 
   PacketQueue& responses_;
@@ -76,12 +98,17 @@ class CKralEventListener : public PacketListener {
 
   std::atomic<DataLogFileHandler*> log_{nullptr};
   std::atomic<bool> collecting_{false};
+  const NameTables* names_ = nullptr;
+  CaptureWriter* capture_ = nullptr;
+  std::atomic<uint64_t> collected_{0};
+  std::atomic<uint64_t> event_count_{0};
   std::atomic<uint64_t> dropped_not_collecting_{0};
   std::atomic<uint64_t> dropped_by_size_{0};
 
   std::mutex callback_mutex_;
   RawPacketCallback callback_ = nullptr;
   uintptr_t callback_value_ = 0;
+  CollectionCallbacks collection_callbacks_;
 
   // Held while handlers are called; recursive, because one may remove itself.
   std::recursive_mutex handlers_mutex_;

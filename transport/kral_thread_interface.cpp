@@ -194,16 +194,11 @@ void CKralThreadInterface::WakeReceiver() {
 
 TrafficCounters CKralThreadInterface::counters() const {
   TrafficCounters counters;
+  if (sorter_ != nullptr) counters = sorter_->counters();
   counters.bytes_received = loop_.bytes_received();
   counters.packets_received = feed_.packets.load(std::memory_order_relaxed);
   counters.bad_fcs = splitter_.deframer().bad_fcs();
-  counters.oversized = splitter_.deframer().oversized();
-  if (sorter_ != nullptr) {
-    counters.dropped_queue_full = sorter_->responses().dropped() + sorter_->asynchronous().dropped();
-    counters.dropped_events_queue_full = sorter_->events().dropped();
-    counters.dropped_not_collecting = sorter_->dropped_not_collecting();
-    counters.oversized += sorter_->dropped_by_size();
-  }
+  counters.oversized += splitter_.deframer().oversized();
   return counters;
 }
 

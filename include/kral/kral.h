@@ -29,6 +29,7 @@
 #include "kral/diag.h"
 #include "kral/efs.h"
 #include "kral/ftm.h"
+#include "kral/log.h"
 #include "kral/nv.h"
 #include "kral/pkv.h"
 #include "kral/text_log.h"

@@ -1,0 +1,141 @@
+// Log masks: one per equipment id, read, changed and written back. Collecting what then comes is the sorter's.
+#include "commands/log_mask.h"
+
+#include <algorithm>
+
+#include "frame/base/little_endian.h"
+#include "frame/diag_ftm.h"
+#include "transport/name_table.h"
+
+namespace kral::diag {
+namespace {
+
+template <class Row, class... Fields>
+bool Configure(Diag_FTM& phone, const Row& row, uint32_t first_word, size_t data_size, const Fields&... fields) {
+  phone.log().WriteLine(
+      kLogFn, "KRAL_DIAG_SetExtendedLogMask( iOperation = 0x%X, piOperationData[0] = 0x%X, iOperationDataSize=%d)",
+      row.header.operation, first_word, static_cast<int>(data_size));
+  return Send(phone, row, fields...);
+}
+
+bool SetLogMask(Diag_FTM& phone, uint8_t equipment_id, const BitMask& mask) {
+  return Configure(phone, kSetLogMask, equipment_id, log_config_reply::kMaskHeader + mask.bytes().size(),
+                   u32{equipment_id}, static_cast<u32>(mask.bits()), mask.bytes());
+}
+
+bool IsMaskPossible(uint32_t items) {
+  return BitMask::BytesFor(items) <= kLongestMask;
+}
+
+// The place of a code in the mask; nothing for one that lies outside.
+std::optional<size_t> ItemOf(uint8_t equipment_id, uint16_t code, uint32_t items) {
+  const uint32_t first = equipment_id * kItemsPerEquipmentId;
+  if (code < first || code - first >= items) return std::nullopt;
+  return code - first;
+}
+
+bool AreAllowed(Diag_FTM& phone, Ids codes, const char* function) {
+  bool allowed = true;
+  for (const uint16_t code : codes) {
+    if (phone.names().Allows(NameTableKind::kAllowedLogs, code)) continue;
+    phone.log().WriteLine(kLogErr, "%s()--log code 0x%X is not allowed", function, code);
+    allowed = false;
+  }
+  return allowed;
+}
+
+// Codes that the handset has no bit for must not end up in another's.
+bool AreInRange(Diag_FTM& phone, uint8_t equipment_id, Ids codes, uint32_t items, const char* function) {
+  const auto outside =
+      std::find_if(codes.begin(), codes.end(), [=](uint16_t code) { return !ItemOf(equipment_id, code, items); });
+  if (outside == codes.end()) return true;
+  phone.log().WriteLine(kLogErr, "%s()--log code 0x%X is outside the range of equipment ID %d", function, *outside,
+                        equipment_id);
+  return false;
+}
+
+std::optional<uint32_t> GetItems(Diag_FTM& phone, uint8_t equipment_id) {
+  const auto ranges = equipment_id < kEquipmentIds ? GetLogRanges(phone) : std::nullopt;
+  if (!ranges || !IsMaskPossible((*ranges)[equipment_id])) return std::nullopt;
+  return (*ranges)[equipment_id];
+}
+
+}  // namespace
+
+std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone) {
+  if (!Configure(phone, kRetrieveLogRanges, 0, 0)) return std::nullopt;
+  const auto response = phone.packet().response();
+  if (response.size() < log_config_reply::kHeader + log_config_reply::kRanges) return std::nullopt;
+  const auto tail = response.last(log_config_reply::kRanges);
+  std::array<uint32_t, kEquipmentIds> ranges{};
+  for (size_t i = 0; i < ranges.size(); ++i) ranges[i] = *LoadLe<uint32_t>(tail, i * sizeof(uint32_t));
+  return ranges;
+}
+
+std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items) {
+  BitMask mask(items);
+  if (!Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) return std::nullopt;
+  const auto response = phone.packet().response();
+  const size_t tail_size = log_config_reply::kMaskHeader + mask.bytes().size();
+  if (response.size() < log_config_reply::kHeader + tail_size) return std::nullopt;
+  const auto tail = response.last(tail_size);
+  if (*LoadLe<uint32_t>(tail) != equipment_id) {
+    phone.log().WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask");
+    return mask;
+  }
+  if (*LoadLe<uint32_t>(tail, sizeof(uint32_t)) != items) return std::nullopt;
+  std::copy(tail.begin() + log_config_reply::kMaskHeader, tail.end(), mask.bytes().begin());
+  return mask;
+}
+
+bool ModifyLogCodes(Diag_FTM& phone, uint8_t equipment_id, Ids codes, bool activate) {
+  auto& log = phone.log();
+  log.WriteLine(kLogFn, "DIAG_ModifyExtendedLogCodes( iEquipmentID = %d,iLogCodeListSize = %d, bActivateLogs = %d)",
+                equipment_id, static_cast<int>(codes.size()), activate ? 1 : 0);
+  if (!AreAllowed(phone, codes, "DIAG_ModifyExtendedLogCodes")) return false;
+  const auto items = GetItems(phone, equipment_id);
+  if (!items) {
+    log.WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes() -- failed to get log range");
+    return false;
+  }
+  if (!AreInRange(phone, equipment_id, codes, *items, "DIAG_ModifyExtendedLogCodes")) return false;
+  // Without the current mask nothing is written: an empty one in its place would switch the other codes off.
+  auto mask = GetLogMask(phone, equipment_id, *items);
+  if (!mask) {
+    log.WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes() -- failed to get the current log mask");
+    return false;
+  }
+  bool needed = false;
+  for (const uint16_t code : codes) {
+    log.WriteLine(kLogRet, "DIAG_ModifyExtendedLogCodes() -- modifying log code 0x%X, bActivateLogs = %d", code,
+                  activate ? 1 : 0);
+    const size_t item = *ItemOf(equipment_id, code, *items);
+    needed = needed || mask->Test(item) != activate;
+    mask->Set(item, activate);
+  }
+  if (needed && !SetLogMask(phone, equipment_id, *mask)) return false;
+  if (activate) phone.sorter().SetCollection(true);
+  return true;
+}
+
+bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16_t items) {
+  constexpr const char* kName = "KRAL_DIAG_SetExtendedLogCode";
+  const Ids codes(&code, 1);
+  if (!AreAllowed(phone, codes, kName) || !AreInRange(phone, equipment_id, codes, items, kName)) return false;
+  if (!IsMaskPossible(items)) return false;
+  BitMask mask(items);
+  mask.Set(*ItemOf(equipment_id, code, items), true);
+  if (!SetLogMask(phone, equipment_id, mask)) return false;
+  phone.sorter().SetCollection(true);
+  return true;
+}
+
+bool ClearAllLogCodes(Diag_FTM& phone, uint8_t equipment_id) {
+  if (equipment_id >= kEquipmentIds) return false;
+  const auto items = GetItems(phone, equipment_id);
+  // Only told, with another function's name: the handset is then sent a mask without bits. Kept.
+  if (!items) phone.log().WriteLine(kLogErr, "KRAL_DIAG_AddExtendedLogCodes() -- failed to get log range");
+  return SetLogMask(phone, equipment_id, BitMask(items.value_or(0)));
+}
+
+}  // namespace kral::diag

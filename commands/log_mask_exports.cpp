@@ -1,0 +1,223 @@
+// Exports of the log masks, the event mask, the message categories, and the tables of names.
+#include <algorithm>
+#include <cstring>
+#include <string>
+
+#include "commands/log_mask.h"
+#include "commands/outputs.h"
+#include "frame/export_call.h"
+#include "kral/log.h"
+#include "transport/name_table.h"
+
+namespace {
+
+using kral::Diag_FTM;
+using kral::LogFormatted;
+using kral::LogName;
+using kral::NameTable;
+using kral::NameTableKind;
+using kral::OnPhone;
+using kral::OnPhoneAtOnce;
+using kral::Put;
+namespace diag = kral::diag;
+
+static_assert(KRAL_EQUIPMENT_IDS == diag::kEquipmentIds);
+static_assert(KRAL_TABLE_ALLOWED_EVENTS == static_cast<uint32_t>(NameTableKind::kAllowedEvents));
+
+bool ReadRanges(Diag_FTM& phone, uint32_t* last_items) {
+  const auto ranges = diag::GetLogRanges(phone);
+  if (!ranges) return false;
+  std::copy(ranges->begin(), ranges->end(), last_items);
+  return true;
+}
+
+bool PutMask(const kral::BitMask& mask, uint16_t* size, uint8_t* bytes) {
+  if (mask.bytes().size() > *size) return false;
+  std::copy(mask.bytes().begin(), mask.bytes().end(), bytes);
+  *size = static_cast<uint16_t>(mask.bytes().size());
+  return true;
+}
+
+bool ReadLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t* bits, uint16_t* size, uint8_t* bytes) {
+  if (size == nullptr || bytes == nullptr || equipment_id >= diag::kEquipmentIds) return false;
+  const auto ranges = diag::GetLogRanges(phone);
+  if (!ranges || kral::BitMask::BytesFor((*ranges)[equipment_id]) > diag::kLongestMask) return false;
+  const auto mask = diag::GetLogMask(phone, equipment_id, (*ranges)[equipment_id]);
+  if (!mask || !PutMask(*mask, size, bytes)) return false;
+  Put(bits, static_cast<uint32_t>(mask->bits()));
+  return true;
+}
+
+bool ReadEventMask(Diag_FTM& phone, uint16_t* bits, uint16_t* size, uint8_t* bytes) {
+  if (size == nullptr || bytes == nullptr) return false;
+  const auto mask = diag::GetEventMask(phone);
+  if (!mask || !PutMask(*mask, size, bytes)) return false;
+  Put(bits, static_cast<uint16_t>(mask->bits()));
+  return true;
+}
+
+bool LoadTable(Diag_FTM& phone, uint32_t table, const char* file_name) {
+  if (table >= kral::kNameTableCount) return false;
+  std::shared_ptr<const NameTable> loaded;
+  if (file_name != nullptr) {
+    std::string error;
+    loaded = NameTable::Load(file_name, error);
+    if (!loaded) {
+      phone.log().WriteLine(kral::kLogErr, "KRAL_LoadNameTable() -- %s: %s", file_name, error.c_str());
+      return false;
+    }
+  }
+  phone.names().Set(static_cast<NameTableKind>(table), std::move(loaded));
+  return true;
+}
+
+bool PutText(const std::string& text, uint16_t size, char* output) {
+  if (output == nullptr || size == 0) return false;
+  const size_t length = std::min<size_t>(text.size(), size - 1U);
+  std::memcpy(output, text.data(), length);
+  output[length] = '\0';
+  return true;
+}
+
+bool ReadName(Diag_FTM& phone, NameTableKind kind, uint16_t id, uint16_t size, char* output) {
+  const auto table = phone.names().Get(kind);
+  const std::string* const name = table->Find(id);
+  return name != nullptr && PutText(*name, size, output);
+}
+
+bool CountCategories(Diag_FTM& phone, uint32_t* count) {
+  Put(count, static_cast<uint32_t>(phone.names().Get(NameTableKind::kMessageCategories)->rows().size()));
+  return true;
+}
+
+bool ReadCategory(Diag_FTM& phone, uint32_t index, uint16_t* category, uint16_t size, char* name) {
+  const auto table = phone.names().Get(NameTableKind::kMessageCategories);
+  if (index >= table->rows().size() || !PutText(table->rows()[index].name, size, name)) return false;
+  Put(category, table->rows()[index].id);
+  return true;
+}
+
+bool EnableCategory(Diag_FTM& phone, uint16_t category, bool on) {
+  if (phone.names().Allows(NameTableKind::kMessageCategories, category)) {
+    return diag::EnableMessageCategory(phone, category, on);
+  }
+  phone.log().WriteLine(kral::kLogErr, "KRAL_ExtendedTextMessage_SetCategoryEnable() -- no category %d in the table",
+                        category);
+  return false;
+}
+
+bool IsList(const uint16_t* ids, uint16_t count) {
+  return ids != nullptr || count == 0;
+}
+
+}  // namespace
+
+extern "C" {
+
+uint8_t KRAL_CALL KRAL_DIAG_SetExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code,
+                                               uint16_t last_item) {
+  LogFormatted(handle, "KRAL_DIAG_SetExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X, iLastItem = %d )",
+               equipment_id, log_code, last_item);
+  return OnPhone(handle, diag::SetOnlyLogCode, equipment_id, log_code, last_item);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code) {
+  LogFormatted(handle, "KRAL_DIAG_AddExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code);
+  return OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), true);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id, const uint16_t* log_codes,
+                                                uint16_t count) {
+  LogFormatted(handle, "KRAL_DIAG_AddExtendedLogCodes( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id,
+               count);
+  return IsList(log_codes, count)
+             ? OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), true)
+             : 0;
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code) {
+  LogFormatted(handle, "KRAL_DIAG_ClearExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code);
+  return OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), false);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id, const uint16_t* log_codes,
+                                                  uint16_t count) {
+  LogFormatted(handle, "KRAL_DIAG_ClearExtendedLogCodes( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id,
+               count);
+  return IsList(log_codes, count)
+             ? OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), false)
+             : 0;
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_ClearAllLogCodes(KRAL_HANDLE handle, uint8_t equipment_id) {
+  LogFormatted(handle, "KRAL_DIAG_ClearAllLogCodes( iEquipmentID = %d )", equipment_id);
+  return OnPhone(handle, diag::ClearAllLogCodes, equipment_id);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_GetLogRanges(KRAL_HANDLE handle, uint32_t* last_items) {
+  LogName(handle, "KRAL_DIAG_GetLogRanges");
+  return last_items == nullptr ? 0 : OnPhone(handle, ReadRanges, last_items);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_GetLogMask(KRAL_HANDLE handle, uint8_t equipment_id, uint32_t* bits, uint16_t* size,
+                                       uint8_t* mask) {
+  LogFormatted(handle, "KRAL_DIAG_GetLogMask( iEquipmentID = %d )", equipment_id);
+  return OnPhone(handle, ReadLogMask, equipment_id, bits, size, mask);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBit(KRAL_HANDLE handle, uint16_t event_id, uint8_t state) {
+  LogFormatted(handle, "KRAL_DIAG_SetEventMaskBit( iMaskID = %d, bMaskState = %d )", event_id, state);
+  return OnPhone(handle, diag::ControlEventReports, diag::Ids(&event_id, 1), state == 1, diag::EventChange::kListed);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBits(KRAL_HANDLE handle, const uint16_t* event_ids, uint16_t count,
+                                             uint8_t state) {
+  LogFormatted(handle, "KRAL_DIAG_SetEventMaskBits( iMaskID_ListSize = %d, bMaskState = %d )", count, state);
+  return IsList(event_ids, count) ? OnPhone(handle, diag::ControlEventReports, diag::Ids(event_ids, count), state == 1,
+                                            diag::EventChange::kListed)
+                                  : 0;
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_SetEntireEventMaskState(KRAL_HANDLE handle, uint8_t state) {
+  LogFormatted(handle, "KRAL_DIAG_SetEntireEventMaskState( bMaskState = %d )", state);
+  return OnPhone(handle, diag::ControlEventReports, diag::Ids(), state == 1,
+                 state == 1 ? diag::EventChange::kAllOn : diag::EventChange::kAllOff);
+}
+
+uint8_t KRAL_CALL KRAL_DIAG_GetEventMask(KRAL_HANDLE handle, uint16_t* bits, uint16_t* size, uint8_t* mask) {
+  LogName(handle, "KRAL_DIAG_GetEventMask");
+  return OnPhone(handle, ReadEventMask, bits, size, mask);
+}
+
+uint8_t KRAL_CALL KRAL_LoadNameTable(KRAL_HANDLE handle, uint32_t table, const char* file_name) {
+  LogFormatted(handle, "KRAL_LoadNameTable( iTable = %u )", table);
+  return OnPhoneAtOnce(handle, LoadTable, table, file_name);
+}
+
+uint8_t KRAL_CALL KRAL_GetEventText(KRAL_HANDLE handle, uint16_t event_id, uint16_t size, char* text) {
+  LogName(handle, "KRAL_GetEventText");
+  return OnPhoneAtOnce(handle, ReadName, NameTableKind::kEventTexts, event_id, size, text);
+}
+
+uint8_t KRAL_CALL KRAL_GetLogCodeText(KRAL_HANDLE handle, uint16_t log_code, uint16_t size, char* text) {
+  LogName(handle, "KRAL_GetLogCodeText");
+  return OnPhoneAtOnce(handle, ReadName, NameTableKind::kLogNames, log_code, size, text);
+}
+
+uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListSize(KRAL_HANDLE handle, uint32_t* count) {
+  LogName(handle, "KRAL_ExtendedTextMessage_GetCategoryListSize");
+  return OnPhoneAtOnce(handle, CountCategories, count);
+}
+
+uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListItem(KRAL_HANDLE handle, uint32_t index, uint16_t* category,
+                                                               uint16_t size, char* name) {
+  LogFormatted(handle, "KRAL_ExtendedTextMessage_GetCategoryListItem( iIndex = %u )", index);
+  return OnPhoneAtOnce(handle, ReadCategory, index, category, size, name);
+}
+
+uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDLE handle, uint16_t category, uint8_t enable) {
+  LogFormatted(handle, "KRAL_ExtendedTextMessage_SetCategoryEnable( iCategory = %d, bEnable = %d )", category, enable);
+  return OnPhone(handle, EnableCategory, category, enable == 1);
+}
+
+}  // extern "C"

@@ -1,0 +1,51 @@
+// What a phone object keeps of the traffic that nobody asked for: counters, the capture file, playback.
+#include "frame/diag_ftm.h"
+#include "frame/diag_ftm_parts.h"
+
+namespace kral {
+
+TrafficCounters Diag_FTM::counters() {
+  return server_mode() ? sorter().counters() : transport().counters();
+}
+
+bool Diag_FTM::StartCapture(const char* file_name) {
+  // Looked at first: the file of the capture that runs must not be emptied.
+  if (!capture().active() && capture().Start(OpenCaptureFile(file_name), parts_)) return true;
+  log().WriteLine(kLogErr, "Capture file: %s cannot be written, or a capture runs already", file_name);
+  return false;
+}
+
+// What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher.
+bool Diag_FTM::StopCapture() {
+  constexpr uint32_t kSettleMs = 200;
+  if (!capture().active()) return false;
+  if (!server_mode()) dispatcher().WaitUntilDispatched(kSettleMs);
+  return capture().Stop();
+}
+
+bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
+  // Through a phone server there is no dispatcher to play into.
+  if (!server_mode() && player().Start(OpenCaptureSource(file_name), pace, dispatcher(), sorter(), parts_)) return true;
+  log().WriteLine(kLogErr, "Capture file: %s cannot be read, or a file is played already", file_name);
+  return false;
+}
+
+// Nobody may wait for packets of a handset that is gone.
+void Diag_FTM::EndCollection() {
+  player().Stop();
+  asynchronous().Close();
+  events().Close();
+  StopCapture();
+}
+
+NameTables& Diag_FTM::names() {
+  return parts_->names;
+}
+CaptureWriter& Diag_FTM::capture() {
+  return parts_->capture;
+}
+CapturePlayer& Diag_FTM::player() {
+  return parts_->player;
+}
+
+}  // namespace kral

@@ -1,0 +1,415 @@
+/**
+ * @file log.h
+ * Logs, events and messages: what a handset sends of its own accord, chosen by masks and collected into queues.
+ *
+ * Beside the rules of kral.h:
+ *
+ * - Log packets (first byte 16), messages (31 and 121), event reports (96) and packets that begin with 146 are put
+ *   into the log queue of the handset while collection is on; while it is off they are dropped, and counted. Every
+ *   event of a report is also put into the event queue. Each queue holds 4,096 records and drops its oldest one when
+ *   full.
+ * - Collection is off at first. It is switched on by KRAL_DIAG_SetPhoneLoggingState, and by every call that switches
+ *   logs or messages on or changes the event mask.
+ * - The mask functions are requests and wait for time-out 0 (4,000 ms) once for each request they make: at most three
+ *   for logs, two for events. They must not be called from a callback. All others never wait for a running request,
+ *   and wait only where they say so.
+ * - An equipment id (0 to 15) has the log codes from its number times 4,096 on, as many as the handset tells. Codes
+ *   outside that range are refused, and so is the whole list they stand in.
+ * - Functions and records marked as an addition are no part of the handset maker's own interface.
+ *
+ * The files that the functions read and write are described in docs/logs.md.
+ */
+#ifndef KRAL_LOG_H
+#define KRAL_LOG_H
+
+#include "kral/transport.h"
+#include "kral/types.h"
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Bytes of the longest packet, its two FCS bytes included. */
+#define KRAL_LONGEST_PACKET 4096u
+
+/** Equipment ids of a handset. */
+#define KRAL_EQUIPMENT_IDS 16u
+
+/** One event, as taken out of a report. */
+typedef struct KRAL_EVENT {
+  uint8_t time_stamp_length; /**< 8, or 2 for a truncated one */
+  uint8_t time_stamp[8];     /**< of a truncated one the first two bytes */
+  uint8_t event_id[2];       /**< little-endian, 0 to 4,095 */
+  uint8_t payload_length;    /**< 0 also for payloads of one and of two bytes that go without a length */
+  uint8_t payload[256];
+} KRAL_EVENT;
+
+/** Fails to compile where the record would be padded. */
+typedef char KRAL_EVENT_SIZE_CHECK[sizeof(KRAL_EVENT) == 268 ? 1 : -1];
+
+/* --- Collecting --------------------------------------------------------------------------------------------------- */
+
+/**
+ * Switches collection on or off. What is in the queues stays there.
+ *
+ * @param handle  from a connect function
+ * @param enable  1: on; every other value: off
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetPhoneLoggingState(KRAL_HANDLE handle, uint8_t enable);
+
+/**
+ * Takes the oldest packet out of the log queue.
+ *
+ * @param      handle  from a connect function
+ * @param[out] size    bytes of the packet, its two FCS bytes at the end included
+ * @param[out] buffer  room for KRAL_LONGEST_PACKET bytes
+ * @return 1, or 0 when the queue is empty
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer);
+
+/**
+ * The same, waiting for a packet when the queue is empty. An addition.
+ *
+ * @param      handle       from a connect function; released meanwhile, it ends the wait
+ * @param[out] size         as above
+ * @param[out] buffer       as above
+ * @param      time_out_ms  0 does not wait
+ * @return 1, or 0 when no packet came in time
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer,
+                                                      uint32_t time_out_ms);
+
+/** Empties the log queue. @return 1 */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearPhoneLogQueue(KRAL_HANDLE handle);
+
+/**
+ * Tells how many packets wait in the log queue.
+ *
+ * @param      handle  from a connect function
+ * @param[out] count   written for an empty queue as well
+ * @return 1 when there are any, 0 when the queue is empty
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetPhoneLogQueueSize(KRAL_HANDLE handle, uint32_t* count);
+
+/**
+ * Takes the oldest event out of the event queue.
+ *
+ * @param      handle  from a connect function
+ * @param[out] event   the event
+ * @return 1, or 0 when the queue is empty
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event);
+
+/**
+ * The same, waiting for an event when the queue is empty. An addition.
+ *
+ * @param      handle       from a connect function; released meanwhile, it ends the wait
+ * @param[out] event        the event
+ * @param      time_out_ms  0 does not wait
+ * @return 1, or 0 when no event came in time
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event, uint32_t time_out_ms);
+
+/** Empties the event queue. @return 1 */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearEventQueue(KRAL_HANDLE handle);
+
+/** Empties the queue of answers: one that a request waits for is lost, too. @return 1 */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearCommandResponseQueue(KRAL_HANDLE handle);
+
+/** Sees an event as it is put into the event queue; rules as for KRAL_RAW_PACKET_CALLBACK. An addition. */
+typedef void(KRAL_CALL* KRAL_EVENT_CALLBACK)(const KRAL_EVENT* event, uintptr_t value);
+
+/**
+ * Sets the functions that see collected packets and events, beside the queues. An addition.
+ *
+ * @param handle  from a connect function
+ * @param packet  called for every packet that is put into the log queue; null: none
+ * @param event   called for every event that is put into the event queue; null: none
+ * @param value   handed to both. Calls to the former functions that are under way still end
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCollectionCallBacks(KRAL_HANDLE handle, KRAL_RAW_PACKET_CALLBACK packet,
+                                                             KRAL_EVENT_CALLBACK event, uintptr_t value);
+
+/** What came over a connection, and what was lost of it; all counted since the handle was made. An addition. */
+typedef struct KRAL_TRAFFIC_COUNTERS {
+  uint64_t bytes_received;   /**< from the port; 0 through a phone server, as are the next, bad_fcs */
+  uint64_t packets_received; /**< made of the bytes, answers included */
+  uint64_t collected;        /**< packets put into the log queue */
+  uint64_t events;           /**< events put into the event queue */
+  uint64_t dropped_logs;     /**< thrown out of the full log queue before they were read */
+  uint64_t dropped_events;   /**< ... out of the event queue */
+  uint64_t dropped_answers;  /**< ... out of the queue of answers */
+  uint64_t dropped_off;      /**< packets that came while collection was off */
+  uint64_t bad_fcs;          /**< answers with a wrong frame check sequence; logs and the like are not checked */
+  uint64_t oversized;        /**< packets of a size that is not taken, and runs of bytes without an end */
+  uint64_t captured;         /**< packets written to capture files */
+  uint64_t capture_lost;     /**< packets that a full or slow disk has cost a capture file */
+} KRAL_TRAFFIC_COUNTERS;
+
+typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 96 ? 1 : -1];
+
+/**
+ * Reads the counters. An addition.
+ *
+ * @param      handle    from a connect function
+ * @param[out] counters  each is exact; traffic that comes meanwhile may be in one of them and not yet in another
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetTrafficCounters(KRAL_HANDLE handle, KRAL_TRAFFIC_COUNTERS* counters);
+
+/* --- Log masks ---------------------------------------------------------------------------------------------------- */
+
+/**
+ * Switches one log code on, and all others of the equipment id off.
+ *
+ * @param handle        from a connect function
+ * @param equipment_id  0 to 15
+ * @param log_code      of that equipment id
+ * @param last_item     the number of items of the equipment id, as KRAL_DIAG_GetLogRanges tells it
+ * @return 1 when the handset has the mask
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code,
+                                                        uint16_t last_item);
+
+/**
+ * Switches a log code on and leaves the others as they are. Nothing is sent for one that is on already.
+ *
+ * @param handle        from a connect function
+ * @param equipment_id  0 to 15
+ * @param log_code      of that equipment id, and on the list of allowed ones if there is one
+ * @return 1 when the code is on
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code);
+
+/**
+ * The same for several.
+ *
+ * @param handle        from a connect function
+ * @param equipment_id  0 to 15
+ * @param log_codes     one that is refused fails the call, and nothing is changed
+ * @param count         codes of the list
+ * @return 1 when all are on
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id,
+                                                         const uint16_t* log_codes, uint16_t count);
+
+/** Switches a log code off; arguments as for KRAL_DIAG_AddExtendedLogCode. @return 1 when it is off */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code);
+
+/** Switches several off; arguments as for KRAL_DIAG_AddExtendedLogCodes. @return 1 when all are off */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id,
+                                                           const uint16_t* log_codes, uint16_t count);
+
+/**
+ * Switches every log code of an equipment id off. When the handset does not tell its ranges, it is sent a mask without
+ * any items.
+ *
+ * @param handle        from a connect function
+ * @param equipment_id  0 to 15
+ * @return 1 when the handset has taken the mask
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearAllLogCodes(KRAL_HANDLE handle, uint8_t equipment_id);
+
+/**
+ * Reads how many log items each equipment id has. An addition.
+ *
+ * @param      handle      from a connect function
+ * @param[out] last_items  KRAL_EQUIPMENT_IDS numbers
+ * @return 1 when the handset answered
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogRanges(KRAL_HANDLE handle, uint32_t* last_items);
+
+/**
+ * Reads the log mask of an equipment id. An addition.
+ *
+ * @param         handle        from a connect function
+ * @param         equipment_id  0 to 15
+ * @param[out]    bits          items of the equipment id
+ * @param[in,out] size          in: bytes of room; out: bytes of the mask
+ * @param[out]    mask          item i is bit (i mod 8) of byte (i / 8)
+ * @return 1; 0 also when there is not enough room (4,096 bytes always are)
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogMask(KRAL_HANDLE handle, uint8_t equipment_id, uint32_t* bits,
+                                                uint16_t* size, uint8_t* mask);
+
+/* --- Event mask --------------------------------------------------------------------------------------------------- */
+
+/**
+ * Switches one event.
+ *
+ * @param handle    from a connect function
+ * @param event_id  that the handset has, and on the list of allowed ones if there is one
+ * @param state     1: on; every other value: off
+ * @return 1 when the handset has taken the mask
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBit(KRAL_HANDLE handle, uint16_t event_id, uint8_t state);
+
+/**
+ * Switches several events.
+ *
+ * @param handle     from a connect function
+ * @param event_ids  one that is refused fails the call, and nothing is changed
+ * @param count      ids of the list
+ * @param state      1: on; every other value: off
+ * @return 1 when the handset has taken the mask
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBits(KRAL_HANDLE handle, const uint16_t* event_ids, uint16_t count,
+                                                      uint8_t state);
+
+/**
+ * Switches all events. A list of allowed events has no say in it.
+ *
+ * @param handle  from a connect function
+ * @param state   1: on; every other value: off
+ * @return 1 when the handset has taken the mask
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEntireEventMaskState(KRAL_HANDLE handle, uint8_t state);
+
+/**
+ * Reads the event mask. An addition.
+ *
+ * @param         handle  from a connect function
+ * @param[out]    bits    events that the handset has
+ * @param[in,out] size    in: bytes of room; out: bytes of the mask
+ * @param[out]    mask    event i is bit (i mod 8) of byte (i / 8)
+ * @return 1; 0 also when there is not enough room (4,096 bytes always are)
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetEventMask(KRAL_HANDLE handle, uint16_t* bits, uint16_t* size, uint8_t* mask);
+
+/* --- Names and lists ---------------------------------------------------------------------------------------------- */
+
+/** The tables of a handle, all of them empty at first. */
+#define KRAL_TABLE_EVENT_TEXTS 0u
+#define KRAL_TABLE_MESSAGE_CATEGORIES 1u
+#define KRAL_TABLE_LOG_NAMES 2u
+#define KRAL_TABLE_ALLOWED_LOGS 3u   /**< the only log codes that may be switched; empty: all may be */
+#define KRAL_TABLE_ALLOWED_EVENTS 4u /**< the same for single events */
+
+/**
+ * Loads a table from a text file: one id and its name a line. An addition.
+ *
+ * @param handle     from a connect function
+ * @param table      KRAL_TABLE_...
+ * @param file_name  null empties the table
+ * @return 1; 0 when the file cannot be read or has a mistake, which the text log names: the table is then as it was
+ *
+ * Wait: the reading of the file.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_LoadNameTable(KRAL_HANDLE handle, uint32_t table, const char* file_name);
+
+/**
+ * The text of an event, from the table of event texts.
+ *
+ * @param      handle    from a connect function
+ * @param      event_id  0 to 4,095
+ * @param      size      bytes of room, at least 1
+ * @param[out] text      terminated; a longer one is cut
+ * @return 1, or 0 when the table has no such event
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetEventText(KRAL_HANDLE handle, uint16_t event_id, uint16_t size, char* text);
+
+/** The name of a log code, from the table of log names; arguments as for KRAL_GetEventText. An addition. */
+KRAL_API uint8_t KRAL_CALL KRAL_GetLogCodeText(KRAL_HANDLE handle, uint16_t log_code, uint16_t size, char* text);
+
+/**
+ * The number of message categories in the table.
+ *
+ * @param      handle  from a connect function
+ * @param[out] count   written on success
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListSize(KRAL_HANDLE handle, uint32_t* count);
+
+/**
+ * One message category of the table, in the order of the file.
+ *
+ * @param      handle    from a connect function
+ * @param      index     from 0
+ * @param[out] category  its id
+ * @param      size      bytes of room for the name, at least 1
+ * @param[out] name      terminated; a longer one is cut
+ * @return 1, or 0 for an index outside the table
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListItem(KRAL_HANDLE handle, uint32_t index,
+                                                                        uint16_t* category, uint16_t size, char* name);
+
+/**
+ * Lets the handset send the messages of a category, of every level, or none of them.
+ *
+ * @param handle    from a connect function
+ * @param category  in the table of message categories; while that is empty, any
+ * @param enable    1: on; every other value: off
+ * @return 1 when the handset has taken it
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDLE handle, uint16_t category,
+                                                                      uint8_t enable);
+
+/* --- Capture files (additions) ------------------------------------------------------------------------------------ */
+
+/**
+ * Writes everything that is collected from now on to a file, beside the queues. The disk never holds up the connection:
+ * packets that it is too slow for are counted as lost, and so are those behind a write that fails. Switches nothing on.
+ *
+ * @param handle     from a connect function
+ * @param file_name  emptied first
+ * @return 1; 0 when the file cannot be written, and while another capture of the handle runs
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name);
+
+/**
+ * Ends the capture and closes its file. A disconnect does so as well.
+ *
+ * @return 1 when every packet that was collected is in the file; 0 also when no capture runs
+ *
+ * Wait: until the rest is written, at most 1,200 ms.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
+
+/** Pace of a playback. */
+#define KRAL_PLAY_FOR_LOG_READER 0u   /**< waits for room in the log queue: no packet is dropped from it */
+#define KRAL_PLAY_FOR_EVENT_READER 1u /**< the same for the event queue */
+#define KRAL_PLAY_AS_RECORDED 2u      /**< with the time between packets as it was */
+#define KRAL_PLAY_AT_ONCE 3u          /**< for callbacks; the queues drop what they do not hold */
+
+/** States of a playback. */
+#define KRAL_PLAYBACK_NONE 0
+#define KRAL_PLAYBACK_RUNNING 1
+#define KRAL_PLAYBACK_DONE 2
+#define KRAL_PLAYBACK_CUT 3     /**< played up to the last whole packet of a file that is cut or damaged there */
+#define KRAL_PLAYBACK_FOREIGN 4 /**< not a capture file */
+#define KRAL_PLAYBACK_STOPPED 5
+
+/**
+ * Plays a capture file: its packets come as if the handset had sent them, on a thread of the library, through counters,
+ * callbacks and queues. Switches collection on. A connection to port 65534, which has no port behind it, is enough.
+ *
+ * @param handle     from a connect function
+ * @param file_name  written by KRAL_StartCapture
+ * @param pace       KRAL_PLAY_...
+ * @return 1 when the playback has begun; 0 when the file cannot be read, while another is played, and through a phone
+ *         server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace);
+
+/** Ends a playback before its time. @return 1; 0 when a callback did not come back within 1,000 ms */
+KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);
+
+/**
+ * Tells how far the last playback has got. Any output may be null.
+ *
+ * @param      handle   from a connect function
+ * @param[out] state    KRAL_PLAYBACK_...
+ * @param[out] packets  played so far
+ * @param[out] skipped  packets of the file that no handset sends unasked: they were left out
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetPlaybackState(KRAL_HANDLE handle, int32_t* state, uint64_t* packets,
+                                                 uint64_t* skipped);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif
