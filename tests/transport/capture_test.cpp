@@ -1,0 +1,273 @@
+// Capture files: what the writer keeps when the disk does not, what the reader makes of damaged files, and the paces of
+// a playback.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <condition_variable>
+#include <mutex>
+
+#include "frame/base/little_endian.h"
+#include "tests/support/engine_bundle.h"
+#include "tests/support/temp_folder.h"
+#include "transport/capture_format.h"
+#include "transport/capture_player.h"
+#include "transport/capture_reader.h"
+#include "transport/capture_writer.h"
+
+namespace kral {
+namespace {
+
+using test::EngineBundle;
+using test::EngineGuard;
+using test::Eventually;
+using Outcome = CaptureReader::Outcome;
+
+// Takes bytes until it is full, and holds the writer up while it is told to.
+class Disk {
+ public:
+  explicit Disk(size_t capacity = SIZE_MAX) : capacity_(capacity) {}
+
+  CaptureSink AsSink() {
+    return [this](std::span<const uint8_t> bytes) {
+      std::unique_lock lock(mutex_);
+      ++writes_;
+      held_.wait(lock, [this] { return !hold_; });
+      const size_t taken = std::min(bytes.size(), capacity_ - content_.size());
+      content_.insert(content_.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(taken));
+      return taken == bytes.size();
+    };
+  }
+  void Hold(bool hold) {
+    const std::lock_guard lock(mutex_);
+    hold_ = hold;
+    held_.notify_all();
+  }
+  int writes() {
+    const std::lock_guard lock(mutex_);
+    return writes_;
+  }
+  Packet content() {
+    const std::lock_guard lock(mutex_);
+    return content_;
+  }
+
+ private:
+  const size_t capacity_;
+  std::mutex mutex_;
+  std::condition_variable held_;
+  bool hold_ = false;
+  int writes_ = 0;
+  Packet content_;
+};
+
+CaptureSource SourceOf(Packet bytes) {
+  return [bytes = std::move(bytes), at = size_t{0}](std::span<uint8_t> buffer) mutable {
+    const size_t count = std::min(buffer.size(), bytes.size() - at);
+    std::copy_n(bytes.begin() + static_cast<std::ptrdiff_t>(at), count, buffer.begin());
+    at += count;
+    return count;
+  };
+}
+
+struct Reading {
+  std::vector<Packet> packets;
+  Outcome end;
+};
+
+Reading ReadAll(const Packet& bytes) {
+  CaptureReader reader(SourceOf(bytes));
+  Reading reading;
+  CaptureRecord record;
+  while ((reading.end = reader.Next(record)) == Outcome::kRecord) reading.packets.push_back(record.packet);
+  EXPECT_EQ(reader.Next(record), reading.end) << "it goes on giving that";
+  return reading;
+}
+
+Packet Capture(const std::vector<Packet>& packets) {
+  Disk disk;
+  CaptureWriter writer;
+  EXPECT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  for (const Packet& packet : packets) writer.Append(packet);
+  EXPECT_TRUE(writer.Stop());
+  return disk.content();
+}
+
+const std::vector<Packet> kPackets = {{16, 1}, Packet(4096, 121), {96, 0, 0, 1, 2}};
+
+TEST(CaptureFile, HoldsWhatWasAppended) {
+  const auto before = std::chrono::system_clock::now().time_since_epoch();
+  Packet odd(4097, 16);
+  const Packet file = Capture({kPackets[0], Packet{16}, odd, kPackets[1], kPackets[2]});
+  const Reading reading = ReadAll(file);
+  EXPECT_EQ(reading.packets, kPackets) << "packets of a size that is none are left out";
+  EXPECT_EQ(reading.end, Outcome::kEnd);
+
+  const Packet head = {'K', 'R', 'A', 'L', 'C', 'A', 'P', 0x1A, 1, 0, 16, 0, 0, 0, 0, 0};
+  EXPECT_EQ(Packet(file.begin(), file.begin() + 16), head);
+  EXPECT_EQ(Packet(file.begin() + 24, file.begin() + 30), (Packet{2, 0, 0xFD, 0xFF, 16, 1}));
+  const auto stamp = *LoadLe<uint64_t>(file, 16);
+  const auto first = static_cast<uint64_t>(std::chrono::duration_cast<std::chrono::microseconds>(before).count());
+  EXPECT_GE(stamp, first);
+  EXPECT_LT(stamp, first + 60'000'000);
+}
+
+TEST(CaptureFile, CutFileIsReadUpToItsLastWholePacket) {
+  const Packet file = Capture({{16, 1}, {16, 2, 3}});
+  ASSERT_EQ(file.size(), 16u + 14u + 15u);
+  for (size_t size = 0; size <= file.size(); ++size) {
+    const Reading reading = ReadAll(Packet(file.begin(), file.begin() + static_cast<std::ptrdiff_t>(size)));
+    EXPECT_EQ(reading.packets.size(), size == 45 ? 2u : size >= 30 ? 1u : 0u) << size;
+    const bool whole = size == 16 || size == 30 || size == 45;
+    EXPECT_EQ(reading.end, size < 16 ? Outcome::kForeign : whole ? Outcome::kEnd : Outcome::kCut) << size;
+  }
+}
+
+TEST(CaptureFile, DamageEndsTheReadingAndForeignFilesAreRefused) {
+  const Packet file = Capture({{16, 1}, {16, 2}});
+  const struct {
+    const char* name;
+    size_t offset;
+    Packet bytes;
+    size_t packets;
+    Outcome end;
+  } cases[] = {
+      {"magic", 3, {'X'}, 0, Outcome::kForeign},
+      {"later version", 8, {2}, 0, Outcome::kForeign},
+      {"head too short", 10, {15}, 0, Outcome::kForeign},
+      {"head beyond the end", 10, {0, 1}, 0, Outcome::kCut},
+      {"longer head", 10, {30}, 1, Outcome::kEnd},
+      {"length", 38, {3}, 1, Outcome::kCut},
+      {"complement", 40, {0}, 1, Outcome::kCut},
+      {"length of no packet", 38, {1, 0, 0xFE, 0xFF}, 1, Outcome::kCut},
+      {"length beyond every packet", 38, {1, 0x10, 0xFE, 0xEF}, 1, Outcome::kCut},
+      {"zeros behind a crash", 30, Packet(14, 0), 1, Outcome::kCut},
+  };
+  for (const auto& c : cases) {
+    Packet damaged = file;
+    std::copy(c.bytes.begin(), c.bytes.end(), damaged.begin() + static_cast<std::ptrdiff_t>(c.offset));
+    const Reading reading = ReadAll(damaged);
+    EXPECT_EQ(reading.packets.size(), c.packets) << c.name;
+    EXPECT_EQ(reading.end, c.end) << c.name;
+  }
+  EXPECT_FALSE(OpenCaptureSource("/nonexistent/capture"));
+  CaptureRecord record;
+  EXPECT_EQ(CaptureReader({}).Next(record), Outcome::kForeign);
+}
+
+TEST(CaptureFile, FullDiskIsCountedAndLoggedOnce) {
+  test::LogLines log;
+  Disk disk(16 + 14 + 5);
+  CaptureWriter writer;
+  writer.SetLogger(log.log());
+  ASSERT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  writer.Append(kPackets[0]);
+  ASSERT_TRUE(Eventually([&] { return writer.written() == 1; }));
+  log.Take();
+  for (int i = 0; i < 3; ++i) {
+    writer.Append(kPackets[0]);
+    ASSERT_TRUE(Eventually([&] { return writer.lost() == static_cast<uint64_t>(i) + 1; }));
+  }
+  EXPECT_EQ(log.Take(),
+            test::LogLines::Lines{"16 Capture file: packets are lost, the file cannot be written any more"});
+  EXPECT_FALSE(writer.Stop()) << "not everything is in the file";
+  EXPECT_EQ(ReadAll(disk.content()).packets.size(), 1u);
+  EXPECT_EQ(writer.written(), 1u);
+
+  Disk full(3);
+  EXPECT_FALSE(writer.Start(full.AsSink(), nullptr)) << "not even the head";
+  Disk good;
+  ASSERT_TRUE(writer.Start(good.AsSink(), nullptr));
+  writer.Append(kPackets[0]);
+  EXPECT_TRUE(writer.Stop()) << "the next capture is judged by itself";
+  writer.Append(kPackets[0]);
+  EXPECT_EQ(ReadAll(good.content()).packets.size(), 1u) << "what comes after the end is left out";
+}
+
+TEST(CaptureFile, SlowDiskCostsPacketsAndHoldsNobodyUp) {
+  test::LogLines log;
+  Disk disk;
+  CaptureWriter writer(100);
+  writer.SetLogger(log.log());
+  ASSERT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  disk.Hold(true);
+  writer.Append(kPackets[0]);
+  ASSERT_TRUE(Eventually([&] { return disk.writes() == 2; })) << "the writer is in the disk's hands";
+  for (int i = 0; i < 10; ++i) writer.Append(kPackets[0]);
+  EXPECT_EQ(writer.lost(), 3u) << "seven records of 14 bytes have room";
+  EXPECT_EQ(log.Take(), test::LogLines::Lines{"16 Capture file: packets are lost, the disk is too slow"});
+  EXPECT_FALSE(writer.Stop(1)) << "the wait has an end";
+  EXPECT_FALSE(writer.Start(Disk().AsSink(), nullptr)) << "the former thread is busy still";
+  disk.Hold(false);
+  EXPECT_FALSE(writer.Stop(5000));
+  EXPECT_EQ(ReadAll(disk.content()).packets.size(), 8u);
+}
+
+// --- Playback -------------------------------------------------------------------------------------------------------
+
+class Playback : public testing::Test {
+ protected:
+  bool Play(const Packet& file, PlayPace pace) {
+    return player_.Start(SourceOf(file), pace, bundle_->dispatcher, bundle_->sorter, nullptr);
+  }
+  bool Ends(PlayState state) {
+    return Eventually([&] { return player_.state() != PlayState::kPlaying; }) && player_.state() == state;
+  }
+
+  EngineGuard bundle_{EngineBundle::Make({}, SystemClock(), 0)};
+  CapturePlayer player_;
+};
+
+TEST_F(Playback, EndsAsTheFileDoes) {
+  const Packet file = Capture({{16, 1}, {75, 1}, {31, 1}, {146, 9}});
+  EXPECT_EQ(player_.state(), PlayState::kIdle);
+  ASSERT_TRUE(Play(file, PlayPace::kForLogReader));
+  EXPECT_TRUE(Ends(PlayState::kDone));
+  EXPECT_EQ(player_.played(), 3u);
+  EXPECT_EQ(player_.skipped(), 1u) << "no answer gets in";
+  EXPECT_EQ(bundle_->asynchronous.size(), 3u);
+  EXPECT_EQ(bundle_->responses.size(), 0u);
+  ASSERT_TRUE(Play(Packet(file.begin(), file.end() - 1), PlayPace::kAtOnce));
+  EXPECT_TRUE(Ends(PlayState::kCut));
+  EXPECT_EQ(player_.played(), 2u);
+  ASSERT_TRUE(Play(Packet(100, 'x'), PlayPace::kAtOnce));
+  EXPECT_TRUE(Ends(PlayState::kForeign));
+  EXPECT_FALSE(player_.Start({}, PlayPace::kAtOnce, bundle_->dispatcher, bundle_->sorter, nullptr));
+}
+
+TEST_F(Playback, WaitsForItsReaderAndCanBeStopped) {
+  const Packet file = Capture(std::vector<Packet>(5000, Packet{16, 1}));
+  ASSERT_TRUE(Play(file, PlayPace::kForLogReader));
+  EXPECT_FALSE(Play(file, PlayPace::kAtOnce)) << "one at a time";
+  ASSERT_TRUE(Eventually([&] { return bundle_->asynchronous.size() == kQueueCapacity; }));
+  EXPECT_TRUE(player_.Stop());
+  EXPECT_EQ(player_.state(), PlayState::kStopped);
+  EXPECT_EQ(bundle_->asynchronous.dropped(), 0u);
+  ASSERT_TRUE(Play(file, PlayPace::kAtOnce));
+  EXPECT_TRUE(Ends(PlayState::kDone));
+  EXPECT_EQ(bundle_->asynchronous.dropped(), 5000u) << "like a handset, it waits for nobody";
+}
+
+TEST_F(Playback, KeepsTheTimeBetweenPackets) {
+  Packet file = Capture({{16, 1}, {16, 2}, {16, 3}, {16, 4}});
+  const auto stamp = [&file](size_t record, uint64_t microseconds) {
+    StoreLe(std::span<uint8_t>(file), 16 + 14 * record, microseconds);
+  };
+  stamp(0, 1'000'000);
+  stamp(1, 1'030'000);
+  stamp(2, 500'000);              // the clock was set back
+  stamp(3, 86'500'000'000 * 30);  // and put right
+  const auto begin = std::chrono::steady_clock::now();
+  ASSERT_TRUE(Play(file, PlayPace::kAsRecorded));
+  EXPECT_TRUE(Ends(PlayState::kDone));
+  const auto took = std::chrono::steady_clock::now() - begin;
+  EXPECT_GE(took, std::chrono::milliseconds(30));
+  EXPECT_LT(took, std::chrono::seconds(20));
+
+  stamp(1, 600'000'000);
+  ASSERT_TRUE(Play(file, PlayPace::kAsRecorded));
+  ASSERT_TRUE(Eventually([&] { return player_.played() == 1; }));
+  EXPECT_TRUE(player_.Stop()) << "also in the midst of a long gap";
+}
+
+}  // namespace
+}  // namespace kral
