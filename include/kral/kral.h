@@ -31,6 +31,7 @@
 #include "kral/ftm.h"
 #include "kral/log.h"
 #include "kral/nv.h"
+#include "kral/nv_tool.h"
 #include "kral/pkv.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"

@@ -1,0 +1,78 @@
+// Keeps definitions and finds them by index, id and path.
+#include "storage/nv_definitions.h"
+
+#include <charconv>
+#include <utility>
+
+namespace kral::nv {
+namespace {
+
+constexpr std::string_view kRfFolder = "/nv/item_files/rfnv/";
+constexpr size_t kRfDigits = 8;
+
+}  // namespace
+
+std::string NvItem::Title() const {
+  return is_file() ? path : "NV ID " + std::to_string(*id);
+}
+
+std::optional<uint16_t> RfIdOfPath(std::string_view path) {
+  if (!path.starts_with(kRfFolder)) return std::nullopt;
+  const std::string_view digits = path.substr(kRfFolder.size());
+  uint16_t id = 0;
+  const auto result = std::from_chars(digits.data(), digits.data() + digits.size(), id);
+  if (digits.size() != kRfDigits || result.ec != std::errc() || result.ptr != digits.data() + digits.size()) {
+    return std::nullopt;
+  }
+  return id;
+}
+
+NvTypePtr NvDefinitions::FindType(std::string_view name) const {
+  const auto type = types_.find(std::string(name));
+  return type == types_.end() ? nullptr : type->second;
+}
+
+void NvDefinitions::PutType(NvTypePtr type) {
+  types_[type->name()] = std::move(type);
+}
+
+NvItem* NvDefinitions::At(size_t index) {
+  if (index < numbered_.size()) return &numbered_[index];
+  index -= numbered_.size();
+  return index < files_.size() ? &files_[index] : nullptr;
+}
+
+NvItem* NvDefinitions::Find(uint16_t id) {
+  if (const auto item = by_id_.find(id); item != by_id_.end()) return &numbered_[item->second];
+  if (const auto item = by_rf_id_.find(id); item != by_rf_id_.end()) return &files_[item->second];
+  return nullptr;
+}
+
+NvItem* NvDefinitions::Find(std::string_view path) {
+  const auto item = by_path_.find(std::string(path));
+  return item == by_path_.end() ? nullptr : &files_[item->second];
+}
+
+bool NvDefinitions::Put(NvItem item) {
+  auto& items = item.is_file() ? files_ : numbered_;
+  size_t index = items.size();
+  if (item.is_file()) {
+    index = by_path_.try_emplace(item.path, index).first->second;
+    if (item.id) by_rf_id_[*item.id] = index;
+  } else {
+    index = by_id_.try_emplace(*item.id, index).first->second;
+  }
+  const bool replaces = index < items.size();
+  if (replaces) {
+    items[index] = std::move(item);
+  } else {
+    items.push_back(std::move(item));
+  }
+  return replaces;
+}
+
+void NvDefinitions::Clear() {
+  *this = {};
+}
+
+}  // namespace kral::nv

@@ -1,0 +1,249 @@
+// Sets of items between the NV tool and files of the PC, and the reports.
+#include <algorithm>
+#include <map>
+#include <utility>
+
+#include "commands/nv_item.h"
+#include "kral/efs.h"
+#include "platform/file_util.h"
+#include "storage/nv_report.h"
+#include "storage/nv_tool.h"
+#include "storage/nv_value.h"
+
+namespace kral::nv {
+namespace {
+
+constexpr uint32_t kModeOfFiles = 0x81B6;  // a file that everybody reads and writes
+
+NvError ErrorOf(const PkvOutcome& outcome) {
+  switch (outcome.result) {
+    case PkvResult::kDone:
+      return NvError::kNone;
+    case PkvResult::kNoStorage:
+      return NvError::kNoPkvStorage;
+    case PkvResult::kDamagedItem:
+      return NvError::kBadPkvItem;
+    case PkvResult::kCannotOpen:
+    case PkvResult::kCannotWrite:
+      break;
+  }
+  return NvError::kCannotOpenPkv;
+}
+
+NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
+  const PkvOutcome outcome = ReadPkv(file, set);
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
+  return ErrorOf(outcome);
+}
+
+NvError SaveText(const std::string& file, const std::string& text, NvError failure) {
+  const std::vector<uint8_t> bytes(text.begin(), text.end());
+  return ReplaceWholeFile(file, bytes) ? failure : NvError::kNone;
+}
+
+}  // namespace
+
+// --- PKV files
+// --------------------------------------------------------------------------------------------------------
+
+NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored) {
+  auto value = FromStored(item, stored);
+  if (!value) {
+    phone.log().WriteLine(kLogErr, "%s: %d bytes are no value of its type", item.Title().c_str(),
+                          static_cast<int>(stored.size()));
+    return NvError::kCannotGetValue;
+  }
+  item.values[slot] = std::move(*value);
+  return NvError::kNone;
+}
+
+// Null when the index word names no element.
+NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, uint16_t highest_index) {
+  NvItem* item = definitions_.Find(entry.id);
+  if (item == nullptr && highest_index <= kHighestElement) {
+    NvItem generic = GenericItem(entry.id);
+    generic.max_index = highest_index;
+    if (highest_index > 0) generic.type = std::make_shared<NvDataType>(NvDataType::Generic(kDataSize - 1));
+    item = &Define(phone, std::move(generic));
+  }
+  return item != nullptr && !item->is_file() && entry.index <= item->max_index ? item : nullptr;
+}
+
+NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
+  PkvSet set;
+  if (const NvError error = ReadPkvFile(phone, file, set); error != NvError::kNone) return error;
+  std::map<uint16_t, uint16_t> highest;
+  for (const PkvNvItem& entry : set.items) {
+    auto& index = highest[entry.id];
+    index = std::max(index, entry.index);
+  }
+  Walk walk(*this, KRAL_NV_OPERATION_READ_PKV, set.items.size() + set.files.size());
+  for (const PkvNvItem& entry : set.items) {
+    NvItem* item = ItemOfPkv(phone, entry, highest[entry.id]);
+    NvError error = NvError::kBadPkvItem;
+    if (item == nullptr) {
+      phone.log().WriteLine(kLogErr, "NV ID %d with index %d has no place", entry.id, entry.index);
+    } else {
+      const size_t size = item->is_array() ? kDataSize - 1 : kDataSize;
+      error = !item->will_read
+                  ? NvError::kNone
+                  : TakeStored(phone, *item, {entry.subscription, entry.index}, std::span(entry.data).first(size));
+    }
+    walk.Report("NV ID " + std::to_string(entry.id), error);
+  }
+  for (const PkvEfsFile& entry : set.files) {
+    NvItem* item = definitions_.Find(entry.path);
+    if (item == nullptr) item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
+    walk.Report(entry.path, item->will_read ? TakeStored(phone, *item, {}, entry.bytes) : NvError::kNone);
+  }
+  return walk.failed() ? NvError::kBadPkvItem : NvError::kNone;
+}
+
+bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value,
+                                 PkvSet& set) const {
+  auto stored = ToStored(item, value);
+  if (!stored) {
+    phone.log().WriteLine(kLogErr, "%s: its value has no room in a data field", item.Title().c_str());
+    return false;
+  }
+  if (item.is_file()) {
+    const bool as_item_file = stored->size() <= KRAL_EFS_ITEM_SIZE;
+    set.files.push_back(
+        {item.path, as_item_file ? kModeOfFiles | KRAL_EFS_MODE_ITEM_FILE : kModeOfFiles, std::move(*stored)});
+    return true;
+  }
+  PkvNvItem entry;
+  entry.id = *item.id;
+  entry.index = slot.element;
+  entry.subscription = slot.subscription;
+  std::copy_n(stored->begin(), std::min(stored->size(), entry.data.size()), entry.data.begin());
+  set.items.push_back(entry);
+  return true;
+}
+
+NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
+  const std::vector<NvItem*> items = Chosen(&NvItem::will_write);
+  size_t total = 0;
+  for (const NvItem* item : items) total += item->values.size();
+  if (total == 0) return NvError::kNoValue;
+  Walk walk(*this, KRAL_NV_OPERATION_WRITE_PKV, total);
+  PkvSet set;
+  for (const NvItem* item : items) {
+    for (const auto& [slot, value] : item->values) {
+      const bool appended = AppendToPkv(phone, *item, slot, value, set);
+      walk.Report(item->Title(), appended ? NvError::kNone : NvError::kCannotSetValue);
+    }
+  }
+  // A backup that lacks something is none.
+  if (walk.failed()) return NvError::kCannotSetValue;
+  const PkvOutcome outcome = WritePkv(file, set, &phone.log());
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
+  return ErrorOf(outcome);
+}
+
+// --- Source files
+// -----------------------------------------------------------------------------------------------------
+
+NvError NVTool_Manager::LoadFromSource(Diag_FTM& phone, const std::string& file) {
+  NvSource source;
+  std::string problem;
+  if (const NvError error = LoadSource(file, source, problem); error != NvError::kNone) {
+    phone.log().WriteLine(kLogErr, "%s", problem.c_str());
+    return error;
+  }
+  Walk walk(*this, KRAL_NV_OPERATION_READ_SOURCE, source.items.size());
+  for (const NvSourceItem& entry : source.items) {
+    const NvError error = TakeSource(phone, entry);
+    walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, error);
+  }
+  for (auto& [number, list] : source.roaming_lists) roaming_lists_[number] = std::move(list);
+  return walk.failed() ? NvError::kBadSourceItem : NvError::kNone;
+}
+
+NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry) {
+  const auto reject = [&](const std::string& problem) {
+    phone.log().WriteLine(kLogErr, "%s: %s", (entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path).c_str(),
+                          problem.c_str());
+    return NvError::kBadSourceItem;
+  };
+  std::optional<NvBytes> bytes;
+  if (!entry.is_direct) bytes = FromHex(entry.value);
+  if (!entry.is_direct && !bytes) return reject("its value is not hexadecimal");
+  NvItem* item = entry.id ? definitions_.Find(*entry.id) : definitions_.Find(entry.path);
+  if (item == nullptr) {
+    if (entry.is_direct) return reject("decimal numbers need a definition");
+    NvItem generic = entry.id ? GenericItem(*entry.id) : GenericFile(entry.path, bytes->size());
+    generic.name = entry.name;
+    item = &Define(phone, std::move(generic));
+  }
+  if (!item->will_read) return NvError::kNone;
+  if (entry.slot.element > item->max_index) return reject("its index is out of range");
+  const NvSlot slot{item->is_file() ? uint16_t{0} : entry.slot.subscription, entry.slot.element};
+  if (entry.is_direct) {
+    std::string problem;
+    auto value = item->type->FromText(entry.value, problem);
+    if (!value) return reject(problem);
+    item->values[slot] = std::move(*value);
+    return NvError::kNone;
+  }
+  if (item->generic && item->is_file()) {
+    item->type = std::make_shared<NvDataType>(NvDataType::Generic(bytes->size()));
+  } else if (item->generic && bytes->size() < item->type->longest()) {
+    bytes->resize(item->type->longest());  // as a write fills the data field up
+  }
+  auto value = item->type->Cut(*bytes);
+  if (!value) return reject("its bytes are no value of its type");
+  item->values[slot] = std::move(*value);
+  return NvError::kNone;
+}
+
+NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) {
+  NvSource source;
+  for (const NvItem* item : Chosen(&NvItem::will_write)) {
+    for (const auto& [slot, value] : item->values) {
+      NvSourceItem entry;
+      if (item->is_file()) {
+        entry.path = item->path;
+      } else {
+        entry.id = item->id;
+      }
+      entry.name = item->name;
+      entry.slot = slot;
+      entry.is_direct = !item->generic;
+      entry.value = entry.is_direct ? item->type->ToText(value) : ToHex(value);
+      source.items.push_back(std::move(entry));
+    }
+  }
+  source.roaming_lists = roaming_lists_;
+  Walk walk(*this, KRAL_NV_OPERATION_WRITE_SOURCE, source.items.size());
+  for (const NvSourceItem& entry : source.items) {
+    walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, NvError::kNone);
+  }
+  const NvError error = SaveSource(file, source);
+  if (error != NvError::kNone) phone.log().WriteLine(kLogErr, "%s cannot be written", file.c_str());
+  return error;
+}
+
+// --- Reports
+// ----------------------------------------------------------------------------------------------------------
+
+NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, const std::string& second,
+                                   const std::string& page) {
+  PkvSet first_set;
+  PkvSet second_set;
+  if (const NvError error = ReadPkvFile(phone, first, first_set); error != NvError::kNone) return error;
+  if (const NvError error = ReadPkvFile(phone, second, second_set); error != NvError::kNone) return error;
+  NvComparison comparison;
+  const std::string text = ComparisonPage(first, first_set, second, second_set, definitions_, comparison);
+  phone.log().WriteLine(kLogRet,
+                        "KRAL_NV_PKV_Diff: %u items differ, %u only in the first, %u only in the second, %u same",
+                        static_cast<unsigned>(comparison.changed), static_cast<unsigned>(comparison.only_first),
+                        static_cast<unsigned>(comparison.only_second), static_cast<unsigned>(comparison.same));
+  return SaveText(page, text, NvError::kCannotOpenReport);
+}
+
+NvError NVTool_Manager::GenerateQdf(const std::string& file) {
+  return SaveText(file, QdfText(definitions_), NvError::kCannotOpenQdf);
+}
+
+}  // namespace kral::nv

@@ -1,0 +1,428 @@
+// The NV tool's sets: between handset, PKV file and source file; filters, reports, single items, what goes wrong.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <string>
+#include <vector>
+
+#include "storage/nv_compression.h"
+#include "tests/support/nv_fixture.h"
+
+namespace kral {
+namespace {
+
+using handset::Bytes;
+using handset::ByteView;
+using handset::FromHex;
+using handset::HexText;
+using handset::NvStatus;
+
+constexpr const char* kTwoBytes =
+    "<DataType><Member name='a' typeid='word8'/><Member name='b' typeid='word8'/></DataType>";
+
+class NvTool : public test::NvToolTest {
+ protected:
+  static std::string Item(int id, const char* name = "") {
+    return "<NvItem id='" + std::to_string(id) + "' name='" + name + "'>" + kTwoBytes + "</NvItem>";
+  }
+  std::string Pkv(const std::string& name = "phone.pkv") {
+    const std::string path = Path(name);
+    EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), path.c_str()), 0u) << ErrorText();
+    return path;
+  }
+  std::string Source() {
+    EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), Path("out.xml").c_str()), 0u) << ErrorText();
+    return folder_.Content("out.xml");
+  }
+  size_t CountRequests(std::string_view prefix) {
+    const auto requests = handset().requests();
+    return static_cast<size_t>(std::count_if(
+        requests.begin(), requests.end(), [&](const Bytes& request) { return HexText(request).starts_with(prefix); }));
+  }
+};
+
+// --- The handset
+// ------------------------------------------------------------------------------------------------------
+
+// Every kind of item goes to the handset and comes back, and again through both kinds of files.
+TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
+  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), test::ExampleDefinitions().c_str()), 0u);
+  handset().nv().MakeArray(3101, 4);
+  std::string zeros;
+  for (int i = 0; i < 255; ++i) zeros += "0,";
+  const struct {
+    uint16_t id;
+    uint16_t array_index;
+    std::string value;
+  } kValues[] = {{10, 0, "1,513"},        {114, 0, "-70000"},      {162, 0, "18446744073709551615"},
+                 {453, 0, "1"},           {3101, 0, "-300,-4"},    {3101, 3, "300,4"},
+                 {3200, 0, "4,10,0,0,1"}, {3201, 0, "1,9750,-12"}, {3300, 0, zeros + "7"},
+                 {20001, 0, "2,-1,2"},    {20002, 0, "-77"}};
+  for (const auto& value : kValues) {
+    ASSERT_EQ(Set(value.id, value.value.c_str(), value.array_index), 0u) << value.id << ErrorText();
+  }
+  const char* const name = "/nv/item_files/modem/mmode/operator_name";
+  ASSERT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), name, "1,75,114"), 0u);
+
+  ASSERT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
+  EXPECT_EQ(HexText(ByteView(*handset().nv().Value(10)).first(4)), "01 01 02 00");
+  EXPECT_EQ(HexText(ByteView(*handset().nv().Element(3101, 3)).first(4)), "2C 01 04 00");
+  EXPECT_EQ(HexText(*handset().efs().File(name)), "01 4B 72");
+  EXPECT_EQ(HexText(*handset().efs().File("/nv/item_files/rfnv/00020002")), "B3 FF");
+  EXPECT_EQ(nv::Decompress(*handset().nv().Value(3300), 512)->size(), 512u);
+  EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_WRITE_F NV Id:453 Status:0"));
+
+  const std::string pkv = Pkv();
+  const std::string source = Source();
+  const auto expect_values = [&](const char* from) {
+    SCOPED_TRACE(from);
+    for (const auto& value : kValues) EXPECT_EQ(Value(value.id, value.array_index), value.value) << value.id;
+    EXPECT_EQ(FileValue(name), "1,75,114");
+    EXPECT_EQ(Value(71), "error 10");
+    KRAL_NV_ClearNVValues(handle());
+  };
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u) << ErrorText();
+  EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_READ_F NV Id:453 Status:0"));
+  EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_READ_F NV Id:71 Status:5"));
+  expect_values("handset");
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u) << ErrorText();
+  expect_values("PKV file");
+  EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), Path("out.xml").c_str()), 0u) << ErrorText();
+  EXPECT_EQ(Source(), source);
+  expect_values("source file");
+}
+
+TEST_F(NvTool, ItemFilesOfTheHandsetGetGenericDefinitions) {
+  ASSERT_EQ(Load("<NvEfsItem fullpathname='/nv/item_files/conf/known' name='KNOWN'>" + std::string(kTwoBytes) +
+                 "</NvEfsItem>"),
+            0u);
+  handset().efs().AddFile("/nv/item_files/conf/known", FromHex("01 02"));
+  handset().efs().AddItemFile("/nv/item_files/conf/deep/er/item", FromHex("0A 0B 0C"));
+  handset().efs().AddItemFile("/nv/item_files/rfnv/00020005", FromHex("DD"));
+  handset().efs().AddItemFile("/nv/item_files/conf/b\x01t", FromHex("EE"));
+  handset().efs().AddItemFile("/elsewhere/item", FromHex("EE"));
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u) << ErrorText();
+  uint32_t files = 0;
+  KRAL_NV_GetNumOfNVEfsDefinition(handle(), &files);
+  EXPECT_EQ(files, 3u);
+  EXPECT_TRUE(HasLine(KRAL_LOG_RET, "Created generic definition for item file path: nv/item_files/conf/deep/er/item"));
+  EXPECT_EQ(FileValue("/nv/item_files/conf/known"), "1,2");
+  EXPECT_EQ(FileValue("nv/item_files/conf/deep/er/item"), "10,11,12");
+  EXPECT_EQ(Value(20005), "221") << "an RF NV item, read outside factory test mode";
+  // Its size may change.
+  handset().efs().AddItemFile("/nv/item_files/rfnv/00020006", FromHex("01 02 03"));
+  handset().mode().SetState(handset::ModeState::kFactoryTest);
+  uint16_t status = 9;
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 20006, &status), 0u);
+  EXPECT_EQ(Value(20006), "1,2,3");
+  EXPECT_GE(CountRequests("4B 0B 24 00 00 00 26 4E"), 1u) << "in factory test mode, by its dispatcher";
+}
+
+TEST_F(NvTool, SingleItemsTellTheHandsetsStatus) {
+  ASSERT_EQ(Load(Item(1) + Item(2) + Item(3)), 0u);
+  handset().nv().SetReadOnly(2);
+  handset().nv().SetStatus(3, NvStatus::kFailed);
+  uint16_t status = 9;
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByNVID(handle(), 1, &status), 10u);
+  for (const uint16_t id : {1, 2, 3}) ASSERT_EQ(Set(id, "7,8"), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByNVID(handle(), 1, &status), 0u);
+  EXPECT_EQ(status, 0);
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByIndex(handle(), 1, &status), 11u);
+  EXPECT_EQ(status, 7);
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 2, &status), 12u);
+  EXPECT_EQ(status, 5);
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 3, nullptr), 12u);
+  EXPECT_EQ(Value(3), "error 10") << "a value that cannot be read is not the handset's";
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByIndex(handle(), 3, &status), 8u);
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByNVID(handle(), 4, &status), 9u);
+  // Items that nobody defined.
+  handset().nv().Set(4, FromHex("2A"));
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 4, &status), 0u);
+  EXPECT_EQ(Value(4).substr(0, 5), "42,0,");
+  EXPECT_TRUE(HasLine(KRAL_LOG_RET, "NV ID 4 definition not found. Created a definition with byte array of 128"));
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 5, &status), 12u);
+  EXPECT_EQ(Value(5), "error 9");
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByEfsFilename(handle(), "/nv/none"), 22u);
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByEfsFilename(handle(), "/nv/none"), 9u);
+  handset().efs().AddItemFile("/nv/one", FromHex("05"));
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByEfsFilename(handle(), "/nv/one"), 0u);
+  EXPECT_EQ(FileValue("/nv/one"), "5");
+  handset().efs().SetTotalBlocks(0);
+  ASSERT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), "/nv/one", "6"), 0u);
+  handset().faults().Add(handset::Refuse(24), handset::When::Always().Of("4B 13 26"));
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByEfsFilename(handle(), "/nv/one"), 23u);
+}
+
+TEST_F(NvTool, SubscriptionsUseTheRequestsThatNameThem) {
+  ASSERT_EQ(Load(Item(20)), 0u);
+  handset().nv().Set(20, FromHex("01 01"), 0);
+  handset().nv().Set(20, FromHex("02 02"), 1);
+  KRAL_NV_SetTargetSupportMultiSIM(handle(), 1);
+  KRAL_NV_SetCurrentSubscriptionIndex(handle(), 1);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u);
+  EXPECT_EQ(Value(20), "2,2");
+  ASSERT_EQ(Set(20, "3,3"), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
+  EXPECT_EQ(handset().nv().Value(20, 1)->front(), 3);
+  EXPECT_EQ(handset().nv().Value(20, 0)->front(), 1);
+  EXPECT_EQ(CountRequests("27"), 0u);
+  const auto pkv = Pkv();
+  KRAL_NV_ClearNVDefinition(handle());
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u);
+  EXPECT_EQ(Value(20).substr(0, 6), "3,3,0,");
+  EXPECT_NE(Source().find("<NvItem id=\"20\" subscriptionid=\"1\" name=\"\" mapping=\"byteStream\" encoding=\"hex\" "
+                          "index=\"0\">03 03 00"),
+            std::string::npos);
+}
+
+TEST_F(NvTool, HandsetThatRefusesHalfOfTheItemsGetsTheRest) {
+  std::string items;
+  for (int id = 100; id < 120; ++id) items += Item(id);
+  ASSERT_EQ(Load(items), 0u);
+  for (uint16_t id = 100; id < 120; ++id) {
+    Set(id, "1,2");
+    if (id % 2 != 0) handset().nv().SetReadOnly(id);
+  }
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 11u);
+  for (uint16_t id = 100; id < 120; ++id) EXPECT_EQ(handset().nv().Value(id).has_value(), id % 2 == 0) << id;
+  EXPECT_EQ(CountLines(KRAL_LOG_ERR, "NV ID 101 was refused with status 7"), 1u);
+
+  for (uint16_t id = 101; id < 120; id += 2) handset().nv().SetStatus(id, NvStatus::kFailed);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 12u);
+  EXPECT_EQ(Value(118), "1,2");
+  EXPECT_EQ(Value(119), "error 10");
+  handset().faults().Add(handset::Refuse(20), handset::When::Always().Of("27"));
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 11u) << "refused as requests, too";
+}
+
+TEST_F(NvTool, LostAnswersAreAskedForAgainAndAPulledCableEndsTheSet) {
+  KRAL_ConfigureTimeOut(handle(), 0, 40);
+  KRAL_ConfigureTimeOut(handle(), 1, 40);
+  ASSERT_EQ(Load(Item(1) + Item(2) + Item(3)), 0u);
+  for (const uint16_t id : {1, 2, 3}) Set(id, "4,5");
+  handset().faults().Add(handset::Lose(), handset::When::Nth(2).Of("27"));
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
+  EXPECT_EQ(CountRequests("27"), 4u);
+  handset().faults().Add(handset::HangUp(), handset::When::Nth(2).Of("26"));
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 16u);
+  uint16_t status = 9;
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 2, &status), 16u);
+  EXPECT_EQ(status, 9);
+  EXPECT_EQ(Value(2), "4,5") << "what the handset could not be asked for stays";
+}
+
+// --- Callback
+// ---------------------------------------------------------------------------------------------------------
+
+std::vector<std::string>& Calls() {
+  static std::vector<std::string> calls;
+  return calls;
+}
+
+void KRAL_CALL OnItem(uint32_t operation, uint32_t done, uint32_t total, const char* item, uint32_t status,
+                      KRAL_HANDLE handle) {
+  Calls().push_back(std::to_string(operation) + " " + std::to_string(done) + "/" + std::to_string(total) + " " + item +
+                    " " + std::to_string(status) + (handle != 0 ? "" : " no handle"));
+}
+
+TEST_F(NvTool, CallbackTellsEveryItem) {
+  ASSERT_EQ(Load(Item(1) + Item(2) + "<NvEfsItem fullpathname='/f'>" + kTwoBytes + "</NvEfsItem>"), 0u);
+  handset().nv().Set(1, FromHex("01"));
+  handset().nv().SetStatus(2, NvStatus::kFailed);
+  EXPECT_EQ(KRAL_NV_ConfigureCallBack(handle(), OnItem), 0u);
+  Calls().clear();
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 12u);
+  EXPECT_EQ(Calls(), (std::vector<std::string>{"1 1/3 NV ID 1 0", "1 2/3 NV ID 2 12", "1 3/3 /f 10"}));
+  Calls().clear();
+  Pkv();
+  KRAL_NV_ConfigureCallBack(handle(), nullptr);
+  Source();
+  EXPECT_EQ(Calls(), (std::vector<std::string>{"4 1/1 NV ID 1 0"}));
+}
+
+// --- Source files
+// -----------------------------------------------------------------------------------------------------
+
+TEST_F(NvTool, SourceFileIsWrittenByTheLetter) {
+  ASSERT_EQ(Load(Item(1, "a &lt;b&gt; &quot;c&quot; &amp; d") + "<NvEfsItem fullpathname='/nv/x&amp;y' name='file'>" +
+                 kTwoBytes + "</NvEfsItem>"),
+            0u);
+  ASSERT_EQ(Set(1, "255,0"), 0u);
+  ASSERT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), "/nv/x&y", "1,2"), 0u);
+  ASSERT_EQ(LoadSource("<NvEfsItem fullpathname='/nv/z' name='raw' mapping='byteStream' encoding='hex' index='0'>0a0B"
+                       "</NvEfsItem><PRLItem nam='1f'>AA BB</PRLItem>"),
+            0u);
+  EXPECT_EQ(Source(),
+            "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n"
+            "<NvSource xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\" "
+            "xsi:noNamespaceSchemaLocation=\"..\\Schema\\NvSource.xsd\">\n"
+            "<NvItem id=\"1\" subscriptionid=\"0\" name=\"a &lt;b&gt; &quot;c&quot; &amp; d\" mapping=\"direct\" "
+            "encoding=\"dec\" index=\"0\">255,0</NvItem>\n"
+            "<NvEfsItem fullpathname=\"/nv/x&amp;y\" name=\"file\" mapping=\"direct\" encoding=\"dec\" index=\"0\">1,2"
+            "</NvEfsItem>\n"
+            "<NvEfsItem fullpathname=\"/nv/z\" name=\"raw\" mapping=\"byteStream\" encoding=\"hex\" index=\"0\">0A 0B"
+            "</NvEfsItem>\n"
+            "<PRLItem nam=\"1f\">AA BB</PRLItem>\n"
+            "</NvSource>\n");
+}
+
+TEST_F(NvTool, SourceItemsThatCannotBeTakenLeaveTheOthers) {
+  ASSERT_EQ(Load(Item(1) + Item(2) + Item(3)), 0u);
+  const auto item = [](const char* attributes, const char* value) {
+    return "<NvItem " + std::string(attributes) + ">" + value + "</NvItem>";
+  };
+  EXPECT_EQ(LoadSource(item("id='1' mapping='direct' encoding='dec'", "1,256") +
+                       item("id='2' mapping='direct' encoding='dec' index='1'", "1,2") +
+                       item("id='4' mapping='direct' encoding='dec'", "1") +
+                       item("id='3' mapping='byteStream' encoding='hex'", "0") +
+                       item("id='2' mapping='byteStream' encoding='hex'", "01") +
+                       item("id='3' mapping='byteStream' encoding='hex'", "01 02 00 00") +
+                       item("id='5' mapping='byteStream' encoding='hex' name='new'", "09")),
+            21u);
+  EXPECT_EQ(Value(1), "error 10");
+  EXPECT_EQ(Value(2), "error 10");
+  EXPECT_EQ(Value(3), "1,2") << "the data field may come whole";
+  EXPECT_EQ(Value(4), "error 9");
+  EXPECT_EQ(Value(5).substr(0, 4), "9,0,");
+  EXPECT_NE(ErrorText().find("NV ID 1: 256 is out of the range of b"), std::string::npos);
+
+  for (const std::string& bad :
+       {item("", "1"), item("id='1' mapping='direct' encoding='hex'", "1"), item("id='1'", "1"),
+        item("id='1' mapping='other' encoding='dec'", "1"), item("id='70000' mapping='direct' encoding='dec'", "1"),
+        item("id='1' mapping='direct' encoding='dec' index='256'", "1"), std::string("<PRLItem>AA</PRLItem>"),
+        std::string("<Nv/>"), std::string("<NvEfsItem mapping='direct' encoding='dec'>1</NvEfsItem>")}) {
+    EXPECT_EQ(LoadSource(item("id='3' mapping='direct' encoding='dec'", "9,9") + bad), 5u) << bad;
+    EXPECT_EQ(Value(3), "1,2") << bad;
+  }
+  EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), folder_.Add("x.xml", "<NvSource>").c_str()), 2u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), Path("nowhere").c_str()), 2u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), folder_.Add("x.xml", "<NvDefinition/>").c_str()), 5u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), Path("no/such/folder.xml").c_str()), 14u);
+}
+
+// --- PKV files
+// --------------------------------------------------------------------------------------------------------
+
+TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
+  handset().nv().MakeArray(30, 3);
+  ASSERT_EQ(Load("<NvItem id='30' maxIndex='2'>" + std::string(kTwoBytes) + "</NvItem>" + Item(1) +
+                 "<NvItem id='2' compressed='1'>" + kTwoBytes + "</NvItem>"),
+            0u);
+  for (const uint16_t index : {0, 2}) ASSERT_EQ(Set(30, "3,4", index), 0u);
+  ASSERT_EQ(Set(1, "1,2"), 0u);
+  ASSERT_EQ(Set(2, "1,2"), 0u);
+  const auto pkv = Pkv();
+  EXPECT_EQ(KRAL_NV_ClearNVDefinition(handle()), 0u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u);
+  EXPECT_EQ(Value(30, 2).substr(0, 6), "3,4,0,");
+  EXPECT_EQ(Value(30, 1), "error 10");
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
+  EXPECT_EQ(HexText(ByteView(*handset().nv().Element(30, 2)).first(3)), "03 04 00");
+
+  // Another definition, which the values do not satisfy.
+  ASSERT_EQ(Load(Item(30) + "<NvItem id='1' compressed='1'>" + kTwoBytes + "</NvItem>"), 13u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
+  EXPECT_EQ(Value(1), "error 10");
+  EXPECT_EQ(Value(30), "3,4");
+  EXPECT_NE(ErrorText().find("NV ID 30 with index 2 has no place"), std::string::npos);
+
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), Path("nowhere").c_str()), 7u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), folder_.Add("text", "no compound document").c_str()), 7u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), Path("no/such/folder.pkv").c_str()), 7u);
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), Path("empty.pkv").c_str()), 10u);
+}
+
+// --- Filters
+// ----------------------------------------------------------------------------------------------------------
+
+TEST_F(NvTool, FiltersAddUpAndLimitWhatMoves) {
+  ASSERT_EQ(Load(Item(1, "GSM_A") + Item(2, "LTE_A") + Item(3, "LTE_B") + Item(40, "W") +
+                 "<NvEfsItem fullpathname='/nv/gsm'>" + kTwoBytes + "</NvEfsItem>"),
+            0u);
+  for (const uint16_t id : {1, 2, 3, 40}) handset().nv().Set(id, FromHex("01 01"));
+  const auto filter = [&](const char* keys) {
+    return folder_.Add("filter.xml", "<NvFilter>" + std::string(keys) + "</NvFilter>");
+  };
+  EXPECT_EQ(KRAL_NV_LoadReadFilter(handle(), filter("<NV>2</NV>").c_str()), 0u);
+  EXPECT_TRUE(HasLine(KRAL_LOG_NV_MANAGER_DEBUG, "NV ID 2:WILL_READ"));
+  EXPECT_TRUE(HasLine(KRAL_LOG_NV_MANAGER_DEBUG, "NV ID 1:WILL_NOT_READ"));
+  EXPECT_TRUE(HasLine(KRAL_LOG_NV_MANAGER_DEBUG, "/nv/gsm:WILL_WRITE"));
+  EXPECT_EQ(KRAL_NV_LoadReadFilter(handle(), filter("<NV_RANGE>39-41, 50</NV_RANGE>"
+                                                    "<NV_NAME_SUBSTRING_LIST>GSM, gsm</NV_NAME_SUBSTRING_LIST>")
+                                                 .c_str()),
+            0u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u);
+  EXPECT_EQ(Value(1) + Value(2) + Value(40), "1,11,11,1");
+  EXPECT_EQ(Value(3), "error 10");
+  EXPECT_EQ(KRAL_NV_CreateNVFilter(handle(), Path("with.xml").c_str()), 0u);
+  EXPECT_EQ(KRAL_NV_CreateComplementNVFilter(handle(), Path("without.xml").c_str()), 0u);
+  EXPECT_NE(folder_.Content("with.xml").find("<NvFilter>\n  <NV>1</NV>\n  <NV>2</NV>\n  <NV>40</NV>\n</NvFilter>"),
+            std::string::npos);
+  EXPECT_NE(folder_.Content("without.xml").find("<NV>3</NV>\n  <NV_NAME_SUBSTRING_LIST>/nv/gsm<"), std::string::npos);
+
+  ASSERT_EQ(KRAL_NV_ClearReadFilters(handle()), 0u);
+  ASSERT_EQ(KRAL_NV_LoadReadFilter(handle(), Path("without.xml").c_str()), 0u);
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u);
+  EXPECT_EQ(Value(3), "1,1");
+  EXPECT_EQ(Value(1), "error 10");
+
+  ASSERT_EQ(Set(1, "9,9"), 0u);
+  ASSERT_EQ(Set(3, "9,9"), 0u);
+  EXPECT_EQ(KRAL_NV_LoadWriteFilter(handle(), filter("<NV>1</NV>").c_str()), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
+  EXPECT_EQ(handset().nv().Value(1)->front(), 9);
+  EXPECT_EQ(handset().nv().Value(3)->front(), 1);
+  EXPECT_EQ(Source().find("id=\"3\""), std::string::npos);
+  EXPECT_EQ(KRAL_NV_ClearWriteFilters(handle()), 0u);
+  EXPECT_NE(Source().find("id=\"3\""), std::string::npos);
+
+  for (const char* bad : {"", "<NV>x</NV>", "<NV>65536</NV>", "<NV_RANGE>5-4</NV_RANGE>", "<NV_RANGE>5-</NV_RANGE>",
+                          "<NV_OTHER>1</NV_OTHER>", "<NV_RANGE>1-2-3</NV_RANGE>"}) {
+    EXPECT_EQ(KRAL_NV_LoadReadFilter(handle(), filter(bad).c_str()), 19u) << bad;
+  }
+  EXPECT_EQ(KRAL_NV_LoadWriteFilter(handle(), Path("nowhere").c_str()), 19u);
+  EXPECT_EQ(KRAL_NV_CreateNVFilter(handle(), Path("no/such/folder").c_str()), 19u);
+}
+
+// --- Reports
+// ----------------------------------------------------------------------------------------------------------
+
+TEST_F(NvTool, ComparisonShowsWhatDiffers) {
+  ASSERT_EQ(Load(Item(1, "SAME") + Item(2, "A&amp;B") + Item(3, "LEFT") + Item(4, "RIGHT")), 0u);
+  for (const uint16_t id : {1, 2, 3}) Set(id, "1,2");
+  const auto first = Pkv("first & only.pkv");
+  KRAL_NV_ClearNVValueByNVID(handle(), 3);
+  Set(2, "1,77");
+  Set(4, "5,6");
+  const auto second = Pkv("second.pkv");
+  const auto page = Path("page.html");
+  ASSERT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), second.c_str(), page.c_str()), 0u);
+  const auto html = folder_.Content("page.html");
+  for (const char* part : {
+           "1 items differ, 1 are only in the first, 1 only in the second, 1 are the same.",
+           "first &amp; only.pkv",
+           "<tr class=\"changed\"><td>2</td><td>A&amp;B</td><td>0</td><td>0</td><td class=\"value\">1, 2</td>"
+           "<td class=\"value\">1, 77</td><td>b: 2 to 77</td></tr>",
+           "<tr class=\"first\"><td>3</td><td>LEFT</td>",
+           "<tr class=\"second\"><td>4</td><td>RIGHT</td>",
+       }) {
+    EXPECT_NE(html.find(part), std::string::npos) << part << "\n" << html;
+  }
+  EXPECT_LT(html.find("<td>2</td>"), html.find("<td>1</td>")) << "differences first";
+  EXPECT_EQ(html.find("http"), std::string::npos) << "it needs nothing else";
+  EXPECT_EQ(Value(2), "1,77");
+  EXPECT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), Path("nowhere").c_str(), page.c_str()), 7u);
+  EXPECT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), second.c_str(), Path("no/page.html").c_str()), 17u);
+
+  ASSERT_EQ(KRAL_NV_GenerateQDF(handle(), Path("list.qdf").c_str()), 0u);
+  EXPECT_EQ(folder_.Content("list.qdf"),
+            "NV ID 1\tSAME\t0\t0\t1,2\nNV ID 2\tA&B\t0\t0\t1,77\nNV ID 4\tRIGHT\t0\t0\t5,6\n");
+  EXPECT_EQ(KRAL_NV_GenerateQDF(handle(), Path("no/list").c_str()), 15u);
+}
+
+}  // namespace
+}  // namespace kral
