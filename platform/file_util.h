@@ -15,6 +15,26 @@ namespace kral {
 // Reads a file of at most `limit` bytes; a longer one is std::errc::file_too_large, and nothing of it is given.
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes);
 
+// A file read from its front to its end, as long as it may be. Others may read it meanwhile; on Windows nobody may
+// write it.
+class FileReader {
+ public:
+  FileReader();
+  ~FileReader();
+  FileReader(const FileReader&) = delete;
+  FileReader& operator=(const FileReader&) = delete;
+
+  std::error_code Open(const std::string& path);  // ordinary files only
+  void Close();
+  // The next bytes; fewer than there is room for only at the end of the file.
+  std::error_code Read(std::span<uint8_t> buffer, size_t& count);
+  uint64_t size() const;  // when it was opened
+
+ private:
+  struct State;
+  std::unique_ptr<State> state_;
+};
+
 // A file being written under a temporary name beside its target. Until Commit the target stays as it was; without a
 // Commit the destructor removes what was written. After a failed Write every later step fails.
 class AtomicFile {

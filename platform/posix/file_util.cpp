@@ -2,6 +2,7 @@
 #include "platform/file_util.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -40,6 +41,46 @@ std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector
     bytes = std::move(content);
     return {};
   }
+}
+
+struct FileReader::State {
+  FileDescriptor file;
+  uint64_t size = 0;
+};
+
+FileReader::FileReader() : state_(std::make_unique<State>()) {}
+FileReader::~FileReader() = default;
+
+std::error_code FileReader::Open(const std::string& path) {
+  Close();
+  // Without waiting: the opening of a pipe would last until somebody writes into it.
+  FileDescriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  struct stat status {};
+  if (!file.valid() || ::fstat(file.get(), &status) != 0) return LastError();
+  if (!S_ISREG(status.st_mode)) return std::make_error_code(std::errc::invalid_argument);
+  state_->file = std::move(file);
+  state_->size = static_cast<uint64_t>(status.st_size);
+  return {};
+}
+
+void FileReader::Close() {
+  *state_ = State();
+}
+
+std::error_code FileReader::Read(std::span<uint8_t> buffer, size_t& count) {
+  count = 0;
+  while (count < buffer.size()) {
+    const ssize_t received = ::read(state_->file.get(), buffer.data() + count, buffer.size() - count);
+    if (received < 0 && errno == EINTR) continue;
+    if (received < 0) return LastError();
+    if (received == 0) break;
+    count += static_cast<size_t>(received);
+  }
+  return {};
+}
+
+uint64_t FileReader::size() const {
+  return state_->size;
 }
 
 struct AtomicFile::State {

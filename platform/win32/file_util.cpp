@@ -13,7 +13,7 @@ namespace {
 
 constexpr size_t kPieceSize = 65536;
 constexpr int kNameAttempts = 64;
-constexpr size_t kLargestWrite = 1u << 24;
+constexpr size_t kLargestPiece = 1u << 24;
 
 std::error_code LastError() {
   switch (::GetLastError()) {
@@ -60,6 +60,48 @@ std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector
   }
 }
 
+struct FileReader::State {
+  WinHandle file;
+  uint64_t size = 0;
+};
+
+FileReader::FileReader() : state_(std::make_unique<State>()) {}
+FileReader::~FileReader() = default;
+
+std::error_code FileReader::Open(const std::string& path) {
+  Close();
+  WinHandle file(::CreateFileA(path.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
+                               FILE_ATTRIBUTE_NORMAL, nullptr));
+  if (!file.valid()) return LastError();
+  LARGE_INTEGER size{};
+  if (::GetFileType(file.get()) != FILE_TYPE_DISK || !::GetFileSizeEx(file.get(), &size)) {
+    return std::make_error_code(std::errc::invalid_argument);
+  }
+  state_->file = std::move(file);
+  state_->size = static_cast<uint64_t>(size.QuadPart);
+  return {};
+}
+
+void FileReader::Close() {
+  *state_ = State();
+}
+
+std::error_code FileReader::Read(std::span<uint8_t> buffer, size_t& count) {
+  count = 0;
+  while (count < buffer.size()) {
+    DWORD received = 0;
+    const auto piece = static_cast<DWORD>(std::min(buffer.size() - count, kLargestPiece));
+    if (!::ReadFile(state_->file.get(), buffer.data() + count, piece, &received, nullptr)) return LastError();
+    if (received == 0) break;
+    count += received;
+  }
+  return {};
+}
+
+uint64_t FileReader::size() const {
+  return state_->size;
+}
+
 struct AtomicFile::State {
   WinHandle file;
   std::string path;
@@ -94,7 +136,7 @@ std::error_code AtomicFile::Write(std::span<const uint8_t> bytes) {
   State& state = *state_;
   if (!state.file.valid()) return std::make_error_code(std::errc::bad_file_descriptor);
   while (!state.failed && !bytes.empty()) {
-    const auto piece = static_cast<DWORD>(std::min(bytes.size(), kLargestWrite));
+    const auto piece = static_cast<DWORD>(std::min(bytes.size(), kLargestPiece));
     DWORD written = 0;
     if (!::WriteFile(state.file.get(), bytes.data(), piece, &written, nullptr)) {
       state.failed = LastError();

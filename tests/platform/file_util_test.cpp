@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <filesystem>
 #include <string>
 #include <vector>
@@ -40,6 +41,24 @@ TEST(ReadWholeFileTest, GivesFilesUpToTheLimitAndNothingOfLongerOnes) {
     EXPECT_EQ(error, c.read ? std::error_code() : std::make_error_code(std::errc::file_too_large));
     EXPECT_EQ(bytes, Of(c.read ? c.content : "kept"));
   }
+}
+
+TEST(FileReaderTest, ReadsOrdinaryFilesToTheirEndAndOpensNothingElse) {
+  const test::TempFolder folder;
+  FileReader reader;
+  EXPECT_TRUE(reader.Open(folder.Path("missing")));
+  EXPECT_TRUE(reader.Open(folder.Path("")));
+  ASSERT_FALSE(reader.Open(folder.Add("file", "a\r\n\x1A z")));
+  EXPECT_EQ(reader.size(), 6u);
+  std::array<uint8_t, 4> buffer{};
+  size_t count = 0;
+  for (const size_t expected : {4, 2, 0}) {
+    EXPECT_FALSE(reader.Read(buffer, count));
+    EXPECT_EQ(count, expected);
+  }
+  reader.Close();
+  EXPECT_TRUE(reader.Read(buffer, count));
+  EXPECT_EQ(count, 0u);
 }
 
 TEST(ReadWholeFileTest, AMissingFileIsNoSuchFile) {
