@@ -52,6 +52,13 @@ class Diag_FTM {
   bool IsDiagServiceAlive();
   // Direct mode: reopens a closed port.
   bool IsPortOpen();
+  // For a protocol that has the bytes of the port for itself: ends the connection and opens its port, or binds the
+  // caller's functions, without a receive thread; what the device has sent already is kept. No request opens the
+  // connection until the port is given back or somebody connects again. Null when it does not open, with the reason
+  // in the port's open_result(), and where there is none: server mode, null port.
+  CSerialPort* BorrowPort();
+  void GiveBackPort();  // closes it; the next request opens the connection
+  bool port_borrowed() const { return port_borrowed_; }
   // Closes the port for good, once a running request has ended: its context is being released, and a request of
   // another thread that still holds the object must not open the port again.
   void Retire();
@@ -115,6 +122,7 @@ class Diag_FTM {
 
   FtmSettings& ftm() { return ftm_; }
   const FtmSettings& ftm() const { return ftm_; }
+  KivratSettings& kivrat() { return kivrat_; }
   EfsSettings& efs() { return efs_; }
   NvBatch& nv_batch() { return nv_batch_; }
   PkvSettings& pkv() { return pkv_; }
@@ -148,6 +156,7 @@ class Diag_FTM {
   std::unique_ptr<CKralEvents, StopDispatching> dispatching_;  // null in server mode
   std::array<CDiagPacket, 3> packets_;
   FtmSettings ftm_;
+  KivratSettings kivrat_;
   EfsSettings efs_;
   NvBatch nv_batch_;
   PkvSettings pkv_;
@@ -157,6 +166,7 @@ class Diag_FTM {
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
   bool retired_ = false;
+  bool port_borrowed_ = false;
 
   // Read and set without the request lock.
   std::array<std::atomic<uint32_t>, kTimeOutCount> time_outs_{};

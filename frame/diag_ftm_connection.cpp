@@ -23,11 +23,12 @@ constexpr uint32_t kStateAliveWithoutAnswer = 4;
 
 bool Diag_FTM::OpenPort(const OpenArguments& arguments) {
   last_open_ = arguments;
+  GiveBackPort();
   return Open(arguments);
 }
 
 bool Diag_FTM::Open(const OpenArguments& arguments) {
-  if (retired_) return false;
+  if (retired_ || port_borrowed_) return false;
   if (server_mode()) {
     OpenThroughServer();
   } else {
@@ -64,7 +65,29 @@ bool Diag_FTM::IsPortOpen() {
   return connected_;
 }
 
+CSerialPort* Diag_FTM::BorrowPort() {
+  if (server_mode() || retired_ || port_ == kNullPort) return nullptr;
+  CSerialPort& port = transport().port();
+  if (port_borrowed_ && port.IsOpen() != 0) return &port;
+  connected_ = false;
+  if (!transport().StopThread()) return nullptr;
+  transport().SetOpenFlags(false, true);
+  const UserTransport& user = last_open_.user;
+  const bool opened = user.send != nullptr ? port.SetUserDefinedTransport(user.context, user.handle, user.send,
+                                                                          user.receive, user.flush) == 1
+                                           : port.Open(port_) == 1;
+  port_borrowed_ = opened;
+  return opened ? &port : nullptr;
+}
+
+void Diag_FTM::GiveBackPort() {
+  if (!port_borrowed_) return;
+  port_borrowed_ = false;
+  transport().port().Close();
+}
+
 bool Diag_FTM::ClosePort() {
+  GiveBackPort();
   if (server_mode()) {
     UnregisterFromServer();
   } else {

@@ -27,6 +27,15 @@ struct FtmSettings {
   FtmSequencer* sequencer = nullptr;  // not owned; none: every request goes out at once
 };
 
+// Of the boot transfer. Set from any thread; what has begun goes on with the former values.
+struct KivratSettings {
+  std::atomic<uint32_t> hello_retries{0};
+  std::atomic<uint32_t> retry_delay_ms{500};
+  std::atomic<uint32_t> pre_done_delay_ms{0};
+  uint32_t read_time_out_ms = 5000;  // these two are shorter in tests only
+  uint32_t settle_ms = 500;
+};
+
 // Set from any thread, also while a transfer runs.
 struct EfsSettings {
   std::atomic<uint16_t> read_packet_size{536};

@@ -83,7 +83,7 @@ class HandsetPorts {
   class Device final : public SerialDevice {
    public:
     Device(std::shared_ptr<State> state, std::shared_ptr<handset::VirtualHandset> handset, uint16_t port)
-        : state_(std::move(state)), handset_(std::move(handset)), port_(port) {}
+        : state_(std::move(state)), handset_(std::move(handset)), appearance_(handset_->appearances()), port_(port) {}
     ~Device() override {
       const std::lock_guard lock(state_->mutex);
       state_->open.erase(port_);
@@ -92,7 +92,7 @@ class HandsetPorts {
     size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override { return handset_->ToHost(buffer); }
     size_t InputWaiting() override { return 0; }
-    bool gone() const override { return handset_->vanished(); }
+    bool gone() const override { return handset_->vanished() || handset_->appearances() != appearance_; }
     bool WaitReadable(uint32_t milliseconds) override { return handset_->WaitForOutput(milliseconds); }
     void Wake() override { handset_->Wake(); }
     DeviceResult SetBaudRate(uint32_t) override { return {}; }
@@ -105,6 +105,7 @@ class HandsetPorts {
    private:
     const std::shared_ptr<State> state_;
     const std::shared_ptr<handset::VirtualHandset> handset_;
+    const uint32_t appearance_;
     const uint16_t port_;
   };
 
