@@ -48,6 +48,7 @@ std::string PtyCable::device_path() const {
 }
 
 bool PtyCable::Plug(std::string& error) {
+  appearance_ = handset_.appearances();
   auto terminal = OpenPseudoTerminal(error);
   if (!terminal) return false;
   if (!link_.empty()) {
@@ -96,7 +97,7 @@ void PtyCable::Serve() {
       handset_.FromHost(std::span(chunk).first(count));
       Write();
     }
-    if (handset_.vanished()) {
+    if (handset_.vanished() || handset_.appearances() != appearance_) {
       chunk_begin_ = chunk_end_ = 0;
       return Unplug();
     }

@@ -40,6 +40,7 @@ class PtyCable {
   const std::string link_;
   mutable std::mutex mutex_;  // of the terminal's pointer, against wakes from other threads
   std::unique_ptr<PseudoTerminal> terminal_;
+  uint32_t appearance_ = 0;  // of the handset that has the terminal
   Bytes chunk_;  // its bytes from chunk_begin_ to chunk_end_ are taken from the handset, not yet by the terminal
   size_t chunk_begin_ = 0;
   size_t chunk_end_ = 0;

@@ -20,6 +20,11 @@ class VirtualHandset::HandsetWire final : public Wire {
   void Enter(std::shared_ptr<WireMode> mode) override { handset_.next_mode_ = std::move(mode); }
   void Restart(uint32_t silent_ms) override { handset_.RestartLocked(silent_ms); }
   void HangUp() override { handset_.HangUp(); }
+  void Reappear(std::shared_ptr<WireMode> mode, uint32_t linger_ms, uint32_t away_ms) override {
+    const uint32_t leave_tick = handset_.clock_.TickMs() + linger_ms;
+    handset_.journey_ = Journey{std::move(mode), leave_tick, leave_tick + away_ms};
+    handset_.travelling_ = true;
+  }
   Clock& clock() override { return handset_.clock_; }
 
  private:
@@ -50,6 +55,7 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
 VirtualHandset::~VirtualHandset() = default;
 
 bool VirtualHandset::FromHost(ByteView bytes) {
+  Travel();
   const std::lock_guard lock(mutex_);
   if (vanished_) return false;
   if (keep_trace_) received_.insert(received_.end(), bytes.begin(), bytes.end());
@@ -63,6 +69,7 @@ bool VirtualHandset::FromHost(ByteView bytes) {
 }
 
 size_t VirtualHandset::ToHost(std::span<uint8_t> buffer) {
+  Travel();
   return vanished_ ? 0 : line_.Take(buffer);
 }
 
@@ -73,17 +80,49 @@ void VirtualHandset::HangUp() {
 
 void VirtualHandset::PlugIn() {
   const std::lock_guard lock(mutex_);
-  decoder_.Reset();
-  mode_ = nullptr;
+  PlugInLocked(start_mode_);
+}
+
+void VirtualHandset::PlugInLocked(std::shared_ptr<WireMode> mode) {
+  journey_.reset();
+  travelling_ = false;
+  if (vanished_) ++appearances_;
   vanished_ = false;
   line_.Clear();
+  next_mode_ = std::move(mode);
+  SwitchModeLocked();
 }
 
 void VirtualHandset::Restart() {
-  PlugIn();
   const std::lock_guard lock(mutex_);
-  RestartLocked(0);
-  SwitchModeLocked();
+  for (const auto& service : services_) service->OnReset();
+  PlugInLocked(start_mode_);
+}
+
+bool VirtualHandset::vanished() {
+  Travel();
+  return vanished_;
+}
+
+// Nothing here has a thread of its own: the way is gone when somebody looks at the port.
+void VirtualHandset::Travel() {
+  if (!travelling_) return;
+  const std::lock_guard lock(mutex_);
+  if (!journey_) return;
+  const auto is_due = [now = clock_.TickMs()](uint32_t tick) { return static_cast<int32_t>(now - tick) >= 0; };
+  if (!journey_->left && is_due(journey_->leave_tick)) {
+    journey_->left = true;
+    HangUp();
+  }
+  if (journey_->left && is_due(journey_->return_tick)) PlugInLocked(journey_->mode);
+}
+
+uint32_t VirtualHandset::MillisecondsToOutput() const {
+  const uint32_t next = line_.MillisecondsToNext();
+  const std::lock_guard lock(mutex_);
+  if (!journey_ || journey_->left) return next;
+  const uint32_t to_leaving = journey_->leave_tick - clock_.TickMs();
+  return static_cast<int32_t>(to_leaving) <= 0 ? 0 : std::min(next, to_leaving);
 }
 
 void VirtualHandset::On(uint8_t code, Length length, Handler handler) {
@@ -105,6 +144,11 @@ void VirtualHandset::EnterMode(std::shared_ptr<WireMode> mode) {
   const std::lock_guard lock(mutex_);
   next_mode_ = std::move(mode);
   SwitchModeLocked();
+}
+
+void VirtualHandset::SetStartMode(std::shared_ptr<WireMode> mode) {
+  const std::lock_guard lock(mutex_);
+  start_mode_ = std::move(mode);
 }
 
 void VirtualHandset::SendPacket(ByteView payload) {
@@ -204,7 +248,7 @@ bool VirtualHandset::SwitchModeLocked() {
 
 void VirtualHandset::RestartLocked(uint32_t silent_ms) {
   for (const auto& service : services_) service->OnReset();
-  next_mode_ = silent_ms == 0 ? nullptr : std::make_shared<SilentMode>(clock_.TickMs() + silent_ms);
+  next_mode_ = silent_ms == 0 || start_mode_ ? start_mode_ : std::make_shared<SilentMode>(clock_.TickMs() + silent_ms);
 }
 
 void VirtualHandset::EmitLocked(ByteView bytes, bool framed, uint32_t delay_ms) {

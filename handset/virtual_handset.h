@@ -48,15 +48,17 @@ class VirtualHandset {
   bool FromHost(ByteView bytes);             // false when the device has vanished
   size_t ToHost(std::span<uint8_t> buffer);  // what is due, whole frames unless told to split; never waits
   bool WaitForOutput(uint32_t milliseconds) { return line_.Wait(milliseconds); }
-  void Wake() { line_.Wake(); }         // ends a wait
-  void DropOutput() { line_.Clear(); }  // what the host purges
-  uint32_t MillisecondsToOutput() const { return line_.MillisecondsToNext(); }
+  void Wake() { line_.Wake(); }           // ends a wait
+  void DropOutput() { line_.Clear(); }    // what the host purges
+  uint32_t MillisecondsToOutput() const;  // or to leaving the port
   // Called whenever output was added and when the device comes or goes; it must not call back.
   void SetOutputListener(std::function<void()> listener) { line_.SetListener(std::move(listener)); }
 
   void HangUp();  // unplugged: bytes of both directions are lost
-  void PlugIn();  // back on the port, in diagnostic mode, with its state as it was
-  bool vanished() const { return vanished_; }
+  void PlugIn();  // back on the port, in the mode it starts in, with its state as it was
+  bool vanished();
+  // How often it has come to a port: what is plugged in again is another device to the host.
+  uint32_t appearances() const { return appearances_; }
   void Restart();  // power off and on; plugged in
 
   // --- Behaviour --------------------------------------------------------------------------------------------------
@@ -65,6 +67,8 @@ class VirtualHandset {
   void AddService(std::shared_ptr<Service> service);
   // Null is the diagnostic mode.
   void EnterMode(std::shared_ptr<WireMode> mode);
+  // What has the line after PlugIn and after a restart; null at first.
+  void SetStartMode(std::shared_ptr<WireMode> mode);
 
   void SendPacket(ByteView payload);  // unsolicited, framed; of the faults it knows bit errors only
   void SendUnframed(ByteView bytes);  // the same as the bytes stand
@@ -97,6 +101,16 @@ class VirtualHandset {
  private:
   class HandsetWire;
 
+  // A way off the port and back to it.
+  struct Journey {
+    std::shared_ptr<WireMode> mode;
+    uint32_t leave_tick = 0;
+    uint32_t return_tick = 0;
+    bool left = false;
+  };
+
+  void Travel();
+  void PlugInLocked(std::shared_ptr<WireMode> mode);
   void OnRequestLocked(ByteView request);
   size_t ReadDiagnosticLocked(ByteView bytes);
   bool SwitchModeLocked();
@@ -109,6 +123,8 @@ class VirtualHandset {
   FaultPlan faults_;
   Script script_;
   std::atomic<bool> vanished_ = false;
+  std::atomic<uint32_t> appearances_ = 1;
+  std::atomic<bool> travelling_ = false;
 
   mutable std::mutex mutex_;  // of everything below, held while handlers and wire modes run
   mutable std::condition_variable heard_;
@@ -117,6 +133,8 @@ class VirtualHandset {
   FrameDecoder decoder_;
   std::unique_ptr<HandsetWire> wire_;
   std::shared_ptr<WireMode> mode_;  // null: diagnostic
+  std::shared_ptr<WireMode> start_mode_;
+  std::optional<Journey> journey_;
   std::optional<std::shared_ptr<WireMode>> next_mode_;
   std::optional<Strike> strike_;  // of the request being answered
   std::vector<Bytes> requests_;

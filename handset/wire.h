@@ -25,6 +25,9 @@ class Wire {
   virtual void Restart(uint32_t silent_ms) = 0;
   // The device leaves the host's port, until the handset is plugged in again.
   virtual void HangUp() = 0;
+  // The device stays for `linger_ms`, leaves the port, and comes back after `away_ms` as another device would, with
+  // `mode` on the line; null is the diagnostic mode.
+  virtual void Reappear(std::shared_ptr<WireMode> mode, uint32_t linger_ms, uint32_t away_ms) = 0;
 
   virtual Clock& clock() = 0;
 };
