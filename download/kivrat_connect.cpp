@@ -1,0 +1,123 @@
+// The hello exchange of the boot transfer, with the reading of the chip identity.
+#include <algorithm>
+#include <array>
+
+#include "download/kivrat.h"
+#include "download/kivrat_packet.h"
+
+namespace kral::kivrat {
+namespace {
+
+using Hello = std::array<uint8_t, kHelloSize>;
+
+class Greeter {
+ public:
+  Greeter(Diag_FTM& phone, const Stop& stop) : phone_(phone), port_(phone) {
+    port_.SetReadTimeOut(phone.kivrat().read_time_out_ms);
+    port_.SetStop(stop);
+  }
+
+  bool Connect(uint32_t& version, std::optional<uint32_t>* identity) {
+    Hello hello{};
+    if (!AwaitFirstHello(hello)) return false;
+    const uint32_t told_version = Field(hello, kVersionAt);
+    std::optional<uint32_t> told_identity;
+    bool in_command_mode = false;
+    if (identity != nullptr) {
+      if (!ReadIdentity(hello, told_identity)) return false;
+      // Nothing to read ends the exchange where it is, without the way back to image transfer: required.
+      in_command_mode = !told_identity;
+      if (!in_command_mode && !(SwitchToImageTransfer() && ReadHello(hello) == Heard::kHello)) return false;
+    }
+    if (!in_command_mode && !Respond(hello, Field(hello, kModeAt))) return false;
+    version = told_version;
+    if (identity != nullptr) *identity = told_identity;
+    port_.Keep();
+    return true;
+  }
+
+ private:
+  enum class Heard { kHello, kNothing, kOther };
+
+  bool Fail(const char* text) {
+    phone_.log().WriteLine(kLogErr, "%s", text);
+    return false;
+  }
+  bool ReadWhole(std::span<uint8_t> packet) {
+    return port_.Read(packet) == packet.size() || Fail("Failed to read the Port buffer\n");
+  }
+
+  // Silence, and a port that is not there (yet), are all that the retries are for.
+  bool AwaitFirstHello(Hello& hello) {
+    for (uint32_t retries = phone_.kivrat().hello_retries;; --retries) {
+      const Heard heard = port_.Open() ? ReadHello(hello) : Heard::kNothing;
+      if (heard == Heard::kHello) return true;
+      if (!phone_.port_borrowed()) Fail("Failed KivratInit()");
+      if (heard == Heard::kOther || retries == 0 || port_.stopped()) return false;
+      port_.GiveBack();
+      port_.Pause(phone_.kivrat().retry_delay_ms);
+    }
+  }
+
+  Heard ReadHello(Hello& hello) {
+    if (!ReadWhole(hello)) return Heard::kNothing;
+    if (!IsPacket(hello, kHello)) {
+      Fail("The packet recieved from the device is not a HELLO_REQ");
+      return Heard::kOther;
+    }
+    phone_.log().WriteLine(kLogRet, "Kivrat Hello recieved from the device\n");
+    return Heard::kHello;
+  }
+
+  // The hello comes back as it was, but for command, status and mode.
+  bool Respond(Hello hello, uint32_t mode) {
+    StoreLe<uint32_t>(hello, kCommandAt, kHelloResponse);
+    StoreLe<uint32_t>(hello, kStatusAt, 0);
+    StoreLe<uint32_t>(hello, kModeAt, mode);
+    if (!port_.Write(hello)) return Fail("Failed to write to the KIVRAT_HELLO_RSP from the host to the Device");
+    phone_.log().WriteLine(kLogRet, "Kivrat Hello Response sent to the device\n");
+    return true;
+  }
+
+  bool ReadIdentity(const Hello& hello, std::optional<uint32_t>& identity) {
+    if (!Respond(hello, kModeCommand)) return false;
+    std::array<uint8_t, kHeaderSize> ready{};
+    if (!ReadWhole(ready) || !IsPacket(ready, kCommandReady)) return Fail("The command mode is not ready \r \n");
+
+    if (!WritePacket(port_, kExecute, kReadChipIdentity)) return Fail("Failed to write the Kivrat command execute");
+    phone_.log().WriteLine(kLogRet, "Kivrat command execute sent to the device\n");
+    std::array<uint8_t, kExecuteResponseSize> response{};
+    if (!ReadWhole(response)) return false;
+    if (!IsPacket(response, kExecuteResponse)) {
+      return Fail("The packet received from the device is not an execute response");
+    }
+    const size_t length = Field(response, kDataLengthAt);
+    if (length == 0) return true;
+
+    if (!WritePacket(port_, kExecuteData, kReadChipIdentity)) return Fail("Failed to write the Kivrat execute data");
+    std::array<uint8_t, kMostIdentityData> data{};
+    const auto read = std::span(data).first(port_.Read(std::span(data).first(std::min(length, data.size()))));
+    identity = LoadLe<uint32_t>(read, kIdentityAt);
+    if (!identity) return Fail("Failed to read the Port buffer\n");
+    phone_.log().WriteLine(kLogRet, "BXC ID read from PBL: %d \r \n", static_cast<int>(*identity));
+    if (length > data.size()) port_.Purge();  // or the rest would stand in front of the hello
+    return true;
+  }
+
+  bool SwitchToImageTransfer() {
+    if (!WritePacket(port_, kSwitchMode, kModeImageTransfer)) return Fail("Failed to write the Kivrat switch mode");
+    phone_.log().WriteLine(kLogRet, "Kivrat swtich mode sent to the device\n");
+    return true;
+  }
+
+  Diag_FTM& phone_;
+  RawPort port_;
+};
+
+}  // namespace
+
+bool Connect(Diag_FTM& phone, uint32_t& version, std::optional<uint32_t>* identity, const Stop& stop) {
+  return Greeter(phone, stop).Connect(version, identity);
+}
+
+}  // namespace kral::kivrat

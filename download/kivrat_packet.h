@@ -1,0 +1,38 @@
+// Reading and writing of boot transfer packets, shared by the hello exchange and the image transfer.
+#ifndef KRAL_DOWNLOAD_KIVRAT_PACKET_H
+#define KRAL_DOWNLOAD_KIVRAT_PACKET_H
+
+#include <array>
+#include <span>
+
+#include "download/kivrat_format.h"
+#include "download/raw_port.h"
+#include "frame/base/little_endian.h"
+
+namespace kral::kivrat {
+
+// A field of a packet; one that the packet does not hold reads as 0.
+inline uint32_t Field(std::span<const uint8_t> packet, size_t offset) {
+  return LoadLe<uint32_t>(packet, offset).value_or(0);
+}
+
+// True for a whole packet of that kind, its length field included.
+inline bool IsPacket(std::span<const uint8_t> packet, uint32_t command) {
+  return Field(packet, kCommandAt) == command && Field(packet, kLengthAt) == packet.size();
+}
+
+// A packet of so many fields behind its header.
+template <class... Fields>
+bool WritePacket(RawPort& port, uint32_t command, Fields... fields) {
+  constexpr size_t kSize = kHeaderSize + 4 * sizeof...(fields);
+  std::array<uint8_t, kSize> packet{};
+  StoreLe<uint32_t>(packet, kCommandAt, command);
+  StoreLe<uint32_t>(packet, kLengthAt, kSize);
+  size_t offset = kHeaderSize;
+  ((StoreLe<uint32_t>(packet, offset, fields), offset += 4), ...);
+  return port.Write(packet);
+}
+
+}  // namespace kral::kivrat
+
+#endif

@@ -1,0 +1,146 @@
+// The image transfer of the boot transfer: the file goes out as the target asks for it, then the target is told that
+// all is done.
+#include <algorithm>
+#include <vector>
+
+#include "download/kivrat.h"
+#include "download/kivrat_packet.h"
+#include "platform/file_util.h"
+
+namespace kral::kivrat {
+namespace {
+
+constexpr const char* kAborted = "Kivrat: the transfer was aborted";
+
+class Server {
+ public:
+  Server(Diag_FTM& phone, const Progress& progress, const Stop& stop)
+      : phone_(phone), progress_(progress), port_(phone), packet_(kPacketBuffer), piece_(kPacketBuffer) {
+    port_.SetReadTimeOut(phone.kivrat().read_time_out_ms);
+    port_.SetStop(stop);
+  }
+
+  bool Run(const std::string& file_name) {
+    if (!phone_.port_borrowed() || !port_.Open()) return Fail("Failed KivratInit()");
+    if (const auto error = file_.Open(file_name)) {
+      phone_.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
+                             error.message().c_str());
+      port_.Keep();
+      return false;
+    }
+    if (!ServeRequests()) return false;
+    file_.Close();
+    return Finish();
+  }
+
+ private:
+  bool Fail(const char* text) {
+    phone_.log().WriteLine(kLogErr, "%s", text);
+    return false;
+  }
+
+  void LogLength(uint32_t length) { phone_.log().WriteLine(kLogErr, "Kivrat: a packet of %u bytes", length); }
+
+  bool ServeRequests() {
+    for (;;) {
+      std::span<const uint8_t> packet;
+      if (!ReadPacket(packet)) return Fail("Failed to read the command from the opened port \r \n");
+      const uint32_t command = Field(packet, kCommandAt);
+      if (command == kEndOfTransfer) {
+        phone_.log().WriteLine(kLogRet, "Kivrat: the target ends the transfer, status %u", Field(packet, kEndStatusAt));
+        return true;
+      }
+      if (command != kReadData) {
+        phone_.log().WriteLine(kLogErr, "Recieved %d instead of KIVRAT_END_TRANSFER (command -> %d) \r\n",
+                               static_cast<int>(command), static_cast<int>(kEndOfTransfer));
+        return false;
+      }
+      if (!Serve(packet)) return false;
+    }
+  }
+
+  // Header first, then as much as it tells.
+  bool ReadPacket(std::span<const uint8_t>& packet) {
+    const auto header = std::span(packet_).first(kHeaderSize);
+    if (port_.Read(header) != header.size()) return false;
+    const size_t length = Field(header, kLengthAt);
+    if (length < kHeaderSize || length > packet_.size()) {
+      LogLength(Field(header, kLengthAt));
+      return false;
+    }
+    const auto rest = std::span(packet_).subspan(kHeaderSize, length - kHeaderSize);
+    packet = std::span(packet_).first(length);
+    return port_.Read(rest) == rest.size();
+  }
+
+  // The next bytes of the file, whatever offset the target names: it asks for consecutive pieces, and those that do
+  // not are served in order all the same.
+  bool Serve(std::span<const uint8_t> request) {
+    const size_t length = Field(request, kReadLengthAt);
+    if (request.size() < kReadDataSize || length == 0 || length > piece_.size()) {
+      phone_.log().WriteLine(kLogErr, "Kivrat: a request for %u bytes", Field(request, kReadLengthAt));
+      return false;
+    }
+    size_t count = 0;
+    const auto error = file_.Read(std::span(piece_).first(length), count);
+    if (error || count == 0) {
+      phone_.log().WriteLine(kLogErr, "Kivrat: the file has no more than %llu bytes, %u are asked for at %u",
+                             static_cast<unsigned long long>(served_), Field(request, kReadLengthAt),
+                             Field(request, kReadOffsetAt));
+      return false;
+    }
+    if (!port_.Write(std::span(piece_).first(count))) {
+      return Fail("Failed to send the command from the host to the device \r \n");
+    }
+    served_ += count;
+    if (!progress_ || progress_(served_, std::max(served_, file_.size()))) return true;
+    return Fail(kAborted);
+  }
+
+  bool Finish() {
+    if (const uint32_t delay = phone_.kivrat().pre_done_delay_ms) {
+      phone_.log().WriteLine(kLogRet, "Waiting %d ms before Kivrat Done", static_cast<int>(delay));
+      port_.Pause(delay);
+      if (port_.stopped()) return Fail(kAborted);
+    }
+    if (!WritePacket(port_, kDone)) {
+      phone_.log().WriteLine(kLogErr, "Failed to send the KIVRAT_DONE_REQ (command -> %d) as expected \r\n",
+                             static_cast<int>(kDone));
+      return false;
+    }
+    const auto response = std::span(packet_).first(kDoneResponseSize);
+    if (port_.Read(response) != response.size()) {
+      return Fail("Failed to recieve the KIVRAT_DONE_RSP as expected \r\n");
+    }
+    if (Field(response, kCommandAt) != kDoneResponse) {
+      phone_.log().WriteLine(kLogErr, "Recieved %d instead of KIVRAT_DONE_RSP (command -> %d) \r\n",
+                             static_cast<int>(Field(response, kCommandAt)), static_cast<int>(kDoneResponse));
+      return false;
+    }
+    if (!IsPacket(response, kDoneResponse)) {
+      LogLength(Field(response, kLengthAt));
+      return false;
+    }
+    phone_.log().WriteLine(kLogRet, "Kivrat: image transfer status %u", Field(response, kDoneStatusAt));
+    phone_.log().WriteLine(kLogRet, "Flash programmer successfully downloaded using Kivrat Protocol!\n");
+    phone_.clock().SleepMs(phone_.kivrat().settle_ms);
+    return true;
+  }
+
+  Diag_FTM& phone_;
+  const Progress& progress_;
+  RawPort port_;
+  FileReader file_;
+  uint64_t served_ = 0;
+  std::vector<uint8_t> packet_;
+  std::vector<uint8_t> piece_;
+};
+
+}  // namespace
+
+bool DownloadFlashProgrammer(Diag_FTM& phone, const std::string& file_name, const Progress& progress,
+                             const Stop& stop) {
+  return Server(phone, progress, stop).Run(file_name);
+}
+
+}  // namespace kral::kivrat

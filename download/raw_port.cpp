@@ -1,0 +1,93 @@
+// Raw bytes to and from the port. What they mean is the protocol's affair, who may open the port the phone object's.
+#include "download/raw_port.h"
+
+#include <algorithm>
+
+#include "frame/base/hex_dump.h"
+
+namespace kral {
+namespace {
+
+// What a driver's queue holds: each such piece has the time that any write has, so that a slow line can take a packet
+// of many of them.
+constexpr size_t kDevicePiece = 4096;
+constexpr uint32_t kLookAroundMs = 50;
+constexpr size_t kLongestDump = 64;  // the bytes of images are left out of the log
+
+}  // namespace
+
+RawPort::~RawPort() {
+  if (!keep_) GiveBack();
+}
+
+bool RawPort::Open() {
+  port_ = phone_.BorrowPort();
+  return port_ != nullptr;
+}
+
+void RawPort::GiveBack() {
+  // Rests of an exchange would only confuse whoever has the port next.
+  Purge();
+  phone_.GiveBackPort();
+  port_ = nullptr;
+}
+
+bool RawPort::Write(std::span<const uint8_t> packet) {
+  if (port_ == nullptr) return false;
+  LogTraffic("SEND", packet);
+  // Transports of a caller may keep writes apart, as packets are.
+  const size_t most = port_->user_defined() ? packet.size() : kDevicePiece;
+  while (!packet.empty()) {
+    const size_t piece = std::min(packet.size(), most);
+    const uint32_t sent = port_->Send(packet.data(), static_cast<uint32_t>(piece));
+    if (sent == 0) return false;
+    packet = packet.subspan(std::min<size_t>(sent, piece));
+  }
+  return true;
+}
+
+size_t RawPort::Read(std::span<uint8_t> buffer) {
+  if (port_ == nullptr) return 0;
+  Clock& clock = phone_.clock();
+  const uint32_t start = clock.TickMs();
+  size_t count = 0;
+  bool promised = false;
+  while (count < buffer.size()) {
+    const auto room = static_cast<uint32_t>(buffer.size() - count);
+    const uint32_t received = std::min(port_->Receive(buffer.data() + count, room), room);
+    count += received;
+    const uint32_t passed = clock.TickMs() - start;
+    if (count == buffer.size() || passed >= read_time_out_ms_ || stopped()) break;
+    if (port_->gone()) {
+      phone_.log().WriteLine(kLogErr, "RawPort: the device has gone");
+      break;
+    }
+    // Nothing was there in spite of a promise, or nobody can promise anything.
+    if (received == 0 && (promised || !port_->CanWait())) clock.SleepMs(1);
+    promised = port_->CanWait() && port_->WaitReadable(std::min(read_time_out_ms_ - passed, kLookAroundMs));
+  }
+  LogTraffic("REC", buffer.first(count));
+  return count;
+}
+
+void RawPort::Purge() {
+  if (port_ != nullptr) port_->FlushPCBuffer();
+}
+
+void RawPort::Pause(uint32_t milliseconds) {
+  while (milliseconds > 0 && !stopped()) {
+    const uint32_t piece = std::min(milliseconds, kLookAroundMs);
+    phone_.clock().SleepMs(piece);
+    milliseconds -= piece;
+  }
+}
+
+void RawPort::LogTraffic(const char* direction, std::span<const uint8_t> bytes) {
+  DataLogFileHandler& log = phone_.log();
+  if (!log.Wants(kLogIo)) return;
+  log.WriteLine(kLogIo, "RAW %s (%d bytes): %s%s", direction, static_cast<int>(bytes.size()),
+                HexDump(bytes.first(std::min(bytes.size(), kLongestDump))).c_str(),
+                bytes.size() > kLongestDump ? "..." : "");
+}
+
+}  // namespace kral

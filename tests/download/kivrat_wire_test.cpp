@@ -1,0 +1,355 @@
+// The boot transfer byte by byte: what goes over the port, what the log says, and what is made of every wrong answer.
+#include "download/kivrat.h"
+
+#include <gtest/gtest.h>
+
+#include "frame/resource_manager.h"
+#include "handset/bytes.h"
+#include "kral/connection.h"
+#include "tests/support/phone_log.h"
+#include "tests/support/temp_folder.h"
+#include "tests/support/test_wire.h"
+
+namespace kral {
+namespace {
+
+using handset::FromHex;
+using handset::HexText;
+using test::Bytes;
+
+using Texts = std::vector<std::string>;
+
+// Hello of version 2: longest command 1,024, mode image transfer, six reserved words.
+const std::string kHello =
+    "01 00 00 00 30 00 00 00 02 00 00 00 01 00 00 00 00 04 00 00 00 00 00 00 "
+    "A1 00 00 00 A2 00 00 00 A3 00 00 00 A4 00 00 00 A5 00 00 00 A6 00 00 00";
+const std::string kReady = "0B 00 00 00 08 00 00 00";
+const std::string kEnd = "04 00 00 00 10 00 00 00 0D 00 00 00 00 00 00 00";
+const std::string kDone = "05 00 00 00 08 00 00 00";
+const std::string kDoneResponse = "06 00 00 00 0C 00 00 00 00 00 00 00";
+
+std::string HelloResponse(const std::string& mode) {
+  return "02 00 00 00 30 00 00 00 02 00 00 00 01 00 00 00 00 00 00 00 " + mode +
+         " 00 00 00 A1 00 00 00 A2 00 00 00 A3 00 00 00 A4 00 00 00 A5 00 00 00 A6 00 00 00";
+}
+const std::string kCommandResponse = HelloResponse("03");
+const std::string kImageResponse = HelloResponse("00");
+const std::string kExecute = "0D 00 00 00 0C 00 00 00 02 00 00 00";
+const std::string kExecuteData = "0F 00 00 00 0C 00 00 00 02 00 00 00";
+const std::string kSwitch = "0C 00 00 00 0C 00 00 00 00 00 00 00";
+std::string ExecuteResponse(const std::string& length) {
+  return "0E 00 00 00 10 00 00 00 02 00 00 00 " + length + " 00 00 00";
+}
+const std::string kIdentity = "11 11 11 11 E1 40 81 00 33 33 33 33 44 44 44 44 55 55 55 55 66 66 66 66";
+
+std::string ReadRequest(uint32_t offset, uint32_t length) {
+  return HexText(handset::ByteWriter().U32(3).U32(20).U32(13).U32(offset).U32(length).Take());
+}
+
+class KivratWire : public testing::Test {
+ protected:
+  void SetUp() override {
+    const UserTransport user = wire_.AsUserTransport();
+    handle_ =
+        KRAL_ConnectServer_UserDefinedTransport(1, user.handle, user.context, user.send, user.receive, user.flush);
+    phone_ = Kral_ResourceManager::GetPhone(handle_);
+    phone_->kivrat().read_time_out_ms = 20;
+    phone_->kivrat().settle_ms = 0;
+    log_ = std::make_unique<test::PhoneLog>(handle_, KRAL_LOG_ERR | KRAL_LOG_RET);
+  }
+  void TearDown() override {
+    log_.reset();
+    phone_.reset();
+    KRAL_DisconnectServer(handle_);
+  }
+
+  // The target says the first text, and each of the others for one write of the host. Empty: nothing.
+  void Target(const Texts& says, bool byte_by_byte = false) {
+    ASSERT_TRUE(phone_->BorrowPort());
+    log_->Take();
+    written_before_ = wire_.Written().size();
+    says_.assign(says.begin(), says.end());
+    const auto say_next = [this, byte_by_byte](const Bytes&) {
+      if (says_.empty()) return Bytes();
+      const Bytes bytes = FromHex(says_.front());
+      says_.pop_front();
+      if (!byte_by_byte) return bytes;
+      for (const uint8_t byte : bytes) wire_.ToHost({byte});
+      return Bytes();
+    };
+    wire_.ToHost(say_next({}));
+    wire_.OnWrite(say_next);
+  }
+
+  Texts Written() const {
+    Texts texts;
+    const auto all = wire_.Written();
+    for (size_t i = written_before_; i < all.size(); ++i) texts.push_back(HexText(all[i]));
+    return texts;
+  }
+
+  // Lines of one flag, without it.
+  Texts Lines(const std::string& flag) {
+    Texts texts;
+    for (const std::string& line : log_->lines()) {
+      if (line.starts_with(flag + " ")) texts.push_back(line.substr(flag.size() + 1));
+    }
+    return texts;
+  }
+  bool HasError(const std::string& text) { return log_->Has("16 " + text); }
+
+  test::TestWire wire_;
+  KRAL_HANDLE handle_ = 0;
+  std::shared_ptr<Diag_FTM> phone_;
+  std::unique_ptr<test::PhoneLog> log_;
+  std::deque<std::string> says_;
+  size_t written_before_ = 0;
+  test::TempFolder folder_;
+};
+
+TEST_F(KivratWire, ConnectReadsTheIdentityAndEntersImageTransfer) {
+  for (const bool byte_by_byte : {false, true}) {
+    Target({kHello, kReady, ExecuteResponse("18"), kIdentity, kHello}, byte_by_byte);
+    uint32_t version = 0;
+    std::optional<uint32_t> identity;
+    EXPECT_TRUE(kivrat::Connect(*phone_, version, &identity));
+    EXPECT_EQ(version, 2u);
+    EXPECT_EQ(identity, 0x008140E1u);
+    EXPECT_EQ(Written(), (Texts{kCommandResponse, kExecute, kExecuteData, kSwitch, kImageResponse}));
+    EXPECT_EQ(Lines("4"),
+              (Texts{"Kivrat Hello recieved from the device\n", "Kivrat Hello Response sent to the device\n",
+                     "Kivrat command execute sent to the device\n", "BXC ID read from PBL: 8470753 \r \n",
+                     "Kivrat swtich mode sent to the device\n", "Kivrat Hello recieved from the device\n",
+                     "Kivrat Hello Response sent to the device\n"}));
+    EXPECT_TRUE(phone_->port_borrowed()) << "the target will ask for its image";
+  }
+}
+
+TEST_F(KivratWire, ConnectWithoutAnIdentityOnlyAnswersTheHello) {
+  std::string hello = kHello;
+  hello.replace(20 * 3, 2, "02");  // whatever mode the target is in comes back
+  Target({hello});
+  uint32_t version = 0;
+  EXPECT_TRUE(kivrat::Connect(*phone_, version, nullptr));
+  EXPECT_EQ(Written(), Texts{HelloResponse("02")});
+}
+
+TEST_F(KivratWire, IdentityWithoutDataEndsTheConnectWithSuccess) {
+  Target({kHello, kReady, ExecuteResponse("00")});
+  uint32_t version = 0;
+  std::optional<uint32_t> identity = 1;
+  EXPECT_TRUE(kivrat::Connect(*phone_, version, &identity));
+  EXPECT_EQ(version, 2u);
+  EXPECT_EQ(identity, std::nullopt);
+  EXPECT_EQ(Written(), (Texts{kCommandResponse, kExecute}));
+}
+
+TEST_F(KivratWire, IdentityNeedsItsSecondWordOnly) {
+  struct Row {
+    const char* told;
+    std::string sent;
+    bool known;
+  };
+  for (const Row& row : {Row{"08", kIdentity.substr(0, 8 * 3), true}, Row{"18", kIdentity.substr(0, 8 * 3), true},
+                         Row{"30", kIdentity + "77 77 77 77", true}, Row{"07", kIdentity.substr(0, 7 * 3), false}}) {
+    Target({kHello, kReady, ExecuteResponse(row.told), row.sent, kHello});
+    uint32_t version = 0;
+    std::optional<uint32_t> identity;
+    EXPECT_EQ(kivrat::Connect(*phone_, version, &identity), row.known) << row.told;
+    EXPECT_EQ(identity.value_or(0), row.known ? 0x008140E1u : 0u);
+  }
+}
+
+TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheConnect) {
+  const std::string read_failed = "Failed to read the Port buffer\n";
+  const std::string no_hello = "The packet recieved from the device is not a HELLO_REQ";
+  std::string long_hello = kHello;
+  long_hello.replace(4 * 3, 2, "31");
+  struct Row {
+    const char* name;
+    Texts says;
+    std::string line;
+  };
+  for (const Row& row : {
+           Row{"silence", {""}, read_failed},
+           Row{"half a hello", {kHello.substr(0, 40 * 3)}, read_failed},
+           Row{"another command", {"07" + kHello.substr(2)}, no_hello},
+           Row{"a hello of another length", {long_hello}, no_hello},
+           Row{"silence behind the response", {kHello}, "The command mode is not ready \r \n"},
+           Row{"not ready", {kHello, "0A" + kReady.substr(2)}, "The command mode is not ready \r \n"},
+           Row{"silence behind the command", {kHello, kReady}, read_failed},
+           Row{"another answer to the command",
+               {kHello, kReady, "0D" + ExecuteResponse("18").substr(2)},
+               "The packet received from the device is not an execute response"},
+           Row{"no identity", {kHello, kReady, ExecuteResponse("18")}, read_failed},
+           Row{"no second hello", {kHello, kReady, ExecuteResponse("18"), kIdentity}, read_failed},
+           Row{"another second hello",
+               {kHello, kReady, ExecuteResponse("18"), kIdentity, "02" + kHello.substr(2)},
+               no_hello},
+       }) {
+    SCOPED_TRACE(row.name);
+    Target(row.says);
+    uint32_t version = 77;
+    std::optional<uint32_t> identity;
+    EXPECT_FALSE(kivrat::Connect(*phone_, version, &identity));
+    EXPECT_EQ(version, 77u);
+    EXPECT_TRUE(HasError(row.line));
+    EXPECT_LE(Written().size(), row.says.size()) << "nothing is sent again";
+    EXPECT_FALSE(phone_->port_borrowed());
+  }
+}
+
+TEST_F(KivratWire, FailedWritesAreToldOfTheirPacket) {
+  Target({kHello});
+  wire_.FailWrites(true);
+  uint32_t version = 0;
+  EXPECT_FALSE(kivrat::Connect(*phone_, version, nullptr));
+  EXPECT_TRUE(HasError("Failed to write to the KIVRAT_HELLO_RSP from the host to the Device"));
+  Target({ReadRequest(0, 4)});
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+  EXPECT_TRUE(HasError("Failed to send the command from the host to the device \r \n"));
+  Target({kEnd});
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+  EXPECT_TRUE(HasError("Failed to send the KIVRAT_DONE_REQ (command -> 5) as expected \r\n"));
+}
+
+TEST_F(KivratWire, HelloRetriesWaitForATargetThatIsLate) {
+  ASSERT_TRUE(phone_->BorrowPort());
+  phone_->kivrat().hello_retries = 3;
+  phone_->kivrat().retry_delay_ms = 1;
+  uint32_t version = 0;
+  EXPECT_FALSE(kivrat::Connect(*phone_, version, nullptr));
+  EXPECT_EQ(Lines("16"), Texts(4, "Failed to read the Port buffer\n"));
+  // The target is there at the third look at the port; a caller gives up at the first.
+  Target({""});
+  int looks = 0;
+  const kivrat::Stop arrive = [&] {
+    if (++looks == 40) wire_.ToHost(FromHex(kHello));
+    return false;
+  };
+  EXPECT_TRUE(kivrat::Connect(*phone_, version, nullptr, arrive));
+  EXPECT_FALSE(kivrat::Connect(*phone_, version, nullptr, [] { return true; }));
+  EXPECT_EQ(Lines("16").back(), "Failed to read the Port buffer\n");
+}
+
+TEST_F(KivratWire, ProgrammerIsServedInOrderWhateverTheOffsets) {
+  const std::string file = folder_.Add("programmer", "0123456789");
+  phone_->kivrat().pre_done_delay_ms = 1;
+  for (const bool byte_by_byte : {false, true}) {
+    // Offsets 0, 100, 2; the last request goes beyond the end of the file, which gives what it has.
+    Target({ReadRequest(0, 4), ReadRequest(100, 3), ReadRequest(2, 131072), kEnd, kDoneResponse}, byte_by_byte);
+    std::vector<std::pair<uint64_t, uint64_t>> progress;
+    EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, file, [&](uint64_t done, uint64_t total) {
+      progress.emplace_back(done, total);
+      return true;
+    }));
+    EXPECT_EQ(Written(), (Texts{"30 31 32 33", "34 35 36", "37 38 39", kDone}));
+    EXPECT_EQ(progress, (std::vector<std::pair<uint64_t, uint64_t>>{{4, 10}, {7, 10}, {10, 10}}));
+    EXPECT_TRUE(log_->Has("4 Waiting 1 ms before Kivrat Done"));
+    EXPECT_TRUE(log_->Has("4 Flash programmer successfully downloaded using Kivrat Protocol!\n"));
+    EXPECT_EQ(Lines("16"), Texts());
+    EXPECT_FALSE(phone_->port_borrowed());
+  }
+}
+
+TEST_F(KivratWire, PacketsMayBeLongerThanTheirFieldsUpToTheBuffer) {
+  Bytes request = FromHex(ReadRequest(0, 4));
+  request.resize(128 << 10, 0xEE);
+  request[4] = 0;
+  request[6] = 2;
+  Target({"", kEnd, kDoneResponse});
+  wire_.ToHost(request);
+  EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+  EXPECT_EQ(Written(), (Texts{"61 62 63 64", kDone}));
+}
+
+TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheTransfer) {
+  const std::string read_failed = "Failed to read the command from the opened port \r \n";
+  const auto header = [](uint32_t command, uint32_t length) {
+    return HexText(handset::ByteWriter().U32(command).U32(length).Take());
+  };
+  struct Row {
+    const char* name;
+    Texts says;
+    std::string line;
+    size_t written;
+  };
+  for (const Row& row : {
+           Row{"silence", {""}, read_failed, 0},
+           Row{"half a header", {"03 00 00 00"}, read_failed, 0},
+           Row{"a packet cut short", {ReadRequest(0, 4).substr(0, 19 * 3)}, read_failed, 0},
+           Row{"a length below the header", {header(4, 7)}, read_failed, 0},
+           Row{"a length over the buffer", {header(4, 131073)}, read_failed, 0},
+           Row{"a length of all ones", {header(3, 0xFFFFFFFF)}, read_failed, 0},
+           Row{"a request without its fields", {header(3, 8)}, "Kivrat: a request for 0 bytes", 0},
+           Row{"a request for nothing", {ReadRequest(0, 0)}, "Kivrat: a request for 0 bytes", 0},
+           Row{"a request over the buffer", {ReadRequest(0, 131073)}, "Kivrat: a request for 131073 bytes", 0},
+           Row{"a request behind the end",
+               {ReadRequest(0, 6), ReadRequest(6, 1)},
+               "Kivrat: the file has no more than 6 bytes, 1 are asked for at 6",
+               1},
+           Row{"another command",
+               {ReadRequest(0, 2), header(7, 8)},
+               "Recieved 7 instead of KIVRAT_END_TRANSFER (command -> 4) \r\n",
+               1},
+           Row{"silence behind done", {kEnd}, "Failed to recieve the KIVRAT_DONE_RSP as expected \r\n", 1},
+           Row{"another answer to done",
+               {kEnd, "05" + kDoneResponse.substr(2)},
+               "Recieved 5 instead of KIVRAT_DONE_RSP (command -> 6) \r\n",
+               1},
+           Row{"a done response of another length",
+               {kEnd, "06 00 00 00 0D 00 00 00 00 00 00 00"},
+               "Kivrat: a packet of 13 bytes",
+               1},
+       }) {
+    SCOPED_TRACE(row.name);
+    Target(row.says);
+    EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+    EXPECT_TRUE(HasError(row.line));
+    EXPECT_EQ(Written().size(), row.written);
+    EXPECT_FALSE(phone_->port_borrowed());
+  }
+}
+
+TEST_F(KivratWire, TransferNeedsAConnectAndAFile) {
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abc")));
+  EXPECT_TRUE(HasError("Failed KivratInit()"));
+  Target({""});
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("missing")));
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("")));
+  EXPECT_EQ(Lines("16").size(), 2u);
+  // Nothing has happened: the right name may follow.
+  wire_.ToHost(FromHex(ReadRequest(0, 3)));
+  says_ = {kEnd, kDoneResponse};
+  EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("file")));
+}
+
+TEST_F(KivratWire, CallerEndsTheTransferBetweenTwoPieces) {
+  Target({ReadRequest(0, 2), ReadRequest(2, 2)});
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef"),
+                                               [](uint64_t done, uint64_t) { return done < 4; }));
+  EXPECT_TRUE(HasError("Kivrat: the transfer was aborted"));
+  EXPECT_EQ(Written(), (Texts{"61 62", "63 64"}));
+}
+
+TEST(KivratPort, DevicesAreGivenPiecesThatTheirDriversHold) {
+  test::TestWire wire;
+  Diag_FTM phone(7, SystemClock(), wire.AsDevice());
+  const test::TempFolder folder;
+  const std::string data(10000, 'x');
+  ASSERT_TRUE(phone.BorrowPort());
+  phone.kivrat().read_time_out_ms = 20;
+  wire.ToHost(FromHex(ReadRequest(0, 131072)));
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(phone, folder.Add("file", data)));
+  std::vector<size_t> sizes;
+  for (const Bytes& piece : wire.Written()) sizes.push_back(piece.size());
+  EXPECT_EQ(sizes, (std::vector<size_t>{4096, 4096, 1808}));
+  // A device that goes ends the waiting at once.
+  phone.kivrat().read_time_out_ms = 60000;
+  ASSERT_TRUE(phone.BorrowPort());
+  wire.Vanish(true);
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(phone, folder.Path("file")));
+}
+
+}  // namespace
+}  // namespace kral
