@@ -54,13 +54,17 @@ class Greeter {
       if (heard == Heard::kHello) return true;
       if (!phone_.port_borrowed()) Fail("Failed KivratInit()");
       if (heard == Heard::kOther || retries == 0 || port_.stopped()) return false;
-      port_.GiveBack();
+      if (port_.gone()) port_.GiveBack();  // it may come back as another device
       port_.Pause(phone_.kivrat().retry_delay_ms);
     }
   }
 
   Heard ReadHello(Hello& hello) {
-    if (!ReadWhole(hello)) return Heard::kNothing;
+    const size_t count = port_.Read(hello);
+    if (count != hello.size()) {
+      Fail("Failed to read the Port buffer\n");
+      return count == 0 ? Heard::kNothing : Heard::kOther;
+    }
     if (!IsPacket(hello, kHello)) {
       Fail("The packet recieved from the device is not a HELLO_REQ");
       return Heard::kOther;

@@ -26,6 +26,8 @@ class RawPort {
   void Keep() { keep_ = true; }
 
   void SetReadTimeOut(uint32_t milliseconds) { read_time_out_ms_ = milliseconds; }
+  bool gone() const { return port_ != nullptr && port_->gone(); }
+
   // Waits are given up as soon as this is true.
   void SetStop(std::function<bool()> stop) { stop_ = std::move(stop); }
   bool stopped() const { return stop_ && stop_(); }
