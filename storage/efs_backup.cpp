@@ -10,10 +10,10 @@ namespace kral {
 namespace {
 
 std::vector<uint8_t> EntryRecord(const PkvEfsFile& file) {
-  std::vector<uint8_t> record(pkv::kEntryPath);
+  std::vector<uint8_t> record(pkv::kEntryPath + file.path.size());
   StoreLe<uint32_t>(record, 0, file.mode);
   StoreLe<uint32_t>(record, pkv::kEntrySize, static_cast<uint32_t>(file.bytes.size()));
-  record.insert(record.end(), file.path.begin(), file.path.end());
+  std::copy(file.path.begin(), file.path.end(), record.begin() + pkv::kEntryPath);
   return record;
 }
 
