@@ -50,8 +50,9 @@ inline constexpr size_t kLongestRequest = 256;      // with a path
 inline constexpr size_t kLongestGetRequest = 1039;  // of an item file
 inline constexpr size_t kGetRequestOverhead = 15;   // beside the path's characters
 inline constexpr size_t kLongestItemPath = kLongestGetRequest - kGetRequestOverhead;
-inline constexpr size_t kReadOverhead = 20;   // of a read reply, beside the data
-inline constexpr size_t kWriteOverhead = 12;  // of a write request
+inline constexpr size_t kLongestReply = 4091;  // the de-framer drops longer ones
+inline constexpr size_t kReadOverhead = 20;    // of a read reply, beside the data
+inline constexpr size_t kWriteOverhead = 12;   // of a write request
 inline constexpr int kTries = 5;
 
 // --- Request values -------------------------------------------------------------------------------------------------

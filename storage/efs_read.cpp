@@ -49,11 +49,12 @@ std::optional<std::span<const u8>> ReadChunk(Diag_FTM& phone, u32 descriptor, u3
 // False also when the transfer was aborted, and when the file turned out shorter than the handset told.
 bool ReadChunks(Diag_FTM& phone, u32 descriptor, u32 total, const Sink& sink) {
   const u16 packet_size = phone.efs().read_packet_size;
-  if (packet_size <= kReadOverhead) {
+  const u32 wanted = packet_size - std::min<u32>(packet_size, kReadOverhead);
+  // A larger size works for files that do not fill a packet.
+  if (wanted == 0 || kReadOverhead + std::min(wanted, total) > kLongestReply) {
     phone.log().WriteLine(kLogErr, "EFS Read packet size %d cannot be used", packet_size);
     return false;
   }
-  const u32 wanted = packet_size - static_cast<u32>(kReadOverhead);
   u32 offset = 0;
   for (bool full = true; full;) {
     if (phone.efs().abort) return false;

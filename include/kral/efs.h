@@ -120,7 +120,8 @@ typedef void(KRAL_CALL* KRAL_EFS_DIRECTORY_CALLBACK)(const KRAL_EFS_ENTRY* entry
  * Sets the packet sizes of file transfers. Nothing is tested here: a size that leaves no room for data, or a packet
  * that is larger than the library can send, fails the transfer.
  *
- * @param read_size   bytes of one answer, of which 20 are not data; 536 at first, at most 4,094
+ * @param read_size   bytes of one answer, of which 20 are not data; 536 at first, at most 4,091; a larger one
+ *                    works only for files that do not fill such an answer
  * @param write_size  bytes of one request, of which 12 are not data; 524 at first, at most 6,143
  * @return 1
  */

@@ -105,20 +105,20 @@ TEST_F(EfsTransfer, EverySizeArrivesWhole) {
 }
 
 TEST_F(EfsTransfer, PacketSizesAreTheCallers) {
-  const Bytes data = RandomBytes(3000);
+  const Bytes data = RandomBytes(5000);
   EXPECT_EQ(KRAL_SetEfsReadAndWritePacketSize(handle(), 1024, 1024), 1);
-  EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 3000, "/f"), 1);
+  EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 5000, "/f"), 1);
   EXPECT_EQ(RequestsOf(5)[0].size(), 8u + 1012u);
-  Bytes back(3000);
+  Bytes back(5000);
   EXPECT_EQ(ReadMem("/f", back), 1);
   EXPECT_EQ(RequestsOf(4)[0], ByteWriter().U32(0).U32(1004).U32(0).Take());
 
-  for (const auto& [read_size, write_size] : {std::pair<uint16_t, uint16_t>{4094, 6143}, {21, 13}}) {
+  for (const auto& [read_size, write_size] : {std::pair<uint16_t, uint16_t>{4091, 6143}, {21, 13}}) {
     KRAL_SetEfsReadAndWritePacketSize(handle(), read_size, write_size);
-    const uint32_t size = write_size > 1000 ? 3000 : 40;
+    const uint32_t size = write_size > 1000 ? 5000 : 40;
     EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), size, "/f"), 1);
     EXPECT_EQ(handset().efs().File("/f"), Bytes(data.begin(), data.begin() + size));
-    back.assign(3000, 0);
+    back.assign(5000, 0);
     EXPECT_EQ(ReadMem("/f", back), 1);
     EXPECT_EQ(back, Bytes(data.begin(), data.begin() + size));
   }
@@ -132,11 +132,15 @@ TEST_F(EfsTransfer, PacketSizesWithoutRoomFailTheTransfer) {
     EXPECT_FALSE(handset().efs().Exists("/f")) << "nothing is left of it";
   }
   handset().efs().AddFile("/f", Bytes{1});
-  for (const uint16_t size : {0, 20}) {
+  handset().efs().AddFile("/large", Bytes(4072));
+  const std::pair<uint16_t, const char*> unusable[] = {{0, "/f"}, {20, "/f"}, {4092, "/large"}, {65535, "/large"}};
+  for (const auto& [size, path] : unusable) {
     KRAL_SetEfsReadAndWritePacketSize(handle(), size, 524);
-    Bytes back(10);
-    EXPECT_EQ(ReadMem("/f", back), 0) << size;
+    Bytes back(5000);
+    EXPECT_EQ(ReadMem(path, back), 0) << size;
   }
+  Bytes back(10);
+  EXPECT_EQ(ReadMem("/f", back), 1) << "the answer is short enough";
 }
 
 TEST_F(EfsTransfer, ItemFilesAreFetchedWithOneRequestAndReplacedByFiles) {

@@ -21,7 +21,7 @@ constexpr std::uint32_t kLargestCat = 64u << 20;
 constexpr std::uint32_t kDefaultSyncMs = 10000;
 constexpr std::uint32_t kLongestSyncMs = 3600 * 1000;
 constexpr std::uint16_t kSmallestPacket = 21;
-constexpr std::uint16_t kLargestPacket = 4094;
+constexpr std::uint16_t kLargestPacket = 4091;
 
 struct FsOptions {
   std::vector<std::string> paths;
