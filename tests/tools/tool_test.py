@@ -264,6 +264,106 @@ class Requests(ToolTest):
                 self.assertEqual(self.expect(0, "-p", "7", "mode", "get", ports=ports).out, f"{mode}\n")
 
 
+class Traffic(ToolTest):
+    RATES = ("--logs", "2000", "--events", "200", "--messages", "200", "--burst", "5")
+
+    def stream(self, *words, ports=None):
+        """The NDJSON objects of a verb, the result last."""
+        objects = [json.loads(line) for line in self.expect(0, *words, "--json", ports=ports).out.splitlines()]
+        self.assertTrue(objects[-1]["ok"])
+        return objects
+
+    def test_logs_are_switched_captured_played_and_counted(self):
+        with handset(*self.RATES) as sim, tempfile.TemporaryDirectory() as folder:
+            ports = {7: sim.device}
+            file, names = os.path.join(folder, "capture"), os.path.join(folder, "names")
+            with open(names, "w", encoding="ascii") as table:
+                table.write("# logs\n0x1001 Paging\n")
+            self.expect(0, "-p", "7", "log", "on", "0x1001", "0x4001-0x4003", "--category", "5", ports=ports)
+            rows = self.expect_json(0, "-p", "7", "log", "list", "--names", names, ports=ports)["equipment_ids"]
+            self.assertEqual({row["equipment_id"]: row["on"] for row in rows}[1], [{"code": 4097, "name": "Paging"}])
+            self.assertEqual([code["code"] for row in rows for code in row["on"]], [0x1001, 0x4001, 0x4002, 0x4003])
+            done = self.expect_json(0, "-p", "7", "log", "capture", file, "--count", "300", ports=ports)
+            self.assertGreaterEqual(done["packets"], 300)
+            self.assertEqual(done["lost"], 0)
+            played = self.stream("log", "play", file)
+            self.assertEqual(len(played) - 1, done["packets"])
+            kinds = {packet["what"] for packet in played[:-1]}
+            self.assertLessEqual(kinds, {"log 0x1001", "log 0x4001", "log 0x4002", "log 0x4003", "message 5"})
+            self.assertTrue(all(len(packet["bytes"].split()) > 2 for packet in played[:-1]))
+            rows = self.expect_json(0, "log", "stats", file, "--names", names)["rows"]
+            self.assertEqual(sum(row["packets"] for row in rows), done["packets"])
+            self.assertIn("Paging", [row.get("name") for row in rows])
+            self.assertIn("Paging", self.expect(0, "log", "stats", file, "--names", names).out)
+            live = self.expect_json(0, "-p", "7", "log", "stats", "--count", "100", ports=ports)
+            self.assertGreaterEqual(live["counters"]["collected"], 100)
+            self.assertGreater(live["rows"][0]["per_second"], 0)
+            self.expect(0, "-p", "7", "log", "off", "--all", "--category", "5", ports=ports)
+            rows = self.expect_json(0, "-p", "7", "log", "list", ports=ports)["equipment_ids"]
+            self.assertEqual([code for row in rows for code in row["on"]], [])
+            with open(file, "r+b") as capture:
+                capture.truncate(os.path.getsize(file) - 1)
+            cut = self.stream("log", "play", file)
+            self.assertEqual((len(cut) - 1, cut[-1]["cut"]), (done["packets"] - 1, True))
+
+    def test_events_are_shown_as_they_come_and_from_a_file(self):
+        with handset(*self.RATES) as sim, tempfile.TemporaryDirectory() as folder:
+            ports = {7: sim.device}
+            file, names = os.path.join(folder, "capture"), os.path.join(folder, "names")
+            with open(names, "w", encoding="ascii") as table:
+                table.write("291,Band change\n")
+            shown = self.stream("-p", "7", "event", "tail", "--on", "291", "7", "--names", names, "--count", "20",
+                                ports=ports)
+            self.assertEqual({(event["id"], event["name"]) for event in shown[:-1]}, {(291, "Band change"), (7, "")})
+            self.assertEqual(len(shown), 21)
+            self.expect(0, "-p", "7", "log", "capture", file, "--count", "20", ports=ports)
+            self.assertGreaterEqual(self.stream("event", "tail", "--file", file)[-1]["events"], 160)
+            self.expect(0, "-p", "7", "event", "off", "291", ports=ports)
+            shown = self.stream("-p", "7", "event", "tail", "--count", "20", ports=ports)
+            self.assertEqual({event["id"] for event in shown[:-1]}, {7})
+            self.expect(0, "-p", "7", "event", "off", "--all", ports=ports)
+            self.assertEqual(len(self.stream("-p", "7", "event", "tail", "--seconds", "0.2", ports=ports)), 1)
+
+    def capturing(self, device, file):
+        """The tool, with packets in the file already."""
+        tool = start("-p", "7", "--json", "log", "capture", file, "--on", "0x1001", ports={7: device})
+        deadline = time.monotonic() + PATIENCE
+        while time.monotonic() < deadline and not (os.path.exists(file) and os.path.getsize(file) > 1000):
+            time.sleep(0.01)
+        return tool
+
+    def test_interrupt_is_the_ordinary_end_of_a_capture(self):
+        with handset(*self.RATES) as sim, tempfile.TemporaryDirectory() as folder:
+            file = os.path.join(folder, "capture")
+            tool = self.capturing(sim.device, file)
+            tool.send_signal(signal.SIGINT)
+            out, err = tool.communicate(timeout=PATIENCE)
+            self.assertEqual(tool.returncode, 0, err)
+            self.assertEqual(len(self.stream("log", "play", file)) - 1, json.loads(out)["packets"])
+
+    def test_handset_that_vanishes_ends_a_capture(self):
+        with handset(*self.RATES) as sim, tempfile.TemporaryDirectory() as folder:
+            file = os.path.join(folder, "capture")
+            tool = self.capturing(sim.device, file)
+            sim.kill()
+            _, err = tool.communicate(timeout=PATIENCE)
+            self.assertEqual(tool.returncode, 9, err)
+            self.assertGreater(len(self.stream("log", "play", file)), 1)
+
+    def test_files_that_cannot_be_used_are_bad_files(self):
+        with handset(*self.RATES) as sim, tempfile.NamedTemporaryFile() as foreign:
+            ports = {7: sim.device}
+            foreign.write(b"not a capture file at all")
+            foreign.flush()
+            self.expect_json(10, "log", "play", foreign.name)
+            self.expect_json(10, "log", "play", "/nonexistent/capture")
+            self.expect_json(10, "-p", "7", "log", "capture", "/nonexistent/capture", ports=ports)
+            self.expect_json(10, "-p", "7", "log", "capture", "/dev/full", ports=ports)
+            self.expect_json(10, "-p", "7", "log", "list", "--names", foreign.name, ports=ports)
+            self.expect_json(2, "-p", "7", "log", "on", ports=ports)
+            self.expect_json(2, "-p", "7", "event", "on", "0x10-0x0F", ports=ports)
+
+
 class Simulation(ToolTest):
     def test_ftm_commands_need_factory_test_mode_and_answer_in_it(self):
         with handset() as sim:

@@ -62,6 +62,8 @@ int Run(int argc, char** argv) {
   AddModeVerbs(app, context);
   AddFsVerbs(app, context);
   AddFtmVerbs(app, context);
+  AddLogVerbs(app, context);
+  AddEventVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);

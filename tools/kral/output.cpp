@@ -34,6 +34,14 @@ void Output::Result(const Json& members, std::string_view text) const {
   }
 }
 
+void Output::Stream(const Json& members, std::string_view text) const {
+  if (json_) {
+    WriteData(members.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n");
+  } else {
+    WriteData(text);
+  }
+}
+
 void Output::Note(std::string_view text) const {
   fmt::print(stderr, "kral: {}\n", text);
 }

@@ -22,6 +22,10 @@ class Output {
   // The result of a verb: `members` join "ok" in the object; `text` is what a person reads, with its line ends.
   void Result(const Json& members, std::string_view text) const;
 
+  // One of many: an object of its own on a line of its own, without "ok". The result of the verb follows behind the
+  // last.
+  void Stream(const Json& members, std::string_view text) const;
+
   // Something worth knowing that is not the result.
   void Note(std::string_view text) const;
 

@@ -6,10 +6,12 @@
 #include <cctype>
 #include <memory>
 #include <optional>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
 
+#include "handset/log_generator.h"
 #include "handset/pty_cable.h"
 #include "handset/virtual_handset.h"
 #include "platform/clock.h"
@@ -35,6 +37,7 @@ struct SimOptions {
   std::vector<std::pair<std::string, std::string>> efs_shown_names;
   std::vector<std::string> faults;
   double bit_errors = 0;
+  handset::LogTraffic traffic;
   std::uint64_t seed = 1;
   std::string link;
 };
@@ -79,6 +82,10 @@ void Simulate(const Context& context, const SimOptions& options) {
     throw ToolError(ExitCode::kUsage, fmt::format("the handset cannot be put on a pseudo terminal: {}", error),
                     "kral sim needs Linux, and a --link that can be made");
   }
+  std::optional<handset::LiveTraffic> traffic;
+  if (options.traffic.logs + options.traffic.reports + options.traffic.messages > 0) {
+    traffic.emplace(handset, options.traffic);
+  }
   context.out.Result({{"device", cable->device_path()}}, cable->device_path() + "\n");
   Serve(handset, options);
 }
@@ -110,6 +117,15 @@ void AddOptions(CLI::App& sim, SimOptions& options) {
   sim.add_option("--efs-blocks", options.efs_blocks, "Size of the file system in blocks of 512 bytes");
   sim.add_option("--efs-bad-offset", options.efs_bad_offset, "Files that are written keep a wrong byte at this offset");
   sim.add_option("--efs-show", options.efs_shown_names, "NAME SHOWN: listings show one name as another")->take_all();
+  const auto rate = CLI::Range(0., 1e6);
+  sim.add_option("--logs", options.traffic.logs, "Log packets per second, of the codes that are on")->check(rate);
+  sim.add_option("--events", options.traffic.reports, "Event reports per second, of the events that are on")
+      ->check(rate);
+  sim.add_option("--messages", options.traffic.messages, "Messages per second, of the categories that are on")
+      ->check(rate);
+  sim.add_option("--log-size", options.traffic.log_size, "Bytes of a log packet")->check(CLI::Range(16, 4090));
+  sim.add_option("--burst", options.traffic.burst, "Packets that come at once; the rate stays")
+      ->check(CLI::Range(1, 4096));
   sim.add_option("--fault", options.faults, "Misbehaviour, see below; may be given several times")
       ->take_all()
       ->allow_extra_args(false);

@@ -1,0 +1,59 @@
+// Anything as a capture file, through the reader and the sorter. What is read is what stands in the file, and nothing
+// that follows a damaged place.
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+
+#include "frame/base/little_endian.h"
+#include "transport/capture_format.h"
+#include "transport/capture_reader.h"
+#include "transport/kral_event_listener.h"
+
+namespace {
+
+using namespace kral;
+
+void Require(bool held) {
+  if (!held) std::abort();
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  const std::span<const uint8_t> file(data, size);
+  size_t at = 0;
+  CaptureReader reader([&](std::span<uint8_t> buffer) {
+    const size_t count = std::min(buffer.size(), file.size() - at);
+    std::copy_n(file.begin() + static_cast<std::ptrdiff_t>(at), count, buffer.begin());
+    at += count;
+    return count;
+  });
+  PacketQueue responses;
+  PacketQueue asynchronous;
+  BoundedQueue<EventRecord> events;
+  CKralEventListener sorter(responses, asynchronous, events);
+  sorter.SetCollection(true);
+
+  CaptureRecord record;
+  uint64_t packets = 0;
+  CaptureReader::Outcome outcome = CaptureReader::Outcome::kRecord;
+  while ((outcome = reader.Next(record)) == CaptureReader::Outcome::kRecord) {
+    const size_t length = record.packet.size();
+    Require(length >= capture_record::kShortestPacket && length <= kMaximumPacket);
+    // Read again by hand, from where the reader has got to.
+    const size_t begin = at - length - capture_record::kSize;
+    Require(LoadLe<uint16_t>(file, begin + capture_record::kLength) == length);
+    Require(LoadLe<uint64_t>(file, begin + capture_record::kMicroseconds) == record.microseconds);
+    Require(std::equal(record.packet.begin(), record.packet.end(),
+                       file.begin() + static_cast<std::ptrdiff_t>(at - length)));
+    sorter.TakePacket(record.packet);
+    ++packets;
+  }
+  if (outcome == CaptureReader::Outcome::kEnd) Require(at == size);
+  if (outcome == CaptureReader::Outcome::kForeign) Require(packets == 0);
+  const auto counters = sorter.counters();
+  Require(counters.collected + responses.size() + responses.dropped() == packets && counters.oversized == 0);
+  while (const auto event = events.Pop()) Require(*LoadLe<uint16_t>(event->bytes, EventRecord::kEventId) <= 0xFFF);
+  return 0;
+}
