@@ -271,7 +271,6 @@ TEST_F(Collection, CapturedTrafficPlaysBackAsItCame) {
 TEST_F(Collection, FloodLosesNothingUncounted) {
   const auto seconds_text = EnvironmentValue("KRAL_TEST_FLOOD_SECONDS");
   const auto length = std::chrono::milliseconds(seconds_text ? 1000 * std::stol(*seconds_text) : 500);
-  Connect();
   KRAL_SetLogFlags(handle(), 0);
   ASSERT_EQ(KRAL_StartCapture(handle(), folder_.Path("flood").c_str()), 1);
   ASSERT_EQ(KRAL_DIAG_AddExtendedLogCode(handle(), 1, 0x1001), 1);

@@ -189,8 +189,11 @@ ToolError Session::Explain(std::string_view what) const {
             "check that no other program talks to the handset; --log FILE shows the traffic"};
   }
   // The connection may have ended for a time-out, or because there is no handset any more: asking tells.
+  // That the device is gone is told only until the asking has closed its port.
+  const auto before = PortTrouble(handle_);
   const bool answers = KRAL_IsPhoneConnected(handle_) != 0;
-  const auto trouble = PortTrouble(handle_);
+  const auto after = PortTrouble(handle_);
+  const auto trouble = after ? after : before;
   if (!answers && trouble) return ExplainPort(port_, *trouble, true);
   if (find("mode switching status polling has timeout") != lines.rend()) {
     return {ExitCode::kNoAnswer, fmt::format("the handset took {} but does not report the new mode", where),
