@@ -158,8 +158,10 @@ std::optional<std::vector<uint8_t>> NvDataType::FromText(std::string_view text, 
   Numbers numbers(text);
   const NvForm* form = forms_.size() == 1 && !forms_[0].selector ? &forms_[0] : nullptr;
   if (form == nullptr && !forms_.empty() && !numbers.at_end()) {
-    const auto first = ParseNumber(Numbers(text).Next(), forms_[0].members[0]);
-    if (first) form = FormOf(*first);
+    const NvMember& selector = forms_[0].members[0];
+    const auto first = ParseNumber(Numbers(text).Next(), selector);
+    // As it is kept: of a negative number only its own bytes.
+    if (first) form = FormOf(*first & std::numeric_limits<uint64_t>::max() >> (64 - 8 * selector.width));
   }
   if (form == nullptr) {
     problem = "the first number chooses no form of the type";

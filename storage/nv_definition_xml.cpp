@@ -78,8 +78,12 @@ class Reader {
     for (size_t i = 0; i < forms.size(); ++i) {
       const NvMember& selector = forms[i].members[0];
       const NvMember& expected = forms[0].members[0];
-      if (forms.size() > 1 && (selector.count != 1 || selector.width != expected.width)) {
+      if (forms.size() > 1 &&
+          (selector.count != 1 || selector.width != expected.width || selector.is_signed != expected.is_signed)) {
         throw BadXml("the forms of " + name + " begin with different members");
+      }
+      if (forms[i].selector && selector.width < 8 && *forms[i].selector >> 8 * selector.width != 0) {
+        throw BadXml("the first member of " + name + " never is " + std::to_string(*forms[i].selector));
       }
       for (size_t k = 0; k < i; ++k) {
         if (forms[k].selector == forms[i].selector) throw BadXml("two forms of " + name + " have the same variantType");

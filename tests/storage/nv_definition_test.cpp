@@ -28,6 +28,7 @@ TEST(NvDataTypeTest, NumbersTurnIntoBytesAndBackWithinTheirRanges) {
   const NvDataType open("", {{std::nullopt, {{"n", 1, false, 1}, {"v", 2, true, 3}}}}, true);
   const NvDataType forms("", {{4, {{"k", 1, false, 1}, {"a", 1, false, 2}}}, {std::nullopt, {{"k", 1, false, 1}}}},
                          false);
+  const NvDataType minus("", {{255, {{"k", 1, true, 1}, {"a", 1, false, 1}}}}, false);
   const struct {
     const NvDataType* type;
     const char* text;
@@ -59,6 +60,8 @@ TEST(NvDataTypeTest, NumbersTurnIntoBytesAndBackWithinTheirRanges) {
       {&forms, "9", "09", nullptr},
       {&forms, "9,1", nullptr, nullptr},
       {&forms, "", nullptr, nullptr},
+      {&minus, "-1,7", "FF 07", nullptr},
+      {&minus, "1,7", nullptr, nullptr},
   };
   for (const auto& row : kRows) {
     SCOPED_TRACE(row.text);
@@ -191,6 +194,9 @@ TEST_F(NvDefinition, ContradictionsAreRefusedAndChangeNothing) {
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>",
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
       "<DataType name='A' variantType='2'><Member typeid='word16'/></DataType>",
+      "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
+      "<DataType name='A' variantType='2'><Member typeid='word8' signed='1'/></DataType>",
+      "<DataType name='A' variantType='256'><Member typeid='word8'/></DataType>",
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
       "<DataType name='B'><Member typeid='A'/></DataType>",
       tower,
