@@ -547,6 +547,60 @@ class Files(ToolTest):
         self.assertEqual(os.listdir(self.folder), ["f"])
 
 
+class NvItems(ToolTest):
+    """NV items by their definitions: those of the examples folder."""
+    DEFS = ("--defs", os.path.join(os.path.dirname(os.path.abspath(__file__)), "../../examples/nv_definitions.xml"))
+
+    def test_items_are_written_and_read_by_id_name_and_path(self):
+        with handset() as sim:
+            ports = {7: sim.device}
+            nv = ("-p", "7", "nv")
+            written = self.expect_json(0, *nv, "write", "PREFERRED_MODE", "1,513", *self.DEFS, ports=ports)
+            self.assertEqual(written["item"], {"id": 10, "name": "PREFERRED_MODE", "value": {"nam": 1, "mode": 513}})
+            self.expect(0, *nv, "write", "20002", "-77", *self.DEFS, ports=ports)
+            self.expect(0, *nv, "write", "6000", "AABB", ports=ports)
+            text = self.expect(0, *nv, "read", "10", "WCDMA_TX_LIMIT", "6000", *self.DEFS, ports=ports).out
+            self.assertRegex(text, r"10 PREFERRED_MODE\n  nam +1\n  mode +513\n")
+            self.assertRegex(text, r"/nv/item_files/rfnv/00020002 WCDMA_TX_LIMIT\n  limit +-77\n")
+            self.assertRegex(text, r"6000\n0000 +AA BB 00")
+            self.assertEqual(self.expect_json(0, *nv, "read", "6000", ports=ports)["items"][0]["bytes"][:8], "AA BB 00")
+            # The handset's word on what it will not do, and the tool's on what makes no sense.
+            self.assertIn("5, never written", self.expect_json(7, *nv, "read", "453", "7000", ports=ports)["error"]["text"])
+            self.assertIn("7, read-only", self.expect_json(7, *nv, "write", "0", "AA", ports=ports)["error"]["text"])
+            self.assertIn("out of the range of mode",
+                          self.expect_json(2, *nv, "write", "10", "1,70000", *self.DEFS, ports=ports)["error"]["text"])
+            self.expect_json(2, *nv, "read", "NO_SUCH_ITEM", *self.DEFS, ports=ports)
+            self.expect_json(2, *nv, "dump", ports=ports)
+            self.expect_json(10, *nv, "read", "10", "--defs", "/nonexistent", ports=ports)
+
+    def test_dump_makes_files_that_compare_and_validate(self):
+        with handset() as sim, tempfile.TemporaryDirectory() as folder:
+            ports = {7: sim.device}
+            nv = ("-p", "7", "nv")
+            pkv = [os.path.join(folder, name) for name in ("first.pkv", "second.pkv")]
+            source, page = os.path.join(folder, "source.xml"), os.path.join(folder, "page.html")
+            self.expect(0, *nv, "dump", *self.DEFS, "--pkv", pkv[0], ports=ports)
+            self.expect(0, *nv, "write", "FTM_MODE", "1", *self.DEFS, ports=ports)
+            answer = self.expect_json(0, *nv, "dump", *self.DEFS, "--pkv", pkv[1], "--source", source, ports=ports)
+            self.assertEqual([item["name"] for item in answer["items"]], ["ESN", "FTM_MODE"])
+            self.assertEqual(len(self.expect_json(0, *nv, "dump", "--items", "450-460", ports=ports)["items"]), 1)
+            self.expect(0, "nv", "diff", *pkv, page, *self.DEFS)
+            with open(page, encoding="utf-8") as file:
+                self.assertIn("enabled: 0 to 1", file.read())
+            subprocess.run(["xmllint", "--noout", source, self.DEFS[1]], check=True, timeout=PATIENCE)
+            self.expect_json(10, "nv", "diff", pkv[0], source, page)
+
+    def test_defs_need_no_handset(self):
+        answer = self.expect_json(0, "nv", "defs", self.DEFS[1])
+        by_name = {item["name"]: item for item in answer["definitions"]}
+        self.assertEqual(len(by_name), 29)
+        self.assertEqual(by_name["CHANNEL_OFFSET"]["max_index"], 3)
+        self.assertEqual([form.get("variant") for form in by_name["SERVER_ADDRESS"]["forms"]], ["4", "6", None])
+        self.assertEqual(by_name["WCDMA_TX_LIMIT"]["forms"][0]["members"],
+                         [{"name": "limit", "type": "signed word16", "count": 1}])
+        self.assertIn("3101 CHANNEL_OFFSET [0-3]\n", self.expect(0, "nv", "defs", self.DEFS[1]).out)
+
+
 class Counting(unittest.TextTestResult):
     passed = 0
 

@@ -64,6 +64,7 @@ int Run(int argc, char** argv) {
   AddFtmVerbs(app, context);
   AddLogVerbs(app, context);
   AddEventVerbs(app, context);
+  AddNvVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);

@@ -38,10 +38,17 @@ std::size_t Number(const XmlElement& element, std::string_view name, std::size_t
   return value;
 }
 
+// RF NV items are files that have an id, too, in eight digits.
+std::optional<std::uint16_t> RfIdOf(std::string_view path) {
+  constexpr std::string_view kFolder = "/nv/item_files/rfnv/";
+  if (!path.starts_with(kFolder) || path.size() != kFolder.size() + 8) return std::nullopt;
+  return ParseId(path.substr(kFolder.size()));
+}
+
 NvItem ItemOf(const XmlElement& element) {
   NvItem item;
-  item.id = ParseId(Attribute(element, "id"));
   item.path = Attribute(element, "fullpathname");
+  item.id = item.path.empty() ? ParseId(Attribute(element, "id")) : RfIdOf(item.path);
   item.name = Attribute(element, "name");
   item.max_index = static_cast<std::uint16_t>(Number(element, "maxIndex", 0));
   for (const XmlElement& type : element.children) {

@@ -49,7 +49,7 @@ void ReadItems(Context& context, const Arguments& arguments) {
   }
   if (missing.empty()) return context.out.Result({{"port", session.port()}, {"items", read}}, text);
   context.found["items"] = read;
-  if (!context.out.json()) context.out.Note(text);
+  if (!context.out.json() && !text.empty()) context.out.Note(text);
   throw ToolError(ExitCode::kRefused, fmt::format("the handset gives no value for {}", missing),
                   "an item that was never written has none");
 }
