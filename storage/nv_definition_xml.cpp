@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <array>
 #include <optional>
+#include <set>
+#include <span>
 #include <unordered_map>
 #include <utility>
 
@@ -17,6 +19,7 @@ namespace {
 // Data types within data types multiply: what they come to in one file is limited.
 constexpr size_t kMostMembers = size_t{1} << 20;
 constexpr size_t kLongestPath = 1024;
+constexpr size_t kMostForms = 256;
 
 std::optional<uint8_t> WidthOf(std::string_view type) {
   constexpr std::array<std::pair<std::string_view, uint8_t>, 4> kWords = {
@@ -36,9 +39,10 @@ class Reader {
     if (root.name != (items_allowed ? "NvDefinition" : "NvDataTypeDictionary")) {
       throw BadXml("the root element is <" + root.name + ">");
     }
-    for (const XmlElement& element : root.children) {
+    for (size_t i = 0; i < root.children.size(); ++i) {
+      const XmlElement& element = root.children[i];
       if (element.name == "DataType") {
-        ReadSharedType(element);
+        i += ReadSharedType(std::span(root.children).subspan(i)) - 1;
       } else if (items_allowed && (element.name == "NvItem" || element.name == "NvEfsItem")) {
         file_.items.push_back(ReadItem(element));
       } else {
@@ -56,38 +60,43 @@ class Reader {
     return own == own_types_.end() ? known_.FindType(name) : own->second;
   }
 
-  // Several elements of one name are the forms of one type.
-  void ReadSharedType(const XmlElement& element) {
-    const std::string name = TextAttribute(element, "name");
+  // Elements of one name that follow each other are the forms of one type. Gives how many there are.
+  size_t ReadSharedType(std::span<const XmlElement> elements) {
+    const std::string name = TextAttribute(elements[0], "name");
     if (name.empty()) throw BadXml("<DataType> without name");
     if (WidthOf(name)) throw BadXml("<DataType>: " + name + " is a word of its own");
-    std::vector<NvForm> forms;
-    bool variable_size = FlagAttribute(element, "variableSize");
-    const auto own = own_types_.find(name);
-    if (own != own_types_.end()) {
-      forms = own->second->forms();
-      variable_size = variable_size || own->second->variable_size();
-    }
-    forms.push_back(ReadForm(element));
-    const NvTypePtr type = MakeType(name, std::move(forms), variable_size);
+    if (own_types_.contains(name)) throw BadXml("<DataType>: " + name + " is defined twice");
+    const auto ends = [&](const XmlElement& element) {
+      return element.name != "DataType" || TextAttribute(element, "name") != name;
+    };
+    const auto end = std::find_if(elements.begin(), elements.end(), ends);
+    const auto count = static_cast<size_t>(end - elements.begin());
+    const NvTypePtr type = MakeType(name, elements.first(count), false);
     own_types_[name] = type;
     file_.types.push_back(type);
+    return count;
   }
 
-  NvTypePtr MakeType(const std::string& name, std::vector<NvForm> forms, bool variable_size) const {
-    for (size_t i = 0; i < forms.size(); ++i) {
-      const NvMember& selector = forms[i].members[0];
+  NvTypePtr MakeType(const std::string& name, std::span<const XmlElement> elements, bool variable_size) {
+    if (elements.size() > kMostForms) throw BadXml(name + " has too many forms");
+    std::vector<NvForm> forms;
+    std::set<std::optional<uint64_t>> selectors;
+    for (const XmlElement& element : elements) {
+      if (element.name != "DataType")
+        throw BadXml("<" + element.name + "> is not expected in the place of a <DataType>");
+      variable_size = variable_size || FlagAttribute(element, "variableSize");
+      forms.push_back(ReadForm(element));
+      const NvForm& form = forms.back();
+      const NvMember& first = form.members[0];
       const NvMember& expected = forms[0].members[0];
-      if (forms.size() > 1 &&
-          (selector.count != 1 || selector.width != expected.width || selector.is_signed != expected.is_signed)) {
+      if (elements.size() > 1 &&
+          (first.count != 1 || first.width != expected.width || first.is_signed != expected.is_signed)) {
         throw BadXml("the forms of " + name + " begin with different members");
       }
-      if (forms[i].selector && selector.width < 8 && *forms[i].selector >> 8 * selector.width != 0) {
-        throw BadXml("the first member of " + name + " never is " + std::to_string(*forms[i].selector));
+      if (form.selector && first.width < 8 && *form.selector >> 8 * first.width != 0) {
+        throw BadXml("the first member of " + name + " never is " + std::to_string(*form.selector));
       }
-      for (size_t k = 0; k < i; ++k) {
-        if (forms[k].selector == forms[i].selector) throw BadXml("two forms of " + name + " have the same variantType");
-      }
+      if (!selectors.insert(form.selector).second) throw BadXml("two forms of " + name + " have the same variantType");
     }
     return std::make_shared<NvDataType>(name, std::move(forms), variable_size);
   }
@@ -167,14 +176,7 @@ class Reader {
       if (type == nullptr) throw BadXml(item.Title() + ": there is no data type " + *shared);
       return type;
     }
-    std::vector<NvForm> forms;
-    bool variable_size = FlagAttribute(element, "variableSize");
-    for (const XmlElement& form : element.children) {
-      if (form.name != "DataType") throw BadXml("<" + form.name + "> is not expected in <" + element.name + ">");
-      variable_size = variable_size || FlagAttribute(form, "variableSize");
-      forms.push_back(ReadForm(form));
-    }
-    return MakeType("", std::move(forms), variable_size);
+    return MakeType("", element.children, FlagAttribute(element, "variableSize"));
   }
 
   static void CheckSize(const NvItem& item) {

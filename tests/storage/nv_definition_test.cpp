@@ -196,6 +196,8 @@ TEST_F(NvDefinition, ContradictionsAreRefusedAndChangeNothing) {
       "<DataType name='A' variantType='2'><Member typeid='word16'/></DataType>",
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
       "<DataType name='A' variantType='2'><Member typeid='word8' signed='1'/></DataType>",
+      "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType><NvItem id='2' typeid='A'/>"
+      "<DataType name='A' variantType='2'><Member typeid='word8'/></DataType>",
       "<DataType name='A' variantType='256'><Member typeid='word8'/></DataType>",
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
       "<DataType name='B'><Member typeid='A'/></DataType>",
