@@ -28,6 +28,8 @@ class NVTool_Manager final : public FamilyObject {
   explicit NVTool_Manager(KRAL_HANDLE handle) : handle_(handle) {}
 
   void SetCallback(KRAL_NV_CALLBACK callback) { callback_ = callback; }
+  // True within the callback: the items of the set must stay where they are.
+  bool is_moving() const { return moving_; }
 
   // --- Definitions (nv_tool.cpp)
   // ----------------------------------------------------------------------------------------
@@ -99,6 +101,7 @@ class NVTool_Manager final : public FamilyObject {
 
   const KRAL_HANDLE handle_;
   KRAL_NV_CALLBACK callback_ = nullptr;
+  bool moving_ = false;
   NvDefinitions definitions_;
   NvRoamingLists roaming_lists_;
   NvFilter read_filter_;
@@ -110,14 +113,19 @@ class NVTool_Manager final : public FamilyObject {
 // Reports each item of a set to the callback, and remembers whether one of them failed.
 class NVTool_Manager::Walk {
  public:
-  Walk(const NVTool_Manager& tool, uint32_t operation, size_t total)
-      : tool_(tool), operation_(operation), total_(static_cast<uint32_t>(total)) {}
+  Walk(NVTool_Manager& tool, uint32_t operation, size_t total)
+      : tool_(tool), operation_(operation), total_(static_cast<uint32_t>(total)) {
+    tool_.moving_ = true;
+  }
+  ~Walk() { tool_.moving_ = false; }
+  Walk(const Walk&) = delete;
+  Walk& operator=(const Walk&) = delete;
 
   void Report(const std::string& title, NvError error);
   bool failed() const { return failed_; }
 
  private:
-  const NVTool_Manager& tool_;
+  NVTool_Manager& tool_;
   const uint32_t operation_;
   const uint32_t total_;
   uint32_t done_ = 0;

@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <mutex>
 #include <string>
+#include <string_view>
 
 #include "commands/outputs.h"
 #include "frame/export_call.h"
@@ -35,7 +36,7 @@ uint32_t OnTool(KRAL_HANDLE handle, const char* name, Operation&& operation) noe
         kral::Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, kral::FamilySlot::kNvManager, MakeTool);
     if (phone && tool) {
       const std::lock_guard lock(phone->request_lock());
-      error = operation(*tool, *phone);
+      error = tool->is_moving() ? NvError::kUnknown : operation(*tool, *phone);
     }
   } catch (...) {
     error = NvError::kUnknown;
@@ -91,9 +92,9 @@ uint32_t OnItem(KRAL_HANDLE handle, const char* name, Key key, Operation&& opera
 // --- Texts handed out
 // -------------------------------------------------------------------------------------------------
 
-NvError Give(const std::string& result, char* text, uint32_t size) {
+NvError Give(std::string_view result, char* text, uint32_t size) {
   if (text == nullptr || result.size() >= size) return NvError::kCannotGetValue;
-  std::copy_n(result.c_str(), result.size() + 1, text);
+  *std::copy(result.begin(), result.end(), text) = '\0';
   return NvError::kNone;
 }
 

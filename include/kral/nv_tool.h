@@ -40,7 +40,8 @@ extern "C" {
 #define KRAL_NV_OPERATION_WRITE_SOURCE 6u
 
 /**
- * Called after each item of a set, on the thread that moves it.
+ * Called after each item of a set, on the thread that moves it. It must not call functions of this header on the same
+ * handle, which give 0xFFFFFFFF until the set has been moved.
  *
  * @param operation  KRAL_NV_OPERATION_...
  * @param done       items so far

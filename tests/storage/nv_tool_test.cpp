@@ -193,6 +193,9 @@ TEST_F(NvTool, HandsetThatRefusesHalfOfTheItemsGetsTheRest) {
   EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 12u);
   EXPECT_EQ(Value(118), "1,2");
   EXPECT_EQ(Value(119), "error 10");
+  handset().faults().Add(handset::Refuse(19), handset::When::Always().Of("4B 13"));
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 12u) << "a handset without files";
+  EXPECT_EQ(Value(118), "1,2");
   handset().faults().Add(handset::Refuse(20), handset::When::Always().Of("27"));
   EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 11u) << "refused as requests, too";
 }
@@ -224,7 +227,8 @@ std::vector<std::string>& Calls() {
 void KRAL_CALL OnItem(uint32_t operation, uint32_t done, uint32_t total, const char* item, uint32_t status,
                       KRAL_HANDLE handle) {
   Calls().push_back(std::to_string(operation) + " " + std::to_string(done) + "/" + std::to_string(total) + " " + item +
-                    " " + std::to_string(status) + (handle != 0 ? "" : " no handle"));
+                    " " + std::to_string(status));
+  EXPECT_EQ(KRAL_NV_ClearNVDefinition(handle), 0xFFFFFFFFu) << "in the middle of a set";
 }
 
 TEST_F(NvTool, CallbackTellsEveryItem) {
