@@ -53,13 +53,11 @@ std::optional<uint16_t> RfIdOfPath(std::string_view path);
 
 class NvDefinitions {
  public:
-  // --- Data types
-  // -----------------------------------------------------------------------------------------------------
+  // --- Data types ----------------------------------------------------------------------------------------------------
   NvTypePtr FindType(std::string_view name) const;
   void PutType(NvTypePtr type);  // replaces one of the same name, for items that are still to be defined
 
-  // --- Items: numbered ones first, then files
-  // ---------------------------------------------------------------------------
+  // --- Items: numbered ones first, then files ------------------------------------------------------------------------
   size_t numbered_count() const { return numbered_.size(); }
   size_t file_count() const { return files_.size(); }
   size_t count() const { return numbered_.size() + files_.size(); }

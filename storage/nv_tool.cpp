@@ -17,8 +17,7 @@ void NVTool_Manager::Walk::Report(const std::string& title, NvError error) {
   tool_.callback_(operation_, done_, total_, title.c_str(), static_cast<uint32_t>(error), tool_.handle_);
 }
 
-// --- Definitions
-// ------------------------------------------------------------------------------------------------------
+// --- Definitions -----------------------------------------------------------------------------------------------------
 
 NvError NVTool_Manager::LoadDefinitions(Diag_FTM& phone, const std::string& file, NvDefinitionKind kind) {
   NvDefinitionFile read;
@@ -68,8 +67,7 @@ NvItem& NVTool_Manager::Define(Diag_FTM& phone, NvItem item) {
   return path.empty() ? *definitions_.Find(id) : *definitions_.Find(path);
 }
 
-// --- Values
-// -----------------------------------------------------------------------------------------------------------
+// --- Values ----------------------------------------------------------------------------------------------------------
 
 NvSlot NVTool_Manager::SlotOf(const NvItem& item, uint16_t element) const {
   return {item.is_file() ? uint16_t{0} : subscription_, element};
@@ -116,8 +114,7 @@ void NVTool_Manager::ClearValues() {
   roaming_lists_.clear();
 }
 
-// --- Filters
-// ----------------------------------------------------------------------------------------------------------
+// --- Filters ---------------------------------------------------------------------------------------------------------
 
 void NVTool_Manager::Mark(Diag_FTM& phone, NvItem& item) const {
   item.will_read = read_filter_.Passes(item);
@@ -180,8 +177,7 @@ NvError NVTool_Manager::CreateFilter(const std::string& file, bool with_value) {
   return filter.is_empty() ? NvError::kNoValue : filter.Save(file);
 }
 
-// --- Subscriptions
-// ----------------------------------------------------------------------------------------------------
+// --- Subscriptions ---------------------------------------------------------------------------------------------------
 
 void NVTool_Manager::SetMultiSim(bool supported) {
   multi_sim_ = supported;

@@ -31,23 +31,20 @@ class NVTool_Manager final : public FamilyObject {
   // True within the callback: the items of the set must stay where they are.
   bool is_moving() const { return moving_; }
 
-  // --- Definitions (nv_tool.cpp)
-  // ----------------------------------------------------------------------------------------
+  // --- Definitions (nv_tool.cpp) -------------------------------------------------------------------------------------
   NvError LoadDefinitions(Diag_FTM& phone, const std::string& file, NvDefinitionKind kind);
   void ClearDefinitions();
   NvDefinitions& definitions() { return definitions_; }
   std::string FileNames();
 
-  // --- Values of the current subscription; a null item is one that is not there
-  // -----------------------------------------
+  // --- Values of the current subscription; a null item is one that is not there --------------------------------------
   NvError GetValue(const NvItem& item, uint16_t element, const NvBytes*& value) const;
   NvError SetBytes(Diag_FTM& phone, NvItem& item, uint16_t element, std::span<const uint8_t> value);
   NvError SetText(Diag_FTM& phone, NvItem& item, uint16_t element, std::string_view text);
   void ClearValue(NvItem& item) const;
   void ClearValues();
 
-  // --- Filters
-  // ----------------------------------------------------------------------------------------------------------
+  // --- Filters -------------------------------------------------------------------------------------------------------
   NvError LoadReadFilter(Diag_FTM& phone, const std::string& file);
   NvError LoadWriteFilter(Diag_FTM& phone, const std::string& file);
   void ClearReadFilters(Diag_FTM& phone);
@@ -55,22 +52,19 @@ class NVTool_Manager final : public FamilyObject {
   // Of the items that have a value, or have none.
   NvError CreateFilter(const std::string& file, bool with_value);
 
-  // --- Subscriptions
-  // ----------------------------------------------------------------------------------------------------
+  // --- Subscriptions -------------------------------------------------------------------------------------------------
   void SetMultiSim(bool supported);
   uint16_t subscription() const { return subscription_; }
   NvError SetSubscription(uint16_t subscription);
 
-  // --- The handset (nv_tool_mobile.cpp)
-  // ---------------------------------------------------------------------------------
+  // --- The handset (nv_tool_mobile.cpp) ------------------------------------------------------------------------------
   NvError LoadFromMobile(Diag_FTM& phone);
   NvError WriteToMobile(Diag_FTM& phone);
   NvError ReadItem(Diag_FTM& phone, uint16_t id, uint16_t& status);
   NvError ReadItem(Diag_FTM& phone, const std::string& path);
   NvError WriteItem(Diag_FTM& phone, const NvItem& item, uint16_t& status);
 
-  // --- Files of the PC (nv_tool_files.cpp)
-  // ------------------------------------------------------------------------------
+  // --- Files of the PC (nv_tool_files.cpp) ---------------------------------------------------------------------------
   NvError LoadFromPkv(Diag_FTM& phone, const std::string& file);
   NvError WriteToPkv(Diag_FTM& phone, const std::string& file);
   NvError LoadFromSource(Diag_FTM& phone, const std::string& file);

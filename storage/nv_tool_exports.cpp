@@ -1,96 +1,20 @@
-// Exports of the NV tool: name line, handle, operation, error code.
+// Exports of the NV tool: error texts, definitions, values.
 #include <algorithm>
-#include <mutex>
 #include <string>
 #include <string_view>
 
 #include "commands/outputs.h"
-#include "frame/export_call.h"
 #include "kral/nv_tool.h"
 #include "storage/nv_definition_xml.h"
-#include "storage/nv_tool.h"
+#include "storage/nv_tool_call.h"
 
 using kral::Diag_FTM;
-using kral::LogName;
 using kral::Put;
-using kral::nv::NvBytes;
-using kral::nv::NvDefinitionKind;
-using kral::nv::NvError;
-using kral::nv::NvItem;
-using kral::nv::NVTool_Manager;
+using namespace kral::nv;
 
 namespace {
 
-std::shared_ptr<kral::FamilyObject> MakeTool(Diag_FTM&, KRAL_HANDLE handle) {
-  return std::make_shared<NVTool_Manager>(handle);
-}
-
-// Runs operation(tool, phone) under the request lock of the handset; no exception leaves it.
-template <class Operation>
-uint32_t OnTool(KRAL_HANDLE handle, const char* name, Operation&& operation) noexcept {
-  LogName(handle, name);
-  NvError error = NvError::kNoConnection;
-  try {
-    const auto phone = kral::Kral_ResourceManager::GetPhone(handle);
-    const auto tool =
-        kral::Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, kral::FamilySlot::kNvManager, MakeTool);
-    if (phone && tool) {
-      const std::lock_guard lock(phone->request_lock());
-      error = tool->is_moving() ? NvError::kUnknown : operation(*tool, *phone);
-    }
-  } catch (...) {
-    error = NvError::kUnknown;
-  }
-  return static_cast<uint32_t>(error);
-}
-
-// An operation that cannot fail.
-template <class Operation>
-uint32_t OnToolAlways(KRAL_HANDLE handle, const char* name, Operation&& operation) noexcept {
-  return OnTool(handle, name, [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    operation(tool, phone);
-    return NvError::kNone;
-  });
-}
-
-std::string Text(const char* text) {
-  return text == nullptr ? "" : text;
-}
-
-// --- The item that an argument names
-// ----------------------------------------------------------------------------------
-
-struct AtIndex {
-  uint32_t index;
-};
-
-NvError Find(NVTool_Manager& tool, AtIndex at, NvItem*& item) {
-  item = tool.definitions().At(at.index);
-  return item == nullptr ? NvError::kIndexOutOfBound : NvError::kNone;
-}
-
-NvError Find(NVTool_Manager& tool, uint16_t id, NvItem*& item) {
-  item = tool.definitions().Find(id);
-  return item == nullptr ? NvError::kNotDefined : NvError::kNone;
-}
-
-NvError Find(NVTool_Manager& tool, const char* path, NvItem*& item) {
-  item = tool.definitions().Find(Text(path));
-  return item == nullptr ? NvError::kNotDefined : NvError::kNone;
-}
-
-// Runs operation(tool, phone, item).
-template <class Key, class Operation>
-uint32_t OnItem(KRAL_HANDLE handle, const char* name, Key key, Operation&& operation) noexcept {
-  return OnTool(handle, name, [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    NvItem* item = nullptr;
-    const NvError error = Find(tool, key, item);
-    return error == NvError::kNone ? operation(tool, phone, *item) : error;
-  });
-}
-
-// --- Texts handed out
-// -------------------------------------------------------------------------------------------------
+// --- Texts handed out ------------------------------------------------------------------------------------------------
 
 NvError Give(std::string_view result, char* text, uint32_t size) {
   if (text == nullptr || result.size() >= size) return NvError::kCannotGetValue;
@@ -117,7 +41,7 @@ struct Length {
 template <class Key, class Target>
 uint32_t GiveDefinition(KRAL_HANDLE handle, const char* name, Key key, Target target) {
   return OnItem(handle, name, key,
-                [&](NVTool_Manager&, Diag_FTM&, NvItem& item) { return target.Take(kral::nv::DefinitionText(item)); });
+                [&](NVTool_Manager&, Diag_FTM&, NvItem& item) { return target.Take(DefinitionText(item)); });
 }
 
 template <class Target>
@@ -133,7 +57,7 @@ template <class Target>
 uint32_t GiveType(KRAL_HANDLE handle, const char* name, const char* type_name, Target target) {
   return OnTool(handle, name, [&](NVTool_Manager& tool, Diag_FTM&) {
     const auto type = tool.definitions().FindType(Text(type_name));
-    return type == nullptr ? NvError::kNotDefined : target.Take(kral::nv::DataTypeText(*type));
+    return type == nullptr ? NvError::kNotDefined : target.Take(DataTypeText(*type));
   });
 }
 
@@ -151,8 +75,7 @@ uint32_t GiveValue(KRAL_HANDLE handle, const char* name, Key key, uint16_t eleme
   });
 }
 
-// --- Values
-// -----------------------------------------------------------------------------------------------------------
+// --- Values ----------------------------------------------------------------------------------------------------------
 
 template <class Key>
 uint32_t GetBytes(KRAL_HANDLE handle, const char* name, Key key, uint16_t element, uint8_t* data, uint32_t* size) {
@@ -191,29 +114,12 @@ uint32_t ClearValue(KRAL_HANDLE handle, const char* name, Key key) {
   });
 }
 
-template <class Key>
-uint32_t WriteItem(KRAL_HANDLE handle, const char* name, Key key, uint16_t* status) {
-  return OnItem(handle, name, key, [&](NVTool_Manager& tool, Diag_FTM& phone, NvItem& item) {
-    uint16_t told = 0;
-    const NvError error = tool.WriteItem(phone, item, told);
-    if (error != NvError::kNoConnection && error != NvError::kNoValue) Put(status, told);
-    return error;
-  });
-}
-
-// An operation of the tool over one file of the PC.
-uint32_t OnFile(KRAL_HANDLE handle, const char* name,
-                NvError (NVTool_Manager::*operation)(Diag_FTM& phone, const std::string& file), const char* file) {
-  return OnTool(handle, name,
-                [&](NVTool_Manager& tool, Diag_FTM& phone) { return (tool.*operation)(phone, Text(file)); });
-}
-
 }  // namespace
 
 extern "C" {
 
 uint32_t KRAL_CALL KRAL_NV_GetErrorText(KRAL_HANDLE, uint32_t code, char* text, uint32_t size) {
-  return static_cast<uint32_t>(Give(kral::nv::TextOf(code), text, size));
+  return static_cast<uint32_t>(Give(TextOf(code), text, size));
 }
 
 uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_NV_CALLBACK callback) {
@@ -221,8 +127,7 @@ uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_NV_CALLBAC
                       [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetCallback(callback); });
 }
 
-// --- Definitions
-// ------------------------------------------------------------------------------------------------------
+// --- Definitions -----------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVDefinitionFile(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_LoadNVDefinitionFile", [&](NVTool_Manager& tool, Diag_FTM& phone) {
@@ -297,8 +202,7 @@ uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenamesStringLength(KRAL_HANDLE handle, uin
   return GiveFileNames(handle, "KRAL_NV_GetNVEfsFilenamesStringLength", Length{length});
 }
 
-// --- Values
-// -----------------------------------------------------------------------------------------------------------
+// --- Values ----------------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                        uint8_t* data, uint32_t* size) {
@@ -374,128 +278,6 @@ uint32_t KRAL_CALL KRAL_NV_ClearNVValueByNVID(KRAL_HANDLE handle, uint16_t item)
 
 uint32_t KRAL_CALL KRAL_NV_ClearNVValues(KRAL_HANDLE handle) {
   return OnToolAlways(handle, "KRAL_NV_ClearNVValues", [](NVTool_Manager& tool, Diag_FTM&) { tool.ClearValues(); });
-}
-
-// --- Sets
-// -------------------------------------------------------------------------------------------------------------
-
-uint32_t KRAL_CALL KRAL_NV_LoadNVsFromMobile(KRAL_HANDLE handle) {
-  return OnTool(handle, "KRAL_NV_LoadNVsFromMobile",
-                [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.LoadFromMobile(phone); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_LoadNVsFromPKV(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadNVsFromPKV", &NVTool_Manager::LoadFromPkv, file);
-}
-
-uint32_t KRAL_CALL KRAL_NV_LoadNVsFromSource(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadNVsFromSource", &NVTool_Manager::LoadFromSource, file);
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVsToMobile(KRAL_HANDLE handle) {
-  return OnTool(handle, "KRAL_NV_WriteNVsToMobile",
-                [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.WriteToMobile(phone); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVsToPKV(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_WriteNVsToPKV", &NVTool_Manager::WriteToPkv, file);
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_WriteNVsToSource", &NVTool_Manager::WriteToSource, file);
-}
-
-// --- Single items
-// -----------------------------------------------------------------------------------------------------
-
-uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status) {
-  return OnTool(handle, "KRAL_NV_ReadNVItemFromMobileByNVID", [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    uint16_t told = 0;
-    const NvError error = tool.ReadItem(phone, item, told);
-    if (error != NvError::kNoConnection) Put(status, told);
-    return error;
-  });
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByNVID", item, status);
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t* status) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByIndex", AtIndex{index}, status);
-}
-
-uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
-  return OnTool(handle, "KRAL_NV_ReadNVItemFromMobileByEfsFilename",
-                [&](NVTool_Manager& tool, Diag_FTM& phone) { return tool.ReadItem(phone, Text(efs_file)); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByEfsFilename", efs_file, nullptr);
-}
-
-// --- Filters
-// ----------------------------------------------------------------------------------------------------------
-
-uint32_t KRAL_CALL KRAL_NV_LoadReadFilter(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadReadFilter", &NVTool_Manager::LoadReadFilter, file);
-}
-
-uint32_t KRAL_CALL KRAL_NV_LoadWriteFilter(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadWriteFilter", &NVTool_Manager::LoadWriteFilter, file);
-}
-
-uint32_t KRAL_CALL KRAL_NV_ClearReadFilters(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearReadFilters",
-                      [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearReadFilters(phone); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_ClearWriteFilters(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearWriteFilters",
-                      [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearWriteFilters(phone); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_CreateNVFilter(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_CreateNVFilter",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(Text(file), true); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_CreateComplementNVFilter",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(Text(file), false); });
-}
-
-// --- Reports
-// ----------------------------------------------------------------------------------------------------------
-
-uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
-                                    const char* html_file) {
-  return OnTool(handle, "KRAL_NV_PKV_Diff", [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    return tool.ComparePkv(phone, Text(first_pkv), Text(second_pkv), Text(html_file));
-  });
-}
-
-uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_GenerateQDF",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.GenerateQdf(Text(file)); });
-}
-
-// --- Subscriptions
-// ----------------------------------------------------------------------------------------------------
-
-uint32_t KRAL_CALL KRAL_NV_SetTargetSupportMultiSIM(KRAL_HANDLE handle, uint8_t supported) {
-  return OnToolAlways(handle, "KRAL_NV_SetTargetSupportMultiSIM",
-                      [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetMultiSim(supported != 0); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_GetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t* subscription) {
-  return OnToolAlways(handle, "KRAL_NV_GetCurrentSubscriptionIndex",
-                      [&](NVTool_Manager& tool, Diag_FTM&) { Put(subscription, tool.subscription()); });
-}
-
-uint32_t KRAL_CALL KRAL_NV_SetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t subscription) {
-  return OnTool(handle, "KRAL_NV_SetCurrentSubscriptionIndex",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.SetSubscription(subscription); });
 }
 
 }  // extern "C"

@@ -43,8 +43,7 @@ NvError SaveText(const std::string& file, const std::string& text, NvError failu
 
 }  // namespace
 
-// --- PKV files
-// --------------------------------------------------------------------------------------------------------
+// --- PKV files -------------------------------------------------------------------------------------------------------
 
 NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored) {
   auto value = FromStored(item, stored);
@@ -141,8 +140,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   return ErrorOf(outcome);
 }
 
-// --- Source files
-// -----------------------------------------------------------------------------------------------------
+// --- Source files ----------------------------------------------------------------------------------------------------
 
 NvError NVTool_Manager::LoadFromSource(Diag_FTM& phone, const std::string& file) {
   NvSource source;
@@ -224,8 +222,7 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
   return error;
 }
 
-// --- Reports
-// ----------------------------------------------------------------------------------------------------------
+// --- Reports ---------------------------------------------------------------------------------------------------------
 
 NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, const std::string& second,
                                    const std::string& page) {

@@ -28,7 +28,7 @@ extern "C" {
 /** Status of a write to an item that cannot be written. */
 #define KRAL_NV_STATUS_READ_ONLY 7u
 
-/* --- One item ------------------------------------------------------------------------------------------------------ */
+/* --- One item ----------------------------------------------------------------------------------------------------- */
 
 /**
  * Reads an item.
@@ -83,7 +83,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_ARRAY_F(KRAL_HANDLE handle, uint16_
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index,
                                                       const uint8_t* data, uint16_t length, uint16_t* status);
 
-/* --- Many items ---------------------------------------------------------------------------------------------------- */
+/* --- Many items --------------------------------------------------------------------------------------------------- */
 
 /**
  * Starts or leaves batch mode, in which writes are collected instead of sent. The queue is emptied either way.
@@ -101,12 +101,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE 
                                                                     uint16_t count);
 
 /**
- * Writes the queued items, some nine full ones in a packet, and leaves batch mode, whatever happens. The first item that
- * fails ends the flush behind its packet; items that are still queued are dropped.
+ * Writes the queued items, some nine full ones in a packet, and leaves batch mode, whatever happens. The first item
+ * that fails ends the flush behind its packet; items that are still queued are dropped.
  *
  * The outputs are written in every case, but for an unknown handle; each may be null.
  *
- * @param[out] last_error_item    id of the last item whose result was read: the failing one, if any; 65535 when none was
+ * @param[out] last_error_item    id of the last item whose result was read: the failing one, if any; 65535 when none
+ * was
  * @param[out] last_total_status  of the last packet, as the handset told
  * @param[out] last_item_status   of that item; 0 when it is read-only and in the list
  * @return 1 when every packet was answered and no item failed

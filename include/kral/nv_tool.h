@@ -65,7 +65,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GetErrorText(KRAL_HANDLE handle, uint32_t co
 /** Has a function called after each item; null for none. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_NV_CALLBACK callback);
 
-/* --- Definitions --------------------------------------------------------------------------------------------------- */
+/* --- Definitions -------------------------------------------------------------------------------------------------- */
 
 /**
  * Loads definitions. They join those that are loaded already; one for the same id or path takes the place of the older
@@ -120,14 +120,15 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenamesStringLength(KRAL_HANDLE ha
  */
 
 /** @param[in,out] size  the room of `data`; the bytes of the value, also when the room is too small */
-KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
-                                                                uint8_t* data, uint32_t* size);
+KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
+                                                                uint16_t array_index, uint8_t* data, uint32_t* size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                                uint8_t* data, uint32_t* size);
 
 /** @param size  bytes of `data`: those of the item's type, or of a value of variable size */
-KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
-                                                                const uint8_t* data, uint32_t size);
+KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
+                                                                uint16_t array_index, const uint8_t* data,
+                                                                uint32_t size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                                const uint8_t* data, uint32_t size);
 
@@ -158,7 +159,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_ClearNVValueByNVID(KRAL_HANDLE handle, uint1
 /** Takes the values of all items and all subscriptions away, and the roaming lists. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_ClearNVValues(KRAL_HANDLE handle);
 
-/* --- Moving sets --------------------------------------------------------------------------------------------------- */
+/* --- Moving sets -------------------------------------------------------------------------------------------------- */
 
 /**
  * Reads the items of the current subscription from the handset. Files that the handset keeps in its folders for item
@@ -192,7 +193,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToPKV(KRAL_HANDLE handle, const char
 /** Writes all values and roaming lists to a source file. 14: it cannot be opened; 3: it cannot be saved. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const char* file);
 
-/* --- Single items, whatever the filters say ---------------------------------------------------------------------------
+/* --- Single items, whatever the filters say -------------------------------------------------------------------------
  *
  * Of an array item all elements are read, and those that have a value are written. 12 and 11: the handset refused a
  * numbered item, with what `status` tells (it may be null); 22 and 23: an RF NV item or a file could not be read or
@@ -206,8 +207,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByIndex(KRAL_HANDLE handl
 KRAL_API uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file);
 
-/* --- Filters: 19 when the file cannot be read or written --------------------------------------------------------------
- */
+/* --- Filters: 19 when the file cannot be read or written ---------------------------------------------------------- */
 
 /** Adds to what sets that are loaded, or written, are limited to. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_LoadReadFilter(KRAL_HANDLE handle, const char* file);
@@ -222,7 +222,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_ClearWriteFilters(KRAL_HANDLE handle);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateNVFilter(KRAL_HANDLE handle, const char* file);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const char* file);
 
-/* --- Reports ------------------------------------------------------------------------------------------------------- */
+/* --- Reports ------------------------------------------------------------------------------------------------------ */
 
 /**
  * Compares two PKV files in a page of HTML, with values decoded by the definitions that are loaded. Values in the tool
@@ -233,10 +233,11 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle,
 KRAL_API uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                              const char* html_file);
 
-/** Writes all values as a list: item, name, subscription, array index, value; tabs between. 15: it cannot be written. */
+/** Writes all values as a list: item, name, subscription, array index, value; tabs between. 15: it cannot be written.
+ */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file);
 
-/* --- Subscriptions ------------------------------------------------------------------------------------------------- */
+/* --- Subscriptions ------------------------------------------------------------------------------------------------ */
 
 /**
  * Tells whether the handset knows subscriptions (1): numbered items are then read and written with the requests that

@@ -117,7 +117,7 @@ TEST_F(Nv, ReadNeedsAnAnswerAsLongAsItsRequest) {
   EXPECT_EQ(handset().request_count(), before);
 }
 
-// --- Batch mode -----------------------------------------------------------------------------------------------------
+// --- Batch mode ------------------------------------------------------------------------------------------------------
 
 class NvBatchMode : public Nv {
  protected:
@@ -234,7 +234,7 @@ TEST_F(NvBatchMode, FailingItemOrPacketEndsTheFlush) {
       1u);
 }
 
-// --- Against the model ----------------------------------------------------------------------------------------------
+// --- Against the model -----------------------------------------------------------------------------------------------
 
 TEST_F(Nv, SubscriptionsAndElementsAreKeptApart) {
   handset().nv().MakeArray(30, 2);

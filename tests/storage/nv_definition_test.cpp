@@ -19,8 +19,7 @@ using nv::NvMember;
 
 class NvDefinition : public test::NvToolTest {};
 
-// --- Values
-// -----------------------------------------------------------------------------------------------------------
+// --- Values ----------------------------------------------------------------------------------------------------------
 
 TEST(NvDataTypeTest, NumbersTurnIntoBytesAndBackWithinTheirRanges) {
   const NvDataType words("", {{std::nullopt, {{"w", 1, false, 2}, {"s", 2, true, 1}, {"d", 4, false, 1}}}}, false);
@@ -101,8 +100,7 @@ TEST(NvCompression, StreamsEndWhereTheySay) {
   EXPECT_FALSE(nv::Decompress({}, 5000));
 }
 
-// --- Definition files
-// -------------------------------------------------------------------------------------------------
+// --- Definition files ------------------------------------------------------------------------------------------------
 
 TEST_F(NvDefinition, ExampleHasItemsOfEveryKind) {
   ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), test::ExampleDefinitions().c_str()), 0u) << ErrorText();

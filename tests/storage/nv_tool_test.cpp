@@ -42,8 +42,7 @@ class NvTool : public test::NvToolTest {
   }
 };
 
-// --- The handset
-// ------------------------------------------------------------------------------------------------------
+// --- The handset -----------------------------------------------------------------------------------------------------
 
 // Every kind of item goes to the handset and comes back, and again through both kinds of files.
 TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
@@ -216,8 +215,7 @@ TEST_F(NvTool, LostAnswersAreAskedForAgainAndAPulledCableEndsTheSet) {
   EXPECT_EQ(Value(2), "4,5") << "what the handset could not be asked for stays";
 }
 
-// --- Callback
-// ---------------------------------------------------------------------------------------------------------
+// --- Callback --------------------------------------------------------------------------------------------------------
 
 std::vector<std::string>& Calls() {
   static std::vector<std::string> calls;
@@ -246,8 +244,7 @@ TEST_F(NvTool, CallbackTellsEveryItem) {
   EXPECT_EQ(Calls(), (std::vector<std::string>{"4 1/1 NV ID 1 0"}));
 }
 
-// --- Source files
-// -----------------------------------------------------------------------------------------------------
+// --- Source files ----------------------------------------------------------------------------------------------------
 
 TEST_F(NvTool, SourceFileIsWrittenByTheLetter) {
   ASSERT_EQ(Load(Item(1, "a &lt;b&gt; &quot;c&quot; &amp; d") + "<NvEfsItem fullpathname='/nv/x&amp;y' name='file'>" +
@@ -306,8 +303,7 @@ TEST_F(NvTool, SourceItemsThatCannotBeTakenLeaveTheOthers) {
   EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), Path("no/such/folder.xml").c_str()), 14u);
 }
 
-// --- PKV files
-// --------------------------------------------------------------------------------------------------------
+// --- PKV files -------------------------------------------------------------------------------------------------------
 
 TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
   handset().nv().MakeArray(30, 3);
@@ -339,8 +335,7 @@ TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
   EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), Path("empty.pkv").c_str()), 10u);
 }
 
-// --- Filters
-// ----------------------------------------------------------------------------------------------------------
+// --- Filters ---------------------------------------------------------------------------------------------------------
 
 TEST_F(NvTool, FiltersAddUpAndLimitWhatMoves) {
   ASSERT_EQ(Load(Item(1, "GSM_A") + Item(2, "LTE_A") + Item(3, "LTE_B") + Item(40, "W") +
@@ -392,8 +387,7 @@ TEST_F(NvTool, FiltersAddUpAndLimitWhatMoves) {
   EXPECT_EQ(KRAL_NV_CreateNVFilter(handle(), Path("no/such/folder").c_str()), 19u);
 }
 
-// --- Reports
-// ----------------------------------------------------------------------------------------------------------
+// --- Reports ---------------------------------------------------------------------------------------------------------
 
 TEST_F(NvTool, ComparisonShowsWhatDiffers) {
   ASSERT_EQ(Load(Item(1, "SAME") + Item(2, "A&amp;B") + Item(3, "LEFT") + Item(4, "RIGHT")), 0u);
