@@ -1,9 +1,6 @@
 // Reads and writes RF NV items through the RF NV dispatcher of factory test mode.
 #include "commands/rf_nv.h"
 
-#include <array>
-#include <cstdio>
-
 #include "commands/ftm_frame.h"
 #include "commands/nv_item.h"
 #include "frame/base/little_endian.h"
@@ -21,6 +18,10 @@ constexpr size_t kStatus = 2;
 constexpr size_t kSize = 4;
 constexpr size_t kData = 6;
 
+bool ReachesDispatchers(const Diag_FTM& phone) {
+  return phone.ftm().command_code == ftm::kCommandCode75 && phone.ftm().queue_mode == 0;
+}
+
 // Sends what the packet buffer holds; the reply behind its header, or nothing when it is not about the item.
 bool Exchange(Diag_FTM& phone, u16 item, std::span<const u8>& reply, u16& status) {
   if (!ftm::Transmit(phone)) return false;
@@ -36,13 +37,8 @@ bool Exchange(Diag_FTM& phone, u16 item, std::span<const u8>& reply, u16& status
 
 }  // namespace
 
-std::string RfPath(uint32_t item) {
-  std::array<char, 40> path{};
-  std::snprintf(path.data(), path.size(), "/nv/item_files/rfnv/%08u", static_cast<unsigned>(item));
-  return path.data();
-}
-
 bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t& status) {
+  if (!ReachesDispatchers(phone)) return false;
   ftm::BeginCommand(phone, kModeIdRfNv, ftm::HeaderForm::kPlain, kRead);
   phone.packet().Append16(item);
   std::span<const u8> reply;
@@ -59,7 +55,7 @@ bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t
 }
 
 bool WriteRf(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
-  if (data.size() > kRfDataSize) return false;
+  if (data.size() > kRfDataSize || !ReachesDispatchers(phone)) return false;
   ftm::BeginCommand(phone, kModeIdRfNv, ftm::HeaderForm::kPlain, kWrite);
   phone.packet().Append16(item);
   phone.packet().Append16(static_cast<u16>(data.size()));

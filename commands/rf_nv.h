@@ -9,7 +9,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <span>
-#include <string>
 #include <vector>
 
 namespace kral {
@@ -20,10 +19,8 @@ namespace nv {
 
 inline constexpr size_t kRfDataSize = 4000;  // what a request and its reply have room for
 
-// "/nv/item_files/rfnv/00020001"
-std::string RfPath(uint32_t item);
-
-// True when the handset answered; the data and their size count only with status 0.
+// True when the handset answered; the data count only with status 0. False without traffic under command code 59, which
+// has no dispatchers, and while requests are queued.
 bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t& status);
 bool WriteRf(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status);
 

@@ -1,4 +1,5 @@
-// Reads and writes items on the handset: plain, of one subscription, elements, RF NV items, files.
+// Chooses the way to each kind of item: numbered, RF NV dispatcher, file. The requests are those of backups, which tell
+// late answers from this request's own.
 #include "storage/nv_mobile.h"
 
 #include <algorithm>
@@ -6,157 +7,101 @@
 #include "commands/nv_item.h"
 #include "commands/rf_nv.h"
 #include "storage/efs_client.h"
-#include "storage/efs_request.h"
 
 namespace kral::nv {
 namespace {
 
-// As handsets have them: some without the slash in front.
-constexpr const char* kItemFolders[] = {"/nv/items", "nv/item_files/conf", "nv/reg_files/conf", "/nv/item_files/rfnv",
-                                        "nv/item_store/rfnv"};
-constexpr int kDeepestFolder = 8;
-constexpr uint32_t kEntriesAtFirst = 1024;
-constexpr size_t kMostFiles = 20000;
-
 using Kind = NvAnswer::Kind;
+using Answer = PhoneItems::Answer;
 
-// Sends once more when the handset is there and only this request went unanswered.
-template <class Ask>
-NvAnswer Persistently(Diag_FTM& phone, Ask ask) {
-  NvAnswer answer = ask();
-  if (answer.kind != Kind::kNoAnswer || !phone.IsPhoneConnected()) return answer;
-  answer = ask();
-  if (answer.kind == Kind::kNoAnswer && phone.IsPhoneConnected()) answer.kind = Kind::kRefused;
-  return answer;
-}
+constexpr uint32_t kPlainFile = 0x8000;
 
 }  // namespace
 
-NvAnswer NvMobile::Judged(bool answered, uint16_t status) const {
-  if (answered) return {status == kDone ? Kind::kOk : Kind::kRefused, status};
-  return {efs::LastRefusal(phone_) != 0 ? Kind::kRefused : Kind::kNoAnswer, 0};
+NvAnswer NvMobile::Judged(Answer answer, uint16_t status) {
+  switch (answer) {
+    case Answer::kAnswered:
+      return {status == kDone ? Kind::kOk : Kind::kRefused, status};
+    case Answer::kRefused:
+      return {Kind::kRefused};
+    case Answer::kLost:
+      break;
+  }
+  return {phone_.IsPhoneConnected() ? Kind::kRefused : Kind::kNoAnswer};
+}
+
+PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
+  PkvNvItem numbered;
+  numbered.id = *item.id;
+  numbered.index = element;
+  numbered.subscription = item.is_array() ? uint16_t{0} : subscription_;
+  return numbered;
 }
 
 NvAnswer NvMobile::Read(const NvItem& item, uint16_t element, NvBytes& stored) {
-  return Persistently(phone_, [&] { return ReadOnce(item, element, stored); });
-}
-
-NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored) {
-  return Persistently(phone_, [&] { return WriteOnce(item, element, stored); });
-}
-
-NvAnswer NvMobile::ReadOnce(const NvItem& item, uint16_t element, NvBytes& stored) {
-  uint16_t status = kDone;
   if (item.is_file()) {
+    uint16_t status = kDone;
     // Outside factory test mode the same bytes are read from the item's file.
     if (item.id && has_rf_dispatcher_) {
-      if (ReadRf(phone_, *item.id, stored, status)) return Judged(true, status);
+      if (ReadRf(phone_, *item.id, stored, status)) return Judged(Answer::kAnswered, status);
       has_rf_dispatcher_ = false;
     }
     return ReadFile(item, stored);
   }
-  stored.assign(item.is_array() ? kDataSize - 1 : kDataSize, 0);
-  bool answered = false;
-  if (item.is_array()) {
-    answered = ReadElement(phone_, *item.id, static_cast<uint8_t>(element), stored, status);
-  } else if (multi_sim_) {
-    answered = ReadExtended(phone_, *item.id, subscription_, stored, status);
-  } else {
-    answered = nv::Read(phone_, *item.id, stored, status);
-  }
-  phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, status);
-  return Judged(answered, status);
+  PkvNvItem numbered = Numbered(item, element);
+  const Answer answer = items_.Read(numbered, item.is_array());
+  const size_t size = item.is_array() ? kDataSize - 1 : kDataSize;
+  stored.assign(numbered.data.begin(), numbered.data.begin() + static_cast<std::ptrdiff_t>(size));
+  phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, numbered.status);
+  return Judged(answer, numbered.status);
 }
 
-NvAnswer NvMobile::WriteOnce(const NvItem& item, uint16_t element, std::span<const uint8_t> stored) {
+NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored) {
   uint16_t status = kDone;
   if (item.is_file()) {
     if (item.id && has_rf_dispatcher_) {
-      if (WriteRf(phone_, *item.id, stored, status)) return Judged(true, status);
+      if (WriteRf(phone_, *item.id, stored, status)) return Judged(Answer::kAnswered, status);
       has_rf_dispatcher_ = false;
     }
     return WriteFile(item, stored);
   }
-  bool answered = false;
-  if (item.is_array()) {
-    answered = WriteElement(phone_, *item.id, static_cast<uint8_t>(element), stored, status);
-  } else if (multi_sim_) {
-    answered = WriteExtended(phone_, *item.id, subscription_, stored, status);
-  } else {
-    answered = nv::Write(phone_, *item.id, stored, status);
-  }
+  PkvNvItem numbered = Numbered(item, element);
+  std::copy_n(stored.begin(), std::min(stored.size(), numbered.data.size()), numbered.data.begin());
+  const Answer answer = items_.Write(numbered, item.is_array(), status);
   phone_.log().WriteLine(kLogRet, "DIAG_NV_WRITE_F NV Id:%d Status:%d", *item.id, status);
-  return Judged(answered, status);
+  return Judged(answer, status);
 }
 
 NvAnswer NvMobile::ReadFile(const NvItem& item, NvBytes& stored) {
   efs::FileStatus status;
-  if (!efs::Stat(phone_, item.path.c_str(), status)) return Judged(false, 0);
+  if (!efs::Stat(phone_, item.path.c_str(), status)) return Judged(Answer::kLost, 0);
   if (!status.exists()) return {Kind::kRefused, kNeverWritten};
   if (status.size > kLongestValue) {
     phone_.log().WriteLine(kLogErr, "%s has %u bytes, too many for an item", item.path.c_str(), status.size);
     return {Kind::kRefused};
   }
-  auto size = status.size;
-  stored.resize(size);
-  if (!efs::ReadToMemory(phone_, item.path.c_str(), stored.data(), &size)) return Judged(false, 0);
-  stored.resize(size);
-  return {Kind::kOk};
+  PkvEfsFile file{item.path, status.mode, {}};
+  uint32_t error = 0;
+  const Answer answer = items_.ReadFile(file, error);
+  if (answer != Answer::kAnswered) return Judged(answer, 0);
+  stored = std::move(file.bytes);
+  return {error == 0 ? Kind::kOk : Kind::kRefused};
 }
 
 NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored) {
-  const char* const path = item.path.c_str();
   efs::FileStatus status;
-  if (!efs::Stat(phone_, path, status)) return Judged(false, 0);
-  const auto size = static_cast<uint32_t>(stored.size());
-  // What is a plain file already stays one.
-  const bool as_item_file = size <= KRAL_EFS_ITEM_SIZE && (!status.exists() || status.is_item_file());
-  const auto write = [&] {
-    return as_item_file ? efs::PutItemFromMemory(phone_, path, stored.data(), size)
-                        : efs::WriteFromMemory(phone_, stored.data(), size, path);
-  };
-  if (write() || (!status.exists() && MakeParents(item.path) && write())) return {Kind::kOk};
-  return phone_.IsPhoneConnected() ? NvAnswer{Kind::kRefused} : NvAnswer{Kind::kNoAnswer};
+  if (!efs::Stat(phone_, item.path.c_str(), status)) return Judged(Answer::kLost, 0);
+  // What is a plain file already stays one; permissions of files that are there stay, too.
+  const bool as_item_file = stored.size() <= KRAL_EFS_ITEM_SIZE && (!status.exists() || status.is_item_file());
+  const uint32_t mode = as_item_file ? uint32_t{KRAL_EFS_MODE_ITEM_FILE} : kPlainFile;
+  uint32_t error = 0;
+  const Answer answer = items_.WriteFile({item.path, mode, {stored.begin(), stored.end()}}, error);
+  if (answer != Answer::kAnswered) return Judged(answer, 0);
+  return {error == 0 ? Kind::kOk : Kind::kRefused};
 }
 
-bool NvMobile::MakeParents(const std::string& path) {
-  for (size_t slash = path.find('/', 1); slash != std::string::npos; slash = path.find('/', slash + 1)) {
-    if (!efs::MakeDirectory(phone_, path.substr(0, slash).c_str(), nullptr)) return false;
-  }
-  return true;
-}
-
-bool NvMobile::ListItemFiles(std::vector<std::pair<std::string, uint32_t>>& files) {
-  for (const char* folder : kItemFolders) {
-    // A folder that is not there is asked for once; listing it would try again and again.
-    efs::FileStatus status;
-    if (!efs::Stat(phone_, folder, status)) {
-      if (efs::LastRefusal(phone_) != 0) return true;  // a handset without files
-      if (!phone_.IsPhoneConnected() || !efs::Stat(phone_, folder, status)) return false;
-    }
-    if (status.exists() && !ListFolder(folder, kDeepestFolder, files)) return false;
-  }
-  return true;
-}
-
-bool NvMobile::ListFolder(const std::string& folder, int depth, std::vector<std::pair<std::string, uint32_t>>& files) {
-  std::vector<KRAL_EFS_ENTRY> entries(kEntriesAtFirst);
-  uint32_t count = kEntriesAtFirst;
-  for (;;) {
-    const auto room = static_cast<uint32_t>(entries.size());
-    if (!efs::ListDirectory(phone_, folder.c_str(), KRAL_EFS_FILTER_ALL, entries.data(), &count)) return false;
-    if (count <= room) break;
-    entries.resize(count);
-  }
-  for (uint32_t i = 0; i < count && files.size() < kMostFiles; ++i) {
-    const KRAL_EFS_ENTRY& entry = entries[i];
-    if (entry.type == KRAL_EFS_ENTRY_FILE) {
-      files.emplace_back(entry.name, entry.size);
-    } else if (entry.type == KRAL_EFS_ENTRY_DIRECTORY && depth > 0 && !ListFolder(entry.name, depth - 1, files)) {
-      return false;
-    }
-  }
-  return true;
+bool NvMobile::ListItemFiles(std::vector<PhoneItems::FoundFile>& files) {
+  return items_.FindFiles(files) == Answer::kAnswered;
 }
 
 }  // namespace kral::nv

@@ -1,15 +1,13 @@
-// Items on the handset: one at a time, whatever their kind.
+// Items on the handset as the NV tool's sets need them: one at a time, whatever their kind.
 #ifndef KRAL_STORAGE_NV_MOBILE_H
 #define KRAL_STORAGE_NV_MOBILE_H
 
 #include <cstdint>
 #include <span>
-#include <string>
-#include <utility>
 #include <vector>
 
-#include "frame/diag_ftm.h"
 #include "storage/nv_definitions.h"
+#include "storage/phone_items.h"
 
 namespace kral::nv {
 
@@ -26,30 +24,26 @@ struct NvAnswer {
 // One walk over items: what it has found out about the handset, it does not ask again.
 class NvMobile {
  public:
-  // With `multi_sim` numbered items are those of the subscription; without, the plain requests serve.
-  NvMobile(Diag_FTM& phone, bool multi_sim, uint16_t subscription)
-      : phone_(phone), multi_sim_(multi_sim), subscription_(subscription) {}
+  // Plain items are those of the subscription; elements of arrays have no request that names one.
+  NvMobile(Diag_FTM& phone, uint16_t subscription) : phone_(phone), subscription_(subscription), items_(phone) {}
 
-  // Values as they are kept (storage/nv_value.h). A request that gets no answer is repeated once when the handset
-  // still answers others.
+  // Values as they are kept (storage/nv_value.h). What gets no answer in spite of several tries counts as refused as
+  // long as the handset answers others.
   NvAnswer Read(const NvItem& item, uint16_t element, NvBytes& stored);
   NvAnswer Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored);
 
-  // Paths and sizes of the files below the folders in which handsets keep item files. False when it does not answer.
-  bool ListItemFiles(std::vector<std::pair<std::string, uint32_t>>& files);
+  // The files in the folders in which handsets keep item files. False when they could not all be listed.
+  bool ListItemFiles(std::vector<PhoneItems::FoundFile>& files);
 
  private:
-  NvAnswer ReadOnce(const NvItem& item, uint16_t element, NvBytes& stored);
-  NvAnswer WriteOnce(const NvItem& item, uint16_t element, std::span<const uint8_t> stored);
   NvAnswer ReadFile(const NvItem& item, NvBytes& stored);
   NvAnswer WriteFile(const NvItem& item, std::span<const uint8_t> stored);
-  NvAnswer Judged(bool answered, uint16_t status) const;
-  bool ListFolder(const std::string& folder, int depth, std::vector<std::pair<std::string, uint32_t>>& files);
-  bool MakeParents(const std::string& path);
+  NvAnswer Judged(PhoneItems::Answer answer, uint16_t status);
+  PkvNvItem Numbered(const NvItem& item, uint16_t element) const;
 
   Diag_FTM& phone_;
-  const bool multi_sim_;
   const uint16_t subscription_;
+  PhoneItems items_;
   bool has_rf_dispatcher_ = true;  // until it refuses
 };
 

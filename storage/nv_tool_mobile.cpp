@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "commands/rf_nv.h"
 #include "storage/nv_tool.h"
 #include "storage/nv_value.h"
 
@@ -25,7 +24,7 @@ size_t CountElements(const std::vector<NvItem*>& items) {
 }  // namespace
 
 NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
-  NvMobile mobile(phone, multi_sim_, subscription_);
+  NvMobile mobile(phone, subscription_);
   if (!DefineItemFiles(phone, mobile)) return NvError::kNoConnection;
   const std::vector<NvItem*> items = Chosen(&NvItem::will_read);
   Walk walk(*this, KRAL_NV_OPERATION_READ_MOBILE, CountElements(items));
@@ -42,12 +41,12 @@ NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
 
 // False when the handset does not answer any more.
 bool NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
-  std::vector<std::pair<std::string, uint32_t>> files;
+  std::vector<PhoneItems::FoundFile> files;
   if (!mobile.ListItemFiles(files)) {
     if (!phone.IsPhoneConnected()) return false;
     phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
   }
-  for (const auto& [path, size] : files) {
+  for (const auto& [path, mode, size] : files) {
     const std::string other = path.starts_with('/') ? path.substr(1) : "/" + path;
     if (definitions_.Find(path) != nullptr || definitions_.Find(other) != nullptr) continue;
     if (size > kLongestValue || path.size() > kLongestGenericPath || !IsPrintable(path)) {
@@ -75,7 +74,7 @@ NvError NVTool_Manager::ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& i
 }
 
 NvError NVTool_Manager::ReadWhole(Diag_FTM& phone, NvItem& item, uint16_t& status) {
-  NvMobile mobile(phone, multi_sim_, subscription_);
+  NvMobile mobile(phone, subscription_);
   NvError result = NvError::kNone;
   for (uint32_t element = 0; element <= item.max_index; ++element) {
     uint16_t told = 0;
@@ -97,7 +96,7 @@ NvError NVTool_Manager::ReadItem(Diag_FTM& phone, uint16_t id, uint16_t& status)
   const NvError error = ReadWhole(phone, generic, status);
   if (error == NvError::kNone) Define(phone, std::move(generic));
   if (error == NvError::kNone || error == NvError::kNoConnection) return error;
-  return ReadItem(phone, RfPath(id)) == NvError::kNone ? NvError::kNone : error;
+  return ReadItem(phone, pkv::RfNvPath(id)) == NvError::kNone ? NvError::kNone : error;
 }
 
 NvError NVTool_Manager::ReadItem(Diag_FTM& phone, const std::string& path) {
@@ -138,7 +137,7 @@ NvError NVTool_Manager::WriteToMobile(Diag_FTM& phone) {
       if (slot == SlotOf(*item, slot.element)) values.push_back({item, slot, &bytes});
     }
   }
-  NvMobile mobile(phone, multi_sim_, subscription_);
+  NvMobile mobile(phone, subscription_);
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_MOBILE, values.size());
   for (const auto& [item, slot, bytes] : values) {
     uint16_t status = 0;
@@ -150,7 +149,7 @@ NvError NVTool_Manager::WriteToMobile(Diag_FTM& phone) {
 }
 
 NvError NVTool_Manager::WriteItem(Diag_FTM& phone, const NvItem& item, uint16_t& status) {
-  NvMobile mobile(phone, multi_sim_, subscription_);
+  NvMobile mobile(phone, subscription_);
   NvError result = NvError::kNoValue;
   for (const auto& [slot, value] : item.values) {
     if (slot != SlotOf(item, slot.element)) continue;

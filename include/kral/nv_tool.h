@@ -19,8 +19,8 @@
  *   the zero included; a buffer that is too small gives 12 and stays as it is.
  * - Functions that move a set go on behind an item that fails, and say in the text log which it was. The files that
  *   they write are replaced in one step. What moves is limited by the filters, if any are loaded.
- * - A request to the handset may wait for time-out 0 (4,000 ms). One that gets no answer is repeated once when the
- *   handset still answers others; when it does not, the function ends with 16.
+ * - A request to the handset may wait for time-out 0 (4,000 ms). One that gets no answer is tried 3 times and then
+ * counts as refused when the handset still answers others; when it does not, the function ends with 16.
  */
 #ifndef KRAL_NV_TOOL_H
 #define KRAL_NV_TOOL_H
@@ -240,8 +240,8 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* 
 /* --- Subscriptions ------------------------------------------------------------------------------------------------ */
 
 /**
- * Tells whether the handset knows subscriptions (1): numbered items are then read and written with the requests that
- * name one. Else (0, as it is at first) the plain requests serve and the current subscription becomes 0.
+ * Tells whether the handset knows subscriptions (1): numbered items of another than 0 are then read and written with
+ * the requests that name it. Without (0, as it is at first) the current subscription becomes 0.
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetTargetSupportMultiSIM(KRAL_HANDLE handle, uint8_t supported);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t* subscription);

@@ -12,6 +12,7 @@
 #include "commands/nv_item.h"
 #include "commands/rf_nv.h"
 #include "frame/resource_manager.h"
+#include "kral/ftm.h"
 #include "tests/support/handset_connection.h"
 
 namespace kral {
@@ -270,7 +271,6 @@ TEST_F(Nv, RfItemsNeedFactoryTestMode) {
   EXPECT_EQ(status_, 5);
   EXPECT_TRUE(nv::WriteRf(*phone, 20001, value, status_));
   EXPECT_EQ(handset().efs().File("/nv/item_files/rfnv/00020001"), value);
-  EXPECT_EQ(nv::RfPath(20001), "/nv/item_files/rfnv/00020001");
   EXPECT_TRUE(nv::ReadRf(*phone, 20001, read, status_));
   EXPECT_EQ(read, value);
   for (const char* reply : {"4B 0B 24 00 00 00 21 4E 00 00 04 00 01 02 03", "4B 0B 24 00 00 00 22 4E 00 00 00 00",
@@ -278,6 +278,11 @@ TEST_F(Nv, RfItemsNeedFactoryTestMode) {
     handset().Expect("4B 0B 24 00 00 00 21 4E").Reply(reply);
     EXPECT_FALSE(nv::ReadRf(*phone, 20001, read, status_)) << reply;
   }
+  KRAL_FTM_SET_COMMAND_CODE(handle(), 59);
+  const uint64_t before = handset().request_count();
+  EXPECT_FALSE(nv::WriteRf(*phone, 20001, value, status_));
+  EXPECT_FALSE(nv::ReadRf(*phone, 20001, read, status_));
+  EXPECT_EQ(handset().request_count(), before);
 }
 
 }  // namespace

@@ -207,6 +207,12 @@ TEST_F(NvTool, LostAnswersAreAskedForAgainAndAPulledCableEndsTheSet) {
   handset().faults().Add(handset::Lose(), handset::When::Nth(2).Of("27"));
   EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
   EXPECT_EQ(CountRequests("27"), 4u);
+  // A late answer is not taken for the next item's.
+  handset().faults().Add(handset::AfterNextRequest(), handset::When::Nth(1).Of("26"));
+  handset().nv().Set(2, FromHex("06 06"));
+  KRAL_NV_LoadNVsFromMobile(handle());
+  EXPECT_EQ(Value(1) + " " + Value(2) + " " + Value(3), "4,5 6,6 4,5");
+  Set(2, "4,5");
   handset().faults().Add(handset::HangUp(), handset::When::Nth(2).Of("26"));
   EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 16u);
   uint16_t status = 9;
