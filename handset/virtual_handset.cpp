@@ -41,7 +41,9 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       mode_service_(std::make_shared<OperatingMode>(*nv_, clock)),
       ftm_(std::make_shared<FtmService>(*mode_service_)),
       memory_(std::make_shared<Memory>()),
-      maintenance_(std::make_shared<Maintenance>(identity.service_code)) {
+      maintenance_(std::make_shared<Maintenance>(identity.service_code)),
+      programmer_(std::make_shared<FlashProgrammer>(flash_)),
+      loader_(std::make_shared<KovaLoader>(*memory_, programmer_)) {
   ftm_->SetDispatcher(kRfNvModeId, [efs = efs_](uint16_t command, ByteView payload) {
     return CarryOutRfNv(*efs, command, payload);
   });
@@ -50,6 +52,7 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
            identity_, nv_, efs_, logs_, mode_service_, ftm_, memory_, maintenance_}) {
     AddServiceLocked(service);
   }
+  mode_service_->SetLoader(loader_);
 }
 
 VirtualHandset::~VirtualHandset() = default;

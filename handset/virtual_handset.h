@@ -21,9 +21,12 @@
 #include "handset/bytes.h"
 #include "handset/efs_service.h"
 #include "handset/faults.h"
+#include "handset/flash_memory.h"
+#include "handset/flash_programmer.h"
 #include "handset/frame_codec.h"
 #include "handset/ftm_service.h"
 #include "handset/identity.h"
+#include "handset/kova_loader.h"
 #include "handset/log_service.h"
 #include "handset/maintenance.h"
 #include "handset/memory.h"
@@ -87,6 +90,10 @@ class VirtualHandset {
   NvStore& nv() { return *nv_; }
   EfsService& efs() { return *efs_; }
   LogService& logs() { return *logs_; }
+  FlashMemory& flash() { return flash_; }
+  KovaLoader& loader() { return *loader_; }              // after the download request
+  FlashProgrammer& programmer() { return *programmer_; }  // what the loaders start
+  std::shared_ptr<FlashProgrammer> programmer_mode() { return programmer_; }
   Clock& clock() { return clock_; }
 
   // --- What it has heard ------------------------------------------------------------------------------------------
@@ -150,6 +157,9 @@ class VirtualHandset {
   std::shared_ptr<FtmService> ftm_;
   std::shared_ptr<Memory> memory_;
   std::shared_ptr<Maintenance> maintenance_;
+  FlashMemory flash_;
+  std::shared_ptr<FlashProgrammer> programmer_;
+  std::shared_ptr<KovaLoader> loader_;
 };
 
 }  // namespace kral::handset
