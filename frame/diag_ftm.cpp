@@ -130,6 +130,9 @@ bool Diag_FTM::SetReceiveMode(ReceiveMode mode) {
 DataLogFileHandler& Diag_FTM::log() {
   return parts_->log;
 }
+std::shared_ptr<void> Diag_FTM::KeepParts() {
+  return parts_;
+}
 CKralThreadInterface& Diag_FTM::transport() {
   return *parts_->transport;
 }

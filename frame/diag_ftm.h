@@ -104,6 +104,8 @@ class Diag_FTM {
   CaptureWriter& capture();
   CapturePlayer& player();
   Clock& clock() { return clock_; }
+  // Keeps log, queues and transport: for a family's thread that may outlive its operation.
+  std::shared_ptr<void> KeepParts();
 
   // --- Settings ---------------------------------------------------------------------------------------------------
   bool server_mode() const { return server_ != nullptr; }
@@ -126,6 +128,8 @@ class Diag_FTM {
   EfsSettings& efs() { return efs_; }
   NvBatch& nv_batch() { return nv_batch_; }
   PkvSettings& pkv() { return pkv_; }
+  DownloadSettings& download() { return download_; }
+  const DownloadSettings& download() const { return download_; }
   // The version response as last received: deliberately never cleared between calls.
   std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
 
@@ -160,6 +164,7 @@ class Diag_FTM {
   EfsSettings efs_;
   NvBatch nv_batch_;
   PkvSettings pkv_;
+  DownloadSettings download_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
 
   OpenArguments last_open_;

@@ -7,6 +7,7 @@
 #include <deque>
 #include <vector>
 
+#include "kral/download.h"
 #include "kral/efs.h"
 #include "kral/pkv.h"
 
@@ -66,6 +67,18 @@ struct PkvSettings {
   uint16_t last_item = 9999;
   uint16_t subscriptions = 1;
   KRAL_PKV_COUNTS counts{};
+};
+
+// Set from any thread, also while a download runs.
+struct DownloadSettings {
+  std::atomic<bool> abort{false};
+  std::atomic<KRAL_DOWNLOAD_PROGRESS_CALLBACK> progress_callback{nullptr};
+  std::atomic<uintptr_t> callback_value{0};
+  std::atomic<uint32_t> hello_tries{5};
+  std::atomic<uint32_t> hello_retry_delay_ms{500};
+  // Bounds of single waits in the handshakes and for acknowledgements; set in tests only.
+  uint32_t handshake_limit_ms = UINT32_MAX;
+  uint32_t acknowledge_limit_ms = UINT32_MAX;
 };
 
 }  // namespace kral

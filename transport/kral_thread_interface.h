@@ -68,6 +68,9 @@ class CKralThreadInterface {
   // Awaits no reply.
   bool SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
 
+  // Empties the response queue of what was read before this call; every synchronous request begins with it.
+  void ForgetReplies();
+
   bool SetPacketMode(uint32_t mode);
   // Whether that change is the handset's as well as ours.
   bool NeedsPhoneFor(uint32_t mode) const;
@@ -97,7 +100,6 @@ class CKralThreadInterface {
   bool RunThread(std::shared_ptr<void> owner);
   void WakeReceiver();
 
-  void ForgetReplies();
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
   bool AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
                      uint8_t expected_code, uint32_t time_out_ms);

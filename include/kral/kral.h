@@ -27,6 +27,7 @@
 #include "kral/band.h"
 #include "kral/connection.h"
 #include "kral/diag.h"
+#include "kral/download.h"
 #include "kral/efs.h"
 #include "kral/ftm.h"
 #include "kral/log.h"

@@ -1,0 +1,167 @@
+// The operations behind the exports: arguments to images and commands, outcomes to result codes.
+#include "download/download_client.h"
+
+#include <optional>
+
+#include "download/download_connection.h"
+#include "download/image_file.h"
+#include "download/image_set_up.h"
+#include "download/kova.h"
+#include "download/stream_format.h"
+#include "download/stream_hello.h"
+#include "download/write_image.h"
+
+namespace kral::download {
+namespace {
+
+bool Give(uint32_t value, uint32_t* result) {
+  if (result != nullptr) *result = value;
+  return value == KRAL_STREAM_WRITTEN;
+}
+
+uint32_t ResultOf(WriteOutcome outcome) {
+  switch (outcome) {
+    case WriteOutcome::kDone:
+      return KRAL_STREAM_WRITTEN;
+    case WriteOutcome::kNotOpened:
+      return KRAL_STREAM_OPEN_FAILED;
+    case WriteOutcome::kNoThread:
+    case WriteOutcome::kThreadNotStarted:
+      return KRAL_STREAM_NO_THREAD;
+    case WriteOutcome::kNotWritten:
+      return KRAL_STREAM_WRITE_FAILED;
+    case WriteOutcome::kNotCompleted:
+      return KRAL_STREAM_NOT_COMPLETED;
+    case WriteOutcome::kThreadNotStopped:
+      return KRAL_STREAM_THREAD_STUCK;
+    case WriteOutcome::kNotClosed:
+      return KRAL_STREAM_CLOSE_FAILED;
+    case WriteOutcome::kAborted:
+      return KRAL_DOWNLOAD_ABORTED;
+  }
+  return KRAL_STREAM_WRITE_FAILED;
+}
+
+uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImage* header,
+                    const WriteArguments& arguments) {
+  const WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
+  try {
+    switch (arguments.method) {
+      case KRAL_STREAM_MULTI_IMAGE:
+        return ResultOf(CWriteImageFramed(connection).Write(image, arguments.image_type, header, requested));
+      case KRAL_STREAM_NOR:
+        return ResultOf(CWriteNORImageFramed(connection).Write(image, arguments.image_type, header, requested));
+      default:
+        return KRAL_STREAM_BAD_ARGUMENT;
+    }
+  } catch (const PhoneImageException& exception) {
+    connection.log().WriteLine(kLogErr, "%s at 0x%08X, size 0x%X", exception.what(), exception.address(),
+                               exception.count());
+    return KRAL_STREAM_WRITE_FAILED;
+  }
+}
+
+bool IsNull(const CallersBytes& bytes) {
+  return bytes.data == nullptr && bytes.size != 0;
+}
+
+}  // namespace
+
+bool SetCallback(Diag_FTM& phone, KRAL_DOWNLOAD_PROGRESS_CALLBACK callback, uintptr_t value) {
+  phone.download().callback_value = value;
+  phone.download().progress_callback = callback;
+  return true;
+}
+
+bool Abort(Diag_FTM& phone) {
+  phone.download().abort = true;
+  return true;
+}
+
+bool ConfigureHello(Diag_FTM& phone, uint32_t tries, uint32_t delay_ms) {
+  phone.download().hello_tries = tries;
+  phone.download().hello_retry_delay_ms = delay_ms;
+  return true;
+}
+
+bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_packet, uint32_t* result) {
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  if (file == nullptr) return Give(KRAL_KOVA_FILE_NOT_OPENED, result);
+  return Give(kova::LoadFlashProgrammer(connection, file, maximum_packet), result);
+}
+
+bool KovaNop(Diag_FTM& phone) {
+  DownloadConnection connection(phone);
+  return kova::Nop(connection);
+}
+
+bool KovaReset(Diag_FTM& phone) {
+  DownloadConnection connection(phone);
+  return kova::Reset(connection);
+}
+
+bool KovaSoftwareVersion(Diag_FTM& phone, uint8_t* version) {
+  DownloadConnection connection(phone);
+  uint8_t value = 0;
+  if (!kova::SoftwareVersion(connection, value)) return false;
+  if (version != nullptr) *version = value;
+  return true;
+}
+
+bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16_t* window) {
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  const auto answer = stream::Hello(connection, phone.download(), variant);
+  if (!answer) return false;
+  if (block_size != nullptr) *block_size = answer->block_size;
+  if (window != nullptr) *window = answer->window;
+  return true;
+}
+
+bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
+  DownloadConnection connection(phone);
+  return CImageSecMode(connection, connection.time_out_ms()).Send(mode);
+}
+
+bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
+  DownloadConnection connection(phone);
+  if (file == nullptr) return false;
+  std::optional<uint8_t> answer;
+  const bool accepted =
+      CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
+  if (answer && status != nullptr) *status = *answer;
+  return accepted;
+}
+
+bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const char* header_file,
+                    const WriteArguments& arguments, uint32_t* result) {
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  if (file == nullptr) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
+  ImageFile image;
+  ImageFile header;
+  uint32_t opened = image.Open(file, format);
+  if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr) opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
+  if (opened != KRAL_STREAM_WRITTEN) return Give(opened, result);
+  if (image.has_second_region()) return Give(KRAL_STREAM_BAD_IMAGE, result);
+  return Give(WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments),
+              result);
+}
+
+bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address, const CallersBytes& header,
+                   const WriteArguments& arguments, uint32_t* result) {
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
+  const auto whole = MakeMemoryImage({image.data, image.size}, address);
+  std::unique_ptr<PhoneImage> opening;
+  if (header.size > stream::kLongestHeader) {
+    connection.log().WriteLine(kLogErr, "multi-image open failed\n");
+    return Give(KRAL_STREAM_OPEN_FAILED, result);
+  }
+  if (header.data != nullptr) opening = MakeMemoryImage({header.data, header.size}, 0);
+  return Give(WriteImage(connection, *whole, opening.get(), arguments), result);
+}
+
+}  // namespace kral::download

@@ -1,0 +1,66 @@
+// Exchanges and writes of the download protocols over the phone object's transport.
+#include "download/download_connection.h"
+
+#include <chrono>
+
+namespace kral {
+namespace {
+
+constexpr size_t kFcsBytes = 2;
+
+// The leading flag is on for the length of an exchange, and off behind it whatever it was before: required.
+class LeadingFlag {
+ public:
+  explicit LeadingFlag(CProtAHDLC& framer) : framer_(framer) { framer_.SetStartFlag(1); }
+  ~LeadingFlag() { framer_.SetStartFlag(0); }
+  LeadingFlag(const LeadingFlag&) = delete;
+  LeadingFlag& operator=(const LeadingFlag&) = delete;
+
+ private:
+  CProtAHDLC& framer_;
+};
+
+}  // namespace
+
+DownloadConnection::Status DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
+                                                        uint32_t time_out_ms, std::vector<uint8_t>& reply) {
+  reply.clear();
+  if (phone_.server_mode()) return kNotSent;
+  const LeadingFlag flag(phone_.transport().framer());
+  // No reply fills the room to the end: a size that still says so was not set.
+  reply.resize(kMaximumPacket);
+  auto size = static_cast<uint16_t>(reply.size());
+  const bool done = phone_.SendSync(request, reply.data(), size, expected_code, time_out_ms);
+  const bool answered = size != kMaximumPacket;
+  reply.resize(answered ? size : 0);
+  if (done && answered) return kDone;
+  return answered ? kOtherReply : kNoReply;
+}
+
+bool DownloadConnection::AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& reply) {
+  const auto record = responses().PopWithin(std::chrono::milliseconds(time_out_ms));
+  if (!record) return false;
+  const size_t length = record->size() - std::min(record->size(), kFcsBytes);
+  reply.assign(record->begin(), record->begin() + static_cast<std::ptrdiff_t>(length));
+  return true;
+}
+
+DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
+  if (phone_.server_mode() || !phone_.IsPortOpen()) return kNotSent;
+  return phone_.transport().SendASync(request, time_out_ms, true) ? kDone : kNotSent;
+}
+
+void DownloadConnection::BeginWork() {
+  phone_.download().abort = false;
+  reported_ = false;
+}
+
+void DownloadConnection::Report(uint32_t done, uint32_t total) {
+  if (reported_ && done == last_report_) return;
+  reported_ = true;
+  last_report_ = done;
+  const auto callback = phone_.download().progress_callback.load();
+  if (callback != nullptr) callback(phone_.handle(), done, total, phone_.download().callback_value);
+}
+
+}  // namespace kral

@@ -1,0 +1,128 @@
+// Exports of software download: name line, handle, operation.
+#include "download/download_client.h"
+#include "download/image_file.h"
+#include "frame/export_call.h"
+
+namespace download = kral::download;
+using kral::LogFormatted;
+using kral::LogName;
+using kral::OnPhone;
+using kral::OnPhoneAtOnce;
+
+namespace {
+
+const char* Text(const char* text) {
+  return text == nullptr ? "" : text;
+}
+
+// For the functions that have no handset.
+template <class Operation>
+uint8_t WithoutPhone(uint32_t* result, Operation&& operation) noexcept {
+  try {
+    const uint32_t value = operation();
+    if (result != nullptr) *result = value;
+    return value == KRAL_STREAM_WRITTEN ? 1 : 0;
+  } catch (...) {
+    if (result != nullptr) *result = KRAL_STREAM_FILE_NOT_DECODED;
+    return 0;
+  }
+}
+
+}  // namespace
+
+extern "C" {
+
+uint8_t KRAL_CALL KRAL_ConfigureDownloadCallBack(KRAL_HANDLE handle, KRAL_DOWNLOAD_PROGRESS_CALLBACK callback,
+                                                 uintptr_t value) {
+  LogName(handle, "KRAL_ConfigureDownloadCallBack");
+  return OnPhoneAtOnce(handle, download::SetCallback, callback, value);
+}
+
+uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_AbortDownload");
+  return OnPhoneAtOnce(handle, download::Abort);
+}
+
+uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file,
+                                                uint32_t maximum_packet, uint32_t* result) {
+  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )",
+               Text(programmer_file), maximum_packet);
+  return OnPhone(handle, download::LoadFlashProgrammer, programmer_file, maximum_packet, result);
+}
+
+uint8_t KRAL_CALL KRAL_KOVA_NOP(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_KOVA_NOP");
+  return OnPhone(handle, download::KovaNop);
+}
+
+uint8_t KRAL_CALL KRAL_KOVA_RESET(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_KOVA_RESET");
+  return OnPhone(handle, download::KovaReset);
+}
+
+uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t* version) {
+  LogName(handle, "KRAL_KOVA_SW_VERSION");
+  return OnPhone(handle, download::KovaSoftwareVersion, version);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_HELLO(KRAL_HANDLE handle, uint32_t variant, uint32_t* block_size, uint16_t* window) {
+  LogFormatted(handle, "KRAL_STREAM_HELLO( iVariant = %u )", variant);
+  return OnPhone(handle, download::StreamHello, variant, block_size, window);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_ConfigureHello(KRAL_HANDLE handle, uint32_t tries, uint32_t delay_ms) {
+  LogFormatted(handle, "KRAL_STREAM_ConfigureHello( iTries = %u, iDelay_ms = %u )", tries, delay_ms);
+  return OnPhoneAtOnce(handle, download::ConfigureHello, tries, delay_ms);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t mode) {
+  LogFormatted(handle, "KRAL_STREAM_SECURITY_MODE( iMode = %d )", mode);
+  return OnPhone(handle, download::SecurityMode, mode);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const char* table_file, uint8_t override_table,
+                                              uint8_t* status) {
+  LogFormatted(handle, "KRAL_STREAM_PARTITION_TABLE( sTable = %s, bOverride = %d )", Text(table_file), override_table);
+  return OnPhone(handle, download::PartitionTable, table_file, override_table, status);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const char* image_file, uint32_t format,
+                                             uint8_t image_type, const char* header_file, uint8_t method,
+                                             uint32_t block_size, uint16_t window, uint32_t* result) {
+  LogFormatted(handle, "KRAL_STREAM_WriteImageFile( sImage = %s, iType = %d, sHeader = %s )", Text(image_file),
+               image_type, Text(header_file));
+  return OnPhone(handle, download::WriteImageFile, image_file, format, header_file,
+                 download::WriteArguments{image_type, method, block_size, window}, result);
+}
+
+uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* data, uint32_t size, uint32_t address,
+                                            uint8_t image_type, const uint8_t* header, uint32_t header_size,
+                                            uint8_t method, uint32_t block_size, uint16_t window, uint32_t* result) {
+  LogFormatted(handle, "KRAL_STREAM_WriteImageMem( iSize = %u, iAddress = 0x%08X, iType = %d )", size, address,
+               image_type);
+  return OnPhone(handle, download::WriteImageMem, download::CallersBytes{data, size}, address,
+                 download::CallersBytes{header, header_size},
+                 download::WriteArguments{image_type, method, block_size, window}, result);
+}
+
+uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info,
+                                     uint32_t* result) {
+  return WithoutPhone(result, [=] {
+    if (image_file == nullptr || info == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
+    return kral::GetImageInfo(image_file, format, *info);
+  });
+}
+
+uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32_t direction, uint32_t* base_address,
+                                   uint32_t* result) {
+  return WithoutPhone(result, [=] {
+    uint32_t base = base_address == nullptr ? 0 : *base_address;
+    if (input == nullptr || output == nullptr || direction > KRAL_HEX_FROM_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
+    const uint32_t value = direction == KRAL_HEX_FROM_BINARY ? kral::BinaryToHex(input, output, base)
+                                                             : kral::HexToBinary(input, output, base);
+    if (value == KRAL_STREAM_WRITTEN && base_address != nullptr) *base_address = base;
+    return value;
+  });
+}
+
+}  // extern "C"

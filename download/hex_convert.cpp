@@ -1,0 +1,100 @@
+// Intel HEX files to binary files and back.
+#include <algorithm>
+#include <vector>
+
+#include "download/hex_phone_image_decoder.h"
+#include "download/image_file.h"
+#include "download/text_source.h"
+#include "platform/file_util.h"
+
+namespace kral {
+namespace {
+
+constexpr uint32_t kPiece = 64 * 1024;
+// Offsets in a HEX file count from the base, of which the file has the upper half only.
+constexpr uint32_t kBaseUnit = 0x10000;
+
+// The text of an encoder on its way to a file that is replaced in one step.
+class AtomicTextSink final : public TextSink {
+ public:
+  bool Open(const std::string& path) { return !file_.Open(path); }
+  bool Write(std::string_view text) override {
+    pending_ += text;
+    return pending_.size() < kPiece || Flush();
+  }
+  bool Commit() { return Flush() && !file_.Commit(); }
+
+ private:
+  bool Flush() {
+    const auto error = file_.Write({reinterpret_cast<const uint8_t*>(pending_.data()), pending_.size()});
+    pending_.clear();
+    return !error;
+  }
+
+  AtomicFile file_;
+  std::string pending_;
+};
+
+// A binary image with another base: a mapped file always begins at 0.
+class MovedImage final : public PhoneImage {
+ public:
+  MovedImage(PhoneImage& image, uint32_t base) : image_(image), base_(base) {}
+
+  void Clear() override { image_.Clear(); }
+  uint32_t GetBaseAddress(uint32_t) override { return base_; }
+  uint32_t GetTotalSize() override { return image_.GetTotalSize(); }
+  uint32_t GetSize(uint32_t region) override { return region == 0 ? image_.GetSize(0) : 0; }
+  uint32_t GetLastAddress(uint32_t region) override { return base_ + image_.GetLastAddress(region); }
+  uint32_t GetStartAddress() override { return image_.GetStartAddress(); }
+  uint8_t* GetPointer(uint32_t offset) override { return image_.GetPointer(offset); }
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override {
+    image_.Read(address - base_, buffer, count, region);
+  }
+  void SetBaseAddress(uint32_t value, uint32_t) override { base_ = value; }
+  void SetSize(uint32_t value, uint32_t region) override { image_.SetSize(value, region); }
+  void SetStartAddress(uint32_t value) override { image_.SetStartAddress(value); }
+  void Write(uint32_t address, const void* data, uint32_t count, uint32_t region) override {
+    image_.Write(address - base_, data, count, region);
+  }
+
+ private:
+  PhoneImage& image_;
+  uint32_t base_;
+};
+
+}  // namespace
+
+uint32_t HexToBinary(const std::string& input, const std::string& output, uint32_t& base) {
+  ImageFile hex;
+  const uint32_t result = hex.Open(input, KRAL_IMAGE_FORMAT_HEX);
+  if (result != KRAL_STREAM_WRITTEN) return result;
+  if (hex.has_second_region()) return KRAL_STREAM_BAD_IMAGE;
+  AtomicFile file;
+  if (file.Open(output)) return KRAL_HEX_NOT_WRITTEN;
+  const uint32_t size = hex.image().GetSize(0);
+  const uint32_t first = hex.image().GetBaseAddress(0);
+  std::vector<uint8_t> piece(kPiece);
+  for (uint32_t done = 0; done < size;) {
+    const uint32_t count = std::min(kPiece, size - done);
+    hex.image().Read(first + done, piece.data(), count, 0);
+    if (file.Write(std::span(piece).first(count))) return KRAL_HEX_NOT_WRITTEN;
+    done += count;
+  }
+  if (file.Commit()) return KRAL_HEX_NOT_WRITTEN;
+  base = first;
+  return KRAL_STREAM_WRITTEN;
+}
+
+uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32_t base) {
+  if (base % kBaseUnit != 0) return KRAL_STREAM_BAD_ARGUMENT;
+  ImageFile binary;
+  const uint32_t result = binary.Open(input, KRAL_IMAGE_FORMAT_BINARY);
+  if (result != KRAL_STREAM_WRITTEN) return result;
+  MovedImage image(binary.image(), base);
+  HexPhoneImageDecoder encoder(false, false, true);
+  AtomicTextSink file;
+  if (!file.Open(output) || !encoder.Encode(image, file) || !file.Commit()) return KRAL_HEX_NOT_WRITTEN;
+  return KRAL_STREAM_WRITTEN;
+}
+
+}  // namespace kral

@@ -1,0 +1,87 @@
+// Opens image files and tells what is in them.
+#include "download/image_file.h"
+
+#include <algorithm>
+#include <array>
+#include <vector>
+
+#include "download/hex_phone_image_decoder.h"
+#include "download/phone_image_binary.h"
+#include "download/phone_image_dpaged.h"
+#include "download/text_source.h"
+
+namespace kral {
+namespace {
+
+// Address space only, which a 32-bit process has to spare; what is not written takes no memory.
+constexpr uint32_t kMaximumKib = 128 * 1024;
+constexpr uint32_t kPiece = 64 * 1024;
+constexpr uint8_t kErased = 0xFF;
+
+uint32_t FormatByContent(const std::string& path) {
+  TextFile file;
+  std::array<char, 1> first{};
+  const bool hex = file.OpenForReading(path) && file.Read(first) == 1 && first[0] == ':';
+  return hex ? KRAL_IMAGE_FORMAT_HEX : KRAL_IMAGE_FORMAT_BINARY;
+}
+
+uint32_t CountPayload(PhoneImage& image, uint32_t region) {
+  std::vector<uint8_t> piece(kPiece);
+  const uint32_t base = image.GetBaseAddress(region);
+  const uint32_t size = image.GetSize(region);
+  uint32_t payload = 0;
+  for (uint32_t done = 0; done < size;) {
+    const uint32_t count = std::min(kPiece, size - done);
+    image.Read(base + done, piece.data(), count, region);
+    payload += count - static_cast<uint32_t>(std::count(piece.begin(), piece.begin() + count, kErased));
+    done += count;
+  }
+  return payload;
+}
+
+}  // namespace
+
+uint32_t ImageFile::Open(const std::string& path, uint32_t format) {
+  format_ = format == KRAL_IMAGE_FORMAT_BY_CONTENT ? FormatByContent(path) : format;
+  if (format_ == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
+  if (format_ != KRAL_IMAGE_FORMAT_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
+  auto binary = std::make_unique<PhoneImageBinary>();
+  if (!binary->Open(path)) return KRAL_STREAM_FILE_NOT_OPENED;
+  image_ = std::move(binary);
+  return KRAL_STREAM_WRITTEN;
+}
+
+uint32_t ImageFile::OpenHex(const std::string& path) {
+  TextFile file;
+  if (!file.OpenForReading(path)) return KRAL_STREAM_FILE_NOT_OPENED;
+  decoder_ = std::make_unique<HexPhoneImageDecoder>();
+  image_ = std::make_unique<PhoneImageDPaged>(kMaximumKib, decoder_.get());
+  return decoder_->Decode(*image_, file) ? KRAL_STREAM_WRITTEN : KRAL_STREAM_FILE_NOT_DECODED;
+}
+
+std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint32_t address) {
+  const auto size = static_cast<uint32_t>(bytes.size());
+  auto image = std::make_unique<PhoneImageDPaged>(static_cast<uint32_t>((bytes.size() + 1023) / 1024), nullptr);
+  image->SetBaseAddress(address, 0);
+  if (size != 0) image->Write(address, bytes.data(), size, 0);
+  return image;
+}
+
+uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info) {
+  ImageFile file;
+  const uint32_t result = file.Open(path, format);
+  if (result != KRAL_STREAM_WRITTEN) return result;
+  KRAL_IMAGE_INFO found{};
+  found.format = file.format();
+  found.start_address = file.image().GetStartAddress();
+  for (uint32_t region = 0; region < file.regions(); ++region) {
+    found.size[region] = file.image().GetSize(region);
+    if (found.size[region] == 0) continue;
+    found.base[region] = file.image().GetBaseAddress(region);
+    found.payload += CountPayload(file.image(), region);
+  }
+  info = found;
+  return KRAL_STREAM_WRITTEN;
+}
+
+}  // namespace kral

@@ -1,0 +1,45 @@
+// Image files as callers name them: opened in the right kind of image, looked at, converted.
+#ifndef KRAL_DOWNLOAD_IMAGE_FILE_H
+#define KRAL_DOWNLOAD_IMAGE_FILE_H
+
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+
+#include "download/phone_image.h"
+#include "download/phone_image_decoder.h"
+#include "kral/download.h"
+
+namespace kral {
+
+// An image with the decoder that it needs.
+class ImageFile {
+ public:
+  // Gives KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_ARGUMENT or 0. The format may be found by content.
+  uint32_t Open(const std::string& path, uint32_t format);
+
+  PhoneImage& image() { return *image_; }
+  uint32_t format() const { return format_; }
+  uint32_t regions() const { return format_ == KRAL_IMAGE_FORMAT_HEX ? KRAL_IMAGE_REGIONS : 1; }
+  // Whether there are bytes that a download, or a binary file, would leave out.
+  bool has_second_region() { return regions() > 1 && image_->GetSize(1) != 0; }
+
+ private:
+  uint32_t OpenHex(const std::string& path);
+
+  uint32_t format_ = KRAL_IMAGE_FORMAT_BY_CONTENT;
+  std::unique_ptr<PhoneImageDecoder> decoder_;
+  std::unique_ptr<PhoneImage> image_;  // borrows the decoder
+};
+
+// An image of exactly these bytes.
+std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint32_t address);
+
+uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info);
+uint32_t HexToBinary(const std::string& input, const std::string& output, uint32_t& base);
+uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32_t base);
+
+}  // namespace kral
+
+#endif

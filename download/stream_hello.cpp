@@ -1,0 +1,66 @@
+// Wakes the flash programmer with no-operations and asks for its limits.
+#include "download/stream_hello.h"
+
+#include <algorithm>
+#include <vector>
+
+#include "download/stream_format.h"
+#include "frame/base/little_endian.h"
+
+namespace kral::stream {
+namespace {
+
+constexpr int kNops = 3;
+constexpr uint32_t kNopMs = 1000;
+constexpr uint32_t kHelloMs = 2000;
+constexpr size_t kReplyRoom = 2048;
+
+std::vector<uint8_t> HelloRequest() {
+  std::vector<uint8_t> request = {kHello};
+  request.insert(request.end(), kHostMagic.begin(), kHostMagic.end());
+  request.insert(request.end(), {kVersion, kCompatibleVersion, kFeatures});
+  return request;
+}
+
+std::optional<HelloReply> ExchangeHello(DownloadConnection& connection, uint32_t variant, uint32_t time_out_ms) {
+  if (variant != kHelloVariant) return std::nullopt;
+  std::vector<uint8_t> reply;
+  if (connection.Exchange(HelloRequest(), kHelloReply, time_out_ms, reply) != DownloadConnection::kDone) {
+    return std::nullopt;
+  }
+  return ParseHelloReply(std::span(reply).first(std::min(reply.size(), kReplyRoom)));
+}
+
+}  // namespace
+
+std::optional<HelloReply> ParseHelloReply(std::span<const uint8_t> reply) {
+  if (reply.size() < kShortestHelloReply || reply[0] != kHelloReply) return std::nullopt;
+  if (!std::equal(kTargetMagic.begin(), kTargetMagic.end(), reply.begin() + kMagicAt)) return std::nullopt;
+  const auto block_size = LoadLe<uint32_t>(reply, kBlockSizeAt);
+  const auto window = LoadLe<uint16_t>(reply, kIdAt + reply[kIdLengthAt]);
+  if (!block_size || !window) return std::nullopt;
+  return HelloReply{*block_size, *window};
+}
+
+std::optional<HelloReply> Hello(DownloadConnection& connection, const DownloadSettings& settings, uint32_t variant) {
+  auto& log = connection.log();
+  const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);
+  for (int i = 1; i <= kNops; ++i) {
+    log.WriteLine(kLogRet, "Sending NOP to flash programmer, %d", i);
+    std::vector<uint8_t> ignored;
+    connection.Exchange(kNopRequest, kNopReply, nop_ms, ignored);
+  }
+  std::optional<HelloReply> answer;
+  const uint32_t tries = std::max(settings.hello_tries.load(), 1u);
+  for (uint32_t i = 1; i <= tries && !answer && !connection.aborted(); ++i) {
+    if (i > 1) connection.clock().SleepMs(settings.hello_retry_delay_ms);
+    log.WriteLine(kLogRet, "Sending HELLO to flash programmer, %d", static_cast<int>(i));
+    answer = ExchangeHello(connection, variant, std::min(kHelloMs, settings.handshake_limit_ms));
+  }
+  const HelloReply limits = answer.value_or(HelloReply{});
+  log.WriteLine(answer ? kLogRet : kLogErr, "HELLO command %s, block size %u, window size %u",
+                answer ? "succeeded" : "failed", limits.block_size, static_cast<unsigned>(limits.window));
+  return answer;
+}
+
+}  // namespace kral::stream
