@@ -1,0 +1,60 @@
+// Any frames as replies to stream writes, and any bytes as the reply to a hello. Whatever comes, the queues of the agent
+// stay whole: acknowledged bytes never exceed those sent, and blocks are neither lost nor doubled.
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <span>
+
+#include "download/image_write_rsp.h"
+#include "download/reply_receiver.h"
+#include "download/stream_hello.h"
+#include "frame/diag_ftm.h"
+
+namespace {
+
+using namespace kral;
+
+constexpr uint32_t kWindow = 4;
+constexpr uint32_t kBlock = 16;
+constexpr uint32_t kImage = 256;
+
+void Check(bool condition) {
+  if (!condition) std::abort();
+}
+
+// What the response thread does with a frame, without the thread.
+class Replies final : public CImageWriteRspFramed {
+ public:
+  using CImageWriteRspFramed::CImageWriteRspFramed;
+  void OnFrame(std::span<const uint8_t> frame) { receiver_.OnFrame(frame); }
+
+ private:
+  AutoResetEvent finished_;
+  CReplyRcvrCont receiver_{*this, agent_, finished_, log_};
+};
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  const std::span bytes(data, size);
+  if (const auto hello = stream::ParseHelloReply(bytes)) Check(size >= 48);
+
+  static Diag_FTM phone(1);
+  DownloadConnection connection(phone);
+  Replies replies(connection);
+  DownloadAgent& agent = replies.agent();
+  agent.Start(kWindow);
+  agent.Enqueue({0, kImage, 0});
+  for (size_t at = 0; at < size;) {
+    while (agent.AwaitTurn(0) == DownloadAgent::Wait::kReady) {
+      if (!agent.TakeResend() && !agent.Carve(std::min(kBlock, agent.head() ? agent.head()->size : 0))) break;
+    }
+    const size_t wanted = data[at++] % 12;
+    const size_t length = std::min(wanted, size - at);
+    replies.OnFrame(bytes.subspan(at, length));
+    at += length;
+    Check(agent.bytes_acknowledged() <= kImage);
+    Check(!agent.done() || agent.bytes_acknowledged() == kImage);
+  }
+  return 0;
+}
