@@ -65,6 +65,7 @@ int Run(int argc, char** argv) {
   AddLogVerbs(app, context);
   AddEventVerbs(app, context);
   AddNvVerbs(app, context);
+  AddFlashVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);

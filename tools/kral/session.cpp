@@ -29,7 +29,7 @@ std::string Describe(const std::vector<std::uint16_t>& ports) {
   return text;
 }
 
-std::uint16_t TheOnlyPort() {
+std::uint16_t TheOnlyPort(Expected expected) {
   const auto answering = ListPortsWithHandset();
   if (answering.size() == 1) return answering.front();
   if (answering.size() > 1) {
@@ -41,6 +41,7 @@ std::uint16_t TheOnlyPort() {
     throw ToolError(ExitCode::kNoPort, "this machine has no serial port",
                     "plug the handset in, or name its port with -p N");
   }
+  if (expected == Expected::kMayBeInDownload && ports.size() == 1) return ports.front();
   throw ToolError(ExitCode::kNoPort, fmt::format("no handset answers on {}", Describe(ports)),
                   "check cable and power of the handset and that no other program uses its port, or name it with -p N");
 }
@@ -120,10 +121,10 @@ std::vector<std::uint16_t> ListPortsWithHandset() {
   return ports;
 }
 
-Session::Session(const SessionOptions& options) : port_(0), handle_(0) {
+Session::Session(const SessionOptions& options, Expected expected) : port_(0), handle_(0) {
   if (!options.log_file.empty()) CheckLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(kWakeOnData);
-  port_ = options.port.empty() ? TheOnlyPort() : ParsePort(options.port);
+  port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
   ThrowIfInterrupted();
   handle_ = KRAL_ConnectServer(port_);
   if (handle_ == 0) {
@@ -137,7 +138,7 @@ Session::Session(const SessionOptions& options) : port_(0), handle_(0) {
       KRAL_ConfigureTimeOut(handle_, kTimeOutCommand, milliseconds);
       KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, milliseconds);
     }
-    CheckAnswers();
+    CheckAnswers(expected);
   } catch (...) {
     KRAL_DisconnectServer(handle_);
     throw;
@@ -157,10 +158,12 @@ void Session::StartLog(const SessionOptions& options) const {
   if (to_file) KRAL_StartLogging(handle_, options.log_file.c_str());
 }
 
-void Session::CheckAnswers() const {
-  if (KRAL_IsPhoneConnected(handle_) != 0) return;
+void Session::CheckAnswers(Expected expected) {
+  answers_ = KRAL_IsPhoneConnected(handle_) != 0;
+  if (answers_) return;
   ThrowIfInterrupted();
   if (const auto trouble = PortTrouble(handle_)) throw ExplainPort(port_, *trouble, false);
+  if (expected == Expected::kMayBeInDownload) return;
   throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
                   "longer, --log FILE shows what came");

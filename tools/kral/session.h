@@ -28,16 +28,20 @@ std::string DescribePort(std::uint16_t port);
 std::vector<std::uint16_t> ListPorts();
 std::vector<std::uint16_t> ListPortsWithHandset();
 
+// A handset that is being downloaded to does not answer diagnostic requests.
+enum class Expected { kAnswers, kMayBeInDownload };
+
 class Session {
  public:
-  // Connects and checks that a handset answers; ToolError when not.
-  explicit Session(const SessionOptions& options);
+  // Connects and checks that a handset answers, unless it need not; ToolError when not.
+  explicit Session(const SessionOptions& options, Expected expected = Expected::kAnswers);
   ~Session();
   Session(const Session&) = delete;
   Session& operator=(const Session&) = delete;
 
   KRAL_HANDLE handle() const { return handle_; }
   std::uint16_t port() const { return port_; }
+  bool answers_diagnostics() const { return answers_; }  // did, when the session began
 
   // To be called before a request, so that Explain speaks of that request only; also the place where Ctrl-C takes
   // effect.
@@ -54,10 +58,11 @@ class Session {
  private:
   [[noreturn]] void Fail(std::string_view what) const;
   void StartLog(const SessionOptions& options) const;
-  void CheckAnswers() const;
+  void CheckAnswers(Expected expected);
 
   std::uint16_t port_;
   KRAL_HANDLE handle_;
+  bool answers_ = false;
 };
 
 }  // namespace kral::tool

@@ -23,6 +23,7 @@ struct Context {
 void AddBandVerbs(CLI::App& app, Context& context);
 void AddFsVerbs(CLI::App& app, Context& context);
 void AddEventVerbs(CLI::App& app, Context& context);
+void AddFlashVerbs(CLI::App& app, Context& context);
 void AddFtmVerbs(CLI::App& app, Context& context);
 void AddLogVerbs(CLI::App& app, Context& context);
 void AddPortVerbs(CLI::App& app, Context& context);

@@ -1,0 +1,203 @@
+// Drives the download functions of the library and turns their results into errors that say what to try next.
+#include "tools/kral/flash_target.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+
+#include "tools/kral/error_lines.h"
+#include "tools/kral/interrupt.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::chrono::milliseconds kLookAround{50};
+constexpr std::uint32_t kAllTries = 5;
+constexpr std::uint32_t kRetryDelayMs = 500;
+
+bool WasLogged(std::string_view part) {
+  const auto lines = ErrorLines();
+  return std::any_of(lines.begin(), lines.end(),
+                     [part](const std::string& line) { return line.find(part) != std::string::npos; });
+}
+
+}  // namespace
+
+AbortWatch::AbortWatch(KRAL_HANDLE handle) : thread_([this, handle] { Run(handle); }) {}
+
+AbortWatch::~AbortWatch() {
+  {
+    const std::lock_guard lock(mutex_);
+    stop_ = true;
+  }
+  changed_.notify_one();
+  thread_.join();
+}
+
+// Again and again: an abort that comes before the download begins is forgotten.
+void AbortWatch::Run(KRAL_HANDLE handle) {
+  std::unique_lock lock(mutex_);
+  while (!changed_.wait_for(lock, kLookAround, [this] { return stop_; })) {
+    if (Interrupted()) KRAL_AbortDownload(handle);
+  }
+}
+
+FlashTarget::FlashTarget(const Context& context)
+    : context_(context), session_(context.session, Expected::kMayBeInDownload), watch_(session_.handle()) {
+  KRAL_ConfigureDownloadCallBack(session_.handle(), &FlashTarget::OnProgress, reinterpret_cast<std::uintptr_t>(this));
+}
+
+FlashTarget::~FlashTarget() {
+  KRAL_ConfigureDownloadCallBack(session_.handle(), nullptr, 0);
+}
+
+void KRAL_CALL FlashTarget::OnProgress(KRAL_HANDLE, std::uint32_t done, std::uint32_t, std::uintptr_t value) {
+  auto& self = *reinterpret_cast<FlashTarget*>(value);
+  if (self.progress_ != nullptr) self.progress_->Update(self.done_before_ + done);
+}
+
+std::optional<std::uint8_t> FlashTarget::LoaderVersion() {
+  session_.Begin();
+  std::uint8_t version = 0;
+  if (KRAL_KOVA_SW_VERSION(session_.handle(), &version) == 0) return std::nullopt;
+  return version;
+}
+
+std::optional<ProgrammerLimits> FlashTarget::TryHello(std::uint32_t tries) {
+  session_.Begin();
+  ProgrammerLimits limits;
+  KRAL_STREAM_ConfigureHello(session_.handle(), tries, kRetryDelayMs);
+  if (KRAL_STREAM_HELLO(session_.handle(), KRAL_STREAM_HELLO_VARIANT, &limits.block_size, &limits.window) == 0) {
+    ThrowIfInterrupted();
+    return std::nullopt;
+  }
+  return limits;
+}
+
+ProgrammerLimits FlashTarget::Hello() {
+  if (session_.answers_diagnostics()) {
+    throw ToolError(ExitCode::kRefused,
+                    fmt::format("the handset on {} is in diagnostic mode", DescribePort(session_.port())),
+                    "load a flash programmer first: kral flash load FILE");
+  }
+  if (const auto limits = TryHello(kAllTries)) return *limits;
+  throw ToolError(ExitCode::kNoAnswer, fmt::format("no flash programmer answers on {}", DescribePort(session_.port())),
+                  "kral flash info tells what has the line; a programmer is loaded with kral flash load FILE");
+}
+
+void FlashTarget::EnterLoader() {
+  if (!session_.answers_diagnostics()) return;
+  session_.Run("the switch into download mode", [&] { return KRAL_DIAG_DLOAD_F(session_.handle()); });
+}
+
+void FlashTarget::Load(const FlashImage& programmer, std::uint32_t maximum_packet) {
+  Progress progress(context_.out, "load", programmer.info.size[0]);
+  progress.Describe(programmer.file);
+  progress_ = &progress;
+  done_before_ = 0;
+  session_.Begin();
+  std::uint32_t result = 0;
+  const bool loaded =
+      KRAL_KOVA_LoadFlashProgrammer(session_.handle(), programmer.file.c_str(), maximum_packet, &result) != 0;
+  progress_ = nullptr;
+  if (loaded) return;
+  switch (result) {
+    case KRAL_DOWNLOAD_ABORTED:
+      throw InterruptedError();
+    case KRAL_KOVA_FILE_NOT_OPENED:
+    case KRAL_KOVA_FILE_NOT_DECODED:
+      throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read as a flash programmer", programmer.file),
+                      "kral flash verify-image FILE tells what is in it");
+    case KRAL_KOVA_GO_FAILED:
+      throw session_.Explain("the start of the flash programmer");
+    default:
+      throw session_.Explain("loading the flash programmer");
+  }
+}
+
+void FlashTarget::SetSecurityMode(std::uint8_t mode) {
+  session_.Run(fmt::format("security mode {}", mode),
+               [&] { return KRAL_STREAM_SECURITY_MODE(session_.handle(), mode); });
+}
+
+void FlashTarget::SendPartitionTable(const std::string& file, bool override_table) {
+  session_.Begin();
+  constexpr std::uint8_t kNothing = 0;
+  std::uint8_t status = kNothing;
+  if (KRAL_STREAM_PARTITION_TABLE(session_.handle(), file.c_str(), override_table ? 1 : 0, &status) != 0) return;
+  if (WasLogged("partition : failed to open file") || WasLogged("partition : file exceeds")) {
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no partition table", file),
+                    "the file must be readable and have at most 512 bytes");
+  }
+  if (status == kNothing) throw session_.Explain("the partition table");
+  static constexpr std::array<std::pair<const char*, const char*>, 3> kRefusals{{
+      {"differs from the one in flash", "--override replaces the table, and with it what the partitions hold"},
+      {"has a bad format", "check that the file is a table for this handset"},
+      {"could not replace the one in flash", "the flash could not be erased"},
+  }};
+  const bool known = status <= kRefusals.size();
+  throw ToolError(ExitCode::kRefused,
+                  fmt::format("the handset refused the partition table {}: it {}", file,
+                              known ? kRefusals[status - 1u].first : fmt::format("gave status {}", status)),
+                  known ? kRefusals[status - 1u].second : "see the documentation of the flash programmer");
+}
+
+void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, const ProgrammerLimits& limits,
+                        std::uint64_t done_before, Progress& progress) {
+  progress.Describe(image.file);
+  progress_ = &progress;
+  done_before_ = done_before;
+  session_.Begin();
+  const auto block_size = options.block_size == 0 ? limits.block_size : std::min(options.block_size, limits.block_size);
+  std::uint32_t result = 0;
+  const bool written =
+      KRAL_STREAM_WriteImageFile(session_.handle(), image.file.c_str(), options.format,
+                                 image.type.value_or(options.type),
+                                 options.header.empty() ? nullptr : options.header.c_str(),
+                                 options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE, block_size, limits.window,
+                                 &result) != 0;
+  progress_ = nullptr;
+  if (!written) throw ExplainWrite(image.file, result);
+}
+
+ToolError FlashTarget::ExplainWrite(const std::string& file, std::uint32_t result) const {
+  const auto where = DescribePort(session_.port());
+  const bool timed_out = WasLogged("Request timed out");
+  switch (result) {
+    case KRAL_DOWNLOAD_ABORTED:
+      return InterruptedError();
+    case KRAL_STREAM_FILE_NOT_OPENED:
+    case KRAL_STREAM_FILE_NOT_DECODED:
+    case KRAL_STREAM_BAD_IMAGE:
+      return {ExitCode::kBadFile, fmt::format("{} or its header cannot be used as an image", file),
+              "kral flash verify-image FILE tells what is in it"};
+    case KRAL_STREAM_OPEN_FAILED:
+      if (timed_out) break;
+      return {ExitCode::kRefused, fmt::format("the handset on {} refused to open {}", where, file),
+              "check the image type (--type) and that the header has at most 512 bytes"};
+    case KRAL_STREAM_WRITE_FAILED:
+      if (WasLogged("write error")) {
+        return {ExitCode::kLink, fmt::format("{} was answered with something else on {}", file, where),
+                "the flash holds part of the image: write it again; --log FILE shows the traffic"};
+      }
+      return {ExitCode::kLost, fmt::format("the handset on {} fell silent while {} was written", where, file),
+              "the flash holds part of the image: check cable and power and write it again"};
+    case KRAL_STREAM_NOT_COMPLETED:
+      return {ExitCode::kLost, fmt::format("the end of {} was not acknowledged on {}", file, where),
+              "write the image again"};
+    case KRAL_STREAM_CLOSE_FAILED:
+      if (timed_out) break;
+      return {ExitCode::kRefused, fmt::format("the handset on {} did not accept {} when it was closed", where, file),
+              "check that the image is meant for this handset and the header belongs to it"};
+    default:
+      return {ExitCode::kInternal, fmt::format("writing {} on {} failed", file, where), "--log FILE shows why"};
+  }
+  return {ExitCode::kNoAnswer, fmt::format("no answer in time to {} of {} on {}",
+                                           result == KRAL_STREAM_OPEN_FAILED ? "the opening" : "the closing", file,
+                                           where),
+          "flash that is being erased takes long: --time-out MS waits longer"};
+}
+
+}  // namespace kral::tool
