@@ -33,7 +33,8 @@ uint32_t CountPayload(PhoneImage& image, uint32_t region) {
   for (uint32_t done = 0; done < size;) {
     const uint32_t count = std::min(kPiece, size - done);
     image.Read(base + done, piece.data(), count, region);
-    payload += count - static_cast<uint32_t>(std::count(piece.begin(), piece.begin() + count, kErased));
+    const auto read = std::span(piece).first(count);
+    payload += count - static_cast<uint32_t>(std::count(read.begin(), read.end(), kErased));
     done += count;
   }
   return payload;

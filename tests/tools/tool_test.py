@@ -601,6 +601,102 @@ class NvItems(ToolTest):
         self.assertIn("3101 CHANNEL_OFFSET [0-3]\n", self.expect(0, "nv", "defs", self.DEFS[1]).out)
 
 
+class Flash(ToolTest):
+    PROGRAMMER = (b":020000040002F8\n:10000000000102030405060708090A0B0C0D0E0F78\n"
+                  b":10001000101112131415161718191A1B1C1D1E1F68\n:0400000500020000F5\n:00000001FF\n")
+
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.folder = folder.name
+        self.programmer = self.add("programmer.hex", self.PROGRAMMER)
+
+    def path(self, name):
+        return os.path.join(self.folder, name)
+
+    def add(self, name, content):
+        with open(self.path(name), "wb") as file:
+            file.write(content)
+        return self.path(name)
+
+    def flash(self, code, sim, *words):
+        return self.expect_json(code, "-p", "7", "--time-out", "2000", "flash", *words, ports={7: sim.device})
+
+    def test_from_diagnostic_mode_to_images_in_flash(self):
+        image = self.add("image.bin", os.urandom(70000))
+        with handset("--flash-block", "4096", "--flash-window", "8") as sim:
+            self.assertEqual(self.flash(0, sim, "info")["state"], "diagnostic")
+            self.assertIn("diagnostic mode", self.flash(7, sim, "write", image)["error"]["text"])
+            loaded = self.flash(0, sim, "load", self.programmer)
+            self.assertEqual((loaded["bytes"], loaded["block_size"], loaded["window"]), (32, 4096, 8))
+            self.assertEqual(self.flash(0, sim, "info")["state"], "programmer")
+            written = self.flash(0, sim, "write", "--type", "2", image, "9:" + self.programmer)
+            self.assertEqual(written["bytes"], 70032)
+            self.assertEqual([row.get("type") for row in written["written"]], [None, 9])
+
+    def test_partition_tables_and_refusals(self):
+        tables = [self.add(f"table{i}", b"\x01NAME" + bytes([i])) for i in (1, 2)]
+        image = self.add("image.bin", bytes(100))
+        with handset() as sim:
+            self.flash(0, sim, "load", self.programmer)
+            self.flash(0, sim, "write", "--security", "1", "--partition", tables[0], image)
+            refusal = self.flash(7, sim, "write", "--partition", tables[1], image)["error"]
+            self.assertIn("--override", refusal["hint"])
+            self.flash(0, sim, "write", "--partition", tables[1], "--override", image)
+            self.flash(10, sim, "write", "--partition", self.add("long", bytes(513)), image)
+
+    def test_broken_pipelines_tell_what_happened(self):
+        image = self.add("image.bin", os.urandom(20000))
+        for fault, code, name in (("wrong-code=13,nth=3,of=08", 6, "link"), ("hang-up,nth=5,of=08", 9, "lost")):
+            with self.subTest(fault), handset("--fault", fault) as sim:
+                self.flash(0, sim, "load", self.programmer)
+                self.assertEqual(self.flash(code, sim, "write", image)["error"]["name"], name)
+
+    def test_interrupted_write_ends_at_once_while_the_handset_is_silent(self):
+        image = self.add("image.bin", bytes(20000))
+        with handset("--fault", "lose,from=3,of=08") as sim:
+            self.flash(0, sim, "load", self.programmer)
+            log = self.path("log")
+            tool = start("-p", "7", "--json", "--log", log, "flash", "write", image, ports={7: sim.device})
+            deadline = time.monotonic() + PATIENCE
+            while time.monotonic() < deadline:
+                with contextlib.suppress(FileNotFoundError), open(log, encoding="latin-1") as file:
+                    if "Streaming start" in file.read():
+                        break
+                time.sleep(0.01)
+            tool.send_signal(signal.SIGINT)
+            began = time.monotonic()
+            out, _ = tool.communicate(timeout=PATIENCE)
+            self.assertEqual((tool.returncode, json.loads(out)["error"]["name"]), (130, "interrupted"))
+            self.assertLess(time.monotonic() - began, 3)
+
+    def test_files_are_checked_and_planned_without_a_handset(self):
+        binary = self.add("image.bin", b"x" * 40000)
+        plan = self.expect_json(0, "flash", "write", "--dry-run", "--block-size", "1000", binary, "3:" + self.programmer)
+        self.assertEqual((plan["bytes"], plan["blocks"]), (40032, 41))
+        self.assertEqual(plan["images"][1]["regions"], [{"base": 0x20000, "size": 32}])
+        plan = self.expect_json(0, "flash", "load", "--dry-run", "--packet", "20", self.programmer)
+        self.assertEqual(plan["writes"], 4)
+        self.assertIn("0x00020000 to 0x0002001F", self.expect(0, "flash", "verify-image", self.programmer).out)
+        startless = self.add("startless.hex", self.PROGRAMMER.replace(b":0400000500020000F5\n", b""))
+        broken = self.add("broken.hex", self.PROGRAMMER.replace(b"F78", b"F79"))
+        two = self.add("two.hex", b":020000040001F9\n:0100000055AA\n:020000040800F2\n:0100000055AA\n:00000001FF\n")
+        for words in (("load", startless), ("load", binary), ("write", broken), ("write", two),
+                      ("write", self.add("empty", b"")), ("verify-image", self.path("missing")), ("hex", two, "x")):
+            self.expect_json(10, "flash", *words)
+
+    def test_hex_files_become_binaries_and_back(self):
+        content = os.urandom(5000)
+        binary, hexfile, back = self.add("a.bin", content), self.path("a.hex"), self.path("b.bin")
+        self.expect(0, "flash", "hex", "--base", "0x30000", binary, hexfile)
+        answer = self.expect_json(0, "flash", "hex", hexfile, back)
+        self.assertEqual((answer["base"], answer["bytes"]), (0x30000, 5000))
+        with open(back, "rb") as file:
+            self.assertEqual(file.read(), content)
+        self.expect_json(2, "flash", "hex", "--base", "0x100", binary, hexfile)
+        self.expect_json(2, "flash", "hex", "--base", "0x30000", hexfile, back)
+
+
 class Counting(unittest.TextTestResult):
     passed = 0
 

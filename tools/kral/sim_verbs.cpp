@@ -35,6 +35,8 @@ struct SimOptions {
   std::uint32_t efs_blocks = 0;     // 0: as many as there are
   std::optional<std::uint32_t> efs_bad_offset;
   std::vector<std::pair<std::string, std::string>> efs_shown_names;
+  std::uint32_t flash_block = 0;  // 0: as the programmer has it
+  std::uint16_t flash_window = 0;
   std::vector<std::string> faults;
   double bit_errors = 0;
   handset::LogTraffic traffic;
@@ -49,6 +51,12 @@ void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
   if (options.efs_blocks != 0) handset.efs().SetTotalBlocks(options.efs_blocks);
   if (options.efs_bad_offset) handset.efs().SetBadOffset(*options.efs_bad_offset);
   for (const auto& [name, shown] : options.efs_shown_names) handset.efs().ShowNameAs(name, shown);
+  auto programmer = handset.programmer().settings();
+  if (options.flash_block != 0) programmer.block_size = options.flash_block;
+  if (options.flash_window != 0) programmer.window = options.flash_window;
+  handset.programmer().Set(programmer);
+  handset.programmer().KeepPackets(false);
+  handset.loader().KeepPackets(false);
   handset.faults().SetSeed(options.seed);
   handset.faults().SetBitErrorRate(options.bit_errors);
   for (const auto& fault : options.faults) AddFault(handset.faults(), fault);
@@ -126,6 +134,8 @@ void AddOptions(CLI::App& sim, SimOptions& options) {
   sim.add_option("--log-size", options.traffic.log_size, "Bytes of a log packet")->check(CLI::Range(16, 4090));
   sim.add_option("--burst", options.traffic.burst, "Packets that come at once; the rate stays")
       ->check(CLI::Range(1, 4096));
+  sim.add_option("--flash-block", options.flash_block, "Largest block that the flash programmer announces");
+  sim.add_option("--flash-window", options.flash_window, "Window that the flash programmer announces");
   sim.add_option("--fault", options.faults, "Misbehaviour, see below; may be given several times")
       ->take_all()
       ->allow_extra_args(false);
