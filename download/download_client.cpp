@@ -61,6 +61,13 @@ uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImag
   }
 }
 
+// Through a phone server there is no framer to talk to.
+bool IsRefused(Diag_FTM& phone, const char* name) {
+  if (!phone.server_mode()) return false;
+  phone.log().WriteLine(kLogErr, "%s() : FAIL in ORBT mode", name);
+  return true;
+}
+
 bool IsNull(const CallersBytes& bytes) {
   return bytes.data == nullptr && bytes.size != 0;
 }
@@ -85,6 +92,7 @@ bool ConfigureHello(Diag_FTM& phone, uint32_t tries, uint32_t delay_ms) {
 }
 
 bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_packet, uint32_t* result) {
+  if (IsRefused(phone, "KRAL_KOVA_LoadFlashProgrammer")) return Give(KRAL_KOVA_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (file == nullptr) return Give(KRAL_KOVA_FILE_NOT_OPENED, result);
@@ -92,16 +100,19 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
 }
 
 bool KovaNop(Diag_FTM& phone) {
+  if (IsRefused(phone, "KRAL_KOVA_NOP")) return false;
   DownloadConnection connection(phone);
   return kova::Nop(connection);
 }
 
 bool KovaReset(Diag_FTM& phone) {
+  if (IsRefused(phone, "KRAL_KOVA_RESET")) return false;
   DownloadConnection connection(phone);
   return kova::Reset(connection);
 }
 
 bool KovaSoftwareVersion(Diag_FTM& phone, uint8_t* version) {
+  if (IsRefused(phone, "KRAL_KOVA_SW_VERSION")) return false;
   DownloadConnection connection(phone);
   uint8_t value = 0;
   if (!kova::SoftwareVersion(connection, value)) return false;
@@ -110,6 +121,7 @@ bool KovaSoftwareVersion(Diag_FTM& phone, uint8_t* version) {
 }
 
 bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16_t* window) {
+  if (IsRefused(phone, "KRAL_STREAM_HELLO")) return false;
   DownloadConnection connection(phone);
   connection.BeginWork();
   const auto answer = stream::Hello(connection, phone.download(), variant);
@@ -120,11 +132,13 @@ bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16
 }
 
 bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
+  if (IsRefused(phone, "KRAL_STREAM_SECURITY_MODE")) return false;
   DownloadConnection connection(phone);
   return CImageSecMode(connection, connection.time_out_ms()).Send(mode);
 }
 
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
+  if (IsRefused(phone, "KRAL_STREAM_PARTITION_TABLE")) return false;
   DownloadConnection connection(phone);
   if (file == nullptr) return false;
   std::optional<uint8_t> answer;
@@ -136,6 +150,7 @@ bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, u
 
 bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const char* header_file,
                     const WriteArguments& arguments, uint32_t* result) {
+  if (IsRefused(phone, "KRAL_STREAM_WriteImageFile")) return Give(KRAL_STREAM_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (file == nullptr) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
@@ -151,6 +166,7 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
 
 bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address, const CallersBytes& header,
                    const WriteArguments& arguments, uint32_t* result) {
+  if (IsRefused(phone, "KRAL_STREAM_WriteImageMem")) return Give(KRAL_STREAM_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);

@@ -7,6 +7,7 @@
 #include "download/stream_hello.h"
 #include "handset/bytes.h"
 #include "tests/support/download_fixture.h"
+#include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -198,6 +199,25 @@ TEST_F(StreamWire, EveryWrongAnswerHasItsLineAndItsResult) {
   EXPECT_EQ(WriteMem({0x55}, 0, 9), KRAL_STREAM_BAD_ARGUMENT);
   block_size_ = 0;  // a handset that takes no bytes at all
   EXPECT_EQ(WriteMem({0x55}, 0, KRAL_STREAM_NOR), KRAL_STREAM_WRITE_FAILED);
+}
+
+TEST(DownloadThroughAServer, IsRefusedWithoutTraffic) {
+  test::ScriptedServer server;
+  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
+  server.TakeCalls();
+  uint8_t version = 0;
+  uint32_t block_size = 0;
+  uint16_t window = 0;
+  uint32_t result = 0;
+  EXPECT_EQ(KRAL_KOVA_LoadFlashProgrammer(handle, "", 100, &result), 0);
+  EXPECT_EQ(KRAL_KOVA_NOP(handle) + KRAL_KOVA_RESET(handle) + KRAL_KOVA_SW_VERSION(handle, &version), 0);
+  EXPECT_EQ(KRAL_STREAM_HELLO(handle, 1, &block_size, &window) + KRAL_STREAM_SECURITY_MODE(handle, 1), 0);
+  EXPECT_EQ(KRAL_STREAM_PARTITION_TABLE(handle, "", 0, nullptr), 0);
+  EXPECT_EQ(KRAL_STREAM_WriteImageFile(handle, "", 0, 0, nullptr, KRAL_STREAM_NOR, 100, 2, &result), 0);
+  EXPECT_EQ(KRAL_STREAM_WriteImageMem(handle, &version, 1, 0, 0, nullptr, 0, KRAL_STREAM_NOR, 100, 2, &result), 0);
+  EXPECT_EQ(result, KRAL_STREAM_WRITE_FAILED);
+  EXPECT_EQ(server.TakeCalls(), std::vector<std::string>{});
+  KRAL_DisconnectServer(handle);
 }
 
 }  // namespace

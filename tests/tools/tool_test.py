@@ -647,7 +647,7 @@ class Flash(ToolTest):
 
     def test_broken_pipelines_tell_what_happened(self):
         image = self.add("image.bin", os.urandom(20000))
-        for fault, code, name in (("wrong-code=13,nth=3,of=08", 6, "link"), ("hang-up,nth=5,of=08", 9, "lost")):
+        for fault, code, name in (("wrong=13,nth=3,of=08", 6, "link"), ("hang-up,nth=5,of=08", 9, "lost")):
             with self.subTest(fault), handset("--fault", fault) as sim:
                 self.flash(0, sim, "load", self.programmer)
                 self.assertEqual(self.flash(code, sim, "write", image)["error"]["name"], name)
