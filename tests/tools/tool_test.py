@@ -404,6 +404,72 @@ class Simulation(ToolTest):
         self.expect_json(2, "sim", "--fault", "frobnicate")
 
 
+class Backups(ToolTest):
+    """NV items to and from PKV files; an item is given its value by a write request of the raw verb."""
+
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.file = os.path.join(folder.name, "phone.pkv")
+        self.ports = {}
+
+    @contextlib.contextmanager
+    def handset(self, *options, values=()):
+        with handset(*options) as sim:
+            self.ports = {7: sim.device}
+            for item, value in values:
+                self.expect(0, "-p", "7", "raw", f"27{item:02X}00{value:02X}" + "00" * 127, ports=self.ports)
+            yield sim
+
+    def nv(self, code, verb, *options):
+        return self.expect_json(code, "-p", "7", "nv", verb, self.file, *options, ports=self.ports)
+
+    def results(self, answer):
+        return {row.get("id", row.get("path")): row["result"] for row in answer["items"]}
+
+    def test_a_backup_is_restored_to_another_handset(self):
+        with self.handset(values=[(1, 0x11), (2, 0x22)]):
+            counts = self.nv(0, "backup", "--items", "0-20")["counts"]
+            self.assertEqual((counts["read"], counts["without-value"]), (3, 18))
+            self.assertEqual(self.results(self.nv(0, "verify")), {0: "equal", 1: "equal", 2: "equal"})
+        with self.handset(values=[(1, 0x11)]):
+            expected = {0: "equal-already", 1: "equal-already", 2: "would-be-written"}
+            self.assertEqual(self.results(self.nv(0, "restore", "--dry-run")), expected)
+            answer = self.nv(8, "verify")
+            self.assertEqual(self.results(answer)[2], "different")
+            self.assertEqual(answer["items"][2]["status"], 5)
+            self.assertEqual(self.results(self.nv(0, "restore")), {0: "skipped", 1: "written", 2: "written"})
+            text = self.expect(0, "-p", "7", "nv", "verify", self.file, ports=self.ports).out
+            self.assertEqual(text, "3 equal\n")
+
+    def test_refused_items_do_not_keep_the_others_from_being_written(self):
+        with self.handset("--esn", "0x1234", values=[(1, 0x11), (2, 0x22)]):
+            self.nv(0, "backup", "--items", "0-20")
+        with self.handset("--esn", "0x5678"):
+            answer = self.nv(7, "restore")
+            self.assertEqual(self.results(answer), {0: "refused", 1: "written", 2: "written"})
+            done = self.expect(7, "-p", "7", "nv", "restore", self.file, ports=self.ports)
+            self.assertIn("item 0: refused, status 7\n2 written, 1 refused\n", done.err)
+
+    def test_a_lost_handset_leaves_the_file_as_it_was(self):
+        with open(self.file, "w", encoding="ascii") as file:
+            file.write("precious")
+        with self.handset("--fault", "hang-up,nth=9,of=26"):
+            answer = self.nv(9, "backup", "--items", "0-20")
+            self.assertEqual(answer["counts"]["not-reached"], 21 - 7)
+        with open(self.file, encoding="ascii") as file:
+            self.assertEqual(file.read(), "precious")
+        self.assertEqual(os.listdir(os.path.dirname(self.file)), ["phone.pkv"])
+
+    def test_mistakes_are_told(self):
+        with self.handset():
+            self.assertIn("phone.pkv", self.nv(10, "restore")["error"]["text"])
+            for items in ("9-1", "x", "0-70000", ""):
+                self.nv(2, "backup", "--items", items)
+            self.nv(2, "backup", "--subscriptions", "0")
+            self.assertIn("no item", self.nv(7, "backup", "--items", "5")["error"]["text"])
+
+
 class Files(ToolTest):
     def setUp(self):
         folder = tempfile.TemporaryDirectory()

@@ -66,6 +66,7 @@ int Run(int argc, char** argv) {
   AddEventVerbs(app, context);
   AddNvVerbs(app, context);
   AddFlashVerbs(app, context);
+  AddNvBackupVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);

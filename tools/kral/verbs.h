@@ -30,6 +30,7 @@ void AddPortVerbs(CLI::App& app, Context& context);
 void AddInfoVerbs(CLI::App& app, Context& context);
 void AddModeVerbs(CLI::App& app, Context& context);
 void AddNvVerbs(CLI::App& app, Context& context);
+void AddNvBackupVerbs(CLI::App& app, Context& context);
 void AddRawVerbs(CLI::App& app, Context& context);
 void AddSimVerbs(CLI::App& app, Context& context);
 
