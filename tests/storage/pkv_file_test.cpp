@@ -131,6 +131,12 @@ TEST(PkvNames, OnlyTheirOwnFormIsTaken) {
 
 // --- Sets, through both writers -------------------------------------------------------------------------------------
 
+void SortItems(PkvSet& set) {
+  std::sort(set.items.begin(), set.items.end(), [](const auto& a, const auto& b) {
+    return std::tuple(a.subscription, a.id, a.index) < std::tuple(b.subscription, b.id, b.index);
+  });
+}
+
 PkvSet ExampleSet() {
   PkvSet set;
   for (uint16_t id = 0; id < 40; ++id) set.items.push_back(Item(id * 7, static_cast<uint8_t>(id)));
@@ -138,9 +144,7 @@ PkvSet ExampleSet() {
   set.items.push_back(Item(10, 0xA1, 2));
   set.items.push_back(Item(5, 0xB0, 0, 1));
   set.items.push_back(Item(5, 0xB1, 3, 2));
-  std::sort(set.items.begin(), set.items.end(), [](const auto& a, const auto& b) {
-    return std::tuple(a.subscription, a.id, a.index) < std::tuple(b.subscription, b.id, b.index);
-  });
+  SortItems(set);
   set.files = {{"/nv/item_files/rfnv/00020203", 0xE1FF, {1, 2, 3}},
                {"/nv/items/empty", 0xE1FF, {}},
                {"nv/reg_files/conf/plain", 0x81FF, std::vector<uint8_t>(5000, 0x5A)}};
@@ -171,6 +175,29 @@ TEST_F(PkvFiles, WhatOneWriterWritesTheReaderReads) {
     EXPECT_EQ(read.files, set.files);
     EXPECT_EQ(read.properties.version, "VARN 6.0.29");
     EXPECT_EQ(read.properties.values, set.properties.values);
+  }
+}
+
+// The same set, written by each writer of each home; the fuzzer begins with these, too.
+TEST_F(PkvFiles, FilesOfBothHomesHoldTheSame) {
+  PkvSet set;
+  for (const uint16_t id : {0, 3, 453, 9999}) {
+    for (const uint16_t subscription : {0, 1}) {
+      set.items.push_back(Item(id, static_cast<uint8_t>(id + subscription), 0, subscription));
+    }
+  }
+  set.items.push_back(Item(453, 0x77, 7));
+  SortItems(set);
+  set.files = {{"/nv/item_files/rfnv/00020203", 0xE1B6, {1, 2, 3}},
+               {"nv/reg_files/conf/plain", 0x81B6, std::vector<uint8_t>(5000, 0x5A)}};
+  for (const char* name : {"linux_arrays", "linux_numbered", "windows_arrays", "windows_numbered"}) {
+    SCOPED_TRACE(name);
+    PkvSet read;
+    const PkvOutcome outcome = ReadPkv(std::string(KRAL_CORPUS "/pkv/") + name, read);
+    ASSERT_TRUE(outcome.done()) << outcome.text;
+    EXPECT_EQ(read.items, set.items);
+    EXPECT_EQ(read.files, set.files);
+    EXPECT_EQ(read.properties.version, "VARN 6.0.29");
   }
 }
 

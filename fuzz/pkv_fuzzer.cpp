@@ -1,0 +1,68 @@
+// Any bytes as a PKV file: the compound document around it, the records in it, and the library's own iterator over
+// them. What was accepted must come out of either writer, and in again, the same.
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <random>
+#include <string>
+
+#include "storage/pkv_set.h"
+#include "storage/varn_pkv_file.h"
+
+namespace {
+
+using namespace kral;
+
+void Check(bool condition) {
+  if (!condition) std::abort();
+}
+
+// A file of this process alone.
+std::string FileName(const char* name) {
+  static const std::string prefix =
+      (std::filesystem::temp_directory_path() / ("kral-fuzz-" + std::to_string(std::random_device()()))).string();
+  return prefix + name;
+}
+
+struct Removed {
+  ~Removed() {
+    std::error_code ignored;
+    std::filesystem::remove(path, ignored);
+  }
+  std::string path;
+};
+
+void Walk(const std::string& path) {
+  VARN_PkvFile file;
+  try {
+    file.open(path);
+    int count = 0;
+    for (auto item = file.begin(); item != file.end(); item++) count += item->data[0] != 0 ? 1 : 0;
+  } catch (const VARN_PkvFile::Exception&) {
+  }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  const Removed input{FileName(".pkv")};
+  std::ofstream(input.path, std::ios::binary)
+      .write(reinterpret_cast<const char*>(data), static_cast<std::streamsize>(size));
+  Walk(input.path);
+  PkvSet set;
+  const PkvOutcome outcome = ReadPkv(input.path, set);
+  Check(outcome.done() == outcome.text.empty());
+  if (!outcome.done()) return 0;
+  for (const PkvWriter writer : {PkvWriter::kStorageClasses, PkvWriter::kVarnPkvFile}) {
+    if (set.items.empty() && set.files.empty()) continue;  // nothing that the second one would write
+    const Removed copy{FileName("-copy.pkv")};
+    const PkvOutcome written = WritePkv(copy.path, set, nullptr, writer);
+    PkvSet again;
+    Check(written.done() && ReadPkv(copy.path, again).done());
+    Check(again.items == set.items);
+    Check(again.files.size() == set.files.size());
+  }
+  return 0;
+}
