@@ -39,6 +39,31 @@ void ReadIdentity(Diag_FTM& phone, PkvProperties& properties) {
   }
 }
 
+struct Wanted {
+  uint16_t id;
+  uint16_t index;
+  uint16_t subscription;
+  bool element;
+};
+
+// The ids of the range, and beyond it those that are defined. Elements can be named in subscription 0 only.
+std::vector<Wanted> WantedItems(Diag_FTM& phone) {
+  const PkvSettings& settings = phone.pkv();
+  auto highest_elements = DefinedItems(phone);
+  for (uint32_t id = settings.first_item; id <= settings.last_item; ++id) {
+    highest_elements.emplace(static_cast<uint16_t>(id), uint16_t{0});
+  }
+  std::vector<Wanted> wanted;
+  for (uint16_t subscription = 0; subscription < settings.subscriptions; ++subscription) {
+    for (const auto& [id, highest] : highest_elements) {
+      if (highest != 0 && subscription != 0) continue;
+      for (uint32_t index = 0; index <= highest; ++index)
+        wanted.push_back({id, static_cast<uint16_t>(index), subscription, highest != 0});
+    }
+  }
+  return wanted;
+}
+
 class BackupJob {
  public:
   explicit BackupJob(Diag_FTM& phone) : phone_(phone), items_(phone) {}
@@ -46,13 +71,10 @@ class BackupJob {
   uint32_t Run(PkvSet& set) {
     std::vector<PhoneItems::FoundFile> files;
     if (items_.FindFiles(files) == Answer::kLost) return KRAL_PKV_STATUS_LOST;
-    const PkvSettings& settings = phone_.pkv();
-    const size_t range = size_t{settings.last_item} - settings.first_item + 1;
-    JobReport report(phone_, range * settings.subscriptions + files.size());
-    for (uint16_t subscription = 0; subscription < settings.subscriptions; ++subscription) {
-      for (uint32_t id = settings.first_item; id <= settings.last_item; ++id) {
-        if (!ReadItem({.id = static_cast<uint16_t>(id), .subscription = subscription}, set, report)) return End(report);
-      }
+    const std::vector<Wanted> items = WantedItems(phone_);
+    JobReport report(phone_, items.size() + files.size());
+    for (const Wanted& item : items) {
+      if (!ReadItem(item, set, report)) return End(report);
     }
     for (const PhoneItems::FoundFile& file : files) {
       if (!ReadFile({.path = file.path, .mode = file.mode, .bytes = {}}, set, report)) return End(report);
@@ -66,8 +88,9 @@ class BackupJob {
   }
 
   // False when the job is over.
-  bool ReadItem(PkvNvItem item, PkvSet& set, JobReport& report) {
-    const Answer answer = items_.Read(item, false);
+  bool ReadItem(const Wanted& wanted, PkvSet& set, JobReport& report) {
+    PkvNvItem item{.id = wanted.id, .index = wanted.index, .subscription = wanted.subscription};
+    const Answer answer = items_.Read(item, wanted.element);
     if (answer == Answer::kLost) return false;
     if (answer == Answer::kRefused) {
       report.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);

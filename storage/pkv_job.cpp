@@ -1,6 +1,8 @@
 // The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
 #include "storage/pkv_jobs.h"
 
+#include "storage/nv_tool.h"
+
 namespace kral::pkv {
 namespace {
 
@@ -86,14 +88,23 @@ uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
   return StatusOf(outcome.result);
 }
 
-ArrayItems::ArrayItems(const PkvSet& set) {
-  for (const PkvNvItem& item : set.items) {
-    if (item.index != 0) arrays_.emplace(item.subscription, item.id);
-  }
+std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
+  std::map<uint16_t, uint16_t> items;
+  const auto tool = Kral_ResourceManager::GetFamily<nv::NVTool_Manager>(phone.handle(), FamilySlot::kNvManager, {});
+  if (!tool) return items;
+  tool->definitions().ForEach([&](const nv::NvItem& item) {
+    if (item.id && !item.is_file()) items.emplace(*item.id, item.max_index);
+  });
+  return items;
 }
 
-bool ArrayItems::IsElement(const PkvNvItem& item) const {
-  return arrays_.contains({item.subscription, item.id});
+ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {
+  for (const PkvNvItem& item : set.items) {
+    if (item.index != 0) ids_.insert(item.id);
+  }
+  for (const auto& [id, highest_element] : DefinedItems(phone)) {
+    if (highest_element != 0) ids_.insert(id);
+  }
 }
 
 }  // namespace kral::pkv

@@ -3,9 +3,9 @@
 #define KRAL_STORAGE_PKV_JOBS_H
 
 #include <cstdint>
+#include <map>
 #include <set>
 #include <string>
-#include <utility>
 
 #include "frame/diag_ftm.h"
 #include "storage/pkv_set.h"
@@ -44,14 +44,18 @@ class JobReport {
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
 uint32_t StatusOf(PkvResult result);
 
-// Ids of which a set holds elements: index words other than 0 name them. Index 0 is then an element, too.
+// The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
+std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
+
+// Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
+// those that are defined so.
 class ArrayItems {
  public:
-  explicit ArrayItems(const PkvSet& set);
-  bool IsElement(const PkvNvItem& item) const;
+  ArrayItems(Diag_FTM& phone, const PkvSet& set);
+  bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
 
  private:
-  std::set<std::pair<uint16_t, uint16_t>> arrays_;  // subscription, id
+  std::set<uint16_t> ids_;
 };
 
 }  // namespace kral::pkv

@@ -14,7 +14,7 @@ using Answer = PhoneItems::Answer;
 class RestoreJob {
  public:
   RestoreJob(Diag_FTM& phone, const PkvSet& set)
-      : items_(phone), set_(set), arrays_(set), report_(phone, set.items.size() + set.files.size()) {}
+      : items_(phone), set_(set), arrays_(phone, set), report_(phone, set.items.size() + set.files.size()) {}
 
   uint32_t Run() {
     std::span<const PkvNvItem> rest(set_.items);  // subscription 0 comes first

@@ -10,7 +10,7 @@ using Answer = PhoneItems::Answer;
 class VerifyJob {
  public:
   VerifyJob(Diag_FTM& phone, const PkvSet& set)
-      : items_(phone), set_(set), arrays_(set), report_(phone, set.items.size() + set.files.size()) {}
+      : items_(phone), set_(set), arrays_(phone, set), report_(phone, set.items.size() + set.files.size()) {}
 
   uint32_t Run() {
     for (const PkvNvItem& item : set_.items) {

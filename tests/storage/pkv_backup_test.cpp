@@ -5,6 +5,7 @@
 #include <map>
 
 #include "kral/nv.h"
+#include "kral/nv_tool.h"
 #include "kral/pkv.h"
 #include "storage/pkv_set.h"
 #include "tests/support/efs_fixture.h"
@@ -209,6 +210,25 @@ TEST_F(PkvBackup, ElementsGoToTheElementsOfArrays) {
   EXPECT_EQ(handset().nv().Element(5, 2).value_or(Bytes{0})[0], 3);
   EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
   EXPECT_EQ(g_results["5[1]"], Result(KRAL_PKV_DONE, 0));
+}
+
+TEST_F(PkvBackup, DefinitionsNameElementsAndItemsBeyondTheRange) {
+  const std::string definitions = folder_.Add(
+      "definitions.xml",
+      "<NvDefinition version='1.0'><NvItem id='5' name='array' maxIndex='2'><DataType><Member name='v' typeid='word8' "
+      "num_of_element='127'/></DataType></NvItem><NvItem id='30000' name='beyond'><DataType><Member name='v' "
+      "typeid='word8' num_of_element='128'/></DataType></NvItem></NvDefinition>");
+  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), definitions.c_str()), 0u) << ErrorText();
+  handset().nv().MakeArray(5, 3);
+  handset().nv().SetElement(5, 0, Bytes{1});  // alone it looks like a plain item
+  handset().nv().Set(30000, Bytes{3});
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  EXPECT_EQ(g_results["5"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["5[2]"], Result(KRAL_PKV_SKIPPED, 5));
+  EXPECT_EQ(g_results["30000"], Result(KRAL_PKV_DONE, 0));
+  handset().nv().SetElement(5, 0, Bytes{9});
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(handset().nv().Element(5, 0).value_or(Bytes{0})[0], 1);
 }
 
 // --- Trouble on the line --------------------------------------------------------------------------------------------
