@@ -30,7 +30,17 @@ class BoundedQueue {
 
   // False when the oldest record had to be dropped to make room.
   bool Push(Record record) {
+    const bool kept_all = PushQuietly(std::move(record));
+    not_empty_.notify_one();
+    return kept_all;
+  }
+
+  // The same without waking a reader for each record: one switch of threads for every packet of a flood would cost more
+  // than all the rest. Readers are woken by WakeReaders, which must follow, and before too many records wait.
+  bool PushQuietly(Record record) {
+    constexpr size_t kManyRecords = 64;
     bool kept_all = true;
+    bool many = false;
     {
       const std::lock_guard lock(mutex_);
       if (records_.size() >= capacity_) {
@@ -39,10 +49,12 @@ class BoundedQueue {
         kept_all = false;
       }
       records_.push_back(std::move(record));
+      many = records_.size() % kManyRecords == 0;
     }
-    not_empty_.notify_one();
+    if (many) WakeReaders();
     return kept_all;
   }
+  void WakeReaders() { not_empty_.notify_all(); }
 
   std::optional<Record> Pop() {
     const std::lock_guard lock(mutex_);

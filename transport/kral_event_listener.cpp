@@ -42,6 +42,12 @@ CKralEventListener::CKralEventListener(PacketQueue& responses, PacketQueue& asyn
 
 void CKralEventListener::OnPacket(std::span<const uint8_t> packet) {
   TakePacket({packet.begin(), packet.end()});
+  OnBatchEnd();
+}
+
+void CKralEventListener::OnBatchEnd() {
+  asynchronous_.WakeReaders();
+  events_.WakeReaders();
 }
 
 void CKralEventListener::TakePacket(Packet packet) {
@@ -78,7 +84,7 @@ void CKralEventListener::QueueAsynchronous(Packet packet) {
   }
   if (packet[0] == kEventReportCode) QueueEvents(packet, callbacks);
   if (capture_ != nullptr) capture_->Append(packet);
-  asynchronous_.Push(std::move(packet));
+  asynchronous_.PushQuietly(std::move(packet));
   Increment(collected_);
 }
 
@@ -96,7 +102,7 @@ void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, cons
       std::memcpy(&record, event->record.bytes.data(), sizeof(record));
       callbacks.event(&record, callbacks.value);
     }
-    events_.Push(event->record);
+    events_.PushQuietly(event->record);
     Increment(event_count_);
   }
 }

@@ -110,6 +110,7 @@ void CKralEvents::Run() {
         if (stop_requested_) break;
         Dispatch(std::move(packet));
       }
+      EndBatch();
     }
     OnThreadEnd();
   } else {
@@ -129,6 +130,12 @@ bool CKralEvents::TakeBatch(std::deque<Packet>& batch) {
   if (stop_requested_) return false;
   batch.swap(queue_);
   return true;
+}
+
+void CKralEvents::EndBatch() {
+  const std::lock_guard lock(listeners_mutex_);
+  // By index: a listener may unregister itself.
+  for (size_t i = 0; i < listeners_.size(); ++i) listeners_[i].listener->OnBatchEnd();
 }
 
 void CKralEvents::Dispatch(Packet packet) {

@@ -64,6 +64,7 @@ class CKralEvents {
   void Run();
   bool TakeBatch(std::deque<Packet>& batch);
   void Dispatch(Packet packet);
+  void EndBatch();
   void EndAccepting();
 
   std::mutex queue_mutex_;
