@@ -17,7 +17,7 @@ namespace {
 
 // A packet is with the system at most so long after it came, or as soon as there is a good piece to write.
 constexpr std::chrono::milliseconds kGatherTime{100};
-constexpr size_t kGoodPiece = size_t{256} << 10;
+constexpr size_t kGoodPiece = size_t{64} << 10;
 
 uint64_t MicrosecondsNow() {
   const auto now = std::chrono::system_clock::now().time_since_epoch();
