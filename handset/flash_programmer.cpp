@@ -56,6 +56,11 @@ bool FlashProgrammer::OnPacket(ByteView packet, Wire& wire) {
     case 0x09:
       wire.Send(Bytes{0x0A});
       break;
+    case 0x0A:
+      if (packet.size() != 1) break;
+      wire.Send(Bytes{0x02});
+      wire.Restart(0);
+      return false;
     case 0x15:
       if (packet.size() == 1) Close(wire);
       break;

@@ -6,6 +6,7 @@
 #include <chrono>
 
 #include "handset/rf_nv.h"
+#include "handset/software_image.h"
 #include "handset/wire_modes.h"
 
 namespace kral::handset {
@@ -43,7 +44,8 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       memory_(std::make_shared<Memory>()),
       maintenance_(std::make_shared<Maintenance>(identity.service_code)),
       programmer_(std::make_shared<FlashProgrammer>(flash_)),
-      loader_(std::make_shared<KovaLoader>(*memory_, programmer_)) {
+      loader_(std::make_shared<KovaLoader>(*memory_, programmer_)),
+      boot_loader_(std::make_shared<BootLoader>()) {
   ftm_->SetDispatcher(kRfNvModeId, [efs = efs_](uint16_t command, ByteView payload) {
     return CarryOutRfNv(*efs, command, payload);
   });
@@ -53,6 +55,7 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
     AddServiceLocked(service);
   }
   mode_service_->SetLoader(loader_);
+  boot_loader_->SetProgrammer(programmer_);
 }
 
 VirtualHandset::~VirtualHandset() = default;
@@ -98,8 +101,19 @@ void VirtualHandset::PlugInLocked(std::shared_ptr<WireMode> mode) {
 
 void VirtualHandset::Restart() {
   const std::lock_guard lock(mutex_);
-  for (const auto& service : services_) service->OnReset();
+  ResetLocked();
   PlugInLocked(start_mode_);
+}
+
+// What was downloaded is what runs from here on.
+void VirtualHandset::ResetLocked() {
+  for (const auto& service : services_) service->OnReset();
+  const auto revision = SoftwareRevision(flash_);
+  if (!revision) return;
+  Identity identity = identity_->identity();
+  identity.software_revision = *revision;
+  identity_->Set(std::move(identity));
+  start_mode_ = nullptr;
 }
 
 bool VirtualHandset::vanished() {
@@ -250,7 +264,7 @@ bool VirtualHandset::SwitchModeLocked() {
 }
 
 void VirtualHandset::RestartLocked(uint32_t silent_ms) {
-  for (const auto& service : services_) service->OnReset();
+  ResetLocked();
   next_mode_ = silent_ms == 0 || start_mode_ ? start_mode_ : std::make_shared<SilentMode>(clock_.TickMs() + silent_ms);
 }
 

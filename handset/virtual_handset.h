@@ -18,6 +18,7 @@
 #include <optional>
 #include <vector>
 
+#include "handset/boot_loader.h"
 #include "handset/bytes.h"
 #include "handset/efs_service.h"
 #include "handset/faults.h"
@@ -70,7 +71,8 @@ class VirtualHandset {
   void AddService(std::shared_ptr<Service> service);
   // Null is the diagnostic mode.
   void EnterMode(std::shared_ptr<WireMode> mode);
-  // What has the line after PlugIn and after a restart; null at first.
+  // What has the line after PlugIn and after a restart; null at first, and again once a restart finds software in
+  // flash.
   void SetStartMode(std::shared_ptr<WireMode> mode);
 
   void SendPacket(ByteView payload);  // unsolicited, framed; of the faults it knows bit errors only
@@ -91,9 +93,11 @@ class VirtualHandset {
   EfsService& efs() { return *efs_; }
   LogService& logs() { return *logs_; }
   FlashMemory& flash() { return flash_; }
-  KovaLoader& loader() { return *loader_; }              // after the download request
+  KovaLoader& loader() { return *loader_; }               // after the download request
   FlashProgrammer& programmer() { return *programmer_; }  // what the loaders start
   std::shared_ptr<FlashProgrammer> programmer_mode() { return programmer_; }
+  // Of a handset that starts in it (SetStartMode), or is sent into it.
+  const std::shared_ptr<BootLoader>& boot_loader() { return boot_loader_; }
   Clock& clock() { return clock_; }
 
   // --- What it has heard ------------------------------------------------------------------------------------------
@@ -117,6 +121,7 @@ class VirtualHandset {
   };
 
   void Travel();
+  void ResetLocked();
   void PlugInLocked(std::shared_ptr<WireMode> mode);
   void OnRequestLocked(ByteView request);
   size_t ReadDiagnosticLocked(ByteView bytes);
@@ -160,6 +165,7 @@ class VirtualHandset {
   FlashMemory flash_;
   std::shared_ptr<FlashProgrammer> programmer_;
   std::shared_ptr<KovaLoader> loader_;
+  std::shared_ptr<BootLoader> boot_loader_;
 };
 
 }  // namespace kral::handset
