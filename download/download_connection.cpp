@@ -51,7 +51,7 @@ DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const u
 }
 
 void DownloadConnection::BeginWork() {
-  phone_.download().abort = false;
+  if (!phone_.download().keep_abort) phone_.download().abort = false;
   reported_ = false;
 }
 

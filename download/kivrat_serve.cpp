@@ -28,6 +28,7 @@ class Server {
       port_.Keep();
       return false;
     }
+    if (progress_ && !progress_(0, file_.size())) return Fail(kAborted);
     if (!ServeRequests()) return false;
     file_.Close();
     return Finish();

@@ -5,6 +5,7 @@
 #ifndef KRAL_FRAME_ORBT_SERVER_H
 #define KRAL_FRAME_ORBT_SERVER_H
 
+#include <atomic>
 #include <cstdint>
 #include <exception>
 #include <functional>
@@ -41,7 +42,8 @@ class OrbtServer {
   virtual std::vector<std::string> PortsWithPhone() = 0;
 };
 
-// Whole download jobs handed to the phone server; keeps the time-outs of identifier 20 and above.
+// Whole download jobs handed to the phone server; keeps the time-outs of identifier 20 and above, and how the server is
+// to answer the hellos of boot loaders.
 class SoftwareDownload {
  public:
   virtual ~SoftwareDownload() = default;
@@ -52,10 +54,14 @@ class SoftwareDownload {
 
   bool ConfigureTimeOut(uint32_t id, int32_t milliseconds);
   int32_t GetTimeOut(uint32_t id) const;
+  // Overridden by what talks to a server, to pass the value on.
+  virtual void SetKivratHelloBehavior(uint16_t behavior) { kivrat_hello_behavior_ = behavior; }
+  uint16_t kivrat_hello_behavior() const { return kivrat_hello_behavior_; }
 
  private:
   mutable std::mutex mutex_;
   std::map<uint32_t, int32_t> time_outs_;
+  std::atomic<uint16_t> kivrat_hello_behavior_{0};
 };
 
 struct ServerFactory {

@@ -72,6 +72,7 @@ struct PkvSettings {
 // Set from any thread, also while a download runs.
 struct DownloadSettings {
   std::atomic<bool> abort{false};
+  bool keep_abort = false;  // while several downloads are one piece of work: an abort in between counts
   std::atomic<KRAL_DOWNLOAD_PROGRESS_CALLBACK> progress_callback{nullptr};
   std::atomic<uintptr_t> callback_value{0};
   std::atomic<uint32_t> hello_tries{5};

@@ -30,6 +30,7 @@
 #include "kral/download.h"
 #include "kral/efs.h"
 #include "kral/ftm.h"
+#include "kral/kivrat.h"
 #include "kral/log.h"
 #include "kral/nv.h"
 #include "kral/nv_tool.h"

@@ -244,7 +244,7 @@ TEST_F(KivratWire, ProgrammerIsServedInOrderWhateverTheOffsets) {
       return true;
     }));
     EXPECT_EQ(Written(), (Texts{"30 31 32 33", "34 35 36", "37 38 39", kDone}));
-    EXPECT_EQ(progress, (std::vector<std::pair<uint64_t, uint64_t>>{{4, 10}, {7, 10}, {10, 10}}));
+    EXPECT_EQ(progress, (std::vector<std::pair<uint64_t, uint64_t>>{{0, 10}, {4, 10}, {7, 10}, {10, 10}}));
     EXPECT_TRUE(log_->Has("4 Waiting 1 ms before Kivrat Done"));
     EXPECT_TRUE(log_->Has("4 Flash programmer successfully downloaded using Kivrat Protocol!\n"));
     EXPECT_EQ(Lines("16"), Texts());

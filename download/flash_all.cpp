@@ -1,0 +1,130 @@
+// The steps of a download from cold, each of which has an export of its own, put together.
+#include "download/flash_all.h"
+
+#include <algorithm>
+
+#include "download/download_client.h"
+#include "download/download_connection.h"
+#include "download/image_file.h"
+#include "download/kivrat.h"
+#include "platform/file_util.h"
+
+namespace kral::download {
+namespace {
+
+uint32_t Saturated(uint64_t value) {
+  return static_cast<uint32_t>(std::min<uint64_t>(value, UINT32_MAX));
+}
+
+// While it lives, the downloads of a handset are parts of one whole to the caller: their progress is added up, and an
+// abort that comes between two of them is not forgotten.
+class WholeWay {
+ public:
+  WholeWay(Diag_FTM& phone, uint64_t total)
+      : settings_(phone.download()),
+        handle_(phone.handle()),
+        callback_(settings_.progress_callback),
+        value_(settings_.callback_value),
+        total_(total) {
+    settings_.abort = false;
+    settings_.keep_abort = true;
+    settings_.callback_value = reinterpret_cast<uintptr_t>(this);
+    settings_.progress_callback = &WholeWay::OnPart;
+  }
+  ~WholeWay() {
+    settings_.progress_callback = callback_;
+    settings_.callback_value = value_;
+    settings_.keep_abort = false;
+  }
+  WholeWay(const WholeWay&) = delete;
+  WholeWay& operator=(const WholeWay&) = delete;
+
+  void EndPart(uint64_t size) { before_ += size; }
+  bool aborted() const { return settings_.abort; }
+
+ private:
+  static void KRAL_CALL OnPart(KRAL_HANDLE, uint32_t done, uint32_t, uintptr_t value) {
+    const auto& self = *reinterpret_cast<const WholeWay*>(value);
+    if (self.callback_ == nullptr) return;
+    self.callback_(self.handle_, Saturated(self.before_ + done), Saturated(self.total_), self.value_);
+  }
+
+  DownloadSettings& settings_;
+  const KRAL_HANDLE handle_;
+  const KRAL_DOWNLOAD_PROGRESS_CALLBACK callback_;
+  const uintptr_t value_;
+  const uint64_t total_;
+  uint64_t before_ = 0;
+};
+
+// Nothing is sent to a handset for files that turn out useless half-way.
+uint32_t CheckProgrammer(const char* file, uint64_t& size) {
+  FileReader reader;
+  if (reader.Open(file) || reader.size() == 0) return KRAL_STREAM_FILE_NOT_OPENED;
+  size = reader.size();
+  return KRAL_STREAM_WRITTEN;
+}
+
+uint32_t CheckImage(const char* file, uint64_t& size) {
+  KRAL_IMAGE_INFO info{};
+  const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info);
+  if (result != KRAL_STREAM_WRITTEN) return result;
+  size = info.size[0];
+  return info.size[1] == 0 ? KRAL_STREAM_WRITTEN : KRAL_STREAM_BAD_IMAGE;
+}
+
+bool BootTransfer(Diag_FTM& phone, const WholeWay& whole) {
+  uint32_t version = 0;
+  return kivrat::Connect(phone, version, nullptr, [&whole] { return whole.aborted(); });
+}
+
+}  // namespace
+
+bool ServeFlashProgrammer(Diag_FTM& phone, const char* file) {
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  const auto progress = [&connection](uint64_t done, uint64_t total) {
+    connection.Report(Saturated(done), Saturated(total));
+    return !connection.aborted();
+  };
+  return kivrat::DownloadFlashProgrammer(phone, file, progress, [&connection] { return connection.aborted(); });
+}
+
+FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const char* const> images,
+                      const uint8_t* types) {
+  uint64_t programmer_size = 0;
+  if (const uint32_t result = CheckProgrammer(programmer, programmer_size)) return {result};
+  std::vector<uint64_t> sizes(images.size());
+  uint64_t total = programmer_size;
+  for (uint32_t i = 0; i < images.size(); ++i) {
+    if (const uint32_t result = CheckImage(images[i], sizes[i])) return {result, i};
+    total += sizes[i];
+  }
+
+  WholeWay whole(phone, total);
+  const auto failed = [&whole](uint32_t result, uint32_t image = KRAL_FLASH_NO_IMAGE) {
+    return FlashOutcome{whole.aborted() ? KRAL_DOWNLOAD_ABORTED : result, image};
+  };
+  if (!BootTransfer(phone, whole)) return failed(KRAL_FLASH_CONNECT_FAILED);
+  if (!ServeFlashProgrammer(phone, programmer)) {
+    phone.GiveBackPort();
+    return failed(KRAL_FLASH_PROGRAMMER_FAILED);
+  }
+  whole.EndPart(programmer_size);
+  uint32_t block_size = 0;
+  uint16_t window = 0;
+  if (!StreamHello(phone, KRAL_STREAM_HELLO_VARIANT, &block_size, &window)) return failed(KRAL_FLASH_HELLO_FAILED);
+  for (uint32_t i = 0; i < images.size(); ++i) {
+    const uint8_t type = types == nullptr ? uint8_t{0} : types[i];
+    uint32_t result = KRAL_STREAM_WRITTEN;
+    const WriteArguments arguments{type, KRAL_STREAM_MULTI_IMAGE, block_size, window};
+    if (whole.aborted() ||
+        !WriteImageFile(phone, images[i], KRAL_IMAGE_FORMAT_BY_CONTENT, nullptr, arguments, &result)) {
+      return failed(result, i);
+    }
+    whole.EndPart(sizes[i]);
+  }
+  return {};
+}
+
+}  // namespace kral::download

@@ -1,0 +1,134 @@
+// Exports of the boot transfer and of the whole way of a download.
+#include "kral/kivrat.h"
+
+#include <algorithm>
+#include <span>
+
+#include "download/download_connection.h"
+#include "download/flash_all.h"
+#include "download/kivrat.h"
+#include "frame/export_call.h"
+#include "frame/orbt_server.h"
+
+namespace {
+
+using kral::Diag_FTM;
+using kral::LogFormatted;
+using kral::LogName;
+using kral::OnPhone;
+using kral::OnPhoneAtOnce;
+
+const char* Text(const char* text) {
+  return text == nullptr ? "" : text;
+}
+
+bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms, uint32_t pre_done_delay_ms) {
+  phone.kivrat().hello_retries = hello_retries;
+  phone.kivrat().retry_delay_ms = retry_delay_ms;
+  phone.kivrat().pre_done_delay_ms = pre_done_delay_ms;
+  return true;
+}
+
+bool Connect(Diag_FTM& phone, uint32_t* version, uint32_t* chip_identity) {
+  kral::DownloadConnection connection(phone);
+  connection.BeginWork();
+  uint32_t told_version = 0;
+  std::optional<uint32_t> identity;
+  const bool connected = kral::kivrat::Connect(phone, told_version, chip_identity == nullptr ? nullptr : &identity,
+                                               [&connection] { return connection.aborted(); });
+  if (!connected) return false;
+  if (version != nullptr) *version = told_version;
+  if (identity) *chip_identity = *identity;
+  return true;
+}
+
+bool DownloadFlashProgrammer(Diag_FTM& phone, const char* file) {
+  return kral::download::ServeFlashProgrammer(phone, Text(file));
+}
+
+bool End(Diag_FTM& phone) {
+  phone.GiveBackPort();
+  return true;
+}
+
+bool FlashAll(Diag_FTM& phone, const char* programmer, const char* const* images, const uint8_t* types, uint32_t count,
+              uint32_t* result, uint32_t* failed_image) {
+  kral::download::FlashOutcome outcome{KRAL_STREAM_BAD_ARGUMENT};
+  if (programmer != nullptr && images != nullptr) {
+    const std::span all(images, count);
+    const auto missing = std::find(all.begin(), all.end(), nullptr);
+    if (missing != all.end()) {
+      outcome.image = static_cast<uint32_t>(missing - all.begin());
+    } else if (count != 0) {
+      outcome = kral::download::FlashAll(phone, programmer, all, types);
+    }
+  }
+  if (result != nullptr) *result = outcome.result;
+  if (failed_image != nullptr) *failed_image = outcome.image;
+  return outcome.result == KRAL_STREAM_WRITTEN;
+}
+
+bool SetHelloBehavior(Diag_FTM& phone, uint16_t behavior) {
+  const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
+  if (!server) return false;
+  server->SetKivratHelloBehavior(behavior);
+  return true;
+}
+
+bool GetHelloBehavior(Diag_FTM& phone, uint16_t* behavior) {
+  const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
+  if (!server || behavior == nullptr) return false;
+  *behavior = server->kivrat_hello_behavior();
+  return true;
+}
+
+}  // namespace
+
+extern "C" {
+
+KRAL_HANDLE KRAL_CALL KRAL_Kivrat_ConnectServer(uint32_t port) {
+  if (port > kral::Kral_ResourceManager::kAnyPort) return 0;
+  const KRAL_HANDLE handle = kral::Kral_ResourceManager::CreateContext(static_cast<uint16_t>(port));
+  LogName(handle, "KRAL_Kivrat_ConnectServer");
+  return handle;
+}
+
+uint8_t KRAL_CALL KRAL_Kivrat_Configure(KRAL_HANDLE handle, uint32_t hello_retries, uint32_t retry_delay_ms,
+                                        uint32_t pre_done_delay_ms) {
+  LogName(handle, "KRAL_Kivrat_Configure");
+  return OnPhoneAtOnce(handle, Configure, hello_retries, retry_delay_ms, pre_done_delay_ms);
+}
+
+uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* version, uint32_t* chip_identity) {
+  LogName(handle, "KRAL_Kivrat_Connect");
+  return OnPhone(handle, Connect, version, chip_identity);
+}
+
+uint8_t KRAL_CALL KRAL_Kivrat_DownloadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file) {
+  LogFormatted(handle, "KRAL_Kivrat_DownloadFlashProgrammer( sFile = %s )", Text(programmer_file));
+  return OnPhone(handle, DownloadFlashProgrammer, programmer_file);
+}
+
+uint8_t KRAL_CALL KRAL_Kivrat_End(KRAL_HANDLE handle) {
+  LogName(handle, "KRAL_Kivrat_End");
+  return OnPhone(handle, End);
+}
+
+uint8_t KRAL_CALL KRAL_Kivrat_FlashAll(KRAL_HANDLE handle, const char* programmer_file, const char* const* image_files,
+                                       const uint8_t* image_types, uint32_t image_count, uint32_t* result,
+                                       uint32_t* failed_image) {
+  LogFormatted(handle, "KRAL_Kivrat_FlashAll( sFile = %s, iImages = %u )", Text(programmer_file), image_count);
+  return OnPhone(handle, FlashAll, programmer_file, image_files, image_types, image_count, result, failed_image);
+}
+
+uint8_t KRAL_CALL KRAL_SetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t behavior) {
+  LogName(handle, "KRAL_SetKivratHelloBehavior");
+  return OnPhone(handle, SetHelloBehavior, behavior);
+}
+
+uint8_t KRAL_CALL KRAL_GetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t* behavior) {
+  LogName(handle, "KRAL_GetKivratHelloBehavior");
+  return OnPhone(handle, GetHelloBehavior, behavior);
+}
+
+}  // extern "C"
