@@ -8,6 +8,7 @@ import fcntl
 import json
 import os
 import signal
+import struct
 import subprocess
 import sys
 import tempfile
@@ -362,6 +363,63 @@ class Traffic(ToolTest):
             self.expect_json(10, "-p", "7", "log", "list", "--names", foreign.name, ports=ports)
             self.expect_json(2, "-p", "7", "log", "on", ports=ports)
             self.expect_json(2, "-p", "7", "event", "on", "0x10-0x0F", ports=ports)
+
+
+def make_file(folder, name, content):
+    path = os.path.join(folder, name)
+    with open(path, "wb") as file:
+        file.write(content)
+    return path
+
+
+class BootLoader(ToolTest):
+    PROGRAMMER = b"VHFP" + struct.pack("<I", 9000) + bytes(range(256)) * 35 + bytes(32)
+    SOFTWARE = b"VHSW" + b"VHS-2.0.1\0" + bytes(range(256)) * 30
+
+    def revision(self, ports):
+        return self.expect_json(0, "-p", "7", "info", ports=ports)["build"]["software_revision"]
+
+    def test_info_tells_who_waits_for_an_image(self):
+        with handset("--boot-loader", "--chip-id", "0x12345678") as sim:
+            answer = self.expect_json(0, "-p", "7", "boot", "info", ports={7: sim.device})
+        self.assertEqual((answer["version"], answer["chip_identity"]), (2, "12345678"))
+
+    def test_programmer_is_loaded_and_answers(self):
+        with handset("--boot-loader") as sim, tempfile.TemporaryDirectory() as folder:
+            ports = {7: sim.device}
+            self.expect(0, "-p", "7", "boot", "load", make_file(folder, "programmer", self.PROGRAMMER), ports=ports)
+            self.assertEqual(self.expect_json(0, "-p", "7", "flash", "info", ports=ports)["state"], "programmer")
+
+    def test_handset_is_sent_into_its_boot_loader_flashed_and_restarted(self):
+        with tempfile.TemporaryDirectory() as folder:
+            link = os.path.join(folder, "port")
+            files = [make_file(folder, "programmer", self.PROGRAMMER), make_file(folder, "software", self.SOFTWARE)]
+            ports = {7: link}
+            with handset("--loader", "boot", "--link", link):
+                self.assertEqual(self.revision(ports), "VHS-1.0.105-R2")
+                answer = self.expect_json(0, "-p", "7", "flash", "all", "--enter", "--reset", *files, ports=ports)
+                self.assertEqual(answer["bytes"], len(self.SOFTWARE))
+                self.assertEqual(self.revision(ports), "VHS-2.0.1")
+
+    def test_failures_say_what_is_wrong(self):
+        with tempfile.TemporaryDirectory() as folder:
+            programmer = make_file(folder, "programmer", self.PROGRAMMER)
+            nothing = make_file(folder, "nothing", b"no programmer")
+            for code, options, words in (
+                    (3, None, ["boot", "info", "--wait", "0"]),
+                    (6, ["--fault", "wrong=7,nth=1"], ["boot", "info"]),
+                    (7, [], ["boot", "load", nothing]),
+                    (9, ["--fault", "hang-up,nth=3"], ["boot", "load", programmer]),
+                    (9, ["--fault", "hang-up,nth=3"], ["flash", "all", programmer, programmer]),
+                    (10, [], ["boot", "load", "/nonexistent/programmer"]),
+                    (10, [], ["flash", "all", "/nonexistent/programmer", programmer]),
+                    (10, [], ["flash", "all", programmer, "/nonexistent/image"])):
+                with self.subTest(words=words):
+                    if options is None:
+                        self.expect_json(code, "-p", "7", *words, ports={7: "/nonexistent/tty"})
+                        continue
+                    with handset("--boot-loader", *options) as sim:
+                        self.expect_json(code, "-p", "7", *words, ports={7: sim.device})
 
 
 class Simulation(ToolTest):

@@ -159,11 +159,11 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
                                  options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE, block_size, limits.window,
                                  &result) != 0;
   progress_ = nullptr;
-  if (!written) throw ExplainWrite(image.file, result);
+  if (!written) throw ExplainWrite(session_.port(), image.file, result);
 }
 
-ToolError FlashTarget::ExplainWrite(const std::string& file, std::uint32_t result) const {
-  const auto where = DescribePort(session_.port());
+ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_t result) {
+  const auto where = DescribePort(port);
   const bool timed_out = WasLogged("Request timed out");
   switch (result) {
     case KRAL_DOWNLOAD_ABORTED:

@@ -46,6 +46,9 @@ struct WriteOptions {
   std::uint32_t block_size = 0;  // at most this; 0: as the handset says
 };
 
+// Why an image could not be written; `result` as KRAL_STREAM_WriteImageFile gave it.
+ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_t result);
+
 class FlashTarget {
  public:
   explicit FlashTarget(const Context& context);
@@ -70,7 +73,6 @@ class FlashTarget {
 
  private:
   static void KRAL_CALL OnProgress(KRAL_HANDLE handle, std::uint32_t done, std::uint32_t total, std::uintptr_t value);
-  ToolError ExplainWrite(const std::string& file, std::uint32_t result) const;
 
   const Context& context_;
   Session session_;

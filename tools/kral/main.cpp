@@ -67,6 +67,7 @@ int Run(int argc, char** argv) {
   AddNvVerbs(app, context);
   AddFlashVerbs(app, context);
   AddNvBackupVerbs(app, context);
+  AddBootVerbs(app, context);
   AddBandVerbs(app, context);
   AddRawVerbs(app, context);
   AddSimVerbs(app, context);

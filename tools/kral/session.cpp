@@ -29,7 +29,16 @@ std::string Describe(const std::vector<std::uint16_t>& ports) {
   return text;
 }
 
+// Nothing is asked: it would cost a boot loader its hello.
+std::uint16_t TheOnlyListedPort() {
+  const auto ports = ListPorts();
+  if (ports.size() == 1) return ports.front();
+  throw ToolError(ExitCode::kUsage, ports.empty() ? "this machine has no serial port" : "this machine has several ports",
+                  "name the port of the boot loader: -p N");
+}
+
 std::uint16_t TheOnlyPort(Expected expected) {
+  if (expected == Expected::kInBootLoader) return TheOnlyListedPort();
   const auto answering = ListPortsWithHandset();
   if (answering.size() == 1) return answering.front();
   if (answering.size() > 1) {
@@ -56,7 +65,7 @@ void CheckLogFile(const std::string& name) {
 }
 
 // The state when it stands in the way of every request; nothing when the port is open, or closed by a time-out only.
-std::optional<std::int32_t> PortTrouble(KRAL_HANDLE handle) {
+std::optional<std::int32_t> TroubleOf(KRAL_HANDLE handle) {
   std::int32_t state = KRAL_PORT_OPEN;
   if (KRAL_GetPortState(handle, &state) == 0 || state == KRAL_PORT_OPEN || state == KRAL_PORT_CLOSED) {
     return std::nullopt;
@@ -126,7 +135,7 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
   KRAL_SetDefaultReceiveMode(kWakeOnData);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
   ThrowIfInterrupted();
-  handle_ = KRAL_ConnectServer(port_);
+  handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
   if (handle_ == 0) {
     throw ToolError(ExitCode::kInternal, fmt::format("no connection to {} could be made", DescribePort(port_)),
                     "close other programs that use the library, then run the command again");
@@ -159,14 +168,20 @@ void Session::StartLog(const SessionOptions& options) const {
 }
 
 void Session::CheckAnswers(Expected expected) {
+  if (expected == Expected::kInBootLoader) return;
   answers_ = KRAL_IsPhoneConnected(handle_) != 0;
   if (answers_) return;
   ThrowIfInterrupted();
-  if (const auto trouble = PortTrouble(handle_)) throw ExplainPort(port_, *trouble, false);
+  if (const auto trouble = TroubleOf(handle_)) throw ExplainPort(port_, *trouble, false);
   if (expected == Expected::kMayBeInDownload) return;
   throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
                   "longer, --log FILE shows what came");
+}
+
+std::optional<ToolError> Session::PortTrouble() const {
+  const auto state = TroubleOf(handle_);
+  return state ? std::optional(ExplainPort(port_, *state, false)) : std::nullopt;
 }
 
 void Session::Begin() {
@@ -193,9 +208,9 @@ ToolError Session::Explain(std::string_view what) const {
   }
   // The connection may have ended for a time-out, or because there is no handset any more: asking tells.
   // That the device is gone is told only until the asking has closed its port.
-  const auto before = PortTrouble(handle_);
+  const auto before = TroubleOf(handle_);
   const bool answers = KRAL_IsPhoneConnected(handle_) != 0;
-  const auto after = PortTrouble(handle_);
+  const auto after = TroubleOf(handle_);
   const auto trouble = after ? after : before;
   if (!answers && trouble) return ExplainPort(port_, *trouble, true);
   if (find("mode switching status polling has timeout") != lines.rend()) {

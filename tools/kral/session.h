@@ -29,7 +29,8 @@ std::vector<std::uint16_t> ListPorts();
 std::vector<std::uint16_t> ListPortsWithHandset();
 
 // A handset that is being downloaded to does not answer diagnostic requests.
-enum class Expected { kAnswers, kMayBeInDownload };
+// One in its boot loader says hello once: its port is not even opened.
+enum class Expected { kAnswers, kMayBeInDownload, kInBootLoader };
 
 class Session {
  public:
@@ -42,6 +43,9 @@ class Session {
   KRAL_HANDLE handle() const { return handle_; }
   std::uint16_t port() const { return port_; }
   bool answers_diagnostics() const { return answers_; }  // did, when the session began
+
+  // What stands in the way of every request, if the port does.
+  std::optional<ToolError> PortTrouble() const;
 
   // To be called before a request, so that Explain speaks of that request only; also the place where Ctrl-C takes
   // effect.

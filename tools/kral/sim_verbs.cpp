@@ -42,6 +42,9 @@ struct SimOptions {
   handset::LogTraffic traffic;
   std::uint64_t seed = 1;
   std::string link;
+  bool boot_loader = false;
+  std::string loader = "kova";
+  std::optional<std::uint32_t> chip_identity;
 };
 
 void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
@@ -60,6 +63,13 @@ void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
   handset.faults().SetSeed(options.seed);
   handset.faults().SetBitErrorRate(options.bit_errors);
   for (const auto& fault : options.faults) AddFault(handset.faults(), fault);
+  const auto& boot_loader = handset.boot_loader();
+  if (options.chip_identity) boot_loader->Set({.chip_identity = *options.chip_identity});
+  if (options.loader == "boot") handset.mode().SetLoader(std::make_shared<handset::Reappearance>(boot_loader));
+  if (options.boot_loader) {
+    handset.SetStartMode(boot_loader);
+    handset.Restart();
+  }
   handset.KeepTrace(false);  // nobody asks for it, and it would grow without end
 }
 
@@ -142,6 +152,13 @@ void AddOptions(CLI::App& sim, SimOptions& options) {
   sim.add_option("--bit-errors", options.bit_errors, "Probability of an error per bit sent")->check(CLI::Range(0., 1.));
   sim.add_option("--seed", options.seed, "Of everything random")->capture_default_str();
   sim.add_option("--back-after", options.back_after_ms, "Milliseconds after which a handset that hung up is back");
+  sim.add_flag("--boot-loader", options.boot_loader, "Start in the primary boot loader, as without any software");
+  sim.add_option("--loader", options.loader,
+                 "What the download request leads to: the KOVA loader, or the boot loader, "
+                 "for which the handset leaves its port and comes back")
+      ->check(CLI::IsMember({"kova", "boot"}))
+      ->capture_default_str();
+  sim.add_option("--chip-id", options.chip_identity, "Chip identity that the boot loader tells");
   sim.add_option("--link", options.link, "Keep a symbolic link of this name to the device");
 }
 

@@ -20,6 +20,7 @@ struct Context {
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure
 };
 
+void AddBootVerbs(CLI::App& app, Context& context);  // behind AddFlashVerbs
 void AddBandVerbs(CLI::App& app, Context& context);
 void AddFsVerbs(CLI::App& app, Context& context);
 void AddEventVerbs(CLI::App& app, Context& context);
