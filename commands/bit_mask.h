@@ -11,7 +11,8 @@ namespace kral {
 class BitMask {
  public:
   explicit BitMask(size_t bits) : bits_(bits), bytes_(BytesFor(bits)) {}
-  static constexpr size_t BytesFor(size_t bits) { return (bits + 7) / 8; }
+  // A handset may tell any number: rounded up without an addition that wraps where size_t has 32 bits.
+  static constexpr size_t BytesFor(size_t bits) { return bits / 8 + (bits % 8 != 0 ? 1 : 0); }
 
   size_t bits() const { return bits_; }
   std::vector<uint8_t>& bytes() { return bytes_; }

@@ -2,6 +2,7 @@
 #include "commands/log_mask.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
@@ -60,6 +61,24 @@ std::optional<uint32_t> GetItems(Diag_FTM& phone, uint8_t equipment_id) {
   return (*ranges)[equipment_id];
 }
 
+struct ToldMask {
+  uint32_t equipment_id;
+  uint32_t items;
+  std::span<const uint8_t> bytes;
+};
+
+// The mask ends the reply, and a status may stand in front of it: it begins where its number of items fits the rest.
+std::optional<ToldMask> FindMask(std::span<const uint8_t> response) {
+  constexpr size_t kHeader = log_config_reply::kMaskHeader;
+  for (size_t at = log_config_reply::kHeader; at + kHeader <= response.size(); ++at) {
+    const auto tail = response.subspan(at);
+    const uint32_t items = *LoadLe<uint32_t>(tail, sizeof(uint32_t));
+    const auto bytes = tail.subspan(kHeader);
+    if (BitMask::BytesFor(items) == bytes.size()) return ToldMask{*LoadLe<uint32_t>(tail), items, bytes};
+  }
+  return std::nullopt;
+}
+
 }  // namespace
 
 std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone) {
@@ -72,19 +91,19 @@ std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone)
   return ranges;
 }
 
-std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items) {
-  BitMask mask(items);
-  if (!Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) return std::nullopt;
-  const auto response = phone.packet().response();
-  const size_t tail_size = log_config_reply::kMaskHeader + mask.bytes().size();
-  if (response.size() < log_config_reply::kHeader + tail_size) return std::nullopt;
-  const auto tail = response.last(tail_size);
-  if (*LoadLe<uint32_t>(tail) != equipment_id) {
-    phone.log().WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask");
-    return mask;
+std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items, OtherMask other) {
+  if (!IsMaskPossible(items) || !Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) {
+    return std::nullopt;
   }
-  if (*LoadLe<uint32_t>(tail, sizeof(uint32_t)) != items) return std::nullopt;
-  std::copy(tail.begin() + log_config_reply::kMaskHeader, tail.end(), mask.bytes().begin());
+  const auto told = FindMask(phone.packet().response());
+  if (!told) return std::nullopt;
+  BitMask mask(items);
+  if (told->equipment_id != equipment_id) {
+    phone.log().WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask");
+    return other == OtherMask::kNothingOn ? std::optional(std::move(mask)) : std::nullopt;
+  }
+  if (told->items != items) return std::nullopt;
+  std::copy(told->bytes.begin(), told->bytes.end(), mask.bytes().begin());
   return mask;
 }
 
@@ -100,7 +119,7 @@ bool ModifyLogCodes(Diag_FTM& phone, uint8_t equipment_id, Ids codes, bool activ
   }
   if (!AreInRange(phone, equipment_id, codes, *items, "DIAG_ModifyExtendedLogCodes")) return false;
   // Without the current mask nothing is written: an empty one in its place would switch the other codes off.
-  auto mask = GetLogMask(phone, equipment_id, *items);
+  auto mask = GetLogMask(phone, equipment_id, *items, OtherMask::kNothingOn);
   if (!mask) {
     log.WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes() -- failed to get the current log mask");
     return false;
@@ -122,7 +141,10 @@ bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16
   constexpr const char* kName = "KRAL_DIAG_SetExtendedLogCode";
   const Ids codes(&code, 1);
   if (!AreAllowed(phone, codes, kName) || !AreInRange(phone, equipment_id, codes, items, kName)) return false;
-  if (!IsMaskPossible(items)) return false;
+  if (!IsMaskPossible(items)) {
+    phone.log().WriteLine(kLogErr, "%s()--a mask of %d items does not fit into a request", kName, items);
+    return false;
+  }
   BitMask mask(items);
   mask.Set(*ItemOf(equipment_id, code, items), true);
   if (!SetLogMask(phone, equipment_id, mask)) return false;

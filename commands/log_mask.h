@@ -22,9 +22,10 @@ using Ids = std::span<const uint16_t>;
 // --- Logs (log_mask.cpp) --------------------------------------------------------------------------------------------
 // The number of items of each equipment id.
 std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone);
-// The mask as the handset has it, `items` long; nothing when it cannot be had. A reply that speaks of another
-// equipment id counts as a mask with nothing on.
-std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items);
+// What a reply that tells another equipment id's mask counts as.
+enum class OtherMask : uint8_t { kFailure, kNothingOn };
+// The mask as the handset has it, `items` long; nothing when it cannot be had.
+std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items, OtherMask other);
 
 bool ModifyLogCodes(Diag_FTM& phone, uint8_t equipment_id, Ids codes, bool activate);
 bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16_t items);

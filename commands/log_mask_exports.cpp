@@ -41,8 +41,8 @@ bool PutMask(const kral::BitMask& mask, uint16_t* size, uint8_t* bytes) {
 bool ReadLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t* bits, uint16_t* size, uint8_t* bytes) {
   if (size == nullptr || bytes == nullptr || equipment_id >= diag::kEquipmentIds) return false;
   const auto ranges = diag::GetLogRanges(phone);
-  if (!ranges || kral::BitMask::BytesFor((*ranges)[equipment_id]) > diag::kLongestMask) return false;
-  const auto mask = diag::GetLogMask(phone, equipment_id, (*ranges)[equipment_id]);
+  if (!ranges) return false;
+  const auto mask = diag::GetLogMask(phone, equipment_id, (*ranges)[equipment_id], diag::OtherMask::kFailure);
   if (!mask || !PutMask(*mask, size, bytes)) return false;
   Put(bits, static_cast<uint32_t>(mask->bits()));
   return true;

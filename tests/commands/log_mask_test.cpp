@@ -168,10 +168,13 @@ TEST_F(Masks, AnswersThatCannotBeTrustedChangeNothing) {
       {"ranges refused", "14 73", "", nullptr},
       {"ranges too short", "73 00 00 00 01 00 00 00 09 00 00 00", "", nullptr},
       {"ranges without end", Ranges("FF FF FF FF"), "", nullptr},
+      {"ranges whose rounding wraps", Ranges("F9 FF FF FF"), "", nullptr},
       {"mask refused", good, "15 73", nullptr},
       {"mask too short", good, "73 00 00 00 04 00 00 00 01 00 00 00 09 00 00 00 81", nullptr},
       {"mask of another length", good, "73 00 00 00 04 00 00 00 01 00 00 00 0A 00 00 00 81 01", nullptr},
       {"mask of another equipment id", good, "73 00 00 00 04 00 00 00 02 00 00 00 09 00 00 00 81 01", "02 00"},
+      {"longer mask of another one", good, "73 00 00 00 04 00 00 00 02 00 00 00 11 00 00 00 81 01 01", "02 00"},
+      {"mask that fits nothing", good, "73 00 00 00 04 00 00 00 02 00 00 00 11 00 00 00 81 01", nullptr},
       {"mask", good, "73 00 00 00 04 00 00 00 01 00 00 00 09 00 00 00 81 01", "83 01"},
       {"mask behind a status", good, "73 00 00 00 04 00 00 00 77 77 77 77 01 00 00 00 09 00 00 00 81 01", "83 01"},
   };
@@ -185,8 +188,20 @@ TEST_F(Masks, AnswersThatCannotBeTrustedChangeNothing) {
     EXPECT_EQ(KRAL_DIAG_AddExtendedLogCode(handle(), 1, 0x1001), c.set != nullptr ? 1 : 0);
     EXPECT_EQ(handset().script().Problems(), "");
   }
-  EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes() -- failed to get log range"), 3u);
-  EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask"), 1u);
+  EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes() -- failed to get log range"), 4u);
+  EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask"), 2u);
+
+  uint32_t bits = 7;
+  std::array<uint8_t, 16> mask{};
+  uint16_t size = mask.size();
+  handset().Expect("73 00 00 00 01 00 00 00").Reply(good);
+  handset()
+      .Expect("73 00 00 00 04 00 00 00 01 00 00 00")
+      .Reply("73 00 00 00 04 00 00 00 02 00 00 00 09 00 00 00 81 01");
+  EXPECT_EQ(KRAL_DIAG_GetLogMask(handle(), 1, &bits, &size, mask.data()), 0) << "another's mask is not an empty one";
+  EXPECT_EQ(bits, 7u);
+  EXPECT_EQ(KRAL_DIAG_SetExtendedLogCode(handle(), 0, 5, 32625), 0);
+  EXPECT_TRUE(HasLine(16, "KRAL_DIAG_SetExtendedLogCode()--a mask of 32625 items does not fit into a request"));
 }
 
 TEST_F(Masks, ClearingAllWithoutRangesSendsAMaskWithoutItems) {
