@@ -35,12 +35,12 @@ bool TakeLog(Diag_FTM& phone, uint16_t* size, uint8_t* buffer, uint32_t time_out
   return true;
 }
 
-bool TakeEvent(Diag_FTM& phone, KRAL_EVENT* event, uint32_t time_out_ms) {
+bool TakeEvent(Diag_FTM& phone, const char* function, KRAL_EVENT* event, uint32_t time_out_ms) {
   if (event == nullptr) return false;
   const auto record = phone.events().PopWithin(milliseconds(time_out_ms));
   if (!record) return false;
   std::memcpy(event, record->bytes.data(), sizeof(*event));
-  phone.log().WriteLine(kral::kLogRet, "KRAL_DIAG_GetNextEvent() : event %d removed from queue",
+  phone.log().WriteLine(kral::kLogRet, "%s() : event %d removed from queue", function,
                         event->event_id[0] | event->event_id[1] << 8);
   return true;
 }
@@ -71,7 +71,8 @@ bool ReadCounters(Diag_FTM& phone, KRAL_TRAFFIC_COUNTERS* counters) {
                c.bad_fcs,
                c.oversized,
                phone.capture().written(),
-               phone.capture().lost()};
+               phone.capture().lost(),
+               phone.capture().pending()};
   return true;
 }
 
@@ -128,12 +129,12 @@ uint8_t KRAL_CALL KRAL_DIAG_GetPhoneLogQueueSize(KRAL_HANDLE handle, uint32_t* c
 
 uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event) {
   LogName(handle, "KRAL_DIAG_GetNextEvent");
-  return OnPhoneAtOnce(handle, TakeEvent, event, 0U);
+  return OnPhoneAtOnce(handle, TakeEvent, "KRAL_DIAG_GetNextEvent", event, 0U);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_WaitNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event, uint32_t time_out_ms) {
   LogFormatted(handle, "KRAL_DIAG_WaitNextEvent( iTimeOut_ms = %u )", time_out_ms);
-  return OnPhoneAtOnce(handle, TakeEvent, event, time_out_ms);
+  return OnPhoneAtOnce(handle, TakeEvent, "KRAL_DIAG_WaitNextEvent", event, time_out_ms);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearEventQueue(KRAL_HANDLE handle) {

@@ -5,21 +5,24 @@
 namespace kral {
 
 TrafficCounters Diag_FTM::counters() {
-  return server_mode() ? sorter().counters() : transport().counters();
+  if (server_mode()) return sorter().counters();
+  TrafficCounters counters = transport().counters();
+  counters.packets_received += player().played_in_all();
+  return counters;
 }
 
 bool Diag_FTM::StartCapture(const char* file_name) {
-  // Looked at first: the file of the capture that runs must not be emptied.
-  if (!capture().active() && capture().Start(OpenCaptureFile(file_name), parts_)) return true;
+  if (capture().Start([file_name] { return OpenCaptureFile(file_name); }, parts_)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be written, or a capture runs already", file_name);
   return false;
 }
 
-// What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher.
+// What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher; while a
+// callback holds that up, the capture ends with what has been collected.
 bool Diag_FTM::StopCapture() {
   constexpr uint32_t kSettleMs = 200;
-  if (!capture().active()) return false;
-  if (!server_mode()) dispatcher().WaitUntilDispatched(kSettleMs);
+  const auto state = capture().state();
+  if (state == CaptureState::kRunning && !server_mode()) dispatcher().WaitUntilDispatched(kSettleMs);
   return capture().Stop();
 }
 

@@ -15,6 +15,7 @@ constexpr uint64_t kLogBatch = 256;
 constexpr uint64_t kEventBatch = 1;  // a report may hold a thousand events
 
 constexpr uint32_t kDispatchMs = 100;
+constexpr uint32_t kLeaveMs = 1000;
 constexpr std::chrono::milliseconds kLookAgain{1};
 
 static_assert(kEventBatch * kMaximumPacket / kSmallestEvent + 1 < kQueueCapacity);
@@ -28,7 +29,9 @@ CapturePlayer::~CapturePlayer() {
 bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& dispatcher, CKralEventListener& sorter,
                           std::shared_ptr<void> owner) {
   const std::lock_guard control(control_mutex_);
-  if (!source || thread_.running()) return false;
+  if (!source || state_ == PlayState::kPlaying) return false;
+  // Its end is told a moment before the thread has left.
+  if (thread_.running() && !ended_.WaitFor(kLeaveMs)) return false;
   thread_.Join();
   {
     const std::lock_guard lock(mutex_);
@@ -78,11 +81,9 @@ PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
       case CaptureReader::Outcome::kRecord:
         break;
       case CaptureReader::Outcome::kEnd:
-        line.dispatcher.WaitUntilDispatched(kDispatchMs);
-        return PlayState::kDone;
+        return AwaitListeners(line) ? PlayState::kDone : PlayState::kStopped;
       case CaptureReader::Outcome::kCut:
-        line.dispatcher.WaitUntilDispatched(kDispatchMs);
-        return PlayState::kCut;
+        return AwaitListeners(line) ? PlayState::kCut : PlayState::kStopped;
       case CaptureReader::Outcome::kForeign:
         return PlayState::kForeign;
     }
@@ -93,6 +94,7 @@ PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
     if (line.pace == PlayPace::kAsRecorded && !AwaitTurn(record.microseconds)) return PlayState::kStopped;
     line.dispatcher.Push(record.packet);
     ++played_;
+    ++played_in_all_;
   }
 }
 
@@ -109,6 +111,14 @@ bool CapturePlayer::AwaitRoom(const Line& line) {
   if (!Sleep({})) return false;
   while (!has_room()) {
     if (!Sleep(kLookAgain)) return false;
+  }
+  return true;
+}
+
+// What was played is where its readers look for it before the end is told.
+bool CapturePlayer::AwaitListeners(const Line& line) {
+  while (!line.dispatcher.WaitUntilDispatched(kDispatchMs)) {
+    if (!Sleep({})) return false;
   }
   return true;
 }

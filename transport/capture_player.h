@@ -51,6 +51,7 @@ class CapturePlayer {
 
   PlayState state() const { return state_; }
   uint64_t played() const { return played_.load(std::memory_order_relaxed); }  // of the last file
+  uint64_t played_in_all() const { return played_in_all_.load(std::memory_order_relaxed); }
   // Records that are no asynchronous packets. They are left out: one could be taken for the answer to a request.
   uint64_t skipped() const { return skipped_.load(std::memory_order_relaxed); }
 
@@ -63,6 +64,7 @@ class CapturePlayer {
 
   PlayState Run(CaptureReader& reader, const Line& line);
   bool AwaitRoom(const Line& line);
+  bool AwaitListeners(const Line& line);
   bool AwaitTurn(uint64_t microseconds);
   bool Sleep(std::chrono::microseconds time);  // false when it was told to stop
 
@@ -73,6 +75,7 @@ class CapturePlayer {
 
   std::atomic<PlayState> state_{PlayState::kIdle};
   std::atomic<uint64_t> played_{0};
+  std::atomic<uint64_t> played_in_all_{0};
   std::atomic<uint64_t> skipped_{0};
 
   uint64_t previous_microseconds_ = 0;  // the thread's own

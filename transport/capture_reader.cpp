@@ -17,7 +17,10 @@ CaptureSource OpenCaptureSource(const std::string& path) {
     if (opened != nullptr) std::fclose(opened);
   });
   if (!file) return {};
-  return [file](std::span<uint8_t> buffer) { return std::fread(buffer.data(), 1, buffer.size(), file.get()); };
+  return [file](std::span<uint8_t> buffer) -> std::optional<size_t> {
+    const size_t count = std::fread(buffer.data(), 1, buffer.size(), file.get());
+    return std::ferror(file.get()) == 0 ? std::optional(count) : std::nullopt;
+  };
 }
 
 CaptureReader::Outcome CaptureReader::Next(CaptureRecord& record) {
@@ -43,7 +46,7 @@ CaptureReader::Outcome CaptureReader::ReadHead() {
 
 CaptureReader::Outcome CaptureReader::ReadRecord(CaptureRecord& record) {
   std::array<uint8_t, capture_record::kSize> head{};
-  const size_t got = source_(head);
+  const auto got = source_(head);
   if (got == 0) return Outcome::kEnd;
   if (got != head.size()) return Outcome::kCut;
   const uint16_t length = *LoadLe<uint16_t>(head, capture_record::kLength);

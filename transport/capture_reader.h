@@ -5,14 +5,16 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <span>
 #include <string>
 #include <vector>
 
 namespace kral {
 
-// Fills the buffer as far as there are bytes, and gives their number; fewer than asked for is the end.
-using CaptureSource = std::function<size_t(std::span<uint8_t> buffer)>;
+// Fills the buffer as far as there are bytes, and gives their number; fewer than asked for is the end, and nothing is a
+// file that cannot be read on.
+using CaptureSource = std::function<std::optional<size_t>(std::span<uint8_t> buffer)>;
 
 // An empty function when the file cannot be opened.
 CaptureSource OpenCaptureSource(const std::string& path);
@@ -27,7 +29,7 @@ class CaptureReader {
   enum class Outcome : uint8_t {
     kRecord,
     kEnd,      // behind the last whole record
-    kCut,      // in the midst of a record, or at bytes that are none: everything before is whole
+    kCut,      // in the midst of a record, at bytes that are none or cannot be read: everything before is whole
     kForeign,  // not a capture file, or one of a later version
   };
 

@@ -41,6 +41,18 @@ std::array<uint8_t, capture_record::kSize> MakeRecordHead(size_t length) {
   return head;
 }
 
+// Of records that may be cut at the end.
+uint64_t CountWholeRecords(std::span<const uint8_t> bytes) {
+  uint64_t count = 0;
+  while (bytes.size() >= capture_record::kSize) {
+    const size_t size = capture_record::kSize + *LoadLe<uint16_t>(bytes, capture_record::kLength);
+    if (bytes.size() < size) break;
+    bytes = bytes.subspan(size);
+    ++count;
+  }
+  return count;
+}
+
 }  // namespace
 
 CaptureSink OpenCaptureFile(const std::string& path) {
@@ -48,23 +60,25 @@ CaptureSink OpenCaptureFile(const std::string& path) {
     if (opened != nullptr) std::fclose(opened);
   });
   if (!file) return {};
-  return [file](std::span<const uint8_t> bytes) {
-    return std::fwrite(bytes.data(), 1, bytes.size(), file.get()) == bytes.size() && std::fflush(file.get()) == 0;
-  };
+  // Pieces are large already; without a buffer the result tells what the system has taken.
+  std::setvbuf(file.get(), nullptr, _IONBF, 0);
+  return [file](std::span<const uint8_t> bytes) { return std::fwrite(bytes.data(), 1, bytes.size(), file.get()); };
 }
 
 CaptureWriter::~CaptureWriter() {
   Stop();
 }
 
-bool CaptureWriter::Start(CaptureSink sink, std::shared_ptr<void> owner) {
+bool CaptureWriter::Start(const std::function<CaptureSink()>& open, std::shared_ptr<void> owner) {
   const std::lock_guard control(control_mutex_);
-  if (!sink || active_ || thread_.running() || !sink(MakeHead())) return false;
+  if (state_ == CaptureState::kRunning || (state_ == CaptureState::kEnding && !ended_.WaitFor(0))) return false;
   thread_.Join();
+  state_ = CaptureState::kNone;
+  CaptureSink sink = open();
+  const auto head = MakeHead();
+  if (!sink || sink(head) != head.size()) return false;
   {
     const std::lock_guard lock(mutex_);
-    pending_.clear();
-    pending_packets_ = 0;
     stop_requested_ = false;
   }
   sink_ = std::move(sink);
@@ -75,12 +89,15 @@ bool CaptureWriter::Start(CaptureSink sink, std::shared_ptr<void> owner) {
     sink_ = {};
     return false;
   }
-  active_ = true;
+  state_ = CaptureState::kRunning;
   return true;
 }
 
 void CaptureWriter::Append(std::span<const uint8_t> packet) {
-  if (!active() || packet.size() < capture_record::kShortestPacket || packet.size() > kMaximumPacket) return;
+  if (state() != CaptureState::kRunning || packet.size() < capture_record::kShortestPacket ||
+      packet.size() > kMaximumPacket) {
+    return;
+  }
   const auto head = MakeRecordHead(packet.size());
   bool kept = false;
   bool wake = false;
@@ -94,7 +111,7 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
         pending_.resize(after);
         const auto record = pending_.begin() + static_cast<std::ptrdiff_t>(before);
         std::copy(packet.begin(), packet.end(), std::copy(head.begin(), head.end(), record));
-        ++pending_packets_;
+        pending_packets_.fetch_add(1, std::memory_order_relaxed);
         kept = true;
         wake = before == 0 || (before < kGoodPiece && after >= kGoodPiece);
       } catch (...) {
@@ -108,44 +125,51 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
 
 bool CaptureWriter::Stop(uint32_t time_out_ms) {
   const std::lock_guard control(control_mutex_);
-  active_ = false;
-  if (thread_.running()) {
-    {
-      const std::lock_guard lock(mutex_);
-      stop_requested_ = true;
-      changed_.notify_one();
+  if (state_ == CaptureState::kNone) return false;
+  state_ = CaptureState::kEnding;
+  {
+    const std::lock_guard lock(mutex_);
+    stop_requested_ = true;
+    changed_.notify_one();
+  }
+  if (!ended_.WaitFor(time_out_ms)) {
+    DataLogFileHandler* const log = log_;
+    if (log != nullptr) {
+      log->WriteLine(kLogErr, "Capture file: %u packets still wait for the disk", static_cast<unsigned>(pending()));
     }
-    if (!ended_.WaitFor(time_out_ms)) return false;
+    return false;
   }
   thread_.Join();
+  state_ = CaptureState::kNone;
   return lost() == lost_before_;
 }
 
 void CaptureWriter::Run() {
   std::vector<uint8_t> batch;
-  uint64_t packets = 0;
   bool failed = false;
-  while (TakeBatch(batch, packets)) {
-    // Behind a record that is cut nothing more can be read: a file that took no more stays as it is.
-    failed = failed || !sink_(batch);
-    if (failed) {
-      Lose(packets, "the file cannot be written any more");
-    } else {
-      written_.fetch_add(packets, std::memory_order_relaxed);
-    }
-  }
+  while (TakeBatch(batch)) WriteBatch(batch, failed);
   sink_ = {};
   ended_.Set();
 }
 
-bool CaptureWriter::TakeBatch(std::vector<uint8_t>& batch, uint64_t& packets) {
+// Behind a record that is cut nothing more can be read: a file that took no more stays as it is.
+void CaptureWriter::WriteBatch(std::span<const uint8_t> batch, bool& failed) {
+  const size_t taken = failed ? 0 : std::min(sink_(batch), batch.size());
+  failed = taken < batch.size();
+  const uint64_t packets = CountWholeRecords(batch);
+  const uint64_t whole = failed ? CountWholeRecords(batch.first(taken)) : packets;
+  written_.fetch_add(whole, std::memory_order_relaxed);
+  if (whole < packets) Lose(packets - whole, "the file cannot be written any more");
+  pending_packets_.fetch_sub(packets, std::memory_order_relaxed);
+}
+
+bool CaptureWriter::TakeBatch(std::vector<uint8_t>& batch) {
   batch.clear();
   std::unique_lock lock(mutex_);
   changed_.wait(lock, [this] { return stop_requested_ || !pending_.empty(); });
   changed_.wait_for(lock, kGatherTime, [this] { return stop_requested_ || pending_.size() >= kGoodPiece; });
   if (pending_.empty()) return false;
   batch.swap(pending_);
-  packets = std::exchange(pending_packets_, 0);
   return true;
 }
 

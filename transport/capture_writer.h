@@ -21,11 +21,18 @@ namespace kral {
 
 class DataLogFileHandler;
 
-// Takes bytes to where they are kept; false when it takes no more. Destroyed with the end of the capture.
-using CaptureSink = std::function<bool(std::span<const uint8_t> bytes)>;
+// Takes bytes to where they are kept, and gives the number of those taken; fewer than given: it takes no more.
+// Destroyed with the end of the capture.
+using CaptureSink = std::function<size_t(std::span<const uint8_t> bytes)>;
 
 // A file of that name, emptied first; an empty function when it cannot be opened.
 CaptureSink OpenCaptureFile(const std::string& path);
+
+enum class CaptureState : uint8_t {
+  kNone,
+  kRunning,
+  kEnding,  // takes no more packets, and has not written all of those it took
+};
 
 // Callable from any thread.
 class CaptureWriter {
@@ -40,26 +47,31 @@ class CaptureWriter {
 
   void SetLogger(DataLogFileHandler* log) { log_ = log; }
 
-  // False when the head cannot be written, and while another capture runs. `owner` holds this object, and is kept
-  // alive by the thread until it ends.
-  bool Start(CaptureSink sink, std::shared_ptr<void> owner);
+  // False when nothing can be opened or the head not be written; and, with nothing opened, while another capture runs
+  // or is ending: its file may be the same one. `owner` holds this object, and is kept alive by the thread until it
+  // ends.
+  bool Start(const std::function<CaptureSink()>& open, std::shared_ptr<void> owner);
   void Append(std::span<const uint8_t> packet);
-  // Waits at most so long for what is left to be written. True when every packet of the capture is in the file.
+  // Waits at most so long for what is left to be written. True when every packet of the capture is in the file; after
+  // false, state() tells whether there is more to wait for in another call.
   bool Stop(uint32_t time_out_ms = 1000);
 
-  bool active() const { return active_.load(std::memory_order_relaxed); }
+  CaptureState state() const { return state_.load(std::memory_order_relaxed); }
+  uint64_t pending() const { return pending_packets_.load(std::memory_order_relaxed); }  // not yet in either of these:
   // Over all captures of this object.
   uint64_t written() const { return written_.load(std::memory_order_relaxed); }
   uint64_t lost() const { return lost_.load(std::memory_order_relaxed); }
 
  private:
   void Run();
-  bool TakeBatch(std::vector<uint8_t>& batch, uint64_t& packets);
+  bool TakeBatch(std::vector<uint8_t>& batch);
+  void WriteBatch(std::span<const uint8_t> batch, bool& failed);
   void Lose(uint64_t packets, const char* reason);
 
   const size_t room_;
   std::atomic<DataLogFileHandler*> log_{nullptr};
-  std::atomic<bool> active_{false};
+  std::atomic<CaptureState> state_{CaptureState::kNone};  // changed under control_mutex_
+  std::atomic<uint64_t> pending_packets_{0};
   std::atomic<uint64_t> written_{0};
   std::atomic<uint64_t> lost_{0};
   std::atomic<bool> loss_told_{false};  // in the text log, once for each capture
@@ -70,7 +82,6 @@ class CaptureWriter {
   std::mutex mutex_;  // of what follows
   std::condition_variable changed_;
   std::vector<uint8_t> pending_;
-  uint64_t pending_packets_ = 0;
   bool stop_requested_ = false;
 
   CaptureSink sink_;  // the thread's own while it runs

@@ -4,10 +4,14 @@
  *
  * Beside the rules of kral.h:
  *
- * - Log packets (first byte 16), messages (31 and 121), event reports (96) and packets that begin with 146 are put
- *   into the log queue of the handset while collection is on; while it is off they are dropped, and counted. Every
- *   event of a report is also put into the event queue. Each queue holds 4,096 records and drops its oldest one when
- *   full.
+ * - Log packets (first byte 16), messages (31 and 121), event reports (96) and packets that begin with 146 (in the
+ *   framed packet mode these are thrown away uncounted) are put into the log queue of the handset while collection is
+ *   on; while it is off they are dropped, and counted. Every event of a report is also put into the event queue. Each
+ *   queue holds 4,096 records and drops its oldest one when full.
+ * - Answers to requests come the same way as collected packets, one after the other: a callback that takes long, and a
+ *   text log that takes long to write them down, hold up everything that comes after, answers too. Requests then run
+ *   into their time-outs, and what has been received meanwhile waits in memory without a bound. Callers that may take
+ *   long read the queues instead.
  * - Collection is off at first. It is switched on by KRAL_DIAG_SetPhoneLoggingState, and by every call that switches
  *   logs or messages on or changes the event mask.
  * - The mask functions are requests and wait for time-out 0 (4,000 ms) once for each request they make: at most three
@@ -15,7 +19,7 @@
  *   and wait only where they say so.
  * - An equipment id (0 to 15) has the log codes from its number times 4,096 on, as many as the handset tells. Codes
  *   outside that range are refused, and so is the whole list they stand in.
- * - Functions and records marked as an addition are no part of the handset maker's own interface.
+ * - Functions and records marked as an addition are additions of this library.
  *
  * The files that the functions read and write are described in docs/logs.md.
  */
@@ -117,7 +121,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearEventQueue(KRAL_HANDLE handle);
 /** Empties the queue of answers: one that a request waits for is lost, too. @return 1 */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearCommandResponseQueue(KRAL_HANDLE handle);
 
-/** Sees an event as it is put into the event queue; rules as for KRAL_RAW_PACKET_CALLBACK. An addition. */
+/**
+ * Sees an event as it is put into the event queue; rules as for KRAL_RAW_PACKET_CALLBACK. How long the payload of an
+ * event without a length is, the report tells, which the callback for packets has seen before. An addition.
+ */
 typedef void(KRAL_CALL* KRAL_EVENT_CALLBACK)(const KRAL_EVENT* event, uintptr_t value);
 
 /**
@@ -135,7 +142,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCollectionCallBacks(KRAL_HANDLE handle,
 /** What came over a connection, and what was lost of it; all counted since the handle was made. An addition. */
 typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t bytes_received;   /**< from the port; 0 through a phone server, as are the next, bad_fcs */
-  uint64_t packets_received; /**< made of the bytes, answers included */
+  uint64_t packets_received; /**< made of the bytes, answers included, or played from a file */
   uint64_t collected;        /**< packets put into the log queue */
   uint64_t events;           /**< events put into the event queue */
   uint64_t dropped_logs;     /**< thrown out of the full log queue before they were read */
@@ -143,12 +150,13 @@ typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t dropped_answers;  /**< ... out of the queue of answers */
   uint64_t dropped_off;      /**< packets that came while collection was off */
   uint64_t bad_fcs;          /**< answers with a wrong frame check sequence; logs and the like are not checked */
-  uint64_t oversized;        /**< packets of a size that is not taken, and runs of bytes without an end */
+  uint64_t oversized;        /**< packets shorter than 2 or longer than 4,096 bytes, and runs of bytes without an end */
   uint64_t captured;         /**< packets written to capture files */
   uint64_t capture_lost;     /**< packets that a full or slow disk has cost a capture file */
+  uint64_t capture_pending;  /**< packets taken for a capture file that are not in it yet */
 } KRAL_TRAFFIC_COUNTERS;
 
-typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 96 ? 1 : -1];
+typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 104 ? 1 : -1];
 
 /**
  * Reads the counters. An addition.
@@ -354,16 +362,20 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDL
  *
  * @param handle     from a connect function
  * @param file_name  emptied first
- * @return 1; 0 when the file cannot be written, and while another capture of the handle runs
+ * @return 1; 0 when the file cannot be written, and, with no file touched, while another capture of the handle runs or
+ *         has not written its rest
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name);
 
 /**
- * Ends the capture and closes its file. A disconnect does so as well.
+ * Ends the capture and closes its file. What was collected until then is written still, and while the disk is too slow
+ * for that (capture_pending of the counters is not 0) another call waits for it again. The disconnect that releases the
+ * handle ends a capture as well; one that leaves it to another connect does not.
  *
- * @return 1 when every packet that was collected is in the file; 0 also when no capture runs
+ * @return 1 when every packet that was collected is in the file; 0 when some were lost, when the rest has not been
+ *         written in time, and when no capture runs
  *
- * Wait: until the rest is written, at most 1,200 ms.
+ * Wait: until the rest is written, at most 1,200 ms; longer behind another thread's call that starts or ends a capture.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 
@@ -383,7 +395,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 
 /**
  * Plays a capture file: its packets come as if the handset had sent them, on a thread of the library, through counters,
- * callbacks and queues. Switches collection on. A connection to port 65534, which has no port behind it, is enough.
+ * callbacks and queues. Switches collection on. The playback is done once its last packet has been through all of them.
+ * When packets came, the file tells, and a playback does not. A connection to port 65534, which has no port behind it,
+ * is enough.
  *
  * @param handle     from a connect function
  * @param file_name  written by KRAL_StartCapture

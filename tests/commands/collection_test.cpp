@@ -117,12 +117,14 @@ TEST_F(Collection, EventsArriveOneByOneTextAndAll) {
     EXPECT_EQ(event.payload[0], i % 4 == 0 ? 0 : i);
   }
   EXPECT_EQ(KRAL_DIAG_GetNextEvent(handle(), &event), 0);
-  EXPECT_TRUE(HasLine(4, "KRAL_DIAG_GetNextEvent() : event 107 removed from queue"));
+  EXPECT_TRUE(HasLine(4, "KRAL_DIAG_WaitNextEvent() : event 107 removed from queue"));
   EXPECT_TRUE(HasLine(8, "Event ID: 103, Handover"));
   EXPECT_TRUE(HasLine(8, "Event ID: 104, no text"));
   EXPECT_EQ(NextLog(handle(), 5000).front(), 96) << "the report itself is in the log queue";
   SendAllForms(2);
   ASSERT_TRUE(Eventually([&] { return CountersOf(handle()).events == 10; }));
+  EXPECT_EQ(KRAL_DIAG_GetNextEvent(handle(), &event), 1);
+  EXPECT_TRUE(HasLine(4, "KRAL_DIAG_GetNextEvent() : event 100 removed from queue"));
   EXPECT_EQ(KRAL_DIAG_ClearEventQueue(handle()), 1);
   EXPECT_EQ(KRAL_DIAG_GetNextEvent(handle(), &event), 0);
 }
@@ -256,6 +258,7 @@ TEST_F(Collection, CapturedTrafficPlaysBackAsItCame) {
   EXPECT_TRUE(Eventually(
       [&] { return KRAL_GetPlaybackState(offline, &state, &packets, nullptr) == 1 && state == KRAL_PLAYBACK_DONE; }));
   EXPECT_EQ(packets, sent.packets());
+  EXPECT_EQ(CountersOf(offline).packets_received, sent.packets()) << "played ones count as received";
 
   KRAL_DIAG_ClearEventQueue(offline);
   ASSERT_EQ(KRAL_StartPlayback(offline, file.c_str(), KRAL_PLAY_FOR_EVENT_READER), 1);
@@ -276,10 +279,9 @@ TEST_F(Collection, FloodLosesNothingUncounted) {
   ASSERT_EQ(KRAL_DIAG_AddExtendedLogCode(handle(), 1, 0x1001), 1);
   ASSERT_EQ(KRAL_DIAG_SetEventMaskBit(handle(), 7, 1), 1);
 
-  std::atomic<bool> stop{false};
   uint64_t taken = 0;
-  std::thread reader([&] {
-    while (!stop) taken += NextLog(handle(), 1).empty() ? 0 : 1;
+  std::jthread reader([&](const std::stop_token& stop) {
+    while (!stop.stop_requested()) taken += NextLog(handle(), 1).empty() ? 0 : 1;
     while (!NextLog(handle()).empty()) ++taken;
   });
   handset::LiveTraffic traffic(handset(), {.logs = 5000, .reports = 500, .burst = 20, .log_size = 198});
@@ -293,7 +295,7 @@ TEST_F(Collection, FloodLosesNothingUncounted) {
   }
   const auto sent = traffic.Stop();
   EXPECT_TRUE(Eventually([&] { return CountersOf(handle()).collected == sent.packets(); }));
-  stop = true;
+  reader.request_stop();
   reader.join();
   const auto counters = CountersOf(handle());
   EXPECT_GT(sent.packets(), 0u);

@@ -3,8 +3,10 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <atomic>
 #include <condition_variable>
 #include <mutex>
+#include <thread>
 
 #include "frame/base/little_endian.h"
 #include "tests/support/engine_bundle.h"
@@ -27,21 +29,26 @@ class Disk {
  public:
   explicit Disk(size_t capacity = SIZE_MAX) : capacity_(capacity) {}
 
-  CaptureSink AsSink() {
-    return [this](std::span<const uint8_t> bytes) {
-      std::unique_lock lock(mutex_);
-      ++writes_;
-      held_.wait(lock, [this] { return !hold_; });
-      const size_t taken = std::min(bytes.size(), capacity_ - content_.size());
-      content_.insert(content_.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(taken));
-      return taken == bytes.size();
+  std::function<CaptureSink()> Opener() {
+    return [this] {
+      ++opened_;
+      return CaptureSink([this](std::span<const uint8_t> bytes) { return Write(bytes); });
     };
+  }
+  size_t Write(std::span<const uint8_t> bytes) {
+    std::unique_lock lock(mutex_);
+    ++writes_;
+    held_.wait(lock, [this] { return !hold_; });
+    const size_t taken = std::min(bytes.size(), capacity_ - content_.size());
+    content_.insert(content_.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(taken));
+    return taken;
   }
   void Hold(bool hold) {
     const std::lock_guard lock(mutex_);
     hold_ = hold;
     held_.notify_all();
   }
+  int opened() const { return opened_; }
   int writes() {
     const std::lock_guard lock(mutex_);
     return writes_;
@@ -56,6 +63,7 @@ class Disk {
   std::mutex mutex_;
   std::condition_variable held_;
   bool hold_ = false;
+  int opened_ = 0;
   int writes_ = 0;
   Packet content_;
 };
@@ -86,7 +94,7 @@ Reading ReadAll(const Packet& bytes) {
 Packet Capture(const std::vector<Packet>& packets) {
   Disk disk;
   CaptureWriter writer;
-  EXPECT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  EXPECT_TRUE(writer.Start(disk.Opener(), nullptr));
   for (const Packet& packet : packets) writer.Append(packet);
   EXPECT_TRUE(writer.Stop());
   return disk.content();
@@ -150,6 +158,12 @@ TEST(CaptureFile, DamageEndsTheReadingAndForeignFilesAreRefused) {
     EXPECT_EQ(reading.end, c.end) << c.name;
   }
   EXPECT_FALSE(OpenCaptureSource("/nonexistent/capture"));
+  CaptureReader failing([whole = SourceOf(file), calls = 0](std::span<uint8_t> buffer) mutable {
+    return ++calls <= 4 ? whole(buffer) : std::nullopt;  // the head, nothing of it left, and a record
+  });
+  CaptureRecord first;
+  EXPECT_EQ(failing.Next(first), Outcome::kRecord);
+  EXPECT_EQ(failing.Next(first), Outcome::kCut) << "a disk that fails between two records is no end of the file";
   CaptureRecord record;
   EXPECT_EQ(CaptureReader({}).Next(record), Outcome::kForeign);
 }
@@ -159,7 +173,7 @@ TEST(CaptureFile, FullDiskIsCountedAndLoggedOnce) {
   Disk disk(16 + 14 + 5);
   CaptureWriter writer;
   writer.SetLogger(log.log());
-  ASSERT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
   writer.Append(kPackets[0]);
   ASSERT_TRUE(Eventually([&] { return writer.written() == 1; }));
   log.Take();
@@ -174,9 +188,9 @@ TEST(CaptureFile, FullDiskIsCountedAndLoggedOnce) {
   EXPECT_EQ(writer.written(), 1u);
 
   Disk full(3);
-  EXPECT_FALSE(writer.Start(full.AsSink(), nullptr)) << "not even the head";
+  EXPECT_FALSE(writer.Start(full.Opener(), nullptr)) << "not even the head";
   Disk good;
-  ASSERT_TRUE(writer.Start(good.AsSink(), nullptr));
+  ASSERT_TRUE(writer.Start(good.Opener(), nullptr));
   writer.Append(kPackets[0]);
   EXPECT_TRUE(writer.Stop()) << "the next capture is judged by itself";
   writer.Append(kPackets[0]);
@@ -188,18 +202,43 @@ TEST(CaptureFile, SlowDiskCostsPacketsAndHoldsNobodyUp) {
   Disk disk;
   CaptureWriter writer(100);
   writer.SetLogger(log.log());
-  ASSERT_TRUE(writer.Start(disk.AsSink(), nullptr));
+  ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
   disk.Hold(true);
   writer.Append(kPackets[0]);
   ASSERT_TRUE(Eventually([&] { return disk.writes() == 2; })) << "the writer is in the disk's hands";
   for (int i = 0; i < 10; ++i) writer.Append(kPackets[0]);
   EXPECT_EQ(writer.lost(), 3u) << "seven records of 14 bytes have room";
   EXPECT_EQ(log.Take(), test::LogLines::Lines{"16 Capture file: packets are lost, the disk is too slow"});
-  EXPECT_FALSE(writer.Stop(1)) << "the wait has an end";
-  EXPECT_FALSE(writer.Start(Disk().AsSink(), nullptr)) << "the former thread is busy still";
+  EXPECT_EQ(writer.pending(), 8u) << "the one in the disk's hands, too";
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_FALSE(writer.Stop(1)) << "the wait has an end";
+    EXPECT_EQ(writer.state(), CaptureState::kEnding);
+    EXPECT_EQ(log.Take(), test::LogLines::Lines{"16 Capture file: 8 packets still wait for the disk"});
+    EXPECT_FALSE(writer.Start(disk.Opener(), nullptr));
+  }
+  EXPECT_EQ(disk.opened(), 1) << "the file that is written still is not emptied";
+  disk.Hold(false);
+  EXPECT_FALSE(writer.Stop(5000)) << "three are lost";
+  EXPECT_EQ(writer.state(), CaptureState::kNone);
+  EXPECT_EQ(writer.pending(), 0u);
+  EXPECT_EQ(ReadAll(disk.content()).packets.size(), 8u);
+  Disk next;
+  EXPECT_TRUE(writer.Start(next.Opener(), nullptr)) << "and the next capture may begin";
+}
+
+TEST(CaptureFile, RecordsInFrontOfTheOneThatTheDiskCutAreNoLoss) {
+  Disk disk(16 + 3 * 14 + 5);
+  CaptureWriter writer;
+  ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
+  disk.Hold(true);
+  writer.Append(kPackets[0]);
+  ASSERT_TRUE(Eventually([&] { return disk.writes() == 2; }));
+  for (int i = 0; i < 5; ++i) writer.Append(kPackets[0]);
   disk.Hold(false);
   EXPECT_FALSE(writer.Stop(5000));
-  EXPECT_EQ(ReadAll(disk.content()).packets.size(), 8u);
+  EXPECT_EQ(writer.written(), 3u);
+  EXPECT_EQ(writer.lost(), 3u);
+  EXPECT_EQ(ReadAll(disk.content()).packets.size(), 3u);
 }
 
 // --- Playback -------------------------------------------------------------------------------------------------------
@@ -245,6 +284,28 @@ TEST_F(Playback, WaitsForItsReaderAndCanBeStopped) {
   ASSERT_TRUE(Play(file, PlayPace::kAtOnce));
   EXPECT_TRUE(Ends(PlayState::kDone));
   EXPECT_EQ(bundle_->asynchronous.dropped(), 5000u) << "like a handset, it waits for nobody";
+}
+
+TEST_F(Playback, IsDoneOnceItsPacketsAreThroughAndCanBeFollowedAtOnce) {
+  static std::atomic<bool> hold;
+  hold = true;
+  const auto held_up = [](uint32_t, const uint8_t*, uintptr_t) {
+    while (hold) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  };
+  bundle_->sorter.SetRawPacketCallback(held_up, 0);
+  const Packet file = Capture({{16, 1}, {16, 2}});
+  ASSERT_TRUE(Play(file, PlayPace::kForLogReader));
+  std::this_thread::sleep_for(std::chrono::milliseconds(250));
+  EXPECT_EQ(player_.state(), PlayState::kPlaying) << "a callback holds them up";
+  hold = false;
+  EXPECT_TRUE(Ends(PlayState::kDone));
+  EXPECT_EQ(bundle_->asynchronous.size(), 2u);
+  for (int i = 0; i < 100; ++i) {
+    ASSERT_TRUE(Play(file, PlayPace::kForLogReader)) << i;
+    while (player_.state() == PlayState::kPlaying) std::this_thread::yield();
+  }
+  EXPECT_EQ(bundle_->asynchronous.size(), 202u);
+  EXPECT_EQ(player_.played_in_all(), 202u);
 }
 
 TEST_F(Playback, KeepsTheTimeBetweenPackets) {
