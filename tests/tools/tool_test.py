@@ -317,6 +317,9 @@ class Traffic(ToolTest):
                                 ports=ports)
             self.assertEqual({(event["id"], event["name"]) for event in shown[:-1]}, {(291, "Band change"), (7, "")})
             self.assertEqual(len(shown), 21)
+            for event in shown[:-1]:
+                self.assertIn(len(event["time_stamp"].split()), (2, 8))
+            self.assertLessEqual({1, 2}, {len(event["payload"].split()) for event in shown[:-1]})
             self.expect(0, "-p", "7", "log", "capture", file, "--count", "20", ports=ports)
             self.assertGreaterEqual(self.stream("event", "tail", "--file", file)[-1]["events"], 160)
             self.expect(0, "-p", "7", "event", "off", "291", ports=ports)
@@ -363,6 +366,10 @@ class Traffic(ToolTest):
             self.expect_json(10, "-p", "7", "log", "list", "--names", foreign.name, ports=ports)
             self.expect_json(2, "-p", "7", "log", "on", ports=ports)
             self.expect_json(2, "-p", "7", "event", "on", "0x10-0x0F", ports=ports)
+            self.expect_json(2, "-p", "7", "event", "on", "0-65535", ports=ports)
+            for ignored in (("--count", "1"), ("--seconds", "1"), ("--on", "7"), ("--all",)):
+                self.expect_json(2, "event", "tail", "--file", foreign.name, *ignored)
+            self.expect_json(2, "log", "stats", foreign.name, "--count", "1")
 
 
 def make_file(folder, name, content):

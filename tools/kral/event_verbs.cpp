@@ -2,20 +2,19 @@
 #include <fmt/format.h>
 
 #include <CLI/CLI.hpp>
-#include <algorithm>
 #include <array>
 #include <memory>
 #include <string>
 #include <vector>
 
+#include "tools/kral/event_report.h"
 #include "tools/kral/traffic.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
 namespace {
 
-constexpr std::uint32_t kWaitMs = 50;
-constexpr std::uint32_t kLookMs = 500;
+constexpr std::uint16_t kLastEventId = 4095;  // reports have twelve bits for it
 
 struct EventOptions {
   std::vector<std::string> ids;
@@ -30,7 +29,7 @@ void SwitchEvents(Session& session, const EventOptions& options, bool on) {
   if (options.all) {
     session.Run("switching all events", [&] { return KRAL_DIAG_SetEntireEventMaskState(session.handle(), state); });
   }
-  const auto ids = ParseIds(options.ids);
+  const auto ids = ParseIds(options.ids, kLastEventId);
   if (ids.empty()) return;
   session.Run("switching events", [&] {
     return KRAL_DIAG_SetEventMaskBits(session.handle(), ids.data(), static_cast<std::uint16_t>(ids.size()), state);
@@ -38,7 +37,7 @@ void SwitchEvents(Session& session, const EventOptions& options, bool on) {
 }
 
 void Switch(const Context& context, const EventOptions& options, bool on) {
-  const auto ids = ParseIds(options.ids);
+  const auto ids = ParseIds(options.ids, kLastEventId);
   if (ids.empty() && !options.all) {
     throw ToolError(ExitCode::kUsage, "nothing to switch", "give event ids or --all");
   }
@@ -49,36 +48,30 @@ void Switch(const Context& context, const EventOptions& options, bool on) {
                      fmt::format("{} {}\n", what, on ? "on" : "off"));
 }
 
-// The one- and two-byte forms carry no length: of them, what is not zero is shown.
-std::span<const std::uint8_t> PayloadOf(const KRAL_EVENT& event) {
-  const std::span<const std::uint8_t> payload(event.payload);
-  if (event.payload_length != 0) return payload.first(event.payload_length);
-  if (payload[1] != 0) return payload.first(2);
-  return payload.first(payload[0] != 0 ? 1 : 0);
-}
-
-void Print(const Context& context, KRAL_HANDLE handle, const KRAL_EVENT& event) {
-  const auto id = static_cast<std::uint16_t>(event.event_id[0] | event.event_id[1] << 8);
+void Print(const Context& context, KRAL_HANDLE handle, const ReportedEvent& event) {
   std::array<char, 256> text{};
-  const bool named = KRAL_GetEventText(handle, id, text.size(), text.data()) != 0;
+  const bool named = KRAL_GetEventText(handle, event.id, text.size(), text.data()) != 0;
   const auto name = named ? Printable(text.data()) : std::string();
-  const auto payload = HexText(PayloadOf(event));
-  const auto stamp = HexText(std::span(event.time_stamp).first(std::min<std::size_t>(event.time_stamp_length, 8)));
-  context.out.Stream({{"event", "event"}, {"id", id}, {"name", name}, {"time_stamp", stamp}, {"payload", payload}},
-                     fmt::format("{:>5}  {:<32}  {}\n", id, name, payload));
+  const auto payload = HexText(event.payload);
+  const auto stamp = HexText(event.time_stamp);
+  context.out.Stream(
+      {{"event", "event"}, {"id", event.id}, {"name", name}, {"time_stamp", stamp}, {"payload", payload}},
+      fmt::format("{:>5}  {:<32}  {:<23}  {}\n", event.id, name, stamp, payload));
 }
 
 void TailFile(const Context& context, const EventOptions& options) {
+  options.limit.Reject("a capture file");
+  if (!options.ids.empty() || options.all) {
+    throw ToolError(ExitCode::kUsage, "a capture file has no events to switch on", "leave out --on and --all");
+  }
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_EVENT_TEXTS, options.names);
   std::uint64_t events = 0;
-  const auto print_waiting = [&] {
-    KRAL_EVENT event{};
-    for (; KRAL_DIAG_GetNextEvent(handle.get(), &event) != 0; ++events) Print(context, handle.get(), event);
-  };
-  const bool whole = PlayFile(handle.get(), options.file, KRAL_PLAY_FOR_EVENT_READER,
-                              [&](std::span<const std::uint8_t>) { print_waiting(); });
-  print_waiting();
+  const bool whole =
+      PlayFile(handle.get(), options.file, KRAL_PLAY_FOR_LOG_READER, [&](std::span<const std::uint8_t> packet) {
+        EventReport report(packet);
+        for (; const auto event = report.Next(); ++events) Print(context, handle.get(), *event);
+      });
   context.out.Result({{"file", options.file}, {"events", events}, {"cut", !whole}}, "");
 }
 
@@ -90,30 +83,28 @@ void Tail(const Context& context, EventOptions& options) {
   KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   options.limit.Begin();
   std::uint64_t events = 0;
-  std::uint32_t looked = SystemClock().TickMs();
-  while (!options.limit.Reached(events)) {
-    KRAL_EVENT event{};
-    if (KRAL_DIAG_WaitNextEvent(session.handle(), &event, kWaitMs) != 0) {
-      Print(context, session.handle(), event);
+  const auto print_events = [&](std::span<const std::uint8_t> packet) {
+    EventReport report(packet);
+    while (!options.limit.Reached(events)) {
+      const auto event = report.Next();
+      if (!event) break;
+      Print(context, session.handle(), *event);
       ++events;
     }
-    if (SystemClock().TickMs() - looked < kLookMs) continue;
-    looked = SystemClock().TickMs();
-    KRAL_DIAG_ClearPhoneLogQueue(session.handle());  // the reports themselves are nobody's here
-    CheckPort(session, "waiting for events");
-  }
+  };
+  CollectPackets(session, options.limit, events, print_events, [] {});
   KRAL_TRAFFIC_COUNTERS counters{};
   KRAL_GetTrafficCounters(session.handle(), &counters);
   const double seconds = options.limit.seconds();
   const auto rate = seconds > 0 ? static_cast<double>(events) / seconds : 0;
   context.out.Result({{"port", session.port()},
                       {"events", events},
-                      {"dropped", counters.dropped_events},
+                      {"dropped", counters.dropped_logs},
                       {"seconds", seconds},
                       {"per_second", rate}},
                      "");
   if (!context.out.json()) {
-    context.out.Note(fmt::format("{} events, {:.1f}/s, {} dropped", events, rate, counters.dropped_events));
+    context.out.Note(fmt::format("{} events, {:.1f}/s, {} packets dropped", events, rate, counters.dropped_logs));
   }
 }
 

@@ -40,18 +40,28 @@ Ranges ReadRanges(Session& session) {
   return ranges;
 }
 
-Codes CodesOn(Session& session, std::uint8_t equipment_id) {
+// Items from 4,096 on have no code of their own: theirs would be the next equipment id's.
+struct ItemsOn {
+  Codes codes;
+  std::uint32_t beyond = 0;
+};
+
+ItemsOn FindItemsOn(Session& session, std::uint8_t equipment_id) {
   std::vector<std::uint8_t> mask(kMaskRoom);
   auto size = static_cast<std::uint16_t>(mask.size());
   std::uint32_t bits = 0;
   session.Run(fmt::format("the request for the log mask of equipment id {}", equipment_id),
               [&] { return KRAL_DIAG_GetLogMask(session.handle(), equipment_id, &bits, &size, mask.data()); });
-  Codes codes;
-  for (std::uint32_t item = 0; item < bits; ++item) {
+  ItemsOn on;
+  for (std::uint32_t item = 0; item < std::min<std::uint32_t>(bits, size * 8U); ++item) {
     if ((mask[item / 8] >> item % 8 & 1) == 0) continue;
-    codes.push_back(static_cast<std::uint16_t>(equipment_id * kItemsPerEquipmentId + item));
+    if (item < kItemsPerEquipmentId) {
+      on.codes.push_back(static_cast<std::uint16_t>(equipment_id * kItemsPerEquipmentId + item));
+    } else {
+      ++on.beyond;
+    }
   }
-  return codes;
+  return on;
 }
 
 std::string NameOf(KRAL_HANDLE handle, std::uint16_t code) {
@@ -69,13 +79,16 @@ void List(const Context& context, const LogOptions& options) {
     if (ranges[id] == 0) continue;
     Json codes = Json::array();
     std::string lines;
-    for (const auto code : CodesOn(session, id)) {
+    const auto on = FindItemsOn(session, id);
+    for (const auto code : on.codes) {
       const auto name = NameOf(session.handle(), code);
       codes.push_back({{"code", code}, {"name", name}});
       lines += fmt::format("  0x{:04X}  {}\n", code, name);
     }
-    text += fmt::format("equipment id {}: {} items, {} on\n{}", id, ranges[id], codes.size(), lines);
-    rows.push_back({{"equipment_id", id}, {"items", ranges[id]}, {"on", std::move(codes)}});
+    if (on.beyond != 0) lines += fmt::format("  and {} without a code\n", on.beyond);
+    text += fmt::format("equipment id {}: {} items, {} on\n{}", id, ranges[id], codes.size() + on.beyond, lines);
+    rows.push_back(
+        {{"equipment_id", id}, {"items", ranges[id]}, {"on", std::move(codes)}, {"on_without_code", on.beyond}});
   }
   context.out.Result({{"port", session.port()}, {"equipment_ids", std::move(rows)}}, text);
 }
@@ -137,33 +150,43 @@ KRAL_TRAFFIC_COUNTERS CountersOf(KRAL_HANDLE handle) {
   return counters;
 }
 
+// However slow the disk is, until Ctrl-C; one that has ended the capture does not end this.
+KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
+  const bool interrupted_before = Interrupted();
+  for (;;) {
+    KRAL_StopCapture(handle);
+    const auto counters = CountersOf(handle);
+    if (counters.capture_pending == 0 || (Interrupted() && !interrupted_before)) return counters;
+  }
+}
+
 void Capture(Context& context, LogOptions& options) {
   const auto codes = ParseIds(options.codes);
   Session session(context.session);
-  SwitchCodes(session, codes, true);
-  KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   if (KRAL_StartCapture(session.handle(), options.file.c_str()) == 0) {
     throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written", options.file),
                     "check folder, permissions and room on the disk");
   }
+  SwitchCodes(session, codes, true);
+  KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   options.limit.Begin();
   std::uint64_t packets = 0;
   {
     Progress progress(context.out, "capture", options.limit.count(), Progress::Unit::kItems);
     CollectPackets(
-        session, options.limit, [&](std::span<const std::uint8_t>) { ++packets; }, [&] { progress.Update(packets); });
+        session, options.limit, packets, [&](std::span<const std::uint8_t>) { ++packets; },
+        [&] { progress.Update(packets); });
   }
-  const bool whole = KRAL_StopCapture(session.handle()) != 0;
-  const auto counters = CountersOf(session.handle());
+  const auto counters = FinishCapture(session.handle());
   const Json members{{"port", session.port()},
                      {"file", options.file},
                      {"packets", counters.captured},
                      {"lost", counters.capture_lost},
+                     {"pending", counters.capture_pending},
                      {"seconds", options.limit.seconds()}};
-  if (!whole) {
+  if (const auto missing = counters.capture_lost + counters.capture_pending; missing != 0) {
     if (context.out.json()) context.found = members;
-    throw ToolError(ExitCode::kBadFile,
-                    fmt::format("{} of the packets are not in {}", counters.capture_lost, options.file),
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} of the packets are not in {}", missing, options.file),
                     "check the room on the disk and its speed; what is in the file can be played");
   }
   context.out.Result(members, fmt::format("{} packets in {}\n", counters.captured, options.file));
@@ -202,6 +225,7 @@ Json JsonOf(const KRAL_TRAFFIC_COUNTERS& c) {
 }
 
 void FileStatistics(const Context& context, const LogOptions& options) {
+  options.limit.Reject("a capture file");
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
@@ -219,11 +243,16 @@ void Statistics(const Context& context, LogOptions& options) {
   TrafficTable table;
   KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   options.limit.Begin();
+  std::uint64_t packets = 0;
   {
     Progress progress(context.out, "stats", options.limit.count(), Progress::Unit::kItems);
     CollectPackets(
-        session, options.limit, [&](std::span<const std::uint8_t> packet) { table.Add(packet); },
-        [&] { progress.Update(table.packets()); });
+        session, options.limit, packets,
+        [&](std::span<const std::uint8_t> packet) {
+          table.Add(packet);
+          ++packets;
+        },
+        [&] { progress.Update(packets); });
   }
   const double seconds = options.limit.seconds();
   const auto counters = CountersOf(session.handle());

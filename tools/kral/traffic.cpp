@@ -30,17 +30,17 @@ std::optional<std::uint16_t> Word(std::span<const std::uint8_t> packet, std::siz
   return static_cast<std::uint16_t>(packet[offset] | packet[offset + 1] << 8);
 }
 
-[[noreturn]] void RejectId(const std::string& word) {
+[[noreturn]] void RejectId(const std::string& word, std::uint16_t most) {
   throw ToolError(ExitCode::kUsage, fmt::format("{} is not an id", word),
-                  "give ids from 0 to 65535, such as 291, 0x1001 or 0x1000-0x100F");
+                  fmt::format("give ids from 0 to {}, such as 291, 0x123 or 0x100-0x10F", most));
 }
 
-std::uint16_t ParseId(std::string_view text, const std::string& word) {
+std::uint16_t ParseId(std::string_view text, const std::string& word, std::uint16_t most) {
   const bool hex = text.starts_with("0x") || text.starts_with("0X");
   if (hex) text.remove_prefix(2);
   std::uint16_t id = 0;
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), id, hex ? 16 : 10);
-  if (error != std::errc() || end != text.data() + text.size()) RejectId(word);
+  if (error != std::errc() || end != text.data() + text.size() || id > most) RejectId(word, most);
   return id;
 }
 
@@ -53,13 +53,13 @@ std::span<const std::uint8_t> NextPacket(KRAL_HANDLE handle, std::span<std::uint
 
 }  // namespace
 
-std::vector<std::uint16_t> ParseIds(const std::vector<std::string>& words) {
+std::vector<std::uint16_t> ParseIds(const std::vector<std::string>& words, std::uint16_t most) {
   std::set<std::uint16_t> ids;
   for (const auto& word : words) {
     const auto dash = word.find('-');
-    const auto first = ParseId(std::string_view(word).substr(0, dash), word);
-    const auto last = dash == std::string::npos ? first : ParseId(std::string_view(word).substr(dash + 1), word);
-    if (last < first) RejectId(word);
+    const auto first = ParseId(std::string_view(word).substr(0, dash), word, most);
+    const auto last = dash == std::string::npos ? first : ParseId(std::string_view(word).substr(dash + 1), word, most);
+    if (last < first) RejectId(word, most);
     for (std::uint32_t id = first; id <= last; ++id) ids.insert(static_cast<std::uint16_t>(id));
   }
   return {ids.begin(), ids.end()};
@@ -86,7 +86,6 @@ void TrafficTable::Add(std::span<const std::uint8_t> packet) {
   if (row.packets == 0 && !packet.empty() && packet.front() == kLog) row.log_code = Word(packet, kLogCodeOffset);
   ++row.packets;
   row.bytes += packet.size();
-  ++packets_;
 }
 
 std::vector<std::pair<std::string, TrafficTable::Row>> TrafficTable::Sorted() const {
@@ -132,6 +131,11 @@ void Limit::AddTo(CLI::App& verb, const char* things) {
   verb.add_option("--count", count_, fmt::format("Stop after so many {}", things));
 }
 
+void Limit::Reject(const char* what) const {
+  if (count_ == 0 && most_seconds_ <= 0) return;
+  throw ToolError(ExitCode::kUsage, fmt::format("{} has an end of its own", what), "leave out --seconds and --count");
+}
+
 void Limit::Begin() {
   begin_ = SystemClock().TickMs();
 }
@@ -149,16 +153,13 @@ void CheckPort(Session& session, const char* what) {
   if (KRAL_GetPortState(session.handle(), &state) != 0 && state != KRAL_PORT_OPEN) throw session.Explain(what);
 }
 
-void CollectPackets(Session& session, const Limit& limit, const PacketSink& sink, const std::function<void()>& look) {
+void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& count, const PacketSink& sink,
+                    const std::function<void()>& look) {
   std::array<std::uint8_t, KRAL_LONGEST_PACKET> buffer{};
-  std::uint64_t count = 0;
   std::uint32_t looked = SystemClock().TickMs();
   while (!limit.Reached(count)) {
     const auto packet = NextPacket(session.handle(), buffer, kWaitMs);
-    if (!packet.empty()) {
-      sink(packet);
-      ++count;
-    }
+    if (!packet.empty()) sink(packet);
     if (SystemClock().TickMs() - looked < kLookMs) continue;
     looked = SystemClock().TickMs();
     CheckPort(session, "the collection of packets");

@@ -24,8 +24,8 @@ namespace kral::tool {
 
 class Session;
 
-// "291", "0x1001", "0x1000-0x100F", in rising order and each once. ToolError kUsage.
-std::vector<std::uint16_t> ParseIds(const std::vector<std::string>& words);
+// "291", "0x1001", "0x1000-0x100F", none above `most`, in rising order and each once. ToolError kUsage.
+std::vector<std::uint16_t> ParseIds(const std::vector<std::string>& words, std::uint16_t most = 0xFFFF);
 
 // "log 0x1001", "message 5", "events", "packet 31".
 std::string DescribePacket(std::span<const std::uint8_t> packet);
@@ -35,7 +35,6 @@ class TrafficTable {
  public:
   void Add(std::span<const std::uint8_t> packet);
 
-  std::uint64_t packets() const { return packets_; }
   // Rows of the busiest first. Names come from the table of log names of the handle.
   Json Rows(KRAL_HANDLE handle, double seconds) const;
   std::string Text(KRAL_HANDLE handle, double seconds) const;
@@ -49,7 +48,6 @@ class TrafficTable {
   std::vector<std::pair<std::string, Row>> Sorted() const;
 
   std::map<std::string, Row> rows_;
-  std::uint64_t packets_ = 0;
 };
 
 // Ends a verb that goes on by itself: after a time, a number of packets or events, or with Ctrl-C, which is its
@@ -57,6 +55,8 @@ class TrafficTable {
 class Limit {
  public:
   void AddTo(CLI::App& verb, const char* things);
+  // For what ends by itself: ToolError kUsage when one was given.
+  void Reject(const char* what) const;
   void Begin();
   bool Reached(std::uint64_t count) const;
   std::uint64_t count() const { return count_; }  // 0: none
@@ -68,10 +68,11 @@ class Limit {
   std::uint32_t begin_ = 0;
 };
 
-// Hands over every packet of the log queue, and `look` a few times a second, until the limit is reached. A handset that
-// goes away meanwhile is an error.
+// Hands over every packet of the log queue, and `look` a few times a second, until `count`, which the sink advances,
+// has reached the limit. A handset that goes away meanwhile is an error.
 using PacketSink = std::function<void(std::span<const std::uint8_t> packet)>;
-void CollectPackets(Session& session, const Limit& limit, const PacketSink& sink, const std::function<void()>& look);
+void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& count, const PacketSink& sink,
+                    const std::function<void()>& look);
 void CheckPort(Session& session, const char* what);
 
 // A handle with nothing behind it, for the playback of files.
