@@ -113,7 +113,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_FlushRxBuffer(KRAL_HANDLE handle);
  * Called for every packet of 2 to 4,096 bytes as it was de-framed, FCS bytes included, before it is put into a queue.
  *
  * Comes on a thread of the library and must not call functions that send requests. The bytes are valid during the
- * call only. Packets wait while it runs.
+ * call only. Everything that is received waits while it runs, the answers to requests of other threads as well: one
+ * that takes long makes them run into their time-outs.
  *
  * @param length  bytes of the packet
  * @param bytes   the packet
