@@ -6,6 +6,8 @@
 #include <thread>
 #include <vector>
 
+#include "frame/diag_ftm.h"
+#include "frame/resource_manager.h"
 #include "handset/log_generator.h"
 #include "kral/diag.h"
 #include "kral/log.h"
@@ -14,6 +16,7 @@
 #include "tests/support/engine_bundle.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/temp_folder.h"
+#include "transport/capture_writer.h"
 
 namespace kral {
 namespace {
@@ -267,6 +270,47 @@ TEST_F(Collection, CapturedTrafficPlaysBackAsItCame) {
   for (uint64_t i = 0; i < sent.events; ++i) ASSERT_EQ(KRAL_DIAG_WaitNextEvent(offline, &event, 5000), 1) << i;
   EXPECT_EQ(CountersOf(offline).dropped_events, dropped_before);
   KRAL_DisconnectServer(offline);
+}
+
+TEST_F(Collection, CaptureThatCouldNotEndInTimeIsWaitedForAgainAndKeepsItsFile) {
+  static std::atomic<bool> hold;
+  hold = false;
+  const auto phone = Kral_ResourceManager::GetPhone(handle());
+  const auto open = [] {
+    return CaptureSink([](std::span<const uint8_t> bytes) {
+      while (hold) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+      return bytes.size();
+    });
+  };
+  ASSERT_TRUE(phone->capture().Start(open, phone));
+  hold = true;
+  KRAL_DIAG_SetPhoneLoggingState(handle(), 1);
+  Send(2);
+  ASSERT_TRUE(Eventually([&] { return CountersOf(handle()).collected == 2; }));
+  EXPECT_FALSE(phone->capture().Stop(1));
+  EXPECT_EQ(CountersOf(handle()).capture_pending, 2u);
+  const std::string file = folder_.Add("kept", "what was captured before");
+  EXPECT_EQ(KRAL_StartCapture(handle(), file.c_str()), 0);
+  EXPECT_EQ(folder_.Content("kept"), "what was captured before");
+  hold = false;
+  EXPECT_EQ(KRAL_StopCapture(handle()), 1);
+  EXPECT_EQ(CountersOf(handle()).captured, 2u);
+  EXPECT_EQ(CountersOf(handle()).capture_pending, 0u);
+  EXPECT_EQ(KRAL_StopCapture(handle()), 0) << "none runs any more";
+  EXPECT_EQ(KRAL_StartCapture(handle(), file.c_str()), 1);
+}
+
+TEST_F(Collection, SlowCallbackHoldsUpAnswersAndLosesNone) {
+  const auto slow = [](uint32_t, const uint8_t*, uintptr_t) {
+    std::this_thread::sleep_for(std::chrono::milliseconds(2));
+  };
+  KRAL_DIAG_SetPhoneLoggingState(handle(), 1);
+  EXPECT_EQ(KRAL_ConfigureCollectionCallBacks(handle(), slow, nullptr, 0), 1);
+  Send(50);
+  const auto begin = steady_clock::now();
+  EXPECT_TRUE(Settle());
+  EXPECT_GT(steady_clock::now() - begin, std::chrono::milliseconds(50)) << "the answer came behind the packets";
+  EXPECT_EQ(CountersOf(handle()).collected, 50u);
 }
 
 // A flood with commands in between: every packet sent is collected or counted, and every command is answered.
