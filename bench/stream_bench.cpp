@@ -88,7 +88,8 @@ class Wire {
     const uint8_t* at = frame.data() + 1;  // behind the leading flag
     const uint8_t* const end = frame.data() + frame.size() - 1;
     while (at != end) {
-      const auto* escape = static_cast<const uint8_t*>(std::memchr(at, handset::kEscape, static_cast<size_t>(end - at)));
+      const auto* escape =
+          static_cast<const uint8_t*>(std::memchr(at, handset::kEscape, static_cast<size_t>(end - at)));
       packet.insert(packet.end(), at, escape == nullptr ? end : escape);
       if (escape == nullptr) break;
       packet.push_back(escape[1] ^ 0x20);
@@ -145,8 +146,8 @@ void StreamImage(benchmark::State& state) {
   const auto window = static_cast<uint32_t>(state.range(0));
   for (auto _ : state) {
     Wire wire(image);
-    const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(kPort, 0, wire.context(), &Wire::Send,
-                                                                       &Wire::Receive, &Wire::Flush);
+    const KRAL_HANDLE handle =
+        KRAL_ConnectServer_UserDefinedTransport(kPort, 0, wire.context(), &Wire::Send, &Wire::Receive, &Wire::Flush);
     uint32_t result = 0;
     const uint8_t written =
         KRAL_STREAM_WriteImageFile(handle, path.c_str(), KRAL_IMAGE_FORMAT_BINARY, 0, nullptr, KRAL_STREAM_NOR,

@@ -96,7 +96,11 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (file == nullptr) return Give(KRAL_KOVA_FILE_NOT_OPENED, result);
-  return Give(kova::LoadFlashProgrammer(connection, file, maximum_packet), result);
+  try {
+    return Give(kova::LoadFlashProgrammer(connection, file, maximum_packet), result);
+  } catch (const PhoneImageException&) {  // no address space for the image
+    return Give(KRAL_KOVA_FILE_NOT_DECODED, result);
+  }
 }
 
 bool KovaNop(Diag_FTM& phone) {
@@ -142,8 +146,7 @@ bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, u
   DownloadConnection connection(phone);
   if (file == nullptr) return false;
   std::optional<uint8_t> answer;
-  const bool accepted =
-      CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
+  const bool accepted = CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
   if (answer && status != nullptr) *status = *answer;
   return accepted;
 }
@@ -157,7 +160,8 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   ImageFile image;
   ImageFile header;
   uint32_t opened = image.Open(file, format);
-  if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr) opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
+  if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
+    opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
   if (opened != KRAL_STREAM_WRITTEN) return Give(opened, result);
   if (image.has_second_region()) return Give(KRAL_STREAM_BAD_IMAGE, result);
   return Give(WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments),
@@ -171,6 +175,7 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
   connection.BeginWork();
   if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
   const auto whole = MakeMemoryImage({image.data, image.size}, address);
+  if (whole == nullptr) return Give(KRAL_STREAM_WRITE_FAILED, result);
   std::unique_ptr<PhoneImage> opening;
   if (header.size > stream::kLongestHeader) {
     connection.log().WriteLine(kLogErr, "multi-image open failed\n");

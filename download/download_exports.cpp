@@ -45,8 +45,8 @@ uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle) {
 
 uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file,
                                                 uint32_t maximum_packet, uint32_t* result) {
-  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )",
-               Text(programmer_file), maximum_packet);
+  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )", Text(programmer_file),
+               maximum_packet);
   return OnPhone(handle, download::LoadFlashProgrammer, programmer_file, maximum_packet, result);
 }
 
@@ -105,8 +105,7 @@ uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* d
                  download::WriteArguments{image_type, method, block_size, window}, result);
 }
 
-uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info,
-                                     uint32_t* result) {
+uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info, uint32_t* result) {
   return WithoutPhone(result, [=] {
     if (image_file == nullptr || info == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
     return kral::GetImageInfo(image_file, format, *info);

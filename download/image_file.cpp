@@ -56,16 +56,24 @@ uint32_t ImageFile::OpenHex(const std::string& path) {
   TextFile file;
   if (!file.OpenForReading(path)) return KRAL_STREAM_FILE_NOT_OPENED;
   decoder_ = std::make_unique<HexPhoneImageDecoder>();
-  image_ = std::make_unique<PhoneImageDPaged>(kMaximumKib, decoder_.get());
+  try {
+    image_ = std::make_unique<PhoneImageDPaged>(kMaximumKib, decoder_.get());
+  } catch (const PhoneImageException&) {  // a process that has no address space left
+    return KRAL_STREAM_FILE_NOT_DECODED;
+  }
   return decoder_->Decode(*image_, file) ? KRAL_STREAM_WRITTEN : KRAL_STREAM_FILE_NOT_DECODED;
 }
 
 std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint32_t address) {
   const auto size = static_cast<uint32_t>(bytes.size());
-  auto image = std::make_unique<PhoneImageDPaged>(static_cast<uint32_t>((bytes.size() + 1023) / 1024), nullptr);
-  image->SetBaseAddress(address, 0);
-  if (size != 0) image->Write(address, bytes.data(), size, 0);
-  return image;
+  try {
+    auto image = std::make_unique<PhoneImageDPaged>(size / 1024 + 1, nullptr);
+    image->SetBaseAddress(address, 0);
+    if (size != 0) image->Write(address, bytes.data(), size, 0);
+    return image;
+  } catch (const PhoneImageException&) {
+    return nullptr;
+  }
 }
 
 uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info) {

@@ -33,7 +33,7 @@ class ImageFile {
   std::unique_ptr<PhoneImage> image_;  // borrows the decoder
 };
 
-// An image of exactly these bytes.
+// An image of exactly these bytes; null when there is no room for a copy.
 std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint32_t address);
 
 uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info);

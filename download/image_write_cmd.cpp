@@ -43,8 +43,7 @@ bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data)
   const auto header = Header(address);
   const auto body = std::copy(header.begin(), header.end(), packet_.begin());
   std::copy(data.begin(), data.end(), body);
-  const auto status =
-      connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_);
+  const auto status = connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_);
   if (status == DownloadConnection::kDone) return true;
   connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", static_cast<unsigned>(status));
   return false;

@@ -16,7 +16,10 @@ constexpr uint32_t kStopMs = 1000;
 }  // namespace
 
 CImageWriteRsp::CImageWriteRsp(DownloadConnection& connection)
-    : log_(connection.log()), connection_(connection), parts_(connection.KeepParts()), responses_(connection.responses()) {}
+    : log_(connection.log()),
+      connection_(connection),
+      parts_(connection.KeepParts()),
+      responses_(connection.responses()) {}
 
 CImageWriteRsp::Start CImageWriteRsp::StartThread(uint32_t time_out_ms) {
   connection_.ForgetReplies();

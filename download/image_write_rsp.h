@@ -38,7 +38,7 @@ class CImageWriteRsp : public std::enable_shared_from_this<CImageWriteRsp>, prot
  private:
   void Run();
 
-  DownloadConnection& connection_;  // for the caller's thread; the thread of this object must not use it
+  DownloadConnection& connection_;     // for the caller's thread; the thread of this object must not use it
   const std::shared_ptr<void> parts_;  // of the phone object: log and queue
   PacketQueue& responses_;
   AutoResetEvent stop_;

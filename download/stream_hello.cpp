@@ -2,6 +2,7 @@
 #include "download/stream_hello.h"
 
 #include <algorithm>
+#include <array>
 #include <vector>
 
 #include "download/stream_format.h"
@@ -15,10 +16,15 @@ constexpr uint32_t kNopMs = 1000;
 constexpr uint32_t kHelloMs = 2000;
 constexpr size_t kReplyRoom = 2048;
 
-std::vector<uint8_t> HelloRequest() {
-  std::vector<uint8_t> request = {kHello};
-  request.insert(request.end(), kHostMagic.begin(), kHostMagic.end());
-  request.insert(request.end(), {kVersion, kCompatibleVersion, kFeatures});
+constexpr size_t kVersionAt = kMagicAt + kHostMagic.size();
+constexpr size_t kRequestSize = kVersionAt + 3;
+
+std::array<uint8_t, kRequestSize> HelloRequest() {
+  std::array<uint8_t, kRequestSize> request{kHello};
+  std::copy(kHostMagic.begin(), kHostMagic.end(), request.begin() + kMagicAt);
+  request[kVersionAt] = kVersion;
+  request[kVersionAt + 1] = kCompatibleVersion;
+  request[kVersionAt + 2] = kFeatures;
   return request;
 }
 

@@ -1,5 +1,5 @@
-// Any frames as replies to stream writes, and any bytes as the reply to a hello. Whatever comes, the queues of the agent
-// stay whole: acknowledged bytes never exceed those sent, and blocks are neither lost nor doubled.
+// Any frames as replies to stream writes, and any bytes as the reply to a hello. Whatever comes, the queues of the
+// agent stay whole: acknowledged bytes never exceed those sent, and blocks are neither lost nor doubled.
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>

@@ -17,9 +17,9 @@ class KovaLoader final : public FramedMode {
   KovaLoader(Memory& memory, std::shared_ptr<WireMode> program) : memory_(memory), program_(std::move(program)) {}
 
   void SetSoftwareVersion(uint8_t version);
-  void SetResetTime(uint32_t milliseconds);           // silence after a reset
-  std::optional<uint32_t> started_at() const;         // the address of the last start
-  uint64_t bytes_loaded() const;                      // since it was last entered
+  void SetResetTime(uint32_t milliseconds);    // silence after a reset
+  std::optional<uint32_t> started_at() const;  // the address of the last start
+  uint64_t bytes_loaded() const;               // since it was last entered
   void OnEnter(Wire& wire) override;
 
  private:

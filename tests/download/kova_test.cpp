@@ -91,7 +91,8 @@ TEST_F(Kova, EveryFailureHasItsResult) {
   const auto startless = folder_.Add("startless.hex", no_start);
   const auto broken = folder_.Add("broken.hex", ":020000040002F8\n:0100000055AB\n:00000001FF\n");
   // Beyond 500 KiB.
-  const auto large = folder_.Add("large.hex", ":020000040001F9\n:0100000055AA\n:020000040009F1\n:0100000055AA\n:00000001FF\n");
+  const auto large =
+      folder_.Add("large.hex", ":020000040001F9\n:0100000055AA\n:020000040009F1\n:0100000055AA\n:00000001FF\n");
   StartLoader();
   EXPECT_EQ(Load(folder_.Path("missing")), KRAL_KOVA_FILE_NOT_OPENED);
   EXPECT_EQ(Load(broken), KRAL_KOVA_FILE_NOT_DECODED);
@@ -114,7 +115,8 @@ TEST_F(Kova, EveryFailureHasItsResult) {
 }
 
 TEST(KovaChunks, AreHalfAPacketAndNeverMoreThanAWriteHolds) {
-  const std::pair<uint32_t, uint32_t> rows[] = {{0, 0}, {1, 0}, {100, 50}, {8177, 4088}, {8178, 4089}, {UINT32_MAX, 4089}};
+  const std::pair<uint32_t, uint32_t> rows[] = {{0, 0},       {1, 0},       {100, 50},
+                                                {8177, 4088}, {8178, 4089}, {UINT32_MAX, 4089}};
   for (const auto& [packet, chunk] : rows) EXPECT_EQ(kova::ChunkSize(packet), chunk) << packet;
 }
 

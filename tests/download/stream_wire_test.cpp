@@ -17,7 +17,9 @@ using handset::FromHex;
 using handset::HexText;
 using test::DownloadTest;
 
-std::string HexOf(std::string_view text) { return HexText(handset::Bytes(text.begin(), text.end())) + " "; }
+std::string HexOf(std::string_view text) {
+  return HexText(handset::Bytes(text.begin(), text.end())) + " ";
+}
 
 const std::string kHello = "01 " + HexOf("VRMO fast download protocol host") + "02 02 01";
 const std::string kTarget = "02 " + HexOf("VRMO fast download protocol targ");
@@ -39,9 +41,9 @@ TEST_F(StreamWire, HelloTellsTheLimitsAndEveryFrameBeginsWithAFlag) {
   EXPECT_EQ(Hello(), 1) << LogText();
   EXPECT_EQ(block_size_, 0x1000u);
   EXPECT_EQ(window_, 0x20);
-  for (const char* line : {"Sending NOP to flash programmer, 1", "Sending NOP to flash programmer, 3",
-                           "Sending HELLO to flash programmer, 1",
-                           "HELLO command succeeded, block size 4096, window size 32"}) {
+  for (const char* line :
+       {"Sending NOP to flash programmer, 1", "Sending NOP to flash programmer, 3",
+        "Sending HELLO to flash programmer, 1", "HELLO command succeeded, block size 4096, window size 32"}) {
     EXPECT_TRUE(HasLine(KRAL_LOG_RET, line)) << line;
   }
   const auto bytes = handset().received();
@@ -148,9 +150,9 @@ TEST_F(StreamWire, OneImageByteForByte) {
   handset().Expect("15").Reply("16");
   EXPECT_EQ(WriteMem({1, 2, 3, 4, 5, 6}, 0x20000, KRAL_STREAM_MULTI_IMAGE, {'H', 'I'}), KRAL_STREAM_WRITTEN)
       << LogText();
-  for (const char* line : {"Enqueued address 0x00020000, size 0x6, device 0\n",
-                           "Streaming start max write 4, window size 1\n", "Reply address 0x00020004 size 0x2\n",
-                           "Sent 2 Acknowledged 2\n"}) {
+  for (const char* line :
+       {"Enqueued address 0x00020000, size 0x6, device 0\n", "Streaming start max write 4, window size 1\n",
+        "Reply address 0x00020004 size 0x2\n", "Sent 2 Acknowledged 2\n"}) {
     EXPECT_TRUE(HasLine(KRAL_LOG_RET, line)) << line << LogText();
   }
   // Without opening and closing packets.

@@ -91,8 +91,10 @@ TEST_F(StreamWrite, FaultMatrix) {
       {"in pieces", strike(handset::Split(2, 1))},
       {"together with the next", strike(handset::Merge())},
       {"behind noise", strike(handset::LeadingNoise(9))},
-      {"all of them twice", [](handset::FaultPlan& plan, uint64_t) { plan.Add(handset::Duplicate(), When::Always().Of("08")); }},
-      {"two in a row lost", [](handset::FaultPlan& plan, uint64_t nth) {
+      {"all of them twice",
+       [](handset::FaultPlan& plan, uint64_t) { plan.Add(handset::Duplicate(), When::Always().Of("08")); }},
+      {"two in a row lost",
+       [](handset::FaultPlan& plan, uint64_t nth) {
          for (const uint64_t n : {nth, nth + 1}) plan.Add(handset::Lose(), When::Nth(n).Of("08"));
        }},
   };
@@ -220,8 +222,8 @@ TEST_F(StreamWrite, FilesOfBothFormatsAndWhatIsWrongWithThem) {
   ExpectInFlash(bytes, 0x30000);
 
   const size_t images = handset().programmer().images().size();
-  const auto two = folder.Add("two.hex",
-                              ":020000040001F9\n:0100000055AA\n:020000040800F2\n:0100000055AA\n:00000001FF\n");
+  const auto two =
+      folder.Add("two.hex", ":020000040001F9\n:0100000055AA\n:020000040800F2\n:0100000055AA\n:00000001FF\n");
   EXPECT_EQ(write(two, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_BAD_IMAGE);
   EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_FILE_NOT_DECODED);
   EXPECT_EQ(write(binary, 7), KRAL_STREAM_BAD_ARGUMENT);

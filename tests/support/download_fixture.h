@@ -37,9 +37,10 @@ class DownloadTest : public HandsetTest {
   uint32_t WriteMem(const std::vector<uint8_t>& bytes, uint32_t address = 0, uint8_t method = KRAL_STREAM_MULTI_IMAGE,
                     const std::vector<uint8_t>& header = {}) {
     uint32_t result = UINT32_MAX;
-    const uint8_t written = KRAL_STREAM_WriteImageMem(
-        handle(), bytes.data(), static_cast<uint32_t>(bytes.size()), address, 7, header.empty() ? nullptr : header.data(),
-        static_cast<uint32_t>(header.size()), method, block_size_, window_, &result);
+    const uint8_t written =
+        KRAL_STREAM_WriteImageMem(handle(), bytes.data(), static_cast<uint32_t>(bytes.size()), address, 7,
+                                  header.empty() ? nullptr : header.data(), static_cast<uint32_t>(header.size()),
+                                  method, block_size_, window_, &result);
     EXPECT_EQ(written, result == KRAL_STREAM_WRITTEN ? 1 : 0);
     return result;
   }

@@ -152,12 +152,11 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
   session_.Begin();
   const auto block_size = options.block_size == 0 ? limits.block_size : std::min(options.block_size, limits.block_size);
   std::uint32_t result = 0;
-  const bool written =
-      KRAL_STREAM_WriteImageFile(session_.handle(), image.file.c_str(), options.format,
-                                 image.type.value_or(options.type),
-                                 options.header.empty() ? nullptr : options.header.c_str(),
-                                 options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE, block_size, limits.window,
-                                 &result) != 0;
+  const bool written = KRAL_STREAM_WriteImageFile(session_.handle(), image.file.c_str(), options.format,
+                                                  image.type.value_or(options.type),
+                                                  options.header.empty() ? nullptr : options.header.c_str(),
+                                                  options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE, block_size,
+                                                  limits.window, &result) != 0;
   progress_ = nullptr;
   if (!written) throw ExplainWrite(session_.port(), image.file, result);
 }
@@ -194,9 +193,9 @@ ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_
     default:
       return {ExitCode::kInternal, fmt::format("writing {} on {} failed", file, where), "--log FILE shows why"};
   }
-  return {ExitCode::kNoAnswer, fmt::format("no answer in time to {} of {} on {}",
-                                           result == KRAL_STREAM_OPEN_FAILED ? "the opening" : "the closing", file,
-                                           where),
+  return {ExitCode::kNoAnswer,
+          fmt::format("no answer in time to {} of {} on {}",
+                      result == KRAL_STREAM_OPEN_FAILED ? "the opening" : "the closing", file, where),
           "flash that is being erased takes long: --time-out MS waits longer"};
 }
 

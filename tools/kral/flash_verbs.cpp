@@ -33,9 +33,9 @@ void ShowInfo(Context& context) {
   }
   // A loader refuses a hello at once, while a programmer is silent to a loader's request.
   if (const auto limits = target.TryHello(1)) {
-    return PrintState(context, port, "programmer", {{"block_size", limits->block_size}, {"window", limits->window}},
-                      fmt::format("flash programmer: blocks of {} bytes, window of {}\n", limits->block_size,
-                                  limits->window));
+    return PrintState(
+        context, port, "programmer", {{"block_size", limits->block_size}, {"window", limits->window}},
+        fmt::format("flash programmer: blocks of {} bytes, window of {}\n", limits->block_size, limits->window));
   }
   if (const auto version = target.LoaderVersion()) {
     return PrintState(context, port, "loader", {{"version", *version}},
@@ -55,9 +55,10 @@ void LoadProgrammer(Context& context, const LoadArguments& arguments) {
   const auto programmer = ReadProgrammer(arguments.file);
   if (arguments.dry_run) {
     const auto chunk = std::max(arguments.packet / 2, 1u);
-    context.out.Result({{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
-                       DescribeImage(programmer) + fmt::format("  {} writes of at most {} bytes\n",
-                                                               CountBlocks(programmer, chunk), chunk));
+    context.out.Result(
+        {{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
+        DescribeImage(programmer) +
+            fmt::format("  {} writes of at most {} bytes\n", CountBlocks(programmer, chunk), chunk));
     return;
   }
   FlashTarget target(context);
@@ -110,12 +111,14 @@ void WriteImages(Context& context, WriteArguments arguments) {
   options.format = ParseImageFormat(arguments.format);
   std::vector<FlashImage> images;
   for (const auto& argument : arguments.images) images.push_back(ReadFlashImage(argument, options.format));
-  if (arguments.dry_run) return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
+  if (arguments.dry_run)
+    return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
 
   FlashTarget target(context);
   const auto limits = target.Hello();
   if (arguments.security_mode) target.SetSecurityMode(*arguments.security_mode);
-  if (!arguments.partition_table.empty()) target.SendPartitionTable(arguments.partition_table, arguments.override_table);
+  if (!arguments.partition_table.empty())
+    target.SendPartitionTable(arguments.partition_table, arguments.override_table);
   const auto total = TotalBytes(images);
   std::uint64_t done = 0;
   Json written = Json::array();
@@ -203,8 +206,7 @@ void AddWriteVerb(CLI::App& flash, Context& context) {
   write->add_option("--partition", arguments->partition_table, "Send this partition table first");
   write->add_flag("--override", arguments->override_table, "Let the partition table replace a different one");
   write->add_flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
-  write->callback(
-      [&context, arguments] { context.run = [&context, arguments] { WriteImages(context, *arguments); }; });
+  write->callback([&context, arguments] { context.run = [&context, arguments] { WriteImages(context, *arguments); }; });
 }
 
 }  // namespace
