@@ -154,13 +154,15 @@ Bytes EfsService::PutItem(ByteView request) {
   if (error == EfsError::kDone && node && node->kind != EfsKind::kItemFile) {
     error = node->kind == EfsKind::kDirectory ? EfsError::kIsDirectory : EfsError::kExists;
   }
-  if (error == EfsError::kDone && !node) error = tree_.Create(*path, EfsKind::kItemFile, 0666, &node);
+  const bool is_new = !node;
+  if (error == EfsError::kDone && is_new) error = tree_.Create(*path, EfsKind::kItemFile, 0666, &node);
   if (error == EfsError::kDone && !node->Permits(kOwnerWrites)) error = EfsError::kNoAccess;
   if (error == EfsError::kDone) {
     const Bytes before = node->data;
     tree_.Truncate(*node);
     error = tree_.Write(*node, 0, request.subspan(14, size));
-    if (error != EfsError::kDone) tree_.Write(*node, 0, before);
+    if (error != EfsError::kDone && is_new) tree_.Unlink(*path);
+    if (error != EfsError::kDone && !is_new) tree_.Write(*node, 0, before);
   }
   return efs::Reply(request).U16(GetU16(request, 12)).U32(efs::Number(error)).Take();
 }

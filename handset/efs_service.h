@@ -29,15 +29,13 @@ class EfsService final : public Service {
   void SetTotalBlocks(uint32_t blocks);
   void SetTime(uint32_t seconds);
 
-  // --- What can run out
-  // -----------------------------------------------------------------------------------------------
+  // --- What can run out ---------------------------------------------------------------------------------------------
   void SetLimits(size_t descriptors, size_t directories);
   size_t open_descriptors() const;
   size_t open_directories() const;
 
-  // --- Behaviour
-  // ------------------------------------------------------------------------------------------------------ A write
-  // takes so many bytes at most; 0 takes none and tells no error.
+  // --- Behaviour ----------------------------------------------------------------------------------------------------
+  // A write takes so many bytes at most; 0 takes none and tells no error.
   void SetWriteLimit(size_t bytes);
   // Worn memory: files keep a wrong byte at this offset.
   void SetBadOffset(uint32_t offset);

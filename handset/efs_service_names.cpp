@@ -162,7 +162,7 @@ Bytes EfsService::FileSystemStatus(ByteView request) const {
 }
 
 Bytes EfsService::DeviceInfo(ByteView request) const {
-  const uint32_t blocks = tree_.total_blocks / 32;  // of 64 pages, 4 file-system blocks each
+  const uint32_t blocks = tree_.total_blocks / (64 * 4);  // of 64 pages, 4 file-system blocks each
   return efs::Reply(request)
       .U32(0)
       .U32(blocks)

@@ -10,7 +10,7 @@ namespace {
 constexpr uint32_t kOwnerWrites = 0200;
 constexpr int kMostLinks = 8;  // followed on the way to one node
 
-uint64_t BlocksOf(size_t size) {
+uint64_t BlocksOf(uint64_t size) {
   return (size + EfsTree::kBlockSize - 1) / EfsTree::kBlockSize;
 }
 
@@ -146,9 +146,10 @@ EfsError EfsTree::ChangeMode(std::string_view path, uint32_t permissions) {
 }
 
 EfsError EfsTree::Write(EfsNode& node, size_t offset, ByteView bytes) {
-  const size_t end = std::max(node.data.size(), offset + bytes.size());
+  // Offsets are the host's: on a 32-bit machine their sum with a size would wrap.
+  const uint64_t end = std::max<uint64_t>(node.data.size(), uint64_t{offset} + bytes.size());
   if (BlocksOf(end) - BlocksOf(node.data.size()) > free_blocks()) return EfsError::kNoSpace;
-  node.Resize(end);
+  node.Resize(static_cast<size_t>(end));
   std::copy(bytes.begin(), bytes.end(), node.data.begin() + static_cast<std::ptrdiff_t>(offset));
   Touch(node);
   return EfsError::kDone;
