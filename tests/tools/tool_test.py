@@ -604,20 +604,24 @@ class Files(ToolTest):
             self.fs(0, "sync")
             self.fs(0, "rm", "/link", "/d/f", "/item")
             self.fs(0, "rmdir", "/a/b/c", "/a/b")
+            self.fs(0, "put", local, ":/file")
             for words, text in ((("rmdir", "/"), "invalid"), (("rm", "/none"), "no such file"),
                                 (("get", ":/none"), "no such file"), (("ls", "/none"), "no such file"),
-                                (("mkdir", "/none/x"), "no such file"), (("put", local, ":/none/x"), "no such file")):
+                                (("mkdir", "/none/x"), "no such file"), (("put", local, ":/none/x"), "no such file"),
+                                (("mkdir", "/file"), "exists already")):
                 with self.subTest(words=words):
                     self.assertIn(text, self.fs(7, *words)["error"]["text"])
 
     def test_mistakes_are_found_before_anything_is_copied(self):
         with self.handset():
             self.fs(0, "mkdir", "/d")
+            self.fs(0, "put", self.add("f", b"1"), ":/d")
             for code, *words in ((2, "get", "f", ":/f"), (2, "put", ":/f", "f"), (2, "get", ":/d"), (2, "cat", "/d"),
                                  (2, "put", self.folder, ":/x"), (10, "put", self.path("none"), ":/x"),
                                  (2, "put", self.add("f", b"1"), ":/" + "n" * 300),
                                  (10, "put", "--item", self.add("g", b"1" * 1025), ":/x"),
-                                 (10, "get", "-r", ":/d", self.path("no", "where"))):
+                                 (10, "get", "-r", ":/d", self.path("no", "where")),
+                                 (10, "get", ":/d/f", os.devnull)):
                 with self.subTest(words=words):
                     self.fs(code, *words)
             self.assertEqual([row["name"] for row in self.fs(0, "ls")["entries"]], ["d"])
@@ -631,7 +635,7 @@ class Files(ToolTest):
             self.assertIn("no room", self.fs(7, "put", local, ":/f")["error"]["text"])
 
     def test_names_of_the_handset_stay_inside_the_target(self):
-        names = ("..", ".", "../../out", "/etc", "a\\b", "C:x", "con", "Lpt1.txt", "dot.", "new\nline")
+        names = ("..", ".", "../../out", "/etc", "a\\b", "C:x", "con", "Lpt1.txt", "dot.", "new\nline", "del\x7f")
         shown = [word for number, name in enumerate(names) for word in ("--efs-show", f"n{number}", name)]
         local = self.add("f", b"1")
         with self.handset(*shown, "--efs-show", "twin", "good"):
@@ -639,7 +643,10 @@ class Files(ToolTest):
                 self.fs(0, "put", "--no-verify", local, f":/{name}")
             os.mkdir(self.path("x"))
             answer = self.fs(11, "get", "-r", ":/", self.path("x"))
-        self.assertEqual(len(answer["left_out"]), len(names) + 1)
+            tree = self.fs(0, "tree")["entries"]
+        # "." and ".." are the directory itself and the one above, in any listing.
+        self.assertEqual(len(answer["left_out"]), len(names) - 1)
+        self.assertEqual(len(tree), len(names))
         self.assertEqual(sorted(os.listdir(self.folder)), ["f", "x"])
         self.assertEqual(os.listdir(self.path("x")), ["good"])
 

@@ -14,7 +14,11 @@ constexpr std::size_t kTextOffset = 8;
 constexpr std::size_t kMostLines = 64;
 
 std::mutex mutex;
-std::deque<std::string> lines;
+struct Line {
+  std::uint32_t flag;
+  std::string text;
+};
+std::deque<Line> lines;
 
 void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   if (record == nullptr || size <= kTextOffset) return;
@@ -28,7 +32,7 @@ void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
       end == nullptr ? room : static_cast<std::size_t>(static_cast<const char*>(end) - (bytes + kTextOffset));
   const std::lock_guard lock(mutex);
   if (lines.size() == kMostLines) lines.pop_front();
-  lines.emplace_back(bytes + kTextOffset, length);
+  lines.push_back({flag, std::string(bytes + kTextOffset, length)});
 }
 
 }  // namespace
@@ -42,9 +46,13 @@ void ForgetErrorLines() {
   lines.clear();
 }
 
-std::vector<std::string> ErrorLines() {
+std::vector<std::string> ErrorLines(std::uint32_t flags) {
   const std::lock_guard lock(mutex);
-  return {lines.begin(), lines.end()};
+  std::vector<std::string> found;
+  for (const Line& line : lines) {
+    if ((line.flag & flags) != 0) found.push_back(line.text);
+  }
+  return found;
 }
 
 }  // namespace kral::tool

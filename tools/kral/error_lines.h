@@ -14,7 +14,8 @@ inline constexpr std::uint32_t kExplainingLines = KRAL_LOG_ERR | KRAL_LOG_RET;
 
 void CollectErrorLines(KRAL_HANDLE handle);  // from now on, through the text-log callback of the handle
 void ForgetErrorLines();                     // before a request
-std::vector<std::string> ErrorLines();       // errors and results since then
+// Those since then, errors and results.
+std::vector<std::string> ErrorLines(std::uint32_t flags = kExplainingLines);
 
 }  // namespace kral::tool
 

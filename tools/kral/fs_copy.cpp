@@ -18,11 +18,6 @@ namespace {
 
 constexpr std::uint64_t kLargestFile = 256u << 20;  // more than handsets hold; what is compared is kept in memory
 
-bool ConcernsOneFile(const ToolError& error) {
-  return error.code() == ExitCode::kRefused || error.code() == ExitCode::kBadFile ||
-         error.code() == ExitCode::kSafetyStop || error.code() == ExitCode::kUsage;
-}
-
 Bytes ReadLocal(const std::string& path) {
   Bytes bytes;
   if (const auto error = ReadWholeFile(path, kLargestFile, bytes)) {
@@ -46,9 +41,13 @@ std::string LowerCase(std::string text) {
 }
 
 // "." and ".." name a folder by where it is.
-bool HasName(std::string_view path) {
-  const auto name = LastName(path);
+bool IsName(std::string_view name) {
   return !name.empty() && name != "." && name != "..";
+}
+
+// Of either side: both join names with '/'.
+bool IsIn(const std::string& folder, const std::string& path) {
+  return path.starts_with(JoinPath(folder, ""));
 }
 
 ToolError UnsafeName(const std::string& where) {
@@ -76,27 +75,27 @@ Copier::~Copier() {
 void Copier::Get(const std::string& source, const std::string& target) {
   const auto status = files_.Status(source);
   auto to = target;
-  if (LookAt(target).kind == LocalKind::kFolder && HasName(source)) {
-    const std::string name(LastName(source));
+  const std::string name(LastEfsName(source));
+  if (LookAt(target).kind == LocalKind::kFolder && IsName(name)) {
     if (!IsSafeLocalName(name)) throw UnsafeName(files_.Where(source));
     to = JoinPath(target, name);
   }
-  if (status.is_directory()) {
-    if (!options_.recursive) throw NeedsRecursion(files_.Where(source));
-    PlanGet(source, to);
-  } else {
+  if (status.is_directory() && !options_.recursive) throw NeedsRecursion(files_.Where(source));
+  const auto plan = [&] {
+    if (status.is_directory()) return PlanGet(source, to);
     AddJob(source, to, status.size, status.size);
-  }
-  Run(MakeLocalFolder, [this](const Job& job) { return GetOne(job); });
+  };
+  Run(plan, MakeLocalFolder, [this](const Job& job) { return GetOne(job); });
 }
 
 // A handset may name its files as it likes: only names that stay inside the target are followed. The limit that
 // paths have in requests ends every descent.
 void Copier::PlanGet(const std::string& source, const std::string& target) {
   progress_.Describe(source);
+  const auto entries = files_.List(source);
   folders_.push_back(target);
   std::set<std::string> taken;  // where the PC does not tell cases apart, the second one would replace the first
-  for (const auto& entry : files_.List(source)) {
+  for (const auto& entry : entries) {
     const auto from = JoinEfs(source, entry.name);
     if (entry.kind == RemoteEntry::Kind::kLink) {
       Leave(from, "links are not copied");
@@ -105,12 +104,7 @@ void Copier::PlanGet(const std::string& source, const std::string& target) {
     } else if (!IsSafeLocalName(entry.name) || !taken.insert(LowerCase(entry.name)).second) {
       Fail(from, UnsafeName(files_.Where(from)));
     } else if (entry.kind == RemoteEntry::Kind::kDirectory) {
-      try {
-        PlanGet(from, JoinPath(target, entry.name));
-      } catch (const ToolError& error) {
-        if (!ConcernsOneFile(error)) throw;
-        Fail(from, error);
-      }
+      Try(from, [&] { PlanGet(from, JoinPath(target, entry.name)); });
     } else {
       AddJob(from, JoinPath(target, entry.name), entry.size, entry.size);
     }
@@ -121,6 +115,10 @@ const char* Copier::GetOne(const Job& job) {
   const auto there = LookAt(job.to);
   if (there.kind == LocalKind::kFolder) {
     throw ToolError(ExitCode::kBadFile, fmt::format("{} is a folder", job.to), "name another file");
+  }
+  if (there.kind == LocalKind::kOther) {  // a device or a pipe, which a new file would replace
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no ordinary file", job.to),
+                    "name another file; kral fs cat prints a file");
   }
   const bool comparable = there.kind == LocalKind::kFile && there.size == job.size && job.size <= kLargestFile;
   if (options_.force || !comparable) {
@@ -141,29 +139,30 @@ const char* Copier::GetOne(const Job& job) {
 void Copier::Put(const std::string& source, const std::string& target) {
   const auto local = LookAt(source);
   const auto there = files_.Find(target);
-  const bool into = there && there->is_directory() && HasName(source);
+  const bool into = there && there->is_directory() && IsName(LastName(source));
   const auto to = into ? JoinEfs(target, LastName(source)) : target;
-  if (local.kind == LocalKind::kFolder) {
-    if (!options_.recursive) throw NeedsRecursion(source);
-    PlanPut(source, to);
-  } else {
+  if (local.kind == LocalKind::kFolder && !options_.recursive) throw NeedsRecursion(source);
+  const auto plan = [&] {
+    if (local.kind == LocalKind::kFolder) return PlanPut(source, to);
     AddJob(source, to, local.size, local.size * (options_.verify ? 2 : 1));
-  }
-  Run([this](const std::string& path) { files_.MakeDirectory(path); }, [this](const Job& job) { return PutOne(job); });
+  };
+  Run(
+      plan, [this](const std::string& path) { files_.MakeDirectory(path); },
+      [this](const Job& job) { return PutOne(job); });
 }
 
 void Copier::PlanPut(const std::string& source, const std::string& target) {
-  folders_.push_back(target);
   std::vector<FolderEntry> entries;
   if (const auto error = ListFolder(source, entries)) {
     throw ToolError(ExitCode::kBadFile, fmt::format("the folder {} cannot be read: {}", source, error.message()),
                     "check its permissions");
   }
+  folders_.push_back(target);
   for (const auto& [name, file] : entries) {
     const auto from = JoinPath(source, name);
     const auto to = JoinEfs(target, name);
     if (file.kind == LocalKind::kFolder) {
-      PlanPut(from, to);
+      Try(from, [&] { PlanPut(from, to); });
     } else if (file.kind == LocalKind::kFile) {
       AddJob(from, to, file.size, file.size * (options_.verify ? 2 : 1));
     } else {
@@ -229,25 +228,68 @@ void Copier::AddJob(std::string from, std::string to, std::uint64_t size, std::u
   progress_.SetTotal(total_);
 }
 
-template <class MakeOne, class CopyOne>
-void Copier::Run(MakeOne&& make_folder, CopyOne&& copy) {
+// What fails for one file or folder only is noted, and no reason to stop.
+template <class Step>
+bool Copier::Try(const std::string& path, Step&& step) {
   try {
-    for (const auto& folder : folders_) make_folder(folder);
-    for (const auto& job : jobs_) {
-      progress_.Describe(job.from);
-      const auto ahead = total_ - base_ - job.moved;  // the bytes of the files behind this one
-      try {
-        const char* const result = copy(job);
-        ++(std::string_view(result) == "equal" ? equal_ : copied_);
-        bytes_ += job.size;
-        rows_.push_back({{"from", job.from}, {"to", job.to}, {"bytes", job.size}, {"result", result}});
-      } catch (const ToolError& error) {
-        if ((jobs_.size() == 1 && failed_ == 0) || !ConcernsOneFile(error)) throw;
-        Fail(job.from, error);
-      }
-      base_ = total_ - ahead;
-      progress_.Update(base_);
+    step();
+    return true;
+  } catch (const ToolError& error) {
+    if (!ConcernsOneFile(error)) throw;
+    Fail(path, error);
+    return false;
+  }
+}
+
+void Copier::Drop(const std::string& folder) {
+  std::erase_if(jobs_, [&](const Job& job) {
+    if (!IsIn(folder, job.to)) return false;
+    total_ -= job.moved;
+    return true;
+  });
+  progress_.SetTotal(total_);
+}
+
+template <class MakeOne>
+void Copier::MakeFolders(MakeOne&& make) {
+  std::optional<std::string> missing;
+  for (const auto& folder : folders_) {
+    if (missing && IsIn(*missing, folder)) continue;
+    if (Try(folder, [&] { make(folder); })) continue;
+    missing = folder;
+    Drop(folder);
+  }
+}
+
+template <class CopyOne>
+void Copier::CopyFiles(CopyOne&& copy) {
+  const bool alone = jobs_.size() == 1 && failed_ == 0;
+  for (const auto& job : jobs_) {
+    progress_.Describe(job.from);
+    const auto ahead = total_ - base_ - job.moved;  // the bytes of the files behind this one
+    const auto copy_one = [&] {
+      const std::string_view result = copy(job);
+      const bool equal = result == "equal";
+      ++(equal ? equal_ : copied_);
+      if (!equal) bytes_ += job.size;
+      rows_.push_back({{"from", job.from}, {"to", job.to}, {"bytes", job.size}, {"result", result}});
+    };
+    if (alone) {
+      copy_one();
+    } else {
+      Try(job.from, copy_one);
     }
+    base_ = total_ - ahead;
+    progress_.Update(base_);
+  }
+}
+
+template <class Plan, class MakeOne, class CopyOne>
+void Copier::Run(Plan&& plan, MakeOne&& make_folder, CopyOne&& copy) {
+  try {
+    plan();
+    MakeFolders(make_folder);
+    CopyFiles(copy);
   } catch (...) {
     context_.found.update(Members());
     throw;

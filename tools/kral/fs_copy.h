@@ -42,9 +42,16 @@ class Copier {
   void PlanGet(const std::string& source, const std::string& target);
   void PlanPut(const std::string& source, const std::string& target);
   void AddJob(std::string from, std::string to, std::uint64_t size, std::uint64_t moved);
-  template <class MakeOne, class CopyOne>
-  void Run(MakeOne&& make_folder, CopyOne&& copy);
-  const char* GetOne(const Job& job);  // the result: "copied" or "equal"
+  template <class Plan, class MakeOne, class CopyOne>
+  void Run(Plan&& plan, MakeOne&& make_folder, CopyOne&& copy);
+  template <class MakeOne>
+  void MakeFolders(MakeOne&& make);
+  template <class CopyOne>
+  void CopyFiles(CopyOne&& copy);
+  template <class Step>
+  bool Try(const std::string& path, Step&& step);  // false when it failed for this path only
+  void Drop(const std::string& folder);            // the jobs in a folder that could not be made
+  const char* GetOne(const Job& job);              // the result: "copied" or "equal"
   const char* PutOne(const Job& job);
 
   bool IsEqual(const std::string& path, const Bytes& bytes);
@@ -67,7 +74,7 @@ class Copier {
 
   Json rows_ = Json::array();
   Json left_ = Json::array();
-  std::uint64_t bytes_ = 0;
+  std::uint64_t bytes_ = 0;  // of the files copied
   std::size_t copied_ = 0;
   std::size_t equal_ = 0;
   std::size_t failed_ = 0;

@@ -1,13 +1,12 @@
 // What can be told of names, modes, times and error numbers without asking a handset.
 #include "tools/kral/fs_names.h"
 
-#include <fmt/chrono.h>
 #include <fmt/format.h>
 
 #include <algorithm>
 #include <array>
 #include <cctype>
-#include <ctime>
+#include <chrono>
 #include <utility>
 
 #include "kral/efs.h"
@@ -99,6 +98,12 @@ std::string_view LastName(std::string_view path) {
   return separator == std::string_view::npos ? path : path.substr(separator + 1);
 }
 
+std::string_view LastEfsName(std::string_view path) {
+  while (path.ends_with('/')) path.remove_suffix(1);
+  const auto separator = path.find_last_of('/');
+  return separator == std::string_view::npos ? path : path.substr(separator + 1);
+}
+
 std::string_view ParentOf(std::string_view path) {
   const auto separator = path.find_last_of('/');
   return separator == std::string_view::npos || separator == 0 ? "/" : path.substr(0, separator);
@@ -106,11 +111,13 @@ std::string_view ParentOf(std::string_view path) {
 
 bool IsSafeLocalName(std::string_view name) {
   if (name.empty() || name.size() > kLongestLocalName || name.back() == '.' || name.back() == ' ') return false;
-  const bool plain = std::all_of(name.begin(), name.end(), [](char character) {
-    return static_cast<unsigned char>(character) >= ' ' &&
-           kReservedCharacters.find(character) == std::string_view::npos;
-  });
-  return plain && !IsDevice(name);  // "." and ".." end with a dot
+  for (std::size_t i = 0; i < name.size(); ++i) {
+    const auto code = static_cast<unsigned char>(name[i]);
+    // Control characters: below the blank, DEL, and in UTF-8 the second range, C2 80 to C2 9F.
+    const bool controls = code < ' ' || code == 0x7F || (code >= 0x80 && code < 0xA0 && i > 0 && name[i - 1] == '\xC2');
+    if (controls || kReservedCharacters.find(name[i]) != std::string_view::npos) return false;
+  }
+  return true && !IsDevice(name);  // "." and ".." end with a dot
 }
 
 std::string ModeText(std::uint32_t mode) {
@@ -120,7 +127,14 @@ std::string ModeText(std::uint32_t mode) {
 }
 
 std::string TimeText(std::uint32_t seconds) {
-  return fmt::format("{:%Y-%m-%d %H:%M:%S}", fmt::gmtime(static_cast<std::time_t>(seconds)));
+  // Not by time_t, which has 32 bits on 32-bit Windows.
+  const std::chrono::sys_seconds time{std::chrono::seconds(std::int64_t{seconds})};
+  const auto day = std::chrono::floor<std::chrono::days>(time);
+  const std::chrono::year_month_day date(day);
+  const std::chrono::hh_mm_ss clock(time - day);
+  return fmt::format("{:04}-{:02}-{:02} {:02}:{:02}:{:02}", static_cast<int>(date.year()),
+                     static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
+                     clock.minutes().count(), clock.seconds().count());
 }
 
 std::string ErrorText(std::uint32_t error_number) {

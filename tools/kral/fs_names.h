@@ -14,8 +14,9 @@ std::string EfsPath(std::string_view argument);
 bool IsEfsArgument(std::string_view argument);  // with a colon
 
 std::string JoinEfs(std::string_view folder, std::string_view name);
-std::string_view LastName(std::string_view path);  // of either side; empty for a root
-std::string_view ParentOf(std::string_view path);  // of the handset's side; "/" at the top
+std::string_view LastEfsName(std::string_view path);  // empty for the root
+std::string_view LastName(std::string_view path);     // of the PC's side; empty for a root
+std::string_view ParentOf(std::string_view path);     // of the handset's side; "/" at the top
 
 // Whether a name that the handset gave can be a file inside a folder of the PC, and of no other place. The rule is the
 // same on both homes: what was fetched on one can be taken to the other.

@@ -6,6 +6,9 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
 #include <utility>
 
 #include "tools/kral/error_lines.h"
@@ -17,7 +20,9 @@ namespace kral::tool {
 namespace {
 
 constexpr std::uint32_t kNoSuchFile = 2;
-constexpr std::size_t kMostEntries = 1'000'000;  // of one directory; more is a handset gone wrong
+constexpr std::uint32_t kExists = 6;
+constexpr std::size_t kMostEntries = 200'000;  // of all directories that a verb lists; more is a handset gone wrong
+constexpr std::chrono::milliseconds kInterruptPoll{100};
 
 // The callbacks carry the handle and nothing else.
 RemoteFiles* current = nullptr;
@@ -58,7 +63,7 @@ std::uint32_t NumberAfter(std::string_view line, std::size_t at) {
   return number;
 }
 
-RemoteEntry::Kind KindOf(const KRAL_EFS_ENTRY& entry) {
+RemoteEntry::Kind KindOfEntry(const KRAL_EFS_ENTRY& entry) {
   if (entry.type == KRAL_EFS_ENTRY_FILE) return RemoteEntry::Kind::kFile;
   if (entry.type == KRAL_EFS_ENTRY_LINK) return RemoteEntry::Kind::kLink;
   // Kinds that the handset alone knows are reported as directories, too.
@@ -68,8 +73,18 @@ RemoteEntry::Kind KindOf(const KRAL_EFS_ENTRY& entry) {
 
 }  // namespace
 
+bool ConcernsOneFile(const ToolError& error) {
+  return error.code() == ExitCode::kRefused || error.code() == ExitCode::kBadFile ||
+         error.code() == ExitCode::kSafetyStop || error.code() == ExitCode::kUsage;
+}
+
 bool RemoteStatus::is_directory() const {
   return (mode & KRAL_EFS_MODE_KIND) == 0x4000;
+}
+RemoteEntry::Kind RemoteStatus::kind() const {
+  const auto kind = mode & KRAL_EFS_MODE_KIND;
+  if (is_directory()) return RemoteEntry::Kind::kDirectory;
+  return is_item() || kind == 0x8000 || kind == 0 ? RemoteEntry::Kind::kFile : RemoteEntry::Kind::kOther;
 }
 bool RemoteStatus::is_item() const {
   return (mode & KRAL_EFS_MODE_KIND) == KRAL_EFS_MODE_ITEM_FILE;
@@ -78,11 +93,24 @@ bool RemoteStatus::is_item() const {
 RemoteFiles::RemoteFiles(const SessionOptions& options) : session_(options) {
   current = this;
   KRAL_ConfigureEfs2CallBacks(session_.handle(), &RemoteFiles::OnChunk, &RemoteFiles::OnEntry);
+  interrupt_watch_ =
+      std::jthread([handle = session_.handle()](const std::stop_token& stop) { AbortWhenInterrupted(stop, handle); });
 }
 
 RemoteFiles::~RemoteFiles() {
   KRAL_ConfigureEfs2CallBacks(session_.handle(), nullptr, nullptr);
   current = nullptr;
+}
+
+// A silent handset brings no callback in which Ctrl-C could be seen. The abort is repeated: what begins in that moment
+// forgets it.
+void RemoteFiles::AbortWhenInterrupted(const std::stop_token& stop, KRAL_HANDLE handle) {
+  std::mutex mutex;
+  std::condition_variable_any stopped;
+  std::unique_lock lock(mutex);
+  while (!stopped.wait_for(lock, stop, kInterruptPoll, [&] { return stop.stop_requested(); })) {
+    if (Interrupted()) KRAL_AbortEFS_Operation(handle);
+  }
 }
 
 void KRAL_CALL RemoteFiles::OnChunk(std::uintptr_t, std::uintptr_t, std::uint32_t, std::uint32_t, std::uint32_t done,
@@ -92,14 +120,16 @@ void KRAL_CALL RemoteFiles::OnChunk(std::uintptr_t, std::uintptr_t, std::uint32_
 }
 
 void KRAL_CALL RemoteFiles::OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle) {
-  if (current == nullptr || Interrupted() || current->entries_.size() >= kMostEntries) {
+  if (current == nullptr || Interrupted() || current->entry_count_ >= kMostEntries) {
     KRAL_AbortEFS_Operation(handle);
     return;
   }
+  ++current->entry_count_;
   // The full path begins with the directory; what follows is the handset's, slashes included.
   std::string_view name = entry->name;
   name.remove_prefix(std::min(name.size(), JoinEfs(current->listed_, "").size()));
-  current->entries_.push_back({KindOf(*entry), std::string(name), entry->mode, entry->size, entry->modify_time});
+  if (name == "." || name == "..") return;
+  current->entries_.push_back({KindOfEntry(*entry), std::string(name), entry->mode, entry->size, entry->modify_time});
 }
 
 std::string RemoteFiles::Where(std::string_view path) const {
@@ -114,7 +144,8 @@ ToolError RemoteFiles::Refusal(std::string_view what, std::uint32_t error_number
 
 ToolError RemoteFiles::Explain(std::string_view what) const {
   if (Interrupted()) return InterruptedError();
-  const auto lines = ErrorLines();
+  // Not the results: they carry paths, which may read like any of the reasons.
+  const auto lines = ErrorLines(KRAL_LOG_ERR);
   // The last word counts: a try that was refused may have been followed by one that got no answer.
   for (auto line = lines.rbegin(); line != lines.rend(); ++line) {
     if (line->find("Request timed out") != std::string::npos) break;
@@ -163,8 +194,15 @@ RemoteStatus RemoteFiles::Status(const std::string& path) {
 std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
   listed_ = path;
   entries_.clear();
-  Transfer(fmt::format("the listing of {}", Printable(path)),
-           [&] { return KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr); });
+  const auto what = fmt::format("the listing of {}", Printable(path));
+  session_.Begin();
+  if (KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr) == 0) {
+    if (Interrupted() || entry_count_ < kMostEntries) throw Explain(what);
+    throw ToolError(
+        ExitCode::kLink,
+        fmt::format("{} on {} does not end: {} entries so far", what, DescribePort(session_.port()), entry_count_),
+        "a handset that gives entries without end needs a restart; list its directories one by one");
+  }
   std::sort(entries_.begin(), entries_.end(),
             [](const RemoteEntry& left, const RemoteEntry& right) { return left.name < right.name; });
   return std::move(entries_);
@@ -174,8 +212,11 @@ void RemoteFiles::MakeDirectory(const std::string& path) {
   const auto what = fmt::format("the making of directory {}", Printable(path));
   std::uint32_t error = 0;
   session_.Begin();
-  if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) != 0) return;
-  throw error != 0 ? Refusal(what, error) : Explain(what);
+  if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) == 0) {
+    throw error != 0 ? Refusal(what, error) : Explain(what);
+  }
+  // The handset says the same of a file in the way.
+  if (error == kExists && !Status(path).is_directory()) throw Refusal(what, kExists);
 }
 
 void RemoteFiles::MakeParents(const std::string& path) {

@@ -8,11 +8,21 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <thread>
 #include <vector>
 
 #include "tools/kral/session.h"
 
 namespace kral::tool {
+
+struct RemoteEntry {
+  enum class Kind { kFile, kDirectory, kLink, kOther };
+  Kind kind = Kind::kOther;
+  std::string name;  // as the handset gave it: it may hold anything but a zero
+  std::uint32_t mode = 0;
+  std::uint32_t size = 0;
+  std::uint32_t modified = 0;
+};
 
 struct RemoteStatus {
   std::uint32_t mode = 0;
@@ -24,21 +34,16 @@ struct RemoteStatus {
 
   bool is_directory() const;
   bool is_item() const;
+  RemoteEntry::Kind kind() const;  // never a link, which is followed
 };
 
-struct RemoteEntry {
-  enum class Kind { kFile, kDirectory, kLink, kOther };
-  Kind kind = Kind::kOther;
-  std::string name;  // as the handset gave it: it may hold anything but a zero
-  std::uint32_t mode = 0;
-  std::uint32_t size = 0;
-  std::uint32_t modified = 0;
-};
+// Whether others may still be copied or looked at after it.
+bool ConcernsOneFile(const ToolError& error);
 
 using Bytes = std::vector<std::uint8_t>;
 
 // One at a time: the library's callbacks know the connection only. Ctrl-C ends a transfer or listing at its next
-// packet.
+// packet, or after the time-out of one that is not answered.
 class RemoteFiles {
  public:
   // Called with the bytes moved by the transfer under way.
@@ -55,7 +60,7 @@ class RemoteFiles {
 
   std::optional<RemoteStatus> Find(const std::string& path);  // nothing when there is no such file
   RemoteStatus Status(const std::string& path);
-  std::vector<RemoteEntry> List(const std::string& path);  // by name
+  std::vector<RemoteEntry> List(const std::string& path);  // by name, without "." and ".."
 
   // A request whose answer is an error number; `what` names it, such as "the removal of /a".
   void Ask(std::string_view what, const std::function<std::uint8_t(std::uint32_t* error_number)>& request);
@@ -74,6 +79,7 @@ class RemoteFiles {
   static void KRAL_CALL OnChunk(std::uintptr_t source, std::uintptr_t destination, std::uint32_t operation,
                                 std::uint32_t reserved, std::uint32_t done, std::uint32_t total, KRAL_HANDLE handle);
   static void KRAL_CALL OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle);
+  static void AbortWhenInterrupted(const std::stop_token& stop, KRAL_HANDLE handle);
   template <class Request>
   void Transfer(std::string_view what, Request&& request);
   ToolError Refusal(std::string_view what, std::uint32_t error_number) const;
@@ -82,6 +88,8 @@ class RemoteFiles {
   Watch watch_;
   std::string listed_;  // the directory whose entries arrive
   std::vector<RemoteEntry> entries_;
+  std::size_t entry_count_ = 0;   // of everything listed
+  std::jthread interrupt_watch_;  // last: it uses the connection
 };
 
 }  // namespace kral::tool

@@ -50,8 +50,7 @@ const char* NameOf(RemoteEntry::Kind kind) {
 }
 
 const char* KindName(const RemoteStatus& status) {
-  if (status.is_directory()) return "directory";
-  return status.is_item() ? "item" : "file";
+  return status.is_item() ? "item" : NameOf(status.kind());
 }
 
 Json Describe(const RemoteEntry& entry) {
@@ -77,8 +76,7 @@ void List(Context& context, RemoteFiles& files, const FsOptions& options) {
   if (const auto status = files.Status(path); status.is_directory()) {
     entries = files.List(path);
   } else {
-    entries.push_back(
-        {RemoteEntry::Kind::kFile, std::string(LastName(path)), status.mode, status.size, status.modified});
+    entries.push_back({status.kind(), std::string(LastEfsName(path)), status.mode, status.size, status.modified});
   }
   Json rows = Json::array();
   std::string text;
@@ -89,7 +87,8 @@ void List(Context& context, RemoteFiles& files, const FsOptions& options) {
   context.out.Result({{"port", files.session().port()}, {"path", path}, {"entries", rows}}, text);
 }
 
-// Draws what is in a directory below its own line; links are shown and not followed.
+// Draws what is in a directory below its own line; links are shown and not followed, nor are names that would lead
+// elsewhere. A directory that cannot be listed is marked.
 Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent, std::string& text) {
   Json rows = Json::array();
   const auto entries = files.List(path);
@@ -99,8 +98,14 @@ Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent
     const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
     text += fmt::format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", Printable(entry.name), is_directory ? "/" : "");
     rows.push_back(Describe(entry));
-    if (is_directory) {
-      rows.back()["entries"] = Draw(files, JoinEfs(path, entry.name), indent + (last ? "    " : "|   "), text);
+    if (!is_directory || entry.name.find('/') != std::string::npos) continue;
+    const auto inner = indent + (last ? "    " : "|   ");
+    try {
+      rows.back()["entries"] = Draw(files, JoinEfs(path, entry.name), inner, text);
+    } catch (const ToolError& error) {
+      if (!ConcernsOneFile(error)) throw;
+      rows.back()["error"] = error.what();
+      text += fmt::format("{}`-- [{}]\n", inner, error.what());
     }
   }
   return rows;
@@ -220,7 +225,7 @@ void MakeDirectories(Context& context, RemoteFiles& files, const FsOptions& opti
 void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto from = EfsPath(options.paths[0]);
   auto to = EfsPath(options.paths[1]);
-  if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastName(from));
+  if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
   files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
   });

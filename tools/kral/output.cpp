@@ -43,7 +43,12 @@ void Output::Stream(const Json& members, std::string_view text) const {
 }
 
 void Output::Note(std::string_view text) const {
-  fmt::print(stderr, "kral: {}\n", text);
+  if (json_) {
+    const Json object{{"event", "note"}, {"text", text}};
+    fmt::print(stderr, "{}\n", object.dump(-1, ' ', false, Json::error_handler_t::replace));
+  } else {
+    fmt::print(stderr, "kral: {}\n", text);
+  }
 }
 
 void Output::Failure(const ToolError& error, const Json& members) const {

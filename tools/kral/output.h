@@ -26,7 +26,7 @@ class Output {
   // last.
   void Stream(const Json& members, std::string_view text) const;
 
-  // Something worth knowing that is not the result.
+  // Something worth knowing that is not the result; with --json an object with the member "event", as progress is.
   void Note(std::string_view text) const;
 
   // The end of a failed verb. `members` is what was found out before it failed, if anything.
