@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cstdint>
 #include <deque>
+#include <optional>
 #include <vector>
 
 #include "kral/download.h"
@@ -28,7 +29,7 @@ struct FtmSettings {
   FtmSequencer* sequencer = nullptr;  // not owned; none: every request goes out at once
 };
 
-// Of the boot transfer. Set from any thread; what has begun goes on with the former values.
+// Of the boot transfer. The atomic ones are set from any thread; what has begun goes on with the former values.
 struct KivratSettings {
   std::atomic<uint32_t> hello_retries{0};
   std::atomic<uint32_t> retry_delay_ms{500};
@@ -37,7 +38,15 @@ struct KivratSettings {
   uint32_t settle_ms = 500;
 };
 
-// Set from any thread, also while a transfer runs.
+// Files or directories that the handset keeps open for this library.
+struct EfsOpenHandles {
+  std::optional<uint32_t> in_use;
+  uint32_t unanswered = 0;       // opening requests whose answers may still come, and tell of further handles
+  std::vector<uint32_t> strays;  // opened by such requests, to be closed
+};
+
+// The atomic ones are set from any thread, also while a transfer runs; the others belong to whoever holds the request
+// lock.
 struct EfsSettings {
   std::atomic<uint16_t> read_packet_size{536};
   std::atomic<uint16_t> write_packet_size{524};
@@ -46,6 +55,8 @@ struct EfsSettings {
   std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
   std::atomic<KRAL_HANDLE> callback_context{0};
   uint32_t packet_time_out_ms = 2000;  // of writes, listings and mkdir; shorter in tests only
+  EfsOpenHandles files;
+  EfsOpenHandles directories;
 };
 
 struct NvQueueItem {

@@ -29,6 +29,7 @@ using handset::ByteView;
 
 constexpr uint8_t kSubsystem = 19;
 constexpr uint16_t kLastCommand = 53;
+constexpr uint8_t kRefusal = 19;
 constexpr int kMostAnswers = 300;     // of one input
 constexpr int32_t kTimeOutMs = 2000;  // every request is answered
 
@@ -45,6 +46,8 @@ class LyingHandset {
         const Bytes answer = Answer(request);
         Note(request, answer);
         wire.Send(answer);
+        // The right answer is waited for behind a foreign one: it is a refusal.
+        if (answer.front() != kRefusal && !IsOwn(request, answer)) wire.Send({kRefusal});
       });
     }
     handle_ = KRAL_ConnectServer_UserDefinedTransport(
@@ -69,8 +72,14 @@ class LyingHandset {
     return {};
   }
 
+  static bool IsOwn(ByteView request, ByteView answer) {
+    const Bytes recognised = Recognised(request, request[2]);
+    return answer.size() >= 4 + recognised.size() && std::equal(request.begin(), request.begin() + 4, answer.begin()) &&
+           std::equal(recognised.begin(), recognised.end(), answer.begin() + 4);
+  }
+
   Bytes Answer(ByteView request) {
-    if (rest_.size() < 2 || ++answers_ > kMostAnswers) return {19};
+    if (rest_.size() < 2 || ++answers_ > kMostAnswers) return {kRefusal};
     const uint8_t control = rest_[0];
     const size_t count = std::min<size_t>(rest_[1] * ((control & 4) != 0 ? 16u : 1u), rest_.size() - 2);
     handset::ByteWriter answer;

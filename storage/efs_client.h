@@ -22,20 +22,17 @@ bool WriteFromMemory(Diag_FTM& phone, const uint8_t* buffer, uint32_t size, cons
 bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool ReadToMemory(Diag_FTM& phone, const char* efs_file, uint8_t* buffer, uint32_t* size);
 
-// --- Item files (efs_item.cpp)
-// ----------------------------------------------------------------------------------------
+// --- Item files (efs_item.cpp) ---------------------------------------------------------------------------------------
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const uint8_t* buffer, uint32_t size);
 bool GetItemToFile(Diag_FTM& phone, const char* local_file, const char* efs_file, uint32_t length);
 
-// --- Directories (efs_directory.cpp, efs_names.cpp)
-// ----------------------------------------------------------------------------------
+// --- Directories (efs_directory.cpp, efs_names.cpp) ------------------------------------------------------------------
 bool ListDirectory(Diag_FTM& phone, const char* folder, uint8_t filter, KRAL_EFS_ENTRY* entries, uint32_t* count);
 bool MakeDirectory(Diag_FTM& phone, const char* folder, uint32_t* error_number);
 bool RemoveDirectory(Diag_FTM& phone, const char* folder, uint32_t* error_number);
 
-// --- Names and files, one request each (efs_names.cpp)
-// -----------------------------------------------------------------
+// --- Names and files, one request each (efs_names.cpp) ---------------------------------------------------------------
 struct FileStatus {
   uint32_t error_number = 0;
   uint32_t mode = 0;
@@ -67,8 +64,7 @@ bool Rename(Diag_FTM& phone, const char* old_path, const char* new_path, uint32_
 bool ChangeMode(Diag_FTM& phone, const char* path, uint16_t mode, uint32_t* error_number);
 bool Access(Diag_FTM& phone, const char* path, uint16_t permission_bits, uint32_t* error_number);
 
-// --- The file system (efs_file_system.cpp, efs_sync.cpp)
-// ----------------------------------------------------------------
+// --- The file system (efs_file_system.cpp, efs_sync.cpp) -------------------------------------------------------------
 bool FileSystemStatus(Diag_FTM& phone, const char* path, uint32_t* error_number, KRAL_EFS_STATFS* status);
 bool UsedSpace(Diag_FTM& phone, const char* path, uint64_t* used);
 bool DeviceInfo(Diag_FTM& phone, uint32_t* error_number, KRAL_EFS_DEVICE_INFO* info);

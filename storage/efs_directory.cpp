@@ -32,11 +32,16 @@ bool IsSelected(u32 type, uint8_t filter) {
   return filter <= KRAL_EFS_FILTER_LINKS && type == filter;
 }
 
-// Nothing when the reply is another entry's, tells an error, or has a name without end.
-std::optional<Entry> ParseEntry(std::span<const u8> reply, u32 directory, u32 sequence) {
+// Nothing (logged) when the reply tells an error, or has a name without end.
+std::optional<Entry> ParseEntry(Diag_FTM& phone, std::span<const u8> reply) {
   auto name = TextAt(reply, entry::kName);
-  if (!name || LoadLe<u32>(reply, kHandleAt) != directory || LoadLe<u32>(reply, entry::kSequence) != sequence ||
-      LoadLe<u32>(reply, entry::kError) != kDone) {
+  if (const u32 error = LoadLe<u32>(reply, entry::kError).value_or(kDone); error != kDone) {
+    phone.log().WriteLine(kLogErr, "EFS Readdir error code %u", error);
+    return std::nullopt;
+  }
+  if (!name) {
+    phone.log().WriteLine(kLogErr, "EFS Readdir reply of %u bytes has no name with an end",
+                          static_cast<u32>(reply.size()));
     return std::nullopt;
   }
   const auto field = [&](size_t offset) { return *LoadLe<u32>(reply, offset); };
@@ -53,15 +58,20 @@ std::optional<Entry> ParseEntry(std::span<const u8> reply, u32 directory, u32 se
 std::optional<Entry> ReadEntry(Diag_FTM& phone, u32 directory, u32 sequence) {
   Compose(phone, kReadDirectory, directory, sequence);
   std::optional<Entry> read;
-  ExchangeUntil(phone, PacketTimeOut(phone), [&](std::span<const u8> reply) {
-    read = ParseEntry(reply, directory, sequence);
+  const auto is_own = [&](std::span<const u8> reply) {
+    return LoadLe<u32>(reply, kHandleAt) == directory && LoadLe<u32>(reply, entry::kSequence) == sequence;
+  };
+  ExchangeUntil(phone, PacketTimeOut(phone), is_own, [&](std::span<const u8> reply) {
+    read = ParseEntry(phone, reply);
     return read.has_value();
   });
   return read;
 }
 
 bool SetFullName(KRAL_EFS_ENTRY& record, const std::string& folder, const std::string& name) {
-  const std::string full = folder + (folder.back() == '/' ? "" : "/") + name;
+  std::string full = folder;
+  if (full.back() != '/') full += '/';
+  full += name;
   if (full.size() >= sizeof(record.name)) return false;
   std::memcpy(record.name, full.c_str(), full.size() + 1);
   return true;
@@ -73,12 +83,19 @@ bool List(Diag_FTM& phone, const std::string& folder, uint8_t filter, KRAL_EFS_E
   const u32 room = entries == nullptr || count == nullptr ? 0 : *count;
   u32 selected = 0;
   for (u32 sequence = kFirstEntry;; ++sequence) {
-    if (phone.efs().abort) return false;
+    if (IsAborted(phone, "Readdir")) return false;
     auto read = ReadEntry(phone, directory.value(), sequence);
-    if (!read) return false;
+    if (!read) {
+      IsAborted(phone, "Readdir");
+      return false;
+    }
     if (read->name.empty()) break;
     if (!IsSelected(read->type, filter)) continue;
-    if (!SetFullName(read->record, folder, read->name)) return false;
+    if (!SetFullName(read->record, folder, read->name)) {
+      phone.log().WriteLine(kLogErr, "EFS Readdir name of %u bytes does not fit behind its directory",
+                            static_cast<u32>(read->name.size()));
+      return false;
+    }
     if (selected < room) entries[selected] = read->record;
     ++selected;
     if (const auto callback = phone.efs().directory_callback.load()) {

@@ -6,24 +6,21 @@
 #include "commands/outputs.h"
 #include "storage/efs_client.h"
 #include "storage/efs_request.h"
+#include "storage/efs_transfer.h"
 
 namespace kral::efs {
-namespace {
 
-// False also when the reply is too short for its fields.
-bool AskStatus(Diag_FTM& phone, const char* path, u32& error, KRAL_EFS_STATFS& status) {
-  if (!Ask(phone, kFileSystemStatus, PathField(path))) return false;
+bool AskStatus(Diag_FTM& phone, Tries tries, const char* path, u32& error, KRAL_EFS_STATFS& status) {
+  if (!Ask(phone, tries, kFileSystemStatus, PathField(path))) return false;
   return ReadFromEnd(phone, {&status.max_file_count, &status.file_count, &status.max_file_size, &status.free_blocks,
                              &status.available_blocks, &status.total_blocks, &status.block_size, &status.type,
                              &status.file_system_id, &error});
 }
 
-}  // namespace
-
 bool FileSystemStatus(Diag_FTM& phone, const char* path, u32* error_number, KRAL_EFS_STATFS* status) {
   u32 error = 0;
   KRAL_EFS_STATFS answer{};
-  if (!AskStatus(phone, path, error, answer)) return false;
+  if (!AskStatus(phone, Tries::kOne, path, error, answer)) return false;
   if (error == kDone) Put(status, answer);
   Put(error_number, error);
   return true;
@@ -32,7 +29,7 @@ bool FileSystemStatus(Diag_FTM& phone, const char* path, u32* error_number, KRAL
 bool UsedSpace(Diag_FTM& phone, const char* path, uint64_t* used) {
   u32 error = 0;
   KRAL_EFS_STATFS status{};
-  if (!AskStatus(phone, path, error, status)) return false;
+  if (!AskStatus(phone, Tries::kOne, path, error, status)) return false;
   if (error != kDone) {
     phone.log().WriteLine(kLogErr, "EFS Command Returned Error Number: %d, Verify file/directory exists",
                           static_cast<int>(error));

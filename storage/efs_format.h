@@ -53,6 +53,7 @@ inline constexpr size_t kLongestItemPath = kLongestGetRequest - kGetRequestOverh
 inline constexpr size_t kLongestReply = 4091;  // the de-framer drops longer ones
 inline constexpr size_t kReadOverhead = 20;    // of a read reply, beside the data
 inline constexpr size_t kWriteOverhead = 12;   // of a write request
+inline constexpr u32 kMostGrowth = 1 << 20;    // of a file while it is read, beyond the size that its status told
 inline constexpr int kTries = 5;
 
 // --- Request values -------------------------------------------------------------------------------------------------
@@ -66,15 +67,14 @@ inline constexpr u32 kItemFlags = 0x00080040;
 inline constexpr u16 kItemSequence = 1;
 inline constexpr u32 kFirstEntry = 1;
 
-// --- Error numbers that the library acts on
-// ---------------------------------------------------------------------------
+// --- Error numbers that the library acts on -------------------------------------------------------------------------
 
 inline constexpr u32 kDone = 0;
+inline constexpr u32 kMissing = 2;
 inline constexpr u32 kExists = 6;
 inline constexpr u32 kBadDescriptor = 9;
 
-// --- Replies
-// ----------------------------------------------------------------------------------------------------------
+// --- Replies --------------------------------------------------------------------------------------------------------
 
 inline constexpr size_t kErrorBehindHeader = 4;  // of close, mkdir, read link, device and extended info, sync
 inline constexpr size_t kHandleAt = 4;           // descriptor or directory handle: open, read, write, opendir, readdir

@@ -8,7 +8,7 @@ namespace kral::efs {
 
 class RemoteHandle {
  public:
-  ~RemoteHandle() { Close(); }
+  ~RemoteHandle();
   RemoteHandle(const RemoteHandle&) = delete;
   RemoteHandle& operator=(const RemoteHandle&) = delete;
 
@@ -16,8 +16,8 @@ class RemoteHandle {
   u32 value() const { return value_; }
 
  protected:
-  RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 time_out_ms)
-      : phone_(phone), close_(close), time_out_ms_(time_out_ms) {}
+  RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, EfsOpenHandles& handles, u32 time_out_ms)
+      : phone_(phone), close_(close), handles_(handles), time_out_ms_(time_out_ms) {}
 
   // Sends the opening request that the phone's packet buffer holds.
   bool OpenWithRequest();
@@ -25,10 +25,8 @@ class RemoteHandle {
   Diag_FTM& phone_;
 
  private:
-  void CloseStrays(int unanswered);
-  bool CloseValue(u32 value);
-
   const EfsRequest<u32> close_;
+  EfsOpenHandles& handles_;  // of this kind
   const u32 time_out_ms_;
   u32 value_ = 0;
   bool open_ = false;
@@ -37,6 +35,8 @@ class RemoteHandle {
 class RemoteFile final : public RemoteHandle {
  public:
   explicit RemoteFile(Diag_FTM& phone);
+  // Whether its path leaves the opening request short enough. A failure is logged; nothing is sent.
+  static bool CanOpen(Diag_FTM& phone, const char* path);
   bool Open(const char* path, u32 flags, u32 mode);  // a failure is logged
 };
 

@@ -30,7 +30,7 @@ bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const u8* buffer, 
   u32 error = 0;
   if (!Exchange(phone, DefaultTimeOut(phone)) || !ReadFromEnd(phone, {&error})) return false;
   if (error == kDone) return true;
-  phone.log().WriteLine(kLogErr, "EFS Put item error code %d", static_cast<int>(error));
+  phone.log().WriteLine(kLogErr, "EFS Put item error code %u", error);
   return false;
 }
 
@@ -49,14 +49,15 @@ bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_fi
   return PutItemFromMemory(phone, efs_file, data.data(), static_cast<u32>(data.size()));
 }
 
-bool GetItem(Diag_FTM& phone, const char* efs_file, u32 length, const TransferEnds& ends, std::vector<u8>& data) {
+bool GetItem(Diag_FTM& phone, Tries tries, const char* efs_file, u32 length, const TransferEnds& ends,
+             std::vector<u8>& data) {
   const Path path = PathField(efs_file);
   if (!IsPathWithinLimit(phone, path)) return false;
   Compose(phone, kGetItem, length, static_cast<u32>(path.size()), kItemSequence, path);
   const CDiagPacket& packet = phone.packet();
   u32 count = 0;
   u32 error = 0;
-  if (!Exchange(phone, DefaultTimeOut(phone)) || !packet.ResponseAt32(kItemCount, count) ||
+  if (!AskComposed(phone, tries) || !packet.ResponseAt32(kItemCount, count) ||
       !packet.ResponseAt32(kItemError, error)) {
     return false;
   }
@@ -72,7 +73,7 @@ bool GetItem(Diag_FTM& phone, const char* efs_file, u32 length, const TransferEn
   }
   const auto content = reply.subspan(kItemData, count);
   data.assign(content.begin(), content.end());
-  phone.log().WriteLine(kLogRet, " EFS Get Transferred %d", static_cast<int>(count));
+  phone.log().WriteLine(kLogRet, " EFS Get Transferred %u", count);
   Report(phone, ends, KRAL_EFS_OPERATION_GET_ITEM, count, length);
   return true;
 }
@@ -84,7 +85,8 @@ bool GetItemToFile(Diag_FTM& phone, const char* local_file, const char* efs_file
     return false;
   }
   std::vector<u8> data;
-  if (!GetItem(phone, efs_file, length, {AddressOf(efs_file), AddressOf(local_file)}, data)) return false;
+  const TransferEnds ends{AddressOf(efs_file), AddressOf(local_file)};
+  if (!GetItem(phone, Tries::kOne, efs_file, length, ends, data)) return false;
   if (!ReplaceWholeFile(local_file, data)) return true;
   phone.log().WriteLine(kLogErr, "Failed to write item file data to the local file: '%s'", local_file);
   return false;

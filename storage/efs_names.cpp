@@ -4,6 +4,7 @@
 #include "commands/outputs.h"
 #include "storage/efs_client.h"
 #include "storage/efs_request.h"
+#include "storage/efs_transfer.h"
 
 namespace kral::efs {
 namespace {
@@ -18,14 +19,8 @@ bool AskForError(Diag_FTM& phone, u32* error_number, const EfsRequest<Fields...>
   return true;
 }
 
-}  // namespace
-
-bool FileStatus::is_item_file() const {
-  return exists() && (mode & kModeKind) == kItemFile;
-}
-
-bool Stat(Diag_FTM& phone, const char* path, FileStatus& status) {
-  if (!Ask(phone, kStat, PathField(path))) return false;
+bool AskStat(Diag_FTM& phone, Tries tries, const char* path, FileStatus& status) {
+  if (!Ask(phone, tries, kStat, PathField(path))) return false;
   FileStatus s;
   if (!ReadFromEnd(
           phone, {&s.change_time, &s.modify_time, &s.access_time, &s.link_count, &s.size, &s.mode, &s.error_number})) {
@@ -39,6 +34,20 @@ bool Stat(Diag_FTM& phone, const char* path, FileStatus& status) {
                         path == nullptr ? "" : path, s.error_number, s.mode, s.size, s.link_count, s.access_time,
                         s.modify_time, s.change_time);
   return true;
+}
+
+}  // namespace
+
+bool FileStatus::is_item_file() const {
+  return exists() && (mode & kModeKind) == kItemFile;
+}
+
+bool Stat(Diag_FTM& phone, const char* path, FileStatus& status) {
+  return AskStat(phone, Tries::kOne, path, status);
+}
+
+bool StatInTransfer(Diag_FTM& phone, const char* path, FileStatus& status) {
+  return AskStat(phone, Tries::kTransfer, path, status);
 }
 
 bool StatInto(Diag_FTM& phone, const char* path, const StatOutputs& outputs) {

@@ -17,7 +17,7 @@ struct Sink {
 };
 
 bool StatExisting(Diag_FTM& phone, const char* efs_file, FileStatus& status) {
-  if (!Stat(phone, efs_file, status)) return false;
+  if (!StatInTransfer(phone, efs_file, status)) return false;
   if (status.exists()) return true;
   phone.log().WriteLine(kLogErr, "EFS Read error code %d", static_cast<int>(status.error_number));
   return false;
@@ -28,12 +28,10 @@ std::optional<std::span<const u8>> ReadChunk(Diag_FTM& phone, u32 descriptor, u3
   Compose(phone, kRead, descriptor, wanted, offset);
   u32 error = 0;
   u32 count = 0;
-  const bool accepted = ExchangeUntil(phone, DefaultTimeOut(phone), [&](std::span<const u8> reply) {
+  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset); };
+  const bool accepted = ExchangeUntil(phone, DefaultTimeOut(phone), is_own, [&](std::span<const u8> reply) {
     const auto error_field = LoadLe<u32>(reply, kTransferError);
-    // The answer to an earlier packet, come late, tells another offset.
-    if (!error_field || LoadLe<u32>(reply, kHandleAt) != descriptor || LoadLe<u32>(reply, kTransferOffset) != offset) {
-      return false;
-    }
+    if (!error_field) return false;
     error = *error_field;
     count = *LoadLe<u32>(reply, kTransferCount);
     return error != kDone || (count <= wanted && count <= reply.size() - kReadData);
@@ -57,16 +55,25 @@ bool ReadChunks(Diag_FTM& phone, u32 descriptor, u32 total, const Sink& sink) {
   }
   u32 offset = 0;
   for (bool full = true; full;) {
-    if (phone.efs().abort) return false;
+    if (IsAborted(phone, "Read")) return false;
     const auto chunk = ReadChunk(phone, descriptor, wanted, offset);
-    if (!chunk || chunk->size() > UINT32_MAX - offset || !sink.write(*chunk)) return false;
+    if (!chunk) {
+      IsAborted(phone, "Read");
+      return false;
+    }
     const auto count = static_cast<u32>(chunk->size());
+    // A file that is being written may grow; one without end would fill the disk of the PC.
+    if (uint64_t{offset} + count > std::min<uint64_t>(uint64_t{total} + kMostGrowth, UINT32_MAX)) {
+      phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes that the handset told, by far", total);
+      return false;
+    }
+    if (!sink.write(*chunk)) return false;
     full = count == wanted;
     offset += count;
-    phone.log().WriteLine(kLogRet, " EFS Read Transferred %d", static_cast<int>(offset));
+    phone.log().WriteLine(kLogRet, " EFS Read Transferred %u", offset);
     Report(phone, sink.ends, KRAL_EFS_OPERATION_READ, offset, total);
   }
-  if (offset >= total) return !phone.efs().abort;
+  if (offset >= total) return !IsAborted(phone, "Read");
   phone.log().WriteLine(kLogErr, "EFS Read ended at %u of %u bytes", offset, total);
   return false;
 }
@@ -77,11 +84,14 @@ bool ReadItem(Diag_FTM& phone, const char* efs_file, u32 size, const Sink& sink)
     phone.log().WriteLine(kLogErr, "EFS Read of an item file of %u bytes", size);
     return false;
   }
-  if (!GetItem(phone, efs_file, size, sink.ends, data)) return false;
-  return data.size() == size && sink.open() && sink.write(data);
+  if (!GetItem(phone, Tries::kTransfer, efs_file, size, sink.ends, data) || IsAborted(phone, "Read")) return false;
+  if (data.size() == size) return sink.open() && sink.write(data);
+  phone.log().WriteLine(kLogErr, "EFS Read ended at %u of %u bytes", static_cast<u32>(data.size()), size);
+  return false;
 }
 
 bool Read(Diag_FTM& phone, const char* efs_file, const FileStatus& status, const Sink& sink) {
+  if (IsAborted(phone, "Read")) return false;
   if (status.is_item_file()) return ReadItem(phone, efs_file, status.size, sink);
   RemoteFile file(phone);
   return file.Open(efs_file, kOpenToRead, kModeOfReading) && sink.open() &&

@@ -2,12 +2,42 @@
 #include "storage/efs_request.h"
 
 #include <algorithm>
+#include <chrono>
+
+#include "storage/efs_strays.h"
 
 namespace kral::efs {
 namespace {
 
 // What the packet buffer is filled with: no handset answers with this code.
 constexpr u8 kNoReply = 0xBB;
+constexpr size_t kFcsBytes = 2;  // at the end of every record of the response queue
+
+bool IsRefusal(u8 code) {
+  constexpr u8 kRefusals[] = {kBadCommand, 20, 21, 24};
+  return std::find(std::begin(kRefusals), std::end(kRefusals), code) != std::end(kRefusals);
+}
+
+bool IsOwnReply(const CDiagPacket& packet, const ReplyTest& is_own) {
+  const auto request = packet.request();
+  const auto reply = packet.response();
+  return reply.size() >= kHeaderSize && std::equal(request.begin(), request.begin() + kHeaderSize, reply.begin()) &&
+         (!is_own || is_own(reply));
+}
+
+// Puts the reply that follows into the buffer.
+bool AwaitNextReply(Diag_FTM& phone, CDiagPacket& packet, u32 start, u32 time_out_ms) {
+  packet.response_area()[0] = kNoReply;
+  const u32 elapsed = phone.clock().TickMs() - start;
+  // Through a phone server no reply comes unasked.
+  if (elapsed >= time_out_ms || phone.server_mode()) return false;
+  const auto record = phone.responses().PopWithin(std::chrono::milliseconds(time_out_ms - elapsed));
+  if (!record || record->size() <= kFcsBytes) return false;
+  const size_t size = std::min<size_t>(record->size() - kFcsBytes, CDiagPacket::kCapacity);
+  std::copy_n(record->begin(), size, packet.response_area().begin());
+  packet.set_response_length(static_cast<u16>(size));
+  return true;
+}
 
 }  // namespace
 
@@ -34,25 +64,49 @@ bool IsWithinLimit(Diag_FTM& phone) {
   return false;
 }
 
-bool Exchange(Diag_FTM& phone, u32 time_out_ms) {
-  CDiagPacket& packet = phone.packet();
+Answer ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own) {
+  NoteLateReplies(phone);
+  const u32 start = phone.clock().TickMs();
   packet.response_area()[0] = kNoReply;
   packet.set_response_length(CDiagPacket::kCapacity);
-  if (!phone.Send(packet, time_out_ms)) return false;
-  const auto request = packet.request();
-  const auto reply = packet.response();
-  if (reply.size() >= kHeaderSize && std::equal(request.begin(), request.begin() + kHeaderSize, reply.begin())) {
-    return true;
+  phone.Send(packet, time_out_ms);
+  if (packet.response_area()[0] == kNoReply) {
+    return phone.clock().TickMs() - start < time_out_ms ? Answer::kNotSent : Answer::kNone;
   }
-  phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
+  while (!IsOwnReply(packet, is_own)) {
+    if (IsRefusal(packet.response_area()[0])) return Answer::kRefused;
+    phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
+    NoteLateReply(phone, packet.response());
+    if (!AwaitNextReply(phone, packet, start, time_out_ms)) return Answer::kNone;
+  }
+  return Answer::kOwn;
+}
+
+Answer ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own) {
+  const Answer answer = ExchangePacket(phone, phone.packet(), time_out_ms, is_own);
+  CloseStrays(phone);
+  return answer;
+}
+
+bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts) {
+  for (int attempt = 0; attempt < kTries; ++attempt) {
+    // With a handset that is silent, an abort would otherwise wait for every try.
+    if (attempt > 0 && phone.efs().abort) return false;
+    if (ExchangeOnce(phone, time_out_ms, is_own) == Answer::kOwn && accepts(phone.packet().response())) return true;
+  }
   return false;
 }
 
-bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const std::function<bool(std::span<const u8>)>& accepts) {
-  for (int attempt = 0; attempt < kTries; ++attempt) {
-    if (Exchange(phone, time_out_ms) && accepts(phone.packet().response())) return true;
-  }
-  return false;
+bool AskComposed(Diag_FTM& phone, Tries tries) {
+  const u32 time_out_ms = DefaultTimeOut(phone);
+  if (tries == Tries::kOne) return Exchange(phone, time_out_ms);
+  return ExchangeUntil(phone, time_out_ms, {}, [](std::span<const u8>) { return true; });
+}
+
+bool IsAborted(Diag_FTM& phone, const char* operation) {
+  if (!phone.efs().abort) return false;
+  phone.log().WriteLine(kLogErr, "EFS %s aborted", operation);
+  return true;
 }
 
 bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields) {
@@ -62,10 +116,9 @@ bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields) {
 }
 
 u8 LastRefusal(Diag_FTM& phone) {
-  constexpr u8 kRefusals[] = {kBadCommand, 20, 21, 24};
   u8 code = 0;
   phone.packet().ResponseAt8(0, code);
-  return std::find(std::begin(kRefusals), std::end(kRefusals), code) == std::end(kRefusals) ? u8{0} : code;
+  return IsRefusal(code) ? code : u8{0};
 }
 
 }  // namespace kral::efs

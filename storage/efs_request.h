@@ -18,14 +18,37 @@ Path PathField(const char* path);
 // The terminated text at an offset of a reply; nothing when it has no end within what was received.
 std::optional<std::string> TextAt(std::span<const u8> reply, size_t offset);
 
+using ReplyTest = std::function<bool(std::span<const u8> reply)>;
+
+enum class Answer {
+  kOwn,
+  kRefused,  // with 19, 20, 21 or 24: not carried out
+  kNone,     // in time: it may have been carried out
+  kNotSent,
+};
+
+inline constexpr size_t kSidePacket = 1;  // for requests that leave the default packet buffer alone
+
+// Sends a buffer's request once. A reply that repeats another header, or is not `is_own`, answers an earlier request
+// that was given up: the right one is waited for behind it, for the rest of the time-out, so that one late answer does
+// not put every later one off by one.
+Answer ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own = {});
+
 // All of these act on the request in the phone's default packet buffer, where the reply is found afterwards.
 
 // False (logged) when a request with a path is longer than the handset takes.
 bool IsWithinLimit(Diag_FTM& phone);
-// Sends once. A reply that repeats another header is an earlier request's, come late, and counts as none.
-bool Exchange(Diag_FTM& phone, u32 time_out_ms);
-// Sends until a reply is accepted. Each try opens a port that an earlier one's time-out has closed.
-bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const std::function<bool(std::span<const u8> reply)>& accepts);
+// Sends once; handles that late replies tell of are closed besides.
+Answer ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
+inline bool Exchange(Diag_FTM& phone, u32 time_out_ms) {
+  return ExchangeOnce(phone, time_out_ms) == Answer::kOwn;
+}
+// Sends until a reply of its own is accepted, at most five times and not after an abort. Each try opens a port that an
+// earlier one's time-out has closed.
+bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
+
+// Whether the transfer or listing is to end; logged when it is.
+bool IsAborted(Diag_FTM& phone, const char* operation);
 
 // Reads double words from the end of the reply backwards; false when it does not hold that many behind its header.
 bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields);
@@ -41,11 +64,21 @@ inline u32 PacketTimeOut(Diag_FTM& phone) {
   return phone.efs().packet_time_out_ms;
 }
 
-// A request with a path, sent once with the default time-out.
+// Requests that stand alone are sent once. Those of a transfer that change nothing are repeated until answered.
+enum class Tries { kOne, kTransfer };
+
+bool AskComposed(Diag_FTM& phone, Tries tries);
+
+// A request with a path and the default time-out.
+template <class... Fields>
+bool Ask(Diag_FTM& phone, Tries tries, const EfsRequest<Fields...>& row,
+         std::type_identity_t<Field<Fields>>... fields) {
+  Compose(phone, row, fields...);
+  return IsWithinLimit(phone) && AskComposed(phone, tries);
+}
 template <class... Fields>
 bool Ask(Diag_FTM& phone, const EfsRequest<Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
-  Compose(phone, row, fields...);
-  return IsWithinLimit(phone) && Exchange(phone, DefaultTimeOut(phone));
+  return Ask(phone, Tries::kOne, row, fields...);
 }
 
 }  // namespace kral::efs

@@ -31,9 +31,14 @@ bool EFS::Initialize(DataLogFileHandler& log, uint16_t port) {
   } catch (...) {
     log.WriteLine(kLogErr, "EFS::initialize - Unknown exception thrown.");
   }
+  Forget();
+  return false;
+}
+
+void EFS::Forget() {
+  module_.reset();
   phone_.reset();
   server_.reset();
-  return false;
 }
 
 bool EFS::EfsStarter(DataLogFileHandler& log, uint16_t port, const char* failure,
@@ -61,8 +66,10 @@ bool EFS::EfsStarter(DataLogFileHandler& log, uint16_t port, const char* failure
     log.WriteLine(kLogErr, "%s", failure);
   } catch (const OrbtServerException&) {
     log.WriteLine(kLogErr, "EFS::EfsStarter - COM exception thrown. ");
+    Forget();
   } catch (...) {
     log.WriteLine(kLogErr, "EFS::EfsStarter - Unknown exception thrown.");
+    Forget();
   }
   return false;
 }

@@ -22,6 +22,8 @@ class EFS final : public FamilyObject {
  private:
   bool Initialize(DataLogFileHandler& log, uint16_t port);
   bool Connect(DataLogFileHandler& log, uint16_t port);
+  // After a failure that may be a server's that is gone: the next job connects afresh.
+  void Forget();
   // Runs a job on the module while the phone is locked. `failure` is logged when the job fails.
   bool EfsStarter(DataLogFileHandler& log, uint16_t port, const char* failure,
                   const std::function<bool(EfsModule&)>& job);

@@ -4,8 +4,10 @@
 
 #include <vector>
 
+#include "frame/base/little_endian.h"
 #include "storage/efs_client.h"
 #include "storage/efs_format.h"
+#include "storage/efs_request.h"
 
 namespace kral::efs {
 
@@ -26,8 +28,20 @@ inline void Report(Diag_FTM& phone, const TransferEnds& ends, u32 operation, u32
   }
 }
 
+// Whether a read or write reply answers the packet at this offset. That to an earlier packet, come late, does not.
+inline bool IsOfChunk(std::span<const u8> reply, u32 descriptor, u32 offset) {
+  return LoadLe<u32>(reply, kHandleAt) == descriptor && LoadLe<u32>(reply, kTransferOffset) == offset;
+}
+
+// The single requests of which transfers are made, with the tries of a transfer.
+
+// Stat (efs_names.cpp).
+bool StatInTransfer(Diag_FTM& phone, const char* path, FileStatus& status);
+// The file system that holds a path (efs_file_system.cpp); false also when the reply is too short for its fields.
+bool AskStatus(Diag_FTM& phone, Tries tries, const char* path, u32& error, KRAL_EFS_STATFS& status);
 // Fetches an item file whole (efs_item.cpp). `data` is untouched on failure.
-bool GetItem(Diag_FTM& phone, const char* efs_file, u32 length, const TransferEnds& ends, std::vector<u8>& data);
+bool GetItem(Diag_FTM& phone, Tries tries, const char* efs_file, u32 length, const TransferEnds& ends,
+             std::vector<u8>& data);
 
 }  // namespace kral::efs
 

@@ -20,7 +20,7 @@ struct Source {
 bool HasRoom(Diag_FTM& phone, u32 size) {
   u32 error = 0;
   KRAL_EFS_STATFS status{};
-  const bool answered = FileSystemStatus(phone, "/", &error, &status);
+  const bool answered = AskStatus(phone, Tries::kTransfer, "/", error, status);
   if (!answered || error != kDone) {
     phone.log().WriteLine(kLogErr, "StatFSAvailSpace() returned %d", answered ? static_cast<int>(error) : -1);
     return false;
@@ -32,24 +32,43 @@ bool HasRoom(Diag_FTM& phone, u32 size) {
   return false;
 }
 
+// Tried like every packet of a transfer, also after an abort.
+bool Remove(Diag_FTM& phone, const char* efs_file) {
+  bool unanswered = false;
+  for (int attempt = 0; attempt < kTries; ++attempt) {
+    u32 error = 0;
+    if (!Unlink(phone, efs_file, &error)) {
+      unanswered = true;
+      continue;
+    }
+    // A file that is missing now was removed by a try whose answer was lost.
+    if (error == kDone || (unanswered && error == kMissing)) return true;
+    phone.log().WriteLine(kLogErr, "EFS Unlink error code %u", error);
+  }
+  return false;
+}
+
 // An item file cannot be opened; an ordinary file takes its place.
 bool RemoveItemFile(Diag_FTM& phone, const char* efs_file) {
   FileStatus status;
-  if (!Stat(phone, efs_file, status)) return false;
-  if (!status.is_item_file()) return true;
-  u32 error = 0;
-  return Unlink(phone, efs_file, &error) && error == kDone;
+  if (!StatInTransfer(phone, efs_file, status) || IsAborted(phone, "Write")) return false;
+  return !status.is_item_file() || Remove(phone, efs_file);
+}
+
+// The packet buffer takes one byte less than it holds.
+bool IsUsable(Diag_FTM& phone, u16 packet_size) {
+  if (packet_size > kWriteOverhead && packet_size < CDiagPacket::kCapacity) return true;
+  phone.log().WriteLine(kLogErr, "EFS Write packet size %d cannot be used", packet_size);
+  return false;
 }
 
 bool WriteChunk(Diag_FTM& phone, u32 descriptor, u32 offset, std::span<const u8> chunk, u32& written) {
   Compose(phone, kWrite, descriptor, offset, chunk);
-  const bool accepted = ExchangeUntil(phone, PacketTimeOut(phone), [&](std::span<const u8> reply) {
+  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset); };
+  const bool accepted = ExchangeUntil(phone, PacketTimeOut(phone), is_own, [&](std::span<const u8> reply) {
     const auto error = LoadLe<u32>(reply, kTransferError);
-    // The answer to an earlier packet, come late, tells another offset.
-    if (!error || LoadLe<u32>(reply, kHandleAt) != descriptor || LoadLe<u32>(reply, kTransferOffset) != offset) {
-      return false;
-    }
-    if (*error != kDone) phone.log().WriteLine(kLogErr, "EFS Write error code %d", static_cast<int>(*error));
+    if (!error) return false;
+    if (*error != kDone) phone.log().WriteLine(kLogErr, "EFS Write error code %u", *error);
     written = *LoadLe<u32>(reply, kTransferCount);
     return *error == kDone;
   });
@@ -61,36 +80,37 @@ bool WriteChunk(Diag_FTM& phone, u32 descriptor, u32 offset, std::span<const u8>
 }
 
 // True also when the transfer was aborted.
-bool WriteChunks(Diag_FTM& phone, u32 descriptor, const Source& source) {
-  const u16 packet_size = phone.efs().write_packet_size;
-  // The packet buffer takes one byte less than it holds.
-  if (packet_size <= kWriteOverhead || packet_size >= CDiagPacket::kCapacity) {
-    phone.log().WriteLine(kLogErr, "EFS Write packet size %d cannot be used", packet_size);
-    return false;
-  }
+bool WriteChunks(Diag_FTM& phone, u32 descriptor, u16 packet_size, const Source& source) {
   std::vector<u8> buffer(packet_size - kWriteOverhead);
   for (u32 offset = 0; offset < source.size && !phone.efs().abort;) {
     const auto chunk = std::span(buffer).first(std::min<size_t>(buffer.size(), source.size - offset));
+    if (!source.read(offset, chunk)) {
+      phone.log().WriteLine(kLogErr, "EFS Write: the local file cannot be read at %u", offset);
+      return false;
+    }
     u32 written = 0;
-    if (!source.read(offset, chunk) || !WriteChunk(phone, descriptor, offset, chunk, written)) return false;
+    if (!WriteChunk(phone, descriptor, offset, chunk, written)) return phone.efs().abort;
     offset += written;
-    phone.log().WriteLine(kLogRet, " EFS Write Transferred %d / %d bytes", static_cast<int>(offset),
-                          static_cast<int>(source.size));
+    phone.log().WriteLine(kLogRet, " EFS Write Transferred %u / %u bytes", offset, source.size);
     Report(phone, source.ends, KRAL_EFS_OPERATION_WRITE, offset, source.size);
   }
   return true;
 }
 
 bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
-  if (!HasRoom(phone, source.size) || !RemoveItemFile(phone, efs_file)) return false;
+  if (efs_file == nullptr) efs_file = "";
+  // The handset's old file goes with the next steps, so everything that can be known to fail has failed before.
+  const u16 packet_size = phone.efs().write_packet_size;
+  if (!RemoteFile::CanOpen(phone, efs_file) || !IsUsable(phone, packet_size)) return false;
+  if (!HasRoom(phone, source.size) || IsAborted(phone, "Write") || !RemoveItemFile(phone, efs_file)) return false;
   RemoteFile file(phone);
-  if (!file.Open(efs_file, kOpenToWrite, kModeOfNewFiles)) return false;
-  const bool written = WriteChunks(phone, file.value(), source);
+  if (IsAborted(phone, "Write") || !file.Open(efs_file, kOpenToWrite, kModeOfNewFiles)) return false;
+  const bool written = WriteChunks(phone, file.value(), packet_size, source);
   if (!written) phone.log().WriteLine(kLogErr, "EFS2WriteEntireFile() failed");
   const bool closed = file.Close();
-  if (written && closed && !phone.efs().abort) return true;
+  if (written && closed && !IsAborted(phone, "Write")) return true;
   // What is there now is a part of the file.
-  Unlink(phone, efs_file, nullptr);
+  if (!Remove(phone, efs_file)) phone.log().WriteLine(kLogErr, "EFS Write leaves a part of %s behind", efs_file);
   return false;
 }
 

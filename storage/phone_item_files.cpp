@@ -90,7 +90,7 @@ std::optional<uint32_t> PhoneItems::ItemError(bool reading) const {
 PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) {
   return Try([&] {
     status = efs::kDone;
-    if (efs::GetItem(phone_, file.path.c_str(), KRAL_EFS_ITEM_SIZE, {}, file.bytes)) return true;
+    if (efs::GetItem(phone_, efs::Tries::kOne, file.path.c_str(), KRAL_EFS_ITEM_SIZE, {}, file.bytes)) return true;
     const auto error = ItemError(true);
     status = error.value_or(kRefusedStatus);
     return error.has_value();

@@ -10,13 +10,19 @@
  * - An error number is what the handset answers: 0 done, 2 no such file, 6 exists already, 28 no room, and others. A
  *   function with an `error_number` gives 1 when the handset answered and leaves the judgement to its caller; the
  *   other outputs are written only when the number is 0. Any output may be null.
- * - Every packet of a transfer and of a listing is tried up to 5 times. A try may wait for time-out 0 (4,000 ms) or,
- *   when a file is written or a directory listed, for 2,000 ms; one that gets no answer closes the port, and the next
- *   one opens it again.
+ * - Every packet of a transfer and of a listing is tried up to 5 times, the questions for room and status in front of
+ *   it included. A try may wait for time-out 0 (4,000 ms) or, when a file is written or a directory listed, for
+ *   2,000 ms; one that gets no answer closes the port, and the next one opens it again.
+ * - The answer to an earlier request, come late, is passed over, and the right one waited for behind it, for the rest
+ *   of the time-out.
  * - A transfer that fails or is aborted leaves no partial file on either side, unless the handset cannot be reached any
- *   more. What is read goes into a temporary file beside its target, which is replaced at the end.
- * - A handset whose answer to an opening request is lost may keep that descriptor open until it restarts: nothing tells
- *   its number. The text log has a line about it.
+ *   more or refuses the removal: then the text log has a line about it. What is read goes into a temporary file beside
+ *   its target, which is replaced at the end.
+ * - Where the path of a transfer to the handset is a symbolic link, it is the link that is removed, in place of an item
+ *   file as well as after a failure: what it leads to keeps what was written.
+ * - A handset whose answer to an opening request does not come keeps that descriptor open. It is closed as soon as the
+ *   answer turns up, in front of whatever other answer; should it be lost, nothing tells the number, and the
+ *   descriptor stays open until the handset restarts. The text log has a line about it.
  */
 #ifndef KRAL_EFS_H
 #define KRAL_EFS_H
@@ -133,16 +139,17 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_
                                                        KRAL_EFS_DIRECTORY_CALLBACK directory);
 
 /**
- * Ends the transfer or listing that runs on another thread, before its next packet; it then gives 0. Each of them
- * forgets earlier calls when it starts.
+ * Ends the transfer or listing that runs on another thread, before its next packet or the next try of one that is not
+ * answered; it then gives 0. Each of them forgets earlier calls when it starts.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle);
 
-/* --- Transfers -----------------------------------------------------------------------------------------------------
- */
+/* --- Transfers ---------------------------------------------------------------------------------------------------- */
 
 /**
  * Copies a file of the PC to the handset, replacing what is there; an item file of that name is removed first.
+ *
+ * What the handset has under that name goes only when the path, the packet size and the room allow the transfer.
  *
  * @return 1 when all bytes were written and the file was closed
  */
@@ -153,7 +160,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsWriteMem(KRAL_HANDLE handle, const uint8_t* b
                                             const char* efs_file);
 
 /**
- * Copies a file of the handset to the PC, replacing what is there. Item files are fetched with one request.
+ * Copies a file of the handset to the PC, replacing what is there. Item files are fetched with one request. A file
+ * that grows meanwhile is read to its end; more than 1 MiB beyond the size that the handset told is a failure.
  *
  * @return 1 when every byte that the handset told of was read and is in the local file
  */
@@ -167,8 +175,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsRead(KRAL_HANDLE handle, const char* local_fi
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsReadMem(KRAL_HANDLE handle, const char* efs_file, uint8_t* buffer, uint32_t* size);
 
-/* --- Item files: one request each ----------------------------------------------------------------------------------
- */
+/* --- Item files: one request each --------------------------------------------------------------------------------- */
 
 /**
  * Writes an item file from a file of the PC of at most 1,024 bytes. A larger one is not sent.
@@ -194,15 +201,14 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsPutItemFromMem(KRAL_HANDLE handle, const char
 KRAL_API uint8_t KRAL_CALL KRAL_Efs2GetItem(KRAL_HANDLE handle, const char* local_file, const char* efs_file,
                                             uint32_t length);
 
-/* --- Directories ---------------------------------------------------------------------------------------------------
- */
+/* --- Directories -------------------------------------------------------------------------------------------------- */
 
 /**
  * Lists a directory, in the handset's order. Every selected entry goes to the directory callback and into `entries`.
  *
  * @param         folder   null and "" list "/"
  * @param         filter   KRAL_EFS_FILTER_...; any other value selects nothing
- * @param[out]    entries  null, or room for `*count` records
+ * @param[out]    entries  null, or room for `*count` records. On failure it may hold those that had come
  * @param[in,out] count    in: records in `entries`; out: entries selected, of which the first so many are in
  *                         `entries`. May be null when `entries` is
  *
@@ -214,7 +220,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsDirectory(KRAL_HANDLE handle, const char* fol
 /**
  * Makes a directory with mode 0777.
  *
- * @return 1 when it is there: error numbers 0 and 6 (it was there already)
+ * @param[out] error_number  written whenever the handset answered, also when the function gives 0
+ * @return 1 when it is there: error numbers 0 and 6 (something of that name was there already)
  *
  * Wait: 2,000 ms.
  */
@@ -223,8 +230,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsMkDir(KRAL_HANDLE handle, const char* folder,
 /** Removes an empty directory. Wait, as for everything below: time-out 0. */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsRmDir(KRAL_HANDLE handle, const char* folder, uint32_t* error_number);
 
-/* --- Names ---------------------------------------------------------------------------------------------------------
- */
+/* --- Names -------------------------------------------------------------------------------------------------------- */
 
 /** Removes a file, an item file or a link. */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsDelete(KRAL_HANDLE handle, const char* efs_file, uint32_t* error_number);
@@ -246,8 +252,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsReadLink(KRAL_HANDLE handle, const char* link
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_RENAME(KRAL_HANDLE handle, const char* old_path, const char* new_path,
                                                  uint32_t* error_number);
 
-/* --- Status --------------------------------------------------------------------------------------------------------
- */
+/* --- Status ------------------------------------------------------------------------------------------------------- */
 
 /** Reads the status of what a path names, links followed. Times are the handset's, in seconds. */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_STAT(KRAL_HANDLE handle, const char* path, uint32_t* error_number,
@@ -293,7 +298,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_EXTENDED_INFO(KRAL_HANDLE handle, uint
 /**
  * Has the handset write what it still keeps in memory, and waits for that.
  *
- * @param time_out  ms until it is given up; the handset is asked every 100 ms
+ * @param time_out  ms until it is given up; the handset is asked every 100 ms. A question without an answer is
+ *                  followed by the next
  * @return 1 when everything under the path is in the flash; 0 also when the handset does not know the request
  *
  * Wait: the time-out and, for each question to the handset, time-out 0.
@@ -304,8 +310,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_SyncWithWait(KRAL_HANDLE handle, const char
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_MAKE_GOLDEN_COPY(KRAL_HANDLE handle, const char* path,
                                                            uint32_t* error_number);
 
-/* --- Done by the phone server: server mode only, 0 in direct mode --------------------------------------------------
- */
+/* --- Done by the phone server: server mode only, 0 in direct mode ------------------------------------------------- */
 
 /** Removes a directory with everything in it. */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsRmTree(KRAL_HANDLE handle, const char* folder);

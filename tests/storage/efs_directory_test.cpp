@@ -105,6 +105,7 @@ TEST_F(EfsDirectory, FailuresAreNamedAndCloseTheDirectory) {
         .Take();
   };
   using namespace std::literals;
+  ShortenTimeOuts();
   for (const Bytes& reply :
        {entry(1, 1, 0, "name without end"), entry(1, 2, 0, "late\0"sv), entry(2, 1, 0, "b\0"sv), entry(1, 1, 9, "\0"sv),
         entry(1, 1, 0, ""), entry(1, 1, 0, std::string(600, 'n') + '\0'), handset::FromHex("4B 13 0C 00 01")}) {

@@ -1,7 +1,11 @@
-// Every fault of the line at every packet of a transfer and of a listing: exact bytes, or a clean failure.
+// Every fault of the line at every packet of a transfer and of a listing: exact bytes, or a clean failure. And what
+// becomes of late answers: they are nobody else's, and the handles that they tell of are closed.
 #include <gtest/gtest.h>
 
+#include <thread>
+
 #include "tests/support/efs_fixture.h"
+#include "tests/support/handset_ports.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -58,7 +62,7 @@ class EfsFaults : public test::EfsTest {
         handset().faults().Clear();
 
         const uint8_t command = commands[packet - 1];
-        EXPECT_EQ(passed, Survives(row.harm, command, commands[1] == 15)) << LogText();
+        EXPECT_EQ(passed, Survives(row.harm, command, commands)) << LogText();
         if (row.harm == Harm::kGone && !passed) continue;  // what the handset keeps cannot be tidied up
         EXPECT_EQ(outcome(passed), "");
         if (row.harm == Harm::kGone) continue;
@@ -71,8 +75,9 @@ class EfsFaults : public test::EfsTest {
     EXPECT_EQ(run_, std::size(kRows) * commands.size());
   }
 
-  static bool Survives(Harm harm, uint8_t command, bool writing) {
-    const bool sent_once = command == 15 || command == 19;  // stat and the free space
+  static bool Survives(Harm harm, uint8_t command, const std::vector<uint8_t>& commands) {
+    const bool writing = commands.front() == 19;
+    const bool sent_once = commands.size() == 1;
     const bool closing = command == 3 || command == 13;
     // What has been read is there, closed or not; what was written may not be.
     if (harm == Harm::kGone) return closing && !writing;
@@ -114,6 +119,52 @@ TEST_F(EfsFaults, StrikeAGet) {
       });
 }
 
+TEST_F(EfsFaults, StrikeAPutOverAnItem) {
+  const Bytes item = RandomBytes(20, 2);
+  Strike(
+      {19, 15, 8, 2, 5, 3},
+      [&] {
+        handset().efs().AddItemFile(Path(), item);
+        return KRAL_EfsWriteMem(handle(), data_.data(), 500, Path().c_str());
+      },
+      [&](bool passed) -> std::string {
+        const auto file = handset().efs().File(Path());
+        if (passed) return file == Bytes(data_.begin(), data_.begin() + 500) ? "" : "other bytes";
+        return !file || file == item ? "" : "a partial file";
+      });
+}
+
+TEST_F(EfsFaults, StrikeItems) {
+  const Bytes item = RandomBytes(100, 2);
+  handset().efs().AddItemFile("/item", item);
+  const std::string target = folder_.Add("target", "");
+  const auto fetched = [&](bool passed) {
+    return folder_.Content("target") == (passed ? Text(item) : "before") ? "" : "other bytes";
+  };
+  Strike(
+      {15, 39},
+      [&] {
+        folder_.Add("target", "before");
+        return KRAL_EfsRead(handle(), target.c_str(), "/item");
+      },
+      fetched);
+  run_ = 0;
+  Strike(
+      {39},
+      [&] {
+        folder_.Add("target", "before");
+        return KRAL_Efs2GetItem(handle(), target.c_str(), "/item", 1024);
+      },
+      fetched);
+  run_ = 0;
+  Strike(
+      {38}, [&] { return KRAL_EfsPutItemFromMem(handle(), Path().c_str(), item.data(), 100); },
+      [&](bool passed) {
+        const auto file = handset().efs().File(Path());
+        return file == item || (!passed && !file) ? "" : "other bytes";
+      });
+}
+
 TEST_F(EfsFaults, StrikeAListing) {
   handset().efs().AddFile("/d/one", Bytes{1});
   handset().efs().AddDirectory("/d/two");
@@ -131,6 +182,102 @@ TEST_F(EfsFaults, StrikeAListing) {
         if (passed) return listed == "2/d/one/d/two" ? "" : listed;
         return listed.starts_with('3') ? "" : "a count in spite of the failure";
       });
+}
+
+// --- Late answers ---------------------------------------------------------------------------------------------------
+
+TEST_F(EfsFaults, LateAnswerIsPassedOverByWhatFollows) {
+  ShortenTimeOuts(kTimeOutMs);
+  handset().efs().AddFile("/f", Bytes{1});
+  handset().faults().Add(handset::AfterNextRequest(), handset::When::Nth(1).Of("4B 13 08"));
+  uint32_t error = 77;
+  EXPECT_EQ(KRAL_EfsDelete(handle(), "/missing", &error), 0);
+  EXPECT_EQ(KRAL_EFS2_DIAG_CHMOD(handle(), "/f", 0400, &error), 1) << "its answer comes behind that of the removal";
+  EXPECT_EQ(error, 0u);
+
+  KRAL_SetEfsReadAndWritePacketSize(handle(), 120, 112);
+  handset().faults().Add(handset::AfterNextRequest(), handset::When::Nth(2).Of("4B 13 05"));
+  handset().ClearTrace();
+  EXPECT_EQ(KRAL_EfsWriteMem(handle(), data_.data(), 700, "/put"), 1);
+  EXPECT_EQ(handset().efs().File("/put"), data_);
+  EXPECT_EQ(handset().requests().size(), 3u + 7u + 1u + 1u) << "one packet goes out twice, not every one behind it";
+}
+
+TEST_F(EfsFaults, HandlesThatLateAnswersTellOfAreClosed) {
+  handset().efs().AddFile("/f", data_);
+  ShortenTimeOuts(kTimeOutMs);
+  // Later than the moment for which late answers are waited for, and in the middle of the transfer.
+  handset().faults().Add(handset::Delay(250), handset::When::Nth(1).Of("4B 13 02"));
+  handset().faults().Add(handset::Delay(15), handset::When::Always().Of("4B 13 04"));
+  KRAL_SetEfsReadAndWritePacketSize(handle(), 40, 524);
+  Bytes back(700);
+  auto size = static_cast<uint32_t>(back.size());
+  EXPECT_EQ(KRAL_EfsReadMem(handle(), "/f", back.data(), &size), 1) << LogText();
+  EXPECT_EQ(back, data_);
+  EXPECT_EQ(handset().efs().open_descriptors(), 0u) << LogText();
+}
+
+// The caller's transport of the other tests stays open whatever happens.
+TEST(EfsOnAComPort, LostAnswersCloseThePortAndTheNextTryOpensIt) {
+  const Bytes data(700, 0x5A);
+  test::HandsetPorts ports;
+  auto& phone = ports.Add(9);
+  const KRAL_HANDLE com = KRAL_ConnectServer(9);
+  ASSERT_NE(com, 0u);
+  KRAL_ConfigureTimeOut(com, 0, 200);
+  Kral_ResourceManager::GetPhone(com)->efs().packet_time_out_ms = 200;
+  for (const char* const command : {"13", "0F", "05", "03"}) {
+    SCOPED_TRACE(command);
+    const size_t opens = ports.opens().size();
+    phone.faults().Add(handset::Lose(), handset::When::Nth(1).Of(std::string("4B 13 ") + command));
+    EXPECT_EQ(KRAL_EfsWriteMem(com, data.data(), 700, "/put"), 1);
+    EXPECT_EQ(phone.efs().File("/put"), data);
+    EXPECT_EQ(phone.efs().open_descriptors(), 0u);
+    EXPECT_GT(ports.opens().size(), opens);
+    phone.faults().Clear();
+  }
+}
+
+// --- Abort from another thread --------------------------------------------------------------------------------------
+
+TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
+  for (int i = 0; i < 300; ++i) handset().efs().AddFile("/d/" + std::to_string(i), {});
+  handset().efs().AddFile("/source", RandomBytes(60000));
+  const Bytes large = RandomBytes(60000);
+  const std::string target = folder_.Add("target", "before");
+  struct Operation {
+    const char* name;
+    const char* command;
+    std::function<uint8_t()> run;
+  };
+  const Operation operations[] = {
+      {"put", "4B 13 05", [&] { return KRAL_EfsWriteMem(handle(), large.data(), 60000, "/put"); }},
+      {"get", "4B 13 04", [&] { return KRAL_EfsRead(handle(), target.c_str(), "/source"); }},
+      {"list", "4B 13 0C", [&] { return KRAL_EfsDirectory(handle(), "/d", KRAL_EFS_FILTER_ALL, nullptr, nullptr); }},
+  };
+  for (const bool silent : {false, true}) {
+    for (const Operation& operation : operations) {
+      SCOPED_TRACE(testing::Message() << operation.name << (silent ? ", no answer" : ", slow answers"));
+      ShortenTimeOuts(silent ? 100 : 2000);
+      handset().faults().Add(silent ? handset::Ignore() : handset::Delay(5),
+                             handset::When::Always().Of(operation.command));
+      handset().ClearTrace();
+      const uint64_t struck = handset().faults().struck();
+      std::thread other([&] {
+        const auto has_begun = [&] { return handset().faults().struck() > struck; };
+        for (int i = 0; i < 5000 && !has_begun(); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        KRAL_AbortEFS_Operation(handle());
+      });
+      EXPECT_EQ(operation.run(), 0);
+      other.join();
+      EXPECT_LT(handset().requests().size(), silent ? 9u : 120u);
+      EXPECT_TRUE(LogText().find(" aborted") != std::string::npos) << LogText();
+      EXPECT_FALSE(handset().efs().Exists("/put"));
+      EXPECT_EQ(folder_.Content("target"), "before");
+      handset().faults().Clear();
+      ClearLog();
+    }
+  }
 }
 
 }  // namespace

@@ -146,6 +146,17 @@ TEST_F(EfsServerJobs, FailuresAreNamedAndThePhoneIsUnlocked) {
     const bool locked = calls.find("lock|remove") != std::string::npos;
     EXPECT_EQ(calls.ends_with("unlock|"), locked);
   }
+  // A server that went away is connected to afresh by the next job.
+  script_ = {.fails = {}, .throws = "lock", .calls = {}};
+  Errors(
+      [&](KRAL_HANDLE handle) {
+        RemoveTree(handle);
+        Calls();
+        script_.throws.clear();
+        return RemoveTree(handle);
+      },
+      1);
+  EXPECT_EQ(Calls(), "server|connect 3|phone|module|lock|remove /a|unlock|");
   script_ = {.fails = "image", .throws = {}, .calls = {}};
   EXPECT_EQ(Errors([](KRAL_HANDLE handle) { return KRAL_DownloadCEFS_File(handle, "image"); }, 0),
             "EFS::CreateCEFS - pMirelEfs->EFS2CreatePhoneImage() failed|EfsStarter() failed during CreateCEFS_impl|");

@@ -143,6 +143,25 @@ TEST_F(EfsTransfer, PacketSizesWithoutRoomFailTheTransfer) {
   EXPECT_EQ(ReadMem("/f", back), 1) << "the answer is short enough";
 }
 
+TEST_F(EfsTransfer, OldFileStaysWhereTheCallIsBoundToFail) {
+  const std::string long_path = "/" + std::string(243, 'p');  // an item's requests take it, the opening one does not
+  KRAL_ConfigureEfs2CallBacks(handle(), &NoteProgress, nullptr);
+  for (const char* const reason : {"path", "packet size", "abort"}) {
+    SCOPED_TRACE(reason);
+    const std::string path = reason == std::string("path") ? long_path : "/f";
+    handset().efs().AddItemFile(path, Bytes{1, 2});
+    KRAL_SetEfsReadAndWritePacketSize(handle(), 536, reason == std::string("packet size") ? 12 : 524);
+    // An abort while the handset tells the status.
+    handset().OnSubsystem(19, 19, {}, [&](handset::ByteView request, handset::Wire& wire) {
+      if (reason == std::string("abort")) KRAL_AbortEFS_Operation(handle());
+      wire.Send(ByteWriter().Raw(request.first(4)).Raw(Bytes(12)).U32(512).Raw(Bytes(24, 1)).Take());
+    });
+    const uint8_t byte = 7;
+    EXPECT_EQ(KRAL_EfsWriteMem(handle(), &byte, 1, path.c_str()), 0);
+    EXPECT_EQ(handset().efs().File(path), (Bytes{1, 2})) << LogText();
+  }
+}
+
 TEST_F(EfsTransfer, ItemFilesAreFetchedWithOneRequestAndReplacedByFiles) {
   const Bytes item = RandomBytes(1024);
   handset().efs().AddItemFile("/nv/item", item);
@@ -214,6 +233,11 @@ TEST_F(EfsTransfer, AbortAtAnyChunkLeavesNoPartialFile) {
     EXPECT_EQ(folder_.Content("target"), "before");
     EXPECT_EQ(handset().efs().open_descriptors(), 0u);
   }
+  handset().efs().AddItemFile("/item", Bytes{1});
+  g_progress.clear();
+  g_abort_at = 1;
+  EXPECT_EQ(KRAL_EfsRead(handle(), target.c_str(), "/item"), 0);
+  EXPECT_EQ(folder_.Content("target"), "before");
   // The flag is forgotten by the next transfer.
   g_abort_at = 0;
   EXPECT_EQ(KRAL_EfsRead(handle(), target.c_str(), "/source"), 1);
@@ -288,6 +312,10 @@ TEST_F(EfsTransfer, ShortWritesContinueWhereTheHandsetStopped) {
 class EfsLies : public EfsTransfer {
  protected:
   // From now on `command` is answered so.
+  void SetUp() override {
+    EfsTransfer::SetUp();
+    ShortenTimeOuts();  // the answer to something else is waited behind
+  }
   void Answer(uint16_t command, std::function<Bytes(handset::ByteView request)> answer) {
     handset().OnSubsystem(19, command, {},
                           [answer](handset::ByteView request, handset::Wire& wire) { wire.Send(answer(request)); });
@@ -320,13 +348,29 @@ TEST_F(EfsLies, ReadRepliesAreCheckedAgainstWhatWasAskedAndReceived) {
   }
 }
 
-TEST_F(EfsLies, EndlessFileStopsAtTheBuffer) {
+TEST_F(EfsLies, EndlessFileStopsAtTheBufferAndOnThePc) {
   handset().efs().AddFile("/f", Bytes{1, 2, 3, 4});
   Answer(4, [](handset::ByteView request) {
-    return ByteWriter().Raw(request.first(8)).Raw(request.subspan(12, 4)).U32(516).U32(0).Raw(Bytes(516)).Take();
+    return ByteWriter().Raw(request.first(8)).Raw(request.subspan(12, 4)).U32(4071).U32(0).Raw(Bytes(4071)).Take();
   });
-  Bytes back(2000);
+  KRAL_SetEfsReadAndWritePacketSize(handle(), 4091, 524);
+  handset().efs().AddFile("/f", Bytes(4071));  // fills a packet
+  Bytes back(20000);
   EXPECT_EQ(ReadMem("/f", back), 0);
+  handset().KeepTrace(false);
+  EXPECT_EQ(KRAL_EfsRead(handle(), folder_.Path("local").c_str(), "/f"), 0);
+  EXPECT_NE(LogText().find("EFS Read needs more than the 4071 bytes that the handset told"), std::string::npos);
+  EXPECT_EQ(folder_.Content("local"), "");
+}
+
+TEST_F(EfsLies, PartThatCannotBeRemovedIsNamed) {
+  const Bytes data = RandomBytes(100);
+  int unlinks = 0;
+  Answer(5, [](handset::ByteView) { return handset::FromHex("4B 13 05 00 00000000 00000000 00000000 1C000000"); });
+  Answer(8, [&](handset::ByteView) { return ++unlinks, handset::FromHex("4B 13 08 00 0D000000"); });
+  EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 100, "/f"), 0);
+  EXPECT_EQ(unlinks, 5);
+  EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "EFS Write leaves a part of /f behind"));
 }
 
 TEST_F(EfsLies, WriteRepliesAreChecked) {

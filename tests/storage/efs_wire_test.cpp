@@ -238,14 +238,14 @@ TEST_F(EfsWire, PathsOverTheLimitAreNotSent) {
     EXPECT_GT(handset().request_count(), before);
   }
 
-  // A transfer has asked for room and for the file's status by the time it opens.
+  // A transfer asks for nothing when it could not open.
   handset().ClearTrace();
   const std::string longest = path(243);
   const uint8_t byte = 1;
   EXPECT_EQ(KRAL_EfsWriteMem(handle(), &byte, 1, longest.c_str()), 1);
   handset().ClearTrace();
   EXPECT_EQ(KRAL_EfsWriteMem(handle(), &byte, 1, (longest + "p").c_str()), 0);
-  EXPECT_EQ(handset().requests().size(), 2u);
+  EXPECT_EQ(handset().requests().size(), 0u);
 }
 
 // --- Synchronisation ------------------------------------------------------------------------------------------------
@@ -277,6 +277,13 @@ TEST_F(EfsWire, SyncFailuresAreNamed) {
   EXPECT_TRUE(
       HasLine(KRAL_LOG_ERR, "KRAL_EFS2_SyncWithWait received ERRNO 2 when sending _EFS2_DIAG_SYNC_NO_WAIT command"));
 
+  handset().Expect("4B 13 30 00 2F 00").Reply("4B 13 30 00 00000000");
+  EXPECT_EQ(KRAL_EFS2_SyncWithWait(handle(), "/", 500), 0) << "no state in the reply";
+
+  handset().efs().SetSyncPolls(2);
+  ShortenTimeOuts();
+  handset().faults().Add(handset::Lose(), handset::When::Nth(1).Of("4B 13 31"));
+  EXPECT_EQ(KRAL_EFS2_SyncWithWait(handle(), "/", 5000), 1) << "a poll that got lost does not end the wait";
   handset().efs().SetSyncPolls(1000);
   EXPECT_EQ(KRAL_EFS2_SyncWithWait(handle(), "/", 10), 0) << "never done";
 }
