@@ -47,7 +47,7 @@ class LyingHandset {
         Note(request, answer);
         wire.Send(answer);
         // The right answer is waited for behind a foreign one: it is a refusal.
-        if (answer.front() != kRefusal && !IsOwn(request, answer)) wire.Send({kRefusal});
+        if (answer.front() != kRefusal && !IsOwn(request, answer)) wire.Send(Bytes{kRefusal});
       });
     }
     handle_ = KRAL_ConnectServer_UserDefinedTransport(

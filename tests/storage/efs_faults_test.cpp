@@ -29,7 +29,7 @@ const Row kRows[] = {
     {"duplicate", handset::Duplicate(), Harm::kPasses},
     {"leading noise", handset::LeadingNoise(40), Harm::kPasses},
     {"merge", handset::Merge(), Harm::kAgain},
-    {"delay", handset::Delay(60), Harm::kAgain},
+    {"delay", handset::Delay(120), Harm::kAgain},
     {"after the next request", handset::AfterNextRequest(), Harm::kAgain},
     {"lose", handset::Lose(), Harm::kAgain, true},
     {"corrupt", handset::Corrupt(), Harm::kAgain, true},
@@ -39,7 +39,7 @@ const Row kRows[] = {
     {"hang up", handset::HangUp(), Harm::kGone},
 };
 
-constexpr uint32_t kTimeOutMs = 40;  // the delayed answer comes behind it
+constexpr uint32_t kTimeOutMs = 80;  // the delayed answer comes behind it
 
 class EfsFaults : public test::EfsTest {
  protected:
@@ -150,14 +150,6 @@ TEST_F(EfsFaults, StrikeItems) {
       fetched);
   run_ = 0;
   Strike(
-      {39},
-      [&] {
-        folder_.Add("target", "before");
-        return KRAL_Efs2GetItem(handle(), target.c_str(), "/item", 1024);
-      },
-      fetched);
-  run_ = 0;
-  Strike(
       {38}, [&] { return KRAL_EfsPutItemFromMem(handle(), Path().c_str(), item.data(), 100); },
       [&](bool passed) {
         const auto file = handset().efs().File(Path());
@@ -207,7 +199,7 @@ TEST_F(EfsFaults, HandlesThatLateAnswersTellOfAreClosed) {
   handset().efs().AddFile("/f", data_);
   ShortenTimeOuts(kTimeOutMs);
   // Later than the moment for which late answers are waited for, and in the middle of the transfer.
-  handset().faults().Add(handset::Delay(250), handset::When::Nth(1).Of("4B 13 02"));
+  handset().faults().Add(handset::Delay(300), handset::When::Nth(1).Of("4B 13 02"));
   handset().faults().Add(handset::Delay(15), handset::When::Always().Of("4B 13 04"));
   KRAL_SetEfsReadAndWritePacketSize(handle(), 40, 524);
   Bytes back(700);
