@@ -48,8 +48,9 @@ u8 Judged(Diag_FTM& phone, u16 item, u8 status) {
   return kDone;
 }
 
-// Reads the item results up to the first failing one. A reply that holds fewer than it tells counts as a failure.
-bool TakeResults(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
+// Reads the item results up to the first failing one. A reply that holds fewer than it tells counts as a failure, as
+// does one that tells of more or fewer items than were sent.
+bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchObserver& observer) {
   const auto reply = phone.packet().response();
   const auto count = LoadLe<u16>(reply, batch::kResultCount);
   const auto total_status = LoadLe<u16>(reply, batch::kTotalStatus);
@@ -75,7 +76,9 @@ bool TakeResults(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& ob
     ++outcome.items_written;
     rest = rest.subspan(batch::kItemHeader + rest[0]);
   }
-  return true;
+  if (*count == sent) return true;
+  phone.log().WriteLine(kLogErr, "NV batch reply has %d item results for %d items", *count, sent);
+  return false;
 }
 
 bool SendPacket(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
@@ -87,7 +90,7 @@ bool SendPacket(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& obs
                           "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Error occurred during send sync operation.");
     return false;
   }
-  return TakeResults(phone, outcome, observer);
+  return TakeResults(phone, count, outcome, observer);
 }
 
 }  // namespace

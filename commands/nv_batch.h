@@ -26,7 +26,7 @@ struct BatchOutcome {
 // Each item result as it is read; status 0 also for an item of the read-only list that was refused as such.
 using BatchObserver = std::function<void(uint16_t item, uint8_t status)>;
 
-// Sends what is queued and leaves batch mode, whatever happens. True when every packet was answered and no item failed;
+// Sends what is queued and leaves batch mode, whatever happens. True when every item was answered and none failed;
 // the first failing item ends the flush behind its packet, and what is still queued is dropped.
 bool FlushBatchQueue(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer = {});
 

@@ -220,6 +220,8 @@ TEST_F(NvBatchMode, FailingItemOrPacketEndsTheFlush) {
       {"4B 30 00 00 01 00 02 00 00", 65535},              // ends within the total status
       {"4B 30 00 00 01 00 02 00 00 00 02 01 00", 65535},  // within an item's header
       {"4B 30 00 00 02 00 02 00 00 00 00 01 00 00 05 01 00 00 AA", 1},
+      {"4B 30 00 00 00 00 00 00 00 00", 65535},                      // tells of no item
+      {"4B 30 00 00 02 00 08 00 00 00 00 01 00 00 00 02 00 00", 2},  // of one more than was sent
   };
   for (const auto& broken : kBroken) {
     SCOPED_TRACE(broken.reply);
