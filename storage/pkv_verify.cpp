@@ -21,12 +21,17 @@ class VerifyJob {
     }
     const KRAL_PKV_COUNTS& counts = report_.counts();
     if (counts.not_reached > 0) return KRAL_PKV_STATUS_LOST;
-    return counts.done == counts.total ? KRAL_PKV_STATUS_DONE : KRAL_PKV_STATUS_DIFFERENT;
+    return counts.done + counts.skipped == counts.total ? KRAL_PKV_STATUS_DONE : KRAL_PKV_STATUS_DIFFERENT;
   }
 
  private:
   // These give false when the caller has stopped the job.
   bool Compare(const PkvNvItem& item) {
+    // No request names both a subscription and an element.
+    if (item.subscription != 0 && arrays_.IsElement(item)) {
+      report_.Add(item, KRAL_PKV_SKIPPED, 0);
+      return !report_.stopped();
+    }
     PkvNvItem present = item;
     const Answer answer = lost_ ? Answer::kLost : items_.Read(present, arrays_.IsElement(item));
     const bool equal = answer == Answer::kAnswered && present.status == 0 && present.data == item.data;

@@ -121,10 +121,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, cons
 KRAL_API uint8_t KRAL_CALL KRAL_RestoreNVFromPKV(KRAL_HANDLE handle, const char* file, uint32_t* status);
 
 /**
- * Compares the items and files of a PKV file with those of the handset, which is not changed. An addition to the
- * interface.
+ * Compares the items and files of a PKV file with those of the handset, which is not changed. Elements of array items
+ * of another subscription than 0 cannot be asked for and are skipped. An addition to the interface.
  *
- * @return 1 when the handset holds everything as it is in the file
+ * @return 1 when the handset holds everything, but for what was skipped, as it is in the file
  */
 KRAL_API uint8_t KRAL_CALL KRAL_PKV_Verify(KRAL_HANDLE handle, const char* file, uint32_t* status);
 

@@ -210,6 +210,7 @@ TEST_F(PkvBackup, ElementsGoToTheElementsOfArrays) {
   EXPECT_EQ(handset().nv().Element(5, 2).value_or(Bytes{0})[0], 3);
   EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
   EXPECT_EQ(g_results["5[1]"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["5[1]/1"], Result(KRAL_PKV_SKIPPED, 0)) << "not compared with the element of subscription 0";
 }
 
 TEST_F(PkvBackup, DefinitionsNameElementsAndItemsBeyondTheRange) {
