@@ -1,6 +1,7 @@
 // Keeps definitions and finds them by index, id and path.
 #include "storage/nv_definitions.h"
 
+#include <algorithm>
 #include <charconv>
 #include <utility>
 
@@ -9,6 +10,7 @@ namespace {
 
 constexpr std::string_view kRfFolder = "/nv/item_files/rfnv/";
 constexpr size_t kRfDigits = 8;
+constexpr size_t kLongestGenericPath = 200;  // a request with a path has room for little more
 
 }  // namespace
 
@@ -25,6 +27,11 @@ std::optional<uint16_t> RfIdOfPath(std::string_view path) {
     return std::nullopt;
   }
   return id;
+}
+
+bool IsUsualPath(std::string_view path) {
+  return !path.empty() && path.size() <= kLongestGenericPath &&
+         std::all_of(path.begin(), path.end(), [](char c) { return c >= ' ' && c <= '~'; });
 }
 
 NvTypePtr NvDefinitions::FindType(std::string_view name) const {
@@ -62,13 +69,13 @@ bool NvDefinitions::Put(NvItem item) {
   } else {
     index = by_id_.try_emplace(*item.id, index).first->second;
   }
-  const bool replaces = index < items.size();
-  if (replaces) {
-    items[index] = std::move(item);
-  } else {
+  if (index == items.size()) {
     items.push_back(std::move(item));
+    return false;
   }
-  return replaces;
+  const bool was_generic = items[index].generic;
+  items[index] = std::move(item);
+  return !was_generic;
 }
 
 void NvDefinitions::Clear() {

@@ -51,6 +51,9 @@ struct NvItem {
 // The id in the path of an RF NV item: /nv/item_files/rfnv/00020001 is 20001; nothing for other paths.
 std::optional<uint16_t> RfIdOfPath(std::string_view path);
 
+// Whether a path can get a generic definition: it fits a request and can stand in XML, reports and logs.
+bool IsUsualPath(std::string_view path);
+
 class NvDefinitions {
  public:
   // --- Data types ----------------------------------------------------------------------------------------------------
@@ -66,7 +69,7 @@ class NvDefinitions {
   NvItem* Find(uint16_t id);
   NvItem* Find(std::string_view path);
 
-  // True when the item takes the place of one with the same id or path, whose values are gone.
+  // The item takes the place of one with the same id or path, whose values are gone: true when that was not made up.
   bool Put(NvItem item);
   void Clear();
 

@@ -30,15 +30,20 @@ NvAnswer NvMobile::Judged(Answer answer, uint16_t status) {
   return {phone_.IsPhoneConnected() ? Kind::kRefused : Kind::kNoAnswer};
 }
 
+bool NvMobile::CanName(const NvItem& item) const {
+  return item.is_file() || !item.is_array() || subscription_ == 0;
+}
+
 PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
   PkvNvItem numbered;
   numbered.id = *item.id;
   numbered.index = element;
-  numbered.subscription = item.is_array() ? uint16_t{0} : subscription_;
+  numbered.subscription = subscription_;
   return numbered;
 }
 
 NvAnswer NvMobile::Read(const NvItem& item, uint16_t element, NvBytes& stored) {
+  if (!CanName(item)) return {Kind::kRefused, kNeverWritten};
   if (item.is_file()) {
     uint16_t status = kDone;
     // Outside factory test mode the same bytes are read from the item's file.
@@ -52,11 +57,14 @@ NvAnswer NvMobile::Read(const NvItem& item, uint16_t element, NvBytes& stored) {
   const Answer answer = items_.Read(numbered, item.is_array());
   const size_t size = item.is_array() ? kDataSize - 1 : kDataSize;
   stored.assign(numbered.data.begin(), numbered.data.begin() + static_cast<std::ptrdiff_t>(size));
-  phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, numbered.status);
+  if (answer == Answer::kAnswered) {
+    phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, numbered.status);
+  }
   return Judged(answer, numbered.status);
 }
 
 NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored) {
+  if (!CanName(item)) return {Kind::kRefused};
   uint16_t status = kDone;
   if (item.is_file()) {
     if (item.id && has_rf_dispatcher_) {
@@ -68,7 +76,9 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
   PkvNvItem numbered = Numbered(item, element);
   std::copy_n(stored.begin(), std::min(stored.size(), numbered.data.size()), numbered.data.begin());
   const Answer answer = items_.Write(numbered, item.is_array(), status);
-  phone_.log().WriteLine(kLogRet, "DIAG_NV_WRITE_F NV Id:%d Status:%d", *item.id, status);
+  if (answer == Answer::kAnswered) {
+    phone_.log().WriteLine(kLogRet, "DIAG_NV_WRITE_F NV Id:%d Status:%d", *item.id, status);
+  }
   return Judged(answer, status);
 }
 

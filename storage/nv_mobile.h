@@ -24,8 +24,10 @@ struct NvAnswer {
 // One walk over items: what it has found out about the handset, it does not ask again.
 class NvMobile {
  public:
-  // Plain items are those of the subscription; elements of arrays have no request that names one.
   NvMobile(Diag_FTM& phone, uint16_t subscription) : phone_(phone), subscription_(subscription), items_(phone) {}
+
+  // No request names both an element and a subscription: of another than 0, arrays have no value and take none.
+  bool CanName(const NvItem& item) const;
 
   // Values as they are kept (storage/nv_value.h). What gets no answer in spite of several tries counts as refused as
   // long as the handset answers others.

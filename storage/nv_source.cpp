@@ -115,8 +115,8 @@ std::string SourceText(const NvSource& source) {
   for (const auto& [number, list] : source.roaming_lists) {
     text += "<PRLItem nam=\"" + HexNumber(number) + "\">" + EscapeXml(list) + "</PRLItem>\n";
   }
-  text += kEnd;
-  return text + "\n";
+  text += kEnd;  // nothing comes behind it, not even the end of the line
+  return text;
 }
 
 NvError SaveSource(const std::string& path, const NvSource& source) {

@@ -90,7 +90,9 @@ class NVTool_Manager final : public FamilyObject {
 
   NvItem* ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, uint16_t highest_index);
   NvError TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored);
-  NvError TakeSource(Diag_FTM& phone, const NvSourceItem& entry);
+  NvError TakeFile(Diag_FTM& phone, const PkvEfsFile& entry);
+  // The highest index of the id in the source file makes an item that nobody defined an array.
+  NvError TakeSource(Diag_FTM& phone, const NvSourceItem& entry, uint16_t highest_index);
   bool AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value, PkvSet& set) const;
 
   const KRAL_HANDLE handle_;

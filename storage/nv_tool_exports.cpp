@@ -118,7 +118,8 @@ uint32_t ClearValue(KRAL_HANDLE handle, const char* name, Key key) {
 
 extern "C" {
 
-uint32_t KRAL_CALL KRAL_NV_GetErrorText(KRAL_HANDLE, uint32_t code, char* text, uint32_t size) {
+uint32_t KRAL_CALL KRAL_NV_GetErrorText(KRAL_HANDLE handle, uint32_t code, char* text, uint32_t size) {
+  kral::LogName(handle, "KRAL_NV_GetErrorText");
   return static_cast<uint32_t>(Give(TextOf(code), text, size));
 }
 

@@ -36,6 +36,13 @@ NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
   return ErrorOf(outcome);
 }
 
+// A path of a file as a title.
+std::string Printable(std::string path) {
+  std::replace_if(
+      path.begin(), path.end(), [](char c) { return c < ' ' || c > '~'; }, '?');
+  return path;
+}
+
 NvError SaveText(const std::string& file, const std::string& text, NvError failure) {
   const std::vector<uint8_t> bytes(text.begin(), text.end());
   return ReplaceWholeFile(file, bytes) ? failure : NvError::kNone;
@@ -60,10 +67,7 @@ NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, s
 NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, uint16_t highest_index) {
   NvItem* item = definitions_.Find(entry.id);
   if (item == nullptr && highest_index <= kHighestElement) {
-    NvItem generic = GenericItem(entry.id);
-    generic.max_index = highest_index;
-    if (highest_index > 0) generic.type = std::make_shared<NvDataType>(NvDataType::Generic(kDataSize - 1));
-    item = &Define(phone, std::move(generic));
+    item = &Define(phone, GenericItem(entry.id, highest_index));
   }
   return item != nullptr && !item->is_file() && entry.index <= item->max_index ? item : nullptr;
 }
@@ -91,11 +95,22 @@ NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
     walk.Report("NV ID " + std::to_string(entry.id), error);
   }
   for (const PkvEfsFile& entry : set.files) {
-    NvItem* item = definitions_.Find(entry.path);
-    if (item == nullptr) item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
-    walk.Report(entry.path, item->will_read ? TakeStored(phone, *item, {}, entry.bytes) : NvError::kNone);
+    walk.Report(Printable(entry.path), TakeFile(phone, entry));
   }
   return walk.failed() ? NvError::kBadPkvItem : NvError::kNone;
+}
+
+NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const PkvEfsFile& entry) {
+  NvItem* item = definitions_.Find(entry.path);
+  if (item == nullptr) {
+    if (entry.bytes.size() > kLongestValue || !IsUsualPath(entry.path)) {
+      phone.log().WriteLine(kLogErr, "A file of %u bytes is left out: it is too large or its name is unusual",
+                            static_cast<unsigned>(entry.bytes.size()));
+      return NvError::kBadPkvItem;
+    }
+    item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
+  }
+  return item->will_read ? TakeStored(phone, *item, {}, entry.bytes) : NvError::kNone;
 }
 
 bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value,
@@ -149,16 +164,22 @@ NvError NVTool_Manager::LoadFromSource(Diag_FTM& phone, const std::string& file)
     phone.log().WriteLine(kLogErr, "%s", problem.c_str());
     return error;
   }
+  std::map<uint16_t, uint16_t> highest;
+  for (const NvSourceItem& entry : source.items) {
+    if (!entry.id) continue;
+    auto& index = highest[*entry.id];
+    index = std::max(index, entry.slot.element);
+  }
   Walk walk(*this, KRAL_NV_OPERATION_READ_SOURCE, source.items.size());
   for (const NvSourceItem& entry : source.items) {
-    const NvError error = TakeSource(phone, entry);
+    const NvError error = TakeSource(phone, entry, entry.id ? highest[*entry.id] : uint16_t{0});
     walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, error);
   }
   for (auto& [number, list] : source.roaming_lists) roaming_lists_[number] = std::move(list);
   return walk.failed() ? NvError::kBadSourceItem : NvError::kNone;
 }
 
-NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry) {
+NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry, uint16_t highest_index) {
   const auto reject = [&](const std::string& problem) {
     phone.log().WriteLine(kLogErr, "%s: %s", (entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path).c_str(),
                           problem.c_str());
@@ -170,7 +191,10 @@ NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry) {
   NvItem* item = entry.id ? definitions_.Find(*entry.id) : definitions_.Find(entry.path);
   if (item == nullptr) {
     if (entry.is_direct) return reject("decimal numbers need a definition");
-    NvItem generic = entry.id ? GenericItem(*entry.id) : GenericFile(entry.path, bytes->size());
+    if (!entry.id && (bytes->size() > kLongestValue || !IsUsualPath(entry.path))) {
+      return reject("it is too large or its name is unusual");
+    }
+    NvItem generic = entry.id ? GenericItem(*entry.id, highest_index) : GenericFile(entry.path, bytes->size());
     generic.name = entry.name;
     item = &Define(phone, std::move(generic));
   }

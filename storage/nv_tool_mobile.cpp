@@ -8,13 +8,6 @@
 namespace kral::nv {
 namespace {
 
-constexpr size_t kLongestGenericPath = 200;  // a request with a path has room for little more
-
-// What can stand in XML, reports and logs.
-bool IsPrintable(const std::string& path) {
-  return std::all_of(path.begin(), path.end(), [](char c) { return c >= ' ' && c <= '~'; });
-}
-
 size_t CountElements(const std::vector<NvItem*>& items) {
   size_t count = 0;
   for (const NvItem* item : items) count += size_t{item->max_index} + 1;
@@ -25,7 +18,8 @@ size_t CountElements(const std::vector<NvItem*>& items) {
 
 NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
   NvMobile mobile(phone, subscription_);
-  if (!DefineItemFiles(phone, mobile)) return NvError::kNoConnection;
+  const bool listed = DefineItemFiles(phone, mobile);
+  if (!listed && !phone.IsPhoneConnected()) return NvError::kNoConnection;
   const std::vector<NvItem*> items = Chosen(&NvItem::will_read);
   Walk walk(*this, KRAL_NV_OPERATION_READ_MOBILE, CountElements(items));
   for (NvItem* item : items) {
@@ -36,26 +30,24 @@ NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
       if (error == NvError::kNoConnection) return error;
     }
   }
-  return walk.failed() ? NvError::kCannotGetValue : NvError::kNone;
+  return walk.failed() || !listed ? NvError::kCannotGetValue : NvError::kNone;
 }
 
-// False when the handset does not answer any more.
+// False when there may be more files than those that were found.
 bool NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
   std::vector<PhoneItems::FoundFile> files;
-  if (!mobile.ListItemFiles(files)) {
-    if (!phone.IsPhoneConnected()) return false;
-    phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
-  }
+  const bool listed = mobile.ListItemFiles(files);
+  if (!listed) phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
   for (const auto& [path, mode, size] : files) {
     const std::string other = path.starts_with('/') ? path.substr(1) : "/" + path;
     if (definitions_.Find(path) != nullptr || definitions_.Find(other) != nullptr) continue;
-    if (size > kLongestValue || path.size() > kLongestGenericPath || !IsPrintable(path)) {
+    if (size > kLongestValue || !IsUsualPath(path)) {
       phone.log().WriteLine(kLogErr, "A file of %u bytes is left out: it is too large or its name is unusual", size);
       continue;
     }
     Define(phone, GenericFile(path, size));
   }
-  return true;
+  return listed;
 }
 
 // kNoValue: the handset has none.
@@ -75,18 +67,21 @@ NvError NVTool_Manager::ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& i
 
 NvError NVTool_Manager::ReadWhole(Diag_FTM& phone, NvItem& item, uint16_t& status) {
   NvMobile mobile(phone, subscription_);
-  NvError result = NvError::kNone;
+  NvError failure = NvError::kNone;
+  bool has_value = false;
   for (uint32_t element = 0; element <= item.max_index; ++element) {
     uint16_t told = 0;
-    NvError error = ReadElement(phone, mobile, item, static_cast<uint16_t>(element), told);
+    const NvError error = ReadElement(phone, mobile, item, static_cast<uint16_t>(element), told);
     if (error == NvError::kNoConnection) return error;
-    if (error == NvError::kNoValue) error = item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
+    has_value = has_value || error == NvError::kNone;
     // The first failure is what is told.
-    if (result != NvError::kNone || error == NvError::kNone) continue;
-    result = error;
+    if (error == NvError::kNone || error == NvError::kNoValue || failure != NvError::kNone) continue;
+    failure = error;
     status = told;
   }
-  return result;
+  if (failure != NvError::kNone || has_value) return failure;
+  status = kNeverWritten;
+  return item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
 }
 
 // An item that nobody defined gets its definition when the handset has it: as a numbered item, else as an RF NV item.
@@ -96,13 +91,15 @@ NvError NVTool_Manager::ReadItem(Diag_FTM& phone, uint16_t id, uint16_t& status)
   const NvError error = ReadWhole(phone, generic, status);
   if (error == NvError::kNone) Define(phone, std::move(generic));
   if (error == NvError::kNone || error == NvError::kNoConnection) return error;
-  return ReadItem(phone, pkv::RfNvPath(id)) == NvError::kNone ? NvError::kNone : error;
+  if (ReadItem(phone, pkv::RfNvPath(id)) != NvError::kNone) return error;
+  status = 0;
+  return NvError::kNone;
 }
 
 NvError NVTool_Manager::ReadItem(Diag_FTM& phone, const std::string& path) {
   uint16_t status = 0;
   if (NvItem* item = definitions_.Find(path)) return ReadWhole(phone, *item, status);
-  if (path.empty() || path.size() > kLongestGenericPath || !IsPrintable(path)) return NvError::kNotDefined;
+  if (!IsUsualPath(path)) return NvError::kNotDefined;
   NvItem generic = GenericFile(path, 0);
   const NvError error = ReadWhole(phone, generic, status);
   if (error == NvError::kNone) Define(phone, std::move(generic));
@@ -115,6 +112,11 @@ NvError NVTool_Manager::WriteElement(Diag_FTM& phone, NvMobile& mobile, const Nv
   const auto stored = ToStored(item, value);
   if (!stored) {
     phone.log().WriteLine(kLogErr, "%s: its value has no room on the handset", item.Title().c_str());
+    return failure;
+  }
+  if (!mobile.CanName(item)) {
+    phone.log().WriteLine(kLogErr, "%s: elements of arrays can be written for subscription 0 only",
+                          item.Title().c_str());
     return failure;
   }
   const NvAnswer answer = mobile.Write(item, slot.element, *stored);

@@ -73,10 +73,11 @@ std::optional<NvBytes> FromHex(std::string_view text) {
   return bytes;
 }
 
-NvItem GenericItem(uint16_t id) {
+NvItem GenericItem(uint16_t id, uint16_t highest_element) {
   NvItem item;
   item.id = id;
-  item.type = std::make_shared<NvDataType>(NvDataType::Generic(kDataSize));
+  item.max_index = highest_element;
+  item.type = std::make_shared<NvDataType>(NvDataType::Generic(RoomOf(item)));
   item.generic = true;
   return item;
 }

@@ -26,7 +26,7 @@ std::optional<NvBytes> FromHex(std::string_view text);
 
 // --- Made-up definitions ---------------------------------------------------------------------------------------------
 
-NvItem GenericItem(uint16_t id);
+NvItem GenericItem(uint16_t id, uint16_t highest_element = 0);
 NvItem GenericFile(std::string path, size_t size);
 
 }  // namespace kral::nv

@@ -15,6 +15,9 @@
  * - An item has one value for each subscription and, when it is an array, for each array index (0 for all others).
  *   Functions act on the current subscription; files have one value for all. Value strings are decimal numbers,
  *   member by member, separated by commas. They are checked against the ranges of the members when they are set.
+ * - No request to the handset names both an array index and a subscription: the handset holds arrays of subscription 0
+ *   only. In another one, array items have no value when they are read (status 5) and are refused when they are written
+ *   (11); files take their values of every subscription.
  * - Texts are terminated. A function that returns one has a companion, ...StringLength, that tells the bytes it needs,
  *   the zero included; a buffer that is too small gives 12 and stays as it is.
  * - Functions that move a set go on behind an item that fails, and say in the text log which it was. The files that
@@ -56,7 +59,7 @@ typedef void(KRAL_CALL* KRAL_NV_CALLBACK)(uint32_t operation, uint32_t done, uin
 /**
  * The text of an error code; "UNKNOWN" for codes beyond 23.
  *
- * @param handle  not looked at; may be 0
+ * @param handle  whose text log gets the line with the function's name; may be 0
  * @param size    bytes of `text`; 128 hold every text
  * @return 0; 12 for a buffer that is too small
  */
@@ -71,7 +74,8 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_N
  * Loads definitions. They join those that are loaded already; one for the same id or path takes the place of the older
  * one, whose value is lost.
  *
- * @return 0; 13 when an item was redefined (all were loaded); 4 or 6 when nothing was loaded
+ * @return 0; 13 when an item was redefined that a file had defined, not one with a generic definition (all were
+ *         loaded); 4 or 6 when nothing was loaded
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_LoadNVDefinitionFile(KRAL_HANDLE handle, const char* file);
 
@@ -166,12 +170,14 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_ClearNVValues(KRAL_HANDLE handle);
  * files get a generic definition when they have none. Items that were never written (status 5) have no value
  * afterwards, as those that the handset refuses.
  *
- * @return 0; 12 when the handset refused items with another status than 5; 16 when it does not answer
+ * @return 0; 12 when the handset refused items with another status than 5, or its files could not be listed to the end
+ *         (all others were read); 16 when it does not answer
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_LoadNVsFromMobile(KRAL_HANDLE handle);
 
 /**
- * Takes the values of a PKV file, of all subscriptions. Items without a definition get a generic one.
+ * Takes the values of a PKV file, of all subscriptions. Items without a definition get a generic one, except files
+ * with a path of more than 200 characters or with other than printable ASCII characters, which are not taken.
  *
  * @return 0; 20 when items of the file could not be taken (the others were); 7 or 18 when the file could not be opened
  */
@@ -195,9 +201,9 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const c
 
 /* --- Single items, whatever the filters say -------------------------------------------------------------------------
  *
- * Of an array item all elements are read, and those that have a value are written. 12 and 11: the handset refused a
- * numbered item, with what `status` tells (it may be null); 22 and 23: an RF NV item or a file could not be read or
- * written; 16: no answer.
+ * Of an array item all elements are read, and those that have a value are written; elements that were never written
+ * (status 5) are a failure only when all of them are. 12 and 11: the handset refused a numbered item, with what
+ * `status` tells (it may be null); 22 and 23: an RF NV item or a file could not be read or written; 16: no answer.
  */
 
 /** An item without a definition gets a generic one. */

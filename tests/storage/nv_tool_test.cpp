@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "storage/nv_compression.h"
+#include "storage/pkv_set.h"
 #include "tests/support/nv_fixture.h"
 
 namespace kral {
@@ -115,6 +116,7 @@ TEST_F(NvTool, ItemFilesOfTheHandsetGetGenericDefinitions) {
   handset().mode().SetState(handset::ModeState::kFactoryTest);
   uint16_t status = 9;
   EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 20006, &status), 0u);
+  EXPECT_EQ(status, 0);
   EXPECT_EQ(Value(20006), "1,2,3");
   EXPECT_GE(CountRequests("4B 0B 24 00 00 00 26 4E"), 1u) << "in factory test mode, by its dispatcher";
 }
@@ -176,6 +178,32 @@ TEST_F(NvTool, SubscriptionsUseTheRequestsThatNameThem) {
             std::string::npos);
 }
 
+TEST_F(NvTool, ArraysHaveGapsAndNoOtherSubscription) {
+  ASSERT_EQ(Load("<NvItem id='30' maxIndex='2'>" + std::string(kTwoBytes) + "</NvItem>"), 0u);
+  handset().nv().MakeArray(30, 3);
+  uint16_t status = 9;
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 30, &status), 12u);
+  EXPECT_EQ(status, 5) << "no element has a value";
+  ASSERT_EQ(Set(30, "3,4", 1), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVItemToMobileByNVID(handle(), 30, &status), 0u);
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 30, &status), 0u);
+  EXPECT_EQ(Value(30, 0) + " " + Value(30, 1), "error 10 3,4");
+
+  KRAL_NV_SetTargetSupportMultiSIM(handle(), 1);
+  KRAL_NV_SetCurrentSubscriptionIndex(handle(), 1);
+  const size_t requests = handset().requests().size();
+  ASSERT_EQ(Set(30, "5,6", 1), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 11u);
+  EXPECT_NE(ErrorText().find("NV ID 30: elements of arrays can be written for subscription 0 only"), std::string::npos);
+  EXPECT_EQ(KRAL_NV_ReadNVItemFromMobileByNVID(handle(), 30, &status), 12u);
+  EXPECT_EQ(status, 5);
+  EXPECT_EQ(handset().requests().size(), requests);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u);
+  EXPECT_EQ(Value(30, 1), "error 10");
+  EXPECT_EQ(handset().nv().Element(30, 1)->front(), 3);
+}
+
 TEST_F(NvTool, HandsetThatRefusesHalfOfTheItemsGetsTheRest) {
   std::string items;
   for (int id = 100; id < 120; ++id) items += Item(id);
@@ -212,6 +240,11 @@ TEST_F(NvTool, LostAnswersAreAskedForAgainAndAPulledCableEndsTheSet) {
   handset().nv().Set(2, FromHex("06 06"));
   KRAL_NV_LoadNVsFromMobile(handle());
   EXPECT_EQ(Value(1) + " " + Value(2) + " " + Value(3), "4,5 6,6 4,5");
+  handset().efs().AddItemFile("/nv/item_files/conf/item", FromHex("01"));
+  handset().faults().Add(handset::Refuse(20), handset::When::Always().Of("4B 13 0C"));
+  EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 12u) << "the files could not be listed";
+  EXPECT_EQ(Value(3), "4,5");
+  handset().faults().Clear();
   Set(2, "4,5");
   handset().faults().Add(handset::HangUp(), handset::When::Nth(2).Of("26"));
   EXPECT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 16u);
@@ -272,7 +305,7 @@ TEST_F(NvTool, SourceFileIsWrittenByTheLetter) {
             "<NvEfsItem fullpathname=\"/nv/z\" name=\"raw\" mapping=\"byteStream\" encoding=\"hex\" index=\"0\">0A 0B"
             "</NvEfsItem>\n"
             "<PRLItem nam=\"1f\">AA BB</PRLItem>\n"
-            "</NvSource>\n");
+            "</NvSource>");
 }
 
 TEST_F(NvTool, SourceItemsThatCannotBeTakenLeaveTheOthers) {
@@ -324,11 +357,18 @@ TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
   EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u);
   EXPECT_EQ(Value(30, 2).substr(0, 6), "3,4,0,");
   EXPECT_EQ(Value(30, 1), "error 10");
-  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
+  // The same by way of a source file, where the highest index comes last.
+  Source();
+  EXPECT_EQ(KRAL_NV_ClearNVDefinition(handle()), 0u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), Path("out.xml").c_str()), 0u) << ErrorText();
+  EXPECT_EQ(Value(30, 0).substr(0, 6) + Value(30, 2).substr(0, 6), "3,4,0,3,4,0,");
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
   EXPECT_EQ(HexText(ByteView(*handset().nv().Element(30, 2)).first(3)), "03 04 00");
 
   // Another definition, which the values do not satisfy.
-  ASSERT_EQ(Load(Item(30) + "<NvItem id='1' compressed='1'>" + kTwoBytes + "</NvItem>"), 13u);
+  const std::string others = Item(30) + "<NvItem id='1' compressed='1'>" + kTwoBytes + "</NvItem>";
+  ASSERT_EQ(Load(others), 0u) << "generic definitions come from no file";
+  ASSERT_EQ(Load(others), 13u);
   EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
   EXPECT_EQ(Value(1), "error 10");
   EXPECT_EQ(Value(30), "3,4");
@@ -339,6 +379,22 @@ TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
   EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), Path("no/such/folder.pkv").c_str()), 7u);
   KRAL_NV_ClearNVValues(handle());
   EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), Path("empty.pkv").c_str()), 10u);
+}
+
+TEST_F(NvTool, PkvFilesWithPathsThatFitNowhereAreLeftOut) {
+  PkvSet set;
+  const std::string longest(200, 'p');
+  for (const std::string& path : {std::string("/nv/b\nt"), std::string("/nv/\xC3\xA4"), longest + "p"}) {
+    set.files.push_back({path, 0xE1B6, FromHex("01")});
+  }
+  set.files.push_back({longest, 0xE1B6, FromHex("02")});
+  const std::string pkv = Path("paths.pkv");
+  ASSERT_TRUE(WritePkv(pkv, set).done());
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
+  uint32_t files = 0;
+  KRAL_NV_GetNumOfNVEfsDefinition(handle(), &files);
+  EXPECT_EQ(files, 1u);
+  EXPECT_EQ(FileValue(longest.c_str()), "2");
 }
 
 // --- Filters ---------------------------------------------------------------------------------------------------------
