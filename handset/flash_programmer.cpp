@@ -30,8 +30,8 @@ bool IsTable(ByteView table) {
 }
 
 Bytes Begin(std::string_view magic, uint8_t code) {
-  Bytes packet = {code};
-  packet.insert(packet.end(), magic.begin(), magic.end());
+  Bytes packet(1 + magic.size(), code);
+  std::copy(magic.begin(), magic.end(), packet.begin() + 1);
   return packet;
 }
 

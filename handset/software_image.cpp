@@ -21,9 +21,8 @@ std::optional<std::string> SoftwareRevision(const FlashMemory& flash) {
 }
 
 Bytes MakeSoftware(std::string_view revision, size_t size) {
-  Bytes image(kMark.begin(), kMark.end());
-  image.insert(image.end(), revision.begin(), revision.end());
-  image.push_back(0);
+  Bytes image(kMark.size() + revision.size() + 1);
+  std::copy(revision.begin(), revision.end(), std::copy(kMark.begin(), kMark.end(), image.begin()));
   for (size_t i = image.size(); i < size; ++i) image.push_back(static_cast<uint8_t>(i * 5 + (i >> 8)));
   return image;
 }
