@@ -9,6 +9,8 @@
 namespace kral::efs {
 namespace {
 
+constexpr u32 kMostEntries = 1'000'000;  // a listing that goes on beyond these has no end
+
 struct Entry {
   u32 type;  // the handset's
   KRAL_EFS_ENTRY record;
@@ -83,7 +85,7 @@ bool List(Diag_FTM& phone, const std::string& folder, uint8_t filter, KRAL_EFS_E
   const u32 room = entries == nullptr || count == nullptr ? 0 : *count;
   u32 selected = 0;
   for (u32 sequence = kFirstEntry;; ++sequence) {
-    if (IsAborted(phone, "Readdir")) return false;
+    if (IsAborted(phone, "Readdir") || sequence > kMostEntries) return false;
     auto read = ReadEntry(phone, directory.value(), sequence);
     if (!read) {
       IsAborted(phone, "Readdir");

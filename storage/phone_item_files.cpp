@@ -19,6 +19,7 @@ constexpr std::array<const char*, 5> kFolders = {"/nv/items", "nv/item_files/con
 constexpr int kDeepest = 8;
 constexpr uint32_t kMostEntries = 20000;  // of one folder, and files in all
 constexpr uint32_t kUsualEntries = 256;
+constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
 
 constexpr uint32_t kDirectory = 0x4000;
@@ -37,7 +38,7 @@ PhoneItems::Answer PhoneItems::Status(const char* path, uint32_t& mode, uint32_t
 
 bool PhoneItems::List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries) {
   entries.resize(kUsualEntries);
-  for (;;) {
+  for (int i = 0; i < kListings; ++i) {
     auto count = static_cast<uint32_t>(entries.size());
     if (!efs::ListDirectory(phone_, folder.c_str(), KRAL_EFS_FILTER_ALL, entries.data(), &count)) return false;
     if (count > kMostEntries) return false;
@@ -45,6 +46,7 @@ bool PhoneItems::List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& en
     entries.resize(count);
     if (complete) return true;
   }
+  return false;
 }
 
 PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::vector<FoundFile>& files) {

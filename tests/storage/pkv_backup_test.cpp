@@ -383,6 +383,7 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
 
 TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
   handset().efs().AddItemFile("/nv/items/good", Bytes{1});
+  for (int i = 0; i < 300; ++i) handset().efs().AddLink("/nv/items/" + std::to_string(i), "good");  // listed twice
   handset().efs().AddFile("/nv/items/huge", Bytes((1 << 20) + 1));
   std::string deep = "/nv/items";
   for (int i = 0; i < 12; ++i) deep += "/d";
