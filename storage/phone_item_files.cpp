@@ -49,32 +49,57 @@ bool PhoneItems::List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& en
   return false;
 }
 
-PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::vector<FoundFile>& files) {
+void PhoneItems::TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted) {
+  phone_.log().WriteLine(kLogErr, "Files of %s not listed, error %u", folder.c_str(), status);
+  unlisted.push_back({folder, status});
+}
+
+PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::vector<FoundFile>& files,
+                                    std::vector<UnlistedFolder>& unlisted) {
   uint32_t mode = 0;
   uint32_t size = 0;
   uint32_t status = 0;
   const Answer answer = Status(folder.c_str(), mode, size, status);
   if (answer == Answer::kLost) return answer;
-  if (answer == Answer::kRefused || status != efs::kDone || (mode & efs::kModeKind) != kDirectory || depth > kDeepest)
+  // A handset without a file system, or without this folder.
+  if (answer == Answer::kRefused ? refusal_ == efs::kBadCommand : status == efs::kMissing) return Answer::kAnswered;
+  if (status == efs::kDone && (mode & efs::kModeKind) != kDirectory) return Answer::kAnswered;
+  if (status != efs::kDone || depth > kDeepest) {
+    TellUnlisted(folder, status != efs::kDone ? status : kRefusedStatus, unlisted);
     return Answer::kAnswered;
+  }
   std::vector<KRAL_EFS_ENTRY> entries;
-  if (!List(folder, entries)) return Answer::kLost;
+  if (!List(folder, entries)) {
+    if (Unanswered() == Answer::kLost) return Answer::kLost;
+    TellUnlisted(folder, kRefusedStatus, unlisted);
+    return Answer::kAnswered;
+  }
   for (const KRAL_EFS_ENTRY& entry : entries) {
+    if (files.size() >= kMostEntries) {
+      TellUnlisted(folder, kRefusedStatus, unlisted);
+      return Answer::kAnswered;
+    }
     if (entry.type == KRAL_EFS_ENTRY_FILE) {
-      if (files.size() >= kMostEntries) return Answer::kLost;
       files.push_back({entry.name, entry.mode, entry.size});
-    } else if (entry.type == KRAL_EFS_ENTRY_DIRECTORY && Walk(entry.name, depth + 1, files) == Answer::kLost) {
+    } else if (entry.type == KRAL_EFS_ENTRY_DIRECTORY &&
+               Walk(entry.name, depth + 1, files, unlisted) == Answer::kLost) {
       return Answer::kLost;
     }
   }
   return Answer::kAnswered;
 }
 
-PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {
+PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted) {
   for (const char* folder : kFolders) {
-    if (Walk(folder, 1, files) == Answer::kLost) return Answer::kLost;
+    if (Walk(folder, 1, files, unlisted) == Answer::kLost) return Answer::kLost;
   }
   return Answer::kAnswered;
+}
+
+PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {
+  std::vector<UnlistedFolder> unlisted;
+  const Answer answer = FindFiles(files, unlisted);
+  return answer == Answer::kAnswered && !unlisted.empty() ? Answer::kRefused : answer;
 }
 
 // The error number of the item request that has just failed; nothing when it was not answered.
@@ -90,13 +115,20 @@ std::optional<uint32_t> PhoneItems::ItemError(bool reading) const {
 }
 
 PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) {
-  return Try([&] {
+  const Answer answer = Try([&] {
     status = efs::kDone;
     if (efs::GetItem(phone_, efs::Tries::kOne, file.path.c_str(), KRAL_EFS_ITEM_SIZE, {}, file.bytes)) return true;
     const auto error = ItemError(true);
     status = error.value_or(kRefusedStatus);
     return error.has_value();
   });
+  if (answer != Answer::kAnswered || status != efs::kDone || file.bytes.size() < KRAL_EFS_ITEM_SIZE) return answer;
+  // All that a request takes; there may be more.
+  uint32_t mode = 0;
+  uint32_t size = 0;
+  const Answer sized = Status(file.path.c_str(), mode, size, status);
+  return sized == Answer::kAnswered && status == efs::kDone && size > KRAL_EFS_ITEM_SIZE ? ReadPlainFile(file, status)
+                                                                                         : sized;
 }
 
 PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t& status) {
@@ -114,9 +146,10 @@ PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t& status)
   return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
 }
 
-PhoneItems::Answer PhoneItems::ReadFile(PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size) {
   file.bytes.clear();
-  const Answer answer = file.is_item_file() ? ReadItemFile(file, status) : ReadPlainFile(file, status);
+  const bool item = file.is_item_file() && known_size <= KRAL_EFS_ITEM_SIZE;
+  const Answer answer = item ? ReadItemFile(file, status) : ReadPlainFile(file, status);
   if (answer != Answer::kAnswered) status = kRefusedStatus;
   return answer;
 }

@@ -44,11 +44,19 @@ PhoneItems::~PhoneItems() {
 }
 
 PhoneItems::Answer PhoneItems::Try(const std::function<bool()>& ask) {
+  refusal_ = 0;
   for (int i = 0; i < kTries; ++i) {
+    phone_.packet().response_area()[0] = 0;  // no refusal of an earlier request, should this one not be sent
     if (ask()) return Answer::kAnswered;
-    if (efs::LastRefusal(phone_) != 0) return Answer::kRefused;
+    refusal_ = efs::LastRefusal(phone_);
+    if (refusal_ != 0) return Answer::kRefused;
   }
-  return Answer::kLost;
+  return Unanswered();
+}
+
+// One request that gets no answer, or is too long to be sent, does not end the work with a handset that is there.
+PhoneItems::Answer PhoneItems::Unanswered() {
+  return phone_.IsPhoneConnected() ? Answer::kRefused : Answer::kLost;
 }
 
 bool PhoneItems::Echoes16(size_t offset, uint16_t value) const {

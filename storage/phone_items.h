@@ -21,7 +21,7 @@ class PhoneItems {
  public:
   enum class Answer {
     kAnswered,  // with a status
-    kRefused,   // as a request; the handset has no status for it
+    kRefused,   // or passed over in silence, or never sent: no status, but the handset is there
     kLost,      // no answer, in spite of all tries
   };
   static constexpr uint32_t kRefusedStatus = 0xFFFF;
@@ -43,22 +43,32 @@ class PhoneItems {
   // Whether the caller does not count the item's being read-only as a failure.
   bool MayBeReadOnly(uint16_t id) const;
 
-  // --- Files; the status is the handset's error number
-  // ----------------------------------------------------------------
+  // --- Files; the status is the handset's error number ---------------------------------------------------------------
   struct FoundFile {
     std::string path;
     uint32_t mode;
     uint32_t size;
   };
-  // Appends what the item folders hold. A handset without them, or without a file system, has none.
-  Answer FindFiles(std::vector<FoundFile>& files);
-  Answer ReadFile(PkvEfsFile& file, uint32_t& status);         // by path and mode
+  // A folder whose files, or some of them, are not found, and why.
+  struct UnlistedFolder {
+    std::string path;
+    uint32_t status;
+  };
+  // Appends what the item folders hold. A handset without them, or without a file system, has none; other folders that
+  // cannot be listed are logged and told.
+  Answer FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
+  Answer FindFiles(std::vector<FoundFile>& files);  // kRefused when there are unlisted ones
+  // By path and mode. An item file that is known to be larger than an item request takes is read as a plain one.
+  Answer ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size = 0);
   Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with folders and permissions
 
  private:
   Answer Try(const std::function<bool()>& ask);
   bool Echoes16(size_t offset, uint16_t value) const;
-  Answer Walk(const std::string& folder, int depth, std::vector<FoundFile>& files);
+  Answer Unanswered();
+  Answer Walk(const std::string& folder, int depth, std::vector<FoundFile>& files,
+              std::vector<UnlistedFolder>& unlisted);
+  void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
   bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
   Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
   Answer ReadItemFile(PkvEfsFile& file, uint32_t& status);
@@ -72,6 +82,7 @@ class PhoneItems {
   NvBatch callers_batch_;
   KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
   KRAL_EFS_DIRECTORY_CALLBACK callers_directory_callback_;
+  uint8_t refusal_ = 0;                         // the code of the last Try that was refused
   std::set<std::string, std::less<>> folders_;  // that were made, or were there
 };
 

@@ -1,6 +1,7 @@
 // Reads items and files of the handset into a set and writes it at the end, so that nothing changes before all is read.
 #include <algorithm>
 #include <array>
+#include <set>
 
 #include "commands/core_diag.h"
 #include "storage/phone_items.h"
@@ -10,6 +11,8 @@ namespace kral::pkv {
 namespace {
 
 using Answer = PhoneItems::Answer;
+
+constexpr size_t kMostFileBytes = kCompoundFileLimit / 2;  // of all files; the items take less than the rest
 
 // A text of the handset as the value of a property: it must not end its line.
 std::string PropertyText(const char* text) {
@@ -70,15 +73,21 @@ class BackupJob {
 
   uint32_t Run(PkvSet& set) {
     std::vector<PhoneItems::FoundFile> files;
-    if (items_.FindFiles(files) == Answer::kLost) return KRAL_PKV_STATUS_LOST;
+    std::vector<PhoneItems::UnlistedFolder> unlisted;
+    if (items_.FindFiles(files, unlisted) == Answer::kLost) return KRAL_PKV_STATUS_LOST;
     const std::vector<Wanted> items = WantedItems(phone_);
-    JobReport report(phone_, items.size() + files.size());
+    JobReport report(phone_, items.size() + unlisted.size() + files.size());
     for (const Wanted& item : items) {
       if (!ReadItem(item, set, report)) return End(report);
     }
-    for (const PhoneItems::FoundFile& file : files) {
-      if (!ReadFile({.path = file.path, .mode = file.mode, .bytes = {}}, set, report)) return End(report);
+    for (const auto& [path, status] : unlisted) {
+      report.Add(PkvEfsFile{.path = path, .mode = 0, .bytes = {}}, KRAL_PKV_REFUSED, status);
+      if (report.stopped()) return End(report);
     }
+    for (const PhoneItems::FoundFile& file : files) {
+      if (!ReadFile(file, set, report)) return End(report);
+    }
+    NoteArrays(items, set);
     return set.items.empty() && set.files.empty() ? KRAL_PKV_STATUS_NOTHING_READ : KRAL_PKV_STATUS_DONE;
   }
 
@@ -103,9 +112,26 @@ class BackupJob {
     return !report.stopped();
   }
 
-  bool ReadFile(PkvEfsFile file, PkvSet& set, JobReport& report) {
+  // Which ids are arrays; an element 0 alone looks like a plain item.
+  static void NoteArrays(const std::vector<Wanted>& items, PkvSet& set) {
+    std::set<uint16_t> arrays;
+    for (const Wanted& item : items) {
+      if (item.element) arrays.insert(item.id);
+    }
+    std::string list;
+    for (const uint16_t id : arrays) list += (list.empty() ? "" : ",") + std::to_string(id);
+    set.properties.values.emplace_back(kArraysProperty, list);
+  }
+
+  bool ReadFile(const PhoneItems::FoundFile& found, PkvSet& set, JobReport& report) {
+    PkvEfsFile file{.path = found.path, .mode = found.mode, .bytes = {}};
     uint32_t status = 0;
-    if (items_.ReadFile(file, status) == Answer::kLost) return false;
+    if (items_.ReadFile(file, status, found.size) == Answer::kLost) return false;
+    // Less than the handset lists would be a backup that looks whole. The same for more than a file of ours holds.
+    if (status == 0 && (file.bytes.size() < found.size || file.bytes.size() > bytes_left_)) {
+      status = PhoneItems::kRefusedStatus;
+    }
+    if (status == 0) bytes_left_ -= file.bytes.size();
     report.Add(file, status == 0 ? KRAL_PKV_DONE : KRAL_PKV_REFUSED, status);
     if (status == 0) set.files.push_back(std::move(file));
     return !report.stopped();
@@ -113,6 +139,7 @@ class BackupJob {
 
   Diag_FTM& phone_;
   PhoneItems items_;
+  size_t bytes_left_ = kMostFileBytes;
 };
 
 }  // namespace

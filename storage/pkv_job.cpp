@@ -1,6 +1,10 @@
 // The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
 #include "storage/pkv_jobs.h"
 
+#include <algorithm>
+#include <charconv>
+#include <string_view>
+
 #include "storage/nv_tool.h"
 
 namespace kral::pkv {
@@ -58,10 +62,10 @@ void JobReport::Add(const PkvEfsFile& file, uint32_t result, uint32_t status) {
 }
 
 void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
-  if (stopped_) return;
   KRAL_PKV_COUNTS& counts = phone_.pkv().counts;
   ++*CounterOf(counts, record.result);
   ++reported_;
+  if (stopped_) return;
   const auto callback = phone_.pkv().callback.load();
   if (callback != nullptr && callback(&record, path, reported_, counts.total, phone_.handle()) == 0) stopped_ = true;
 }
@@ -101,6 +105,19 @@ std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
 ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {
   for (const PkvNvItem& item : set.items) {
     if (item.index != 0) ids_.insert(item.id);
+  }
+  const auto& properties = set.properties.values;
+  const auto listed =
+      std::find_if(properties.begin(), properties.end(), [](const auto& p) { return p.first == kArraysProperty; });
+  if (listed != properties.end()) {
+    for (std::string_view rest = listed->second; !rest.empty();) {
+      const std::string_view digits = rest.substr(0, rest.find(','));
+      rest.remove_prefix(std::min(digits.size() + 1, rest.size()));
+      uint16_t id = 0;
+      const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), id);
+      if (error == std::errc() && end == digits.data() + digits.size()) ids_.insert(id);
+    }
+    return;
   }
   for (const auto& [id, highest_element] : DefinedItems(phone)) {
     if (highest_element != 0) ids_.insert(id);

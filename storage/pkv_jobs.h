@@ -26,7 +26,7 @@ class JobReport {
   JobReport(const JobReport&) = delete;
   JobReport& operator=(const JobReport&) = delete;
 
-  // Each item and file is reported once. After the caller has stopped the job nothing counts any more.
+  // Each item and file is reported once. After the caller has stopped the job they are counted only.
   void Add(const PkvNvItem& item, uint32_t result, uint32_t status);
   void Add(const PkvEfsFile& file, uint32_t result, uint32_t status);
   bool stopped() const { return stopped_; }
@@ -47,8 +47,11 @@ uint32_t StatusOf(PkvResult result);
 // The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
 std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
 
+// The property of a backup that lists the ids of its array items: "3101,3102".
+inline constexpr const char* kArraysProperty = "Arrays";
+
 // Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
-// those that are defined so.
+// those that the backup lists. Where it has no list, those that are defined so.
 class ArrayItems {
  public:
   ArrayItems(Diag_FTM& phone, const PkvSet& set);

@@ -101,7 +101,7 @@ class RestoreJob {
       return report_.Add(file, KRAL_PKV_REFUSED, status != 0 ? status : PhoneItems::kRefusedStatus);
     }
     PkvEfsFile present{.path = file.path, .mode = file.mode, .bytes = {}};
-    const Answer read = items_.ReadFile(present, status);
+    const Answer read = items_.ReadFile(present, status, file.bytes.size());
     lost_ = read == Answer::kLost;
     if (read != Answer::kAnswered || status != 0) return report_.Add(file, KRAL_PKV_NOT_READ_BACK, status);
     report_.Add(file, present.bytes == file.bytes ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);

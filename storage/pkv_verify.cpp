@@ -42,7 +42,7 @@ class VerifyJob {
   bool Compare(const PkvEfsFile& file) {
     PkvEfsFile present{.path = file.path, .mode = file.mode, .bytes = {}};
     uint32_t status = 0;
-    const Answer answer = lost_ ? Answer::kLost : items_.ReadFile(present, status);
+    const Answer answer = lost_ ? Answer::kLost : items_.ReadFile(present, status, file.bytes.size());
     Add(file, answer, status == 0 && present.bytes == file.bytes, status);
     return !report_.stopped();
   }

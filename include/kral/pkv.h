@@ -71,8 +71,9 @@ typedef struct KRAL_PKV_COUNTS {
 typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
 
 /**
- * Called once for every item and file, with its final result, on the thread that called the function. It must not call
- * functions of the handle.
+ * Called once for every item and file, with its final result, on the thread that called the function, until it stops
+ * the work: what a restore had written together with the last one is then in the counts only. It must not call functions
+ * of the handle.
  *
  * @param item    lives for the call only
  * @param path    of a file; null for an NV item
@@ -103,7 +104,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNT
 /**
  * Reads the handset's items and files and writes them to a PKV file, which is replaced in one step at the end.
  *
- * @return 1 when the status is 0. Files that the handset lists but does not give are left out and counted as refused
+ * @return 1 when the status is 0. Files that the handset lists but does not give whole are left out and counted as
+ *         refused, and so are folders, by their paths, whose files it does not list
  */
 KRAL_API uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, const char* file, uint32_t* status);
 

@@ -230,6 +230,19 @@ TEST_F(PkvBackup, DefinitionsNameElementsAndItemsBeyondTheRange) {
   handset().nv().SetElement(5, 0, Bytes{9});
   ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
   EXPECT_EQ(handset().nv().Element(5, 0).value_or(Bytes{0})[0], 1);
+  EXPECT_EQ(Read().properties.values.back(), std::pair(std::string("Arrays"), std::string("5")));
+}
+
+// Whatever is defined when it is restored.
+TEST_F(PkvBackup, WhatIsAnArrayIsInTheFile) {
+  handset().nv().MakeArray(5, 3);
+  PkvSet set;
+  set.items.push_back({.id = 5, .data = {2, 7}});  // as a plain item: element 2
+  set.properties.values = {{"Arrays", "x,5,70000,,"}};
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  const Bytes element = handset().nv().Element(5, 0).value_or(Bytes{0, 0});
+  EXPECT_EQ(Bytes(element.begin(), element.begin() + 2), (Bytes{2, 7}));
 }
 
 // --- Trouble on the line --------------------------------------------------------------------------------------------
@@ -328,7 +341,10 @@ TEST_F(PkvBackup, TheCallbackEndsEachOfThem) {
   for (const Job job : {KRAL_BackupNVFromMobileToPKV, KRAL_RestoreNVFromPKV, KRAL_PKV_Verify}) {
     EXPECT_EQ(Run(job), KRAL_PKV_STATUS_STOPPED);
     EXPECT_EQ(g_results.size(), 4u);
-    Counts();  // add up
+    // A restore's packet of nine is counted to its end.
+    EXPECT_EQ(Counts(), job == KRAL_BackupNVFromMobileToPKV ? "2 2 0 0 0 59"
+                        : job == KRAL_RestoreNVFromPKV      ? "8 1 0 0 0 14"
+                                                            : "4 0 0 0 0 19");
   }
   EXPECT_EQ(folder_.Content("phone.pkv"), before);
 }
@@ -393,6 +409,53 @@ TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
   EXPECT_EQ(g_results["/nv/items/huge"], Result(KRAL_PKV_REFUSED, 0xFFFF));
   ASSERT_EQ(Read().files.size(), 1u);
   EXPECT_EQ(Read().files[0].path, "/nv/items/good");
+}
+
+// This handset opens no item file as a plain one, so that one beyond an item request cannot be had whole.
+TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
+  const std::string large = "/nv/item_files/rfnv/00020204";
+  const std::string far = "/nv/items/" + std::string(200, 'f') + "/" + std::string(40, 'p');
+  handset().efs().AddItemFile(large, RandomBytes(2000));
+  handset().efs().AddItemFile("/nv/items/full", RandomBytes(1024));
+  handset().efs().AddFile(far, Bytes{1});
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  EXPECT_EQ(g_results[large], Result(KRAL_PKV_REFUSED, 0xFFFF));
+  EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
+  PkvSet set = Read();
+  ASSERT_EQ(set.files.size(), 1u);
+  EXPECT_EQ(set.files[0].bytes, RandomBytes(1024));
+  set.files.push_back({large, 0xE1FF, RandomBytes(1024)});  // as if it were whole
+  set.files.push_back({far, 0x81FF, {1}});
+  set.files.push_back({"/nv/items/last", 0xE1FF, {1}});
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
+  EXPECT_EQ(g_results[large].first, KRAL_PKV_REFUSED);
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
+  EXPECT_EQ(g_results["/nv/items/last"], Result(KRAL_PKV_DONE, 0));
+}
+
+// Only what is not there has no files.
+TEST_F(PkvBackup, FoldersThatCannotBeListedAreTold) {
+  Furnish();
+  const struct {
+    const char* name;
+    Fault fault;
+    When when;
+    std::string counts;
+  } kRows[] = {
+      {"no file system", handset::Refuse(19), When::Always().Of("4B 13"), "20 40 0 0 0 0"},
+      {"stat refused", handset::Refuse(20), When::Nth(1).Of("4B 13 0F 00"), "22 40 1 0 0 0"},
+      {"opendir refused", handset::Refuse(24), When::Always().Of("4B 13 0B 00"), "20 40 3 0 0 0"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.name);
+    handset().faults().Add(row.fault, row.when);
+    EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+    EXPECT_EQ(Counts(), row.counts);
+    EXPECT_EQ(g_results.contains("/nv/items"), std::string_view(row.name) != "no file system");
+    handset().faults().Clear();
+  }
 }
 
 // --- The phone server -----------------------------------------------------------------------------------------------
