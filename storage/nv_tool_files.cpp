@@ -9,6 +9,8 @@
 #include "storage/nv_report.h"
 #include "storage/nv_tool.h"
 #include "storage/nv_value.h"
+#include "storage/pkv_jobs.h"
+#include "transport/kral_thread_interface.h"
 
 namespace kral::nv {
 namespace {
@@ -150,6 +152,9 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   }
   // A backup that lacks something is none.
   if (walk.failed()) return NvError::kCannotSetValue;
+  // Values need no handset, and the null port is none; one that is there signs them.
+  const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
+  if (has_handset) pkv::ReadIdentity(phone, set.properties);
   const PkvOutcome outcome = WritePkv(file, set, &phone.log());
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
   return ErrorOf(outcome);

@@ -23,7 +23,8 @@ std::string PropertyText(const char* text) {
   return value;
 }
 
-// Who the handset is, as far as it tells.
+}  // namespace
+
 void ReadIdentity(Diag_FTM& phone, PkvProperties& properties) {
   uint32_t serial = 0;
   if (diag::ReadSerialNumber(phone, &serial)) {
@@ -41,6 +42,8 @@ void ReadIdentity(Diag_FTM& phone, PkvProperties& properties) {
     properties.values.emplace_back("Model", PropertyText(texts[1].data()));
   }
 }
+
+namespace {
 
 struct Wanted {
   uint16_t id;

@@ -18,6 +18,9 @@ uint32_t Verify(Diag_FTM& phone, const std::string& path);   // pkv_verify.cpp
 
 bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions);
 
+// Appends who the handset is, as far as it tells (pkv_backup.cpp).
+void ReadIdentity(Diag_FTM& phone, PkvProperties& properties);
+
 // What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
 class JobReport {
  public:

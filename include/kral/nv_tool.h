@@ -193,7 +193,11 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_LoadNVsFromSource(KRAL_HANDLE handle, const 
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToMobile(KRAL_HANDLE handle);
 
-/** Writes all values to a PKV file. 7: it cannot be written; 10: there is no value to be written. */
+/**
+ * Writes all values to a PKV file, with the identity of the handset when one is connected and answers.
+ *
+ * @return 0; 11 when a value has no place in a PKV file, 10 when there is no value, 7 when the file cannot be written
+ */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToPKV(KRAL_HANDLE handle, const char* file);
 
 /** Writes all values and roaming lists to a source file. 14: it cannot be opened; 3: it cannot be saved. */

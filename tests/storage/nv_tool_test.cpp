@@ -74,6 +74,11 @@ TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
   EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_WRITE_F NV Id:453 Status:0"));
 
   const std::string pkv = Pkv();
+  PkvSet signed_set;
+  ASSERT_TRUE(ReadPkv(pkv, signed_set).done());
+  ASSERT_EQ(signed_set.properties.values.size(), 5u);
+  EXPECT_EQ(signed_set.properties.values[0].first, "ESN");
+  EXPECT_EQ(signed_set.properties.version, PkvVersionText());
   const std::string source = Source();
   const auto expect_values = [&](const char* from) {
     SCOPED_TRACE(from);
