@@ -1,6 +1,7 @@
 // The operations behind the exports: arguments to images and commands, outcomes to result codes.
 #include "download/download_client.h"
 
+#include <exception>
 #include <optional>
 
 #include "download/download_connection.h"
@@ -44,6 +45,7 @@ uint32_t ResultOf(WriteOutcome outcome) {
 
 uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImage* header,
                     const WriteArguments& arguments) {
+  if (arguments.block_size == 0) return KRAL_STREAM_BAD_ARGUMENT;  // before anything is erased for it
   const WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
   try {
     switch (arguments.method) {
@@ -59,6 +61,18 @@ uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImag
                                exception.count());
     return KRAL_STREAM_WRITE_FAILED;
   }
+}
+
+// Whatever ends an operation, its caller learns a result: no exception passes the output by.
+template <class Operation>
+bool GiveResultOf(Diag_FTM& phone, uint32_t result_of_exceptions, uint32_t* result, Operation&& operation) {
+  uint32_t value = result_of_exceptions;
+  try {
+    value = operation();
+  } catch (const std::exception& exception) {
+    phone.log().WriteLine(kLogErr, "download : %s", exception.what());
+  }
+  return Give(value, result);
 }
 
 // Through a phone server there is no framer to talk to.
@@ -96,11 +110,9 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (file == nullptr) return Give(KRAL_KOVA_FILE_NOT_OPENED, result);
-  try {
-    return Give(kova::LoadFlashProgrammer(connection, file, maximum_packet), result);
-  } catch (const PhoneImageException&) {  // no address space for the image
-    return Give(KRAL_KOVA_FILE_NOT_DECODED, result);
-  }
+  // What throws is the image, for which there is no address space.
+  return GiveResultOf(phone, KRAL_KOVA_FILE_NOT_DECODED, result,
+                      [&] { return kova::LoadFlashProgrammer(connection, file, maximum_packet); });
 }
 
 bool KovaNop(Diag_FTM& phone) {
@@ -157,15 +169,16 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (file == nullptr) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
-  ImageFile image;
-  ImageFile header;
-  uint32_t opened = image.Open(file, format);
-  if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
-    opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
-  if (opened != KRAL_STREAM_WRITTEN) return Give(opened, result);
-  if (image.has_second_region()) return Give(KRAL_STREAM_BAD_IMAGE, result);
-  return Give(WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments),
-              result);
+  return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
+    ImageFile image;
+    ImageFile header;
+    uint32_t opened = image.Open(file, format);
+    if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
+      opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
+    if (opened != KRAL_STREAM_WRITTEN) return opened;
+    if (image.has_second_region()) return KRAL_STREAM_BAD_IMAGE;
+    return WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments);
+  });
 }
 
 bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address, const CallersBytes& header,
@@ -174,15 +187,18 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
   DownloadConnection connection(phone);
   connection.BeginWork();
   if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
-  const auto whole = MakeMemoryImage({image.data, image.size}, address);
-  if (whole == nullptr) return Give(KRAL_STREAM_WRITE_FAILED, result);
-  std::unique_ptr<PhoneImage> opening;
-  if (header.size > stream::kLongestHeader) {
-    connection.log().WriteLine(kLogErr, "multi-image open failed\n");
-    return Give(KRAL_STREAM_OPEN_FAILED, result);
-  }
-  if (header.data != nullptr) opening = MakeMemoryImage({header.data, header.size}, 0);
-  return Give(WriteImage(connection, *whole, opening.get(), arguments), result);
+  return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
+    const auto whole = MakeMemoryImage({image.data, image.size}, address);
+    if (whole == nullptr) return KRAL_STREAM_WRITE_FAILED;
+    if (header.size > stream::kLongestHeader) {
+      connection.log().WriteLine(kLogErr, "multi-image open failed\n");
+      return KRAL_STREAM_OPEN_FAILED;
+    }
+    std::unique_ptr<PhoneImage> opening;
+    if (header.data != nullptr) opening = MakeMemoryImage({header.data, header.size}, 0);
+    if (header.data != nullptr && opening == nullptr) return KRAL_STREAM_WRITE_FAILED;
+    return WriteImage(connection, *whole, opening.get(), arguments);
+  });
 }
 
 }  // namespace kral::download

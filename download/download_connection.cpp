@@ -7,6 +7,7 @@ namespace kral {
 namespace {
 
 constexpr size_t kFcsBytes = 2;
+constexpr uint32_t kLookAroundMs = 50;
 
 // The leading flag is on for the length of an exchange, and off behind it whatever it was before: required.
 class LeadingFlag {
@@ -53,6 +54,15 @@ DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const u
 void DownloadConnection::BeginWork() {
   if (!phone_.download().keep_abort) phone_.download().abort = false;
   reported_ = false;
+}
+
+bool DownloadConnection::Pause(uint32_t milliseconds) {
+  while (milliseconds > 0 && !aborted()) {
+    const uint32_t piece = std::min(milliseconds, kLookAroundMs);
+    clock().SleepMs(piece);
+    milliseconds -= piece;
+  }
+  return !aborted();
 }
 
 void DownloadConnection::Report(uint32_t done, uint32_t total) {

@@ -44,6 +44,7 @@ class DownloadConnection {
   // --- The caller ---
   void BeginWork();  // forgets an abort that came before
   bool aborted() const { return phone_.download().abort; }
+  bool Pause(uint32_t milliseconds);  // false when an abort ended it
   // Tells the caller, on the caller's own thread. Nothing for a figure that was told already.
   void Report(uint32_t done, uint32_t total);
 

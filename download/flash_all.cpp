@@ -2,6 +2,7 @@
 #include "download/flash_all.h"
 
 #include <algorithm>
+#include <exception>
 
 #include "download/download_client.h"
 #include "download/download_connection.h"
@@ -26,7 +27,6 @@ class WholeWay {
         callback_(settings_.progress_callback),
         value_(settings_.callback_value),
         total_(total) {
-    settings_.abort = false;
     settings_.keep_abort = true;
     settings_.callback_value = reinterpret_cast<uintptr_t>(this);
     settings_.progress_callback = &WholeWay::OnPart;
@@ -67,8 +67,12 @@ uint32_t CheckProgrammer(const char* file, uint64_t& size) {
 
 uint32_t CheckImage(const char* file, uint64_t& size) {
   KRAL_IMAGE_INFO info{};
-  const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info);
-  if (result != KRAL_STREAM_WRITTEN) return result;
+  try {
+    const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info);
+    if (result != KRAL_STREAM_WRITTEN) return result;
+  } catch (const std::exception&) {  // no memory or address space for it
+    return KRAL_STREAM_FILE_NOT_DECODED;
+  }
   size = info.size[0];
   return info.size[1] == 0 ? KRAL_STREAM_WRITTEN : KRAL_STREAM_BAD_IMAGE;
 }
@@ -92,6 +96,7 @@ bool ServeFlashProgrammer(Diag_FTM& phone, const char* file) {
 
 FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const char* const> images,
                       const uint8_t* types) {
+  phone.download().abort = false;  // here, so that one during the look at the files counts
   uint64_t programmer_size = 0;
   if (const uint32_t result = CheckProgrammer(programmer, programmer_size)) return {result};
   std::vector<uint64_t> sizes(images.size());
@@ -99,6 +104,7 @@ FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const c
   for (uint32_t i = 0; i < images.size(); ++i) {
     if (const uint32_t result = CheckImage(images[i], sizes[i])) return {result, i};
     total += sizes[i];
+    if (phone.download().abort) return {KRAL_DOWNLOAD_ABORTED};
   }
 
   WholeWay whole(phone, total);

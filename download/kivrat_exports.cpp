@@ -2,6 +2,7 @@
 #include "kral/kivrat.h"
 
 #include <algorithm>
+#include <exception>
 #include <span>
 
 #include "download/download_connection.h"
@@ -60,7 +61,12 @@ bool FlashAll(Diag_FTM& phone, const char* programmer, const char* const* images
     if (missing != all.end()) {
       outcome.image = static_cast<uint32_t>(missing - all.begin());
     } else if (count != 0) {
-      outcome = kral::download::FlashAll(phone, programmer, all, types);
+      try {
+        outcome = kral::download::FlashAll(phone, programmer, all, types);
+      } catch (const std::exception&) {  // no memory
+        phone.GiveBackPort();
+        outcome = {KRAL_STREAM_WRITE_FAILED};
+      }
     }
   }
   if (result != nullptr) *result = outcome.result;

@@ -25,7 +25,6 @@ class Server {
     if (const auto error = file_.Open(file_name)) {
       phone_.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
                              error.message().c_str());
-      port_.Keep();
       return false;
     }
     if (progress_ && !progress_(0, file_.size())) return Fail(kAborted);

@@ -44,14 +44,15 @@ std::optional<HelloReply> ParseHelloReply(std::span<const uint8_t> reply) {
   if (!std::equal(kTargetMagic.begin(), kTargetMagic.end(), reply.begin() + kMagicAt)) return std::nullopt;
   const auto block_size = LoadLe<uint32_t>(reply, kBlockSizeAt);
   const auto window = LoadLe<uint16_t>(reply, kIdAt + reply[kIdLengthAt]);
-  if (!block_size || !window) return std::nullopt;
+  // No image can be written in blocks of nothing.
+  if (!block_size || *block_size == 0 || !window) return std::nullopt;
   return HelloReply{*block_size, *window};
 }
 
 std::optional<HelloReply> Hello(DownloadConnection& connection, const DownloadSettings& settings, uint32_t variant) {
   auto& log = connection.log();
   const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);
-  for (int i = 1; i <= kNops; ++i) {
+  for (int i = 1; i <= kNops && !connection.aborted(); ++i) {
     log.WriteLine(kLogRet, "Sending NOP to flash programmer, %d", i);
     std::vector<uint8_t> ignored;
     connection.Exchange(kNopRequest, kNopReply, nop_ms, ignored);
@@ -59,7 +60,7 @@ std::optional<HelloReply> Hello(DownloadConnection& connection, const DownloadSe
   std::optional<HelloReply> answer;
   const uint32_t tries = std::max(settings.hello_tries.load(), 1u);
   for (uint32_t i = 1; i <= tries && !answer && !connection.aborted(); ++i) {
-    if (i > 1) connection.clock().SleepMs(settings.hello_retry_delay_ms);
+    if (i > 1 && !connection.Pause(settings.hello_retry_delay_ms)) break;
     log.WriteLine(kLogRet, "Sending HELLO to flash programmer, %d", static_cast<int>(i));
     answer = ExchangeHello(connection, variant, std::min(kHelloMs, settings.handshake_limit_ms));
   }

@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <cstring>
 
+#include "platform/file_util.h"
+
 namespace kral {
 namespace {
 
@@ -11,8 +13,13 @@ constexpr size_t kBufferSize = 0x10000;
 
 }  // namespace
 
-bool TextFile::Open(const std::string& path, const char* mode) {
-  file_.reset(std::fopen(path.c_str(), mode));
+bool TextFile::OpenForReading(const std::string& path) {
+  file_.reset(OpenToRead(path));
+  return file_ != nullptr;
+}
+
+bool TextFile::OpenForWriting(const std::string& path) {
+  file_.reset(std::fopen(path.c_str(), "wb"));
   return file_ != nullptr;
 }
 

@@ -28,8 +28,8 @@ class TextSink {
 // An open file. Lines are passed as they are on the disk: nothing is translated on either home.
 class TextFile final : public TextSource, public TextSink {
  public:
-  bool OpenForReading(const std::string& path) { return Open(path, "rb"); }
-  bool OpenForWriting(const std::string& path) { return Open(path, "wb"); }  // empties it
+  bool OpenForReading(const std::string& path);
+  bool OpenForWriting(const std::string& path);  // empties it
   bool Close();  // false when not everything reached the file
 
   size_t Read(std::span<char> buffer) override;
@@ -40,8 +40,6 @@ class TextFile final : public TextSource, public TextSink {
   struct Closer {
     void operator()(std::FILE* file) const { std::fclose(file); }
   };
-
-  bool Open(const std::string& path, const char* mode);
 
   std::unique_ptr<std::FILE, Closer> file_;
 };

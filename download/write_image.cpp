@@ -52,7 +52,8 @@ CWriteNORImageFramed::CWriteNORImageFramed(DownloadConnection& connection)
 WriteOutcome CWriteImage::Write(PhoneImage& image, uint8_t type, PhoneImage* header, const WriteLimits& requested) {
   const uint32_t size = image.GetSize(0);
   WriteLimits limits;
-  if (!opener_->OpenMulti(type, header, requested, limits)) {
+  if (connection_.aborted()) return Failed(WriteOutcome::kAborted, "aborted before the image was opened\n");
+  if (requested.block_size == 0 || !opener_->OpenMulti(type, header, requested, limits)) {
     return Failed(WriteOutcome::kNotOpened, "multi-image open failed\n");
   }
   // An image of nothing is opened and closed.
@@ -60,6 +61,7 @@ WriteOutcome CWriteImage::Write(PhoneImage& image, uint8_t type, PhoneImage* hea
     const WriteOutcome outcome = Stream(image, size, limits);
     if (outcome != WriteOutcome::kDone) return outcome;
   }
+  if (connection_.aborted()) return Failed(WriteOutcome::kAborted, "aborted before the image was closed\n");
   return opener_->Close() ? WriteOutcome::kDone : WriteOutcome::kNotClosed;
 }
 

@@ -74,8 +74,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* ver
  *
  * @param handle           of a connected target
  * @param programmer_file  path of the file, in the target's own format
- * @return 1 when the target has acknowledged the end; 0 also for a file that cannot be opened, which leaves the target
- *         waiting as before, and for one that ends before the target has all it wants
+ * @return 1 when the target has acknowledged the end; 0 also for a file that cannot be opened, and for one that ends
+ *         before the target has all it wants
  *
  * Wait: 5,000 ms for each packet, and 500 ms at the end, in which the programmer starts. Progress counts the bytes
  * of the file.

@@ -25,6 +25,7 @@ class FileDescriptor {
 
   int get() const { return fd_; }
   bool valid() const { return fd_ >= 0; }
+  int Release() { return std::exchange(fd_, -1); }  // to another owner
 
  private:
   int fd_ = -1;

@@ -21,14 +21,33 @@ std::error_code LastError() {
   return {errno, std::generic_category()};
 }
 
+// Without waiting: the opening of a pipe would last until somebody writes into it. What /proc has is ordinary too.
+std::error_code OpenOrdinary(const std::string& path, FileDescriptor& file) {
+  FileDescriptor opened(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  struct stat status {};
+  if (!opened.valid() || ::fstat(opened.get(), &status) != 0) return LastError();
+  if (S_ISDIR(status.st_mode)) return std::make_error_code(std::errc::is_a_directory);
+  if (!S_ISREG(status.st_mode)) return std::make_error_code(std::errc::invalid_argument);
+  file = std::move(opened);
+  return {};
+}
+
 }  // namespace
 
+std::FILE* OpenToRead(const std::string& path) {
+  FileDescriptor file;
+  if (OpenOrdinary(path, file)) return nullptr;
+  std::FILE* stream = ::fdopen(file.get(), "rb");
+  if (stream != nullptr) file.Release();
+  return stream;
+}
+
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes) {
-  const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
-  if (!file.valid()) return LastError();
+  FileDescriptor file;
+  if (const auto error = OpenOrdinary(path, file)) return error;
   limit = std::min(limit, SIZE_MAX - 1);
   std::vector<uint8_t> content;
-  // Pieces rather than the size from stat: that is 0 for /proc and pipes, and may change meanwhile.
+  // Pieces rather than the size from stat: that is 0 for /proc, and may change meanwhile.
   for (size_t used = 0;;) {
     content.resize(used + std::min(kPieceSize, limit + 1 - used));
     const ssize_t received = ::read(file.get(), content.data() + used, content.size() - used);
@@ -53,11 +72,10 @@ FileReader::~FileReader() = default;
 
 std::error_code FileReader::Open(const std::string& path) {
   Close();
-  // Without waiting: the opening of a pipe would last until somebody writes into it.
-  FileDescriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  FileDescriptor file;
   struct stat status {};
-  if (!file.valid() || ::fstat(file.get(), &status) != 0) return LastError();
-  if (!S_ISREG(status.st_mode)) return std::make_error_code(std::errc::invalid_argument);
+  if (const auto error = OpenOrdinary(path, file)) return error;
+  if (::fstat(file.get(), &status) != 0) return LastError();
   state_->file = std::move(file);
   state_->size = static_cast<uint64_t>(status.st_size);
   return {};

@@ -40,6 +40,10 @@ std::error_code LastError() {
 
 }  // namespace
 
+std::FILE* OpenToRead(const std::string& path) {
+  return std::fopen(path.c_str(), "rb");
+}
+
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes) {
   const WinHandle file(::CreateFileA(path.c_str(), GENERIC_READ, FILE_SHARE_READ | FILE_SHARE_WRITE, nullptr,
                                      OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));

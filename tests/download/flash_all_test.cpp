@@ -180,7 +180,6 @@ TEST_F(FlashAll, StepsCanBeTakenOneByOne) {
   EXPECT_EQ(version, 2u);
   EXPECT_EQ(identity, 0x008140E1u);
   EXPECT_EQ(KRAL_IsPhoneConnected(handle_), 0) << "the port is not the connection's";
-  EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, nullptr), 0);
   EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, programmer_.c_str()), 1);
   EXPECT_EQ(figures_.back(), std::pair(2500u, 2500u));
   EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, programmer_.c_str()), 0) << "over";
@@ -195,6 +194,11 @@ TEST_F(FlashAll, StepsCanBeTakenOneByOne) {
   EXPECT_EQ(identity, 77u);
   EXPECT_EQ(KRAL_Kivrat_End(handle_), 1);
   EXPECT_FALSE(ports_.IsOpen(7));
+
+  StartInBootLoader();
+  EXPECT_EQ(KRAL_Kivrat_Connect(handle_, nullptr, nullptr), 1);
+  EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, nullptr), 0);
+  EXPECT_FALSE(ports_.IsOpen(7)) << "any failure gives the port back";
   EXPECT_EQ(KRAL_Kivrat_Connect(0, &version, nullptr), 0);
 }
 

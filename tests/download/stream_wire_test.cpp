@@ -1,7 +1,10 @@
 // The packets of the streaming download as they go over the wire, and what is made of every kind of answer to them.
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <chrono>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "download/stream_hello.h"
@@ -66,6 +69,7 @@ TEST(StreamHelloReply, IsCheckedToItsLastField) {
       {"a long id", limits + "04 AA AA AA AA FF FF", 0xFFFF},
       {"an id up to the end", limits + "04 AA AA AA AA", -1},
       {"an id far behind the end", limits + "FF AA AA AA AA AA", -1},
+      {"blocks of nothing", "02 02 00 00 00 00 00 00 00 08 02 AA BB 20 00", -1},
       {"half a window", limits + "03 AA AA AA 20", -1},
   };
   for (const Row& row : rows) {
@@ -164,6 +168,35 @@ TEST_F(StreamWire, OneImageByteForByte) {
   EXPECT_EQ(WriteMem({}), KRAL_STREAM_WRITTEN) << LogText();
 }
 
+void KRAL_CALL AbortAtTheEnd(KRAL_HANDLE handle, uint32_t done, uint32_t total, uintptr_t) {
+  if (done == total) KRAL_AbortDownload(handle);
+}
+
+TEST_F(StreamWire, AbortsAreSeenInEveryStep) {
+  block_size_ = 8;
+  window_ = 5;
+  KRAL_ConfigureDownloadCallBack(handle(), AbortAtTheEnd, 0);
+  handset().Expect("1B 07").Reply("1C 00");
+  handset().Expect("07 00 00 00 00 55").Reply("08 00 00 00 00");
+  handset().ClearTrace();
+  EXPECT_EQ(WriteMem({0x55}), KRAL_DOWNLOAD_ABORTED);
+  EXPECT_EQ(handset().requests().size(), 2u) << "the image was not closed";
+
+  KRAL_STREAM_ConfigureHello(handle(), 2, UINT32_MAX);
+  settings().handshake_limit_ms = 10;
+  handset().faults().Add(handset::Ignore(), handset::When::Always());
+  std::atomic<bool> over{false};
+  std::thread caller([&] {
+    for (; !over; std::this_thread::sleep_for(std::chrono::milliseconds(5))) {
+      if (HasLine(KRAL_LOG_RET, "Sending HELLO to flash programmer, 1")) KRAL_AbortDownload(handle());
+    }
+  });
+  EXPECT_EQ(Hello(), 0);
+  over = true;
+  caller.join();
+  EXPECT_FALSE(HasLine(KRAL_LOG_RET, "Sending HELLO to flash programmer, 2"));
+}
+
 TEST_F(StreamWire, EveryWrongAnswerHasItsLineAndItsResult) {
   struct Row {
     const char* open;
@@ -199,8 +232,10 @@ TEST_F(StreamWire, EveryWrongAnswerHasItsLineAndItsResult) {
   }
   EXPECT_EQ(WriteMem({0x55}, 0, KRAL_STREAM_MULTI_IMAGE, std::vector<uint8_t>(513)), KRAL_STREAM_OPEN_FAILED);
   EXPECT_EQ(WriteMem({0x55}, 0, 9), KRAL_STREAM_BAD_ARGUMENT);
-  block_size_ = 0;  // a handset that takes no bytes at all
-  EXPECT_EQ(WriteMem({0x55}, 0, KRAL_STREAM_NOR), KRAL_STREAM_WRITE_FAILED);
+  block_size_ = 0;
+  for (const uint8_t method : {KRAL_STREAM_NOR, KRAL_STREAM_MULTI_IMAGE}) {
+    EXPECT_EQ(WriteMem({0x55}, 0, method), KRAL_STREAM_BAD_ARGUMENT) << "and nothing was sent";
+  }
 }
 
 TEST(DownloadThroughAServer, IsRefusedWithoutTraffic) {
