@@ -22,6 +22,12 @@ auto& OpenOrAdd(List& list, std::string_view wanted) {
   return added;
 }
 
+size_t CountEntries(const CompoundStorage& storage) {
+  size_t count = storage.streams.size();
+  for (const CompoundStorage& child : storage.storages) count += 1 + CountEntries(child);
+  return count;
+}
+
 }  // namespace
 
 CompoundStorage* CompoundStorage::FindStorage(std::string_view wanted) {
@@ -51,8 +57,10 @@ std::string LoadCompoundFile(const std::string& path, CompoundStorage& root) {
 }
 
 std::string SaveCompoundFile(const std::string& path, const CompoundStorage& root) {
+  if (CountEntries(root) > kCompoundEntryLimit) return path + ": too many entries";
   std::vector<uint8_t> file;
   if (const std::string problem = SerializeCompoundFile(root, file); !problem.empty()) return path + ": " + problem;
+  if (file.size() > kCompoundFileLimit) return path + ": too large";
   if (const std::error_code error = ReplaceWholeFile(path, file)) return path + ": " + error.message();
   return {};
 }

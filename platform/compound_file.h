@@ -41,7 +41,8 @@ inline constexpr size_t kCompoundEntryLimit = 200000;
 std::string ParseCompoundFile(std::span<const uint8_t> file, CompoundStorage& root);
 std::string SerializeCompoundFile(const CompoundStorage& root, std::vector<uint8_t>& file);
 
-// Through memory: the file is read at once, and replaced in one step behind a temporary name.
+// Through memory: the file is read at once, and replaced in one step behind a temporary name. What could not be loaded
+// for its size is not saved.
 std::string LoadCompoundFile(const std::string& path, CompoundStorage& root);
 std::string SaveCompoundFile(const std::string& path, const CompoundStorage& root);
 

@@ -46,6 +46,10 @@ EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_vie
   if (access == pkv::Access::kRead) return;
   directory_ = &storage_->OpenOrAddStorage(pkv::kEfsDirectory);
   data_ = &storage_->OpenOrAddStorage(pkv::kEfsData);
+  for (const auto& [number, entry] : NumberedStreams(*directory_)) {
+    if (entry->bytes.size() > pkv::kEntryPath)
+      numbers_[{entry->bytes.begin() + pkv::kEntryPath, entry->bytes.end()}] = number;
+  }
   for (const CompoundStorage* part : {directory_, data_}) {
     const auto streams = NumberedStreams(*part);
     if (!streams.empty()) next_number_ = std::max(next_number_, streams.rbegin()->first + 1);
@@ -54,9 +58,17 @@ EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_vie
 
 bool EfsEntryStorage::Write(const PkvEfsFile& file) {
   if (access_ == pkv::Access::kRead) return false;
-  const std::string name = pkv::EntryName(next_number_++);
-  directory_->streams.push_back({name, EntryRecord(file)});
-  data_->streams.push_back({name, file.bytes});
+  const auto [known, added] = numbers_.emplace(file.path, next_number_);
+  const std::string name = pkv::EntryName(known->second);
+  if (added) {
+    ++next_number_;
+    directory_->streams.push_back({name, {}});  // no search: the number is new
+    data_->streams.push_back({name, {}});
+  }
+  CompoundStream& entry = added ? directory_->streams.back() : directory_->OpenOrAddStream(name);
+  CompoundStream& content = added ? data_->streams.back() : data_->OpenOrAddStream(name);
+  entry.bytes = EntryRecord(file);
+  content.bytes = file.bytes;
   return true;
 }
 

@@ -3,6 +3,7 @@
 #define KRAL_STORAGE_EFS_BACKUP_H
 
 #include <cstdint>
+#include <map>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -26,7 +27,7 @@ struct PkvEfsFile {
 // The pair of "EFS_Dir" and "EFS_Data" in a storage of its own below the configuration.
 class EfsEntryStorage {
  public:
-  // Appends a file. False when the storage was opened for reading.
+  // Appends a file, or puts it in the place of the one with its path. False when the storage was opened for reading.
   bool Write(const PkvEfsFile& file);
   // Appends the files in the order of their numbers; `problem` names a damaged entry.
   bool Read(std::vector<PkvEfsFile>& files, std::string& problem) const;
@@ -39,6 +40,7 @@ class EfsEntryStorage {
   const pkv::Access access_;
   CompoundStorage* directory_ = nullptr;
   CompoundStorage* data_ = nullptr;
+  std::map<std::string, uint32_t> numbers_;  // by path
   uint32_t next_number_ = 0;
 };
 

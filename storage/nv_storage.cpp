@@ -3,6 +3,8 @@
 
 #include <set>
 
+#include "frame/base/little_endian.h"
+
 namespace kral {
 
 CNVStorage::CNVStorage(CompoundStorage& storage, uint16_t subscription, pkv::Access access)
@@ -46,6 +48,10 @@ bool CNVStorage::ReadNumbered(std::vector<PkvNvItem>& items, std::string& proble
       if (!pkv::ParseNumberedRecord(stream.bytes, item)) {
         problem = storage->name + "/" + stream.name + " has only " + std::to_string(stream.bytes.size()) + " of " +
                   std::to_string(pkv::kNumberedRecordSize) + " bytes";
+        return false;
+      }
+      if (item.id != id || LoadLe<uint16_t>(stream.bytes, pkv::kNumberedLength) != pkv::kNumberedRecordSize) {
+        problem = storage->name + "/" + stream.name + " is damaged";
         return false;
       }
       item.subscription = subscription_;

@@ -13,12 +13,10 @@ using kral::OnPhoneAtOnce;
 
 namespace {
 
-constexpr uint32_t kUnknownStatus = 0xFFFFFFFF;
-
 using Job = uint32_t (*)(Diag_FTM& phone, const std::string& path);
 
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
-  kral::Put(status, kUnknownStatus);
+  kral::Put(status, uint32_t{KRAL_PKV_STATUS_UNEXPECTED});
   const uint32_t result = job(phone, file == nullptr ? "" : file);
   kral::Put(status, result);
   return result == KRAL_PKV_STATUS_DONE;

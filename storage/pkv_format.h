@@ -109,7 +109,7 @@ namespace pkv {
 
 std::array<uint8_t, kArrayRecordSize> ArrayRecord(const PkvNvItem& item);
 std::array<uint8_t, kNumberedRecordSize> NumberedRecord(const PkvNvItem& item);
-// The length words are not looked at: nothing depends on them. False when there are too few bytes.
+// The length words are not looked at here. False when there are too few bytes.
 bool ParseArrayRecord(std::span<const uint8_t> bytes, PkvNvItem& item, uint16_t& flags);
 bool ParseNumberedRecord(std::span<const uint8_t> bytes, PkvNvItem& item);
 

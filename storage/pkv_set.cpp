@@ -6,6 +6,7 @@
 #include <tuple>
 #include <utility>
 
+#include "frame/base/little_endian.h"
 #include "frame/base/text_log.h"
 #include "platform/station_switch.h"
 #include "storage/nv_storage.h"
@@ -28,8 +29,25 @@ void Normalize(std::vector<PkvNvItem>& items) {
   items.erase(std::unique(items.begin(), items.end(), same), items.end());
 }
 
+// A record in use that tells another length is out of step: its value would be part of another one's.
+bool AreRecordsWhole(const CompoundStorage& storage, uint16_t subscription) {
+  const CompoundStream* const stream = storage.FindStream(pkv::NameOfSubscription(pkv::kItemArray, subscription));
+  if (stream == nullptr) return true;
+  const std::span<const uint8_t> bytes(stream->bytes);
+  PkvNvItem item;
+  uint16_t flags = 0;
+  for (size_t at = 0; pkv::ParseArrayRecord(bytes.subspan(at), item, flags); at += pkv::kArrayRecordSize) {
+    if ((flags & pkv::kRecordInUse) != 0 && LoadLe<uint16_t>(bytes, at) != pkv::kArrayRecordSize) return false;
+  }
+  return true;
+}
+
 bool AppendItems(CompoundStorage& storage, std::vector<PkvNvItem>& items, std::string& problem) {
   for (const uint16_t subscription : CNVStorage::Subscriptions(storage)) {
+    if (!AreRecordsWhole(storage, subscription)) {
+      problem = pkv::NameOfSubscription(pkv::kItemArray, subscription) + " is damaged";
+      return false;
+    }
     CNVStorage source(storage, subscription, pkv::Access::kRead);
     source.OpenItemArray();
     const std::vector<PkvNvItem> array = source.item_array().Items();

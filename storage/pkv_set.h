@@ -45,8 +45,8 @@ enum class PkvWriter { kStorageClasses, kVarnPkvFile };
 // environment variable KRAL_USE_PKV_FILE (Linux) is there.
 PkvWriter ChosenPkvWriter();
 
-// Items whose status is not 0 have no value and are left out. The file is replaced in one step; after a failure it is
-// as it was. `log`, if given, gets a line per item and one at the end.
+// Items whose status is not 0 have no value and are left out. VARN_PkvFile writes no file without an item. The file is
+// replaced in one step; after a failure it is as it was. `log`, if given, gets a line per item and one at the end.
 PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandler* log = nullptr,
                     PkvWriter writer = ChosenPkvWriter());
 

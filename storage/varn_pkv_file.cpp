@@ -207,6 +207,7 @@ void VARN_PkvFile::open(const std::string& file_name) {
     AppendNumbered(*configuration, subscription, content->places);
   }
   file_name_ = file_name;
+  properties_ = content->file.properties();
   content_ = std::move(content);
 }
 
@@ -221,7 +222,7 @@ VARN_PkvFile& VARN_PkvFile::operator<<(const PkvEfsFile& file) {
 }
 
 void VARN_PkvFile::writeToDisk() {
-  if (items_.empty() && files_.empty()) {
+  if (items_.empty()) {
     throw Exception(
         "VARN_PkvFile::writeToDisk() - Before calling this member function you need to add at least 1 NV item to the "
         "this object using the insertion operator.");
@@ -247,6 +248,11 @@ void VARN_PkvFile::writeToDiskImpl(CPhoneStorageFile& file) const {
     if (granted != pkv::kNumberedRecordSize)
       raise("NV Item: '" + std::to_string(item.id) + "' but", granted, std::to_string(pkv::kNumberedRecordSize));
     targets.try_emplace(item.subscription, configuration, item.subscription).first->second.Write(item);
+  }
+  for (const PkvEfsFile& entry : files_) {
+    const size_t size = pkv::kEntryPath + entry.path.size() + entry.bytes.size();
+    const size_t granted = room.Claim(size);
+    if (granted != size) raise("EFS File: '" + entry.path + "' but", granted, std::to_string(size));
   }
   WriteEfsFiles(configuration, files_);
   const auto write = [&](CompoundStorage& storage, std::string_view name, std::vector<uint8_t> bytes,

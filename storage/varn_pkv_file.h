@@ -73,22 +73,22 @@ class VARN_PkvFile {
   VARN_PkvFile(const VARN_PkvFile&) = delete;
   VARN_PkvFile& operator=(const VARN_PkvFile&) = delete;
 
-  // Reads the file; what is added then and written joins what it holds, or takes its place. Raises an Exception when it
-  // cannot be read.
+  // Reads the file, its properties too; what is added then and written joins what it holds, or takes its place. Raises
+  // an Exception when it cannot be read.
   void open(const std::string& file_name);
 
   VARN_PkvFile& operator<<(const NvItem& item);
   VARN_PkvFile& operator<<(const PkvEfsFile& file);
   void setProperties(PkvProperties properties) { properties_ = std::move(properties); }
 
-  // Replaces the file in one step. Raises an Exception when nothing was added and when it cannot be written.
+  // Replaces the file in one step. Raises an Exception when no NV item was added and when it cannot be written.
   void writeToDisk();
 
   // Of the file as it was opened; one that was named only is opened by the first begin().
   Iterator begin();
   Iterator end();
 
-  // Bytes that the items and the properties may take together; lower in tests only.
+  // Bytes that the items, the files and the properties may take together; lower in tests only.
   void set_size_limit(size_t limit) { size_limit_ = limit; }
 
  private:

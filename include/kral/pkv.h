@@ -27,14 +27,15 @@ extern "C" {
 
 /** Ends of the work. */
 #define KRAL_PKV_STATUS_DONE 0u
-#define KRAL_PKV_STATUS_CANNOT_OPEN 7u   /**< the file cannot be read, or cannot be written */
-#define KRAL_PKV_STATUS_LOST 16u         /**< the handset does not answer */
-#define KRAL_PKV_STATUS_NO_STORAGE 18u   /**< the file is no PKV file */
-#define KRAL_PKV_STATUS_BAD_ITEM 20u     /**< something in the file is damaged */
-#define KRAL_PKV_STATUS_NOTHING_READ 22u /**< the handset gave no item and no file */
-#define KRAL_PKV_STATUS_NOT_WRITTEN 23u  /**< the handset refused something, or reads back otherwise */
-#define KRAL_PKV_STATUS_DIFFERENT 256u   /**< file and handset differ */
-#define KRAL_PKV_STATUS_STOPPED 257u     /**< the callback wanted it so */
+#define KRAL_PKV_STATUS_CANNOT_OPEN 7u         /**< the file cannot be read, or cannot be written */
+#define KRAL_PKV_STATUS_LOST 16u               /**< the handset does not answer */
+#define KRAL_PKV_STATUS_NO_STORAGE 18u         /**< the file is no PKV file */
+#define KRAL_PKV_STATUS_BAD_ITEM 20u           /**< something in the file is damaged */
+#define KRAL_PKV_STATUS_NOTHING_READ 22u       /**< the handset gave no item and no file */
+#define KRAL_PKV_STATUS_NOT_WRITTEN 23u        /**< the handset refused something, or reads back otherwise */
+#define KRAL_PKV_STATUS_DIFFERENT 256u         /**< file and handset differ */
+#define KRAL_PKV_STATUS_STOPPED 257u           /**< the callback wanted it so */
+#define KRAL_PKV_STATUS_UNEXPECTED 0xFFFFFFFFu /**< the library itself failed: out of memory, for instance */
 
 /** What became of an item or a file. */
 #define KRAL_PKV_DONE 0u          /**< backup: read; restore: written and read back; comparison: equal */
@@ -72,8 +73,8 @@ typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
 
 /**
  * Called once for every item and file, with its final result, on the thread that called the function, until it stops
- * the work: what a restore had written together with the last one is then in the counts only. It must not call functions
- * of the handle.
+ * the work: what a restore had written together with the last one is then in the counts only. It must not call
+ * functions of the handle.
  *
  * @param item    lives for the call only
  * @param path    of a file; null for an NV item

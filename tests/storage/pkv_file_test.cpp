@@ -218,7 +218,7 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
       {"an empty configuration",
        [&] { tree([](auto& root) { root.OpenOrAddStorage("Default_Phone_Configuration"); }); }, PkvResult::kDone},
       {"a bare configuration",
-       [&] { tree([](auto& root) { root.OpenOrAddStream("NV_ITEM_ARRAY").bytes.assign(136, 1); }); }, PkvResult::kDone},
+       [&] { tree([](auto& root) { root.OpenOrAddStream("NV_ITEM_ARRAY").bytes.assign(136, 0); }); }, PkvResult::kDone},
       {"a short numbered item",
        [&] {
          tree([](auto& root) {
@@ -232,6 +232,26 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
          tree([](auto& root) {
            auto& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
            files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = {0, 0, 0, 0, 3, 0, 0, 0, '/', 'a'};
+         });
+       },
+       PkvResult::kDamagedItem},
+      {"a record of another id than its storage",
+       [&] {
+         tree([](auto& root) {
+           const auto record = pkv::NumberedRecord(Item(2, 1));
+           root.OpenOrAddStorage("NV_NUMBERED_ITEMS")
+               .OpenOrAddStorage("00000001")
+               .OpenOrAddStream("00000000")
+               .bytes.assign(record.begin(), record.end());
+         });
+       },
+       PkvResult::kDamagedItem},
+      {"an array record of another length",
+       [&] {
+         tree([](auto& root) {
+           auto record = pkv::ArrayRecord(Item(2, 1));
+           record[0] = 0x87;
+           root.OpenOrAddStream("NV_ITEM_ARRAY").bytes.assign(record.begin(), record.end());
          });
        },
        PkvResult::kDamagedItem},
@@ -306,12 +326,42 @@ TEST_F(PkvFiles, TheIteratorGivesEveryItemOfBothLayouts) {
             (std::vector<PkvNvItem>{Item(1, 1), Item(2, 0x22), Item(2, 0x33, 1), Item(3, 5), Item(4, 4, 0, 1)}));
 }
 
+TEST_F(PkvFiles, WhatIsAddedToAFileKeepsItsPropertiesAndReplacesFilesOfItsPaths) {
+  PkvSet set = ExampleSet();
+  ASSERT_TRUE(WritePkv(Path(), set).done());
+  VARN_PkvFile file;
+  file.open(Path());
+  file << Item(60000, 1);
+  set.files[1].bytes = {9, 8};
+  set.files[2].bytes = {7};
+  for (size_t i : {1, 2}) file << set.files[i];
+  file.writeToDisk();
+  PkvSet joined;
+  ASSERT_TRUE(ReadPkv(Path(), joined).done());
+  EXPECT_EQ(joined.files, set.files);
+  EXPECT_EQ(joined.properties.values, set.properties.values);
+}
+
+TEST_F(PkvFiles, WhatTheReaderWouldRefuseForItsSizeIsNotWritten) {
+  folder_.Add("phone.pkv", "precious");
+  CompoundStorage root;
+  auto& storage = root.OpenOrAddStorage("many");
+  for (size_t i = 0; i < kCompoundEntryLimit; ++i) storage.streams.push_back({std::to_string(i), {}});
+  EXPECT_NE(SaveCompoundFile(Path(), root), "");
+  EXPECT_EQ(folder_.Content("phone.pkv"), "precious");
+}
+
 TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
   VARN_PkvFile none;
   VARN_PkvFile::Iterator unset;
   VARN_PkvFile full(Path());
   full << Item(453, 1);
   full.set_size_limit(133);
+  VARN_PkvFile files_only(Path());
+  files_only << PkvEfsFile{"/nv/items/x", 0xE1FF, {1}};
+  VARN_PkvFile without_file(Path());
+  without_file << Item(453, 1) << PkvEfsFile{"/nv/items/x", 0xE1FF, {1}};
+  without_file.set_size_limit(134 + 19);
   VARN_PkvFile without_properties(Path());
   without_properties << Item(453, 1);
   without_properties.set_size_limit(134 + 5);
@@ -328,6 +378,11 @@ TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
       {[&] { none.writeToDisk(); },
        "VARN_PkvFile::writeToDisk() - Before calling this member function you need to add at least 1 NV item to the "
        "this object using the insertion operator."},
+      {[&] { files_only.writeToDisk(); },
+       "VARN_PkvFile::writeToDisk() - Before calling this member function you need to add at least 1 NV item to the "
+       "this object using the insertion operator."},
+      {[&] { without_file.writeToDisk(); },
+       impl + "EFS File: '/nv/items/x' but was only able to write 19 out of 20 bytes"},
       {[&] { none.begin(); },
        "VARN_PkvFile::begin() - Error no PKV file has been opened.  Either create the PKV with a file name, or call "
        "the open member function with a file name as a parameter."},

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 #include <utility>
+#include <vector>
 
 #include "tools/kral/interrupt.h"
 #include "tools/kral/progress.h"
@@ -20,6 +21,7 @@ struct BackupOptions {
   std::string items = "0-9999";
   std::uint16_t subscriptions = 1;
   bool dry_run = false;
+  std::vector<std::uint16_t> read_only;
 };
 
 using Job = std::uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* file, std::uint32_t* status);
@@ -204,6 +206,8 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
     case KRAL_PKV_STATUS_DIFFERENT:
       return {ExitCode::kMismatch, fmt::format("{} and the handset on {} differ", file, DescribePort(session.port())),
               "the result names the items; kral nv restore writes them"};
+    case KRAL_PKV_STATUS_UNEXPECTED:
+      return {ExitCode::kInternal, fmt::format("{} failed within the library", where), "--log FILE tells more"};
     default:
       return BadFile(file, status);
   }
@@ -215,6 +219,10 @@ void RunJob(Context& context, const BackupOptions& options, const char* work, Jo
   if (job == KRAL_BackupNVFromMobileToPKV) {
     const auto [first, last] = ParseItems(options.items);
     KRAL_PKV_ConfigureBackup(session.handle(), first, last, options.subscriptions);
+  }
+  if (!options.read_only.empty()) {
+    KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(session.handle(), options.read_only.data(),
+                                             static_cast<std::uint16_t>(options.read_only.size()));
   }
   std::uint32_t status = 0;
   Json members{{"port", session.port()}, {"file", options.file}};
@@ -267,8 +275,11 @@ void AddNvBackupVerbs(CLI::App& app, Context& context) {
   backup->add_option("--items", options->items, "Range of item ids to read");
   backup->add_option("--subscriptions", options->subscriptions, "How many subscriptions the handset has")
       ->check(CLI::Range(1, 16));
-  add("restore", "Write what a PKV file holds to the handset and read it back", Restore)
-      ->add_flag("--dry-run", options->dry_run, "Only tell what would be written");
+  auto* restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);
+  restore->add_flag("--dry-run", options->dry_run, "Only tell what would be written");
+  restore->add_option("--read-only", options->read_only, "Items that may be read-only (0,447): skipped, not refused")
+      ->delimiter(',')
+      ->allow_extra_args(false);
   add("verify", "Compare a PKV file with the handset", Verify);
 }
 
