@@ -815,12 +815,16 @@ class Flash(ToolTest):
         self.assertEqual(plan["images"][1]["regions"], [{"base": 0x20000, "size": 32}])
         plan = self.expect_json(0, "flash", "load", "--dry-run", "--packet", "20", self.programmer)
         self.assertEqual(plan["writes"], 4)
+        large = self.expect_json(0, "flash", "load", "--dry-run", "--packet", "65535", self.programmer)
+        self.assertEqual(large["writes"], 1)
         self.assertIn("0x00020000 to 0x0002001F", self.expect(0, "flash", "verify-image", self.programmer).out)
         startless = self.add("startless.hex", self.PROGRAMMER.replace(b":0400000500020000F5\n", b""))
         broken = self.add("broken.hex", self.PROGRAMMER.replace(b"F78", b"F79"))
         two = self.add("two.hex", b":020000040001F9\n:0100000055AA\n:020000040800F2\n:0100000055AA\n:00000001FF\n")
         for words in (("load", startless), ("load", binary), ("write", broken), ("write", two),
-                      ("write", self.add("empty", b"")), ("verify-image", self.path("missing")), ("hex", two, "x")):
+                      ("write", self.add("empty", b"")), ("verify-image", self.path("missing")), ("hex", two, "x"),
+                      ("write", "--dry-run", "--header", self.add("long", bytes(513)), binary),
+                      ("write", "--dry-run", "--partition", self.path("missing"), binary)):
             self.expect_json(10, "flash", *words)
 
     def test_hex_files_become_binaries_and_back(self):

@@ -30,17 +30,18 @@ constexpr std::array<Reason, 9> kReasons{{
     {"is not a HELLO_REQ", ExitCode::kLink, "something other than a boot loader answers",
      "check the port: the handset may be running its software, from which --enter leads into the boot loader"},
     {"cannot be opened", ExitCode::kBadFile, "the file of the flash programmer cannot be read",
-     "check its name and permissions; the boot loader still waits for it"},
+     "check its name and permissions, power the handset off and on and begin again"},
     {"Kivrat: the file has no more", ExitCode::kBadFile,
      "the flash programmer ends before the boot loader has all of it",
      "check that the file is whole and meant for this handset; power the handset off and on and begin again"},
     {"Failed to send", ExitCode::kLink, "a packet could not be written", "check the cable and begin again"},
     {"Failed to write", ExitCode::kLink, "a packet could not be written", "check the cable and begin again"},
+    // In front of the lines that follow it in the log.
+    {"Kivrat: a ", ExitCode::kLink, "the boot loader sent a packet that makes no sense",
+     "power the handset off and on and begin again; --log FILE shows the packets"},
     {"Failed to re", ExitCode::kNoAnswer, "no boot loader answers in time",
      "power the handset off and on: its hello comes once, and is lost when another program reads it"},
     {"Recieved ", ExitCode::kLink, "the boot loader answered with something else",
-     "power the handset off and on and begin again; --log FILE shows the packets"},
-    {"Kivrat: a ", ExitCode::kLink, "the boot loader sent a packet that makes no sense",
      "power the handset off and on and begin again; --log FILE shows the packets"},
 }};
 

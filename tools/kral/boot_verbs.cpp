@@ -31,6 +31,7 @@ void ShowInfo(Context& context, const BootOptions& options) {
 }
 
 void Load(Context& context, const BootOptions& options, const std::string& programmer) {
+  CheckFile(programmer);
   BootTarget target(context, options);
   const auto identity = target.Connect(false);
   context.found["version"] = identity.version;

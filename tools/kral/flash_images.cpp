@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <charconv>
 
+#include "platform/file_util.h"
 #include "tools/kral/progress.h"
 
 namespace kral::tool {
@@ -41,6 +42,15 @@ std::optional<std::uint8_t> TakeType(std::string_view& argument) {
 }
 
 }  // namespace
+
+void CheckFile(const std::string& file, std::uint64_t most) {
+  FileReader reader;
+  if (reader.Open(file) || reader.size() == 0) {
+    throw BadImage(file, "the file is missing, empty or unreadable", "check its name and permissions");
+  }
+  if (reader.size() <= most) return;
+  throw BadImage(file, fmt::format("it has {} bytes", reader.size()), fmt::format("at most {} are taken", most));
+}
 
 std::uint32_t ParseImageFormat(std::string_view name) {
   if (name == "hex") return KRAL_IMAGE_FORMAT_HEX;

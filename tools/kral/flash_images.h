@@ -27,6 +27,9 @@ FlashImage ReadFlashImage(std::string_view argument, std::uint32_t format);
 // A flash programmer: HEX, not too large, and started at its lowest address.
 FlashImage ReadProgrammer(const std::string& file);
 
+// ToolError kBadFile for one that is no readable file, empty, or longer than `most` bytes.
+void CheckFile(const std::string& file, std::uint64_t most = UINT64_MAX);
+
 // What a file holds, for people and in JSON.
 std::string DescribeImage(const FlashImage& image);
 Json ImageObject(const FlashImage& image);

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
+#include <ranges>
 
 #include "tools/kral/error_lines.h"
 #include "tools/kral/interrupt.h"
@@ -21,6 +22,16 @@ bool WasLogged(std::string_view part) {
   const auto lines = ErrorLines();
   return std::any_of(lines.begin(), lines.end(),
                      [part](const std::string& line) { return line.find(part) != std::string::npos; });
+}
+
+// Since the handset last did as it was asked: what timed out before was made good.
+bool TimedOutLast() {
+  const auto lines = ErrorLines();
+  for (const auto& line : lines | std::views::reverse) {
+    if (line.find("Request timed out") != std::string::npos) return true;
+    if (line.starts_with("HELLO command succeeded") || line.starts_with("Enqueued")) return false;
+  }
+  return false;
 }
 
 }  // namespace
@@ -163,7 +174,7 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
 
 ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_t result) {
   const auto where = DescribePort(port);
-  const bool timed_out = WasLogged("Request timed out");
+  const bool timed_out = TimedOutLast();
   switch (result) {
     case KRAL_DOWNLOAD_ABORTED:
       return InterruptedError();

@@ -17,6 +17,8 @@ namespace {
 // What one frame takes; the plan of a dry run reckons with it where nothing else is said.
 constexpr std::uint32_t kLargestBlock = 16376;
 constexpr std::uint32_t kDefaultPacket = 8178;
+constexpr std::uint32_t kLargestChunk = 4089;
+constexpr std::size_t kLargestOpening = 512;  // of headers and of partition tables
 
 void PrintState(Context& context, std::uint16_t port, const char* state, const Json& more, const std::string& text) {
   Json members{{"port", port}, {"state", state}};
@@ -54,7 +56,7 @@ struct LoadArguments {
 void LoadProgrammer(Context& context, const LoadArguments& arguments) {
   const auto programmer = ReadProgrammer(arguments.file);
   if (arguments.dry_run) {
-    const auto chunk = std::max(arguments.packet / 2, 1u);
+    const auto chunk = std::min(arguments.packet / 2, kLargestChunk);
     context.out.Result(
         {{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
         DescribeImage(programmer) +
@@ -111,6 +113,8 @@ void WriteImages(Context& context, WriteArguments arguments) {
   options.format = ParseImageFormat(arguments.format);
   std::vector<FlashImage> images;
   for (const auto& argument : arguments.images) images.push_back(ReadFlashImage(argument, options.format));
+  if (!options.header.empty()) CheckFile(options.header, kLargestOpening);
+  if (!arguments.partition_table.empty()) CheckFile(arguments.partition_table, kLargestOpening);
   if (arguments.dry_run)
     return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
 
