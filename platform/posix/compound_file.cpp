@@ -11,6 +11,8 @@
 #include <memory>
 #include <utility>
 
+#include "platform/compound_chains.h"
+
 namespace kral {
 namespace {
 
@@ -118,6 +120,7 @@ bool WriteChildren(GsfOutfile* outfile, const CompoundStorage& storage) {
 }  // namespace
 
 std::string ParseCompoundFile(std::span<const uint8_t> file, CompoundStorage& root) {
+  if (!CompoundChainsEnd(file)) return "a compound document whose chains do not end";
   const Owned<GsfInput> input(gsf_input_memory_new(file.data(), static_cast<gsf_off_t>(file.size()), FALSE));
   if (!input) return "out of memory";
   const QuietParser quiet;

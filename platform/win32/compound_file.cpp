@@ -9,6 +9,8 @@
 #include <memory>
 #include <utility>
 
+#include "platform/compound_chains.h"
+
 namespace kral {
 namespace {
 
@@ -166,6 +168,7 @@ std::string CopyOut(ILockBytes* bytes, std::vector<uint8_t>& file) {
 }  // namespace
 
 std::string ParseCompoundFile(std::span<const uint8_t> file, CompoundStorage& root) {
+  if (!CompoundChainsEnd(file)) return "a compound document whose chains do not end";
   const Owned<ILockBytes> bytes = MakeLockBytes(file);
   if (!bytes) return "out of memory";
   IStorage* opened = nullptr;
