@@ -149,7 +149,7 @@ class Document {
 
 bool CompoundChainsEnd(std::span<const uint8_t> file) {
   if (file.size() < kHeaderSize || !std::equal(kMagic.begin(), kMagic.end(), file.begin())) return true;
-  const unsigned shift = file[kSectorShift] | file[kSectorShift + 1] << 8;
+  const unsigned shift = file[kSectorShift] | unsigned{file[kSectorShift + 1]} << 8;
   return (shift == 9 || shift == 12) && Document(file, shift).ChainsEnd();
 }
 
