@@ -92,7 +92,7 @@ NvAnswer NvMobile::ReadFile(const NvItem& item, NvBytes& stored) {
   }
   PkvEfsFile file{item.path, status.mode, {}};
   uint32_t error = 0;
-  const Answer answer = items_.ReadFile(file, error);
+  const Answer answer = items_.ReadFile(file, error, status.size);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   stored = std::move(file.bytes);
   return {error == 0 ? Kind::kOk : Kind::kRefused};

@@ -59,7 +59,7 @@ class PhoneItems {
   Answer FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   Answer FindFiles(std::vector<FoundFile>& files);  // kRefused when there are unlisted ones
   // By path and mode. An item file that is known to be larger than an item request takes is read as a plain one.
-  Answer ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size = 0);
+  Answer ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size);
   Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with folders and permissions
 
  private:
