@@ -16,7 +16,8 @@ namespace kral {
 // Opens an ordinary file for a reader of its own; null for everything else. Never waits, as a pipe would have it.
 std::FILE* OpenToRead(const std::string& path);
 
-// Reads an ordinary file of at most `limit` bytes; a longer one is std::errc::file_too_large, and nothing of it is given.
+// Reads an ordinary file of at most `limit` bytes; a longer one is std::errc::file_too_large, and nothing of it is
+// given.
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes);
 
 // A file read from its front to its end, as long as it may be. Others may read it meanwhile; on Windows nobody may

@@ -33,7 +33,8 @@ std::string Describe(const std::vector<std::uint16_t>& ports) {
 std::uint16_t TheOnlyListedPort() {
   const auto ports = ListPorts();
   if (ports.size() == 1) return ports.front();
-  throw ToolError(ExitCode::kUsage, ports.empty() ? "this machine has no serial port" : "this machine has several ports",
+  throw ToolError(ExitCode::kUsage,
+                  ports.empty() ? "this machine has no serial port" : "this machine has several ports",
                   "name the port of the boot loader: -p N");
 }
 
