@@ -1,6 +1,7 @@
 // Exports of software download: name line, handle, operation.
 #include "download/download_client.h"
 #include "download/image_file.h"
+#include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 
 namespace download = kral::download;
@@ -8,12 +9,9 @@ using kral::LogFormatted;
 using kral::LogName;
 using kral::OnPhone;
 using kral::OnPhoneAtOnce;
+using kral::TextOrEmpty;
 
 namespace {
-
-const char* Text(const char* text) {
-  return text == nullptr ? "" : text;
-}
 
 // For the functions that have no handset.
 template <class Operation>
@@ -45,8 +43,8 @@ uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle) {
 
 uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file,
                                                 uint32_t maximum_packet, uint32_t* result) {
-  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )", Text(programmer_file),
-               maximum_packet);
+  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )",
+               TextOrEmpty(programmer_file), maximum_packet);
   return OnPhone(handle, download::LoadFlashProgrammer, programmer_file, maximum_packet, result);
 }
 
@@ -82,15 +80,16 @@ uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t mode) {
 
 uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const char* table_file, uint8_t override_table,
                                               uint8_t* status) {
-  LogFormatted(handle, "KRAL_STREAM_PARTITION_TABLE( sTable = %s, bOverride = %d )", Text(table_file), override_table);
+  LogFormatted(handle, "KRAL_STREAM_PARTITION_TABLE( sTable = %s, bOverride = %d )", TextOrEmpty(table_file),
+               override_table);
   return OnPhone(handle, download::PartitionTable, table_file, override_table, status);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const char* image_file, uint32_t format,
                                              uint8_t image_type, const char* header_file, uint8_t method,
                                              uint32_t block_size, uint16_t window, uint32_t* result) {
-  LogFormatted(handle, "KRAL_STREAM_WriteImageFile( sImage = %s, iType = %d, sHeader = %s )", Text(image_file),
-               image_type, Text(header_file));
+  LogFormatted(handle, "KRAL_STREAM_WriteImageFile( sImage = %s, iType = %d, sHeader = %s )", TextOrEmpty(image_file),
+               image_type, TextOrEmpty(header_file));
   return OnPhone(handle, download::WriteImageFile, image_file, format, header_file,
                  download::WriteArguments{image_type, method, block_size, window}, result);
 }

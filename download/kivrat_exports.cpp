@@ -8,6 +8,7 @@
 #include "download/download_connection.h"
 #include "download/flash_all.h"
 #include "download/kivrat.h"
+#include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 #include "frame/orbt_server.h"
 
@@ -18,10 +19,7 @@ using kral::LogFormatted;
 using kral::LogName;
 using kral::OnPhone;
 using kral::OnPhoneAtOnce;
-
-const char* Text(const char* text) {
-  return text == nullptr ? "" : text;
-}
+using kral::TextOrEmpty;
 
 bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms, uint32_t pre_done_delay_ms) {
   phone.kivrat().hello_retries = hello_retries;
@@ -44,7 +42,7 @@ bool Connect(Diag_FTM& phone, uint32_t* version, uint32_t* chip_identity) {
 }
 
 bool DownloadFlashProgrammer(Diag_FTM& phone, const char* file) {
-  return kral::download::ServeFlashProgrammer(phone, Text(file));
+  return kral::download::ServeFlashProgrammer(phone, TextOrEmpty(file));
 }
 
 bool End(Diag_FTM& phone) {
@@ -111,7 +109,7 @@ uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* version, uin
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_DownloadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file) {
-  LogFormatted(handle, "KRAL_Kivrat_DownloadFlashProgrammer( sFile = %s )", Text(programmer_file));
+  LogFormatted(handle, "KRAL_Kivrat_DownloadFlashProgrammer( sFile = %s )", TextOrEmpty(programmer_file));
   return OnPhone(handle, DownloadFlashProgrammer, programmer_file);
 }
 
@@ -123,7 +121,7 @@ uint8_t KRAL_CALL KRAL_Kivrat_End(KRAL_HANDLE handle) {
 uint8_t KRAL_CALL KRAL_Kivrat_FlashAll(KRAL_HANDLE handle, const char* programmer_file, const char* const* image_files,
                                        const uint8_t* image_types, uint32_t image_count, uint32_t* result,
                                        uint32_t* failed_image) {
-  LogFormatted(handle, "KRAL_Kivrat_FlashAll( sFile = %s, iImages = %u )", Text(programmer_file), image_count);
+  LogFormatted(handle, "KRAL_Kivrat_FlashAll( sFile = %s, iImages = %u )", TextOrEmpty(programmer_file), image_count);
   return OnPhone(handle, FlashAll, programmer_file, image_files, image_types, image_count, result, failed_image);
 }
 

@@ -1,4 +1,5 @@
 // Exports of the EFS2 client: name line, handle, operation.
+#include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 #include "kral/efs.h"
 #include "storage/efs_client.h"
@@ -10,12 +11,9 @@ using kral::LogFormatted;
 using kral::LogName;
 using kral::OnPhone;
 using kral::OnPhoneAtOnce;
+using kral::TextOrEmpty;
 
 namespace {
-
-const char* Text(const char* text) {
-  return text == nullptr ? "" : text;
-}
 
 uint8_t ImageJob(KRAL_HANDLE handle, const char* name, EfsImageJob job, const char* image_file) {
   LogName(handle, name);
@@ -44,7 +42,8 @@ uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle) {
 }
 
 uint8_t KRAL_CALL KRAL_EfsWrite(KRAL_HANDLE handle, const char* local_file, const char* efs_file) {
-  LogFormatted(handle, "KRAL_EfsWrite( sLocalFile = %s, sEFS_File = %s)", Text(local_file), Text(efs_file));
+  LogFormatted(handle, "KRAL_EfsWrite( sLocalFile = %s, sEFS_File = %s)", TextOrEmpty(local_file),
+               TextOrEmpty(efs_file));
   return OnPhone(handle, efs::WriteFromFile, local_file, efs_file);
 }
 
@@ -81,7 +80,7 @@ uint8_t KRAL_CALL KRAL_Efs2GetItem(KRAL_HANDLE handle, const char* local_file, c
 
 uint8_t KRAL_CALL KRAL_EfsDirectory(KRAL_HANDLE handle, const char* folder, uint8_t filter, KRAL_EFS_ENTRY* entries,
                                     uint32_t* count) {
-  LogFormatted(handle, "KRAL_EfsDirectory( sFolderPath = %s )", Text(folder));
+  LogFormatted(handle, "KRAL_EfsDirectory( sFolderPath = %s )", TextOrEmpty(folder));
   return OnPhone(handle, efs::ListDirectory, folder, filter, entries, count);
 }
 

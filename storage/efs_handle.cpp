@@ -1,6 +1,7 @@
 // Opens and closes files and directories of the handset, also where answers get lost or come late.
 #include "storage/efs_handle.h"
 
+#include "frame/base/text_argument.h"
 #include "storage/efs_request.h"
 #include "storage/efs_strays.h"
 
@@ -55,14 +56,14 @@ RemoteFile::RemoteFile(Diag_FTM& phone) : RemoteHandle(phone, kClose, phone.efs(
 bool RemoteFile::CanOpen(Diag_FTM& phone, const char* path) {
   Compose(phone, kOpen, kOpenToRead, kModeOfReading, PathField(path));
   if (IsWithinLimit(phone)) return true;
-  phone.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", path == nullptr ? "" : path);
+  phone.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", TextOrEmpty(path));
   return false;
 }
 
 bool RemoteFile::Open(const char* path, u32 flags, u32 mode) {
   Compose(phone_, kOpen, flags, mode, PathField(path));
   if (OpenWithRequest()) return true;
-  phone_.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", path == nullptr ? "" : path);
+  phone_.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", TextOrEmpty(path));
   return false;
 }
 

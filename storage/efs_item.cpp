@@ -1,6 +1,7 @@
 // Item files: small files that are written and read whole, by one request.
 #include <algorithm>
 
+#include "frame/base/text_argument.h"
 #include "platform/file_util.h"
 #include "storage/efs_client.h"
 #include "storage/efs_request.h"
@@ -36,7 +37,7 @@ bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const u8* buffer, 
 
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
   std::vector<u8> data;
-  const char* const name = local_file == nullptr ? "" : local_file;
+  const char* const name = TextOrEmpty(local_file);
   if (const auto error = ReadWholeFile(name, KRAL_EFS_ITEM_SIZE, data)) {
     if (error == std::errc::file_too_large) {
       phone.log().WriteLine(kLogErr, "KRAL_EFS2_DIAG_Put source file '%s' is too big. Item file max size is %i bytes, ",

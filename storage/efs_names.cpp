@@ -2,6 +2,7 @@
 #include <cstring>
 
 #include "commands/outputs.h"
+#include "frame/base/text_argument.h"
 #include "storage/efs_client.h"
 #include "storage/efs_request.h"
 #include "storage/efs_transfer.h"
@@ -31,8 +32,8 @@ bool AskStat(Diag_FTM& phone, Tries tries, const char* path, FileStatus& status)
                         "KRAL_EFS2_DIAG_STAT(                               sFilePath = %s, iErrorNo = 0x%X, iMode = "
                         "0x%X, iSize = 0x%X,                               iNlink = 0x%X, iAtime = 0x%X, iMtime = "
                         "0x%X, iCtime  = 0x%X)",
-                        path == nullptr ? "" : path, s.error_number, s.mode, s.size, s.link_count, s.access_time,
-                        s.modify_time, s.change_time);
+                        TextOrEmpty(path), s.error_number, s.mode, s.size, s.link_count, s.access_time, s.modify_time,
+                        s.change_time);
   return true;
 }
 

@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <functional>
 
+#include "frame/base/text_argument.h"
 #include "platform/file_util.h"
 #include "storage/efs_handle.h"
 #include "storage/efs_request.h"
@@ -104,7 +105,7 @@ bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
   phone.efs().abort = false;
   FileStatus status;
   if (!StatExisting(phone, efs_file, status)) return false;
-  const char* const name = local_file == nullptr ? "" : local_file;
+  const char* const name = TextOrEmpty(local_file);
   // Until its Commit nothing of that name has changed.
   AtomicFile file;
   Sink sink{.ends = {AddressOf(efs_file), AddressOf(local_file)}};

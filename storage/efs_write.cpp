@@ -3,6 +3,7 @@
 #include <fstream>
 #include <functional>
 
+#include "frame/base/text_argument.h"
 #include "storage/efs_handle.h"
 #include "storage/efs_request.h"
 #include "storage/efs_transfer.h"
@@ -115,11 +116,11 @@ bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
 }
 
 bool WriteLocalFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  std::ifstream file(local_file == nullptr ? "" : local_file, std::ios::binary | std::ios::ate);
+  std::ifstream file(TextOrEmpty(local_file), std::ios::binary | std::ios::ate);
   const auto size = static_cast<int64_t>(file.tellg());
   // A folder opens on some systems and has no end.
   if (!file || size < 0 || size > UINT32_MAX) {
-    phone.log().WriteLine(kLogErr, "fopen() failed to open PC file %s", local_file == nullptr ? "" : local_file);
+    phone.log().WriteLine(kLogErr, "fopen() failed to open PC file %s", TextOrEmpty(local_file));
     return false;
   }
   Source source{.size = static_cast<u32>(size), .ends = {AddressOf(local_file), AddressOf(efs_file)}};

@@ -7,6 +7,7 @@
 #include <mutex>
 #include <string>
 
+#include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 #include "storage/nv_tool.h"
 
@@ -43,10 +44,6 @@ uint32_t OnToolAlways(KRAL_HANDLE handle, const char* name, Operation&& operatio
   });
 }
 
-inline std::string Text(const char* text) {
-  return text == nullptr ? "" : text;
-}
-
 // --- The item that an argument names ---------------------------------------------------------------------------------
 
 struct AtIndex {
@@ -64,7 +61,7 @@ inline NvError Find(NVTool_Manager& tool, uint16_t id, NvItem*& item) {
 }
 
 inline NvError Find(NVTool_Manager& tool, const char* path, NvItem*& item) {
-  item = tool.definitions().Find(Text(path));
+  item = tool.definitions().Find(TextOrEmpty(path));
   return item == nullptr ? NvError::kNotDefined : NvError::kNone;
 }
 

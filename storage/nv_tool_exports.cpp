@@ -10,6 +10,7 @@
 
 using kral::Diag_FTM;
 using kral::Put;
+using kral::TextOrEmpty;
 using namespace kral::nv;
 
 namespace {
@@ -56,7 +57,7 @@ uint32_t GiveFieldNames(KRAL_HANDLE handle, const char* name, uint32_t index, Ta
 template <class Target>
 uint32_t GiveType(KRAL_HANDLE handle, const char* name, const char* type_name, Target target) {
   return OnTool(handle, name, [&](NVTool_Manager& tool, Diag_FTM&) {
-    const auto type = tool.definitions().FindType(Text(type_name));
+    const auto type = tool.definitions().FindType(TextOrEmpty(type_name));
     return type == nullptr ? NvError::kNotDefined : target.Take(DataTypeText(*type));
   });
 }
@@ -102,7 +103,7 @@ uint32_t SetBytes(KRAL_HANDLE handle, const char* name, Key key, uint16_t elemen
 template <class Key>
 uint32_t SetString(KRAL_HANDLE handle, const char* name, Key key, uint16_t element, const char* text) {
   return OnItem(handle, name, key, [&](NVTool_Manager& tool, Diag_FTM& phone, NvItem& item) {
-    return tool.SetText(phone, item, element, Text(text));
+    return tool.SetText(phone, item, element, TextOrEmpty(text));
   });
 }
 
@@ -132,13 +133,13 @@ uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_NV_CALLBAC
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVDefinitionFile(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_LoadNVDefinitionFile", [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    return tool.LoadDefinitions(phone, Text(file), NvDefinitionKind::kDefinitions);
+    return tool.LoadDefinitions(phone, TextOrEmpty(file), NvDefinitionKind::kDefinitions);
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVDataTypeDictinary(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_LoadNVDataTypeDictinary", [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    return tool.LoadDefinitions(phone, Text(file), NvDefinitionKind::kDictionary);
+    return tool.LoadDefinitions(phone, TextOrEmpty(file), NvDefinitionKind::kDictionary);
   });
 }
 

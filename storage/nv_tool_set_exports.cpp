@@ -7,6 +7,7 @@
 
 using kral::Diag_FTM;
 using kral::Put;
+using kral::TextOrEmpty;
 using namespace kral::nv;
 
 namespace {
@@ -25,7 +26,7 @@ uint32_t WriteItem(KRAL_HANDLE handle, const char* name, Key key, uint16_t* stat
 uint32_t OnFile(KRAL_HANDLE handle, const char* name,
                 NvError (NVTool_Manager::*operation)(Diag_FTM& phone, const std::string& file), const char* file) {
   return OnTool(handle, name,
-                [&](NVTool_Manager& tool, Diag_FTM& phone) { return (tool.*operation)(phone, Text(file)); });
+                [&](NVTool_Manager& tool, Diag_FTM& phone) { return (tool.*operation)(phone, TextOrEmpty(file)); });
 }
 
 }  // namespace
@@ -81,7 +82,7 @@ uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByIndex(KRAL_HANDLE handle, uint32
 
 uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
   return OnTool(handle, "KRAL_NV_ReadNVItemFromMobileByEfsFilename",
-                [&](NVTool_Manager& tool, Diag_FTM& phone) { return tool.ReadItem(phone, Text(efs_file)); });
+                [&](NVTool_Manager& tool, Diag_FTM& phone) { return tool.ReadItem(phone, TextOrEmpty(efs_file)); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
@@ -110,12 +111,12 @@ uint32_t KRAL_CALL KRAL_NV_ClearWriteFilters(KRAL_HANDLE handle) {
 
 uint32_t KRAL_CALL KRAL_NV_CreateNVFilter(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_CreateNVFilter",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(Text(file), true); });
+                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(TextOrEmpty(file), true); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_CreateComplementNVFilter",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(Text(file), false); });
+                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(TextOrEmpty(file), false); });
 }
 
 // --- Reports ---------------------------------------------------------------------------------------------------------
@@ -123,13 +124,13 @@ uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const ch
 uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                     const char* html_file) {
   return OnTool(handle, "KRAL_NV_PKV_Diff", [&](NVTool_Manager& tool, Diag_FTM& phone) {
-    return tool.ComparePkv(phone, Text(first_pkv), Text(second_pkv), Text(html_file));
+    return tool.ComparePkv(phone, TextOrEmpty(first_pkv), TextOrEmpty(second_pkv), TextOrEmpty(html_file));
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file) {
   return OnTool(handle, "KRAL_NV_GenerateQDF",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.GenerateQdf(Text(file)); });
+                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.GenerateQdf(TextOrEmpty(file)); });
 }
 
 // --- Subscriptions ---------------------------------------------------------------------------------------------------

@@ -1,5 +1,6 @@
 // Exports of PKV backups: name line, handle, operation.
 #include "commands/outputs.h"
+#include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 #include "frame/orbt_server.h"
 #include "kral/pkv.h"
@@ -10,6 +11,7 @@ using kral::Diag_FTM;
 using kral::LogName;
 using kral::OnPhone;
 using kral::OnPhoneAtOnce;
+using kral::TextOrEmpty;
 
 namespace {
 
@@ -17,7 +19,7 @@ using Job = uint32_t (*)(Diag_FTM& phone, const std::string& path);
 
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   kral::Put(status, uint32_t{KRAL_PKV_STATUS_UNEXPECTED});
-  const uint32_t result = job(phone, file == nullptr ? "" : file);
+  const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   return result == KRAL_PKV_STATUS_DONE;
 }
@@ -38,7 +40,7 @@ uint8_t RunOnServer(KRAL_HANDLE handle, const char* name, ServerJob job, const c
   LogName(handle, name);
   return OnPhone(handle, [&](Diag_FTM& phone) {
     const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(handle);
-    if (server && ((*server).*job)(file == nullptr ? "" : file, options)) return true;
+    if (server && ((*server).*job)(TextOrEmpty(file), options)) return true;
     phone.log().WriteLine(kral::kLogErr, "%s() - %s", name, server ? "the download agent failed" : "no phone server");
     return false;
   });
