@@ -30,7 +30,7 @@ class TextFile final : public TextSource, public TextSink {
  public:
   bool OpenForReading(const std::string& path);
   bool OpenForWriting(const std::string& path);  // empties it
-  bool Close();  // false when not everything reached the file
+  bool Close();                                  // false when not everything reached the file
 
   size_t Read(std::span<char> buffer) override;
   void Rewind() override;

@@ -46,9 +46,8 @@ VirtualHandset::VirtualHandset(Identity identity, Clock& clock)
       programmer_(std::make_shared<FlashProgrammer>(flash_)),
       loader_(std::make_shared<KovaLoader>(*memory_, programmer_)),
       boot_loader_(std::make_shared<BootLoader>()) {
-  ftm_->SetDispatcher(kRfNvModeId, [efs = efs_](uint16_t command, ByteView payload) {
-    return CarryOutRfNv(*efs, command, payload);
-  });
+  ftm_->SetDispatcher(
+      kRfNvModeId, [efs = efs_](uint16_t command, ByteView payload) { return CarryOutRfNv(*efs, command, payload); });
   identity_ = std::make_shared<IdentityService>(std::move(identity));
   for (const std::shared_ptr<Service>& service : std::initializer_list<std::shared_ptr<Service>>{
            identity_, nv_, efs_, logs_, mode_service_, ftm_, memory_, maintenance_}) {

@@ -14,7 +14,9 @@
 namespace kral {
 
 // std::has_single_bit counts all bits, with a call where the machine cannot.
-constexpr bool HasSingleBit(uint32_t mask) { return mask != 0 && (mask & (mask - 1)) == 0; }
+constexpr bool HasSingleBit(uint32_t mask) {
+  return mask != 0 && (mask & (mask - 1)) == 0;
+}
 
 // Eight bytes in a machine word.
 class WordBlock {

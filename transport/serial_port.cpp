@@ -45,7 +45,9 @@ int32_t SettingErrorCode(DeviceError error) {
   }
 }
 
-DeviceResult NotOpen() { return {DeviceError::kOther, 0, "the port is not open"}; }
+DeviceResult NotOpen() {
+  return {DeviceError::kOther, 0, "the port is not open"};
+}
 
 }  // namespace
 

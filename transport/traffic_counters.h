@@ -7,7 +7,7 @@
 namespace kral {
 
 struct TrafficCounters {
-  uint64_t bytes_received = 0;      // from the port
+  uint64_t bytes_received = 0;    // from the port
   uint64_t packets_received = 0;  // handed to the dispatcher
   uint64_t collected = 0;         // put into the asynchronous queue
   uint64_t events = 0;            // put into the event queue

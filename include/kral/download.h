@@ -142,8 +142,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t
  * @param      handle          of a handset that runs a flash programmer
  * @param      table_file      path of the table, at most 512 bytes
  * @param      override_table  1 to replace a different table
- * @param[out] status          what the handset said, KRAL_STREAM_PARTITION_...; also written when that is a refusal, and
- *                             untouched when it said nothing. May be null.
+ * @param[out] status          what the handset said, KRAL_STREAM_PARTITION_...; also written when that is a refusal,
+ *                             and untouched when it said nothing. May be null.
  * @return 1 when the table was accepted
  *
  * Wait: time-out 0.
@@ -250,8 +250,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char *image_file, uint32_t f
  * @param         input        path of the file to read
  * @param         output       path of the file to write
  * @param         direction    KRAL_HEX_TO_BINARY or KRAL_HEX_FROM_BINARY
- * @param[in,out] base_address of the first byte: told by the HEX file, or given for it, then a multiple of 65,536. May be
- *                             null, for 0.
+ * @param[in,out] base_address of the first byte: told by the HEX file, or given for it, then a multiple of 65,536. May
+ *                             be null, for 0.
  * @param[out]    result       KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_IMAGE, ..._BAD_ARGUMENT,
  *                             KRAL_HEX_NOT_WRITTEN or 0; may be null
  */

@@ -21,7 +21,7 @@
 extern "C" {
 #endif
 
-/* --- Settings of the handle ---------------------------------------------------------------------------------------- */
+/* --- Settings of the handle --------------------------------------------------------------------------------------- */
 
 /**
  * Chooses the dispatcher that receives FTM commands. Sends nothing.
@@ -45,7 +45,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_COMMAND_CODE(KRAL_HANDLE handle, uint16_
 /** Hands back the command code in force. Sends nothing. */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t *code);
 
-/* --- Into and out of factory test mode ----------------------------------------------------------------------------- */
+/* --- Into and out of factory test mode ---------------------------------------------------------------------------- */
 
 /**
  * Asks whether the handset is in factory test mode: its operating mode under command code 75, the boot flag (NV item
@@ -83,7 +83,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ChangeFTM_BootMode(KRAL_HANDLE handle, uint8_t f
  */
 KRAL_API uint8_t KRAL_CALL KRAL_ChangeFTM_ModeRuntime(KRAL_HANDLE handle, uint8_t ftm);
 
-/* --- Commands with arguments of their own -------------------------------------------------------------------------- */
+/* --- Commands with arguments of their own ------------------------------------------------------------------------- */
 
 /**
  * Sets the RF mode: technology and band (command 7).
@@ -122,7 +122,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_TX_ON(KRAL_HANDLE handle);
 /** Switches the transmitter off (command 3). */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_TX_OFF(KRAL_HANDLE handle);
 
-/* --- Commands of every family: additions of this library ----------------------------------------------------------- */
+/* --- Commands of every family: additions of this library ---------------------------------------------------------- */
 
 /**
  * Addition. Sends any FTM command to the dispatcher of the current mode id; arguments as ftm_commands.h tells.

@@ -6,7 +6,6 @@
 #include <cctype>
 #include <memory>
 #include <optional>
-#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
