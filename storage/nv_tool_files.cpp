@@ -1,6 +1,7 @@
 // Sets of items between the NV tool and files of the PC, and the reports.
 #include <algorithm>
 #include <map>
+#include <set>
 #include <utility>
 
 #include "commands/nv_item.h"
@@ -144,7 +145,9 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   if (total == 0) return NvError::kNoValue;
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_PKV, total);
   PkvSet set;
+  std::set<uint16_t> arrays;
   for (const NvItem* item : items) {
+    if (item->is_array() && item->id) arrays.insert(*item->id);
     for (const auto& [slot, value] : item->values) {
       const bool appended = AppendToPkv(phone, *item, slot, value, set);
       walk.Report(item->Title(), appended ? NvError::kNone : NvError::kCannotSetValue);
@@ -155,6 +158,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   // Values need no handset, and the null port is none; one that is there signs them.
   const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
   if (has_handset) pkv::ReadIdentity(phone, set.properties);
+  pkv::NoteArrays(arrays, set.properties);
   const PkvOutcome outcome = WritePkv(file, set, &phone.log());
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
   return ErrorOf(outcome);

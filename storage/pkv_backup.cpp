@@ -90,7 +90,11 @@ class BackupJob {
     for (const PhoneItems::FoundFile& file : files) {
       if (!ReadFile(file, set, report)) return End(report);
     }
-    NoteArrays(items, set);
+    std::set<uint16_t> arrays;
+    for (const Wanted& item : items) {
+      if (item.element) arrays.insert(item.id);
+    }
+    NoteArrays(arrays, set.properties);
     return set.items.empty() && set.files.empty() ? KRAL_PKV_STATUS_NOTHING_READ : KRAL_PKV_STATUS_DONE;
   }
 
@@ -113,17 +117,6 @@ class BackupJob {
       report.Add(item, KRAL_PKV_DONE, 0);
     }
     return !report.stopped();
-  }
-
-  // Which ids are arrays; an element 0 alone looks like a plain item.
-  static void NoteArrays(const std::vector<Wanted>& items, PkvSet& set) {
-    std::set<uint16_t> arrays;
-    for (const Wanted& item : items) {
-      if (item.element) arrays.insert(item.id);
-    }
-    std::string list;
-    for (const uint16_t id : arrays) list += (list.empty() ? "" : ",") + std::to_string(id);
-    set.properties.values.emplace_back(kArraysProperty, list);
   }
 
   bool ReadFile(const PhoneItems::FoundFile& found, PkvSet& set, JobReport& report) {

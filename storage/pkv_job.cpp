@@ -10,6 +10,8 @@
 namespace kral::pkv {
 namespace {
 
+constexpr const char* kArraysProperty = "Arrays";
+
 uint32_t* CounterOf(KRAL_PKV_COUNTS& counts, uint32_t result) {
   switch (result) {
     case KRAL_PKV_DONE:
@@ -100,6 +102,12 @@ std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
     if (item.id && !item.is_file()) items.emplace(*item.id, item.max_index);
   });
   return items;
+}
+
+void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties) {
+  std::string list;
+  for (const uint16_t id : ids) list += (list.empty() ? "" : ",") + std::to_string(id);
+  properties.values.emplace_back(kArraysProperty, list);
 }
 
 ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {

@@ -50,11 +50,11 @@ uint32_t StatusOf(PkvResult result);
 // The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
 std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
 
-// The property of a backup that lists the ids of its array items: "3101,3102".
-inline constexpr const char* kArraysProperty = "Arrays";
+// Notes which ids are arrays, as "3101,3102": an element 0 alone looks like a plain item.
+void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties);
 
 // Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
-// those that the backup lists. Where it has no list, those that are defined so.
+// those that the file notes. Where it has no such note, those that are defined so.
 class ArrayItems {
  public:
   ArrayItems(Diag_FTM& phone, const PkvSet& set);

@@ -76,7 +76,8 @@ TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
   const std::string pkv = Pkv();
   PkvSet signed_set;
   ASSERT_TRUE(ReadPkv(pkv, signed_set).done());
-  ASSERT_EQ(signed_set.properties.values.size(), 5u);
+  ASSERT_EQ(signed_set.properties.values.size(), 6u);
+  EXPECT_EQ(signed_set.properties.values.back(), std::pair(std::string("Arrays"), std::string("3100,3101")));
   EXPECT_EQ(signed_set.properties.values[0].first, "ESN");
   EXPECT_EQ(signed_set.properties.version, PkvVersionText());
   const std::string source = Source();
