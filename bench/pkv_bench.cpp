@@ -150,8 +150,8 @@ void LoadArray(benchmark::State& state) {
 void LoadNumberedItems(benchmark::State& state) {
   LoadFile(state, PkvWriter::kVarnPkvFile);
 }
-BENCHMARK(LoadArray)->Arg(5000)->Arg(10000)->Arg(20000)->Unit(benchmark::kMillisecond)->Complexity();
-BENCHMARK(LoadNumberedItems)->Arg(5000)->Arg(10000)->Arg(20000)->Unit(benchmark::kMillisecond)->Complexity();
+BENCHMARK(LoadArray)->Arg(5000)->Arg(10000)->Arg(20000)->Arg(60000)->Unit(benchmark::kMillisecond)->Complexity();
+BENCHMARK(LoadNumberedItems)->Arg(5000)->Arg(10000)->Arg(20000)->Arg(60000)->Unit(benchmark::kMillisecond)->Complexity();
 
 void WriteFile(benchmark::State& state, PkvWriter writer) {
   const test::TempFolder folder;

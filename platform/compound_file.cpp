@@ -1,4 +1,4 @@
-// The tree of a compound document and its way to and from a file; the format itself is the system's.
+// The tree of a compound document and its way to and from a file; the format is the reader's and the system's.
 #include "platform/compound_file.h"
 
 #include <algorithm>

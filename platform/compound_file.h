@@ -1,5 +1,5 @@
-// Compound documents (structured storage): a tree of storages and streams, loaded and saved whole. The system's own
-// reader and writer do the work: OLE structured storage on Windows, libgsf on Linux.
+// Compound documents (structured storage): a tree of storages and streams, loaded and saved whole. The system's
+// writer does the saving: OLE structured storage on Windows, libgsf on Linux. Loading is our own, see the reader for why.
 #ifndef KRAL_PLATFORM_COMPOUND_FILE_H
 #define KRAL_PLATFORM_COMPOUND_FILE_H
 
@@ -32,7 +32,7 @@ struct CompoundStorage {
   CompoundStream& OpenOrAddStream(std::string_view wanted);
 };
 
-// What a hostile file may not exceed, on either side.
+// What a hostile file may not exceed, read or written.
 inline constexpr size_t kCompoundFileLimit = size_t{256} << 20;
 inline constexpr size_t kCompoundDepthLimit = 16;
 inline constexpr size_t kCompoundEntryLimit = 200000;

@@ -1,7 +1,11 @@
 // Compound documents and XML: what is written is read again, and hostile input is refused.
+#include <fmt/format.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <functional>
 #include <string>
+#include <vector>
 
 #include "platform/compound_file.h"
 #include "platform/xml_document.h"
@@ -54,6 +58,159 @@ TEST(CompoundFile, TruncatedAndForeignFilesAreRefusedAndTheTreeStaysAsItWas) {
   const std::string text = "this is no compound document at all, and never was one";
   CompoundStorage root;
   EXPECT_NE(ParseCompoundFile({reinterpret_cast<const uint8_t*>(text.data()), text.size()}, root), "");
+}
+
+// A document made by hand: storages "00000000", "00000001" ... in the root, each the right sibling of the one before.
+class HandmadeDocument {
+ public:
+  static constexpr size_t kDirectory = 512;
+  static constexpr size_t kEntry = 128;
+  static constexpr size_t kPerSector = 512 / 4;
+
+  explicit HandmadeDocument(uint32_t storages) {
+    const uint32_t directory_sectors = (storages + 1 + 3) / 4;
+    while (tables_ * kPerSector < directory_sectors + tables_ + Lists()) ++tables_;
+    bytes.resize(512 * (1 + directory_sectors + tables_ + Lists()));
+    const uint8_t magic[] = {0xD0, 0xCF, 0x11, 0xE0, 0xA1, 0xB1, 0x1A, 0xE1};
+    std::copy(std::begin(magic), std::end(magic), bytes.begin());
+    bytes[30] = 9;
+    Put(60, kEnd);
+    Put(68, Lists() == 0 ? kEnd : directory_sectors + tables_);
+    for (uint32_t i = 0; i < 109; ++i) Put(76 + 4 * i, i < tables_ ? directory_sectors + i : kFree);
+    for (uint32_t i = 0; i < Lists() * kPerSector; ++i) {
+      const bool last = i % kPerSector == kPerSector - 1;
+      const uint32_t listed = 109 + i - i / kPerSector;
+      const uint32_t next = (i + 1) / kPerSector < Lists() ? directory_sectors + tables_ + (i + 1) / kPerSector : kEnd;
+      Put(512 * (1 + directory_sectors + tables_) + 4 * i, last               ? next
+                                                           : listed < tables_ ? directory_sectors + listed
+                                                                              : kFree);
+    }
+    table_at = 512 * (1 + directory_sectors);
+    for (uint32_t i = 0; i < tables_ * kPerSector; ++i)
+      Put(table_at + 4 * i, i + 1 < directory_sectors ? i + 1 : i + 1 == directory_sectors ? kEnd : kFree);
+    AddEntry(0, "Root Entry", 5, kFree, storages > 0 ? 1 : kFree);
+    for (uint32_t i = 1; i <= storages; ++i)
+      AddEntry(i, fmt::format("{:08}", i - 1), 1, i < storages ? i + 1 : kFree, kFree);
+  }
+
+  void Put(size_t at, uint32_t value) {
+    for (size_t i = 0; i < 4; ++i) bytes[at + i] = static_cast<uint8_t>(value >> (8 * i));
+  }
+
+  static constexpr uint32_t kEnd = 0xFFFFFFFE;
+  static constexpr uint32_t kFree = 0xFFFFFFFF;
+  std::vector<uint8_t> bytes;
+  size_t table_at = 0;
+
+ private:
+  uint32_t Lists() const { return tables_ <= 109 ? 0 : (tables_ - 109 + 126) / 127; }
+
+  void AddEntry(uint32_t number, const std::string& name, uint8_t type, uint32_t right, uint32_t child) {
+    const size_t at = kDirectory + kEntry * number;
+    for (size_t i = 0; i < name.size(); ++i) bytes[at + 2 * i] = static_cast<uint8_t>(name[i]);
+    bytes[at + 64] = static_cast<uint8_t>(2 * name.size() + 2);
+    bytes[at + 66] = type;
+    Put(at + 68, kFree);
+    Put(at + 72, right);
+    Put(at + 76, child);
+  }
+
+  uint32_t tables_ = 1;
+};
+
+// Writers are free to chain all siblings: a reader that goes one call deeper for each would use up the stack.
+TEST(CompoundFile, SiblingsMayBeAChainOfAnyLength) {
+  constexpr uint32_t kSiblings = 120000;
+  CompoundStorage root;
+  ASSERT_EQ(ParseCompoundFile(HandmadeDocument(kSiblings).bytes, root), "");
+  EXPECT_EQ(root.storages.size(), kSiblings);
+  EXPECT_EQ(root.storages.back().name, "00119999");
+  EXPECT_EQ(ParseCompoundFile(HandmadeDocument(kCompoundEntryLimit + 1).bytes, root), "too many entries");
+}
+
+TEST(CompoundFile, NamesComeFromUtf16) {
+  HandmadeDocument document(1);
+  constexpr size_t kName = HandmadeDocument::kDirectory + HandmadeDocument::kEntry;
+  document.Put(kName, 0xDCF1D83D);  // U+1F4F1
+  document.Put(kName + 4, 0x20AC00E9);
+  CompoundStorage root;
+  ASSERT_EQ(ParseCompoundFile(document.bytes, root), "");
+  EXPECT_EQ(root.storages.front().name,
+            "\xF0\x9F\x93\xB1\xC3\xA9\xE2\x82\xAC"
+            "0000");
+}
+
+TEST(CompoundFile, EachDamageIsNamed) {
+  const std::string circle = "its sectors run in circles or lead out of the file";
+  const std::string directory = "its directory runs in circles or leads out of the file";
+  constexpr size_t kThird = HandmadeDocument::kDirectory + 3 * HandmadeDocument::kEntry;
+  constexpr size_t kType = 64;  // behind the length of the name
+  struct Damage {
+    std::string what;
+    std::function<void(HandmadeDocument&)> inflict;
+    std::string problem;
+  };
+  const Damage damages[] = {
+      {"sector size", [](auto& d) { d.bytes[30] = 10; }, "sectors of an unknown size"},
+      {"directory outside", [](auto& d) { d.Put(48, 999); }, circle},
+      {"directory of circles", [](auto& d) { d.Put(d.table_at, 0); }, circle},
+      {"table outside", [](auto& d) { d.Put(76, 99); }, circle},
+      {"one table again and again",
+       [](auto& d) {
+         for (size_t i = 0; i < 20; ++i) d.Put(76 + 4 * i, 1);
+       },
+       circle},
+      {"list of circles",
+       [](auto& d) {
+         d.Put(68, 1);
+         d.Put(d.table_at + 508, 1);
+       },
+       circle},
+      {"no root", [](auto& d) { d.bytes[d.kDirectory + 66] = 1; }, "no directory"},
+      {"sibling of its own", [](auto& d) { d.Put(kThird + 68, 3); }, directory},
+      {"sibling outside", [](auto& d) { d.Put(kThird + 72, 4); }, directory},
+      {"child is a parent", [](auto& d) { d.Put(kThird + 76, 1); }, directory},
+      {"odd name", [](auto& d) { d.Put(kThird + kType, 0x010011); }, "an entry has a damaged name"},
+      {"no name", [](auto& d) { d.Put(kThird + kType, 0x010002); }, "an entry has a damaged name"},
+      {"name too long", [](auto& d) { d.Put(kThird + kType, 0x010042); }, "an entry has a damaged name"},
+      {"half a pair", [](auto& d) { d.Put(kThird, 0x0030D83D); }, "an entry has a damaged name"},
+      {"unknown kind", [](auto& d) { d.bytes[kThird + 66] = 7; }, "entry 00000002 is neither storage nor stream"},
+      {"short stream nowhere",
+       [](auto& d) {
+         d.bytes[kThird + 66] = 2;
+         d.Put(kThird + 120, 5);
+       },
+       circle},
+      {"stream in the directory",
+       [](auto& d) {
+         d.bytes[kThird + 66] = 2;
+         d.bytes.resize(8192);
+         d.Put(kThird + 120, 4096);
+       },
+       circle},
+      {"stream of no sectors",
+       [](auto& d) {
+         d.bytes[kThird + 66] = 2;
+         d.bytes.resize(8192);
+         d.Put(kThird + 116, d.kEnd);
+         d.Put(kThird + 120, 4096);
+       },
+       "stream 00000002 is cut short"},
+      {"stream longer than the file",
+       [](auto& d) {
+         d.bytes[kThird + 66] = 2;
+         d.Put(kThird + 120, 0x7FFFFFFF);
+       },
+       "stream 00000002 is cut short"},
+  };
+  for (const Damage& damage : damages) {
+    HandmadeDocument document(3);
+    damage.inflict(document);
+    CompoundStorage root;
+    root.OpenOrAddStream("kept");
+    EXPECT_EQ(ParseCompoundFile(document.bytes, root), damage.problem) << damage.what;
+    EXPECT_NE(root.FindStream("kept"), nullptr) << damage.what;
+  }
 }
 
 TEST(CompoundFile, FlippedBytesNeverDoHarm) {
