@@ -6,7 +6,6 @@
 #include <gsf/gsf-output-memory.h>
 
 #include <memory>
-#include <ranges>
 
 namespace kral {
 namespace {
@@ -25,15 +24,15 @@ bool WriteStream(GsfOutfile* parent, const CompoundStream& stream) {
   return gsf_output_close(output.get()) && written;
 }
 
+// libgsf keeps siblings sorted and looks for the place of each from the front: the last name first is the short way.
 bool WriteChildren(GsfOutfile* outfile, const CompoundStorage& storage) {
-  for (const CompoundStream& stream : storage.streams | std::views::reverse) {
-    if (!WriteStream(outfile, stream)) return false;
+  for (auto stream = storage.streams.rbegin(); stream != storage.streams.rend(); ++stream) {
+    if (!WriteStream(outfile, *stream)) return false;
   }
-  // libgsf keeps siblings sorted and looks for the place of each from the front: the last name first is the short way.
-  for (const CompoundStorage& child : storage.storages | std::views::reverse) {
-    const Owned<GsfOutput> output(gsf_outfile_new_child(outfile, child.name.c_str(), TRUE));
+  for (auto child = storage.storages.rbegin(); child != storage.storages.rend(); ++child) {
+    const Owned<GsfOutput> output(gsf_outfile_new_child(outfile, child->name.c_str(), TRUE));
     if (!output) return false;
-    const bool written = WriteChildren(GSF_OUTFILE(output.get()), child);
+    const bool written = WriteChildren(GSF_OUTFILE(output.get()), *child);
     if (!gsf_output_close(output.get()) || !written) return false;
   }
   return true;
