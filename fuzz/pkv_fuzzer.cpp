@@ -38,8 +38,10 @@ void Walk(const std::string& path) {
   VARN_PkvFile file;
   try {
     file.open(path);
-    int count = 0;
-    for (auto item = file.begin(); item != file.end(); item++) count += item->data[0] != 0 ? 1 : 0;
+    for (auto item = file.begin(); item != file.end(); item++) {
+      const VARN_PkvFile::NvItem copy = *item;  // reads every byte of it
+      Check(copy == *item);
+    }
   } catch (const VARN_PkvFile::Exception&) {
   }
 }
