@@ -70,7 +70,8 @@ size_t CNVItemStream::ClaimPosition(uint16_t id) {
 size_t CNVItemStream::Write(const PkvNvItem& item) {
   if (!writable()) return 0;
   const auto record = pkv::ArrayRecord(item);
-  std::copy(record.begin(), record.end(), stream_->bytes.begin() + static_cast<ptrdiff_t>(ClaimPosition(item.id)));
+  const auto position = static_cast<ptrdiff_t>(ClaimPosition(item.id));  // first: it may move the bytes
+  std::copy(record.begin(), record.end(), stream_->bytes.begin() + position);
   return record.size();
 }
 
