@@ -5,6 +5,7 @@
 #include <array>
 #include <chrono>
 #include <cstdio>
+#include <thread>
 #include <utility>
 
 #include "frame/base/little_endian.h"
@@ -18,6 +19,10 @@ namespace {
 // A packet is with the system at most so long after it came, or as soon as there is a good piece to write.
 constexpr std::chrono::milliseconds kGatherTime{100};
 constexpr size_t kGoodPiece = size_t{64} << 10;
+constexpr size_t kBehind = 4 * kGoodPiece;
+constexpr size_t kSlice = size_t{16} << 10;  // what the system copies in a few microseconds
+
+
 
 uint64_t MicrosecondsNow() {
   const auto now = std::chrono::system_clock::now().time_since_epoch();
@@ -104,16 +109,18 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
   {
     const std::lock_guard lock(mutex_);
     if (stop_requested_) return;  // it came after the end
-    const size_t before = pending_.size();
+    std::vector<uint8_t>& records = pending_.records;
+    const size_t before = records.size();
     const size_t after = before + head.size() + packet.size();
     if (after <= room_) {
       try {
-        pending_.resize(after);
-        const auto record = pending_.begin() + static_cast<std::ptrdiff_t>(before);
-        std::copy(packet.begin(), packet.end(), std::copy(head.begin(), head.end(), record));
+        if (after > records.capacity()) records.reserve(std::min(2 * after, room_));
+        records.insert(records.end(), head.begin(), head.end());
+        records.insert(records.end(), packet.begin(), packet.end());
+        ++pending_.packets;
         pending_packets_.fetch_add(1, std::memory_order_relaxed);
         kept = true;
-        wake = before == 0 || (before < kGoodPiece && after >= kGoodPiece);
+        wake = before < kGoodPiece && after >= kGoodPiece;
       } catch (...) {
         // Out of memory: lost like a packet that the disk is too slow for.
       }
@@ -145,32 +152,48 @@ bool CaptureWriter::Stop(uint32_t time_out_ms) {
 }
 
 void CaptureWriter::Run() {
-  std::vector<uint8_t> batch;
+  Batch batch;
   bool failed = false;
   while (TakeBatch(batch)) WriteBatch(batch, failed);
   sink_ = {};
   ended_.Set();
 }
 
-// Behind a record that is cut nothing more can be read: a file that took no more stays as it is.
-void CaptureWriter::WriteBatch(std::span<const uint8_t> batch, bool& failed) {
-  const size_t taken = failed ? 0 : std::min(sink_(batch), batch.size());
-  failed = taken < batch.size();
-  const uint64_t packets = CountWholeRecords(batch);
-  const uint64_t whole = failed ? CountWholeRecords(batch.first(taken)) : packets;
-  written_.fetch_add(whole, std::memory_order_relaxed);
-  if (whole < packets) Lose(packets - whole, "the file cannot be written any more");
-  pending_packets_.fetch_sub(packets, std::memory_order_relaxed);
+// Looks by itself whether anything came: to be woken by the first packet of each batch would hold the connection up more
+// than the looks cost. False at the end.
+bool CaptureWriter::TakeBatch(Batch& batch) {
+  batch.records.clear();
+  batch.packets = 0;
+  std::unique_lock lock(mutex_);
+  changed_.wait_for(lock, kGatherTime, [this] { return stop_requested_ || pending_.records.size() >= kGoodPiece; });
+  std::swap(batch, pending_);
+  return batch.packets != 0 || !stop_requested_;
 }
 
-bool CaptureWriter::TakeBatch(std::vector<uint8_t>& batch) {
-  batch.clear();
-  std::unique_lock lock(mutex_);
-  changed_.wait(lock, [this] { return stop_requested_ || !pending_.empty(); });
-  changed_.wait_for(lock, kGatherTime, [this] { return stop_requested_ || pending_.size() >= kGoodPiece; });
-  if (pending_.empty()) return false;
-  batch.swap(pending_);
-  return true;
+// Behind a record that is cut nothing more can be read: a file that took no more stays as it is.
+void CaptureWriter::WriteBatch(const Batch& batch, bool& failed) {
+  const std::span<const uint8_t> records(batch.records);
+  const size_t taken = failed ? 0 : WriteInSlices(records);
+  failed = failed || taken < records.size();
+  const uint64_t whole = failed ? CountWholeRecords(records.first(taken)) : batch.packets;
+  written_.fetch_add(whole, std::memory_order_relaxed);
+  if (whole < batch.packets) Lose(batch.packets - whole, "the file cannot be written any more");
+  pending_packets_.fetch_sub(batch.packets, std::memory_order_relaxed);
+}
+
+// After each slice whoever waits for this processor may have it: on a machine of few, that may be the answer to a
+// command. A writer that has fallen behind gives nothing away.
+size_t CaptureWriter::WriteInSlices(std::span<const uint8_t> bytes) {
+  const size_t most = bytes.size() > kBehind ? bytes.size() : kSlice;
+  size_t taken = 0;
+  while (taken < bytes.size()) {
+    const auto slice = bytes.subspan(taken, std::min(most, bytes.size() - taken));
+    const size_t count = std::min(sink_(slice), slice.size());
+    taken += count;
+    if (count < slice.size()) break;
+    std::this_thread::yield();
+  }
+  return taken;
 }
 
 void CaptureWriter::Lose(uint64_t packets, const char* reason) {

@@ -63,9 +63,15 @@ class CaptureWriter {
   uint64_t lost() const { return lost_.load(std::memory_order_relaxed); }
 
  private:
+  struct Batch {
+    std::vector<uint8_t> records;
+    uint64_t packets = 0;
+  };
+
   void Run();
-  bool TakeBatch(std::vector<uint8_t>& batch);
-  void WriteBatch(std::span<const uint8_t> batch, bool& failed);
+  bool TakeBatch(Batch& batch);
+  size_t WriteInSlices(std::span<const uint8_t> bytes);
+  void WriteBatch(const Batch& batch, bool& failed);
   void Lose(uint64_t packets, const char* reason);
 
   const size_t room_;
@@ -81,7 +87,7 @@ class CaptureWriter {
 
   std::mutex mutex_;  // of what follows
   std::condition_variable changed_;
-  std::vector<uint8_t> pending_;
+  Batch pending_;
   bool stop_requested_ = false;
 
   CaptureSink sink_;  // the thread's own while it runs
