@@ -50,6 +50,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     sorter.TakePacket(record.packet);
     ++packets;
   }
+  sorter.OnBatchEnd();
   if (outcome == CaptureReader::Outcome::kEnd) Require(at == size);
   if (outcome == CaptureReader::Outcome::kForeign) Require(packets == 0);
   const auto counters = sorter.counters();

@@ -31,6 +31,7 @@ class Counter final : public PacketListener {
     // A copy of its own, so that the address sanitizer sees a read behind the packet.
     next_.TakePacket({packet.begin(), packet.end()});
   }
+  void OnBatchEnd() override { next_.OnBatchEnd(); }
   uint64_t packets = 0;
 
  private:

@@ -28,33 +28,37 @@ class BoundedQueue {
  public:
   explicit BoundedQueue(size_t capacity = kQueueCapacity) : capacity_(capacity) {}
 
-  // False when the oldest record had to be dropped to make room.
-  bool Push(Record record) {
-    const bool kept_all = PushQuietly(std::move(record));
-    not_empty_.notify_one();
-    return kept_all;
+  void Push(Record record) {
+    Stage(std::move(record));
+    WakeReaders();
   }
 
-  // The same without waking a reader for each record: one switch of threads for every packet of a flood would cost more
-  // than all the rest. Readers are woken by WakeReaders, which must follow, and before too many records wait.
-  bool PushQuietly(Record record) {
-    constexpr size_t kManyRecords = 64;
-    bool kept_all = true;
+  // Lays a record ready for Publish, which must follow soon: until then readers see nothing of it, and no counter has
+  // it. In a flood, meeting a reader at the lock for every record, and waking it, would cost more than all the rest.
+  void Stage(Record record) {
+    constexpr size_t kManyRecords = 512;
     bool many = false;
     {
-      const std::lock_guard lock(mutex_);
-      if (records_.size() >= capacity_) {
-        records_.pop_front();
-        ++dropped_;
-        kept_all = false;
-      }
-      records_.push_back(std::move(record));
-      many = records_.size() % kManyRecords == 0;
+      const std::lock_guard staging(staging_mutex_);
+      staged_.push_back(std::move(record));
+      many = staged_.size() >= kManyRecords;
     }
     if (many) WakeReaders();
-    return kept_all;
   }
-  void WakeReaders() { not_empty_.notify_all(); }
+  void Publish() {
+    const std::lock_guard staging(staging_mutex_);
+    if (staged_.empty()) return;
+    {
+      const std::lock_guard lock(mutex_);
+      for (Record& record : staged_) Append(std::move(record));
+    }
+    staged_.clear();
+  }
+  // Publishes, and tells those who wait.
+  void WakeReaders() {
+    Publish();
+    not_empty_.notify_all();
+  }
 
   std::optional<Record> Pop() {
     const std::lock_guard lock(mutex_);
@@ -78,6 +82,7 @@ class BoundedQueue {
 
   void Clear() {
     std::deque<Record> doomed;
+    Publish();
     const std::lock_guard lock(mutex_);
     doomed.swap(records_);
   }
@@ -87,12 +92,25 @@ class BoundedQueue {
     return records_.size();
   }
 
+  uint64_t pushed() const {
+    const std::lock_guard lock(mutex_);
+    return pushed_;
+  }
   uint64_t dropped() const {
     const std::lock_guard lock(mutex_);
     return dropped_;
   }
 
  private:
+  void Append(Record record) {  // locked
+    if (records_.size() >= capacity_) {
+      records_.pop_front();
+      ++dropped_;
+    }
+    records_.push_back(std::move(record));
+    ++pushed_;
+  }
+
   std::optional<Record> TakeFront() {
     if (records_.empty()) return std::nullopt;
     std::optional<Record> front(std::move(records_.front()));
@@ -104,9 +122,12 @@ class BoundedQueue {
   }
 
   const size_t capacity_;
-  mutable std::mutex mutex_;
+  std::mutex staging_mutex_;  // locked before the other
+  std::vector<Record> staged_;
+  mutable std::mutex mutex_;  // of what follows
   std::condition_variable not_empty_;
   std::deque<Record> records_;
+  uint64_t pushed_ = 0;
   uint64_t dropped_ = 0;
   bool closed_ = false;
 };

@@ -38,6 +38,11 @@ void ChunkSplitter::Feed(std::span<const uint8_t> chunk) {
   const PacketMode mode = mode_;
   if (mode != entered_mode_) EnterMode(mode);
   if (flush_pending_.exchange(false)) DropPartialNow();
+  FeedByMode(mode, chunk);
+  sink_.OnBatchEnd();
+}
+
+void ChunkSplitter::FeedByMode(PacketMode mode, std::span<const uint8_t> chunk) {
   switch (mode) {
     case PacketMode::kFramed:
       deframer_.Feed(chunk);

@@ -32,11 +32,13 @@ class ChunkSplitter {
   // With the next chunk, before it is looked at.
   void DropPartialPacket() { flush_pending_ = true; }
 
+  // The sink's OnBatchEnd follows the chunk's last packet.
   void Feed(std::span<const uint8_t> chunk);
 
   const HdlcDeframer& deframer() const { return deframer_; }
 
  private:
+  void FeedByMode(PacketMode mode, std::span<const uint8_t> chunk);
   void EnterMode(PacketMode mode);
   void DropPartialNow();
   void FeedAtReply(std::span<const uint8_t> chunk);

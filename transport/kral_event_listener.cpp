@@ -55,6 +55,8 @@ void CKralEventListener::TakePacket(Packet packet) {
     Increment(dropped_by_size_);
     return;
   }
+  // Callbacks and text logs may take long: readers have what came before this packet meanwhile.
+  if (IsWatched()) OnBatchEnd();
   CallRawPacketCallback(packet);
   const uint8_t code = packet[0];
   if (code == kLogCode) OfferLog(packet);
@@ -67,8 +69,16 @@ void CKralEventListener::TakePacket(Packet packet) {
   }
 }
 
+bool CKralEventListener::IsWatched() const {
+  const DataLogFileHandler* const log = log_;
+  return has_callbacks_ || (log != nullptr && log->Wants(kLogIo | kLogAsync));
+}
+
 void CKralEventListener::QueueResponse(Packet packet, const char* format) {
   LogPacket(kLogIo, format, packet);
+  // Whoever has the answer finds what came before it.
+  asynchronous_.Publish();
+  events_.Publish();
   responses_.Push(std::move(packet));
 }
 
@@ -84,8 +94,7 @@ void CKralEventListener::QueueAsynchronous(Packet packet) {
   }
   if (packet[0] == kEventReportCode) QueueEvents(packet, callbacks);
   if (capture_ != nullptr) capture_->Append(packet);
-  asynchronous_.PushQuietly(std::move(packet));
-  Increment(collected_);
+  asynchronous_.Stage(std::move(packet));
 }
 
 void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks) {
@@ -102,8 +111,7 @@ void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, cons
       std::memcpy(&record, event->record.bytes.data(), sizeof(record));
       callbacks.event(&record, callbacks.value);
     }
-    events_.PushQuietly(event->record);
-    Increment(event_count_);
+    events_.Stage(event->record);
   }
 }
 
@@ -116,8 +124,8 @@ std::string CKralEventListener::EventText(uint16_t id) const {
 
 TrafficCounters CKralEventListener::counters() const {
   TrafficCounters counters;
-  counters.collected = collected_.load(std::memory_order_relaxed);
-  counters.events = event_count_.load(std::memory_order_relaxed);
+  counters.collected = asynchronous_.pushed();
+  counters.events = events_.pushed();
   counters.dropped_asynchronous = asynchronous_.dropped();
   counters.dropped_events = events_.dropped();
   counters.dropped_responses = responses_.dropped();
@@ -136,11 +144,18 @@ void CKralEventListener::SetRawPacketCallback(RawPacketCallback callback, uintpt
   const std::lock_guard lock(callback_mutex_);
   callback_ = callback;
   callback_value_ = value;
+  NoteCallbacks();
 }
 
 void CKralEventListener::SetCollectionCallbacks(const CollectionCallbacks& callbacks) {
   const std::lock_guard lock(callback_mutex_);
   collection_callbacks_ = callbacks;
+  NoteCallbacks();
+}
+
+void CKralEventListener::NoteCallbacks() {
+  has_callbacks_ =
+      callback_ != nullptr || collection_callbacks_.packet != nullptr || collection_callbacks_.event != nullptr;
 }
 
 CollectionCallbacks CKralEventListener::collection_callbacks() {

@@ -83,6 +83,7 @@ class CKralEventListener : public PacketListener {
   TrafficCounters counters() const;  // as far as the sorter knows them
 
  private:
+  bool IsWatched() const;
   void CallRawPacketCallback(std::span<const uint8_t> packet);
   bool IsClaimed(std::span<const uint8_t> event_report);
   void OfferLog(std::span<const uint8_t> log_packet);
@@ -90,6 +91,7 @@ class CKralEventListener : public PacketListener {
   void QueueAsynchronous(Packet packet);
   void QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks);
   CollectionCallbacks collection_callbacks();
+  void NoteCallbacks();  // callbacks locked
   std::string EventText(uint16_t id) const;
   void LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet);
 
@@ -101,11 +103,10 @@ class CKralEventListener : public PacketListener {
   std::atomic<bool> collecting_{false};
   const NameTables* names_ = nullptr;
   CaptureWriter* capture_ = nullptr;
-  std::atomic<uint64_t> collected_{0};
-  std::atomic<uint64_t> event_count_{0};
   std::atomic<uint64_t> dropped_not_collecting_{0};
   std::atomic<uint64_t> dropped_by_size_{0};
 
+  std::atomic<bool> has_callbacks_{false};
   std::mutex callback_mutex_;
   RawPacketCallback callback_ = nullptr;
   uintptr_t callback_value_ = 0;

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <iterator>
 #include <thread>
 #include <utility>
 
@@ -34,6 +35,7 @@ bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
     stop_requested_ = false;
     pushed_ = 0;
     dispatched_ = 0;
+    backlog_ = 0;
   }
   started_.Reset();
   stopped_.Reset();
@@ -55,7 +57,12 @@ void CKralEvents::UnregisterListener(PacketListener* listener) {
 }
 
 void CKralEvents::Push(std::span<const uint8_t> packet) {
-  Packet record(packet.begin(), packet.end());
+  std::vector<Packet> one;
+  one.emplace_back(packet.begin(), packet.end());
+  PushAll(one);
+}
+
+void CKralEvents::PushAll(std::vector<Packet>& packets) {
   // The queue is locked for moments only. The receive thread may be one that shows windows for the caller's
   // transport, whose messages must not wait even so.
   while (!queue_mutex_.try_lock()) {
@@ -65,11 +72,15 @@ void CKralEvents::Push(std::span<const uint8_t> packet) {
   bool was_empty = false;
   {
     const std::lock_guard lock(queue_mutex_, std::adopt_lock);
-    if (!accepting_) return;
     was_empty = queue_.empty();
-    queue_.push_back(std::move(record));
-    ++pushed_;
+    if (accepting_) {
+      queue_.insert(queue_.end(), std::make_move_iterator(packets.begin()), std::make_move_iterator(packets.end()));
+      pushed_ += packets.size();
+      const uint64_t backlog = backlog_.fetch_add(packets.size(), std::memory_order_relaxed) + packets.size();
+      greatest_backlog_ = std::max(greatest_backlog(), backlog);
+    }
   }
+  packets.clear();
   // The dispatcher takes the whole queue at a time and waits only for an empty one.
   if (was_empty) new_packet_.notify_one();
 }
@@ -96,6 +107,7 @@ void CKralEvents::EndAccepting() {
   const std::lock_guard lock(queue_mutex_);
   accepting_ = false;
   stop_requested_ = true;
+  backlog_.fetch_sub(queue_.size(), std::memory_order_relaxed);
   queue_.clear();
   new_packet_.notify_one();
   batch_done_.notify_all();
@@ -104,11 +116,12 @@ void CKralEvents::EndAccepting() {
 void CKralEvents::Run() {
   started_.Set();
   if (OnThreadStart()) {
-    std::deque<Packet> batch;
+    std::vector<Packet> batch;
     while (TakeBatch(batch)) {
       for (Packet& packet : batch) {
         if (stop_requested_) break;
         Dispatch(std::move(packet));
+        backlog_.fetch_sub(1, std::memory_order_relaxed);
       }
       EndBatch();
     }
@@ -119,7 +132,7 @@ void CKralEvents::Run() {
   stopped_.Set();
 }
 
-bool CKralEvents::TakeBatch(std::deque<Packet>& batch) {
+bool CKralEvents::TakeBatch(std::vector<Packet>& batch) {
   std::unique_lock lock(queue_mutex_);
   if (!batch.empty()) {
     dispatched_ += batch.size();

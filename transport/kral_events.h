@@ -5,7 +5,6 @@
 #include <atomic>
 #include <condition_variable>
 #include <cstdint>
-#include <deque>
 #include <memory>
 #include <mutex>
 #include <span>
@@ -42,6 +41,12 @@ class CKralEvents {
   // From the receive thread: pumps the calling thread's messages while the queue is busy. Without a running
   // dispatcher thread the packet is dropped.
   void Push(std::span<const uint8_t> packet);
+  // The same for several at once, which are gone from the vector afterwards.
+  void PushAll(std::vector<Packet>& packets);
+
+  // What was pushed and has not been through its listeners, now and at its most.
+  uint64_t backlog() const { return backlog_.load(std::memory_order_relaxed); }
+  uint64_t greatest_backlog() const { return greatest_backlog_.load(std::memory_order_relaxed); }
 
   // Waits until every packet pushed before the call has been through its listeners; false when that takes longer.
   bool WaitUntilDispatched(uint32_t time_out_ms);
@@ -62,7 +67,7 @@ class CKralEvents {
 
   bool StartThread(std::shared_ptr<void> owner);  // listeners locked
   void Run();
-  bool TakeBatch(std::deque<Packet>& batch);
+  bool TakeBatch(std::vector<Packet>& batch);
   void Dispatch(Packet packet);
   void EndBatch();
   void EndAccepting();
@@ -70,10 +75,12 @@ class CKralEvents {
   std::mutex queue_mutex_;
   std::condition_variable new_packet_;
   std::condition_variable batch_done_;
-  std::deque<Packet> queue_;
+  std::vector<Packet> queue_;
   bool accepting_ = false;
   uint64_t pushed_ = 0;
   uint64_t dispatched_ = 0;
+  std::atomic<uint64_t> backlog_{0};
+  std::atomic<uint64_t> greatest_backlog_{0};  // changed under queue_mutex_
   std::atomic<bool> stop_requested_{false};
 
   // Recursive: a listener may register and unregister from its call.

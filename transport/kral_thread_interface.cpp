@@ -35,8 +35,18 @@ void CKralThreadInterface::Attach(CKralEvents* dispatcher, CKralEventListener* s
 }
 
 void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> packet) {
-  packets.fetch_add(1, std::memory_order_relaxed);
-  if (dispatcher != nullptr) dispatcher->Push(packet);
+  // The dispatcher begins on the first ones while a long chunk is still being split.
+  constexpr size_t kManyPackets = 64;
+  gathered_.emplace_back(packet.begin(), packet.end());
+  const bool is_answer = packet.empty() || !IsAsynchronousCode(packet.front());
+  if (is_answer || gathered_.size() >= kManyPackets) OnBatchEnd();
+}
+
+void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
+  if (gathered_.empty()) return;
+  packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
+  if (dispatcher != nullptr) dispatcher->PushAll(gathered_);
+  gathered_.clear();
 }
 
 void CKralThreadInterface::SetLogger(DataLogFileHandler* log) {

@@ -86,12 +86,17 @@ class CKralThreadInterface {
   CSerialPort& port() { return port_; }
 
  private:
-  // Takes the splitter's packets on the receive thread.
+  // Takes the splitter's packets on the receive thread. The asynchronous ones of a chunk are handed on together: for
+  // each of a flood the dispatcher would be met at its lock and woken.
   class DispatcherFeed final : public PacketListener {
    public:
     void OnPacket(std::span<const uint8_t> packet) override;
+    void OnBatchEnd() override;
     CKralEvents* dispatcher = nullptr;
     std::atomic<uint64_t> packets{0};
+
+   private:
+    std::vector<Packet> gathered_;
   };
 
   bool OpenPort(uint32_t port_number, const UserTransport& user);

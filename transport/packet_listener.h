@@ -15,7 +15,7 @@ class PacketListener {
   virtual void OnPacket(std::span<const uint8_t> packet) = 0;
   // The same for a packet that nobody else needs any more: a listener that keeps packets keeps this one uncopied.
   virtual void TakePacket(std::vector<uint8_t> packet) { OnPacket(packet); }
-  // Follows the last of some packets that were handed over by TakePacket: a listener need not wake anybody sooner.
+  // Follows the last of some packets that came together: a listener need not wake anybody sooner.
   virtual void OnBatchEnd() {}
 };
 

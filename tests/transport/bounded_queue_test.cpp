@@ -1,8 +1,10 @@
-// The bounded queue: order, the dropping of the oldest, and waiting.
+// The bounded queue: order, the dropping of the oldest, what readers see when, and waiting.
 #include "transport/bounded_queue.h"
 
 #include <gtest/gtest.h>
 
+#include <functional>
+#include <initializer_list>
 #include <thread>
 
 namespace kral {
@@ -16,9 +18,11 @@ Packet Numbered(size_t number) {
 
 TEST(BoundedQueue, KeepsTheNewestWhenFull) {
   PacketQueue queue;
-  for (size_t i = 0; i < kQueueCapacity; ++i) EXPECT_TRUE(queue.Push(Numbered(i)));
-  EXPECT_FALSE(queue.Push(Numbered(kQueueCapacity)));
+  // By both ways in turn: their order is that of the calls.
+  for (size_t i = 0; i <= kQueueCapacity; ++i) i % 3 == 0 ? queue.Push(Numbered(i)) : queue.Stage(Numbered(i));
+  queue.Publish();
   EXPECT_EQ(queue.size(), kQueueCapacity);
+  EXPECT_EQ(queue.pushed(), kQueueCapacity + 1);
   EXPECT_EQ(queue.dropped(), 1u);
   for (size_t i = 1; i <= kQueueCapacity; ++i) ASSERT_EQ(queue.Pop(), Numbered(i));
   EXPECT_EQ(queue.Pop(), std::nullopt);
@@ -35,19 +39,32 @@ TEST(BoundedQueue, RecordOfTheUnwrittenLengthIsTakenOutButAbsent) {
 TEST(BoundedQueue, ClearForgetsRecordsAndTheirSignal) {
   PacketQueue queue;
   queue.Push(Numbered(1));
+  queue.Stage(Numbered(2));
   queue.Clear();
-  EXPECT_EQ(queue.size(), 0u);
+  queue.Publish();
+  EXPECT_EQ(queue.pushed(), 2u);
   EXPECT_EQ(queue.PopWithin(milliseconds(5)), std::nullopt);
 }
 
-TEST(BoundedQueue, WaitEndsWithTheFirstRecord) {
-  PacketQueue queue;
-  std::thread pusher([&queue] {
-    std::this_thread::sleep_for(milliseconds(5));
-    queue.Push(Numbered(7));
-  });
-  EXPECT_EQ(queue.PopWithin(milliseconds(5000)), Numbered(7));
-  pusher.join();
+TEST(BoundedQueue, WaitEndsWithWhatIsPushedOrPublished) {
+  const auto push = [](PacketQueue& queue) { queue.Push(Numbered(0)); };
+  const auto stage_one = [](PacketQueue& queue) {
+    queue.Stage(Numbered(0));
+    EXPECT_EQ(queue.size(), 0u) << "not seen yet";
+    queue.WakeReaders();
+  };
+  const auto stage_many = [](PacketQueue& queue) {
+    for (size_t i = 0; i < kQueueCapacity / 2; ++i) queue.Stage(Numbered(0));
+  };
+  for (const auto& bring : std::initializer_list<std::function<void(PacketQueue&)>>{push, stage_one, stage_many}) {
+    PacketQueue queue;
+    std::thread bringer([&] {
+      std::this_thread::sleep_for(milliseconds(5));
+      bring(queue);
+    });
+    EXPECT_EQ(queue.PopWithin(milliseconds(60000)), Numbered(0));
+    bringer.join();
+  }
 }
 
 }  // namespace
