@@ -72,7 +72,9 @@ bool ReadCounters(Diag_FTM& phone, KRAL_TRAFFIC_COUNTERS* counters) {
                c.oversized,
                phone.capture().written(),
                phone.capture().lost(),
-               phone.capture().pending()};
+               phone.capture().pending(),
+               c.waiting,
+               c.most_waiting};
   return true;
 }
 

@@ -8,6 +8,8 @@ TrafficCounters Diag_FTM::counters() {
   if (server_mode()) return sorter().counters();
   TrafficCounters counters = transport().counters();
   counters.packets_received += player().played_in_all();
+  counters.waiting = dispatcher().backlog();
+  counters.most_waiting = dispatcher().greatest_backlog();
   return counters;
 }
 
@@ -18,11 +20,15 @@ bool Diag_FTM::StartCapture(const char* file_name) {
 }
 
 // What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher; while a
-// callback holds that up, the capture ends with what has been collected.
+// callback holds that up, the capture ends with what has been collected. That is no loss of the capture's, so the
+// result does not tell it: the counters do, and the text log.
 bool Diag_FTM::StopCapture() {
   constexpr uint32_t kSettleMs = 200;
-  const auto state = capture().state();
-  if (state == CaptureState::kRunning && !server_mode()) dispatcher().WaitUntilDispatched(kSettleMs);
+  const bool running = capture().state() == CaptureState::kRunning;
+  if (running && !server_mode() && !dispatcher().WaitUntilDispatched(kSettleMs)) {
+    log().WriteLine(kLogErr, "Capture file: it ends in front of %u packets that still wait for callbacks",
+                    static_cast<unsigned>(dispatcher().backlog()));
+  }
   return capture().Stop();
 }
 

@@ -154,9 +154,11 @@ typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t captured;         /**< packets written to capture files */
   uint64_t capture_lost;     /**< packets that a full or slow disk has cost a capture file */
   uint64_t capture_pending;  /**< packets taken for a capture file that are not in it yet */
+  uint64_t waiting;          /**< packets received that still wait for callbacks and queues; 0 through a phone server */
+  uint64_t most_waiting;     /**< the most that ever waited so */
 } KRAL_TRAFFIC_COUNTERS;
 
-typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 104 ? 1 : -1];
+typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 120 ? 1 : -1];
 
 /**
  * Reads the counters. An addition.

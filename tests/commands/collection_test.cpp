@@ -300,6 +300,26 @@ TEST_F(Collection, CaptureThatCouldNotEndInTimeIsWaitedForAgainAndKeepsItsFile) 
   EXPECT_EQ(KRAL_StartCapture(handle(), file.c_str()), 1);
 }
 
+TEST_F(Collection, CaptureEndsInFrontOfWhatACallbackHoldsUpAndSaysSo) {
+  static std::atomic<bool> hold;
+  hold = true;
+  const auto held_up = [](uint32_t, const uint8_t*, uintptr_t) {
+    while (hold) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  };
+  KRAL_DIAG_SetPhoneLoggingState(handle(), 1);
+  KRAL_ConfigureCollectionCallBacks(handle(), held_up, nullptr, 0);
+  ASSERT_EQ(KRAL_StartCapture(handle(), folder_.Path("capture").c_str()), 1);
+  Send(3);
+  ASSERT_TRUE(Eventually([&] { return CountersOf(handle()).waiting == 3; }));
+  EXPECT_EQ(KRAL_StopCapture(handle()), 1) << "nothing that was collected is missing";
+  EXPECT_TRUE(HasLine(16, "Capture file: it ends in front of 3 packets that still wait for callbacks"));
+  hold = false;
+  EXPECT_TRUE(Eventually([&] { return CountersOf(handle()).waiting == 0; }));
+  EXPECT_EQ(CountersOf(handle()).most_waiting, 3u);
+  EXPECT_EQ(CountersOf(handle()).collected, 3u);
+  EXPECT_EQ(CountersOf(handle()).captured, 0u);
+}
+
 TEST_F(Collection, SlowCallbackHoldsUpAnswersAndLosesNone) {
   const auto slow = [](uint32_t, const uint8_t*, uintptr_t) {
     std::this_thread::sleep_for(std::chrono::milliseconds(2));

@@ -221,7 +221,9 @@ Json JsonOf(const KRAL_TRAFFIC_COUNTERS& c) {
           {"dropped_answers", c.dropped_answers},
           {"dropped_off", c.dropped_off},
           {"bad_fcs", c.bad_fcs},
-          {"oversized", c.oversized}};
+          {"oversized", c.oversized},
+          {"waiting", c.waiting},
+          {"most_waiting", c.most_waiting}};
 }
 
 void FileStatistics(const Context& context, const LogOptions& options) {
