@@ -91,6 +91,11 @@ bool StartPlayback(Diag_FTM& phone, const char* file_name, uint32_t pace) {
   return pace < kral::kPlayPaceCount && phone.StartPlayback(file_name, static_cast<kral::PlayPace>(pace));
 }
 
+bool SetPlaybackCallback(Diag_FTM& phone, KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
+  phone.player().SetCallback(callback, value);
+  return true;
+}
+
 bool ReadPlaybackState(Diag_FTM& phone, int32_t* state, uint64_t* packets, uint64_t* skipped) {
   // The state first: one that has ended has its last figures.
   Put(state, static_cast<int32_t>(phone.player().state()));
@@ -173,6 +178,12 @@ uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle) {
 uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace) {
   LogFormatted(handle, "KRAL_StartPlayback( iPace = %u )", pace);
   return file_name == nullptr ? 0 : OnPhoneAtOnce(handle, StartPlayback, file_name, pace);
+}
+
+uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback,
+                                                 uintptr_t value) {
+  LogName(handle, "KRAL_ConfigurePlaybackCallBack");
+  return OnPhoneAtOnce(handle, SetPlaybackCallback, callback, value);
 }
 
 uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle) {

@@ -92,10 +92,29 @@ PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
       continue;
     }
     if (line.pace == PlayPace::kAsRecorded && !AwaitTurn(record.microseconds)) return PlayState::kStopped;
+    CallBack(record);
     line.dispatcher.Push(record.packet);
     ++played_;
     ++played_in_all_;
   }
+}
+
+void CapturePlayer::SetCallback(KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
+  const std::lock_guard lock(mutex_);
+  callback_ = callback;
+  callback_value_ = value;
+}
+
+void CapturePlayer::CallBack(const CaptureRecord& record) {
+  KRAL_PLAYBACK_CALLBACK callback = nullptr;
+  uintptr_t value = 0;
+  {
+    const std::lock_guard lock(mutex_);
+    callback = callback_;
+    value = callback_value_;
+  }
+  if (callback == nullptr) return;
+  callback(record.microseconds, static_cast<uint32_t>(record.packet.size()), record.packet.data(), value);
 }
 
 // Also keeps the dispatcher's own queue, which has no bound, from taking in the whole file.

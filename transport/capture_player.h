@@ -9,6 +9,7 @@
 #include <memory>
 #include <mutex>
 
+#include "kral/log.h"
 #include "transport/capture_reader.h"
 #include "transport/manual_reset_event.h"
 #include "transport/worker_thread.h"
@@ -49,6 +50,9 @@ class CapturePlayer {
              std::shared_ptr<void> owner);
   bool Stop(uint32_t time_out_ms = 1000);  // false when the thread, held up in a listener, did not end in time
 
+  // Called on the thread with every packet just before it is played. A call that is under way when it is changed ends.
+  void SetCallback(KRAL_PLAYBACK_CALLBACK callback, uintptr_t value);
+
   PlayState state() const { return state_; }
   uint64_t played() const { return played_.load(std::memory_order_relaxed); }  // of the last file
   uint64_t played_in_all() const { return played_in_all_.load(std::memory_order_relaxed); }
@@ -63,15 +67,18 @@ class CapturePlayer {
   };
 
   PlayState Run(CaptureReader& reader, const Line& line);
+  void CallBack(const CaptureRecord& record);
   bool AwaitRoom(const Line& line);
   bool AwaitListeners(const Line& line);
   bool AwaitTurn(uint64_t microseconds);
   bool Sleep(std::chrono::microseconds time);  // false when it was told to stop
 
   std::mutex control_mutex_;  // one start or stop at a time
-  std::mutex mutex_;
+  std::mutex mutex_;  // of what follows
   std::condition_variable changed_;
   bool stop_requested_ = false;
+  KRAL_PLAYBACK_CALLBACK callback_ = nullptr;
+  uintptr_t callback_value_ = 0;
 
   std::atomic<PlayState> state_{PlayState::kIdle};
   std::atomic<uint64_t> played_{0};

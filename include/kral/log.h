@@ -398,8 +398,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 /**
  * Plays a capture file: its packets come as if the handset had sent them, on a thread of the library, through counters,
  * callbacks and queues. Switches collection on. The playback is done once its last packet has been through all of them.
- * When packets came, the file tells, and a playback does not. A connection to port 65534, which has no port behind it,
- * is enough.
+ * When they came the first time, the callback for playbacks tells. A connection to port 65534, which has no port behind
+ * it, is enough.
  *
  * @param handle     from a connect function
  * @param file_name  written by KRAL_StartCapture
@@ -408,6 +408,30 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
  *         server
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace);
+
+/**
+ * Sees a packet of a file just before it is played, with the time at which it was collected. It comes on the thread of
+ * the playback, which waits while it runs, and must not call functions that send requests. Packets that are left out are
+ * not seen.
+ *
+ * @param microseconds  since 1970-01-01 UTC, by the clock of the PC that wrote the file
+ * @param length        bytes of the packet
+ * @param bytes         the packet; valid during the call only
+ * @param value         as given to KRAL_ConfigurePlaybackCallBack
+ */
+typedef void(KRAL_CALL* KRAL_PLAYBACK_CALLBACK)(uint64_t microseconds, uint32_t length, const uint8_t* bytes,
+                                                uintptr_t value);
+
+/**
+ * Sets the function that sees the packets of files that are played.
+ *
+ * @param handle    from a connect function
+ * @param callback  null: none. A call to the former one that is under way still ends
+ * @param value     handed to the callback
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback,
+                                                          uintptr_t value);
 
 /** Ends a playback before its time. @return 1; 0 when a callback did not come back within 1,000 ms */
 KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);

@@ -197,6 +197,7 @@ TEST_F(Collection, UnknownHandlesAndMissingArgumentsGiveZero) {
   EXPECT_EQ(KRAL_StartCapture(unknown, "x"), 0);
   EXPECT_EQ(KRAL_StopCapture(unknown), 0);
   EXPECT_EQ(KRAL_StartPlayback(unknown, "x", 0), 0);
+  EXPECT_EQ(KRAL_ConfigurePlaybackCallBack(unknown, nullptr, 0), 0);
   EXPECT_EQ(KRAL_StopPlayback(unknown), 0);
   EXPECT_EQ(KRAL_GetPlaybackState(unknown, &state, nullptr, nullptr), 0);
   EXPECT_EQ(count, 1u);

@@ -292,12 +292,16 @@ class Traffic(ToolTest):
             kinds = {packet["what"] for packet in played[:-1]}
             self.assertLessEqual(kinds, {"log 0x1001", "log 0x4001", "log 0x4002", "log 0x4003", "message 5"})
             self.assertTrue(all(len(packet["bytes"].split()) > 2 for packet in played[:-1]))
+            self.assertTrue(all(abs(packet["microseconds"] / 1e6 - time.time()) < 600 for packet in played[:-1]))
+            today = time.strftime("%Y-%m-%dT", time.gmtime(played[0]["microseconds"] / 1e6))
+            self.assertRegex(self.expect(0, "log", "play", file).out, rf"^{today}\d\d:\d\d:\d\d\.\d{{6}}Z  log 0x")
             rows = self.expect_json(0, "log", "stats", file, "--names", names)["rows"]
             self.assertEqual(sum(row["packets"] for row in rows), done["packets"])
             self.assertIn("Paging", [row.get("name") for row in rows])
             self.assertIn("Paging", self.expect(0, "log", "stats", file, "--names", names).out)
             live = self.expect_json(0, "-p", "7", "log", "stats", "--count", "100", ports=ports)
             self.assertGreaterEqual(live["counters"]["collected"], 100)
+            self.assertGreaterEqual(live["counters"]["most_waiting"], 1)
             self.assertGreater(live["rows"][0]["per_second"], 0)
             self.expect(0, "-p", "7", "log", "off", "--all", "--category", "5", ports=ports)
             rows = self.expect_json(0, "-p", "7", "log", "list", ports=ports)["equipment_ids"]

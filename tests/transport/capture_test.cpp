@@ -257,12 +257,21 @@ class Playback : public testing::Test {
 };
 
 TEST_F(Playback, EndsAsTheFileDoes) {
-  const Packet file = Capture({{16, 1}, {75, 1}, {31, 1}, {146, 9}});
+  Packet file = Capture({{16, 1}, {75, 1}, {31, 1}, {146, 9}});
+  StoreLe(std::span<uint8_t>(file), 16 + 2 * 14, uint64_t{0x123456789ABC});
+  std::vector<std::pair<uint64_t, Packet>> seen;
+  const auto see = [](uint64_t microseconds, uint32_t length, const uint8_t* bytes, uintptr_t value) {
+    reinterpret_cast<decltype(seen)*>(value)->emplace_back(microseconds, Packet(bytes, bytes + length));
+  };
+  player_.SetCallback(see, reinterpret_cast<uintptr_t>(&seen));
   EXPECT_EQ(player_.state(), PlayState::kIdle);
   ASSERT_TRUE(Play(file, PlayPace::kForLogReader));
   EXPECT_TRUE(Ends(PlayState::kDone));
   EXPECT_EQ(player_.played(), 3u);
   EXPECT_EQ(player_.skipped(), 1u) << "no answer gets in";
+  ASSERT_EQ(seen.size(), 3u);
+  EXPECT_EQ(seen[1], std::pair(uint64_t{0x123456789ABC}, Packet{31, 1})) << "when it was collected";
+  player_.SetCallback(nullptr, 0);
   EXPECT_EQ(bundle_->asynchronous.size(), 3u);
   EXPECT_EQ(bundle_->responses.size(), 0u);
   ASSERT_TRUE(Play(Packet(file.begin(), file.end() - 1), PlayPace::kAtOnce));

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "tools/kral/event_report.h"
+#include "tools/kral/playback.h"
 #include "tools/kral/traffic.h"
 #include "tools/kral/verbs.h"
 
@@ -67,11 +68,10 @@ void TailFile(const Context& context, const EventOptions& options) {
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_EVENT_TEXTS, options.names);
   std::uint64_t events = 0;
-  const bool whole =
-      PlayFile(handle.get(), options.file, KRAL_PLAY_FOR_LOG_READER, [&](std::span<const std::uint8_t> packet) {
-        EventReport report(packet);
-        for (; const auto event = report.Next(); ++events) Print(context, handle.get(), *event);
-      });
+  const bool whole = PlayFile(handle.get(), options.file, Pace::kAtOnce, [&](const PlayedPacket& packet) {
+    EventReport report(packet.bytes);
+    for (; const auto event = report.Next(); ++events) Print(context, handle.get(), *event);
+  });
   context.out.Result({{"file", options.file}, {"events", events}, {"cut", !whole}}, "");
 }
 

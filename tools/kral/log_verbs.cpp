@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "tools/kral/interrupt.h"
+#include "tools/kral/playback.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/traffic.h"
 #include "tools/kral/verbs.h"
@@ -200,12 +201,16 @@ void Play(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   std::uint64_t packets = 0;
   const bool whole =
-      PlayFile(handle.get(), options.file, options.as_recorded ? KRAL_PLAY_AS_RECORDED : KRAL_PLAY_FOR_LOG_READER,
-               [&](std::span<const std::uint8_t> packet) {
+      PlayFile(handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
+               [&](const PlayedPacket& packet) {
                  ++packets;
-                 const auto what = DescribePacket(packet);
-                 context.out.Stream({{"event", "packet"}, {"what", what}, {"bytes", HexText(packet)}},
-                                    fmt::format("{}  {} bytes\n{}", what, packet.size(), HexDump(packet)));
+                 const auto what = DescribePacket(packet.bytes);
+                 context.out.Stream({{"event", "packet"},
+                                     {"microseconds", packet.microseconds},
+                                     {"what", what},
+                                     {"bytes", HexText(packet.bytes)}},
+                                    fmt::format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what,
+                                                packet.bytes.size(), HexDump(packet.bytes)));
                });
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
@@ -231,8 +236,8 @@ void FileStatistics(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
-  const bool whole = PlayFile(handle.get(), options.file, KRAL_PLAY_FOR_LOG_READER,
-                              [&](std::span<const std::uint8_t> packet) { table.Add(packet); });
+  const bool whole = PlayFile(handle.get(), options.file, Pace::kAtOnce,
+                              [&](const PlayedPacket& packet) { table.Add(packet.bytes); });
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"cut", !whole}, {"rows", table.Rows(handle.get(), 0)}},
                      table.Text(handle.get(), 0));

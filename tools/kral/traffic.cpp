@@ -21,7 +21,6 @@ constexpr std::uint8_t kMessage = 121;
 constexpr std::size_t kLogCodeOffset = 6;
 constexpr std::size_t kCategoryOffset = 14;
 
-constexpr std::uint16_t kNullPort = 65534;
 constexpr std::uint32_t kWaitMs = 50;
 constexpr std::uint32_t kLookMs = 200;
 
@@ -164,41 +163,6 @@ void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& c
     looked = SystemClock().TickMs();
     CheckPort(session, "the collection of packets");
     look();
-  }
-}
-
-OfflineHandle::OfflineHandle() : handle_(0) {
-  KRAL_SetDefaultReceiveMode(1);
-  handle_ = KRAL_ConnectServer(kNullPort);
-  if (handle_ == 0) {
-    throw ToolError(ExitCode::kInternal, "no handle for the playback could be made",
-                    "close other programs that use the library, then run the command again");
-  }
-}
-
-OfflineHandle::~OfflineHandle() {
-  KRAL_DisconnectServer(handle_);
-}
-
-bool PlayFile(KRAL_HANDLE handle, const std::string& file, std::uint32_t pace, const PacketSink& sink) {
-  if (KRAL_StartPlayback(handle, file.c_str(), pace) == 0) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read", file), "check the name and the permissions");
-  }
-  std::array<std::uint8_t, KRAL_LONGEST_PACKET> buffer{};
-  for (;;) {
-    // Looked at before the queue: what a playback that has ended left there is taken out still.
-    std::int32_t state = KRAL_PLAYBACK_RUNNING;
-    KRAL_GetPlaybackState(handle, &state, nullptr, nullptr);
-    const auto packet = NextPacket(handle, buffer, state == KRAL_PLAYBACK_RUNNING ? kWaitMs : 0);
-    ThrowIfInterrupted();
-    if (!packet.empty()) {
-      sink(packet);
-    } else if (state == KRAL_PLAYBACK_FOREIGN) {
-      throw ToolError(ExitCode::kBadFile, fmt::format("{} is not a capture file", file),
-                      "kral log capture writes such files");
-    } else if (state != KRAL_PLAYBACK_RUNNING) {
-      return state == KRAL_PLAYBACK_DONE;
-    }
   }
 }
 

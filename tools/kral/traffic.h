@@ -75,22 +75,6 @@ void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& c
                     const std::function<void()>& look);
 void CheckPort(Session& session, const char* what);
 
-// A handle with nothing behind it, for the playback of files.
-class OfflineHandle {
- public:
-  OfflineHandle();
-  ~OfflineHandle();
-  OfflineHandle(const OfflineHandle&) = delete;
-  OfflineHandle& operator=(const OfflineHandle&) = delete;
-  KRAL_HANDLE get() const { return handle_; }
-
- private:
-  KRAL_HANDLE handle_;
-};
-
-// The whole file, packet by packet. ToolError kBadFile; one that is cut gives what it has, and false.
-bool PlayFile(KRAL_HANDLE handle, const std::string& file, std::uint32_t pace, const PacketSink& sink);
-
 void LoadTable(KRAL_HANDLE handle, std::uint32_t table, const std::string& file);
 
 }  // namespace kral::tool
