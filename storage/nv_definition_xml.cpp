@@ -16,8 +16,10 @@
 namespace kral::nv {
 namespace {
 
-// Data types within data types multiply: what they come to in one file is limited.
+// Data types within data types multiply, and so do the names of their members: what they come to in one file is limited.
 constexpr size_t kMostMembers = size_t{1} << 20;
+constexpr size_t kLongestMemberName = 255;
+constexpr size_t kMostNameBytes = size_t{32} << 20;
 constexpr size_t kLongestPath = 1024;
 constexpr size_t kMostForms = 256;
 
@@ -140,7 +142,10 @@ class Reader {
   void Append(std::vector<NvMember>& members, size_t& size, NvMember member) {
     size += member.size();
     if (size > kLongestValue) throw BadXml("a data type of more than " + std::to_string(kLongestValue) + " bytes");
-    if (++member_count_ > kMostMembers) throw BadXml("too many members");
+    if (member.name.size() > kLongestMemberName)
+      throw BadXml("a member's name of more than " + std::to_string(kLongestMemberName) + " bytes");
+    name_bytes_ += member.name.size();
+    if (++member_count_ > kMostMembers || name_bytes_ > kMostNameBytes) throw BadXml("too many members");
     members.push_back(std::move(member));
   }
 
@@ -193,6 +198,7 @@ class Reader {
   NvDefinitionFile& file_;
   std::unordered_map<std::string, NvTypePtr> own_types_;
   size_t member_count_ = 0;
+  size_t name_bytes_ = 0;
 };
 
 std::string Attribute(std::string_view name, std::string_view value) {

@@ -200,6 +200,8 @@ TEST_F(NvDefinition, ContradictionsAreRefusedAndChangeNothing) {
       "<DataType name='A' variantType='1'><Member typeid='word8'/></DataType>"
       "<DataType name='B'><Member typeid='A'/></DataType>",
       tower,
+      "<DataType name='A'><Member name='x' typeid='word8'/></DataType>"
+      "<DataType name='B'><Member name='" + std::string(254, 'n') + "' typeid='A'/></DataType>",
       "<NvSomething/>",
   };
   for (const std::string& bad : kBad) {
