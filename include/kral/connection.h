@@ -142,7 +142,8 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_LogicalPort(uint32_t logical_p
  * releases one of them.
  *
  * @param port     as for KRAL_ConnectServer
- * @param wait_ms  no further attempt begins after this time; 0: exactly one attempt
+ * @param wait_ms  no further attempt begins after this time; 0: exactly one attempt. The end is reckoned in the 32-bit
+ *                 tick count of the machine, so a time that reaches beyond its wrap, as 0xFFFFFFFF does, ends at once
  * @return the handle; 0 when no handset answered in time
  */
 KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_t wait_ms);
