@@ -4,34 +4,36 @@
 
 #include <cstdint>
 
+#include "kral/nv_tool.h"
+
 namespace kral::nv {
 
 enum class NvError : uint32_t {
-  kNone = 0,
-  kNoXmlParser = 1,
-  kCannotLoadSource = 2,
-  kCannotSaveSource = 3,
-  kCannotLoadDefinition = 4,
-  kBadSource = 5,
-  kBadDefinition = 6,
-  kCannotOpenPkv = 7,
-  kIndexOutOfBound = 8,
-  kNotDefined = 9,
-  kNoValue = 10,
-  kCannotSetValue = 11,
-  kCannotGetValue = 12,
-  kRedefined = 13,
-  kCannotOpenSource = 14,
-  kCannotOpenQdf = 15,
-  kNoConnection = 16,
-  kCannotOpenReport = 17,
-  kNoPkvStorage = 18,
-  kCannotOpenFilter = 19,
-  kBadPkvItem = 20,
-  kBadSourceItem = 21,
-  kCannotReadFileItem = 22,
-  kCannotWriteFileItem = 23,
-  kUnknown = 0xFFFFFFFF,  // no text of its own
+  kNone = KRAL_NV_ERROR_NONE,
+  kNoXmlParser = KRAL_NV_ERROR_NO_XML_PARSER,
+  kCannotLoadSource = KRAL_NV_ERROR_CANNOT_LOAD_SOURCE,
+  kCannotSaveSource = KRAL_NV_ERROR_CANNOT_SAVE_SOURCE,
+  kCannotLoadDefinition = KRAL_NV_ERROR_CANNOT_LOAD_DEFINITION,
+  kBadSource = KRAL_NV_ERROR_BAD_SOURCE,
+  kBadDefinition = KRAL_NV_ERROR_BAD_DEFINITION,
+  kCannotOpenPkv = KRAL_NV_ERROR_CANNOT_OPEN_PKV,
+  kIndexOutOfBound = KRAL_NV_ERROR_INDEX_OUT_OF_BOUND,
+  kNotDefined = KRAL_NV_ERROR_NOT_DEFINED,
+  kNoValue = KRAL_NV_ERROR_NO_VALUE,
+  kCannotSetValue = KRAL_NV_ERROR_CANNOT_SET_VALUE,
+  kCannotGetValue = KRAL_NV_ERROR_CANNOT_GET_VALUE,
+  kRedefined = KRAL_NV_ERROR_REDEFINED,
+  kCannotOpenSource = KRAL_NV_ERROR_CANNOT_OPEN_SOURCE,
+  kCannotOpenQdf = KRAL_NV_ERROR_CANNOT_OPEN_QDF,
+  kNoConnection = KRAL_NV_ERROR_NO_CONNECTION,
+  kCannotOpenReport = KRAL_NV_ERROR_CANNOT_OPEN_REPORT,
+  kNoPkvStorage = KRAL_NV_ERROR_NO_PKV_STORAGE,
+  kCannotOpenFilter = KRAL_NV_ERROR_CANNOT_OPEN_FILTER,
+  kBadPkvItem = KRAL_NV_ERROR_BAD_PKV_ITEM,
+  kBadSourceItem = KRAL_NV_ERROR_BAD_SOURCE_ITEM,
+  kCannotReadFileItem = KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM,
+  kCannotWriteFileItem = KRAL_NV_ERROR_CANNOT_WRITE_FILE_ITEM,
+  kUnknown = KRAL_NV_ERROR_UNKNOWN,  // no text of its own
 };
 
 const char* TextOf(uint32_t code);

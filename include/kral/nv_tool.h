@@ -23,7 +23,7 @@
  * - Functions that move a set go on behind an item that fails, and say in the text log which it was. The files that
  *   they write are replaced in one step. What moves is limited by the filters, if any are loaded.
  * - A request to the handset may wait for time-out 0 (4,000 ms). One that gets no answer is tried 3 times and then
- * counts as refused when the handset still answers others; when it does not, the function ends with 16.
+ *   counts as refused when the handset still answers others; when it does not, the function ends with 16.
  */
 #ifndef KRAL_NV_TOOL_H
 #define KRAL_NV_TOOL_H
@@ -33,6 +33,33 @@
 #ifdef __cplusplus
 extern "C" {
 #endif
+
+/** Error codes, in the order of their texts. */
+#define KRAL_NV_ERROR_NONE 0u                    /**< "ERROR_FREE" */
+#define KRAL_NV_ERROR_NO_XML_PARSER 1u           /**< the machine's XML parser cannot be had */
+#define KRAL_NV_ERROR_CANNOT_LOAD_SOURCE 2u      /**< no source file there, or no XML */
+#define KRAL_NV_ERROR_CANNOT_SAVE_SOURCE 3u      /**< the source file could not be written whole */
+#define KRAL_NV_ERROR_CANNOT_LOAD_DEFINITION 4u  /**< no definition file there, or no XML */
+#define KRAL_NV_ERROR_BAD_SOURCE 5u              /**< the source file is not of the form of docs/nv.md */
+#define KRAL_NV_ERROR_BAD_DEFINITION 6u          /**< the definition file is not, or contradicts itself */
+#define KRAL_NV_ERROR_CANNOT_OPEN_PKV 7u         /**< the PKV file cannot be read, or cannot be written */
+#define KRAL_NV_ERROR_INDEX_OUT_OF_BOUND 8u      /**< no definition, or no element, has that index */
+#define KRAL_NV_ERROR_NOT_DEFINED 9u             /**< no definition has that id or path */
+#define KRAL_NV_ERROR_NO_VALUE 10u               /**< the item has no value */
+#define KRAL_NV_ERROR_CANNOT_SET_VALUE 11u       /**< the value does not suit the item, or the handset refused it */
+#define KRAL_NV_ERROR_CANNOT_GET_VALUE 12u       /**< the handset gave no value, or the buffer is too small */
+#define KRAL_NV_ERROR_REDEFINED 13u              /**< a warning: a definition took the place of an older one */
+#define KRAL_NV_ERROR_CANNOT_OPEN_SOURCE 14u     /**< the source file cannot be opened for writing */
+#define KRAL_NV_ERROR_CANNOT_OPEN_QDF 15u        /**< the list cannot be written */
+#define KRAL_NV_ERROR_NO_CONNECTION 16u          /**< the handset does not answer; also an unknown handle */
+#define KRAL_NV_ERROR_CANNOT_OPEN_REPORT 17u     /**< the page of the comparison cannot be written */
+#define KRAL_NV_ERROR_NO_PKV_STORAGE 18u         /**< the file is no PKV file */
+#define KRAL_NV_ERROR_CANNOT_OPEN_FILTER 19u     /**< no filter file there, or not of its form */
+#define KRAL_NV_ERROR_BAD_PKV_ITEM 20u           /**< an item of the PKV file is damaged or has no place */
+#define KRAL_NV_ERROR_BAD_SOURCE_ITEM 21u        /**< an item of the source file is damaged or has no place */
+#define KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM 22u  /**< the handset did not give a file */
+#define KRAL_NV_ERROR_CANNOT_WRITE_FILE_ITEM 23u /**< the handset did not take a file */
+#define KRAL_NV_ERROR_UNKNOWN 0xFFFFFFFFu        /**< the library itself failed: out of memory, for instance */
 
 /** Operations that the callback reports. */
 #define KRAL_NV_OPERATION_READ_MOBILE 1u
@@ -243,8 +270,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle,
 KRAL_API uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                              const char* html_file);
 
-/** Writes all values as a list: item, name, subscription, array index, value; tabs between. 15: it cannot be written.
- */
+/** Writes all values as a list: item, name, subscription, array index, value; tabs between. 15: it cannot be made. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file);
 
 /* --- Subscriptions ------------------------------------------------------------------------------------------------ */

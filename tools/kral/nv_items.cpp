@@ -14,11 +14,6 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint32_t kRedefined = 13;
-constexpr std::uint32_t kNoValue = 10;
-constexpr std::uint32_t kNotRead = 12;
-constexpr std::uint32_t kFileNotRead = 22;
-
 std::optional<std::uint16_t> ParseId(std::string_view text) {
   std::uint16_t id = 0;
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), id);
@@ -122,24 +117,22 @@ std::vector<NamedNumbers> Named(const NvItem& item, const std::vector<std::strin
 
 ExitCode ExitOf(std::uint32_t code) {
   switch (code) {
-    case 8:
-    case 9:
-    case 11:
+    case KRAL_NV_ERROR_INDEX_OUT_OF_BOUND:
+    case KRAL_NV_ERROR_NOT_DEFINED:
+    case KRAL_NV_ERROR_CANNOT_SET_VALUE:
       return ExitCode::kUsage;
-    case kNoValue:
-    case kNotRead:
-    case kFileNotRead:
-    case 23:
+    case KRAL_NV_ERROR_NO_VALUE:
+    case KRAL_NV_ERROR_CANNOT_GET_VALUE:
+    case KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM:
+    case KRAL_NV_ERROR_CANNOT_WRITE_FILE_ITEM:
       return ExitCode::kRefused;
-    case 1:
-    case 0xFFFFFFFF:
+    case KRAL_NV_ERROR_NO_XML_PARSER:
+    case KRAL_NV_ERROR_UNKNOWN:
       return ExitCode::kInternal;
     default:
       return ExitCode::kBadFile;
   }
 }
-
-constexpr std::uint32_t kNoConnection = 16;
 
 }  // namespace
 
@@ -172,7 +165,7 @@ void NvItems::LoadFile(const std::string& file, bool dictionary) {
   session_.Begin();
   const std::uint32_t code = dictionary ? KRAL_NV_LoadNVDataTypeDictinary(session_.handle(), file.c_str())
                                         : KRAL_NV_LoadNVDefinitionFile(session_.handle(), file.c_str());
-  Check(code, file, kRedefined);
+  Check(code, file, KRAL_NV_ERROR_REDEFINED);
 }
 
 void NvItems::ListItems() {
@@ -214,7 +207,7 @@ NvItem NvItems::Find(const std::string& which) const {
 
 void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t allowed) const {
   if (code == 0 || code == allowed) return;
-  if (code == kNoConnection) throw session_.Explain(what);
+  if (code == KRAL_NV_ERROR_NO_CONNECTION) throw session_.Explain(what);
   std::array<char, 128> text{};
   KRAL_NV_GetErrorText(0, code, text.data(), static_cast<std::uint32_t>(text.size()));
   const auto lines = ErrorLines();
@@ -228,12 +221,12 @@ bool NvItems::Read(const NvItem& item, std::uint16_t& status) {
   status = 0;
   if (!item.path.empty()) {
     const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByEfsFilename(session_.handle(), item.path.c_str());
-    Check(code, item.path, kFileNotRead);
+    Check(code, item.path, KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM);
     return code == 0;
   }
   if (item.defined) {
     const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByNVID(session_.handle(), *item.id, &status);
-    Check(code, fmt::format("NV item {}", *item.id), kNotRead);
+    Check(code, fmt::format("NV item {}", *item.id), KRAL_NV_ERROR_CANNOT_GET_VALUE);
     return code == 0;
   }
   bytes_.assign(KRAL_NV_DATA_SIZE, 0);
