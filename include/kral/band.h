@@ -57,7 +57,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_Band_Helper_GetBandCount(void);
  * @param[out] band   the band id
  * @return 1; 0 for an index past the list or a null output
  */
-KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBand(uint32_t index, uint16_t *band);
+KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBand(uint32_t index, uint16_t* band);
 
 /**
  * The name of a band, such as "LTE band 4".
@@ -67,7 +67,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBand(uint32_t index, uint16_t *ba
  * @param      size  bytes in `name`; 40 hold every name
  * @return 1; 0 for a band without channels, a null output or size 0
  */
-KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBandName(uint16_t band, char *name, uint32_t size);
+KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBandName(uint16_t band, char* name, uint32_t size);
 
 /**
  * One inclusive range of a band's channel numbers.
@@ -80,7 +80,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBandName(uint16_t band, char *nam
  * @return 1; 0 when there is no such range (or band, or direction) and for a null output
  */
 KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBandRange(uint16_t band, uint8_t direction, uint32_t index,
-                                                         int32_t *first, int32_t *last);
+                                                         int32_t* first, int32_t* last);
 
 #ifdef __cplusplus
 }

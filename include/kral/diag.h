@@ -42,12 +42,11 @@ extern "C" {
  * @return 1 when the handset answered. An answer of fewer than 54 bytes also gives 1: the outputs then show the last
  *         full answer of this connection's handset object, or zeros when there was none.
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char *compile_date, char *compile_time,
-                                             char *release_date, char *release_time, char *version_directory,
-                                             uint8_t *station_class_mark, uint8_t *air_interface_revision,
-                                             uint8_t *mobile_model, uint16_t *firmware_revision,
-                                             uint8_t *slot_cycle_index, uint8_t *vocoder_major,
-                                             uint8_t *vocoder_minor);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char* compile_date, char* compile_time,
+                                             char* release_date, char* release_time, char* version_directory,
+                                             uint8_t* station_class_mark, uint8_t* air_interface_revision,
+                                             uint8_t* mobile_model, uint16_t* firmware_revision,
+                                             uint8_t* slot_cycle_index, uint8_t* vocoder_major, uint8_t* vocoder_minor);
 
 /**
  * Reads the extended build identity.
@@ -62,8 +61,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char *compile_d
  * @param[out] model              4,096 bytes, NUL-terminated; empty when the handset sent no second text
  * @return 1 on success; 0 also when the answer ends before the mobile model. Texts that were not sent are empty
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t *hardware_version,
-                                                    uint32_t *mobile_model, char *software_revision, char *model);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t* hardware_version,
+                                                    uint32_t* mobile_model, char* software_revision, char* model);
 
 /**
  * Reads the electronic serial number (NV item 0).
@@ -75,7 +74,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t
  * @param[out] serial  the serial number
  * @return 1 on success; 0 also when the NV status of the answer is not 0
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_READ_ESN_F(KRAL_HANDLE handle, uint32_t *serial);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_READ_ESN_F(KRAL_HANDLE handle, uint32_t* serial);
 
 /* --- Operating mode ----------------------------------------------------------------------------------------------- */
 
@@ -109,16 +108,15 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_CONTROL_F(KRAL_HANDLE handle, uint16_t mode
  * @param[out] data     room for `count` elements
  * @return 1 on success; 0 also when the answer holds fewer
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                   uint8_t *data);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_F(KRAL_HANDLE handle, uint32_t address, uint16_t count, uint8_t* data);
 
 /** The same for 16-bit words. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_WORD_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                        uint16_t *data);
+                                                        uint16_t* data);
 
 /** The same for 32-bit words. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_DWORD_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                         uint32_t *data);
+                                                         uint32_t* data);
 
 /**
  * Writes `count` bytes into the handset's memory.
@@ -131,15 +129,15 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_DWORD_F(KRAL_HANDLE handle, uin
  * @return 1 when the handset answered
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_POKE_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                   const uint8_t *data, uint8_t *status);
+                                                   const uint8_t* data, uint8_t* status);
 
 /** The same for 16-bit words. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_POKE_WORD_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                        const uint16_t *data, uint8_t *status);
+                                                        const uint16_t* data, uint8_t* status);
 
 /** The same for 32-bit words. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_POKE_DWORD_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
-                                                         const uint32_t *data, uint8_t *status);
+                                                         const uint32_t* data, uint8_t* status);
 
 /* --- Keys, switches, service code --------------------------------------------------------------------------------- */
 
@@ -158,7 +156,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_HS_KEY_F(KRAL_HANDLE handle, uint8_t hold, 
  * @param      handle    from a connect function
  * @param[out] switches  one bit per switch, bit 0 first
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GET_DIPSW_F(KRAL_HANDLE handle, uint16_t *switches);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GET_DIPSW_F(KRAL_HANDLE handle, uint16_t* switches);
 
 /** Writes the switch word of the handset, one bit per switch. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SET_DIPSW_F(KRAL_HANDLE handle, uint16_t switches);
@@ -171,7 +169,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SET_DIPSW_F(KRAL_HANDLE handle, uint16_t sw
  * @param[out] result  the last byte of the answer: 1 when the handset accepted the code
  * @return 1 when the handset answered, whatever it thought of the code
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char *code, uint8_t *result);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char* code, uint8_t* result);
 
 /* --- Error log and status ----------------------------------------------------------------------------------------- */
 
@@ -183,16 +181,16 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char *code,
  *                         has at most 6,144 bytes.
  * @param[out]    records  the answer as it came, its command code (42) first
  */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_READ_F(KRAL_HANDLE handle, uint16_t *size, uint8_t *records);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_READ_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* records);
 
 /** Clears one record of the error log, by its index. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_CLEAR_F(KRAL_HANDLE handle, uint8_t record);
 
 /** Reads the status record; size and buffer as in KRAL_DIAG_ERR_READ_F, with a first byte of 75. */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_STATUS_F(KRAL_HANDLE handle, uint16_t *size, uint8_t *record);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_STATUS_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* record);
 
 /** Reads the IS-2000 status record; size and buffer as in KRAL_DIAG_ERR_READ_F, with a first byte of 112. */
-KRAL_API uint8_t KRAL_CALL KRAL_DIAG_IS2000_STATUS_F(KRAL_HANDLE handle, uint16_t *size, uint8_t *record);
+KRAL_API uint8_t KRAL_CALL KRAL_DIAG_IS2000_STATUS_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* record);
 
 /* --- Whole-handset requests --------------------------------------------------------------------------------------- */
 

@@ -40,7 +40,7 @@ extern "C" {
  * @param total         bytes in all
  * @param value         as given to KRAL_ConfigureDownloadCallBack
  */
-typedef void(KRAL_CALL *KRAL_DOWNLOAD_PROGRESS_CALLBACK)(KRAL_HANDLE handle, uint32_t acknowledged, uint32_t total,
+typedef void(KRAL_CALL* KRAL_DOWNLOAD_PROGRESS_CALLBACK)(KRAL_HANDLE handle, uint32_t acknowledged, uint32_t total,
                                                          uintptr_t value);
 
 /**
@@ -67,11 +67,11 @@ KRAL_API uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle);
 /** @name KOVA: the loader stage */
 /**@{*/
 
-#define KRAL_KOVA_LOADED 0u            /**< loaded and started */
-#define KRAL_KOVA_FILE_NOT_OPENED 1u   /**< the file cannot be opened */
-#define KRAL_KOVA_FILE_NOT_DECODED 2u  /**< no Intel HEX file, or larger than 500 KiB */
-#define KRAL_KOVA_GO_FAILED 4u         /**< loaded, but the handset did not acknowledge the start */
-#define KRAL_KOVA_WRITE_FAILED 5u      /**< a piece was not acknowledged, or lies outside the image */
+#define KRAL_KOVA_LOADED 0u           /**< loaded and started */
+#define KRAL_KOVA_FILE_NOT_OPENED 1u  /**< the file cannot be opened */
+#define KRAL_KOVA_FILE_NOT_DECODED 2u /**< no Intel HEX file, or larger than 500 KiB */
+#define KRAL_KOVA_GO_FAILED 4u        /**< loaded, but the handset did not acknowledge the start */
+#define KRAL_KOVA_WRITE_FAILED 5u     /**< a piece was not acknowledged, or lies outside the image */
 
 /**
  * Loads a flash programmer from an Intel HEX file into the handset's memory and starts it at its start address, which
@@ -85,8 +85,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle);
  *
  * Wait: time-out 0 for each piece, 1,000 ms for the start. Progress counts the bytes of the programmer.
  */
-KRAL_API uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char *programmer_file,
-                                                         uint32_t maximum_packet, uint32_t *result);
+KRAL_API uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file,
+                                                         uint32_t maximum_packet, uint32_t* result);
 
 /** Asks the loader for a sign of life. Wait: time-out 0. */
 KRAL_API uint8_t KRAL_CALL KRAL_KOVA_NOP(KRAL_HANDLE handle);
@@ -95,7 +95,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_KOVA_NOP(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_KOVA_RESET(KRAL_HANDLE handle);
 
 /** Reads the software version of the loader. Wait: time-out 0. */
-KRAL_API uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t *version);
+KRAL_API uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t* version);
 
 /**@}*/
 /** @name Streaming download: images into flash */
@@ -115,8 +115,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t *ver
  * Wait: three times at most 1,000 ms, then up to 5 hellos of at most 2,000 ms, 500 ms apart
  * (KRAL_STREAM_ConfigureHello).
  */
-KRAL_API uint8_t KRAL_CALL KRAL_STREAM_HELLO(KRAL_HANDLE handle, uint32_t variant, uint32_t *block_size,
-                                             uint16_t *window);
+KRAL_API uint8_t KRAL_CALL KRAL_STREAM_HELLO(KRAL_HANDLE handle, uint32_t variant, uint32_t* block_size,
+                                             uint16_t* window);
 
 /**
  * Sets how often KRAL_STREAM_HELLO says hello and how long it pauses in between.
@@ -148,8 +148,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t
  *
  * Wait: time-out 0.
  */
-KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const char *table_file,
-                                                       uint8_t override_table, uint8_t *status);
+KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const char* table_file,
+                                                       uint8_t override_table, uint8_t* status);
 
 /** Formats of image files. */
 #define KRAL_IMAGE_FORMAT_BY_CONTENT 0u /**< HEX when the first character is a colon, else binary */
@@ -161,16 +161,16 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const
 #define KRAL_STREAM_NOR 1u         /**< with neither */
 
 #define KRAL_STREAM_WRITTEN 0u
-#define KRAL_STREAM_FILE_NOT_OPENED 1u   /**< the image or header file is missing, empty or unreadable */
-#define KRAL_STREAM_FILE_NOT_DECODED 2u  /**< a HEX file that is broken, or spreads over more than 128 MiB */
-#define KRAL_STREAM_BAD_IMAGE 3u         /**< a second region at 0x08000000, of which a download can write none */
-#define KRAL_STREAM_BAD_ARGUMENT 4u      /**< no such format or method, a null pointer */
-#define KRAL_STREAM_OPEN_FAILED 5u       /**< the handset refused to open the image; also a header over 512 bytes */
-#define KRAL_STREAM_NO_THREAD 6u         /**< the response thread did not start */
-#define KRAL_STREAM_WRITE_FAILED 7u      /**< the handset fell silent, answered something else, or the port failed */
-#define KRAL_STREAM_NOT_COMPLETED 8u     /**< the last acknowledgement did not come */
-#define KRAL_STREAM_THREAD_STUCK 9u      /**< the response thread did not stop */
-#define KRAL_STREAM_CLOSE_FAILED 10u     /**< everything is written, but the handset did not close the image */
+#define KRAL_STREAM_FILE_NOT_OPENED 1u  /**< the image or header file is missing, empty or unreadable */
+#define KRAL_STREAM_FILE_NOT_DECODED 2u /**< a HEX file that is broken, or spreads over more than 128 MiB */
+#define KRAL_STREAM_BAD_IMAGE 3u        /**< a second region at 0x08000000, of which a download can write none */
+#define KRAL_STREAM_BAD_ARGUMENT 4u     /**< no such format or method, a null pointer */
+#define KRAL_STREAM_OPEN_FAILED 5u      /**< the handset refused to open the image; also a header over 512 bytes */
+#define KRAL_STREAM_NO_THREAD 6u        /**< the response thread did not start */
+#define KRAL_STREAM_WRITE_FAILED 7u     /**< the handset fell silent, answered something else, or the port failed */
+#define KRAL_STREAM_NOT_COMPLETED 8u    /**< the last acknowledgement did not come */
+#define KRAL_STREAM_THREAD_STUCK 9u     /**< the response thread did not stop */
+#define KRAL_STREAM_CLOSE_FAILED 10u    /**< everything is written, but the handset did not close the image */
 
 /**
  * Writes an image file into flash.
@@ -190,9 +190,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const
  * Wait: time-out 0 for the opening, for each acknowledgement, and for the closing; ten time-outs in a row without any
  * acknowledgement end it.
  */
-KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const char *image_file, uint32_t format,
-                                                      uint8_t image_type, const char *header_file, uint8_t method,
-                                                      uint32_t block_size, uint16_t window, uint32_t *result);
+KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const char* image_file, uint32_t format,
+                                                      uint8_t image_type, const char* header_file, uint8_t method,
+                                                      uint32_t block_size, uint16_t window, uint32_t* result);
 
 /**
  * Writes bytes of the caller into flash.
@@ -204,10 +204,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const 
  * @param header       for the opening packet; null for none
  * @param header_size  its bytes, at most 512
  */
-KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t *data, uint32_t size,
-                                                     uint32_t address, uint8_t image_type, const uint8_t *header,
+KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* data, uint32_t size,
+                                                     uint32_t address, uint8_t image_type, const uint8_t* header,
                                                      uint32_t header_size, uint8_t method, uint32_t block_size,
-                                                     uint16_t window, uint32_t *result);
+                                                     uint16_t window, uint32_t* result);
 
 /**@}*/
 /** @name Image files; no handset is needed, and nothing is logged */
@@ -235,8 +235,8 @@ typedef char KRAL_IMAGE_INFO_SIZE_CHECK[sizeof(KRAL_IMAGE_INFO) == 28 ? 1 : -1];
  * @param[out] info       what is in it
  * @param[out] result     KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_ARGUMENT or 0; may be null
  */
-KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char *image_file, uint32_t format, KRAL_IMAGE_INFO *info,
-                                              uint32_t *result);
+KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info,
+                                              uint32_t* result);
 
 #define KRAL_HEX_TO_BINARY 0u
 #define KRAL_HEX_FROM_BINARY 1u
@@ -255,8 +255,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char *image_file, uint32_t f
  * @param[out]    result       KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_IMAGE, ..._BAD_ARGUMENT,
  *                             KRAL_HEX_NOT_WRITTEN or 0; may be null
  */
-KRAL_API uint8_t KRAL_CALL KRAL_HEX_Convert(const char *input, const char *output, uint32_t direction,
-                                            uint32_t *base_address, uint32_t *result);
+KRAL_API uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32_t direction,
+                                            uint32_t* base_address, uint32_t* result);
 
 #define KRAL_HEX_NOT_WRITTEN 11u
 

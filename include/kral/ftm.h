@@ -33,7 +33,7 @@ extern "C" {
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_MODE_ID(KRAL_HANDLE handle, uint16_t mode_id);
 
 /** Hands back the mode id in force. Sends nothing. */
-KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t *mode_id);
+KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t* mode_id);
 
 /**
  * Chooses the diagnostic command code that carries FTM: 75 (the default) or 59 (legacy handsets). Sends nothing.
@@ -43,7 +43,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t *mo
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t code);
 
 /** Hands back the command code in force. Sends nothing. */
-KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t *code);
+KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t* code);
 
 /* --- Into and out of factory test mode ---------------------------------------------------------------------------- */
 
@@ -55,7 +55,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_
  * @param[out] is_ftm  1 or 0
  * @return 1 when the handset told
  */
-KRAL_API uint8_t KRAL_CALL KRAL_IsFTM_Mode(KRAL_HANDLE handle, uint8_t *is_ftm);
+KRAL_API uint8_t KRAL_CALL KRAL_IsFTM_Mode(KRAL_HANDLE handle, uint8_t* is_ftm);
 
 /**
  * Chooses the mode in which the handset boots: takes it offline (KRAL_DIAG_CONTROL_F with mode 1) and writes NV item
@@ -129,8 +129,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_TX_OFF(KRAL_HANDLE handle);
  *
  * @param command  the command id
  */
-KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t command, const uint8_t *payload,
-                                                uint16_t payload_size, uint8_t *response, uint16_t *response_size);
+KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t command, const uint8_t* payload,
+                                                uint16_t payload_size, uint8_t* response, uint16_t* response_size);
 
 /**
  * Addition. The same to the dispatcher of a given mode id and with a given header, which leaves the current mode id
@@ -147,8 +147,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t com
  * `response` receives what stands behind the command id, the two length words of forms 1 and 2 included.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommandTo(KRAL_HANDLE handle, uint16_t mode_id, uint8_t header_form,
-                                                  uint16_t command, const uint8_t *payload, uint16_t payload_size,
-                                                  uint8_t *response, uint16_t *response_size);
+                                                  uint16_t command, const uint8_t* payload, uint16_t payload_size,
+                                                  uint8_t* response, uint16_t* response_size);
 
 /** Addition. The number of commands in the library's table of RF commands. */
 KRAL_API uint16_t KRAL_CALL KRAL_FTM_GetCommandCount(void);
@@ -162,7 +162,7 @@ KRAL_API uint16_t KRAL_CALL KRAL_FTM_GetCommandCount(void);
  * @param      name_size  room of `name`; 64 bytes hold every name
  * @return 1; 0 for an index out of range or a name that does not fit
  */
-KRAL_API uint8_t KRAL_CALL KRAL_FTM_GetCommandInfo(uint16_t index, uint16_t *command, char *name, uint16_t name_size);
+KRAL_API uint8_t KRAL_CALL KRAL_FTM_GetCommandInfo(uint16_t index, uint16_t* command, char* name, uint16_t name_size);
 
 #ifdef __cplusplus
 }

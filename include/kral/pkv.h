@@ -6,9 +6,9 @@
  *
  * - A backup reads the NV items of a range of ids (KRAL_PKV_ConfigureBackup; 0 to 9,999 of one subscription at first),
  *   those that are defined for the handset's NV tool, array items of these element by element, and every file in the
- * handset's item folders, /nv/items, nv/item_files/conf, nv/reg_files/conf, /nv/item_files/rfnv and nv/item_store/rfnv,
- * with what is below them. Items that the handset answers with a status other than 0 have no value and are left out. RF
- * NV items are files, too.
+ *   handset's item folders, /nv/items, nv/item_files/conf, nv/reg_files/conf, /nv/item_files/rfnv and
+ *   nv/item_store/rfnv, with what is below them. Items that the handset answers with a status other than 0 have no
+ *   value and are left out. RF NV items are files, too.
  * - Every request is tried up to 3 times, each of them for time-out 0 (4,000 ms). A handset that cannot be reached any
  *   more ends the work: a backup then leaves the file as it was.
  * - `status` tells how the work ended: the code of the NV tool (KRAL_NV_GetErrorText), or one of those below. It is
