@@ -45,13 +45,6 @@ constexpr std::array<Reason, 9> kReasons{{
      "power the handset off and on and begin again; --log FILE shows the packets"},
 }};
 
-std::optional<std::string> FindLine(std::string_view part) {
-  const auto lines = ErrorLines();
-  const auto found = std::find_if(lines.begin(), lines.end(),
-                                  [part](const std::string& line) { return line.find(part) != std::string::npos; });
-  return found == lines.end() ? std::nullopt : std::optional(*found);
-}
-
 }  // namespace
 
 BootTarget::BootTarget(const Context& context, const BootOptions& options)
@@ -81,7 +74,7 @@ BootIdentity BootTarget::Connect(bool ask_identity) {
   AwaitPort([&] {
     std::uint32_t chip = 0;
     if (KRAL_Kivrat_Connect(session_.handle(), &identity.version, ask_identity ? &chip : nullptr) == 0) return false;
-    if (FindLine("BXC ID read from PBL")) identity.chip = chip;
+    if (FindErrorLine("BXC ID read from PBL")) identity.chip = chip;
     return true;
   });
   return identity;
@@ -96,7 +89,7 @@ void BootTarget::Load(const std::string& programmer) {
   progress_ = nullptr;
   if (!loaded) throw Explain();
   // The protocol goes on whatever the target says; a person wants to know.
-  const auto status = FindLine(kStatus);
+  const auto status = FindErrorLine(kStatus);
   if (status && !status->ends_with(" 0")) {
     throw ToolError(ExitCode::kRefused,
                     fmt::format("the boot loader on {} refused {}: status {}", DescribePort(session_.port()),
@@ -152,17 +145,17 @@ void BootTarget::AwaitPort(const std::function<bool()>& attempt) {
 }
 
 bool BootTarget::IsPortMissing() const {
-  if (FindLine(kGone)) return true;
+  if (FindErrorLine(kGone)) return true;
   std::int32_t state = KRAL_PORT_CLOSED;
   KRAL_GetPortState(session_.handle(), &state);
-  return FindLine("Failed KivratInit()") && state != KRAL_PORT_BUSY && state != KRAL_PORT_NOT_PERMITTED;
+  return FindErrorLine("Failed KivratInit()") && state != KRAL_PORT_BUSY && state != KRAL_PORT_NOT_PERMITTED;
 }
 
 ToolError BootTarget::Explain() const {
   if (Interrupted()) return InterruptedError();
   if (const auto trouble = session_.PortTrouble()) return *trouble;
   for (const auto& reason : kReasons) {
-    if (!FindLine(reason.line)) continue;
+    if (!FindErrorLine(reason.line)) continue;
     return {reason.code, fmt::format("{} on {}", reason.text, DescribePort(session_.port())), std::string(reason.hint)};
   }
   return {ExitCode::kLink, fmt::format("the boot transfer on {} failed", DescribePort(session_.port())),

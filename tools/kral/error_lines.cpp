@@ -1,6 +1,7 @@
 // Receives the text-log records of the connection and keeps those that explain failures.
 #include "tools/kral/error_lines.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <cstring>
 #include <deque>
@@ -53,6 +54,13 @@ std::vector<std::string> ErrorLines(std::uint32_t flags) {
     if ((line.flag & flags) != 0) found.push_back(line.text);
   }
   return found;
+}
+
+std::optional<std::string> FindErrorLine(std::string_view part) {
+  const std::lock_guard lock(mutex);
+  const auto holds = [part](const Line& line) { return line.text.find(part) != std::string::npos; };
+  const auto found = std::find_if(lines.rbegin(), lines.rend(), holds);
+  return found == lines.rend() ? std::nullopt : std::optional(found->text);
 }
 
 }  // namespace kral::tool

@@ -3,7 +3,9 @@
 #ifndef KRAL_TOOLS_ERROR_LINES_H
 #define KRAL_TOOLS_ERROR_LINES_H
 
+#include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "kral/kral.h"
@@ -16,6 +18,8 @@ void CollectErrorLines(KRAL_HANDLE handle);  // from now on, through the text-lo
 void ForgetErrorLines();                     // before a request
 // Those since then, errors and results.
 std::vector<std::string> ErrorLines(std::uint32_t flags = kExplainingLines);
+// The last of them that holds a text.
+std::optional<std::string> FindErrorLine(std::string_view part);
 
 }  // namespace kral::tool
 

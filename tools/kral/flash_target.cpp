@@ -18,12 +18,6 @@ constexpr std::chrono::milliseconds kLookAround{50};
 constexpr std::uint32_t kAllTries = 5;
 constexpr std::uint32_t kRetryDelayMs = 500;
 
-bool WasLogged(std::string_view part) {
-  const auto lines = ErrorLines();
-  return std::any_of(lines.begin(), lines.end(),
-                     [part](const std::string& line) { return line.find(part) != std::string::npos; });
-}
-
 // Since the handset last did as it was asked: what timed out before was made good.
 bool TimedOutLast() {
   const auto lines = ErrorLines();
@@ -138,7 +132,7 @@ void FlashTarget::SendPartitionTable(const std::string& file, bool override_tabl
   constexpr std::uint8_t kNothing = 0;
   std::uint8_t status = kNothing;
   if (KRAL_STREAM_PARTITION_TABLE(session_.handle(), file.c_str(), override_table ? 1 : 0, &status) != 0) return;
-  if (WasLogged("partition : failed to open file") || WasLogged("partition : file exceeds")) {
+  if (FindErrorLine("partition : failed to open file") || FindErrorLine("partition : file exceeds")) {
     throw ToolError(ExitCode::kBadFile, fmt::format("{} is no partition table", file),
                     "the file must be readable and have at most 512 bytes");
   }
@@ -188,7 +182,7 @@ ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_
       return {ExitCode::kRefused, fmt::format("the handset on {} refused to open {}", where, file),
               "check the image type (--type) and that the header has at most 512 bytes"};
     case KRAL_STREAM_WRITE_FAILED:
-      if (WasLogged("write error")) {
+      if (FindErrorLine("write error")) {
         return {ExitCode::kLink, fmt::format("{} was answered with something else on {}", file, where),
                 "the flash holds part of the image: write it again; --log FILE shows the traffic"};
       }

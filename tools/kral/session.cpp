@@ -192,18 +192,13 @@ void Session::Begin() {
 
 ToolError Session::Explain(std::string_view what) const {
   if (Interrupted()) return InterruptedError();
-  const auto lines = ErrorLines();
-  const auto find = [&lines](std::string_view part) {
-    return std::find_if(lines.rbegin(), lines.rend(),
-                        [part](const std::string& line) { return line.find(part) != std::string::npos; });
-  };
   const auto where = fmt::format("{} on {}", what, DescribePort(port_));
 
-  if (const auto refusal = find("ERROR:\tDIAG_BAD_"); refusal != lines.rend()) {
+  if (const auto refusal = FindErrorLine("ERROR:\tDIAG_BAD_")) {
     return {ExitCode::kRefused, fmt::format("the handset refused {}: {}", where, refusal->substr(7)),
             "the command may need another mode (kral mode), an unlock, or other firmware"};
   }
-  if (find("Received different response command byte") != lines.rend()) {
+  if (FindErrorLine("Received different response command byte")) {
     return {ExitCode::kLink, fmt::format("{} was answered with something else", where),
             "check that no other program talks to the handset; --log FILE shows the traffic"};
   }
@@ -214,18 +209,19 @@ ToolError Session::Explain(std::string_view what) const {
   const auto after = TroubleOf(handle_);
   const auto trouble = after ? after : before;
   if (!answers && trouble) return ExplainPort(port_, *trouble, true);
-  if (find("mode switching status polling has timeout") != lines.rend()) {
+  if (FindErrorLine("mode switching status polling has timeout")) {
     return {ExitCode::kNoAnswer, fmt::format("the handset took {} but does not report the new mode", where),
             "it may still be switching: ask with kral mode get"};
   }
-  if (find("Request timed out") != lines.rend()) {
+  if (FindErrorLine("Request timed out")) {
     return {ExitCode::kNoAnswer, fmt::format("no answer in time to {}", where),
             answers ? "the handset still answers other requests; --time-out MS waits longer"
                     : "the handset answers nothing any more: check cable and power"};
   }
-  if (find("Error. Send data failed.") != lines.rend()) {
+  if (FindErrorLine("Error. Send data failed.")) {
     return {ExitCode::kLink, fmt::format("{} could not be written", where), "check the cable and try again"};
   }
+  const auto lines = ErrorLines();
   return {ExitCode::kLink,
           fmt::format("{} failed{}{}", where, lines.empty() ? "" : ": ", lines.empty() ? "" : Printable(lines.back())),
           "--log FILE shows the traffic"};
