@@ -1,5 +1,7 @@
 // Builds what a context row owns, on first use. Nothing is built under the table lock, so a row may be released
 // meanwhile: what was built for it is then thrown away.
+#include <functional>
+#include <type_traits>
 #include <utility>
 
 #include "frame/diag_ftm.h"
@@ -16,24 +18,31 @@ bool IsServerModeOnly(FamilySlot slot) {
   return slot == FamilySlot::kEfs || slot == FamilySlot::kServerPort;
 }
 
-// One owned pointer of the row with that handle; null for an unknown handle.
-template <class T>
-std::shared_ptr<T> Owned(KRAL_HANDLE handle, std::shared_ptr<T> ContextObjects::*member) {
+// The pointer of the row with that handle that a projection chooses; null for an unknown handle.
+template <class Choose>
+auto Owned(KRAL_HANDLE handle, Choose choose) {
   auto& library = Library();
   const std::lock_guard lock(library.mutex);
-  const Context* context = FindContext(library, handle);
-  return context == nullptr ? nullptr : context->objects.*member;
+  Context* const context = FindContext(library, handle);
+  using Pointer = std::remove_reference_t<std::invoke_result_t<Choose, ContextObjects&>>;
+  return context == nullptr ? Pointer() : std::invoke(choose, context->objects);
 }
 
 // False when the row is gone.
-template <class T>
-bool Own(KRAL_HANDLE handle, std::shared_ptr<T> ContextObjects::*member, const std::shared_ptr<T>& object) {
+template <class Choose, class T>
+bool Own(KRAL_HANDLE handle, Choose choose, const std::shared_ptr<T>& object) {
   auto& library = Library();
   const std::lock_guard lock(library.mutex);
-  Context* context = FindContext(library, handle);
+  Context* const context = FindContext(library, handle);
   if (context == nullptr) return false;
-  context->objects.*member = object;
+  std::invoke(choose, context->objects) = object;
   return true;
+}
+
+auto FamilyIn(FamilySlot slot) {
+  return [slot](ContextObjects & objects) -> auto& {
+    return objects.family[static_cast<size_t>(slot)];
+  };
 }
 
 // The row's proxy, connected to its port when it is new.
@@ -63,23 +72,6 @@ std::shared_ptr<Diag_FTM> MakePhone(KRAL_HANDLE handle, uint16_t port) {
   phone->SetTargetType(Kral_ResourceManager::target_type());
   phone->SetHandle(handle);
   return phone;
-}
-
-// The slot's object; null for an unknown handle or an empty slot.
-std::shared_ptr<FamilyObject> OwnedFamily(KRAL_HANDLE handle, FamilySlot slot) {
-  auto& library = Library();
-  const std::lock_guard lock(library.mutex);
-  const Context* context = FindContext(library, handle);
-  return context == nullptr ? nullptr : context->objects.family[static_cast<size_t>(slot)];
-}
-
-bool OwnFamily(KRAL_HANDLE handle, FamilySlot slot, const std::shared_ptr<FamilyObject>& object) {
-  auto& library = Library();
-  const std::lock_guard lock(library.mutex);
-  Context* context = FindContext(library, handle);
-  if (context == nullptr) return false;
-  context->objects.family[static_cast<size_t>(slot)] = object;
-  return true;
 }
 
 // A pointer to the family object that keeps the phone object alive as well.
@@ -115,14 +107,14 @@ std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle) try {
 std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make) try {
   const auto phone = GetPhone(handle);
   if (!phone || (IsServerModeOnly(slot) && !phone->server_mode())) return nullptr;
-  if (auto object = OwnedFamily(handle, slot)) return Joined(phone, std::move(object));
+  if (auto object = Owned(handle, FamilyIn(slot))) return Joined(phone, std::move(object));
   if (!make) return nullptr;
   // The request lock rather than one of the table: a maker may send requests, and an operation that holds the request
   // lock may ask for a family object.
   const std::lock_guard building(phone->request_lock());
-  if (auto object = OwnedFamily(handle, slot)) return Joined(phone, std::move(object));
+  if (auto object = Owned(handle, FamilyIn(slot))) return Joined(phone, std::move(object));
   auto object = make(*phone, handle);
-  return object && OwnFamily(handle, slot, object) ? Joined(phone, std::move(object)) : nullptr;
+  return object && Own(handle, FamilyIn(slot), object) ? Joined(phone, std::move(object)) : nullptr;
 } catch (...) {
   return nullptr;
 }
