@@ -247,11 +247,6 @@ void EfsService::SetTotalBlocks(uint32_t blocks) {
   tree_.total_blocks = blocks;
 }
 
-void EfsService::SetTime(uint32_t seconds) {
-  const std::lock_guard lock(mutex_);
-  tree_.now = seconds;
-}
-
 void EfsService::SetLimits(size_t descriptors, size_t directories) {
   const std::lock_guard lock(mutex_);
   most_descriptors_ = descriptors;
@@ -286,16 +281,6 @@ void EfsService::ShowNameAs(std::string name, std::string shown) {
 void EfsService::SetSyncPolls(uint32_t polls) {
   const std::lock_guard lock(mutex_);
   sync_polls_ = polls;
-}
-
-void EfsService::SetExtendedInfo(uint32_t query, std::variant<uint32_t, std::string> answer) {
-  const std::lock_guard lock(mutex_);
-  extended_info_[query] = std::move(answer);
-}
-
-uint32_t EfsService::golden_copies() const {
-  const std::lock_guard lock(mutex_);
-  return golden_copies_;
 }
 
 }  // namespace kral::handset

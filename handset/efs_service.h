@@ -27,7 +27,6 @@ class EfsService final : public Service {
   bool Exists(std::string_view path) const { return Mode(path).has_value(); }
   uint32_t used_blocks() const;
   void SetTotalBlocks(uint32_t blocks);
-  void SetTime(uint32_t seconds);
 
   // --- What can run out ---------------------------------------------------------------------------------------------
   void SetLimits(size_t descriptors, size_t directories);
@@ -43,8 +42,6 @@ class EfsService final : public Service {
   void ShowNameAs(std::string name, std::string shown);
   // A sync is reported done with the n-th status request; 0: at once.
   void SetSyncPolls(uint32_t polls);
-  void SetExtendedInfo(uint32_t query, std::variant<uint32_t, std::string> answer);
-  uint32_t golden_copies() const;
 
  private:
   struct OpenFile {
@@ -92,8 +89,8 @@ class EfsService final : public Service {
   std::map<std::string, std::string> shown_names_;
   uint32_t sync_polls_ = 0;
   uint32_t polls_to_go_ = 0;
-  uint32_t golden_copies_ = 0;
-  std::map<uint32_t, std::variant<uint32_t, std::string>> extended_info_ = {{0, 255u}, {1, std::string("VHFS 2.1")}};
+  const std::map<uint32_t, std::variant<uint32_t, std::string>> extended_info_ = {{0, 255u},
+                                                                                  {1, std::string("VHFS 2.1")}};
 };
 
 }  // namespace kral::handset

@@ -44,11 +44,6 @@ Bytes FlashMemory::Load(uint32_t address, size_t size) const {
   return bytes;
 }
 
-size_t FlashMemory::erased_sectors() const {
-  const std::lock_guard lock(mutex_);
-  return erased_.size();
-}
-
 Bytes& FlashMemory::SectorLocked(uint32_t address) {
   Bytes& sector = sectors_[address / kSectorSize];
   if (sector.empty()) sector.assign(kSectorSize, kErased);

@@ -24,7 +24,6 @@ class FlashMemory {
   void Fill(uint32_t address, ByteView bytes);
 
   Bytes Load(uint32_t address, size_t size) const;  // never written: erased
-  size_t erased_sectors() const;                    // since the image began
 
  private:
   Bytes& SectorLocked(uint32_t address);

@@ -178,12 +178,6 @@ Bytes FlashProgrammer::partition_table() const {
   return partition_table_;
 }
 
-void FlashProgrammer::SetPartitionTable(Bytes table) {
-  const std::lock_guard lock(mutex_);
-  table.resize(kTableSize);
-  partition_table_ = std::move(table);
-}
-
 size_t FlashProgrammer::most_ahead() const {
   const std::lock_guard lock(mutex_);
   return most_ahead_;

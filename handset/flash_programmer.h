@@ -40,9 +40,8 @@ class FlashProgrammer final : public FramedMode {
 
   std::vector<WrittenImage> images() const;
   std::optional<uint8_t> security_mode() const;
-  Bytes partition_table() const;        // empty before the first
-  void SetPartitionTable(Bytes table);  // what is in flash already
-  size_t most_ahead() const;            // writes not yet acknowledged when another came, at most
+  Bytes partition_table() const;  // empty before the first
+  size_t most_ahead() const;      // writes not yet acknowledged when another came, at most
 
  private:
   bool OnPacket(ByteView packet, Wire& wire) override;

@@ -71,12 +71,6 @@ void FtmService::OnReset() {
   }
 }
 
-Radio FtmService::RadioOf(uint16_t mode_id) const {
-  const std::lock_guard lock(mutex_);
-  const auto radio = radios_.find(mode_id);
-  return radio != radios_.end() ? radio->second : Radio{};
-}
-
 void FtmService::SetInputLevel(uint16_t mode_id, int16_t hundredths_of_dbm) {
   const std::lock_guard lock(mutex_);
   radios_[mode_id].input_level = hundredths_of_dbm;

@@ -55,7 +55,6 @@ class FtmService final : public Service {
   using Dispatcher = std::function<Bytes(uint16_t command, ByteView payload)>;
   void SetDispatcher(uint16_t mode_id, Dispatcher dispatcher) { dispatchers_[mode_id] = std::move(dispatcher); }
 
-  Radio RadioOf(uint16_t mode_id) const;
   void SetInputLevel(uint16_t mode_id, int16_t hundredths_of_dbm);
   std::vector<FtmCommand> commands() const;  // all that were carried out, oldest first; the last 4,096 of them
 

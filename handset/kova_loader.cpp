@@ -6,6 +6,7 @@ namespace {
 
 constexpr uint8_t kAcknowledged = 0x02;
 constexpr uint8_t kRefused = 0x03;
+constexpr uint8_t kSoftwareVersion = 0x21;
 constexpr size_t kWriteHeaderSize = 7;
 constexpr size_t kMostData = 4089;
 
@@ -46,7 +47,7 @@ bool KovaLoader::OnPacket(ByteView packet, Wire& wire) {
       wire.Restart(reset_time_ms_);
       return false;
     case 0x0C:
-      if (packet.size() == 1) wire.Send(Bytes{0x0D, software_version_});
+      if (packet.size() == 1) wire.Send(Bytes{0x0D, kSoftwareVersion});
       return true;
     case 0x0F:
       answer(Load(packet));
@@ -73,11 +74,6 @@ bool KovaLoader::MayStart(uint32_t address) const {
   return first_address_ && address - *first_address_ < bytes_loaded_;
 }
 
-void KovaLoader::SetSoftwareVersion(uint8_t version) {
-  const std::lock_guard lock(mutex_);
-  software_version_ = version;
-}
-
 void KovaLoader::SetResetTime(uint32_t milliseconds) {
   const std::lock_guard lock(mutex_);
   reset_time_ms_ = milliseconds;
@@ -86,11 +82,6 @@ void KovaLoader::SetResetTime(uint32_t milliseconds) {
 std::optional<uint32_t> KovaLoader::started_at() const {
   const std::lock_guard lock(mutex_);
   return started_at_;
-}
-
-uint64_t KovaLoader::bytes_loaded() const {
-  const std::lock_guard lock(mutex_);
-  return bytes_loaded_;
 }
 
 }  // namespace kral::handset

@@ -16,10 +16,8 @@ class KovaLoader final : public FramedMode {
   // Whatever program is started, it turns out to be `program`.
   KovaLoader(Memory& memory, std::shared_ptr<WireMode> program) : memory_(memory), program_(std::move(program)) {}
 
-  void SetSoftwareVersion(uint8_t version);
   void SetResetTime(uint32_t milliseconds);    // silence after a reset
   std::optional<uint32_t> started_at() const;  // the address of the last start
-  uint64_t bytes_loaded() const;               // since it was last entered
   void OnEnter(Wire& wire) override;
 
  private:
@@ -30,7 +28,6 @@ class KovaLoader final : public FramedMode {
   Memory& memory_;
   const std::shared_ptr<WireMode> program_;
   mutable std::mutex mutex_;
-  uint8_t software_version_ = 0x21;
   uint32_t reset_time_ms_ = 0;
   std::optional<uint32_t> started_at_;
   std::optional<uint32_t> first_address_;

@@ -125,11 +125,6 @@ void Maintenance::AddErrorRecord(ByteView record) {
   error_records_.emplace_back(kept.begin(), kept.end());
 }
 
-std::vector<Bytes> Maintenance::error_records() const {
-  const std::lock_guard lock(mutex_);
-  return error_records_;
-}
-
 void Maintenance::SetStatusRecord(Bytes record) {
   const std::lock_guard lock(mutex_);
   status_record_ = std::move(record);

@@ -31,7 +31,6 @@ class Maintenance final : public Service {
   uint32_t backups() const;
 
   void AddErrorRecord(ByteView record);  // at most 255 of at most 255 bytes
-  std::vector<Bytes> error_records() const;
   void SetStatusRecord(Bytes record);
   void SetIs2000StatusRecord(Bytes record);
 
