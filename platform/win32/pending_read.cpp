@@ -18,21 +18,18 @@ PendingRead::~PendingRead() {
   ::GetOverlappedResult(port_, &overlapped_, &ignored, TRUE);
 }
 
-PendingRead::Outcome PendingRead::Wait(HANDLE wake, DWORD milliseconds) {
+PendingRead::Outcome PendingRead::Wait(HANDLE wake, DWORD milliseconds, DWORD& error) {
   {
     const std::lock_guard lock(mutex_);
-    if (const DWORD error = Start()) {
-      ::SetLastError(error);
-      return Outcome::kFailed;
-    }
+    error = Start();
+    if (error != ERROR_SUCCESS) return Outcome::kFailed;
     if (received_) return Outcome::kReceived;
   }
   const std::array<HANDLE, 2> events = {ended_.get(), wake};
   switch (::WaitForMultipleObjects(static_cast<DWORD>(events.size()), events.data(), FALSE, milliseconds)) {
     case WAIT_OBJECT_0: {
       const std::lock_guard lock(mutex_);
-      const DWORD error = Collect();
-      ::SetLastError(error);
+      error = Collect();
       return error == ERROR_SUCCESS ? Outcome::kReceived : Outcome::kFailed;
     }
     case WAIT_OBJECT_0 + 1:

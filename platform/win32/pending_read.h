@@ -24,8 +24,8 @@ class PendingRead {
   enum class Outcome { kReceived, kWoken, kTimeOut, kFailed };
 
   // Starts a read unless one is under way, and waits for its end or for `wake`. A read that has not ended stays under
-  // way: what comes later is found by the next Wait or Take. After kFailed, GetLastError tells why.
-  Outcome Wait(HANDLE wake, DWORD milliseconds);
+  // way: what comes later is found by the next Wait or Take. `error` tells why with kFailed only.
+  Outcome Wait(HANDLE wake, DWORD milliseconds, DWORD& error);
 
   size_t Take(std::span<uint8_t> buffer);  // 0 or 1
   size_t Waiting();                        // 0 or 1

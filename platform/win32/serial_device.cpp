@@ -198,12 +198,13 @@ bool ComPort::WaitReadable(uint32_t milliseconds) {
   auto left = static_cast<DWORD>(milliseconds);
   if (InputWaiting() > 0) return true;
   while (!gone_) {
-    switch (pending_.Wait(wake_.get(), left)) {
+    DWORD error = ERROR_SUCCESS;
+    switch (pending_.Wait(wake_.get(), left, error)) {
       case PendingRead::Outcome::kReceived:
         if (pending_.Waiting() > 0) return true;
         break;
       case PendingRead::Outcome::kFailed:
-        NoteFailure(::GetLastError());
+        NoteFailure(error);
         ::Sleep(1);  // a driver that refuses at once must not keep the thread busy
         break;
       default:
