@@ -9,14 +9,10 @@
 #include <memory>
 #include <utility>
 
+#include "platform/win32/com_object.h"
+
 namespace kral {
 namespace {
-
-struct Release {
-  void operator()(IUnknown* object) const { object->Release(); }
-};
-template <class T>
-using Owned = std::unique_ptr<T, Release>;
 
 constexpr DWORD kWriteMode = STGM_READWRITE | STGM_SHARE_EXCLUSIVE | STGM_CREATE;
 

@@ -9,17 +9,13 @@
 #include <memory>
 #include <utility>
 
+#include "platform/win32/com_object.h"
+
 namespace kral {
 namespace {
 
 // IXMLDOMDocument2, for which MinGW's import libraries have no identifier.
 constexpr IID kDocument2 = {0x2933BF95, 0x7B36, 0x11D2, {0xB2, 0x0E, 0x00, 0xC0, 0x4F, 0x98, 0x3E, 0x60}};
-
-struct Release {
-  void operator()(IUnknown* object) const { object->Release(); }
-};
-template <class T>
-using Owned = std::unique_ptr<T, Release>;
 
 struct FreeString {
   void operator()(wchar_t* text) const { ::SysFreeString(text); }
