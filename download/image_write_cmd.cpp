@@ -39,7 +39,7 @@ bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data)
     connection_.log().WriteLine(kLogErr, "write command too long\n");
     return false;
   }
-  packet_.assign(stream::kWriteBufferSize, 0);
+  packet_.resize(stream::kWriteBufferSize);
   const auto header = Header(address);
   const auto body = std::copy(header.begin(), header.end(), packet_.begin());
   std::copy(data.begin(), data.end(), body);
