@@ -22,6 +22,7 @@ constexpr uint32_t kUsualEntries = 256;
 constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
 
+constexpr uint32_t kUnanswered = 0xFFFFFFFF;  // in place of an error number
 constexpr uint32_t kDirectory = 0x4000;
 constexpr uint32_t kPermissions = 0777;
 
@@ -157,7 +158,15 @@ PhoneItems::Answer PhoneItems::ReadFile(PkvEfsFile& file, uint32_t& status, size
 void PhoneItems::MakeFolders(const std::string& path) {
   for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
     const std::string folder = path.substr(0, end);
-    if (folders_.insert(folder).second) efs::MakeDirectory(phone_, folder.c_str(), nullptr);
+    if (folders_.contains(folder)) continue;
+    bool made = false;
+    const Answer answer = Try([&] {
+      uint32_t error = kUnanswered;
+      made = efs::MakeDirectory(phone_, folder.c_str(), &error);
+      return error != kUnanswered;
+    });
+    if (made) folders_.insert(folder);
+    if (answer == Answer::kLost) return;
   }
 }
 
