@@ -19,7 +19,7 @@ bool TextFile::OpenForReading(const std::string& path) {
 }
 
 bool TextFile::OpenForWriting(const std::string& path) {
-  file_.reset(std::fopen(path.c_str(), "wb"));
+  file_.reset(OpenToWrite(path));
   return file_ != nullptr;
 }
 

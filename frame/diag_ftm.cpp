@@ -2,13 +2,13 @@
 // diag_ftm_connection.cpp, requests in diag_ftm_requests.cpp.
 #include "frame/diag_ftm.h"
 
-#include <fstream>
 #include <sstream>
 #include <string>
 #include <utility>
 
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
+#include "platform/file_util.h"
 
 namespace kral {
 namespace {
@@ -23,6 +23,7 @@ constexpr std::array kLogCategories = {"ZEFT log parsing", "cdma2000 RDA log par
 // Optional settings of a station, in the current directory.
 constexpr const char* kStationFile = "WLANEVKConfig.txt";
 constexpr size_t kStationLineLength = 80;
+constexpr size_t kLargestStationFile = 1 << 20;
 
 bool IsTransportTimeOut(uint32_t id) {
   return id == kTimeOutPortWrite || id == kTimeOutThreadRead;
@@ -66,7 +67,9 @@ void Diag_FTM::ApplyDefaults() {
 }
 
 void Diag_FTM::ReadStationFile() {
-  std::ifstream file(kStationFile);
+  std::vector<uint8_t> bytes;
+  if (ReadWholeFile(kStationFile, kLargestStationFile, bytes)) return;
+  std::istringstream file(std::string(bytes.begin(), bytes.end()));
   for (std::string line; std::getline(file, line);) {
     line.resize(std::min(line.size(), kStationLineLength));
     std::istringstream fields(line);

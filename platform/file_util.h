@@ -13,24 +13,31 @@
 
 namespace kral {
 
-// Opens an ordinary file for a reader of its own; null for everything else. Never waits, as a pipe would have it.
+// Each opens an ordinary file for a stream of its own; null for everything else. None waits, as a pipe would have it.
 std::FILE* OpenToRead(const std::string& path);
+std::FILE* OpenToWrite(const std::string& path);  // emptied, or made
+// For lines, which end as the system ends them. Terminals, the null device and their like, and pipes that somebody
+// reads are welcome too; writing to these waits for whoever reads.
+std::FILE* OpenToWriteText(const std::string& path);
 
 // Reads an ordinary file of at most `limit` bytes; a longer one is std::errc::file_too_large, and nothing of it is
 // given.
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes);
 
-// A file read from its front to its end, as long as it may be. Others may read it meanwhile; on Windows nobody may
-// write it.
+// A file read piece by piece, as long as it may be.
 class FileReader {
  public:
+  // What others may do with the file meanwhile. Only Windows can keep them from it.
+  enum class Others { kMayRead, kMayWrite };
+
   FileReader();
   ~FileReader();
   FileReader(const FileReader&) = delete;
   FileReader& operator=(const FileReader&) = delete;
 
-  std::error_code Open(const std::string& path);  // ordinary files only
+  std::error_code Open(const std::string& path, Others others = Others::kMayRead);  // ordinary files only
   void Close();
+  std::error_code Seek(uint64_t offset);
   // The next bytes; fewer than there is room for only at the end of the file.
   std::error_code Read(std::span<uint8_t> buffer, size_t& count);
   uint64_t size() const;  // when it was opened
@@ -41,7 +48,8 @@ class FileReader {
 };
 
 // A file being written under a temporary name beside its target. Until Commit the target stays as it was; without a
-// Commit the destructor removes what was written. After a failed Write every later step fails.
+// Commit the destructor removes what was written. After a failed Write every later step fails. Only ordinary files are
+// replaced, and links lead to what is.
 class AtomicFile {
  public:
   AtomicFile();

@@ -1,9 +1,9 @@
 // Copies files of the PC, or memory, to the handset, chunk by chunk.
 #include <algorithm>
-#include <fstream>
 #include <functional>
 
 #include "frame/base/text_argument.h"
+#include "platform/file_util.h"
 #include "storage/efs_handle.h"
 #include "storage/efs_request.h"
 #include "storage/efs_transfer.h"
@@ -116,18 +116,15 @@ bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
 }
 
 bool WriteLocalFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  std::ifstream file(TextOrEmpty(local_file), std::ios::binary | std::ios::ate);
-  const auto size = static_cast<int64_t>(file.tellg());
-  // A folder opens on some systems and has no end.
-  if (!file || size < 0 || size > UINT32_MAX) {
+  FileReader file;
+  if (file.Open(TextOrEmpty(local_file), FileReader::Others::kMayWrite) || file.size() > UINT32_MAX) {
     phone.log().WriteLine(kLogErr, "fopen() failed to open PC file %s", TextOrEmpty(local_file));
     return false;
   }
-  Source source{.size = static_cast<u32>(size), .ends = {AddressOf(local_file), AddressOf(efs_file)}};
+  Source source{.size = static_cast<u32>(file.size()), .ends = {AddressOf(local_file), AddressOf(efs_file)}};
   source.read = [&file](u32 offset, std::span<u8> chunk) {
-    file.seekg(offset);
-    file.read(reinterpret_cast<char*>(chunk.data()), static_cast<std::streamsize>(chunk.size()));
-    return file.good();
+    size_t count = 0;
+    return !file.Seek(offset) && !file.Read(chunk, count) && count == chunk.size();
   };
   return Write(phone, source, efs_file);
 }

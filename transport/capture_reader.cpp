@@ -7,13 +7,14 @@
 #include <memory>
 
 #include "frame/base/little_endian.h"
+#include "platform/file_util.h"
 #include "transport/bounded_queue.h"
 #include "transport/capture_format.h"
 
 namespace kral {
 
 CaptureSource OpenCaptureSource(const std::string& path) {
-  const std::shared_ptr<std::FILE> file(std::fopen(path.c_str(), "rb"), [](std::FILE* opened) {
+  const std::shared_ptr<std::FILE> file(OpenToRead(path), [](std::FILE* opened) {
     if (opened != nullptr) std::fclose(opened);
   });
   if (!file) return {};

@@ -10,6 +10,7 @@
 
 #include "frame/base/little_endian.h"
 #include "frame/base/text_log.h"
+#include "platform/file_util.h"
 #include "transport/bounded_queue.h"
 #include "transport/capture_format.h"
 
@@ -61,7 +62,7 @@ uint64_t CountWholeRecords(std::span<const uint8_t> bytes) {
 }  // namespace
 
 CaptureSink OpenCaptureFile(const std::string& path) {
-  const std::shared_ptr<std::FILE> file(std::fopen(path.c_str(), "wb"), [](std::FILE* opened) {
+  const std::shared_ptr<std::FILE> file(OpenToWrite(path), [](std::FILE* opened) {
     if (opened != nullptr) std::fclose(opened);
   });
   if (!file) return {};

@@ -8,6 +8,7 @@
 
 #include "frame/base/little_endian.h"
 #include "frame/base/text_log_format.h"
+#include "platform/file_util.h"
 #include "platform/local_time.h"
 
 namespace kral {
@@ -43,7 +44,7 @@ void DataLogFileHandler::WriteLine(uint32_t flag, const char* format, ...) {
 
 void DataLogFileHandler::WriteToFile(uint32_t flag, const char* text) {
   if (!logging_started_) return;
-  if (!file_ && !file_name_.empty()) file_.reset(std::fopen(file_name_.c_str(), "w"));
+  if (!file_ && !file_name_.empty()) file_.reset(OpenToWriteText(file_name_));
   if (!file_) return;  // a file that cannot be opened is not reported: its lines are dropped
   if (relative_time_stamps_) {
     std::fprintf(file_.get(), "%d\t", static_cast<int>(clock_.TickMs() - start_tick_));

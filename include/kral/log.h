@@ -363,7 +363,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDL
  * packets that it is too slow for are counted as lost, and so are those behind a write that fails. Switches nothing on.
  *
  * @param handle     from a connect function
- * @param file_name  emptied first
+ * @param file_name  an ordinary file, emptied first
  * @return 1; 0 when the file cannot be written, and, with no file touched, while another capture of the handle runs or
  *         has not written its rest
  */

@@ -65,6 +65,9 @@ typedef void(KRAL_CALL* KRAL_TEXT_LOG_CALLBACK)(uint32_t size, const void* recor
  * Starts writing the log to a file. The file is opened, and truncated, with the next line; one that cannot be opened
  * is not reported, its lines are dropped. While a log is being written, starts the new one in its place.
  *
+ * A terminal, the null device, and a pipe that somebody reads already are opened too. Each line then waits until it is
+ * taken, and with it the thread that writes it.
+ *
  * @param handle     from a connect function
  * @param file_name  terminated
  * @return 1, or 0 for an unknown handle

@@ -5,8 +5,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
+#include <cstdlib>
+#include <memory>
 #include <utility>
 
 #include "platform/posix/file_descriptor.h"
@@ -14,52 +15,68 @@
 namespace kral {
 namespace {
 
-constexpr size_t kPieceSize = 65536;
 constexpr int kNameAttempts = 64;
 
 std::error_code LastError() {
   return {errno, std::generic_category()};
 }
 
-// Without waiting: the opening of a pipe would last until somebody writes into it. What /proc has is ordinary too.
-std::error_code OpenOrdinary(const std::string& path, FileDescriptor& file) {
-  FileDescriptor opened(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+bool IsOrdinary(mode_t mode) {
+  return S_ISREG(mode);
+}
+
+bool TakesLines(mode_t mode) {
+  return S_ISREG(mode) || S_ISCHR(mode) || S_ISFIFO(mode);
+}
+
+std::error_code KindError(mode_t mode) {
+  return std::make_error_code(S_ISDIR(mode) ? std::errc::is_a_directory : std::errc::invalid_argument);
+}
+
+// Without waiting: the opening of a pipe would last until somebody comes to its other end. What /proc has is ordinary
+// too.
+std::error_code OpenIf(bool (*is_wanted)(mode_t mode), const std::string& path, int flags, FileDescriptor& file) {
+  FileDescriptor opened(::open(path.c_str(), flags | O_NONBLOCK | O_NOCTTY | O_CLOEXEC, 0666));
   struct stat status {};
   if (!opened.valid() || ::fstat(opened.get(), &status) != 0) return LastError();
-  if (S_ISDIR(status.st_mode)) return std::make_error_code(std::errc::is_a_directory);
-  if (!S_ISREG(status.st_mode)) return std::make_error_code(std::errc::invalid_argument);
+  if (!is_wanted(status.st_mode)) return KindError(status.st_mode);
+  if (::fcntl(opened.get(), F_SETFL, 0) != 0) return LastError();
   file = std::move(opened);
+  return {};
+}
+
+std::FILE* OpenStream(bool (*is_wanted)(mode_t mode), const std::string& path, int flags) {
+  FileDescriptor file;
+  if (OpenIf(is_wanted, path, flags, file)) return nullptr;
+  std::FILE* stream = ::fdopen(file.get(), (flags & O_ACCMODE) == O_RDONLY ? "rb" : "wb");
+  if (stream != nullptr) file.Release();
+  return stream;
+}
+
+// Where a new file takes the place of what a path leads to.
+std::error_code FindTarget(const std::string& path, std::string& target) {
+  struct stat status {};
+  if (::stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode)) return KindError(status.st_mode);
+  target = path;
+  if (::lstat(path.c_str(), &status) != 0 || !S_ISLNK(status.st_mode)) return {};
+  const std::unique_ptr<char, void (*)(void*)> resolved(::realpath(path.c_str(), nullptr), std::free);
+  if (!resolved) return LastError();
+  target = resolved.get();
   return {};
 }
 
 }  // namespace
 
 std::FILE* OpenToRead(const std::string& path) {
-  FileDescriptor file;
-  if (OpenOrdinary(path, file)) return nullptr;
-  std::FILE* stream = ::fdopen(file.get(), "rb");
-  if (stream != nullptr) file.Release();
-  return stream;
+  return OpenStream(IsOrdinary, path, O_RDONLY);
 }
 
-std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes) {
-  FileDescriptor file;
-  if (const auto error = OpenOrdinary(path, file)) return error;
-  limit = std::min(limit, SIZE_MAX - 1);
-  std::vector<uint8_t> content;
-  // Pieces rather than the size from stat: that is 0 for /proc, and may change meanwhile.
-  for (size_t used = 0;;) {
-    content.resize(used + std::min(kPieceSize, limit + 1 - used));
-    const ssize_t received = ::read(file.get(), content.data() + used, content.size() - used);
-    if (received < 0 && errno == EINTR) continue;
-    if (received < 0) return LastError();
-    used += static_cast<size_t>(received);
-    if (used > limit) return std::make_error_code(std::errc::file_too_large);
-    if (received > 0) continue;
-    content.resize(used);
-    bytes = std::move(content);
-    return {};
-  }
+std::FILE* OpenToWrite(const std::string& path) {
+  return OpenStream(IsOrdinary, path, O_WRONLY | O_CREAT | O_TRUNC);
+}
+
+std::FILE* OpenToWriteText(const std::string& path) {
+  return OpenStream(TakesLines, path, O_WRONLY | O_CREAT | O_TRUNC);
 }
 
 struct FileReader::State {
@@ -70,11 +87,11 @@ struct FileReader::State {
 FileReader::FileReader() : state_(std::make_unique<State>()) {}
 FileReader::~FileReader() = default;
 
-std::error_code FileReader::Open(const std::string& path) {
+std::error_code FileReader::Open(const std::string& path, Others) {
   Close();
   FileDescriptor file;
   struct stat status {};
-  if (const auto error = OpenOrdinary(path, file)) return error;
+  if (const auto error = OpenIf(IsOrdinary, path, O_RDONLY, file)) return error;
   if (::fstat(file.get(), &status) != 0) return LastError();
   state_->file = std::move(file);
   state_->size = static_cast<uint64_t>(status.st_size);
@@ -83,6 +100,10 @@ std::error_code FileReader::Open(const std::string& path) {
 
 void FileReader::Close() {
   *state_ = State();
+}
+
+std::error_code FileReader::Seek(uint64_t offset) {
+  return ::lseek(state_->file.get(), static_cast<off_t>(offset), SEEK_SET) < 0 ? LastError() : std::error_code();
 }
 
 std::error_code FileReader::Read(std::span<uint8_t> buffer, size_t& count) {
@@ -117,10 +138,10 @@ AtomicFile::~AtomicFile() {
 std::error_code AtomicFile::Open(const std::string& path) {
   if (state_->file.valid()) return std::make_error_code(std::errc::device_or_resource_busy);
   State& state = *state_;
-  state.failed = {};
-  state.path = path;
+  state.failed = FindTarget(path, state.path);
+  if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
-    state.temporary = path + "." + std::to_string(::getpid()) + "." + std::to_string(attempt) + ".tmp";
+    state.temporary = state.path + "." + std::to_string(::getpid()) + "." + std::to_string(attempt) + ".tmp";
     state.file = FileDescriptor(::open(state.temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666));
     if (state.file.valid()) return {};
     if (errno != EEXIST) break;
@@ -150,13 +171,6 @@ std::error_code AtomicFile::Commit() {
   if (::rename(state.temporary.c_str(), state.path.c_str()) != 0) return state.failed = LastError();
   state.file = FileDescriptor();
   return {};
-}
-
-std::error_code ReplaceWholeFile(const std::string& path, std::span<const uint8_t> bytes) {
-  AtomicFile file;
-  if (const auto error = file.Open(path)) return error;
-  if (const auto error = file.Write(bytes)) return error;
-  return file.Commit();
 }
 
 }  // namespace kral

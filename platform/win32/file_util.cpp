@@ -1,67 +1,116 @@
 // Whole files on Windows. Names are in the system's ANSI code page, as callers pass them.
 #include "platform/file_util.h"
 
+#include <fcntl.h>
+#include <io.h>
 #include <windows.h>
 
 #include <algorithm>
+#include <array>
+#include <cstring>
+#include <string_view>
 #include <utility>
 
+#include "platform/win32/last_error.h"
 #include "platform/win32/win_handle.h"
 
 namespace kral {
 namespace {
 
-constexpr size_t kPieceSize = 65536;
 constexpr int kNameAttempts = 64;
 constexpr size_t kLargestPiece = 1u << 24;
+constexpr DWORD kShareAll = FILE_SHARE_READ | FILE_SHARE_WRITE;
 
-std::error_code LastError() {
-  switch (::GetLastError()) {
-    case ERROR_FILE_NOT_FOUND:
-    case ERROR_PATH_NOT_FOUND:
-    case ERROR_INVALID_NAME:
-      return std::make_error_code(std::errc::no_such_file_or_directory);
-    case ERROR_ACCESS_DENIED:
-    case ERROR_WRITE_PROTECT:
-      return std::make_error_code(std::errc::permission_denied);
-    case ERROR_SHARING_VIOLATION:
-    case ERROR_LOCK_VIOLATION:
-      return std::make_error_code(std::errc::device_or_resource_busy);
-    case ERROR_DISK_FULL:
-    case ERROR_HANDLE_DISK_FULL:
-      return std::make_error_code(std::errc::no_space_on_device);
-    case ERROR_FILE_EXISTS:
-    case ERROR_ALREADY_EXISTS:
-      return std::make_error_code(std::errc::file_exists);
-    default:
-      return std::make_error_code(std::errc::io_error);
-  }
+bool IsOrdinary(HANDLE file) {
+  return ::GetFileType(file) == FILE_TYPE_DISK;
+}
+
+bool TakesLines(HANDLE file) {
+  return ::GetFileType(file) != FILE_TYPE_UNKNOWN;
+}
+
+struct Opening {
+  DWORD access;
+  DWORD sharing;
+  DWORD creation;
+};
+
+// Devices have names as files have: CON, NUL, COM7, on many systems NUL.txt too.
+std::error_code OpenIf(bool (*is_wanted)(HANDLE file), const std::string& path, const Opening& how, WinHandle& file) {
+  WinHandle opened(
+      ::CreateFileA(path.c_str(), how.access, how.sharing, nullptr, how.creation, FILE_ATTRIBUTE_NORMAL, nullptr));
+  if (!opened.valid()) return LastError();
+  if (!is_wanted(opened.get())) return std::make_error_code(std::errc::invalid_argument);
+  file = std::move(opened);
+  return {};
+}
+
+// Hands the file over to the C library. `flags` as it takes them: text mode, or binary.
+std::FILE* MakeStream(WinHandle file, int flags, const char* mode) {
+  const int descriptor = ::_open_osfhandle(reinterpret_cast<intptr_t>(file.get()), flags);
+  if (descriptor < 0) return nullptr;
+  file.Release();
+  std::FILE* stream = ::_fdopen(descriptor, mode);
+  if (stream == nullptr) ::_close(descriptor);
+  return stream;
+}
+
+// Emptied only when it is known to be what is wanted.
+std::FILE* OpenEmptied(bool (*is_wanted)(HANDLE file), const std::string& path, int flags, const char* mode) {
+  WinHandle file;
+  if (OpenIf(is_wanted, path, {GENERIC_WRITE, kShareAll, OPEN_ALWAYS}, file)) return nullptr;
+  if (IsOrdinary(file.get()) && !::SetEndOfFile(file.get())) return nullptr;
+  return MakeStream(std::move(file), flags, mode);
+}
+
+// The name behind "\\.\"; empty for files. Nothing is opened.
+std::string DeviceName(const std::string& path) {
+  constexpr std::string_view kDevices = "\\\\.\\";
+  std::array<char, MAX_PATH> full{};
+  const DWORD length = ::GetFullPathNameA(path.c_str(), static_cast<DWORD>(full.size()), full.data(), nullptr);
+  if (length >= full.size() || !std::string_view(full.data(), length).starts_with(kDevices)) return {};
+  return full.data() + kDevices.size();
+}
+
+// What a link leads to.
+std::error_code Resolve(const std::string& path, std::string& target) {
+  const WinHandle file(::CreateFileA(path.c_str(), 0, kShareAll | FILE_SHARE_DELETE, nullptr, OPEN_EXISTING,
+                                     FILE_ATTRIBUTE_NORMAL, nullptr));
+  std::array<char, 4 * MAX_PATH> full{};
+  const auto room = static_cast<DWORD>(full.size());
+  const DWORD length = file.valid() ? ::GetFinalPathNameByHandleA(file.get(), full.data(), room, 0) : 0;
+  if (length == 0) return LastError();
+  if (length >= room) return std::make_error_code(std::errc::filename_too_long);
+  target.assign(full.data(), length);
+  return {};
+}
+
+// Where a new file takes the place of what a path leads to.
+std::error_code FindTarget(const std::string& path, std::string& target) {
+  if (!DeviceName(path).empty()) return std::make_error_code(std::errc::invalid_argument);
+  target = path;
+  const DWORD attributes = ::GetFileAttributesA(path.c_str());
+  if (attributes == INVALID_FILE_ATTRIBUTES) return {};
+  if ((attributes & FILE_ATTRIBUTE_DIRECTORY) != 0) return std::make_error_code(std::errc::is_a_directory);
+  return (attributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0 ? Resolve(path, target) : std::error_code();
 }
 
 }  // namespace
 
 std::FILE* OpenToRead(const std::string& path) {
-  return std::fopen(path.c_str(), "rb");
+  WinHandle file;
+  if (OpenIf(IsOrdinary, path, {GENERIC_READ, kShareAll, OPEN_EXISTING}, file)) return nullptr;
+  return MakeStream(std::move(file), _O_RDONLY | _O_BINARY, "rb");
 }
 
-std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes) {
-  const WinHandle file(::CreateFileA(path.c_str(), GENERIC_READ, FILE_SHARE_READ | FILE_SHARE_WRITE, nullptr,
-                                     OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
-  if (!file.valid()) return LastError();
-  limit = std::min(limit, SIZE_MAX - 1);
-  std::vector<uint8_t> content;
-  for (size_t used = 0;;) {
-    content.resize(used + std::min(kPieceSize, limit + 1 - used));
-    DWORD received = 0;
-    const auto room = static_cast<DWORD>(content.size() - used);
-    if (!::ReadFile(file.get(), content.data() + used, room, &received, nullptr)) return LastError();
-    used += received;
-    if (used > limit) return std::make_error_code(std::errc::file_too_large);
-    if (received > 0) continue;
-    content.resize(used);
-    bytes = std::move(content);
-    return {};
-  }
+std::FILE* OpenToWrite(const std::string& path) {
+  return OpenEmptied(IsOrdinary, path, _O_BINARY, "wb");
+}
+
+std::FILE* OpenToWriteText(const std::string& path) {
+  // Only one may have a COM port open, and a handset may be behind it.
+  if (::_strnicmp(DeviceName(path).c_str(), "COM", 3) == 0) return nullptr;
+  return OpenEmptied(TakesLines, path, _O_TEXT, "w");
 }
 
 struct FileReader::State {
@@ -72,15 +121,13 @@ struct FileReader::State {
 FileReader::FileReader() : state_(std::make_unique<State>()) {}
 FileReader::~FileReader() = default;
 
-std::error_code FileReader::Open(const std::string& path) {
+std::error_code FileReader::Open(const std::string& path, Others others) {
   Close();
-  WinHandle file(::CreateFileA(path.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
-                               FILE_ATTRIBUTE_NORMAL, nullptr));
-  if (!file.valid()) return LastError();
+  const DWORD sharing = others == Others::kMayWrite ? kShareAll : FILE_SHARE_READ;
+  WinHandle file;
   LARGE_INTEGER size{};
-  if (::GetFileType(file.get()) != FILE_TYPE_DISK || !::GetFileSizeEx(file.get(), &size)) {
-    return std::make_error_code(std::errc::invalid_argument);
-  }
+  if (const auto error = OpenIf(IsOrdinary, path, {GENERIC_READ, sharing, OPEN_EXISTING}, file)) return error;
+  if (!::GetFileSizeEx(file.get(), &size)) return LastError();
   state_->file = std::move(file);
   state_->size = static_cast<uint64_t>(size.QuadPart);
   return {};
@@ -88,6 +135,12 @@ std::error_code FileReader::Open(const std::string& path) {
 
 void FileReader::Close() {
   *state_ = State();
+}
+
+std::error_code FileReader::Seek(uint64_t offset) {
+  LARGE_INTEGER place{};
+  place.QuadPart = static_cast<LONGLONG>(offset);
+  return ::SetFilePointerEx(state_->file.get(), place, nullptr, FILE_BEGIN) ? std::error_code() : LastError();
 }
 
 std::error_code FileReader::Read(std::span<uint8_t> buffer, size_t& count) {
@@ -124,10 +177,11 @@ AtomicFile::~AtomicFile() {
 std::error_code AtomicFile::Open(const std::string& path) {
   State& state = *state_;
   if (state.file.valid()) return std::make_error_code(std::errc::device_or_resource_busy);
-  state.failed = {};
-  state.path = path;
+  state.failed = FindTarget(path, state.path);
+  if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
-    state.temporary = path + "." + std::to_string(::GetCurrentProcessId()) + "." + std::to_string(attempt) + ".tmp";
+    state.temporary =
+        state.path + "." + std::to_string(::GetCurrentProcessId()) + "." + std::to_string(attempt) + ".tmp";
     state.file = WinHandle(
         ::CreateFileA(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (state.file.valid()) return {};
@@ -164,13 +218,6 @@ std::error_code AtomicFile::Commit() {
   state.failed = LastError();
   ::DeleteFileA(state.temporary.c_str());
   return state.failed;
-}
-
-std::error_code ReplaceWholeFile(const std::string& path, std::span<const uint8_t> bytes) {
-  AtomicFile file;
-  if (const auto error = file.Open(path)) return error;
-  if (const auto error = file.Write(bytes)) return error;
-  return file.Commit();
 }
 
 }  // namespace kral

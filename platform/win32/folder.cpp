@@ -6,29 +6,14 @@
 #include <algorithm>
 #include <memory>
 
+#include "platform/win32/last_error.h"
+
 namespace kral {
 namespace {
 
 struct CloseSearch {
   void operator()(void* search) const { ::FindClose(search); }
 };
-
-std::error_code LastError() {
-  switch (::GetLastError()) {
-    case ERROR_FILE_NOT_FOUND:
-    case ERROR_PATH_NOT_FOUND:
-    case ERROR_INVALID_NAME:
-    case ERROR_DIRECTORY:
-      return std::make_error_code(std::errc::no_such_file_or_directory);
-    case ERROR_ACCESS_DENIED:
-    case ERROR_WRITE_PROTECT:
-      return std::make_error_code(std::errc::permission_denied);
-    case ERROR_ALREADY_EXISTS:
-      return std::make_error_code(std::errc::file_exists);
-    default:
-      return std::make_error_code(std::errc::io_error);
-  }
-}
 
 LocalFile FileOf(DWORD attributes, DWORD size_high, DWORD size_low) {
   if ((attributes & FILE_ATTRIBUTE_DIRECTORY) != 0) return {LocalKind::kFolder};

@@ -25,6 +25,7 @@ class WinHandle {
 
   HANDLE get() const { return handle_; }
   bool valid() const { return handle_ != nullptr; }
+  HANDLE Release() { return std::exchange(handle_, nullptr); }  // to another owner
 
  private:
   HANDLE handle_ = nullptr;

@@ -108,7 +108,7 @@ TEST(AtomicFileTest, TwoWritersOfOneTargetDoNotMix) {
 TEST(AtomicFileTest, ATargetThatCannotBeReplacedStaysAndLeavesNoRest) {
   const test::TempFolder folder;
   std::filesystem::create_directories(folder.Path("target/inner"));
-  EXPECT_TRUE(ReplaceWholeFile(folder.Path("target"), Of("text")));
+  EXPECT_EQ(ReplaceWholeFile(folder.Path("target"), Of("text")), std::errc::is_a_directory);
   EXPECT_EQ(FilesIn(folder.Path("")), 1u);
   EXPECT_EQ(ReplaceWholeFile(folder.Path("none/target"), Of("text")), std::errc::no_such_file_or_directory);
 }

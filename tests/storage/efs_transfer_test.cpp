@@ -298,7 +298,7 @@ TEST_F(EfsTransfer, FullHandsetIsNotWrittenTo) {
 TEST_F(EfsTransfer, ShortWritesContinueWhereTheHandsetStopped) {
   const Bytes data = RandomBytes(1000);
   handset().efs().SetWriteLimit(300);
-  EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 1000, "/f"), 1);
+  EXPECT_EQ(KRAL_EfsWrite(handle(), folder_.Add("local", Text(data)).c_str(), "/f"), 1);
   EXPECT_EQ(handset().efs().File("/f"), data);
   EXPECT_EQ(RequestsOf(5).size(), 4u);
   handset().efs().SetWriteLimit(0);

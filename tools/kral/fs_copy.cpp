@@ -20,6 +20,10 @@ constexpr std::uint64_t kLargestFile = 256u << 20;  // more than handsets hold; 
 
 Bytes ReadLocal(const std::string& path) {
   Bytes bytes;
+  if (LookAt(path).kind == LocalKind::kOther) {
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no ordinary file", path),
+                    "write what comes from pipes and devices into a file first");
+  }
   if (const auto error = ReadWholeFile(path, kLargestFile, bytes)) {
     throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read: {}", path, error.message()),
                     fmt::format("check the name and its permissions; a file may have {}", SizeText(kLargestFile)));

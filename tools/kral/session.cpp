@@ -9,6 +9,7 @@
 #include <cstdio>
 #include <memory>
 
+#include "platform/file_util.h"
 #include "platform/port_list.h"
 #include "tools/kral/error_lines.h"
 #include "tools/kral/exit_codes.h"
@@ -57,12 +58,10 @@ std::uint16_t TheOnlyPort(Expected expected) {
 }
 
 // An unwritable log is noticed here: the library drops the lines of a file that it cannot open without a word.
-void CheckLogFile(const std::string& name) {
-  const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(name.c_str(), "w"), std::fclose);
-  if (!file) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("the log file {} cannot be written", name),
-                    "check folder and permissions of the file named by --log");
-  }
+std::shared_ptr<std::FILE> OpenLogFile(const std::string& name) {
+  if (std::FILE* const file = OpenToWriteText(name)) return {file, std::fclose};
+  throw ToolError(ExitCode::kBadFile, fmt::format("the log file {} cannot be written", name),
+                  "check folder and permissions of the file named by --log; a pipe must have its reader already");
 }
 
 // The state when it stands in the way of every request; nothing when the port is open, or closed by a time-out only.
@@ -132,7 +131,7 @@ std::vector<std::uint16_t> ListPortsWithHandset() {
 }
 
 Session::Session(const SessionOptions& options, Expected expected) : port_(0), handle_(0) {
-  if (!options.log_file.empty()) CheckLogFile(options.log_file);
+  if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(kWakeOnData);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
   ThrowIfInterrupted();

@@ -3,6 +3,8 @@
 #define KRAL_TOOLS_SESSION_H
 
 #include <cstdint>
+#include <cstdio>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -67,6 +69,7 @@ class Session {
   std::uint16_t port_;
   KRAL_HANDLE handle_;
   bool answers_ = false;
+  std::shared_ptr<std::FILE> log_file_;  // the library has its own; the reader of a pipe must not see its end before
 };
 
 }  // namespace kral::tool

@@ -1,29 +1,82 @@
-// Names of pipes, at which the opening of a file would wait for somebody who writes.
-#include <gtest/gtest.h>
-
-#include <cstdlib>
-
-#include "kral/kral.h"
+// What only looks like a file: pipes, at which an opening would wait for somebody on the other side, devices and links.
 #include "platform/file_util.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <array>
+#include <filesystem>
+
+#include "frame/base/text_log.h"
+#include "platform/posix/file_descriptor.h"
+#include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"
+#include "transport/capture_reader.h"
+#include "transport/capture_writer.h"
 
 namespace kral {
 namespace {
 
-TEST(Pipes, AreNoFilesAndNeverWaitedFor) {
-  const test::TempFolder folder;
-  const std::string pipe = folder.Path("pipe");
-  ASSERT_EQ(std::system(("mkfifo '" + pipe + "'").c_str()), 0);
+class Pipes : public test::EfsTest {
+ protected:
+  void SetUp() override {
+    EfsTest::SetUp();
+    ASSERT_EQ(::mkfifo(pipe_.c_str(), 0600), 0);
+  }
+
+  test::TempFolder folder_;
+  const std::string pipe_ = folder_.Path("pipe");
+};
+
+TEST_F(Pipes, AreNoFilesAndNeverWaitedFor) {
   for (const uint32_t format : {KRAL_IMAGE_FORMAT_BY_CONTENT, KRAL_IMAGE_FORMAT_HEX, KRAL_IMAGE_FORMAT_BINARY}) {
     KRAL_IMAGE_INFO info{};
     uint32_t result = 77;
-    EXPECT_EQ(KRAL_IMAGE_GetInfo(pipe.c_str(), format, &info, &result), 0);
+    EXPECT_EQ(KRAL_IMAGE_GetInfo(pipe_.c_str(), format, &info, &result), 0);
     EXPECT_EQ(result, KRAL_STREAM_FILE_NOT_OPENED) << format;
   }
   std::vector<uint8_t> bytes;
-  EXPECT_EQ(ReadWholeFile(pipe, 100, bytes), std::errc::invalid_argument);
+  EXPECT_EQ(ReadWholeFile(pipe_, 100, bytes), std::errc::invalid_argument);
   EXPECT_FALSE(ReadWholeFile("/proc/self/status", 1 << 16, bytes)) << "a file without a size";
   EXPECT_FALSE(bytes.empty());
+  EXPECT_EQ(KRAL_EfsWrite(handle(), pipe_.c_str(), "/file"), 0);
+  EXPECT_FALSE(OpenCaptureSource(pipe_));
+  EXPECT_FALSE(OpenCaptureFile(pipe_));
+}
+
+TEST_F(Pipes, TakeTheTextLogOnceSomebodyReads) {
+  DataLogFileHandler log;
+  log.Start(pipe_.c_str());
+  log.WriteLine(kLogErr, "lost");
+  const FileDescriptor reader(::open(pipe_.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  EXPECT_FALSE(OpenToWrite(pipe_)) << "not even now";
+  log.WriteLine(kLogErr, "text");
+  std::array<char, 100> read{};
+  ASSERT_GT(::read(reader.get(), read.data(), read.size() - 1), 0);
+  EXPECT_STREQ(read.data() + 10, ",LOG_ERR,text\n");
+  log.Start("/dev/full");
+  log.WriteLine(kLogErr, "a device that takes nothing");
+}
+
+TEST_F(Pipes, DevicesAndFoldersAreNotReplacedAndLinksLeadToWhatIs) {
+  std::filesystem::create_symlink("missing", folder_.Path("broken"));
+  const struct {
+    std::string path;
+    std::errc error;
+  } kRows[] = {{pipe_, std::errc::invalid_argument},
+               {"/dev/null", std::errc::invalid_argument},
+               {folder_.Path(""), std::errc::is_a_directory},
+               {folder_.Path("broken"), std::errc::no_such_file_or_directory}};
+  for (const auto& row : kRows) EXPECT_EQ(AtomicFile().Open(row.path), row.error) << row.path;
+
+  std::filesystem::create_directory(folder_.Path("inner"));
+  folder_.Add("inner/target", "old");
+  std::filesystem::create_symlink("inner/target", folder_.Path("link"));
+  const std::vector<uint8_t> text = {'n', 'e', 'w'};
+  EXPECT_FALSE(ReplaceWholeFile(folder_.Path("link"), text));
+  EXPECT_TRUE(std::filesystem::is_symlink(folder_.Path("link")));
+  EXPECT_EQ(folder_.Content("inner/target"), "new");
 }
 
 }  // namespace

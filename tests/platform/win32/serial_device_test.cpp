@@ -7,10 +7,12 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdlib>
+#include <string>
 #include <thread>
 #include <vector>
 
 #include "platform/environment.h"
+#include "platform/file_util.h"
 #include "platform/port_list.h"
 
 namespace kral {
@@ -108,6 +110,7 @@ TEST_F(ComPortTest, ThePortIsListedAndOpensAgainAfterAClose) {
   ASSERT_TRUE(ListComPorts(ports));
   EXPECT_NE(std::find(ports.begin(), ports.end(), number_), ports.end());
   port_.reset();
+  EXPECT_EQ(OpenToWriteText("COM" + std::to_string(number_)), nullptr) << "lines of a log do not go to a handset";
   DeviceResult result;
   EXPECT_TRUE(OpenComPort(number_, result)) << result.text;
 }

@@ -1,4 +1,4 @@
-// Registry, window messages and processes of Windows.
+// Registry, window messages, processes, and names of devices, of Windows.
 #include <gtest/gtest.h>
 #include <windows.h>
 
@@ -7,10 +7,12 @@
 #include <string>
 #include <vector>
 
+#include "platform/file_util.h"
 #include "platform/message_pump.h"
 #include "platform/named_mutex.h"
 #include "platform/port_list.h"
 #include "platform/process.h"
+#include "platform/pseudo_terminal.h"
 #include "storage/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
@@ -97,6 +99,26 @@ TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
   EXPECT_EQ(exit_code, static_cast<DWORD>(STILL_ACTIVE));
   ::CloseHandle(process.hThread);
   ::CloseHandle(process.hProcess);
+}
+
+TEST(DeviceNames, AreNoFilesAndTheNullDeviceTakesLines) {
+  std::vector<uint8_t> bytes;
+  EXPECT_EQ(ReadWholeFile("NUL", 100, bytes), std::errc::invalid_argument);
+  EXPECT_EQ(OpenToRead("NUL"), nullptr);
+  EXPECT_EQ(OpenToWrite("NUL"), nullptr);
+  for (const char* name : {"NUL", "COM7", "\\\\.\\COM7"}) {
+    EXPECT_EQ(AtomicFile().Open(name), std::errc::invalid_argument) << name;
+  }
+  std::FILE* const file = OpenToWriteText("NUL");
+  ASSERT_NE(file, nullptr);
+  EXPECT_GE(std::fputs("text\n", file), 0);
+  EXPECT_EQ(std::fclose(file), 0);
+}
+
+TEST(PseudoTerminalTest, ThereIsNoneAndTheReasonIsTold) {
+  std::string error;
+  EXPECT_FALSE(OpenPseudoTerminal(error));
+  EXPECT_NE(error, "");
 }
 
 TEST(StationSwitchTest, ARegistryKeyChoosesTheWriterOfBackups) {
