@@ -1,3 +1,4 @@
+// The blocks of bytes that are searched at once, one by one.
 #include "transport/byte_block.h"
 
 #include <gtest/gtest.h>

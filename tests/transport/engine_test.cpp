@@ -179,19 +179,6 @@ TEST_F(Engine, FailedWriteClosesThePort) {
                                             "4 CKralThreadInterface::SendSync = result = 0"}));
 }
 
-TEST_F(Engine, NullPortConnectsAndSkipsEveryRequest) {
-  ASSERT_TRUE(engine_->transport.Open(kNullPort, wire_.AsUserTransport(), engine_->shared_from_this()))
-      << "also with a caller's functions";
-  EXPECT_TRUE(engine_->transport.connected());
-  engine_->log.Take();
-  EXPECT_FALSE(Ask({75}).succeeded);
-  EXPECT_EQ(EngineLines(), (LogLines::Lines{"1 SEND (1 bytes):4B ", "16 Send Sync skipped for NULL port"}));
-  EXPECT_FALSE(AskRaw({75}).succeeded);
-  EXPECT_FALSE(engine_->transport.SendASync(Bytes{75}, 0, false));
-  EXPECT_TRUE(wire_.Written().empty());
-  EXPECT_EQ(wire_.reads(), 0u);
-}
-
 TEST_F(Engine, RawTakesWhateverComesFirstWithItsFcsBytes) {
   Open();
   AnswerWith({19, 1});

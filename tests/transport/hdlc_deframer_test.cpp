@@ -1,3 +1,4 @@
+// What becomes of a stream: which frames are delivered, which are dropped, and what is said of them.
 #include "transport/hdlc_deframer.h"
 
 #include <gtest/gtest.h>
@@ -50,60 +51,18 @@ TEST_F(HdlcDeframerTest, IntactAnswerIsDeliveredWithItsFcsAndLogged) {
   EXPECT_EQ(lines_.Take(), (Lines{"1 SYNC REC (4 bytes): 7E 7D F1 CD "}));
 }
 
-TEST_F(HdlcDeframerTest, AnyFlippedBitDropsTheAnswer) {
-  const Bytes body = WithFcs({0x0C, 0x01, 0x02, 0x03});
-  for (size_t bit = 0; bit < body.size() * 8; ++bit) {
-    Bytes bad = body;
-    bad[bit / 8] = static_cast<uint8_t>(bad[bit / 8] ^ (1U << (bit % 8)));
-    Bytes frame = test::Stuffed(bad);
-    frame.push_back(0x7E);
-    EXPECT_TRUE(Feed(frame).empty()) << "bit " << bit;
-    const Lines lines = lines_.Take();
-    ASSERT_EQ(lines.size(), 1U);
-    EXPECT_EQ(lines[0].substr(0, 29), "16 ERROR SYNC REC (6 bytes): ");
-  }
-  EXPECT_EQ(deframer_.bad_fcs(), body.size() * 8);
-  EXPECT_EQ(Feed(PlainFrame({0x0C})), (Packets{WithFcs({0x0C})})) << "one corrupt frame costs only itself";
-}
-
 TEST_F(HdlcDeframerTest, FirstByteDecidesWhetherTheFcsIsChecked) {
   for (unsigned code = 0; code < 256; ++code) {
     const Bytes bad = {static_cast<uint8_t>(code), 0x01, 0x02, 0xAA, 0xBB};
     const Bytes frame = Joined({test::Stuffed(bad), {0x7E}});
     const bool unchecked = code == 16 || code == 31 || code == 96 || code == 121;
     EXPECT_EQ(Feed(frame), unchecked ? Packets{bad} : Packets{}) << code;
-    EXPECT_EQ(lines_.Take().size(), unchecked || code == 146 ? 0U : 1U) << code;
+    const Lines lines = lines_.Take();
+    EXPECT_EQ(lines.size(), unchecked || code == 146 ? 0U : 1U) << code;
+    for (const auto& line : lines) EXPECT_TRUE(line.starts_with("16 ERROR SYNC REC (5 bytes): ")) << line;
   }
   EXPECT_TRUE(Feed(PlainFrame({146, 1, 2})).empty());
   EXPECT_EQ(deframer_.bad_fcs(), 251U);
-}
-
-TEST_F(HdlcDeframerTest, LeadingAndRepeatedFlagsDeliverNothing) {
-  EXPECT_TRUE(Feed(Bytes(100, 0x7E)).empty());
-  const Bytes frame = PlainFrame({0x00, 0x11});
-  EXPECT_EQ(Feed(Joined({{0x7E}, frame, Bytes(40, 0x7E), frame, {0x7E}})), Packets(2, WithFcs({0x00, 0x11})));
-  EXPECT_EQ(lines_.Take().size(), 2U);
-}
-
-TEST_F(HdlcDeframerTest, EscapeBeforeAFlagUnescapesTheNextFramesFirstByte) {
-  const Bytes body = WithFcs({0x4B, 0x01});
-  Bytes masked = body;
-  masked[0] ^= 0x20;
-  EXPECT_EQ(Feed(Joined({{0x7D, 0x7E, 0x7E}, masked, {0x7E}})), Packets{body});
-  // The frame that ends in an escape byte is whole nevertheless.
-  EXPECT_EQ(Feed(Joined({body, {0x7D, 0x7E}, masked, {0x7E}})), Packets(2, body));
-  // A repeated escape byte counts once.
-  EXPECT_EQ(Feed(Joined({{0x7D, 0x7D, 0x7D}, masked, {0x7E}})), Packets{body});
-}
-
-TEST_F(HdlcDeframerTest, FrameMayBeSplitAnywhere) {
-  const Bytes payload = {0x26, 0x7E, 0x00, 0x7D, 0x7D, 0x42, 0x5E};
-  const Bytes frame = PlainFrame(payload, true);
-  for (size_t cut = 1; cut < frame.size(); ++cut) {
-    const auto middle = frame.begin() + static_cast<ptrdiff_t>(cut);
-    EXPECT_TRUE(Feed(Bytes(frame.begin(), middle)).empty());
-    EXPECT_EQ(Feed(Bytes(middle, frame.end())), Packets{WithFcs(payload)}) << "cut at " << cut;
-  }
 }
 
 TEST_F(HdlcDeframerTest, LongestAnswerHas4093BytesAndLongestLogPacket4094) {
@@ -153,13 +112,6 @@ TEST_F(HdlcDeframerTest, DroppedPartialTakesAPendingEscapeWithIt) {
   EXPECT_EQ(Feed(PlainFrame({0x0C})), Packets{WithFcs({0x0C})});
 }
 
-TEST_F(HdlcDeframerTest, DeliversWithoutALog) {
-  deframer_.SetLogger(nullptr);
-  EXPECT_EQ(Feed(Joined({PlainFrame({0x0C}), {1, 2, 3, 0x7E}, Bytes(9000, 1), {0x7E}, Bytes(20, 0)})),
-            Packets{WithFcs({0x0C})});
-  EXPECT_TRUE(lines_.Take().empty());
-}
-
 // Streams of frames and of rubbish in chunks of any size, against the plain splitter after every chunk.
 TEST_F(HdlcDeframerTest, AgreesWithPlainCodeOnAnyStreamInAnyChunks) {
   deframer_.SetLogger(nullptr);
@@ -173,7 +125,12 @@ TEST_F(HdlcDeframerTest, AgreesWithPlainCodeOnAnyStreamInAnyChunks) {
       const size_t size = random() % 8 == 0 ? random() % 4400 : random() % 100;
       const Bytes bytes = test::RandomBytes(random, size, one_special_in);
       stream = Joined({stream, random() % 3 == 0 ? bytes : PlainFrame(bytes, random() % 2 == 0)});
-      if (random() % 10 == 0) stream.insert(stream.end(), random() % 50, 0x00);
+      if (random() % 10 == 0) stream.insert(stream.end(), random() % 50, random() % 2 == 0 ? 0x00 : 0x7E);
+      if (random() % 10 == 0) {  // an escape byte in front of a flag reaches into the next frame
+        Bytes next = PlainFrame({0x4B, 0x01});
+        next[0] ^= 0x20;
+        stream = Joined({stream, WithFcs({0x0C}), {0x7D, 0x7E}, next});
+      }
     }
     const size_t largest = size_t{1} << (random() % 13);
     for (size_t at = 0; at < stream.size();) {

@@ -1,3 +1,4 @@
+// The framer over a scripted port: writes, raw reads, and the switch from data to diagnostic mode.
 #include "transport/hdlc_framer.h"
 
 #include <gtest/gtest.h>
@@ -104,16 +105,6 @@ TEST_F(HdlcFramer, RequestGoesOutInOneWriteAndIsLogged) {
             (Lines{"64 CProtAHDLC::Send(iSize=1, iTimeout=900)", "128 CProtAHDLC::Send(_iALen=4) ... OK"}));
 }
 
-TEST_F(HdlcFramer, LeadingFlagComesFromTheSettingOrTheCallAndNeverTwice) {
-  for (const bool setting : {false, true}) {
-    framer_.SetStartFlag(setting ? 1 : 0);
-    for (const bool forced : {false, true}) {
-      Send({0x0C}, forced ? 1 : 0);
-      EXPECT_EQ(port_.sent, PlainFrame({0x0C}, setting || forced));
-    }
-  }
-}
-
 TEST_F(HdlcFramer, ShortWriteFails) {
   port_.accepts = 3;
   EXPECT_EQ(Send({0x0C}), 0U);
@@ -165,45 +156,44 @@ TEST_F(HdlcFramer, RawReadFillsTheBufferAndGivesWhatArrived) {
   EXPECT_TRUE(lines_.Take().empty());
 }
 
-TEST_F(HdlcFramer, SwitchToDiagnosticModeStopsAtTheFirstRateThatAnswers) {
-  port_.answers = {"\r\n", "O", "K\r\n"};
-  EXPECT_EQ(framer_.Data2DM(0xFF), 1U);
-  EXPECT_EQ(port_.steps, (Steps{"19200", "purge", "flag", kCommand, "57600", "purge", "flag", "purge"}));
-  EXPECT_EQ(clock_.slept(), 50U) << "settles before it reports success";
-  EXPECT_EQ(lines_.Take()[0], "64 CProtAHDLC::Data2DM(baudrate_mask=255)");
-}
-
-TEST_F(HdlcFramer, SwitchTriesEachRateTwiceForABoundedTime) {
-  EXPECT_EQ(framer_.Data2DM(0x05), 0U);
-  EXPECT_EQ(port_.steps, (Steps{"19200", "purge", "flag", kCommand, kCommand, "115200", "purge", "flag", kCommand,
-                                kCommand, "57600", "purge", "flag", "purge"}));
-  EXPECT_EQ(clock_.slept(), 4 * 200U);
+TEST_F(HdlcFramer, SwitchTriesEachRateOfItsMaskTwiceUntilOneAnswers) {
+  const Steps back{"57600", "purge", "flag", "purge"};
+  const Steps slow{"19200", "purge", "flag", kCommand}, fast{"115200", "purge", "flag", kCommand};
+  const Steps again{kCommand};
+  const std::deque<std::string> too_much{std::string(19, 'x'), std::string(4000, 'x'), "OK"};
+  const struct {
+    const char* name;
+    uint8_t mask;
+    uint32_t raw;
+    std::deque<std::string> answers;
+    int answers_from_write;
+    uint32_t succeeds;
+    std::vector<Steps> steps;
+    uint32_t slept;  // 200 per attempt that fails, 50 to settle
+  } kRows[] = {
+      {"at the first rate", 0xFF, 0, {"\r\n", "O", "K\r\n"}, 0, 1, {slow, back}, 50},
+      {"never", 0x05, 0, {}, 0, 0, {slow, again, fast, again, back}, 4 * 200},
+      {"at the second attempt", 0x04, 0, {"OK"}, 2, 1, {fast, again, back}, 200 + 50},
+      {"other bits of the mask", 0xFA, 0, {}, 0, 0, {back}, 0},
+      {"raw data, at the rate at which it asked", 0x04, 1, {"OK"}, 0, 1, {fast, {"purge", "flag", "purge"}}, 50},
+      {"an area that is full and begins empty again", 0x04, 0, too_much, 0, 1, {fast, again, back}, 50},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.name);
+    port_.steps.clear();
+    port_.answers = row.answers;
+    port_.answers_from_write = row.answers_from_write;
+    framer_.SetRawDataFlag(row.raw);
+    lines_.Take();
+    const uint32_t before = clock_.slept();
+    EXPECT_EQ(framer_.Data2DM(row.mask), row.succeeds);
+    Steps steps;
+    for (const Steps& part : row.steps) steps.insert(steps.end(), part.begin(), part.end());
+    EXPECT_EQ(port_.steps, steps);
+    EXPECT_EQ(clock_.slept() - before, row.slept);
+    EXPECT_EQ(lines_.Take()[0], "64 CProtAHDLC::Data2DM(baudrate_mask=" + std::to_string(row.mask) + ")");
+  }
   EXPECT_EQ(port_.largest_read, 20U);
-}
-
-TEST_F(HdlcFramer, SwitchMayNeedTheSecondAttempt) {
-  port_.answers = {"OK"};
-  port_.answers_from_write = 2;
-  EXPECT_EQ(framer_.Data2DM(0x04), 1U);
-  EXPECT_EQ(port_.steps, (Steps{"115200", "purge", "flag", kCommand, kCommand, "57600", "purge", "flag", "purge"}));
-}
-
-TEST_F(HdlcFramer, SwitchIgnoresOtherBitsOfItsMask) {
-  EXPECT_EQ(framer_.Data2DM(0xFA), 0U);
-  EXPECT_EQ(port_.steps, (Steps{"57600", "purge", "flag", "purge"}));
-}
-
-TEST_F(HdlcFramer, SwitchWithRawDataLeavesTheRateAtWhichItAsked) {
-  framer_.SetRawDataFlag(1);
-  port_.answers = {"OK"};
-  EXPECT_EQ(framer_.Data2DM(0x04), 1U);
-  EXPECT_EQ(port_.steps, (Steps{"115200", "purge", "flag", kCommand, "purge", "flag", "purge"}));
-}
-
-TEST_F(HdlcFramer, SwitchReadsNoFurtherThanItsAreaWhateverThePortClaims) {
-  port_.answers = {std::string(19, 'x'), std::string(4000, 'x'), "OK"};
-  EXPECT_EQ(framer_.Data2DM(0x04), 1U) << "the second attempt begins with an empty area";
-  EXPECT_EQ(clock_.slept(), 50U);
 }
 
 }  // namespace

@@ -168,15 +168,6 @@ TEST(ReceiveThread, FailedOpenLeavesThePortClosedAndSaysSo) {
   }
 }
 
-TEST(ReceiveThread, TransportWithoutAllThreeFunctionsIsRefused) {
-  TestWire wire;
-  EngineGuard engine(EngineBundle::Make());
-  UserTransport user = wire.AsUserTransport();
-  user.flush = nullptr;
-  EXPECT_FALSE(engine->OpenUser(user));
-  EXPECT_TRUE(engine->OpenUser(wire.AsUserTransport()));
-}
-
 TEST(ReceiveThread, BlockedReceiveFunctionBoundsTheStopAndTheThreadEndsLater) {
   TestWire wire;
   auto bundle = EngineBundle::Make();

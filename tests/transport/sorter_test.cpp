@@ -76,20 +76,6 @@ TEST_F(Sorter, TakesPacketsOf2To4096Bytes) {
   EXPECT_EQ(Counts(), (Sorted{2, 0, 0}));
 }
 
-TEST_F(Sorter, RawCallbackSeesEveryPacketWithTheCallersValue) {
-  std::vector<Packet> seen;
-  const auto callback = [](uint32_t length, const uint8_t* bytes, uintptr_t value) {
-    reinterpret_cast<std::vector<Packet>*>(value)->emplace_back(bytes, bytes + length);
-  };
-  sorter_.SetRawPacketCallback(callback, reinterpret_cast<uintptr_t>(&seen));
-  sorter_.OnPacket(Packet{16, 1});  // dropped, but seen
-  sorter_.OnPacket(Packet{1});      // too short to be one
-  sorter_.OnPacket(Packet{0, 2});
-  sorter_.SetRawPacketCallback(nullptr, 0);
-  sorter_.OnPacket(Packet{0, 3});
-  EXPECT_EQ(seen, (std::vector<Packet>{{16, 1}, {0, 2}}));
-}
-
 TEST_F(Sorter, ClaimedReportIsAResponseWhateverTheCollection) {
   class Claimer final : public EventHandler {
    public:
