@@ -20,8 +20,7 @@ using handset::FromHex;
 using handset::HexText;
 using handset::When;
 
-// --- Rows
-// -------------------------------------------------------------------------------------------------------------
+// --- Rows -----------------------------------------------------------------------------------------------------------
 
 // What a call left in its outputs, which begin as 0xCC throughout.
 class Outputs {
@@ -197,19 +196,6 @@ TEST_F(CoreDiag, RefusedRequestGivesZeroAndLeavesOutputsUntouched) {
   }
 }
 
-TEST_F(CoreDiag, UnknownHandleGivesZeroAndNoTraffic) {
-  const auto before = handset().request_count();
-  for (const Row& row : Rows()) {
-    SCOPED_TRACE(row.name);
-    for (const KRAL_HANDLE unknown : {KRAL_HANDLE{0}, handle() + 1}) {
-      Outputs outputs;
-      EXPECT_EQ(row.call(unknown, outputs), 0);
-      EXPECT_TRUE(outputs.untouched()) << outputs.text();
-    }
-  }
-  EXPECT_EQ(handset().request_count(), before);
-}
-
 TEST_F(CoreDiag, ReplyTooShortForItsFieldsGivesZero) {
   const std::array<std::pair<const char*, const char*>, 5> cut{{
       {"KRAL_DIAG_MEMORY_PEEK_F", "02 DE AD BE"},
@@ -268,8 +254,7 @@ TEST_F(CoreDiag, PokeBeyondThePacketBufferIsSentCut) {
   EXPECT_EQ(status, 0xCC);
 }
 
-// --- Version
-// ----------------------------------------------------------------------------------------------------------
+// --- Version --------------------------------------------------------------------------------------------------------
 
 struct Version {
   std::array<char, 11> compile_date = Outputs::Untouched<std::array<char, 11>>();
@@ -356,8 +341,7 @@ TEST_F(CoreDiag, RefusedVersionLeavesOutputsUntouched) {
   EXPECT_EQ(version, Version());
 }
 
-// --- Build identity
-// ---------------------------------------------------------------------------------------------------
+// --- Build identity -------------------------------------------------------------------------------------------------
 
 struct BuildId {
   uint32_t hardware = 0xCCCCCCCC;
@@ -415,8 +399,7 @@ TEST_F(CoreDiag, LongestBuildIdentityTextFitsTheBufferAskedFor) {
   EXPECT_EQ(std::strlen(id.revision.data()), reply.size() - 12);
 }
 
-// --- Serial number
-// ----------------------------------------------------------------------------------------------------
+// --- Serial number --------------------------------------------------------------------------------------------------
 
 TEST_F(CoreDiag, SerialNumberFollowsTheNvStatus) {
   uint32_t serial = 0xCCCCCCCC;
@@ -445,8 +428,7 @@ TEST_F(CoreDiag, ApplicationProcessorTargetHasNoSerialNumber) {
   ExpectLine(0x4, "DIAG_READ_ESN() is not supported on ZTD target. Return 0xDEADBEEF ");
 }
 
-// --- Rows that do not compile
-// -----------------------------------------------------------------------------------------
+// --- Rows that do not compile ---------------------------------------------------------------------------------------
 
 template <class Row, class... Fields>
 concept Sendable = requires(Diag_FTM& phone, const Row& row, Fields... fields) {

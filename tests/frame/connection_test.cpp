@@ -11,6 +11,7 @@
 #include "handset/caller_transport.h"
 #include "kral/connection.h"
 #include "kral/text_log.h"
+#include "kral/transport.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
 
@@ -72,17 +73,6 @@ TEST_F(Connection, HandsetThatAppearsLaterIsFoundByTheLivenessCheck) {
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
 }
 
-TEST_F(Connection, HandShakeWritesTheLoopbackFrameTwice) {
-  const handset::Bytes frame = handset::FromHex("7B 00 01 02 03 04 05 06 07 08 09 9D 5F 7E");
-  handset::Bytes twice = frame;
-  twice.insert(twice.end(), frame.begin(), frame.end());
-  KRAL_ConnectServer(kPort);
-  EXPECT_TRUE(handset_.received().empty());
-  KRAL_DisconnectAllServers();
-  KRAL_ConnectServerWithHandShake(kPort);
-  EXPECT_EQ(handset_.received(), twice);
-}
-
 TEST_F(Connection, VerifyGivesZeroAndKeepsTheContextWhenThePortDoesNotOpen) {
   EXPECT_EQ(KRAL_ConnectServerWithVerify(kNoHandset), 0u);
   EXPECT_TRUE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "the failed connect still counts";
@@ -118,14 +108,15 @@ TEST_F(Connection, NullPortCountsAsConnectedAndEveryRequestFails) {
   phone.packet().Append8(0);
   test::PhoneLog log(handle);
   EXPECT_FALSE(phone.Send(phone.packet()));
-  const auto lines = log.Take();
-  EXPECT_TRUE(std::any_of(lines.begin(), lines.end(),
-                          [](const std::string& line) { return line.ends_with(" Send Sync skipped for NULL port"); }));
+  EXPECT_EQ(log.Count("16 Send Sync skipped for NULL port"), 1u);
+  const uint8_t request = 0;
+  uint16_t size = 0;
+  EXPECT_EQ(KRAL_SendASync(handle, 1, &request, 10, 0), 0);
+  EXPECT_EQ(KRAL_SendRAW(handle, 1, &request, &size, nullptr, 10), 0);
   EXPECT_TRUE(ports_.opens().empty());
 }
 
-// --- Liveness
-// ---------------------------------------------------------------------------------------------------------
+// --- Liveness -------------------------------------------------------------------------------------------------------
 
 struct Liveness {
   const char* name;
@@ -187,8 +178,7 @@ TEST_F(Connection, ApplicationTargetAsksForTheDiagnosticService) {
   EXPECT_TRUE(log.Has("1 Diag_FTM::IsDiagServiceAlive() -- pinging phone with version command, 0x4B 0x32 0x3 0x0"));
 }
 
-// --- Requests
-// ---------------------------------------------------------------------------------------------------------
+// --- Requests -------------------------------------------------------------------------------------------------------
 
 const std::pair<const char*, const char*> kRefusals[] = {
     {"13 26", "16 ERROR:\tDIAG_BAD_CMD_F (19) received, bad command"},
@@ -234,8 +224,16 @@ TEST_F(Connection, EmptyRequestFailsWithoutTraffic) {
 TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
   handset_.faults().Add(handset::Ignore(), When::Always());
   const KRAL_HANDLE handle = KRAL_ConnectServerWithHandShake(kPort);
+  EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 1);
+  EXPECT_EQ(KRAL_SetRTS_State(handle, 0), 1);
   KRAL_ConfigureTimeOut(handle, 1, 20);
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+  int32_t state = -1;
+  EXPECT_EQ(KRAL_GetPortState(handle, &state), 1);
+  EXPECT_EQ(state, KRAL_PORT_CLOSED);
+  EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 0) << "the lines do not reopen it";
+  EXPECT_EQ(KRAL_SetRTS_State(handle, 1), 0);
+  EXPECT_EQ(KRAL_FlushRxBuffer(handle), 0);
   EXPECT_FALSE(ports_.IsOpen(kPort));
   handset_.faults().Clear();
   // Late answers to the handshake would be taken for those to the requests behind it.
@@ -284,13 +282,6 @@ TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {
   EXPECT_FALSE(phone->data_to_diagnostic_search());
   EXPECT_EQ(KRAL_SetData2DiagSearch(handle, 1), 1);
   EXPECT_TRUE(phone->data_to_diagnostic_search());
-}
-
-TEST_F(Connection, CallersTransportNeedsAllItsFunctions) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer_UserDefinedTransport(200, cable_.handle_value(), cable_.context(),
-                                                                     handset::CallerTransport::Send, nullptr, nullptr);
-  EXPECT_NE(handle, 0u);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
 }
 
 TEST_F(Connection, LibraryModeChangesDoNotTouchOpenConnections) {

@@ -27,12 +27,25 @@ TEST_F(TimeOuts, HaveTheirDefaults) {
   for (uint32_t id = 0; id < 20; ++id) EXPECT_EQ(KRAL_GetTimeOut(handle, id), kDefaults[id]) << id;
 }
 
-TEST_F(TimeOuts, ServerModeHasNoDefaultsForTheTransport) {
+TEST_F(TimeOuts, ServerModeRefusesThoseOfTheTransportAndAsksTheDownloadForItsOwn) {
   test::ScriptedServer server;
   const KRAL_HANDLE handle = KRAL_ConnectServer(3);
+  const test::PhoneLog log(handle, KRAL_LOG_FN);
   for (uint32_t id = 0; id < 20; ++id) {
     EXPECT_EQ(KRAL_GetTimeOut(handle, id), id == 7 || id == 8 ? 0 : kDefaults[id]) << id;
   }
+  for (const uint32_t id : {7u, 8u}) {
+    EXPECT_EQ(KRAL_ConfigureTimeOut(handle, id, 1234), 0);
+    EXPECT_EQ(KRAL_GetTimeOut(handle, id), 1234) << "refused, and stored";
+  }
+  EXPECT_EQ(log.Count("2 KRAL_ConfigureTimeOut() - error, this timeout cannot be set in ORBT mode"), 2u);
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 0);
+  EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 20, 77), 1);
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 77);
+  EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 21, 78), 0);
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 21), 0);
+  const auto calls = server.TakeCalls();
+  EXPECT_EQ(std::count(calls.begin(), calls.end(), "make KRAL-SW Download"), 1);
 }
 
 TEST_F(TimeOuts, AreStoredPerHandset) {
@@ -53,29 +66,6 @@ TEST_F(TimeOuts, UnknownIdentifiersAreRefused) {
   }
 }
 
-TEST_F(TimeOuts, ServerModeRefusesThoseOfTheTransportAndStoresThem) {
-  test::ScriptedServer server;
-  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
-  const test::PhoneLog log(handle, KRAL_LOG_FN);
-  for (const uint32_t id : {7u, 8u}) {
-    EXPECT_EQ(KRAL_ConfigureTimeOut(handle, id, 1234), 0);
-    EXPECT_EQ(KRAL_GetTimeOut(handle, id), 1234);
-  }
-  EXPECT_EQ(log.Count("2 KRAL_ConfigureTimeOut() - error, this timeout cannot be set in ORBT mode"), 2u);
-}
-
-TEST_F(TimeOuts, SoftwareDownloadKeepsItsOwnInServerMode) {
-  test::ScriptedServer server;
-  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
-  EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 0);
-  EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 20, 77), 1);
-  EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 77);
-  EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 21, 78), 0);
-  EXPECT_EQ(KRAL_GetTimeOut(handle, 21), 0);
-  const auto calls = server.TakeCalls();
-  EXPECT_EQ(std::count(calls.begin(), calls.end(), "make KRAL-SW Download"), 1);
-}
-
 TEST_F(TimeOuts, CallsAreTold) {
   const KRAL_HANDLE handle = KRAL_ConnectServer(3);
   KRAL_StartLogging(handle, "");  // no file: only so that formatted lines are written
@@ -93,8 +83,7 @@ TEST_F(TimeOuts, CallsAreTold) {
             }));
 }
 
-// --- WLANEVKConfig.txt
-// ------------------------------------------------------------------------------------------------
+// --- WLANEVKConfig.txt ----------------------------------------------------------------------------------------------
 
 struct StationFile {
   const char* name;
