@@ -1,4 +1,4 @@
-// The virtual handset behind a connection of the library: what the fixture of the other tests promises.
+// Every fault of the virtual handset behind a connection of the library: what it costs a request, and no more.
 #include <gtest/gtest.h>
 
 #include "kral/diag.h"
@@ -7,30 +7,9 @@
 namespace kral {
 namespace {
 
-using handset::FromHex;
 using handset::When;
 
 class ConnectedHandset : public HandsetTest {};
-
-TEST_F(ConnectedHandset, IsAliveOnBothKindsOfTarget) {
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle()), 1);
-  EXPECT_EQ(handset().requests(), (std::vector<handset::Bytes>{FromHex("7B 00 01 02 03 04 05 06 07 08 09"), {0}}));
-  Connect([] { KRAL_SetTargetType(1); });
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle()), 1);
-  EXPECT_EQ(handset().requests().back(), FromHex("4B 32 03 00 00 00 00 00 00 00 00 00"));
-}
-
-TEST_F(ConnectedHandset, FollowsModelAndScript) {
-  uint32_t serial = 0;
-  EXPECT_EQ(KRAL_DIAG_READ_ESN_F(handle(), &serial), 1);
-  EXPECT_EQ(serial, handset().identity().identity().serial_number);
-  handset().Expect("2F").Reply("2F 78 56");
-  uint16_t switches = 0;
-  EXPECT_EQ(KRAL_DIAG_GET_DIPSW_F(handle(), &switches), 1);
-  EXPECT_EQ(switches, 0x5678);
-  EXPECT_TRUE(HasLine(KRAL_LOG_C_HIGH_LEVEL_START, "KRAL_DIAG_GET_DIPSW_F")) << LogText();
-  EXPECT_EQ(ErrorText(), "");
-}
 
 TEST_F(ConnectedHandset, FaultsThatCostNothingAreSurvived) {
   struct Case {
@@ -74,16 +53,6 @@ TEST_F(ConnectedHandset, FaultsThatCostTheRequestCostOnlyThatOne) {
     handset().DropOutput();
     EXPECT_EQ(KRAL_DIAG_GET_DIPSW_F(handle(), &switches), 1);
   }
-}
-
-TEST_F(ConnectedHandset, VanishesMidRequestAndComesBack) {
-  ASSERT_EQ(KRAL_ConfigureTimeOut(handle(), 0, 50), 1);
-  handset().faults().Add(handset::HangUp(), When::Nth(1));
-  uint16_t switches = 0;
-  EXPECT_EQ(KRAL_DIAG_GET_DIPSW_F(handle(), &switches), 0);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle()), 0);
-  handset().PlugIn();
-  EXPECT_EQ(KRAL_DIAG_GET_DIPSW_F(handle(), &switches), 1);
 }
 
 }  // namespace

@@ -5,7 +5,6 @@
 
 #include <thread>
 
-#include "handset/caller_transport.h"
 #include "handset/wire_modes.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_host.h"
@@ -63,25 +62,6 @@ TEST_F(Handset, AnswersEveryCoreRequest) {
   EXPECT_EQ(handset_.maintenance().backups(), 1u);
 }
 
-TEST_F(Handset, TellsItsIdentity) {
-  Identity identity;
-  identity.compile_date = "May 5";
-  identity.version_directory = "TOO-LONG-NAME";
-  identity.firmware_revision = 0xABCD;
-  identity.hardware_version = 0x11223344;
-  identity.software_revision = "S1";
-  identity.model = "M";
-  handset_.identity().Set(identity);
-  const Bytes version = FromHex(host_.Ask("00"));
-  ASSERT_EQ(version.size(), 55u);
-  EXPECT_EQ(std::string(version.begin() + 1, version.begin() + 12), "May 5      ");
-  EXPECT_EQ(std::string(version.begin() + 39, version.begin() + 47), "TOO-LONG");
-  EXPECT_EQ(GetU16(version, 50), 0xABCD);
-  EXPECT_EQ(host_.Ask("7C"), "7C 00 00 00 44 33 22 11 91 02 00 00 53 31 00 4D 00");
-  handset_.identity().SetVersionReplySize(53);
-  EXPECT_EQ(FromHex(host_.Ask("00")).size(), 53u);
-}
-
 TEST_F(Handset, RefusesWhatItCannotDo) {
   struct Row {
     const char* request;
@@ -101,30 +81,6 @@ TEST_F(Handset, RefusesWhatItCannotDo) {
        }) {
     EXPECT_EQ(host_.Ask(row.request), std::string(row.code) + " " + row.request);
   }
-}
-
-TEST_F(Handset, NvItemsHaveStatuses) {
-  const auto write = [this](std::string_view head) {
-    Bytes request = FromHex(head);
-    request.resize(3 + NvStore::kItemSize);
-    return host_.Ask(HexText(request));
-  };
-  const auto status = [](const std::string& reply) { return reply.substr(reply.size() - 5); };
-
-  EXPECT_EQ(host_.Ask("26 00 00 00 00 00 00 00 00").substr(0, 20), "26 00 00 EE FF C0 80");
-  EXPECT_EQ(status(host_.Ask("26 01 00 11")), "05 00");  // never written
-  const std::string written = write("27 C5 01 01");
-  EXPECT_EQ(FromHex(written).size(), 133u);
-  EXPECT_EQ(status(written), "00 00");
-  EXPECT_EQ(handset_.nv().Value(kFtmBootItem)->front(), 1);
-  EXPECT_EQ(status(write("27 00 00 55")), "07 00");  // the serial number is read-only
-  EXPECT_EQ(handset_.nv().Value(kSerialNumberItem)->front(), 0xEE);
-  handset_.nv().SetStatus(kFtmBootItem, NvStatus::kFailed);
-  EXPECT_EQ(status(host_.Ask("26 C5 01")), "04 00");
-  EXPECT_EQ(host_.Ask("27 C5 01 00").substr(0, 2), "15");
-  handset_.nv().Set(7, FromHex("01"), 2);
-  EXPECT_FALSE(handset_.nv().Value(7, 1));
-  EXPECT_TRUE(handset_.nv().Value(7, 2));
 }
 
 TEST_F(Handset, SwitchesItsModeAfterTheDelay) {
@@ -159,30 +115,6 @@ TEST_F(Handset, ResetIsSilentForItsTimeAndBootsAsNvSays) {
   EXPECT_EQ(Mode(), "05");
 }
 
-TEST_F(Handset, DownloadRequestLeavesDiagnosticModeForTheLoader) {
-  EXPECT_EQ(host_.Ask("3A"), "3A");
-  EXPECT_EQ(host_.Ask("00"), "03");
-  handset_.Restart();
-
-  struct Loader final : WireMode {
-    void OnEnter(Wire& wire) override { wire.Write(FromHex("01")); }
-    size_t OnBytes(ByteView bytes, Wire& wire) override {
-      wire.Write(bytes.first(1));
-      if (bytes[0] == 0xEE) wire.Enter(nullptr);
-      return 1;
-    }
-  };
-  handset_.mode().SetLoader(std::make_shared<Loader>());
-  host_.Send("3A");
-  EXPECT_EQ(host_.Read(), HexText(EncodeFrame(FromHex("3A"))) + " 01");
-  // The loader leaves in the middle of a chunk; the rest is diagnostic again.
-  Bytes chunk = FromHex("55 EE");
-  const Bytes frame = EncodeFrame(FromHex("2F"));
-  chunk.insert(chunk.end(), frame.begin(), frame.end());
-  handset_.FromHost(chunk);
-  EXPECT_EQ(host_.Read(), "55 EE " + HexText(EncodeFrame(FromHex("2F 34 12"))));
-}
-
 TEST_F(Handset, AtModemSwitchesToDiagnosticMode) {
   const auto modem = std::make_shared<AtModem>();
   modem->Answer("ATI", "\r\nVH\r\nOK\r\n");
@@ -204,31 +136,6 @@ TEST_F(Handset, AtModemSwitchesToDiagnosticMode) {
   handset_.mode().SetPacketMode(nullptr);
   EXPECT_EQ(host_.Ask("44"), "44 00");
   EXPECT_EQ(host_.Ask("2F"), "2F 34 12");
-}
-
-TEST_F(Handset, TakesNewServicesAndHandlers) {
-  struct Counter final : Service {
-    void Register(RequestTable& table) override {
-      table.OnSubsystem(200, 1, Length::Exactly(4), [this](ByteView request, Wire& wire) {
-        wire.Send(ByteWriter().Raw(request).U8(++count).Take());
-        wire.Send(FromHex("60 00"), 5);  // and an event a little later
-      });
-      table.OnSubsystem(200, Length::AtLeast(4),
-                        [](ByteView request, Wire& wire) { Refuse(Refusal::kBadMode, request, wire); });
-    }
-    void OnReset() override { count = 0; }
-    uint8_t count = 0;
-  };
-  const auto counter = std::make_shared<Counter>();
-  handset_.AddService(counter);
-  EXPECT_EQ(host_.Ask("4B C8 01 00"), "4B C8 01 00 01");
-  clock_.Advance(5);
-  EXPECT_EQ(host_.Packets(), std::vector<std::string>{"60 00"});
-  EXPECT_EQ(host_.Ask("4B C8 02 00"), "18 4B C8 02 00");
-  handset_.Restart();
-  EXPECT_EQ(counter->count, 0);
-  handset_.On(0x2F, Length::Exactly(1), [](ByteView, Wire& wire) { wire.Send(FromHex("2F 00 00")); });
-  EXPECT_EQ(host_.Ask("2F"), "2F 00 00");
 }
 
 TEST_F(Handset, FollowsItsScriptAndThenItself) {
@@ -281,17 +188,6 @@ TEST_F(Handset, TraceHoldsRequestsAndRawBytes) {
   EXPECT_EQ(handset_.request_count(), 2u);
 }
 
-TEST_F(Handset, ReadsEndWhereFramesEnd) {
-  const Bytes frame = EncodeFrame(FromHex("60 00"));
-  for (int i = 0; i < 3; ++i) handset_.SendPacket(FromHex("60 00"));
-  Bytes buffer(frame.size() * 2 + 1);
-  EXPECT_EQ(handset_.ToHost(buffer), frame.size() * 2);
-  Bytes small(frame.size() - 1);  // smaller than any frame
-  EXPECT_EQ(handset_.ToHost(small), frame.size() - 1);
-  EXPECT_EQ(handset_.ToHost(small), 1u);
-  EXPECT_EQ(handset_.ToHost(small), 0u);
-}
-
 TEST_F(Handset, OutputThatNobodyReadsIsBounded) {
   const Bytes packet(1 << 20, 0x60);
   for (int i = 0; i < 40; ++i) handset_.SendUnframed(packet);
@@ -301,21 +197,6 @@ TEST_F(Handset, OutputThatNobodyReadsIsBounded) {
   EXPECT_LE(taken, OutputLine::kCapacity);
   EXPECT_GT(taken, OutputLine::kCapacity / 2);
   EXPECT_EQ(host_.Ask("2F"), "2F 34 12");
-}
-
-TEST(HandsetThreads, WaitEndsWithOutputAndWithAWake) {
-  VirtualHandset handset;
-  std::thread sender([&] { handset.SendPacket(FromHex("60 00")); });
-  EXPECT_TRUE(handset.WaitForOutput(10'000));
-  sender.join();
-  handset.DropOutput();
-  handset.Wake();
-  EXPECT_FALSE(handset.WaitForOutput(10'000));
-
-  std::thread host([&] { handset.FromHost(EncodeFrame(FromHex("2F"))); });
-  EXPECT_TRUE(handset.WaitForRequests(1, 10'000));
-  host.join();
-  EXPECT_FALSE(handset.WaitForRequests(2, 1));
 }
 
 TEST(HandsetThreads, ManyThreadsMayUseIt) {
@@ -343,38 +224,6 @@ TEST(HandsetThreads, ManyThreadsMayUseIt) {
   reader.join();
   EXPECT_EQ(handset.request_count(), 500u);
   EXPECT_GE(read.load(), 500 * (EncodeFrame(FromHex("60 00")).size() + 6));
-}
-
-TEST_F(Handset, CallerTransportCarriesBytesAndFailsWhenTheDeviceIsGone) {
-  CallerTransport cable(handset_);
-  const Bytes request = EncodeFrame(FromHex("2F"));
-  Bytes buffer(64);
-  uint32_t count = 0;
-  const auto send = [&] {
-    return CallerTransport::Send(cable.context(), cable.handle_value(), static_cast<uint32_t>(request.size()),
-                                 request.data(), &count);
-  };
-  const auto receive = [&] {
-    count = static_cast<uint32_t>(buffer.size());
-    return CallerTransport::Receive(cable.context(), cable.handle_value(), &count, buffer.data());
-  };
-  EXPECT_EQ(send(), 0u);
-  EXPECT_EQ(count, request.size());
-  EXPECT_EQ(receive(), 0u);
-  EXPECT_EQ(count, EncodeFrame(FromHex("2F 34 12")).size());
-  EXPECT_EQ(receive(), 0u);
-  EXPECT_EQ(count, 0u);
-
-  EXPECT_EQ(send(), 0u);
-  EXPECT_EQ(CallerTransport::Flush(cable.context(), cable.handle_value()), 0u);
-  EXPECT_EQ(receive(), 0u);
-  EXPECT_EQ(count, 0u);
-  EXPECT_EQ(cable.flushes(), 1u);
-
-  handset_.HangUp();
-  EXPECT_NE(send(), 0u);
-  EXPECT_NE(receive(), 0u);
-  EXPECT_NE(CallerTransport::Flush(cable.context(), cable.handle_value() + 1), 0u);
 }
 
 }  // namespace
