@@ -1,5 +1,4 @@
-// Intel HEX against two foreign tools, srec_cat and objcopy, in both directions over generated images. Skipped where
-// the tools are not installed: on Windows.
+// Intel HEX against two foreign tools, srec_cat and objcopy, in both directions over generated images.
 #include <gtest/gtest.h>
 
 #include <cstdint>
