@@ -1,0 +1,98 @@
+"""Logs and events: switched, shown, captured, played and counted."""
+import json
+import os
+import signal
+import time
+
+from tool import PATIENCE, ToolTest, start, wait_until
+
+
+class Traffic(ToolTest):
+    RATES = ("--logs", "2000", "--events", "200", "--messages", "200", "--burst", "5")
+
+    def stream(self, *words):
+        """The NDJSON objects of a verb, the result last."""
+        objects = [json.loads(line) for line in self.expect(0, *words, "--json").out.splitlines()]
+        self.assertTrue(objects[-1]["ok"])
+        return objects
+
+    def test_logs_are_switched_captured_played_and_counted(self):
+        file, names = self.path("capture"), self.add("names", b"# logs\n0x1001 Paging\n")
+        with self.handset(*self.RATES):
+            self.ask(0, "log", "on", "0x1001", "0x4001-0x4003", "--category", "5")
+            rows = self.ask(0, "log", "list", "--names", names)["equipment_ids"]
+            self.assertEqual({row["equipment_id"]: row["on"] for row in rows}[1], [{"code": 4097, "name": "Paging"}])
+            self.assertEqual([code["code"] for row in rows for code in row["on"]], [0x1001, 0x4001, 0x4002, 0x4003])
+            done = self.ask(0, "log", "capture", file, "--count", "300")
+            self.assertGreaterEqual(done["packets"], 300)
+            self.assertEqual(done["lost"], 0)
+            played = self.stream("log", "play", file)
+            self.assertEqual(len(played) - 1, done["packets"])
+            kinds = {packet["what"] for packet in played[:-1]}
+            self.assertLessEqual(kinds, {"log 0x1001", "log 0x4001", "log 0x4002", "log 0x4003", "message 5"})
+            self.assertTrue(all(len(packet["bytes"].split()) > 2 for packet in played[:-1]))
+            self.assertTrue(all(abs(packet["microseconds"] / 1e6 - time.time()) < 600 for packet in played[:-1]))
+            today = time.strftime("%Y-%m-%dT", time.gmtime(played[0]["microseconds"] / 1e6))
+            self.assertRegex(self.expect(0, "log", "play", file).out, rf"^{today}\d\d:\d\d:\d\d\.\d{{6}}Z  log 0x")
+            rows = self.expect_json(0, "log", "stats", file, "--names", names)["rows"]
+            self.assertEqual(sum(row["packets"] for row in rows), done["packets"])
+            self.assertIn("Paging", [row.get("name") for row in rows])
+            self.assertIn("Paging", self.expect(0, "log", "stats", file, "--names", names).out)
+            live = self.ask(0, "log", "stats", "--count", "100")
+            self.assertGreaterEqual(live["counters"]["collected"], 100)
+            self.assertGreaterEqual(live["counters"]["most_waiting"], 1)
+            self.assertGreater(live["rows"][0]["per_second"], 0)
+            self.ask(0, "log", "off", "--all", "--category", "5")
+            rows = self.ask(0, "log", "list")["equipment_ids"]
+            self.assertEqual([code for row in rows for code in row["on"]], [])
+        os.truncate(file, os.path.getsize(file) - 1)
+        cut = self.stream("log", "play", file)
+        self.assertEqual((len(cut) - 1, cut[-1]["cut"]), (done["packets"] - 1, True))
+
+    def test_events_are_shown_as_they_come_and_from_a_file(self):
+        file, names = self.path("capture"), self.add("names", b"291,Band change\n")
+        with self.handset(*self.RATES):
+            tail = ("-p", "7", "event", "tail")
+            shown = self.stream(*tail, "--on", "291", "7", "--names", names, "--count", "20")
+            self.assertEqual({(event["id"], event["name"]) for event in shown[:-1]}, {(291, "Band change"), (7, "")})
+            self.assertEqual(len(shown), 21)
+            for event in shown[:-1]:
+                self.assertIn(len(event["time_stamp"].split()), (2, 8))
+            self.assertLessEqual({1, 2}, {len(event["payload"].split()) for event in shown[:-1]})
+            self.ask(0, "log", "capture", file, "--count", "20")
+            self.assertGreaterEqual(self.stream("event", "tail", "--file", file)[-1]["events"], 160)
+            self.ask(0, "event", "off", "291")
+            self.assertEqual({event["id"] for event in self.stream(*tail, "--count", "20")[:-1]}, {7})
+            self.ask(0, "event", "off", "--all")
+            self.assertEqual(len(self.stream(*tail, "--seconds", "0.2")), 1)
+
+    def test_interrupt_is_the_ordinary_end_of_a_capture_and_a_lost_handset_is_not(self):
+        file = self.path("capture")
+        for end, code in ((lambda sim, process: process.send_signal(signal.SIGINT), 0),
+                          (lambda sim, process: sim.kill(), 9)):
+            with self.subTest(code=code), self.handset(*self.RATES) as sim:
+                process = start("-p", "7", "--json", "log", "capture", file, "--on", "0x1001", ports=self.ports)
+                wait_until(lambda: os.path.exists(file) and os.path.getsize(file) > 1000)
+                end(sim, process)
+                out, err = process.communicate(timeout=PATIENCE)
+                self.assertEqual(process.returncode, code, err)
+                packets = len(self.stream("log", "play", file)) - 1
+                self.assertGreater(packets, 0)
+                if code == 0:
+                    self.assertEqual(packets, json.loads(out)["packets"])
+            os.remove(file)
+
+    def test_files_that_cannot_be_used_are_bad_files(self):
+        foreign = self.add("foreign", b"not a capture file at all")
+        with self.handset(*self.RATES):
+            self.expect_json(10, "log", "play", foreign)
+            self.expect_json(10, "log", "play", "/nonexistent/capture")
+            self.ask(10, "log", "capture", "/nonexistent/capture")
+            self.ask(10, "log", "capture", "/dev/full")
+            self.ask(10, "log", "list", "--names", foreign)
+            self.ask(2, "log", "on")
+            self.ask(2, "event", "on", "0x10-0x0F")
+            self.ask(2, "event", "on", "0-65535")
+            for ignored in (("--count", "1"), ("--seconds", "1"), ("--on", "7"), ("--all",)):
+                self.expect_json(2, "event", "tail", "--file", foreign, *ignored)
+            self.expect_json(2, "log", "stats", foreign, "--count", "1")

@@ -1,0 +1,78 @@
+"""NV items by their definitions, and to and from PKV files."""
+import os
+import subprocess
+
+from tool import PATIENCE, ToolTest
+
+
+class NvItems(ToolTest):
+    """The definitions are those of the examples folder."""
+    DEFS = ("--defs", os.path.join(os.path.dirname(os.path.abspath(__file__)), "../../examples/nv_definitions.xml"))
+
+    def test_items_are_written_and_read_by_id_name_and_path(self):
+        with self.handset():
+            written = self.ask(0, "nv", "write", "PREFERRED_MODE", "1,513", *self.DEFS)
+            self.assertEqual(written["item"], {"id": 10, "name": "PREFERRED_MODE", "value": {"nam": 1, "mode": 513}})
+            self.ask(0, "nv", "write", "20002", "-77", *self.DEFS)
+            self.ask(0, "nv", "write", "6000", "AABB")
+            text = self.text("nv", "read", "10", "WCDMA_TX_LIMIT", "6000", *self.DEFS)
+            self.assertRegex(text, r"10 PREFERRED_MODE\n  nam +1\n  mode +513\n")
+            self.assertRegex(text, r"/nv/item_files/rfnv/00020002 WCDMA_TX_LIMIT\n  limit +-77\n")
+            self.assertRegex(text, r"6000\n0000 +AA BB 00")
+            # The handset's word on what it will not do, and the tool's on what makes no sense.
+            for code, text, *words in ((7, "5, never written", "read", "453", "7000"),
+                                       (7, "7, read-only", "write", "0", "AA"),
+                                       (2, "out of the range of mode", "write", "10", "1,70000", *self.DEFS),
+                                       (2, "", "read", "NO_SUCH_ITEM", *self.DEFS), (2, "", "dump"),
+                                       (10, "", "read", "10", "--defs", "/nonexistent")):
+                with self.subTest(words=words):
+                    self.assertIn(text, self.ask(code, "nv", *words)["error"]["text"])
+
+    def test_dump_makes_files_that_compare_and_validate(self):
+        pkv = [self.path("first.pkv"), self.path("second.pkv")]
+        source, page = self.path("source.xml"), self.path("page.html")
+        with self.handset():
+            self.ask(0, "nv", "dump", *self.DEFS, "--pkv", pkv[0])
+            self.ask(0, "nv", "write", "FTM_MODE", "1", *self.DEFS)
+            answer = self.ask(0, "nv", "dump", *self.DEFS, "--pkv", pkv[1], "--source", source)
+            self.assertEqual([item["name"] for item in answer["items"]], ["ESN", "FTM_MODE"])
+            self.assertEqual(len(self.ask(0, "nv", "dump", "--items", "450-460")["items"]), 1)
+        self.expect(0, "nv", "diff", *pkv, page, *self.DEFS)
+        self.assertIn(b"enabled: 0 to 1", self.content("page.html"))
+        subprocess.run(["xmllint", "--noout", source, self.DEFS[1]], check=True, timeout=PATIENCE)
+        self.expect_json(10, "nv", "diff", pkv[0], source, page)
+        self.assertEqual(len(self.expect_json(0, "nv", "defs", self.DEFS[1])["definitions"]), 29)
+        self.assertIn("3101 CHANNEL_OFFSET [0-3]\n", self.expect(0, "nv", "defs", self.DEFS[1]).out)
+
+
+class Backups(ToolTest):
+    def nv(self, code, verb, *options):
+        return self.ask(code, "nv", verb, self.path("phone.pkv"), *options)
+
+    def results(self, answer):
+        return {row.get("id", row.get("path")): row["result"] for row in answer["items"]}
+
+    def test_a_backup_is_restored_to_another_handset(self):
+        with self.handset():
+            for item, value in ((1, "11"), (2, "22")):
+                self.ask(0, "nv", "write", str(item), value)
+            self.assertEqual(self.nv(0, "backup", "--items", "0-20")["counts"]["read"], 3)
+            self.assertEqual(self.text("nv", "verify", self.path("phone.pkv")), "3 equal\n")
+        with self.handset("--esn", "0x5678"):
+            self.ask(0, "nv", "write", "1", "11")
+            expected = {0: "would-be-written", 1: "equal-already", 2: "would-be-written"}
+            self.assertEqual(self.results(self.nv(0, "restore", "--dry-run")), expected)
+            self.assertEqual(self.results(self.nv(8, "verify"))[2], "different")
+            self.assertEqual(self.results(self.nv(7, "restore")), {0: "refused", 1: "written", 2: "written"})
+            done = self.expect(7, "-p", "7", "nv", "restore", self.path("phone.pkv"))
+            self.assertIn("item 0: refused, status 7\n2 written, 1 refused\n", done.err)
+        with self.handset("--fault", "hang-up,nth=9,of=26"):
+            self.assertEqual(self.nv(9, "backup", "--items", "0-20")["counts"]["not-reached"], 21 - 7)
+
+    def test_mistakes_are_told(self):
+        with self.handset():
+            self.assertIn("phone.pkv", self.nv(10, "restore")["error"]["text"])
+            for items in ("9-1", "x", "0-70000", ""):
+                self.nv(2, "backup", "--items", items)
+            self.nv(2, "backup", "--subscriptions", "0")
+            self.assertIn("no item", self.nv(7, "backup", "--items", "5")["error"]["text"])

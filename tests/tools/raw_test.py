@@ -1,0 +1,85 @@
+"""Requests of the caller's own and mode switches, and the exit code of everything that can become of a request."""
+import contextlib
+import json
+import os
+import signal
+import subprocess
+
+import tool
+from tool import PATIENCE, ToolTest, clean_environment, holds, start, wait_until
+
+
+class Requests(ToolTest):
+    def test_raw_shows_the_reply_as_it_came(self):
+        with self.handset("--switches", "0x1234"):
+            self.assertEqual(self.text("raw", "2F").split()[:4], ["0000", "2F", "34", "12"])
+            for words in (["30", "78", "56"], ["307856"], ["0x30,0x78,0x56"]):
+                self.assertEqual(self.ask(0, "raw", *words)["request"], "30 78 56")
+            self.assertEqual(self.ask(0, "raw", "2f")["reply"], "2F 78 56")
+
+    def test_modes_are_switched_and_read_back(self):
+        with self.handset():
+            self.assertEqual(self.text("mode", "get"), "online\n")
+            for mode in ("ftm", "lpm", "online"):
+                self.assertEqual(self.ask(0, "mode", mode)["mode"], mode)
+                self.assertEqual(self.text("mode", "get"), f"{mode}\n")
+
+
+class Failures(ToolTest):
+    @contextlib.contextmanager
+    def tool_waiting_for_an_answer(self, *options):
+        """The tool, with the request 7C sent and its answer outstanding."""
+        log = self.path("log")
+        process = start("-p", "7", "--time-out", "2000", "--log", log, "raw", "7C", *options, ports=self.ports)
+        try:
+            wait_until(lambda: process.poll() is not None or holds(log, "SEND (1 bytes):7C"))
+            yield process
+        finally:
+            if process.poll() is None:
+                process.kill()
+                process.communicate()
+
+    def test_each_has_its_code_and_text(self):
+        for fault, words, code, text, hint, reply in (
+                ("ignore", ["info"], 5, "COM7", "", ""),
+                ("lose,of=7C", ["--time-out", "300", "raw", "7C"], 5, "command 7C", "still answers", ""),
+                ("refuse=24,of=29", ["raw", "29 05 00"], 7, "invalid for the current mode", "", "18"),
+                ("wrong=0x55,of=7C", ["raw", "7C"], 6, "", "", "")):
+            with self.subTest(fault=fault), self.handset("--fault", fault):
+                answer = self.ask(code, *words)
+                self.assertIn(text, answer["error"]["text"])
+                self.assertIn(hint, answer["error"]["hint"])
+                self.assertIn(reply, answer.get("reply", "")[:2])
+
+    def test_handset_that_vanishes_is_lost(self):
+        with self.handset("--fault", "lose,of=7C") as sim, self.tool_waiting_for_an_answer() as process:
+            sim.kill()
+            _, err = process.communicate(timeout=PATIENCE)
+            self.assertEqual(process.returncode, 9, err)
+
+    def test_handset_that_comes_back_is_served_again(self):
+        link = self.path("port")
+        with self.handset("--fault", "hang-up,nth=1,of=7C", "--back-after", "300", "--link", link):
+            self.ports = {7: link}
+            self.ask(9, "--time-out", "200", "raw", "7C")
+            wait_until(lambda: os.path.lexists(link))
+            self.ask(0, "raw", "7C")
+
+    def test_mistakes_on_the_command_line_are_usage(self):
+        for words in (["frobnicate"], ["info", "--frobnicate"], [], ["raw", "4B0"], ["raw", "xyz"],
+                      ["-p", "seven", "info"], ["mode", "sideways"], ["--time-out", "0", "info"],
+                      ["sim", "--fault", "frobnicate"]):
+            with self.subTest(words=words):
+                self.expect_json(2, *words)
+
+    def test_result_that_cannot_be_written_is_not_a_success(self):
+        with self.handset(), open("/dev/full", "w", encoding="ascii") as full:
+            done = subprocess.run([tool.KRAL, "-p", "7", "info"], env=clean_environment(self.ports), stdout=full,
+                                  stderr=subprocess.PIPE, text=True, timeout=PATIENCE, check=False)
+        self.assertEqual(done.returncode, 1, done.stderr)
+
+    def test_interrupted_verb_disconnects_and_says_so(self):
+        with self.handset("--fault", "lose,of=7C"), self.tool_waiting_for_an_answer("--json") as process:
+            process.send_signal(signal.SIGINT)
+            out, _ = process.communicate(timeout=PATIENCE)
+            self.assertEqual((process.returncode, json.loads(out)["error"]["name"]), (130, "interrupted"))

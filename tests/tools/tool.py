@@ -1,0 +1,113 @@
+"""What the tests of the tool share: running it and the handset it simulates, and a folder for files."""
+import contextlib
+import json
+import os
+import subprocess
+import tempfile
+import time
+import unittest
+
+KRAL = None  # the tool; set before any test runs
+PATIENCE = 30  # seconds; far more than anything here takes
+
+
+def clean_environment(ports):
+    """An environment in which exactly these COM numbers have devices of ours."""
+    env = {name: value for name, value in os.environ.items() if not name.startswith("KRAL_")}
+    env["KRAL_PORT_DIR"] = "/nonexistent"
+    env.update({f"KRAL_COM{number}": device for number, device in ports.items()})
+    return env
+
+
+def start(*words, ports=None, before=()):
+    return subprocess.Popen([*before, KRAL, *words], env=clean_environment(ports or {}), stdin=subprocess.DEVNULL,
+                            stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
+
+
+def run(*words, ports=None, before=()):
+    process = start(*words, ports=ports, before=before)
+    process.out, process.err = process.communicate(timeout=PATIENCE)
+    return process
+
+
+def wait_until(condition):
+    deadline = time.monotonic() + PATIENCE
+    while time.monotonic() < deadline and not condition():
+        time.sleep(0.01)
+
+
+def holds(file, text):
+    """Whether a log that is being written holds a text by now."""
+    with contextlib.suppress(FileNotFoundError), open(file, encoding="latin-1") as log:
+        return text in log.read()
+    return False
+
+
+@contextlib.contextmanager
+def handset(*options):
+    """A simulated handset; gives its process, whose `device` is where it answers."""
+    sim = start("sim", *options)
+    try:
+        sim.device = sim.stdout.readline().strip()
+        if not os.path.exists(sim.device):
+            raise AssertionError(f"kral sim {options}: no device: {sim.communicate()[1]}")
+        yield sim
+    finally:
+        if sim.poll() is None:
+            sim.terminate()
+        sim.communicate(timeout=PATIENCE)
+
+
+class ToolTest(unittest.TestCase):
+    """A folder for files, and COM ports: one handset is on COM7 as long as a test is inside of `handset`."""
+
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.folder = folder.name
+        self.ports = {}
+
+    def path(self, *names):
+        return os.path.join(self.folder, *names)
+
+    def add(self, name, content):
+        os.makedirs(os.path.dirname(self.path(name)), exist_ok=True)
+        with open(self.path(name), "wb") as file:
+            file.write(content)
+        return self.path(name)
+
+    def content(self, *names):
+        with open(self.path(*names), "rb") as file:
+            return file.read()
+
+    @contextlib.contextmanager
+    def handset(self, *options):
+        with handset(*options) as sim:
+            self.ports = {7: sim.device}
+            yield sim
+
+    def expect(self, code, *words):
+        """Runs the tool and checks its exit code."""
+        done = run(*words, ports=self.ports)
+        self.assertEqual(done.returncode, code, f"kral {' '.join(words)}\n{done.out}{done.err}")
+        return done
+
+    def expect_json(self, code, *words):
+        """The same with --json: one object, nothing else, whose error agrees with the exit code."""
+        done = self.expect(code, *words, "--json")
+        answer = json.loads(done.out)
+        self.assertEqual(done.out.count("\n"), 1)
+        self.assertEqual(answer["ok"], code == 0)
+        if code != 0:
+            self.assertEqual(answer["error"]["code"], code)
+            for member in ("name", "text", "hint"):
+                self.assertTrue(answer["error"][member], member)
+        return answer
+
+    def text(self, *words):
+        """What the tool prints for a person of the handset on COM7."""
+        return self.expect(0, "-p", "7", *words).out
+
+    def ask(self, code, *words):
+        """The object that it prints of the handset on COM7."""
+        return self.expect_json(code, "-p", "7", *words)
