@@ -8,6 +8,7 @@
 #include "handset/software_image.h"
 #include "kral/kral.h"
 #include "tests/support/handset_ports.h"
+#include "tests/support/hex_files.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
@@ -119,9 +120,8 @@ TEST_F(FlashAll, FollowsAHandsetThatComesBackAsAnotherDevice) {
 
 TEST_F(FlashAll, LooksAtEveryFileBeforeTheFirstPacket) {
   const std::string missing = folder_.Path("missing");
-  const std::string broken = folder_.Add("broken.hex", ":0000\n");
-  const std::string second_region =
-      folder_.Add("second.hex", ":020000040000FA\n:0100000001FE\n:020000040800F2\n:0100000002FD\n:00000001FF\n");
+  const std::string broken = folder_.Add("broken.hex", test::kBrokenHex);
+  const std::string second_region = folder_.Add("second.hex", test::kTwoRegionsHex);
   struct Row {
     std::vector<const char*> images;
     uint32_t result;

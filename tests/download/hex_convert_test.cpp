@@ -4,13 +4,11 @@
 #include <string>
 
 #include "kral/download.h"
+#include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
 namespace {
-
-constexpr char kTwoRegions[] = ":020000040001F9\n:0100000055AA\n:020000040800F2\n:020010005566\n:00000001FF\n";
-constexpr char kSecondRegionRecord[] = ":02001000556633\n";
 
 class ImageFiles : public testing::Test {
  protected:
@@ -57,18 +55,16 @@ TEST_F(ImageFiles, GoToHexAndBackWithTheirGaps) {
 }
 
 TEST_F(ImageFiles, SecondRegionIsToldAndFitsIntoNoBinary) {
-  std::string text = kTwoRegions;
-  text.replace(text.find(":020010005566\n"), 14, kSecondRegionRecord);
-  const auto file = folder_.Add("two.hex", text);
+  const auto file = folder_.Add("two.hex", test::kTwoRegionsHex);
   ASSERT_EQ(Info(file), 0u);
   EXPECT_EQ(info_.base[1], 0x08000000u);
-  EXPECT_EQ(info_.size[1], 2u);
+  EXPECT_EQ(info_.size[1], 1u);
   EXPECT_EQ(Convert(file, folder_.Path("two.bin"), KRAL_HEX_TO_BINARY), KRAL_STREAM_BAD_IMAGE);
 }
 
 TEST_F(ImageFiles, FailuresHaveTheirResultsAndLeaveTheOutputAlone) {
   const auto good = folder_.Add("good.bin", "abc");
-  const auto broken = folder_.Add("broken.hex", kTwoRegions);  // a record without its checksum
+  const auto broken = folder_.Add("broken.hex", test::kBrokenHex);
   const auto output = folder_.Add("output", "as it was");
   uint32_t odd_base = 0x8000;
   EXPECT_EQ(Convert(good, output, KRAL_HEX_FROM_BINARY, &odd_base), KRAL_STREAM_BAD_ARGUMENT);

@@ -5,6 +5,7 @@
 
 #include "download/kova.h"
 #include "tests/support/download_fixture.h"
+#include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -89,10 +90,10 @@ TEST_F(Kova, EveryFailureHasItsResult) {
   std::string no_start = kProgrammer;
   no_start.erase(no_start.find(":04000005"), 20);
   const auto startless = folder_.Add("startless.hex", no_start);
-  const auto broken = folder_.Add("broken.hex", ":020000040002F8\n:0100000055AB\n:00000001FF\n");
-  // Beyond 500 KiB.
-  const auto large =
-      folder_.Add("large.hex", ":020000040001F9\n:0100000055AA\n:020000040009F1\n:0100000055AA\n:00000001FF\n");
+  const auto broken = folder_.Add("broken.hex", test::kBrokenHex);
+  std::string far = test::kTwoRegionsHex;
+  far.replace(far.find("0800F2"), 6, "0009F1");  // beyond 500 KiB
+  const auto large = folder_.Add("large.hex", far);
   StartLoader();
   EXPECT_EQ(Load(folder_.Path("missing")), KRAL_KOVA_FILE_NOT_OPENED);
   EXPECT_EQ(Load(broken), KRAL_KOVA_FILE_NOT_DECODED);

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <functional>
 #include <string>
+#include <typeinfo>
 #include <vector>
 
 #include "download/phone_image_binary.h"
@@ -119,45 +120,6 @@ TEST(PagedMemory, ASecondReservationMayNotBeLarger) {
   ExpectThrow("Paged Allocation", 0, 0xFFFFFFFF, Kind::kWriteOrAllocation, [] { PhoneImageDPaged(0x400000, nullptr); });
 }
 
-TEST(BinaryImage, ShowsTheFileWithinItsBounds) {
-  const test::TempFolder folder;
-  PhoneImageBinary image;
-  ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789")));
-  EXPECT_EQ(image.GetTotalSize(), 10u);
-  EXPECT_EQ(image.GetSize(0), 10u);
-  EXPECT_EQ(image.GetLastAddress(0), 9u);
-  EXPECT_EQ(image.GetStartAddress(), 0u);
-  EXPECT_EQ(ReadText(image, 3, 7), "3456789");
-  EXPECT_EQ(*image.GetPointer(9), '9');
-  ExpectThrow("Read Failure", 10, 1, Kind::kRead, [&] { image.GetPointer(10); });
-  ExpectThrow("Read Failure", 3, 8, Kind::kRead, [&] { ReadText(image, 3, 8); });
-  char byte = 0;
-  ExpectThrow("Read Failure", 0xFFFFFFFF, 2, Kind::kRead, [&] { image.Read(0xFFFFFFFF, &byte, 2, 0); });
-
-  image.SetBaseAddress(0x1000, 0);
-  image.SetSize(4, 0);
-  image.SetStartAddress(7);
-  EXPECT_EQ(image.GetBaseAddress(0), 0u);
-  EXPECT_EQ(image.GetSize(0), 4u);
-  EXPECT_EQ(image.GetLastAddress(0), 9u);
-  EXPECT_EQ(image.GetStartAddress(), 7u);
-  EXPECT_EQ(ReadText(image, 0, 10), "0123456789");
-}
-
-TEST(BinaryImage, RefusesWritesAndOtherRegions) {
-  const test::TempFolder folder;
-  PhoneImageBinary image;
-  ASSERT_TRUE(image.Open(folder.Add("image.bin", "0123456789")));
-  ExpectThrow("Write Failure", 0, 10, Kind::kWriteOrAllocation, [&] { image.Clear(); });
-  ExpectThrow("Write Failure", 5, 1, Kind::kWriteOrAllocation, [&] { WriteText(image, 5, "x"); });
-  const std::function<void()> kCalls[] = {[&] { image.GetBaseAddress(1); }, [&] { image.GetSize(1); },
-                                          [&] { image.GetLastAddress(1); }, [&] { image.SetSize(1, 1); },
-                                          [&] { image.SetBaseAddress(1, 1); }};
-  for (const auto& call : kCalls) ExpectThrow("Read Failure", 1, 0, Kind::kRead, call);
-  ExpectThrow("Read Failure", 1, 0, Kind::kRead, [&] { ReadText(image, 0, 1, 1); });
-  EXPECT_EQ(folder.Content("image.bin"), "0123456789");
-}
-
 TEST(BinaryImage, MissingAndEmptyFilesAreRefused) {
   const test::TempFolder folder;
   PhoneImageBinary image;
@@ -185,31 +147,57 @@ TEST(MappedFile, AWritableViewChangesTheFile) {
   EXPECT_NE(file.last_error(), 0u);
 }
 
-TEST(RawImages, CountTheTerminatingZeroAndDifferInReadOnly) {
+// The same six bytes as a file and as a caller's memory, in which a terminating zero counts.
+TEST(FlatImages, ShowTheirBytesAndDifferInWhatTheyRefuse) {
+  const test::TempFolder folder;
+  const std::string bytes("table\0", 6);
+  PhoneImageBinary file;
   PhoneImageRawBinary blob;
   PhoneImageRawBuffer buffer;
-  std::string data = "table";
+  ASSERT_TRUE(file.Open(folder.Add("image.bin", bytes)));
   for (PhoneImageRaw* image : std::initializer_list<PhoneImageRaw*>{&blob, &buffer}) {
     EXPECT_FALSE(image->SetData(nullptr, 5));
     EXPECT_EQ(image->GetTotalSize(), 0u);
-    ASSERT_TRUE(image->SetData(data.data(), 5));
-    image->SetSize(2, 0);
-    image->SetBaseAddress(0x100, 0);
-    WriteText(*image, 0, "XXXXX");
-    image->Clear();
-    EXPECT_EQ(image->GetSize(0), 6u);
-    EXPECT_EQ(image->GetTotalSize(), 6u);
-    EXPECT_EQ(image->GetLastAddress(0), 0u);
-    EXPECT_EQ(image->GetBaseAddress(0), 0u);
-    EXPECT_EQ(ReadText(*image, 0, 6), std::string("table\0", 6));
-    EXPECT_EQ(*image->GetPointer(5), 0);
-    ExpectThrow("Read Failure", 6, 1, Kind::kRead, [&] { image->GetPointer(6); });
+    ASSERT_TRUE(image->SetData(bytes.data(), 5));
   }
-  EXPECT_EQ(ReadText(blob, 0x8000, 3, 1), "tab");
-  ExpectThrow("", 0, 7, Kind::kRead, [&] { ReadText(blob, 0, 7); });
-  EXPECT_EQ(ReadText(buffer, 2, 3), "ble");
-  ExpectThrow("Read Failure", 4, 3, Kind::kRead, [&] { ReadText(buffer, 4, 3); });
+  const struct {
+    PhoneImage& image;
+    uint32_t resized, last_address;
+    const char* beyond;  // what a read behind the end throws
+  } kRows[] = {{file, 4, 5, "Read Failure"}, {blob, 6, 0, ""}, {buffer, 6, 0, "Read Failure"}};
+  for (const auto& [image, resized, last_address, beyond] : kRows) {
+    SCOPED_TRACE(typeid(image).name());
+    PhoneImage& shown = image;
+    EXPECT_EQ(shown.GetSize(0), 6u);
+    shown.SetSize(4, 0);
+    shown.SetBaseAddress(0x100, 0);
+    EXPECT_EQ(shown.GetSize(0), resized);
+    EXPECT_EQ(shown.GetTotalSize(), 6u);
+    EXPECT_EQ(shown.GetBaseAddress(0), 0u);
+    EXPECT_EQ(shown.GetLastAddress(0), last_address);
+    EXPECT_EQ(ReadText(shown, 0, 6), bytes);
+    EXPECT_EQ(*shown.GetPointer(5), 0);
+    ExpectThrow("Read Failure", 6, 1, Kind::kRead, [&] { shown.GetPointer(6); });
+    ExpectThrow(beyond, 0, 7, Kind::kRead, [&] { ReadText(shown, 0, 7); });
+    if (&shown != &file) {
+      WriteText(shown, 0, "XXXXX");
+      shown.Clear();
+      EXPECT_EQ(ReadText(shown, 0, 6), bytes) << "writes are let pass and change nothing";
+    }
+  }
+  EXPECT_EQ(ReadText(blob, 0x8000, 3, 1), "tab") << "whatever the address and the region";
   ExpectThrow("Read Failure", 0, 1, Kind::kRead, [&] { ReadText(buffer, 0, 1, 1); });
+  file.SetStartAddress(7);
+  EXPECT_EQ(file.GetStartAddress(), 7u);
+  ExpectThrow("Write Failure", 0, 6, Kind::kWriteOrAllocation, [&] { file.Clear(); });
+  ExpectThrow("Write Failure", 5, 1, Kind::kWriteOrAllocation, [&] { WriteText(file, 5, "x"); });
+  char byte = 0;
+  ExpectThrow("Read Failure", 0xFFFFFFFF, 2, Kind::kRead, [&] { file.Read(0xFFFFFFFF, &byte, 2, 0); });
+  const std::function<void()> kCalls[] = {[&] { file.GetBaseAddress(1); },    [&] { file.GetSize(1); },
+                                          [&] { file.GetLastAddress(1); },    [&] { file.SetSize(1, 1); },
+                                          [&] { file.SetBaseAddress(1, 1); }, [&] { ReadText(file, 0, 1, 1); }};
+  for (const auto& call : kCalls) ExpectThrow("Read Failure", 1, 0, Kind::kRead, call);
+  EXPECT_EQ(folder.Content("image.bin"), bytes);
 }
 
 }  // namespace

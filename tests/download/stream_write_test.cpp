@@ -10,6 +10,7 @@
 
 #include "download/image_write_cmd.h"
 #include "tests/support/download_fixture.h"
+#include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -223,8 +224,7 @@ TEST_F(StreamWrite, FilesOfBothFormatsAndWhatIsWrongWithThem) {
   ExpectInFlash(bytes, 0x30000);
 
   const size_t images = handset().programmer().images().size();
-  const auto two =
-      folder.Add("two.hex", ":020000040001F9\n:0100000055AA\n:020000040800F2\n:0100000055AA\n:00000001FF\n");
+  const auto two = folder.Add("two.hex", test::kTwoRegionsHex);
   EXPECT_EQ(write(two, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_BAD_IMAGE);
   EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_FILE_NOT_DECODED);
   EXPECT_EQ(write(binary, 7), KRAL_STREAM_BAD_ARGUMENT);
