@@ -207,6 +207,25 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
     build(root);
     EXPECT_EQ(SaveCompoundFile(Path(), root), "");
   };
+  const auto bytes_of = [](const auto& record) { return std::vector<uint8_t>(record.begin(), record.end()); };
+  const auto numbered = [&](const std::vector<uint8_t>& record) {
+    tree([&](auto& root) {
+      root.OpenOrAddStorage("NV_NUMBERED_ITEMS").OpenOrAddStorage("00000001").OpenOrAddStream("00000000").bytes =
+          record;
+    });
+  };
+  const auto array = [&](const std::vector<uint8_t>& records) {
+    tree([&](auto& root) { root.OpenOrAddStream("NV_ITEM_ARRAY").bytes = records; });
+  };
+  const auto directory = [&](const std::vector<uint8_t>& entry, bool with_content) {
+    tree([&](auto& root) {
+      auto& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
+      files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = entry;
+      if (with_content) files.OpenOrAddStorage("EFS_Data").OpenOrAddStream("00000000");
+    });
+  };
+  auto longer = pkv::ArrayRecord(Item(2, 1));
+  longer[0] = 0x87;
   const struct {
     const char* what;
     std::function<void()> make;
@@ -217,51 +236,19 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
       {"of something else", [&] { tree([](auto& root) { root.OpenOrAddStorage("Other"); }); }, PkvResult::kNoStorage},
       {"an empty configuration",
        [&] { tree([](auto& root) { root.OpenOrAddStorage("Default_Phone_Configuration"); }); }, PkvResult::kDone},
-      {"a bare configuration",
-       [&] { tree([](auto& root) { root.OpenOrAddStream("NV_ITEM_ARRAY").bytes.assign(136, 0); }); }, PkvResult::kDone},
-      {"a short numbered item",
-       [&] {
-         tree([](auto& root) {
-           root.OpenOrAddStorage("NV_NUMBERED_ITEMS").OpenOrAddStorage("00000001").OpenOrAddStream("00000000").bytes = {
-               1};
-         });
-       },
+      {"a bare configuration", [&] { array(std::vector<uint8_t>(136)); }, PkvResult::kDone},
+      {"a short numbered item", [&] { numbered({1}); }, PkvResult::kDamagedItem},
+      {"a record of another id than its storage", [&] { numbered(bytes_of(pkv::NumberedRecord(Item(2, 1)))); },
        PkvResult::kDamagedItem},
+      {"an array record of another length", [&] { array(bytes_of(longer)); }, PkvResult::kDamagedItem},
       {"a file without content",
        [&] {
-         tree([](auto& root) {
-           auto& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
-           files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = {0, 0, 0, 0, 3, 0, 0, 0, '/', 'a'};
-         });
-       },
-       PkvResult::kDamagedItem},
-      {"a record of another id than its storage",
-       [&] {
-         tree([](auto& root) {
-           const auto record = pkv::NumberedRecord(Item(2, 1));
-           root.OpenOrAddStorage("NV_NUMBERED_ITEMS")
-               .OpenOrAddStorage("00000001")
-               .OpenOrAddStream("00000000")
-               .bytes.assign(record.begin(), record.end());
-         });
-       },
-       PkvResult::kDamagedItem},
-      {"an array record of another length",
-       [&] {
-         tree([](auto& root) {
-           auto record = pkv::ArrayRecord(Item(2, 1));
-           record[0] = 0x87;
-           root.OpenOrAddStream("NV_ITEM_ARRAY").bytes.assign(record.begin(), record.end());
-         });
+         directory({0, 0, 0, 0, 3, 0, 0, 0, '/', 'a'}, false);
        },
        PkvResult::kDamagedItem},
       {"a path with a zero",
        [&] {
-         tree([](auto& root) {
-           auto& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
-           files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = {0, 0, 0, 0, 0, 0, 0, 0, '/', 0, 'a'};
-           files.OpenOrAddStorage("EFS_Data").OpenOrAddStream("00000000");
-         });
+         directory({0, 0, 0, 0, 0, 0, 0, 0, '/', 0, 'a'}, true);
        },
        PkvResult::kDamagedItem},
   };
