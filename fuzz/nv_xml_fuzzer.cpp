@@ -68,11 +68,12 @@ void FuzzSource(const XmlElement& root) {
   if (ReadSource(root, source, problem) != NvError::kNone) return;
   NvSource again;
   Check(ReadSource(Parsed(SourceText(source)), again, problem) == NvError::kNone);
-  Check(again.items.size() == source.items.size() && again.roaming_lists.size() == source.roaming_lists.size());
+  Check(again.items.size() == source.items.size());
   for (size_t i = 0; i < source.items.size(); ++i) {
     Check(again.items[i].id == source.items[i].id && again.items[i].slot == source.items[i].slot);
-    if (const auto bytes = FromHex(source.items[i].value)) Check(FromHex(ToHex(*bytes)) == *bytes);
+    Check(again.items[i].path == source.items[i].path && again.items[i].value == source.items[i].value);
   }
+  Check(again.roaming_lists == source.roaming_lists);
 }
 
 void FuzzFilter(const XmlElement& root) {
@@ -83,7 +84,10 @@ void FuzzFilter(const XmlElement& root) {
   NvItem item;
   item.id = 453;
   item.name = "FTM_MODE";
-  filter.Passes(item);
+  const bool passes = filter.Passes(item);
+  Check(filter.Read(root, problem) == NvError::kNone && filter.Passes(item) == passes);  // the same again adds nothing
+  filter.AddItem(item);
+  Check(filter.Passes(item));
 }
 
 }  // namespace

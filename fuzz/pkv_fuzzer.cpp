@@ -64,7 +64,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     PkvSet again;
     Check(written.done() && ReadPkv(copy.path, again).done());
     Check(again.items == set.items);
-    Check(again.files.size() == set.files.size());
+    Check(again.files == set.files);
   }
   return 0;
 }
