@@ -291,11 +291,13 @@ TEST_F(PkvBackup, ALostRequestForAFolderIsMadeAgain) {
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
   MakeBlank();
   ShortenTimeOuts(20);
-  const std::string folder = "/nv/reg_files/conf/below";
+  const std::string folder = "nv/reg_files/conf/below";
   ASSERT_EQ(KRAL_EfsRmDir(handle(), folder.c_str(), nullptr), 1);
   const std::string request = "4B 13 09 00 FF 01 " + handset::HexText(Bytes(folder.begin(), folder.end()));
   handset().faults().Add(handset::Ignore(), When::Nth(1).Of(request));
+  handset().ClearTrace();
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(RequestsOf(handset::FromHex(request)), 2u);
   EXPECT_EQ(handset().efs().File(folder + "/plain"), RandomBytes(2000));
 }
 
