@@ -13,8 +13,10 @@ class Diag_FTM;
 
 namespace nv {
 
-inline constexpr uint16_t kDone = 0;      // NV status: success
-inline constexpr uint16_t kReadOnly = 7;  // ... the item cannot be written
+inline constexpr uint16_t kDone = 0;          // NV status: success
+inline constexpr uint16_t kNeverWritten = 5;  // ... the item has no value
+inline constexpr uint16_t kNoSuchItem = 6;    // ... the handset does not know the item, or has no such element
+inline constexpr uint16_t kReadOnly = 7;      // ... the item cannot be written
 inline constexpr uint16_t kEsnItem = 0;
 inline constexpr size_t kDataSize = 128;
 

@@ -78,6 +78,7 @@ struct PkvSettings {
   uint16_t last_item = 9999;
   uint16_t subscriptions = 1;
   KRAL_PKV_COUNTS counts{};
+  bool running = false;  // a backup, restore or comparison: its callback must not begin another one
 };
 
 // Set from any thread, also while a download runs.

@@ -64,9 +64,20 @@ void NvStore::Register(RequestTable& table) {
                     });
 }
 
+// Of an array, a plain request names the element in its first data byte, as a write does.
 void NvStore::ReadPlain(ByteView request, Wire& wire) const {
+  const uint16_t item = GetU16(request, 1);
   Data data = Filled(request.subspan(kDataOffset));
-  const NvStatus status = Read(GetU16(request, 1), data);
+  NvStatus status = NvStatus::kBadItem;
+  {
+    const std::lock_guard lock(mutex_);
+    if (const auto array = arrays_.find(item); array == arrays_.end()) {
+      status = ReadLocked({item, uint16_t{0}, uint8_t{0}}, data);
+    } else if (Data element{}; data[0] < array->second) {
+      status = ReadLocked({item, uint16_t{0}, data[0]}, element);
+      if (status == NvStatus::kDone) std::copy_n(element.begin(), kElementSize, data.begin() + 1);
+    }
+  }
   Reply(request.first(kDataOffset), data, status, wire);
 }
 

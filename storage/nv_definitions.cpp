@@ -49,8 +49,13 @@ NvItem* NvDefinitions::At(size_t index) {
   return index < files_.size() ? &files_[index] : nullptr;
 }
 
+NvItem* NvDefinitions::FindNumbered(uint16_t id) {
+  const auto item = by_id_.find(id);
+  return item == by_id_.end() ? nullptr : &numbered_[item->second];
+}
+
 NvItem* NvDefinitions::Find(uint16_t id) {
-  if (const auto item = by_id_.find(id); item != by_id_.end()) return &numbered_[item->second];
+  if (NvItem* const item = FindNumbered(id)) return item;
   if (const auto item = by_rf_id_.find(id); item != by_rf_id_.end()) return &files_[item->second];
   return nullptr;
 }

@@ -67,6 +67,7 @@ class NvDefinitions {
 
   NvItem* At(size_t index);  // null beyond the end
   NvItem* Find(uint16_t id);
+  NvItem* FindNumbered(uint16_t id);  // no file
   NvItem* Find(std::string_view path);
 
   // The item takes the place of one with the same id or path, whose values are gone: true when that was not made up.

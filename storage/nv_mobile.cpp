@@ -6,7 +6,7 @@
 
 #include "commands/nv_item.h"
 #include "commands/rf_nv.h"
-#include "storage/efs_client.h"
+#include "storage/efs_request.h"
 
 namespace kral::nv {
 namespace {
@@ -67,7 +67,7 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
   if (!CanName(item)) return {Kind::kRefused};
   uint16_t status = kDone;
   if (item.is_file()) {
-    if (item.id && has_rf_dispatcher_) {
+    if (item.id && has_rf_dispatcher_ && stored.size() <= kRfDataSize) {
       if (WriteRf(phone_, *item.id, stored, status)) return Judged(Answer::kAnswered, status);
       has_rf_dispatcher_ = false;
     }
@@ -83,29 +83,33 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
 }
 
 NvAnswer NvMobile::ReadFile(const NvItem& item, NvBytes& stored) {
-  efs::FileStatus status;
-  if (!efs::Stat(phone_, item.path.c_str(), status)) return Judged(Answer::kLost, 0);
-  if (!status.exists()) return {Kind::kRefused, kNeverWritten};
-  if (status.size > kLongestValue) {
-    phone_.log().WriteLine(kLogErr, "%s has %u bytes, too many for an item", item.path.c_str(), status.size);
+  uint32_t mode = 0;
+  uint32_t size = 0;
+  uint32_t error = 0;
+  const Answer told = items_.Status(item.path.c_str(), mode, size, error);
+  if (told != Answer::kAnswered) return Judged(told, 0);
+  if (error != efs::kDone) return {Kind::kRefused, kNeverWritten};
+  if (size > kLongestValue) {
+    phone_.log().WriteLine(kLogErr, "%s has %u bytes, too many for an item", item.path.c_str(), size);
     return {Kind::kRefused};
   }
-  PkvEfsFile file{item.path, status.mode, {}};
-  uint32_t error = 0;
-  const Answer answer = items_.ReadFile(file, error, status.size);
+  PkvEfsFile file{item.path, mode, {}};
+  const Answer answer = items_.ReadFile(file, error, size);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   stored = std::move(file.bytes);
   return {error == 0 ? Kind::kOk : Kind::kRefused};
 }
 
 NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored) {
-  efs::FileStatus status;
-  if (!efs::Stat(phone_, item.path.c_str(), status)) return Judged(Answer::kLost, 0);
-  // What is a plain file already stays one; permissions of files that are there stay, too.
-  const bool as_item_file = stored.size() <= KRAL_EFS_ITEM_SIZE && (!status.exists() || status.is_item_file());
-  const uint32_t mode = as_item_file ? uint32_t{KRAL_EFS_MODE_ITEM_FILE} : kPlainFile;
+  PkvEfsFile file{item.path, 0, {stored.begin(), stored.end()}};
+  uint32_t size = 0;
   uint32_t error = 0;
-  const Answer answer = items_.WriteFile({item.path, mode, {stored.begin(), stored.end()}}, error);
+  const Answer told = items_.Status(item.path.c_str(), file.mode, size, error);
+  if (told != Answer::kAnswered) return Judged(told, 0);
+  // What is a plain file already stays one; permissions of files that are there stay, too.
+  const bool as_item_file = stored.size() <= KRAL_EFS_ITEM_SIZE && (error != efs::kDone || file.is_item_file());
+  file.mode = as_item_file ? uint32_t{KRAL_EFS_MODE_ITEM_FILE} : kPlainFile;
+  const Answer answer = items_.WriteFile(file, error);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   return {error == 0 ? Kind::kOk : Kind::kRefused};
 }

@@ -6,12 +6,11 @@
 #include <span>
 #include <vector>
 
+#include "commands/nv_item.h"
 #include "storage/nv_definitions.h"
 #include "storage/phone_items.h"
 
 namespace kral::nv {
-
-inline constexpr uint16_t kNeverWritten = 5;  // status of an item that the handset knows and has no value for
 
 // What became of an item. The status is the handset's NV status; of a file kNeverWritten when it is not there, else 0.
 struct NvAnswer {

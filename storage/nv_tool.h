@@ -88,7 +88,8 @@ class NVTool_Manager final : public FamilyObject {
   NvError WriteElement(Diag_FTM& phone, NvMobile& mobile, const NvItem& item, NvSlot slot, const NvBytes& value,
                        uint16_t& status) const;
 
-  NvItem* ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, uint16_t highest_index);
+  struct PkvArrays;
+  NvItem* ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, const PkvArrays& arrays);
   NvError TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored);
   NvError TakeFile(Diag_FTM& phone, const PkvEfsFile& entry);
   // The highest index of the id in the source file makes an item that nobody defined an array.

@@ -66,26 +66,42 @@ NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, s
   return NvError::kNone;
 }
 
-// Null when the index word names no element.
-NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, uint16_t highest_index) {
-  NvItem* item = definitions_.Find(entry.id);
+// What a PKV file tells of its items beside their values.
+struct NVTool_Manager::PkvArrays {
+  explicit PkvArrays(const PkvSet& set) : noted(pkv::NotedArrays(set.properties)) {
+    for (const PkvNvItem& entry : set.items) {
+      auto& index = highest[entry.id];
+      index = std::max(index, entry.index);
+    }
+    if (!noted) return;
+    // One element at least that is not the first: else the item would be a plain one.
+    for (const uint16_t id : *noted) highest[id] = std::max<uint16_t>(highest[id], 1);
+  }
+  bool IsArray(uint16_t id) const { return highest.at(id) > 0; }
+
+  std::optional<std::set<uint16_t>> noted;
+  std::map<uint16_t, uint16_t> highest;  // index word by id
+};
+
+// Null when the index word names no element, and when file and definition do not agree on what is an array: the first
+// byte of the value is then part of it, or is not.
+NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, const PkvArrays& arrays) {
+  NvItem* item = definitions_.FindNumbered(entry.id);
+  const uint16_t highest_index = arrays.highest.at(entry.id);
   if (item == nullptr && highest_index <= kHighestElement) {
     item = &Define(phone, GenericItem(entry.id, highest_index));
   }
-  return item != nullptr && !item->is_file() && entry.index <= item->max_index ? item : nullptr;
+  if (item == nullptr || entry.index > item->max_index) return nullptr;
+  return !arrays.noted || item->is_array() == arrays.IsArray(entry.id) ? item : nullptr;
 }
 
 NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
   PkvSet set;
   if (const NvError error = ReadPkvFile(phone, file, set); error != NvError::kNone) return error;
-  std::map<uint16_t, uint16_t> highest;
-  for (const PkvNvItem& entry : set.items) {
-    auto& index = highest[entry.id];
-    index = std::max(index, entry.index);
-  }
+  const PkvArrays arrays(set);
   Walk walk(*this, KRAL_NV_OPERATION_READ_PKV, set.items.size() + set.files.size());
   for (const PkvNvItem& entry : set.items) {
-    NvItem* item = ItemOfPkv(phone, entry, highest[entry.id]);
+    NvItem* item = ItemOfPkv(phone, entry, arrays);
     NvError error = NvError::kBadPkvItem;
     if (item == nullptr) {
       phone.log().WriteLine(kLogErr, "NV ID %d with index %d has no place", entry.id, entry.index);
@@ -153,6 +169,8 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
       walk.Report(item->Title(), appended ? NvError::kNone : NvError::kCannotSetValue);
     }
   }
+  // The library's own file class holds no file without an item.
+  if (set.items.empty() && ChosenPkvWriter() == PkvWriter::kVarnPkvFile) return NvError::kNoValue;
   // A backup that lacks something is none.
   if (walk.failed()) return NvError::kCannotSetValue;
   // Values need no handset, and the null port is none; one that is there signs them.
@@ -197,7 +215,7 @@ NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry, u
   std::optional<NvBytes> bytes;
   if (!entry.is_direct) bytes = FromHex(entry.value);
   if (!entry.is_direct && !bytes) return reject("its value is not hexadecimal");
-  NvItem* item = entry.id ? definitions_.Find(*entry.id) : definitions_.Find(entry.path);
+  NvItem* item = entry.id ? definitions_.FindNumbered(*entry.id) : definitions_.Find(entry.path);
   if (item == nullptr) {
     if (entry.is_direct) return reject("decimal numbers need a definition");
     if (!entry.id && (bytes->size() > kLongestValue || !IsUsualPath(entry.path))) {
@@ -246,6 +264,7 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
     }
   }
   source.roaming_lists = roaming_lists_;
+  if (source.items.empty() && source.roaming_lists.empty()) return NvError::kNoValue;
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_SOURCE, source.items.size());
   for (const NvSourceItem& entry : source.items) {
     walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, NvError::kNone);

@@ -5,14 +5,13 @@
 #include <utility>
 
 #include "commands/nv_item.h"
-#include "commands/rf_nv.h"
 #include "storage/nv_compression.h"
 
 namespace kral::nv {
 namespace {
 
 size_t RoomOf(const NvItem& item) {
-  if (item.is_file()) return item.id ? kRfDataSize : kLongestValue;
+  if (item.is_file()) return kLongestValue;
   return item.is_array() ? kDataSize - 1 : kDataSize;
 }
 

@@ -1,6 +1,7 @@
 // The files that belong to a backup: where the handset keeps them, reading them and writing them.
 #include <algorithm>
 #include <array>
+#include <string_view>
 
 #include "frame/base/little_endian.h"
 #include "storage/efs_client.h"
@@ -17,14 +18,21 @@ constexpr std::array<const char*, 5> kFolders = {"/nv/items", "nv/item_files/con
 
 // What a hostile handset may not exceed.
 constexpr int kDeepest = 8;
-constexpr uint32_t kMostEntries = 20000;  // of one folder, and files in all
+constexpr uint32_t kMostEntries = 20000;  // of one folder; files in all, folders in all
 constexpr uint32_t kUsualEntries = 256;
 constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
 
 constexpr uint32_t kUnanswered = 0xFFFFFFFF;  // in place of an error number
 constexpr uint32_t kDirectory = 0x4000;
+constexpr uint32_t kPlainFile = 0x8000;
 constexpr uint32_t kPermissions = 0777;
+
+// A folder's entries for itself and for the one above it.
+bool IsDots(std::string_view path) {
+  const std::string_view name = path.substr(path.rfind('/') + 1);
+  return name == "." || name == "..";
+}
 
 }  // namespace
 
@@ -55,31 +63,37 @@ void PhoneItems::TellUnlisted(const std::string& folder, uint32_t status, std::v
   unlisted.push_back({folder, status});
 }
 
-PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::vector<FoundFile>& files,
+PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vector<FoundFile>& files,
                                     std::vector<UnlistedFolder>& unlisted) {
   uint32_t mode = 0;
   uint32_t size = 0;
   uint32_t status = 0;
-  const Answer answer = Status(folder.c_str(), mode, size, status);
+  const Answer answer = Status(path.c_str(), mode, size, status);
   if (answer == Answer::kLost) return answer;
   // A handset without a file system, or without this folder.
   if (answer == Answer::kRefused ? refusal_ == efs::kBadCommand : status == efs::kMissing) return Answer::kAnswered;
-  if (status == efs::kDone && (mode & efs::kModeKind) != kDirectory) return Answer::kAnswered;
-  if (status != efs::kDone || depth > kDeepest) {
-    TellUnlisted(folder, status != efs::kDone ? status : kRefusedStatus, unlisted);
+  if (status == efs::kDone && (mode & efs::kModeKind) != kDirectory) {
+    // Listings give entries of kinds that they do not know as folders: item files of some handsets are among them.
+    const uint32_t kind = mode & efs::kModeKind;
+    if (kind == kPlainFile || kind == KRAL_EFS_MODE_ITEM_FILE) files.push_back({path, mode, size});
+    return Answer::kAnswered;
+  }
+  if (status != efs::kDone || depth > kDeepest || ++walked_ > kMostEntries) {
+    TellUnlisted(path, status != efs::kDone ? status : kRefusedStatus, unlisted);
     return Answer::kAnswered;
   }
   std::vector<KRAL_EFS_ENTRY> entries;
-  if (!List(folder, entries)) {
+  if (!List(path, entries)) {
     if (Unanswered() == Answer::kLost) return Answer::kLost;
-    TellUnlisted(folder, kRefusedStatus, unlisted);
+    TellUnlisted(path, kRefusedStatus, unlisted);
     return Answer::kAnswered;
   }
   for (const KRAL_EFS_ENTRY& entry : entries) {
     if (files.size() >= kMostEntries) {
-      TellUnlisted(folder, kRefusedStatus, unlisted);
+      TellUnlisted(path, kRefusedStatus, unlisted);
       return Answer::kAnswered;
     }
+    if (IsDots(entry.name)) continue;
     if (entry.type == KRAL_EFS_ENTRY_FILE) {
       files.push_back({entry.name, entry.mode, entry.size});
     } else if (entry.type == KRAL_EFS_ENTRY_DIRECTORY &&
@@ -91,6 +105,7 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& folder, int depth, std::v
 }
 
 PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted) {
+  walked_ = 0;
   for (const char* folder : kFolders) {
     if (Walk(folder, 1, files, unlisted) == Answer::kLost) return Answer::kLost;
   }

@@ -65,8 +65,8 @@ bool PhoneItems::Echoes16(size_t offset, uint16_t value) const {
 }
 
 PhoneItems::Answer PhoneItems::Read(PkvNvItem& item, bool element) {
-  item.data = {};
   return Try([&] {
+    item.data = {};  // a reply that was not this request's may have filled it
     item.status = 0;
     if (item.subscription != 0) {
       return nv::ReadExtended(phone_, item.id, item.subscription, item.data, item.status) &&

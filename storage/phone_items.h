@@ -58,6 +58,8 @@ class PhoneItems {
   // cannot be listed are logged and told.
   Answer FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   Answer FindFiles(std::vector<FoundFile>& files);  // kRefused when there are unlisted ones
+  // Of a file or folder, when the status is 0.
+  Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
   // By path and mode. An item file that is known to be larger than an item request takes is read as a plain one.
   Answer ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size);
   Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with folders and permissions
@@ -66,11 +68,9 @@ class PhoneItems {
   Answer Try(const std::function<bool()>& ask);
   bool Echoes16(size_t offset, uint16_t value) const;
   Answer Unanswered();
-  Answer Walk(const std::string& folder, int depth, std::vector<FoundFile>& files,
-              std::vector<UnlistedFolder>& unlisted);
+  Answer Walk(const std::string& path, int depth, std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
   bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
-  Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
   Answer ReadItemFile(PkvEfsFile& file, uint32_t& status);
   Answer ReadPlainFile(PkvEfsFile& file, uint32_t& status);
   Answer WriteItemFile(const PkvEfsFile& file, uint32_t& status);
@@ -82,6 +82,7 @@ class PhoneItems {
   NvBatch callers_batch_;
   KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
   KRAL_EFS_DIRECTORY_CALLBACK callers_directory_callback_;
+  size_t walked_ = 0;                           // folders and what is listed as one
   uint8_t refusal_ = 0;                         // the code of the last Try that was refused
   std::set<std::string, std::less<>> folders_;  // that were made, or were there
 };

@@ -4,6 +4,8 @@
 #include <set>
 
 #include "commands/core_diag.h"
+#include "commands/nv_item.h"
+#include "platform/file_util.h"
 #include "storage/phone_items.h"
 #include "storage/pkv_jobs.h"
 
@@ -95,7 +97,8 @@ class BackupJob {
       if (item.element) arrays.insert(item.id);
     }
     NoteArrays(arrays, set.properties);
-    return set.items.empty() && set.files.empty() ? KRAL_PKV_STATUS_NOTHING_READ : KRAL_PKV_STATUS_DONE;
+    if (set.items.empty() && set.files.empty()) return KRAL_PKV_STATUS_NOTHING_READ;
+    return report.counts().refused > 0 ? KRAL_PKV_STATUS_INCOMPLETE : KRAL_PKV_STATUS_DONE;
   }
 
  private:
@@ -110,8 +113,9 @@ class BackupJob {
     if (answer == Answer::kLost) return false;
     if (answer == Answer::kRefused) {
       report.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
-    } else if (item.status != 0) {
-      report.Add(item, KRAL_PKV_SKIPPED, item.status);
+    } else if (item.status != nv::kDone) {
+      const bool has_none = item.status == nv::kNeverWritten || item.status == nv::kNoSuchItem;
+      report.Add(item, has_none ? KRAL_PKV_SKIPPED : KRAL_PKV_REFUSED, item.status);
     } else {
       set.items.push_back(item);
       report.Add(item, KRAL_PKV_DONE, 0);
@@ -143,14 +147,20 @@ class BackupJob {
 uint32_t Backup(Diag_FTM& phone, const std::string& path) {
   PkvSet set;
   phone.pkv().counts = {};
+  // Before the many requests that would otherwise be in vain.
+  if (const std::error_code error = AtomicFile().Open(path)) {
+    phone.log().WriteLine(kLogErr, "%s: %s", path.c_str(), error.message().c_str());
+    return KRAL_PKV_STATUS_CANNOT_OPEN;
+  }
   ReadIdentity(phone, set.properties);
-  if (const uint32_t status = BackupJob(phone).Run(set); status != KRAL_PKV_STATUS_DONE) {
+  const uint32_t status = BackupJob(phone).Run(set);
+  if (status != KRAL_PKV_STATUS_DONE && status != KRAL_PKV_STATUS_INCOMPLETE) {
     phone.log().WriteLine(kLogErr, "KRAL_BackupNVFromMobileToPKV() - nothing written, status %u", status);
     return status;
   }
   const PkvOutcome outcome = WritePkv(path, set, &phone.log());
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
-  return StatusOf(outcome.result);
+  return outcome.done() ? status : StatusOf(outcome.result);
 }
 
 }  // namespace kral::pkv

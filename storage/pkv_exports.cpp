@@ -17,8 +17,21 @@ namespace {
 
 using Job = uint32_t (*)(Diag_FTM& phone, const std::string& path);
 
+class Running {
+ public:
+  explicit Running(bool& flag) : flag_(flag) { flag_ = true; }
+  ~Running() { flag_ = false; }
+  Running(const Running&) = delete;
+  Running& operator=(const Running&) = delete;
+
+ private:
+  bool& flag_;
+};
+
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   kral::Put(status, uint32_t{KRAL_PKV_STATUS_UNEXPECTED});
+  if (phone.pkv().running) return false;
+  const Running running(phone.pkv().running);
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   return result == KRAL_PKV_STATUS_DONE;

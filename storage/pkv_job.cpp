@@ -91,7 +91,9 @@ uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
   phone.pkv().counts = {};
   const PkvOutcome outcome = ReadPkv(path, set);
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
-  return StatusOf(outcome.result);
+  if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
+  phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
+  return KRAL_PKV_STATUS_BAD_ITEM;
 }
 
 std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
@@ -110,25 +112,30 @@ void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties) {
   properties.values.emplace_back(kArraysProperty, list);
 }
 
+std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties) {
+  const auto& values = properties.values;
+  const auto note =
+      std::find_if(values.begin(), values.end(), [](const auto& v) { return v.first == kArraysProperty; });
+  if (note == values.end()) return std::nullopt;
+  std::set<uint16_t> ids;
+  for (std::string_view rest = note->second; !rest.empty();) {
+    const std::string_view digits = rest.substr(0, rest.find(','));
+    rest.remove_prefix(std::min(digits.size() + 1, rest.size()));
+    uint16_t id = 0;
+    const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), id);
+    if (error == std::errc() && end == digits.data() + digits.size()) ids.insert(id);
+  }
+  return ids;
+}
+
 ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {
+  const auto noted = NotedArrays(set.properties);
+  if (noted) ids_ = *noted;
   for (const PkvNvItem& item : set.items) {
     if (item.index != 0) ids_.insert(item.id);
   }
-  const auto& properties = set.properties.values;
-  const auto listed =
-      std::find_if(properties.begin(), properties.end(), [](const auto& p) { return p.first == kArraysProperty; });
-  if (listed != properties.end()) {
-    for (std::string_view rest = listed->second; !rest.empty();) {
-      const std::string_view digits = rest.substr(0, rest.find(','));
-      rest.remove_prefix(std::min(digits.size() + 1, rest.size()));
-      uint16_t id = 0;
-      const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), id);
-      if (error == std::errc() && end == digits.data() + digits.size()) ids_.insert(id);
-    }
-    return;
-  }
   for (const auto& [id, highest_element] : DefinedItems(phone)) {
-    if (highest_element != 0) ids_.insert(id);
+    if (highest_element != 0 && !ids_.contains(id)) (noted ? unclear_ : ids_).insert(id);
   }
 }
 

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <map>
+#include <optional>
 #include <set>
 #include <string>
 
@@ -53,15 +54,21 @@ std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
 // Notes which ids are arrays, as "3101,3102": an element 0 alone looks like a plain item.
 void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties);
 
+// The ids of that note; nothing where there is none.
+std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties);
+
 // Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
 // those that the file notes. Where it has no such note, those that are defined so.
 class ArrayItems {
  public:
   ArrayItems(Diag_FTM& phone, const PkvSet& set);
   bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
+  // Defined as an array, but kept in a file that notes arrays and not this one: read without knowing which element.
+  bool IsUnclear(const PkvNvItem& item) const { return unclear_.contains(item.id); }
 
  private:
   std::set<uint16_t> ids_;
+  std::set<uint16_t> unclear_;
 };
 
 }  // namespace kral::pkv

@@ -31,11 +31,19 @@ class RestoreJob {
  private:
   // As many items as go together; gives how many these were.
   size_t RestorePacket(std::span<const PkvNvItem> rest) {
+    const PkvNvItem& first = rest.front();
+    if (arrays_.IsUnclear(first)) {
+      report_.Add(first, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+      return 1;
+    }
     size_t count = 0;
-    while (count < std::min(rest.size(), PhoneItems::kMostInBatch) && rest[count].subscription == 0) ++count;
+    while (count < std::min(rest.size(), PhoneItems::kMostInBatch) && rest[count].subscription == 0 &&
+           !arrays_.IsUnclear(rest[count])) {
+      ++count;
+    }
     const auto packet = rest.first(std::max<size_t>(count, 1));
-    if (count == 0 && IsInexpressible(packet.front())) {
-      report_.Add(packet.front(), KRAL_PKV_SKIPPED, 0);
+    if (count == 0 && IsInexpressible(first)) {
+      report_.Add(first, KRAL_PKV_SKIPPED, 0);
       return 1;
     }
     std::vector<uint16_t> statuses;

@@ -32,6 +32,10 @@ class VerifyJob {
       report_.Add(item, KRAL_PKV_SKIPPED, 0);
       return !report_.stopped();
     }
+    if (arrays_.IsUnclear(item)) {
+      report_.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+      return !report_.stopped();
+    }
     PkvNvItem present = item;
     const Answer answer = lost_ ? Answer::kLost : items_.Read(present, arrays_.IsElement(item));
     const bool equal = answer == Answer::kAnswered && present.status == 0 && present.data == item.data;

@@ -6,6 +6,7 @@
 #include <span>
 #include <utility>
 
+#include "frame/base/little_endian.h"
 #include "storage/nv_storage.h"
 
 namespace kral {
@@ -109,6 +110,12 @@ class VARN_PkvFile::IteratorImpl {
       throw Exception("VARN_PkvFile::IteratorImpl::increamentImpl() - Tried to read NV Item: " +
                       std::to_string(place.id) + ". Was only able to read " + std::to_string(place.record.size()) +
                       " out of " + std::to_string(pkv::kNumberedRecordSize));
+    }
+    // Another id or length word: the record is another one's, or out of step.
+    const auto length = LoadLe<uint16_t>(place.record, place.numbered ? pkv::kNumberedLength : 0);
+    if (item.id != place.id || length != (place.numbered ? pkv::kNumberedRecordSize : pkv::kArrayRecordSize)) {
+      throw Exception("VARN_PkvFile::IteratorImpl::increamentImpl() - NV Item: " + std::to_string(place.id) +
+                      " is damaged");
     }
     item.subscription = place.subscription;
     item_ = item;

@@ -28,9 +28,10 @@ extern "C" {
 /** Ends of the work. */
 #define KRAL_PKV_STATUS_DONE 0u
 #define KRAL_PKV_STATUS_CANNOT_OPEN 7u         /**< the file cannot be read, or cannot be written */
+#define KRAL_PKV_STATUS_INCOMPLETE 12u         /**< backup: the file is written, but the handset refused something */
 #define KRAL_PKV_STATUS_LOST 16u               /**< the handset does not answer */
 #define KRAL_PKV_STATUS_NO_STORAGE 18u         /**< the file is no PKV file */
-#define KRAL_PKV_STATUS_BAD_ITEM 20u           /**< something in the file is damaged */
+#define KRAL_PKV_STATUS_BAD_ITEM 20u           /**< something in the file is damaged, or it holds nothing */
 #define KRAL_PKV_STATUS_NOTHING_READ 22u       /**< the handset gave no item and no file */
 #define KRAL_PKV_STATUS_NOT_WRITTEN 23u        /**< the handset refused something, or reads back otherwise */
 #define KRAL_PKV_STATUS_DIFFERENT 256u         /**< file and handset differ */
@@ -74,7 +75,7 @@ typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
 /**
  * Called once for every item and file, with its final result, on the thread that called the function, until it stops
  * the work: what a restore had written together with the last one is then in the counts only. It must not call
- * functions of the handle.
+ * functions of the handle; another backup, restore or comparison would give KRAL_PKV_STATUS_UNEXPECTED.
  *
  * @param item    lives for the call only
  * @param path    of a file; null for an NV item
@@ -105,8 +106,12 @@ KRAL_API uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNT
 /**
  * Reads the handset's items and files and writes them to a PKV file, which is replaced in one step at the end.
  *
- * @return 1 when the status is 0. Files that the handset lists but does not give whole are left out and counted as
- *         refused, and so are folders, by their paths, whose files it does not list
+ * Items that were never written (status 5), and those that the handset does not know (6), have no value. All others
+ * that it does not give are refused: items with another status, files that it lists but does not give whole, and
+ * folders, by their paths, whose files it does not list. What was read is written even so, and the status is
+ * KRAL_PKV_STATUS_INCOMPLETE.
+ *
+ * @return 1 when the status is 0
  */
 KRAL_API uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, const char* file, uint32_t* status);
 
@@ -117,7 +122,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, cons
  *
  * An item that the handset refuses as read-only (status 7) is skipped when it holds the value already, or is in the
  * list of KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List. Elements of array items can be written for subscription 0 only, and
- * are skipped for others. Items queued in batch mode stay queued.
+ * are skipped for others. An item that is defined as an array now, in a file that notes its arrays and not this one,
+ * is refused (0xFFFF): it was read without knowing which element it is. Items queued in batch mode stay queued.
  *
  * @return 1 when everything was written, or skipped
  */

@@ -210,6 +210,20 @@ TEST_F(NvTool, ArraysHaveGapsAndNoOtherSubscription) {
   EXPECT_EQ(handset().nv().Element(30, 1)->front(), 3);
 }
 
+TEST_F(NvTool, APkvFileTellsWhatIsAnArray) {
+  handset().nv().MakeArray(5, 3);
+  PkvSet set;
+  set.items.push_back({.id = 5, .data = {2, 7}});  // as a plain item: element 2
+  set.properties.values = {{"Arrays", "5"}};
+  ASSERT_TRUE(WritePkv(Path("phone.pkv"), set).done());
+  ASSERT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), Path("phone.pkv").c_str()), 0u) << ErrorText();
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
+  EXPECT_EQ(handset().nv().Element(5, 0)->front(), 2);
+  EXPECT_FALSE(handset().nv().Element(5, 2));
+  ASSERT_EQ(Load(Item(5)), 0u);
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), Path("phone.pkv").c_str()), 20u) << "defined as a plain item";
+}
+
 TEST_F(NvTool, HandsetThatRefusesHalfOfTheItemsGetsTheRest) {
   std::string items;
   for (int id = 100; id < 120; ++id) items += Item(id);
@@ -346,6 +360,9 @@ TEST_F(NvTool, SourceItemsThatCannotBeTakenLeaveTheOthers) {
   EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), Path("nowhere").c_str()), 2u);
   EXPECT_EQ(KRAL_NV_LoadNVsFromSource(handle(), folder_.Add("x.xml", "<NvDefinition/>").c_str()), 5u);
   EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), Path("no/such/folder.xml").c_str()), 14u);
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), folder_.Add("kept.xml", "kept").c_str()), 10u);
+  EXPECT_EQ(folder_.Content("kept.xml"), "kept");
 }
 
 // --- PKV files -------------------------------------------------------------------------------------------------------
@@ -377,7 +394,7 @@ TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
   ASSERT_EQ(Load(others), 13u);
   EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
   EXPECT_EQ(Value(1), "error 10");
-  EXPECT_EQ(Value(30), "3,4");
+  EXPECT_EQ(Value(30), "error 10") << "an array there, and none here";
   EXPECT_NE(ErrorText().find("NV ID 30 with index 2 has no place"), std::string::npos);
 
   EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), Path("nowhere").c_str()), 7u);

@@ -245,6 +245,35 @@ TEST_F(PkvBackup, WhatIsAnArrayIsInTheFile) {
   EXPECT_EQ(Bytes(element.begin(), element.begin() + 2), (Bytes{2, 7}));
 }
 
+// A plain request for an array names the element in its first byte, in both directions.
+TEST_F(PkvBackup, AnArrayThatNobodyDefinedLosesNothing) {
+  handset().nv().MakeArray(5, 3);
+  for (uint8_t index = 0; index < 3; ++index) handset().nv().SetElement(5, index, Bytes{uint8_t(index + 1), 0xAA});
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  handset().nv().SetElement(5, 0, Bytes{9});
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u);
+  for (uint8_t index = 0; index < 3; ++index) EXPECT_EQ(handset().nv().Element(5, index)->front(), index + 1);
+
+  const std::string definition =
+      "<NvDefinition version='1.0'><NvItem id='5' maxIndex='2'><DataType><Member typeid='word8'/></DataType></NvItem>"
+      "</NvDefinition>";
+  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), folder_.Add("array.xml", definition).c_str()), 0u);
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results["5"], Result(KRAL_PKV_REFUSED, 0xFFFF)) << "now it would be taken for an element";
+  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
+}
+
+TEST_F(PkvBackup, ARefusedItemMakesItIncomplete) {
+  Furnish();
+  handset().nv().SetStatus(6, NvStatus::kFailed);
+  handset().nv().SetStatus(9, NvStatus::kBadItem);
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE);
+  EXPECT_EQ(g_results["6"], Result(KRAL_PKV_REFUSED, 4));
+  EXPECT_EQ(g_results["9"], Result(KRAL_PKV_SKIPPED, 6));
+  EXPECT_EQ(Read().items.size(), kValues - 5);
+}
+
 // --- Trouble on the line --------------------------------------------------------------------------------------------
 
 // One fault at every packet: the work is done all the same, with the right values, or fails and says so.
@@ -402,8 +431,10 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
     EXPECT_EQ(job(handle(), nullptr, nullptr), 0);
     EXPECT_EQ(job(0, "none.pkv", nullptr), 0);
   }
-  EXPECT_TRUE(handset().requests().empty());
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "no folder/phone.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
+  ASSERT_TRUE(WritePkv(folder_.Path("empty.pkv"), {}).done());
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV, "empty.pkv"), KRAL_PKV_STATUS_BAD_ITEM);
+  EXPECT_TRUE(handset().requests().empty());
   handset().nv().SetStatus(0, NvStatus::kInactive);
   ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 0, 1), 1);
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_NOTHING_READ);
@@ -420,7 +451,11 @@ TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
   for (int i = 0; i < 12; ++i) deep += "/d";
   handset().efs().AddFile(deep + "/deep", Bytes{1});
   handset().efs().AddLink("/nv/items/loop", "/nv/items");
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  handset().efs().AddDirectory("/nv/items/self");
+  handset().efs().AddDirectory("/nv/items/above");
+  handset().efs().ShowNameAs("self", ".");
+  handset().efs().ShowNameAs("above", "..");
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE) << ErrorText();
   EXPECT_EQ(g_results["/nv/items/huge"], Result(KRAL_PKV_REFUSED, 0xFFFF));
   ASSERT_EQ(Read().files.size(), 1u);
   EXPECT_EQ(Read().files[0].path, "/nv/items/good");
@@ -433,7 +468,7 @@ TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
   handset().efs().AddItemFile(large, RandomBytes(2000));
   handset().efs().AddItemFile("/nv/items/full", RandomBytes(1024));
   handset().efs().AddFile(far, Bytes{1});
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE) << ErrorText();
   EXPECT_EQ(g_results[large], Result(KRAL_PKV_REFUSED, 0xFFFF));
   EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
   PkvSet set = Read();
@@ -458,15 +493,16 @@ TEST_F(PkvBackup, FoldersThatCannotBeListedAreTold) {
     Fault fault;
     When when;
     std::string counts;
+    uint32_t status;
   } kRows[] = {
-      {"no file system", handset::Refuse(19), When::Always().Of("4B 13"), "20 40 0 0 0 0"},
-      {"stat refused", handset::Refuse(20), When::Nth(1).Of("4B 13 0F 00"), "22 40 1 0 0 0"},
-      {"opendir refused", handset::Refuse(24), When::Always().Of("4B 13 0B 00"), "20 40 3 0 0 0"},
+      {"no file system", handset::Refuse(19), When::Always().Of("4B 13"), "20 40 0 0 0 0", 0},
+      {"stat refused", handset::Refuse(20), When::Nth(1).Of("4B 13 0F 00"), "22 40 1 0 0 0", 12},
+      {"opendir refused", handset::Refuse(24), When::Always().Of("4B 13 0B 00"), "20 40 3 0 0 0", 12},
   };
   for (const auto& row : kRows) {
     SCOPED_TRACE(row.name);
     handset().faults().Add(row.fault, row.when);
-    EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+    EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), row.status) << ErrorText();
     EXPECT_EQ(Counts(), row.counts);
     EXPECT_EQ(g_results.contains("/nv/items"), std::string_view(row.name) != "no file system");
     handset().faults().Clear();

@@ -194,6 +194,11 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
     case KRAL_PKV_STATUS_NOTHING_READ:
       return {ExitCode::kRefused, fmt::format("the handset on {} gave no item", DescribePort(session.port())),
               "check the range of --items"};
+    case KRAL_PKV_STATUS_INCOMPLETE:
+      return {ExitCode::kRefused,
+              fmt::format("the handset on {} refused {} items; {} holds the others", DescribePort(session.port()),
+                          counts.refused, file),
+              "the result names them; some may need an unlock or another mode"};
     case KRAL_PKV_STATUS_NOT_WRITTEN:
       if (counts.refused > 0) {
         return {ExitCode::kRefused,
