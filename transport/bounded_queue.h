@@ -103,12 +103,16 @@ class BoundedQueue {
 
  private:
   void Append(Record record) {  // locked
-    if (records_.size() >= capacity_) {
-      records_.pop_front();
-      ++dropped_;
-    }
-    records_.push_back(std::move(record));
     ++pushed_;
+    try {
+      records_.push_back(std::move(record));
+    } catch (...) {
+      ++dropped_;  // out of memory
+      return;
+    }
+    if (records_.size() <= capacity_) return;
+    records_.pop_front();
+    ++dropped_;
   }
 
   std::optional<Record> TakeFront() {

@@ -44,9 +44,10 @@ void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> pac
 
 void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   if (gathered_.empty()) return;
-  packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
+  const size_t count = gathered_.size();
   if (dispatcher != nullptr) dispatcher->PushAll(gathered_);
   gathered_.clear();
+  packets.fetch_add(count, std::memory_order_relaxed);
 }
 
 void CKralThreadInterface::SetLogger(DataLogFileHandler* log) {

@@ -334,11 +334,16 @@ TEST_F(Collection, SlowCallbackHoldsUpAnswersAndLosesNone) {
   EXPECT_EQ(CountersOf(handle()).collected, 50u);
 }
 
-// A flood with commands in between: every packet sent is collected or counted, and every command is answered.
+// In either receive mode.
+class Flood : public Collection, public testing::WithParamInterface<uint8_t> {};
+INSTANTIATE_TEST_SUITE_P(ReceiveMode, Flood, testing::Values(0, 1));
+
+// With commands in between: every packet sent is collected or counted, and every command is answered.
 // KRAL_TEST_FLOOD_SECONDS makes it longer.
-TEST_F(Collection, FloodLosesNothingUncounted) {
+TEST_P(Flood, LosesNothingUncounted) {
   const auto seconds_text = EnvironmentValue("KRAL_TEST_FLOOD_SECONDS");
-  const auto length = std::chrono::milliseconds(seconds_text ? 1000 * std::stol(*seconds_text) : 500);
+  const auto length = std::chrono::milliseconds(seconds_text ? 1000 * std::stol(*seconds_text) : 250);
+  ASSERT_EQ(KRAL_SetReceiveMode(handle(), GetParam()), 1);
   KRAL_SetLogFlags(handle(), 0);
   ASSERT_EQ(KRAL_StartCapture(handle(), folder_.Path("flood").c_str()), 1);
   ASSERT_EQ(KRAL_DIAG_AddExtendedLogCode(handle(), 1, 0x1001), 1);
@@ -370,6 +375,9 @@ TEST_F(Collection, FloodLosesNothingUncounted) {
   EXPECT_EQ(taken + counters.dropped_logs, counters.collected);
   EXPECT_EQ(KRAL_StopCapture(handle()), 1);
   EXPECT_EQ(CountersOf(handle()).captured, sent.packets());
+  RecordProperty("packets", std::to_string(sent.packets()));
+  RecordProperty("dropped", std::to_string(counters.dropped_logs));
+  RecordProperty("commands", std::to_string(2 * commands));
 }
 
 }  // namespace
