@@ -21,6 +21,7 @@ class NvItems(ToolTest):
             self.assertRegex(text, r"6000\n0000 +AA BB 00")
             # The handset's word on what it will not do, and the tool's on what makes no sense.
             for code, text, *words in ((7, "5, never written", "read", "453", "7000"),
+                                       (7, "/nv/none (there is no such file)", "read", "/nv/none"),
                                        (7, "7, read-only", "write", "0", "AA"),
                                        (2, "out of the range of mode", "write", "10", "1,70000", *self.DEFS),
                                        (2, "", "read", "NO_SUCH_ITEM", *self.DEFS), (2, "", "dump"),
@@ -37,12 +38,39 @@ class NvItems(ToolTest):
             answer = self.ask(0, "nv", "dump", *self.DEFS, "--pkv", pkv[1], "--source", source)
             self.assertEqual([item["name"] for item in answer["items"]], ["ESN", "FTM_MODE"])
             self.assertEqual(len(self.ask(0, "nv", "dump", "--items", "450-460")["items"]), 1)
-        self.expect(0, "nv", "diff", *pkv, page, *self.DEFS)
+        self.assertEqual(self.expect_json(8, "nv", "diff", *pkv, page, *self.DEFS)["counts"],
+                         {"equal": 1, "different": 1, "only-in-first": 0, "only-in-second": 0})
         self.assertIn(b"enabled: 0 to 1", self.content("page.html"))
         subprocess.run(["xmllint", "--noout", source, self.DEFS[1]], check=True, timeout=PATIENCE)
-        self.expect_json(10, "nv", "diff", pkv[0], source, page)
+        self.assertIn("2 equal, 0 different", self.expect(0, "nv", "diff", pkv[0], pkv[0], page).out)
+        for file in (source, self.path("none.pkv")):
+            self.assertEqual(self.expect_json(10, "nv", "diff", pkv[0], file, page)["error"]["text"].count(file), 1)
         self.assertEqual(len(self.expect_json(0, "nv", "defs", self.DEFS[1])["definitions"]), 29)
         self.assertIn("3101 CHANNEL_OFFSET [0-3]\n", self.expect(0, "nv", "defs", self.DEFS[1]).out)
+
+    def test_dump_keeps_items_without_definition(self):
+        source = self.path("source.xml")
+        with self.handset("--fault", "hang-up,nth=9,of=26"):
+            answer = self.ask(0, "nv", "dump", "--items", "0-2", "--source", source)
+            kept = self.content("source.xml")
+            self.assertIn(answer["items"][0]["bytes"].encode(), kept)
+            self.assertEqual((kept.count(b"<NvItem"), answer["without_value"], answer["refused"]), (1, 2, []))
+            # Without a value there is nothing to write, and what was read is told when the handset goes away.
+            self.assertIn("no value", self.ask(7, "nv", "dump", "--items", "1-2", "--source", source)["error"]["text"])
+            answer = self.ask(9, "nv", "dump", "--items", "0-99", "--time-out", "200")
+            self.assertEqual([item["id"] for item in answer["items"]], [0])
+            self.assertEqual(self.content("source.xml"), kept)
+
+    def test_members_are_named_by_the_form_of_the_value(self):
+        definitions = self.add("types.xml", b"""<NvDefinition>
+            <NvItem id="6001" name="SIGNED"><DataType variantType="255"><Member name="kind" typeid="word8" signed="1"/>
+            <Member name="rest" typeid="word8"/></DataType></NvItem>
+            <NvItem id="6002" name="SAME"><DataType><Member name="a" typeid="word8"/>
+            <Member name="a" typeid="word8" num_of_element="2"/></DataType></NvItem></NvDefinition>""")
+        with self.handset():
+            for name, value, expected in (("SIGNED", "-1,7", {"kind": -1, "rest": 7}), ("SAME", "1,2,3", [1, [2, 3]])):
+                answer = self.ask(0, "nv", "write", name, value, "--defs", definitions)
+                self.assertEqual(answer["item"]["value"], expected)
 
 
 class Backups(ToolTest):
@@ -76,3 +104,12 @@ class Backups(ToolTest):
                 self.nv(2, "backup", "--items", items)
             self.nv(2, "backup", "--subscriptions", "0")
             self.assertIn("no item", self.nv(7, "backup", "--items", "5")["error"]["text"])
+            self.assertRegex(self.nv(10, "verify")["error"]["text"], r"phone\.pkv cannot be used - \w+")
+        with self.handset("--fault", "refuse=20,of=26"):
+            self.assertIn("refused 4", self.nv(7, "backup", "--items", "0-3")["error"]["text"])
+
+    def test_definitions_name_items_beyond_the_range(self):
+        with self.handset():
+            self.ask(0, "nv", "write", "FTM_MODE", "1", *NvItems.DEFS)
+            self.assertEqual(self.nv(0, "backup", "--items", "1", *NvItems.DEFS)["counts"]["read"], 2)  # and item 0
+            self.assertEqual(self.nv(0, "verify", *NvItems.DEFS)["counts"]["equal"], 2)

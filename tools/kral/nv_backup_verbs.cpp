@@ -3,13 +3,13 @@
 
 #include <CLI/CLI.hpp>
 #include <array>
-#include <charconv>
 #include <memory>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "tools/kral/interrupt.h"
+#include "tools/kral/nv_items.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/verbs.h"
 
@@ -17,6 +17,7 @@ namespace kral::tool {
 namespace {
 
 struct BackupOptions {
+  NvOptions nv;
   std::string file;
   std::string items = "0-9999";
   std::uint16_t subscriptions = 1;
@@ -53,20 +54,6 @@ const char* WordOf(std::uint32_t result, const Words& words) {
     default:
       return "not-reached";
   }
-}
-
-// "7" or "0-9999".
-std::pair<std::uint16_t, std::uint16_t> ParseItems(const std::string& text) {
-  std::uint16_t first = 0;
-  std::uint16_t last = 0;
-  const char* const end = text.data() + text.size();
-  auto parsed = std::from_chars(text.data(), end, first);
-  last = first;
-  if (parsed.ec == std::errc() && parsed.ptr != end && *parsed.ptr == '-') {
-    parsed = std::from_chars(parsed.ptr + 1, end, last);
-  }
-  if (parsed.ec == std::errc() && parsed.ptr == end && first <= last) return {first, last};
-  throw ToolError(ExitCode::kUsage, fmt::format("{} is no range of items", text), "give --items as in 0-9999");
 }
 
 // One run of a job: its progress, and what became of each item. The library's callback carries the handle and nothing
@@ -165,20 +152,12 @@ class JobRun {
   std::string text_;
 };
 
-std::string ErrorText(std::uint32_t status) {
-  switch (status) {
-    case KRAL_PKV_STATUS_NO_STORAGE:
-      return "is no PKV file";
-    case KRAL_PKV_STATUS_BAD_ITEM:
-      return "holds a damaged item";
-    default:
-      return "cannot be used";
-  }
-}
-
 ToolError BadFile(const std::string& file, std::uint32_t status) {
-  return {ExitCode::kBadFile, fmt::format("{} {}", file, ErrorText(status)),
-          "check the name and the permissions of the file; --log FILE tells what is wrong with it"};
+  const char* const fault = status == KRAL_PKV_STATUS_NO_STORAGE ? "is no PKV file"
+                            : status == KRAL_PKV_STATUS_BAD_ITEM ? "holds a damaged item"
+                                                                 : "cannot be used";
+  return {ExitCode::kBadFile, fmt::format("{} {}{}", file, fault, CauseOf(file)),
+          "check the file and the disk that it is on, then run the command again"};
 }
 
 // The end of a job that did not come out as wanted.
@@ -192,6 +171,12 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
       return {ExitCode::kLost, fmt::format("the handset stopped answering during {}", where),
               "check the cable, then run the command again"};
     case KRAL_PKV_STATUS_NOTHING_READ:
+      if (counts.refused > 0) {
+        return {
+            ExitCode::kRefused,
+            fmt::format("the handset on {} gave no item and refused {}", DescribePort(session.port()), counts.refused),
+            "the result names them; some may need an unlock or another mode"};
+      }
       return {ExitCode::kRefused, fmt::format("the handset on {} gave no item", DescribePort(session.port())),
               "check the range of --items"};
     case KRAL_PKV_STATUS_INCOMPLETE:
@@ -221,8 +206,9 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
 void RunJob(Context& context, const BackupOptions& options, const char* work, Job job, const Words& words,
             bool keeps_all) {
   Session session(context.session);
+  const NvItems definitions(session, options.nv);  // the library then knows arrays, and items beyond the range
   if (job == KRAL_BackupNVFromMobileToPKV) {
-    const auto [first, last] = ParseItems(options.items);
+    const auto [first, last] = ParseIdRange(options.items);
     KRAL_PKV_ConfigureBackup(session.handle(), first, last, options.subscriptions);
   }
   if (!options.read_only.empty()) {
@@ -250,7 +236,7 @@ void RunJob(Context& context, const BackupOptions& options, const char* work, Jo
 }
 
 void Backup(Context& context, const BackupOptions& options) {
-  ParseItems(options.items);
+  ParseIdRange(options.items);
   RunJob(context, options, "backup", KRAL_BackupNVFromMobileToPKV, kBackupWords, false);
 }
 
@@ -273,6 +259,7 @@ void AddNvBackupVerbs(CLI::App& app, Context& context) {
   const auto add = [&](const char* name, const char* help, void (*act)(Context&, const BackupOptions&)) {
     auto* verb = nv->add_subcommand(name, help);
     verb->add_option("file", options->file, "PKV file")->required();
+    AddDefinitionOptions(*verb, options->nv);
     verb->callback([&context, options, act] { context.run = [&context, options, act] { act(context, *options); }; });
     return verb;
   };

@@ -1,4 +1,4 @@
-// Loads definitions, reads and writes items, and names the numbers of their values.
+// Loads definitions, finds, reads and writes items. How they are shown is in nv_item_output.cpp.
 #include "tools/kral/nv_items.h"
 
 #include <fmt/format.h>
@@ -6,13 +6,19 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <string_view>
 
 #include "platform/xml_document.h"
 #include "tools/kral/error_lines.h"
 #include "tools/kral/hex_bytes.h"
+#include "tools/kral/output.h"
 
 namespace kral::tool {
 namespace {
+
+// NV statuses of items that have no value.
+constexpr std::uint16_t kNeverWritten = 5;
+constexpr std::uint16_t kUnknown = 6;
 
 std::optional<std::uint16_t> ParseId(std::string_view text) {
   std::uint16_t id = 0;
@@ -79,40 +85,8 @@ std::vector<std::string> Split(const std::string& numbers) {
   return parts;
 }
 
-// JSON numbers beyond what a double holds exactly stay exact here: the library's words have up to 64 bits.
-Json JsonNumber(const std::string& text) {
-  if (text.starts_with('-')) {
-    std::int64_t value = 0;
-    std::from_chars(text.data(), text.data() + text.size(), value);
-    return value;
-  }
-  std::uint64_t value = 0;
-  std::from_chars(text.data(), text.data() + text.size(), value);
-  return value;
-}
-
-struct NamedNumbers {
-  std::string name;
-  bool is_list;
-  std::vector<std::string> numbers;
-};
-
-std::vector<NamedNumbers> Named(const NvItem& item, const std::vector<std::string>& numbers) {
-  const NvForm* form = nullptr;
-  for (const NvForm& candidate : item.forms) {
-    const bool fits = candidate.selector.empty() || (!numbers.empty() && candidate.selector == numbers[0]);
-    if (fits && (form == nullptr || form->selector.empty())) form = &candidate;
-  }
-  std::vector<NamedNumbers> named;
-  if (form == nullptr) return named;
-  std::size_t next = 0;
-  for (const NvMember& member : form->members) {
-    const std::size_t count = std::min(member.count, numbers.size() - next);
-    const auto first = numbers.begin() + static_cast<std::ptrdiff_t>(next);
-    named.push_back({member.name, member.count > 1, {first, first + static_cast<std::ptrdiff_t>(count)}});
-    next += count;
-  }
-  return named;
+NvReading::Kind KindOf(std::uint16_t failure) {
+  return failure == kNeverWritten || failure == kUnknown ? NvReading::Kind::kNoValue : NvReading::Kind::kRefused;
 }
 
 ExitCode ExitOf(std::uint32_t code) {
@@ -138,13 +112,21 @@ ExitCode ExitOf(std::uint32_t code) {
 
 std::string DescribeNvStatus(std::uint16_t status) {
   switch (status) {
-    case 5:
+    case kNeverWritten:
       return "5, never written";
+    case kUnknown:
+      return "6, unknown to the handset";
     case KRAL_NV_STATUS_READ_ONLY:
       return "7, read-only";
     default:
       return fmt::to_string(status);
   }
+}
+
+std::string DescribeReading(const NvItem& item, const NvReading& reading) {
+  if (!item.path.empty()) return reading.kind == NvReading::Kind::kNoValue ? "there is no such file" : "refused";
+  // Refused as a whole, an answer has no status.
+  return reading.status == 0 ? "refused" : "status " + DescribeNvStatus(reading.status);
 }
 
 std::string NvItem::Title() const {
@@ -183,24 +165,33 @@ void NvItems::ListItems() {
     std::string problem;
     if (!text) continue;
     const std::vector<std::uint8_t> bytes(text->begin(), text->end());
-    if (ParseXml(bytes, element, problem) == XmlResult::kOk) items_.push_back(ItemOf(element));
+    if (ParseXml(bytes, element, problem) != XmlResult::kOk) continue;
+    items_.push_back(ItemOf(element));
+    const NvItem& item = items_.back();
+    // Numbered items come before the files that have an id, too, and go before them.
+    if (item.id) by_id_.try_emplace(*item.id, items_.size() - 1);
+    if (!item.path.empty()) by_text_.try_emplace(item.path, items_.size() - 1);
+    if (!item.name.empty()) by_text_.try_emplace(item.name, items_.size() - 1);
   }
 }
 
-NvItem NvItems::Find(const std::string& which) const {
-  const auto id = ParseId(which);
-  const auto found = std::find_if(items_.begin(), items_.end(), [&](const NvItem& item) {
-    return item.name == which || item.path == which || (id && item.id == id);
-  });
-  if (found != items_.end()) return *found;
+NvItem NvItems::Find(std::uint16_t id) const {
+  if (const auto found = by_id_.find(id); found != by_id_.end()) return items_[found->second];
   NvItem item;
   item.defined = false;
   item.id = id;
-  if (id) return item;
+  return item;
+}
+
+NvItem NvItems::Find(const std::string& which) const {
+  if (const auto id = ParseId(which)) return Find(*id);
+  if (const auto found = by_text_.find(which); found != by_text_.end()) return items_[found->second];
   if (which.find('/') == std::string::npos) {
     throw ToolError(ExitCode::kUsage, fmt::format("there is no item {}", which),
                     "give an NV id, a path of the handset, or the name of an item in a file given by --defs");
   }
+  NvItem item;
+  item.defined = false;
   item.path = which;
   return item;
 }
@@ -210,33 +201,71 @@ void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t a
   if (code == KRAL_NV_ERROR_NO_CONNECTION) throw session_.Explain(what);
   std::array<char, 128> text{};
   KRAL_NV_GetErrorText(0, code, text.data(), static_cast<std::uint32_t>(text.size()));
-  const auto lines = ErrorLines();
-  const std::string detail = lines.empty() ? "" : Printable(lines.back());
-  throw ToolError(ExitOf(code), fmt::format("{}: {}{}", what, text.data(), detail.empty() ? "" : " - " + detail),
+  throw ToolError(ExitOf(code), fmt::format("{}: {}{}", what, text.data(), CauseOf(what)),
                   "--log FILE tells every item; docs/nv.md describes the files");
 }
 
-bool NvItems::Read(const NvItem& item, std::uint16_t& status) {
+NvReading NvItems::Read(const NvItem& item) {
   session_.Begin();
-  status = 0;
-  if (!item.path.empty()) {
-    const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByEfsFilename(session_.handle(), item.path.c_str());
-    Check(code, item.path, KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM);
-    return code == 0;
+  if (!item.path.empty()) return ReadFile(item);
+  return item.defined ? ReadDefined(item) : ReadBytes(item);
+}
+
+NvReading NvItems::ReadFile(const NvItem& item) {
+  const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByEfsFilename(session_.handle(), item.path.c_str());
+  Check(code, item.path, KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM);
+  NvReading reading;
+  // A file that is not there is refused without a line.
+  if (code != 0) {
+    reading.kind = FindErrorLine("was refused with status") ? NvReading::Kind::kRefused : NvReading::Kind::kNoValue;
+  } else {
+    reading.elements = Elements(item);
   }
-  if (item.defined) {
-    const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByNVID(session_.handle(), *item.id, &status);
-    Check(code, fmt::format("NV item {}", *item.id), KRAL_NV_ERROR_CANNOT_GET_VALUE);
-    return code == 0;
+  return reading;
+}
+
+NvReading NvItems::ReadDefined(const NvItem& item) {
+  NvReading reading;
+  const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByNVID(session_.handle(), *item.id, &reading.status);
+  Check(code, fmt::format("NV item {}", *item.id), KRAL_NV_ERROR_CANNOT_GET_VALUE);
+  if (code != 0) {
+    reading.kind = KindOf(reading.status);
+  } else {
+    reading.elements = Elements(item);
   }
-  bytes_.assign(KRAL_NV_DATA_SIZE, 0);
-  session_.Run(fmt::format("NV item {}", *item.id), [&] {
-    return options_.subscription
-               ? KRAL_DIAG_NV_READ_EXT_F(session_.handle(), *item.id, bytes_.data(), *options_.subscription,
-                                         KRAL_NV_DATA_SIZE, &status)
-               : KRAL_DIAG_NV_READ_F(session_.handle(), *item.id, bytes_.data(), KRAL_NV_DATA_SIZE, &status);
-  });
-  return status == KRAL_NV_STATUS_DONE;
+  return reading;
+}
+
+NvReading NvItems::ReadBytes(const NvItem& item) {
+  const std::string what = fmt::format("NV item {}", *item.id);
+  const KRAL_HANDLE handle = session_.handle();
+  NvReading reading;
+  reading.bytes.assign(KRAL_NV_DATA_SIZE, 0);
+  const bool answered =
+      (options_.subscription
+           ? KRAL_DIAG_NV_READ_EXT_F(handle, *item.id, reading.bytes.data(), *options_.subscription, KRAL_NV_DATA_SIZE,
+                                     &reading.status)
+           : KRAL_DIAG_NV_READ_F(handle, *item.id, reading.bytes.data(), KRAL_NV_DATA_SIZE, &reading.status)) != 0;
+  if (!answered) {
+    const ToolError error = session_.Explain(what);
+    if (error.code() != ExitCode::kRefused) throw error;
+    reading.kind = NvReading::Kind::kRefused;
+    return reading;
+  }
+  // The library looks for an id that the handset does not have among the files, too: it is asked for those only that
+  // are there. What it has read then is what is shown.
+  if (reading.status == KRAL_NV_STATUS_DONE && keeps_undefined_) {
+    const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByNVID(handle, *item.id, &reading.status);
+    Check(code, what, KRAL_NV_ERROR_CANNOT_GET_VALUE);
+    if (code != 0) {
+      reading.kind = KindOf(reading.status);
+      return reading;
+    }
+    std::uint32_t size = KRAL_NV_DATA_SIZE;
+    Check(KRAL_NV_GetNVValueByteStreamByNVID(handle, *item.id, 0, reading.bytes.data(), &size), what);
+  }
+  if (reading.status != KRAL_NV_STATUS_DONE) reading.kind = KindOf(reading.status);
+  return reading;
 }
 
 void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::string& value) {
@@ -291,51 +320,13 @@ std::optional<std::string> NvItems::Value(const NvItem& item, std::uint16_t arra
       });
 }
 
-Json NvItems::ToJson(const NvItem& item) const {
-  Json json = Json::object();
-  if (item.id) json["id"] = *item.id;
-  if (!item.path.empty()) json["path"] = Printable(item.path);
-  if (!item.name.empty()) json["name"] = item.name;
-  if (!item.defined && item.path.empty()) {
-    json["bytes"] = HexText(bytes_);
-    return json;
-  }
-  Json elements = Json::array();
+std::vector<NvElement> NvItems::Elements(const NvItem& item) const {
+  std::vector<NvElement> elements;
   for (std::uint32_t index = 0; index <= item.max_index; ++index) {
-    const auto value = Value(item, static_cast<std::uint16_t>(index));
-    if (!value) continue;
-    Json members = Json::object();
-    Json numbers = Json::array();
-    for (const auto& number : Split(*value)) numbers.push_back(JsonNumber(number));
-    for (const auto& member : Named(item, Split(*value))) {
-      Json list = Json::array();
-      for (const auto& number : member.numbers) list.push_back(JsonNumber(number));
-      members[member.name] = member.is_list || list.empty() ? list : list[0];
-    }
-    Json element = {{"index", index}, {"value", item.defined ? members : numbers}};
-    elements.push_back(std::move(element));
+    const auto element = static_cast<std::uint16_t>(index);
+    if (const auto value = Value(item, element)) elements.push_back({element, Split(*value)});
   }
-  if (item.max_index > 0) {
-    json["elements"] = elements;
-  } else {
-    json["value"] = elements.empty() ? Json() : elements[0]["value"];
-  }
-  return json;
-}
-
-std::string NvItems::ToText(const NvItem& item) const {
-  std::string text = item.Title() + "\n";
-  if (!item.defined && item.path.empty()) return text + HexDump(bytes_);
-  for (std::uint32_t index = 0; index <= item.max_index; ++index) {
-    const auto value = Value(item, static_cast<std::uint16_t>(index));
-    if (!value) continue;
-    const std::string element = item.max_index > 0 ? fmt::format("[{}] ", index) : "";
-    if (!item.defined) text += fmt::format("  {}{}\n", element, *value);
-    for (const auto& member : Named(item, Split(*value))) {
-      text += fmt::format("  {}{:<24} {}\n", element, member.name, fmt::join(member.numbers, " "));
-    }
-  }
-  return text;
+  return elements;
 }
 
 }  // namespace kral::tool

@@ -2,9 +2,14 @@
 #include <fmt/format.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
+#include <array>
 #include <charconv>
 #include <memory>
+#include <string_view>
 
+#include "tools/kral/error_lines.h"
+#include "tools/kral/nv_item_output.h"
 #include "tools/kral/nv_items.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/verbs.h"
@@ -31,27 +36,69 @@ SessionOptions WithoutHandset(const Context& context) {
   return options;
 }
 
+// What a verb has read so far.
+struct ReadSoFar {
+  Json items = Json::array();
+  Json refused = Json::array();
+  std::string text;
+  std::string refusals;  // "453 FTM_MODE (status 4), ..."
+  std::string missing;   // the same of items without a value
+  std::size_t without_value = 0;
+
+  void Add(const NvItem& item, const NvReading& reading) {
+    if (reading.has_value()) {
+      items.push_back(ValueJson(item, reading));
+      text += ValueText(item, reading);
+      return;
+    }
+    const std::string reason = DescribeReading(item, reading);
+    const bool is_refused = reading.kind == NvReading::Kind::kRefused;
+    std::string& list = is_refused ? refusals : missing;
+    list += fmt::format("{}{} ({})", list.empty() ? "" : ", ", item.Title(), reason);
+    if (!is_refused) {
+      ++without_value;
+      return;
+    }
+    Json row = TitleJson(item);
+    row["reason"] = reason;
+    refused.push_back(std::move(row));
+  }
+
+  // For the end of a verb that fails.
+  void Keep(Context& context) const {
+    context.found.update(Json{{"items", items}, {"without_value", without_value}, {"refused", refused}});
+    if (!context.out.json() && !text.empty()) context.out.Note(text);
+  }
+};
+
+void ReadAll(Context& context, NvItems& items, const std::vector<NvItem>& wanted, ReadSoFar& read) {
+  try {
+    Progress progress(context.out, "read", wanted.size(), Progress::Unit::kItems);
+    for (const NvItem& item : wanted) {
+      progress.Describe(item.Title());
+      read.Add(item, items.Read(item));
+      progress.Advance(1);
+    }
+  } catch (const ToolError&) {
+    read.Keep(context);
+    throw;
+  }
+}
+
 void ReadItems(Context& context, const Arguments& arguments) {
   Session session(context.session);
   NvItems items(session, arguments.options);
-  Json read = Json::array();
-  std::string text;
-  std::string missing;
-  for (const std::string& which : arguments.items) {
-    const NvItem item = items.Find(which);
-    std::uint16_t status = 0;
-    if (items.Read(item, status)) {
-      read.push_back(items.ToJson(item));
-      text += items.ToText(item);
-      continue;
-    }
-    missing += fmt::format("{}{} (status {})", missing.empty() ? "" : ", ", item.Title(), DescribeNvStatus(status));
-  }
-  if (missing.empty()) return context.out.Result({{"port", session.port()}, {"items", read}}, text);
-  context.found["items"] = read;
-  if (!context.out.json() && !text.empty()) context.out.Note(text);
+  std::vector<NvItem> wanted;
+  for (const std::string& which : arguments.items) wanted.push_back(items.Find(which));
+  ReadSoFar read;
+  ReadAll(context, items, wanted, read);
+  const std::string missing =
+      read.missing + (read.missing.empty() || read.refusals.empty() ? "" : ", ") + read.refusals;
+  if (missing.empty()) return context.out.Result({{"port", session.port()}, {"items", read.items}}, read.text);
+  read.Keep(context);
   throw ToolError(ExitCode::kRefused, fmt::format("the handset gives no value for {}", missing),
-                  "an item that was never written has none");
+                  read.refusals.empty() ? "an item that was never written has none"
+                                        : "what is refused may need an unlock or another mode");
 }
 
 void WriteItem(Context& context, const Arguments& arguments) {
@@ -59,30 +106,28 @@ void WriteItem(Context& context, const Arguments& arguments) {
   NvItems items(session, arguments.options);
   const NvItem item = items.Find(arguments.item);
   items.Write(item, arguments.array_index, arguments.value);
-  std::uint16_t status = 0;
-  if (!items.Read(item, status)) {
+  const NvReading reading = items.Read(item);
+  if (!reading.has_value()) {
     throw ToolError(ExitCode::kMismatch, fmt::format("{} was written and cannot be read back", item.Title()),
                     "the item may be one that can only be written");
   }
-  context.out.Result({{"port", session.port()}, {"item", items.ToJson(item)}}, items.ToText(item));
+  context.out.Result({{"port", session.port()}, {"item", ValueJson(item, reading)}}, ValueText(item, reading));
 }
 
-// "0-999", "453": the ids to be read without definitions.
 std::vector<NvItem> ItemsOfRange(const NvItems& items, const std::string& range) {
-  std::uint32_t first = 0;
-  std::uint32_t last = 0;
-  const char* const end = range.data() + range.size();
-  auto parsed = std::from_chars(range.data(), end, first);
-  last = first;
-  if (parsed.ec == std::errc() && parsed.ptr != end && *parsed.ptr == '-') {
-    parsed = std::from_chars(parsed.ptr + 1, end, last);
-  }
-  if (parsed.ec != std::errc() || parsed.ptr != end || first > last || last > 0xFFFF) {
-    throw ToolError(ExitCode::kUsage, fmt::format("{} is no range of NV ids", range), "such as --items 0-999");
-  }
+  const auto [first, last] = ParseIdRange(range);
   std::vector<NvItem> found;
-  for (std::uint32_t id = first; id <= last; ++id) found.push_back(items.Find(fmt::to_string(id)));
+  for (std::uint32_t id = first; id <= last; ++id) found.push_back(items.Find(static_cast<std::uint16_t>(id)));
   return found;
+}
+
+void WriteFiles(const Session& session, const NvItems& items, const Arguments& arguments) {
+  if (!arguments.source_file.empty()) {
+    items.Check(KRAL_NV_WriteNVsToSource(session.handle(), arguments.source_file.c_str()), arguments.source_file);
+  }
+  if (!arguments.pkv_file.empty()) {
+    items.Check(KRAL_NV_WriteNVsToPKV(session.handle(), arguments.pkv_file.c_str()), arguments.pkv_file);
+  }
 }
 
 void Dump(Context& context, const Arguments& arguments) {
@@ -92,60 +137,76 @@ void Dump(Context& context, const Arguments& arguments) {
   if (wanted.empty()) {
     throw ToolError(ExitCode::kUsage, "nothing says which items to read", "give --defs FILE, or --items 0-999");
   }
-  Json read = Json::array();
-  std::string text;
-  std::size_t missing = 0;
-  {
-    Progress progress(context.out, "dump", wanted.size(), Progress::Unit::kItems);
-    for (const NvItem& item : wanted) {
-      progress.Describe(item.Title());
-      std::uint16_t status = 0;
-      if (items.Read(item, status)) {
-        read.push_back(items.ToJson(item));
-        text += items.ToText(item);
-      } else {
-        ++missing;
+  const bool to_files = !arguments.source_file.empty() || !arguments.pkv_file.empty();
+  if (to_files) items.KeepUndefined();
+  ReadSoFar read;
+  ReadAll(context, items, wanted, read);
+  context.out.Note(fmt::format("{} items read, {} without a value{}{}", read.items.size(), read.without_value,
+                               read.refusals.empty() ? "" : ", refused: ", read.refusals));
+  if (to_files) {
+    try {
+      if (read.items.empty()) {
+        throw ToolError(ExitCode::kRefused, "the handset gave no value to write to a file",
+                        "nothing was written; check the range of --items or the files of --defs");
       }
-      progress.Advance(1);
+      session.Begin();
+      WriteFiles(session, items, arguments);
+    } catch (const ToolError&) {
+      read.Keep(context);
+      throw;
     }
   }
-  if (!arguments.source_file.empty()) {
-    items.Check(KRAL_NV_WriteNVsToSource(session.handle(), arguments.source_file.c_str()), arguments.source_file);
-  }
-  if (!arguments.pkv_file.empty()) {
-    items.Check(KRAL_NV_WriteNVsToPKV(session.handle(), arguments.pkv_file.c_str()), arguments.pkv_file);
-  }
-  context.out.Note(fmt::format("{} items read, {} without a value", read.size(), missing));
-  context.out.Result({{"port", session.port()}, {"without_value", missing}, {"items", read}}, text);
+  context.out.Result({{"port", session.port()},
+                      {"without_value", read.without_value},
+                      {"refused", read.refused},
+                      {"items", read.items}},
+                     read.text);
 }
+
+// The counts of a comparison are in the line that the library writes about it.
+struct DiffCounts {
+  std::array<std::uint32_t, 4> values{};  // different, only in the first, only in the second, equal
+
+  bool Read() {
+    constexpr std::string_view kMark = "KRAL_NV_PKV_Diff: ";
+    const std::string line = FindErrorLine(kMark).value_or("");
+    std::size_t at = std::min(line.find(kMark), line.size());
+    for (std::uint32_t& value : values) {
+      at = line.find_first_of("0123456789", at);
+      if (at == std::string::npos) return false;
+      const auto parsed = std::from_chars(line.data() + at, line.data() + line.size(), value);
+      at = static_cast<std::size_t>(parsed.ptr - line.data());
+    }
+    return true;
+  }
+};
 
 void Compare(Context& context, const Arguments& arguments) {
   Session session(WithoutHandset(context));
   const NvItems items(session, arguments.options);
   session.Begin();
-  items.Check(
-      KRAL_NV_PKV_Diff(session.handle(), arguments.first.c_str(), arguments.second.c_str(), arguments.page.c_str()),
-      "the comparison");
-  context.out.Result({{"report", arguments.page}}, fmt::format("{}\n", arguments.page));
-}
-
-std::string FormText(const NvForm& form) {
-  std::string text;
-  for (const NvMember& member : form.members) {
-    text += fmt::format("{}{}: {}", text.empty() ? "" : ", ", member.name, member.type);
-    if (member.count > 1) text += fmt::format("[{}]", member.count);
+  const std::uint32_t code =
+      KRAL_NV_PKV_Diff(session.handle(), arguments.first.c_str(), arguments.second.c_str(), arguments.page.c_str());
+  const bool is_second = FindErrorLine(arguments.second + ": ").has_value();
+  items.Check(code, code == KRAL_NV_ERROR_CANNOT_OPEN_REPORT ? arguments.page
+                    : is_second                              ? arguments.second
+                                                             : arguments.first);
+  DiffCounts counts;
+  if (!counts.Read()) {
+    throw ToolError(ExitCode::kInternal, "the library tells no counts", "--log FILE tells more");
   }
-  return text;
-}
-
-Json FormJson(const NvForm& form) {
-  Json members = Json::array();
-  for (const NvMember& member : form.members) {
-    members.push_back({{"name", member.name}, {"type", member.type}, {"count", member.count}});
-  }
-  Json json{{"members", members}};
-  if (!form.selector.empty()) json["variant"] = form.selector;
-  return json;
+  const auto [different, only_first, only_second, equal] = counts.values;
+  const Json members{
+      {"report", arguments.page},
+      {"counts",
+       {{"equal", equal}, {"different", different}, {"only-in-first", only_first}, {"only-in-second", only_second}}}};
+  const std::string text = fmt::format("{}: {} equal, {} different, {} only in the first, {} only in the second\n",
+                                       arguments.page, equal, different, only_first, only_second);
+  if (different + only_first + only_second == 0) return context.out.Result(members, text);
+  context.found = members;
+  if (!context.out.json()) context.out.Note(text);
+  throw ToolError(ExitCode::kMismatch, fmt::format("{} and {} differ", arguments.first, arguments.second),
+                  fmt::format("{} shows in what", arguments.page));
 }
 
 void ListDefinitions(Context& context, Arguments arguments) {
@@ -155,27 +216,10 @@ void ListDefinitions(Context& context, Arguments arguments) {
   Json rows = Json::array();
   std::string text;
   for (const NvItem& item : items.all()) {
-    Json row = Json::object();
-    if (item.id) row["id"] = *item.id;
-    if (!item.path.empty()) row["path"] = item.path;
-    row["name"] = item.name;
-    if (item.max_index > 0) row["max_index"] = item.max_index;
-    row["forms"] = Json::array();
-    text += item.Title() + (item.max_index > 0 ? fmt::format(" [0-{}]", item.max_index) : "") + "\n";
-    for (const NvForm& form : item.forms) {
-      row["forms"].push_back(FormJson(form));
-      text += fmt::format("  {}{}\n", form.selector.empty() ? "" : form.selector + " -> ", FormText(form));
-    }
-    rows.push_back(std::move(row));
+    rows.push_back(DefinitionJson(item));
+    text += DefinitionText(item);
   }
   context.out.Result({{"definitions", rows}}, text);
-}
-
-void AddDefinitionOptions(CLI::App& verb, const std::shared_ptr<Arguments>& arguments) {
-  verb.add_option("--defs", arguments->options.definitions, "Definition file; may be given several times")
-      ->allow_extra_args(false);
-  verb.add_option("--types", arguments->options.dictionaries, "Data-type dictionary that the definitions use")
-      ->allow_extra_args(false);
 }
 
 }  // namespace
@@ -205,8 +249,7 @@ void AddNvVerbs(CLI::App& app, Context& context) {
   write->add_option("--index", arguments->array_index, "Element of an array item");
   auto* dump = add("dump", "Print the values of all items that are defined", Dump);
   dump->add_option("--items", arguments->range, "Range of NV ids instead, such as 0-999");
-  dump->add_option("--source", arguments->source_file,
-                   "Write the values of defined items to this source file (XML), too");
+  dump->add_option("--source", arguments->source_file, "Write the values to this source file (XML), too");
   dump->add_option("--pkv", arguments->pkv_file, "... to this PKV file");
   auto* diff = add("diff", "Compare two PKV files in a page of HTML; needs no handset", Compare);
   diff->add_option("first", arguments->first, "PKV file")->required();
@@ -214,13 +257,12 @@ void AddNvVerbs(CLI::App& app, Context& context) {
   diff->add_option("page", arguments->page, "HTML file to be written")->required();
   auto* definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
   definitions->add_option("file", arguments->items, "Definition file")->required();
-  definitions->add_option("--types", arguments->options.dictionaries, "Data-type dictionary that they use")
-      ->allow_extra_args(false);
+  AddDictionaryOption(*definitions, arguments->options);
   for (auto* verb : {read, write, dump}) {
-    AddDefinitionOptions(*verb, arguments);
+    AddDefinitionOptions(*verb, arguments->options);
     add_subscription(*verb);
   }
-  AddDefinitionOptions(*diff, arguments);
+  AddDefinitionOptions(*diff, arguments->options);
 }
 
 }  // namespace kral::tool
