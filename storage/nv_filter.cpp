@@ -2,13 +2,17 @@
 #include "storage/nv_filter.h"
 
 #include <algorithm>
+#include <iterator>
 #include <string_view>
+#include <utility>
 
 #include "platform/file_util.h"
 #include "storage/nv_xml.h"
 
 namespace kral::nv {
 namespace {
+
+constexpr size_t kMostEntries = size_t{1} << 18;  // all ids and more files than a handset has
 
 std::string_view Trimmed(std::string_view text) {
   constexpr std::string_view kBlanks = " \t\r\n";
@@ -33,17 +37,45 @@ void ForEachPart(std::string_view list, Take take) {
   }
 }
 
+// Of sorted parts of which none begins with another, the one that a text begins with is the last that is not above it.
+bool HoldsAny(std::string_view text, const std::vector<std::string>& parts) {
+  for (; !text.empty(); text.remove_prefix(1)) {
+    const auto above = std::upper_bound(parts.begin(), parts.end(), text);
+    if (above != parts.begin() && text.starts_with(*std::prev(above))) return true;
+  }
+  return false;
+}
+
 }  // namespace
 
 bool NvFilter::Passes(const NvItem& item) const {
   if (is_empty()) return true;
-  const auto holds_id = [&](const auto& range) {
-    return item.id && *item.id >= range.first && *item.id <= range.second;
-  };
-  const auto is_part = [&](const std::string& part) {
-    return item.name.find(part) != std::string::npos || item.path.find(part) != std::string::npos;
-  };
-  return std::any_of(ranges_.begin(), ranges_.end(), holds_id) || std::any_of(parts_.begin(), parts_.end(), is_part);
+  if (item.id) {
+    const auto above = std::upper_bound(ids_.begin(), ids_.end(), *item.id,
+                                        [](uint16_t id, const auto& range) { return id < range.first; });
+    if (above != ids_.begin() && *item.id <= std::prev(above)->second) return true;
+  }
+  return HoldsAny(item.name, parts_) || HoldsAny(item.path, parts_);
+}
+
+void NvFilter::Sort() {
+  std::sort(ids_.begin(), ids_.end());
+  size_t kept = 0;
+  for (const auto& range : ids_) {
+    if (kept > 0 && range.first <= uint32_t{ids_[kept - 1].second} + 1) {
+      ids_[kept - 1].second = std::max(ids_[kept - 1].second, range.second);
+    } else {
+      ids_[kept++] = range;
+    }
+  }
+  ids_.resize(kept);
+  // A part that begins with another is found with it.
+  std::sort(parts_.begin(), parts_.end());
+  std::vector<std::string> parts;
+  for (std::string& part : parts_) {
+    if (parts.empty() || !part.starts_with(parts.back())) parts.push_back(std::move(part));
+  }
+  parts_ = std::move(parts);
 }
 
 NvError NvFilter::Load(const std::string& path, std::string& problem) {
@@ -66,14 +98,14 @@ NvError NvFilter::Read(const XmlElement& root, std::string& problem) {
     for (const XmlElement& key : root.children) {
       if (key.name == "NV") {
         const uint16_t id = ParseId(key.text);
-        read.ranges_.emplace_back(id, id);
+        read.ids_.emplace_back(id, id);
       } else if (key.name == "NV_RANGE") {
         ForEachPart(key.text, [&](std::string_view range) {
           const size_t dash = range.find('-');
           const uint16_t first = ParseId(range.substr(0, dash));
           const uint16_t last = dash == std::string_view::npos ? first : ParseId(range.substr(dash + 1));
           if (first > last) throw BadXml("the range " + std::string(range) + " is empty");
-          read.ranges_.emplace_back(first, last);
+          read.ids_.emplace_back(first, last);
         });
       } else if (key.name == "NV_NAME_SUBSTRING_LIST") {
         ForEachPart(key.text, [&](std::string_view part) { read.parts_.emplace_back(part); });
@@ -83,31 +115,23 @@ NvError NvFilter::Read(const XmlElement& root, std::string& problem) {
     }
     // One that lets nothing pass would be taken for none at all.
     if (read.is_empty()) throw BadXml("the filter is empty");
+    read.ids_.insert(read.ids_.end(), ids_.begin(), ids_.end());
+    read.parts_.insert(read.parts_.end(), parts_.begin(), parts_.end());
+    if (read.ids_.size() + read.parts_.size() > kMostEntries) throw BadXml("the filter has too many entries");
   } catch (const BadXml& bad) {
     problem = bad.what();
     return NvError::kCannotOpenFilter;
   }
-  ranges_.insert(ranges_.end(), read.ranges_.begin(), read.ranges_.end());
-  parts_.insert(parts_.end(), read.parts_.begin(), read.parts_.end());
+  read.Sort();
+  *this = std::move(read);
   return NvError::kNone;
 }
 
-void NvFilter::AddItem(const NvItem& item) {
-  if (item.is_file()) {
-    parts_.push_back(item.path);
-  } else {
-    ranges_.emplace_back(*item.id, *item.id);
-  }
-}
-
-NvError NvFilter::Save(const std::string& path) const {
+NvError SaveFilter(const std::string& path, std::span<const NvItem* const> items) {
   std::string text = "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n<NvFilter>\n";
-  for (const auto& [first, last] : ranges_) {
-    text += first == last ? "  <NV>" + std::to_string(first) + "</NV>\n"
-                          : "  <NV_RANGE>" + std::to_string(first) + "-" + std::to_string(last) + "</NV_RANGE>\n";
-  }
-  for (const std::string& part : parts_) {
-    text += "  <NV_NAME_SUBSTRING_LIST>" + EscapeXml(part) + "</NV_NAME_SUBSTRING_LIST>\n";
+  for (const NvItem* item : items) {
+    text += item->is_file() ? "  <NV_NAME_SUBSTRING_LIST>" + EscapeXml(item->path) + "</NV_NAME_SUBSTRING_LIST>\n"
+                            : "  <NV>" + std::to_string(*item->id) + "</NV>\n";
   }
   text += "</NvFilter>\n";
   const std::vector<uint8_t> bytes(text.begin(), text.end());

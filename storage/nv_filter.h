@@ -9,6 +9,7 @@
 #define KRAL_STORAGE_NV_FILTER_H
 
 #include <cstdint>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
@@ -21,7 +22,7 @@ namespace kral::nv {
 
 class NvFilter {
  public:
-  bool is_empty() const { return ranges_.empty() && parts_.empty(); }
+  bool is_empty() const { return ids_.empty() && parts_.empty(); }
   // An empty filter lets everything pass.
   bool Passes(const NvItem& item) const;
 
@@ -29,13 +30,15 @@ class NvFilter {
   NvError Load(const std::string& path, std::string& problem);
   NvError Read(const XmlElement& root, std::string& problem);
 
-  void AddItem(const NvItem& item);
-  NvError Save(const std::string& path) const;
-
  private:
-  std::vector<std::pair<uint16_t, uint16_t>> ranges_;  // of NV ids, first and last
-  std::vector<std::string> parts_;                     // of names and paths
+  void Sort();
+
+  std::vector<std::pair<uint16_t, uint16_t>> ids_;  // first and last, in rising order with gaps between
+  std::vector<std::string> parts_;                  // of names and paths, in rising order; none begins with another
 };
+
+// Writes a filter that lets these items pass.
+NvError SaveFilter(const std::string& path, std::span<const NvItem* const> items);
 
 }  // namespace kral::nv
 

@@ -167,14 +167,14 @@ void NVTool_Manager::ClearWriteFilters(Diag_FTM& phone) {
 }
 
 NvError NVTool_Manager::CreateFilter(const std::string& file, bool with_value) {
-  NvFilter filter;
+  std::vector<const NvItem*> items;
   definitions_.ForEach([&](const NvItem& item) {
     const uint16_t subscription = SlotOf(item, 0).subscription;
     const bool has_value = std::any_of(item.values.begin(), item.values.end(),
                                        [&](const auto& value) { return value.first.subscription == subscription; });
-    if (has_value == with_value) filter.AddItem(item);
+    if (has_value == with_value) items.push_back(&item);
   });
-  return filter.is_empty() ? NvError::kNoValue : filter.Save(file);
+  return items.empty() ? NvError::kNoValue : SaveFilter(file, items);
 }
 
 // --- Subscriptions ---------------------------------------------------------------------------------------------------

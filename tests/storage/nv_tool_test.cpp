@@ -4,9 +4,11 @@
 #include <algorithm>
 #include <array>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "storage/nv_compression.h"
+#include "storage/nv_filter.h"
 #include "storage/pkv_set.h"
 #include "tests/support/nv_fixture.h"
 
@@ -470,6 +472,44 @@ TEST_F(NvTool, FiltersAddUpAndLimitWhatMoves) {
   }
   EXPECT_EQ(KRAL_NV_LoadWriteFilter(handle(), Path("nowhere").c_str()), 19u);
   EXPECT_EQ(KRAL_NV_CreateNVFilter(handle(), Path("no/such/folder").c_str()), 19u);
+}
+
+TEST(NvFilterTest, PassesWhatOneOfManyEntriesHolds) {
+  XmlElement root;
+  root.name = "NvFilter";
+  const auto add = [&root](const char* name, const char* text) {
+    XmlElement& key = root.children.emplace_back();
+    key.name = name;
+    key.text = text;
+  };
+  add("NV_RANGE", "30-35,10-20,12-14,21-22,65535,15-24");
+  add("NV_NAME_SUBSTRING_LIST", "ab,abc,b/c,/x,aba,/nv/long");
+  nv::NvFilter filter;
+  std::string problem;
+  ASSERT_EQ(filter.Read(root, problem), nv::NvError::kNone) << problem;
+  for (const auto& [id, name, passes] :
+       std::initializer_list<std::tuple<uint16_t, const char*, bool>>{{9, "", false},
+                                                                      {10, "", true},
+                                                                      {24, "", true},
+                                                                      {25, "", false},
+                                                                      {29, "a", false},
+                                                                      {35, "", true},
+                                                                      {65534, "", false},
+                                                                      {65535, "", true},
+                                                                      {1, "xab", true},
+                                                                      {1, "a/b/c", true},
+                                                                      {1, "a/b", false},
+                                                                      {1, "/nv/lon", false},
+                                                                      {1, "/nv/longer", true},
+                                                                      {1, "b/x", true},
+                                                                      {1, "zz", false}}) {
+    nv::NvItem item;
+    item.id = id;
+    item.name = name;
+    EXPECT_EQ(filter.Passes(item), passes) << id << " " << name;
+  }
+  for (int i = 0; i < 1 << 18; ++i) add("NV", "1");
+  EXPECT_EQ(filter.Read(root, problem), nv::NvError::kCannotOpenFilter);
 }
 
 // --- Reports ---------------------------------------------------------------------------------------------------------
