@@ -84,6 +84,8 @@ size_t NvForm::size() const {
 }
 
 NvDataType NvDataType::Generic(size_t size) {
+  // Of an empty file: a member of no element is none, but the only one may be absent.
+  if (size == 0) return NvDataType("", {{std::nullopt, {{"data", 1, false, 1}}}}, true);
   return NvDataType("", {{std::nullopt, {{"data", 1, false, static_cast<uint32_t>(size)}}}}, false);
 }
 

@@ -201,7 +201,8 @@ TEST_F(NvDefinition, ContradictionsAreRefusedAndChangeNothing) {
       "<DataType name='B'><Member typeid='A'/></DataType>",
       tower,
       "<DataType name='A'><Member name='x' typeid='word8'/></DataType>"
-      "<DataType name='B'><Member name='" + std::string(254, 'n') + "' typeid='A'/></DataType>",
+      "<DataType name='B'><Member name='" +
+          std::string(254, 'n') + "' typeid='A'/></DataType>",
       "<NvSomething/>",
   };
   for (const std::string& bad : kBad) {
@@ -219,6 +220,23 @@ TEST_F(NvDefinition, ContradictionsAreRefusedAndChangeNothing) {
   EXPECT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), Path("nowhere.xml").c_str()), 4u);
   EXPECT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), nullptr), 4u);
   EXPECT_EQ(KRAL_NV_LoadNVDataTypeDictinary(handle(), test::ExampleDefinitions().c_str()), 6u) << "another root";
+}
+
+TEST_F(NvDefinition, WhatIsToldOfAnEmptyFileCanBeLoaded) {
+  ASSERT_EQ(LoadSource("<NvEfsItem fullpathname='/a' mapping='byteStream' encoding='hex' index='0'></NvEfsItem>"), 0u);
+  EXPECT_EQ(FileValue("/a"), "");
+  std::array<char, 256> text{};
+  ASSERT_EQ(KRAL_NV_GetNVDefinitionByEfsFilename(handle(), "/a", text.data(), text.size()), 0u);
+  EXPECT_EQ(Load(text.data()), 0u) << text.data();
+  EXPECT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), "/a", ""), 0u);
+}
+
+TEST_F(NvDefinition, TheLastDefinitionOfAnItemHolds) {
+  const std::string byte = "<DataType><Member typeid='word8'/></DataType></NvItem>";
+  EXPECT_EQ(Load("<NvItem id='1' name='first'>" + byte + "<NvItem id='1' name='last'>" + byte), 13u);
+  std::array<char, 256> text{};
+  ASSERT_EQ(KRAL_NV_GetNVDefinitionByIndex(handle(), 0, text.data(), text.size()), 0u);
+  EXPECT_NE(std::string(text.data()).find("last"), std::string::npos);
 }
 
 TEST_F(NvDefinition, ValuesAreCheckedWhenTheyAreSet) {
