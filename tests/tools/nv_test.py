@@ -43,6 +43,8 @@ class NvItems(ToolTest):
         self.assertIn(b"enabled: 0 to 1", self.content("page.html"))
         subprocess.run(["xmllint", "--noout", source, self.DEFS[1]], check=True, timeout=PATIENCE)
         self.assertIn("2 equal, 0 different", self.expect(0, "nv", "diff", pkv[0], pkv[0], page).out)
+        text = self.expect_json(10, "nv", "diff", pkv[0], pkv[1], self.path("no", "page.html"))["error"]["text"]
+        self.assertNotIn("items differ", text)
         for file in (source, self.path("none.pkv")):
             self.assertEqual(self.expect_json(10, "nv", "diff", pkv[0], file, page)["error"]["text"].count(file), 1)
         self.assertEqual(len(self.expect_json(0, "nv", "defs", self.DEFS[1])["definitions"]), 29)

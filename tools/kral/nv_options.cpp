@@ -37,7 +37,7 @@ std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text) {
 }
 
 std::string CauseOf(const std::string& file) {
-  const auto lines = ErrorLines();
+  const auto lines = ErrorLines(KRAL_LOG_ERR);
   if (lines.empty()) return "";
   const std::string name = file + ": ";
   std::string cause = lines.back();
