@@ -145,34 +145,37 @@ bool CKralEvents::TakeBatch(std::vector<Packet>& batch) {
   return true;
 }
 
-void CKralEvents::EndBatch() {
-  const std::lock_guard lock(listeners_mutex_);
-  // By index: a listener may unregister itself.
-  for (size_t i = 0; i < listeners_.size(); ++i) listeners_[i].listener->OnBatchEnd();
-}
-
-void CKralEvents::Dispatch(Packet packet) {
+// By index: a listener may register another one, whose turn comes with the next call, and unregister any.
+template <class Call>
+void CKralEvents::ForEachListener(Call call) {
   const std::lock_guard lock(listeners_mutex_);
   dispatching_ = true;
-  const auto accepts = [&packet](const Registration& entry) {
-    return entry.listener != nullptr && (entry.filter == nullptr || entry.filter->Accepts(packet));
-  };
-  // By index: a listener may register another one, which begins with the next packet.
   const size_t count = listeners_.size();
   for (size_t i = 0; i < count; ++i) {
     try {
-      if (!accepts(listeners_[i])) continue;
-      if (i + 1 == count) {
-        listeners_[i].listener->TakePacket(std::move(packet));
-      } else {
-        listeners_[i].listener->OnPacket(packet);
-      }
+      const Registration entry = listeners_[i];  // a copy: the list may grow meanwhile
+      if (entry.listener != nullptr) call(entry, i + 1 == count);
     } catch (...) {
       // A listener's failure costs it this packet, not the others theirs.
     }
   }
   dispatching_ = false;
   std::erase_if(listeners_, [](const Registration& entry) { return entry.listener == nullptr; });
+}
+
+void CKralEvents::EndBatch() {
+  ForEachListener([](const Registration& entry, bool) { entry.listener->OnBatchEnd(); });
+}
+
+void CKralEvents::Dispatch(Packet packet) {
+  ForEachListener([&packet](const Registration& entry, bool is_last) {
+    if (entry.filter != nullptr && !entry.filter->Accepts(packet)) return;
+    if (is_last) {
+      entry.listener->TakePacket(std::move(packet));
+    } else {
+      entry.listener->OnPacket(packet);
+    }
+  });
 }
 
 }  // namespace kral

@@ -68,6 +68,8 @@ class CKralEvents {
   bool StartThread(std::shared_ptr<void> owner);  // listeners locked
   void Run();
   bool TakeBatch(std::vector<Packet>& batch);
+  template <class Call>
+  void ForEachListener(Call call);
   void Dispatch(Packet packet);
   void EndBatch();
   void EndAccepting();

@@ -25,7 +25,11 @@ class Recorder final : public PacketListener {
     }
     if (then) then();
   }
+  void OnBatchEnd() override {
+    if (at_end) at_end();
+  }
   std::function<void()> then;
+  std::function<void()> at_end;
 
  private:
   std::vector<std::string>& calls_;
@@ -85,6 +89,16 @@ TEST_F(KralEvents, ListenerMayUnregisterAndFailInItsCall) {
   Push(1);
   Push(2);
   EXPECT_EQ(Calls(5), (Names{"a1", "b1", "last1", "b2", "last2"}));
+  EXPECT_TRUE(events_->Stop());
+}
+
+TEST_F(KralEvents, ListenerMayUnregisterAtTheEndOfABatch) {
+  std::atomic<int> ends{0};
+  a_.at_end = [this] { events_->UnregisterListener(&a_); };
+  b_.at_end = [&ends] { ++ends; };
+  for (PacketListener* listener : {&a_, &b_}) events_->RegisterListener(listener, nullptr, events_);
+  Push(1);
+  EXPECT_TRUE(Eventually([&] { return ends == 1; })) << "not passed over";
   EXPECT_TRUE(events_->Stop());
 }
 
