@@ -35,7 +35,7 @@ NvError ErrorOf(const PkvOutcome& outcome) {
 
 NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
   const PkvOutcome outcome = ReadPkv(file, set);
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());  // begins with the path
   return ErrorOf(outcome);
 }
 
@@ -178,7 +178,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   if (has_handset) pkv::ReadIdentity(phone, set.properties);
   pkv::NoteArrays(arrays, set.properties);
   const PkvOutcome outcome = WritePkv(file, set, &phone.log());
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s: %s", file.c_str(), outcome.text.c_str());
+  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
   return ErrorOf(outcome);
 }
 
