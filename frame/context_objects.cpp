@@ -39,11 +39,13 @@ bool Own(KRAL_HANDLE handle, Choose choose, const std::shared_ptr<T>& object) {
   return true;
 }
 
-auto FamilyIn(FamilySlot slot) {
-  return [slot](ContextObjects & objects) -> auto& {
+// The projection of a slot.
+struct FamilyIn {
+  FamilySlot slot;
+  std::shared_ptr<FamilyObject>& operator()(ContextObjects& objects) const {
     return objects.family[static_cast<size_t>(slot)];
-  };
-}
+  }
+};
 
 // The row's proxy, connected to its port when it is new.
 std::shared_ptr<OrbtServer> GetServer(KRAL_HANDLE handle, uint16_t port) {
@@ -107,14 +109,14 @@ std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle) try {
 std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make) try {
   const auto phone = GetPhone(handle);
   if (!phone || (IsServerModeOnly(slot) && !phone->server_mode())) return nullptr;
-  if (auto object = Owned(handle, FamilyIn(slot))) return Joined(phone, std::move(object));
+  if (auto object = Owned(handle, FamilyIn{slot})) return Joined(phone, std::move(object));
   if (!make) return nullptr;
   // The request lock rather than one of the table: a maker may send requests, and an operation that holds the request
   // lock may ask for a family object.
   const std::lock_guard building(phone->request_lock());
-  if (auto object = Owned(handle, FamilyIn(slot))) return Joined(phone, std::move(object));
+  if (auto object = Owned(handle, FamilyIn{slot})) return Joined(phone, std::move(object));
   auto object = make(*phone, handle);
-  return object && Own(handle, FamilyIn(slot), object) ? Joined(phone, std::move(object)) : nullptr;
+  return object && Own(handle, FamilyIn{slot}, object) ? Joined(phone, std::move(object)) : nullptr;
 } catch (...) {
   return nullptr;
 }
