@@ -122,6 +122,8 @@ inline constexpr size_t kSyncState = 8;  // of both sync requests
 inline constexpr u32 kInSync = 0;
 
 inline constexpr u32 kModeKind = 0xF000;
+inline constexpr u32 kFolder = 0x4000;
+inline constexpr u32 kPlainFile = 0x8000;
 inline constexpr u32 kItemFile = 0xE000;
 
 }  // namespace kral::efs

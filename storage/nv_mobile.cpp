@@ -14,8 +14,6 @@ namespace {
 using Kind = NvAnswer::Kind;
 using Answer = PhoneItems::Answer;
 
-constexpr uint32_t kPlainFile = 0x8000;
-
 }  // namespace
 
 NvAnswer NvMobile::Judged(Answer answer, uint16_t status) {
@@ -108,7 +106,7 @@ NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored
   if (told != Answer::kAnswered) return Judged(told, 0);
   // What is a plain file already stays one; permissions of files that are there stay, too.
   const bool as_item_file = stored.size() <= KRAL_EFS_ITEM_SIZE && (error != efs::kDone || file.is_item_file());
-  file.mode = as_item_file ? uint32_t{KRAL_EFS_MODE_ITEM_FILE} : kPlainFile;
+  file.mode = as_item_file ? efs::kItemFile : efs::kPlainFile;
   const Answer answer = items_.WriteFile(file, error);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   return {error == 0 ? Kind::kOk : Kind::kRefused};

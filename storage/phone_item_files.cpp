@@ -24,8 +24,6 @@ constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
 
 constexpr uint32_t kUnanswered = 0xFFFFFFFF;  // in place of an error number
-constexpr uint32_t kDirectory = 0x4000;
-constexpr uint32_t kPlainFile = 0x8000;
 constexpr uint32_t kPermissions = 0777;
 
 // A folder's entries for itself and for the one above it.
@@ -72,10 +70,10 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vec
   if (answer == Answer::kLost) return answer;
   // A handset without a file system, or without this folder.
   if (answer == Answer::kRefused ? refusal_ == efs::kBadCommand : status == efs::kMissing) return Answer::kAnswered;
-  if (status == efs::kDone && (mode & efs::kModeKind) != kDirectory) {
+  const uint32_t kind = mode & efs::kModeKind;
+  if (status == efs::kDone && kind != efs::kFolder) {
     // Listings give entries of kinds that they do not know as folders: item files of some handsets are among them.
-    const uint32_t kind = mode & efs::kModeKind;
-    if (kind == kPlainFile || kind == KRAL_EFS_MODE_ITEM_FILE) files.push_back({path, mode, size});
+    if (kind == efs::kPlainFile || kind == efs::kItemFile) files.push_back({path, mode, size});
     return Answer::kAnswered;
   }
   if (status != efs::kDone || depth > kDeepest || ++walked_ > kMostEntries) {
