@@ -63,6 +63,8 @@ class ArrayItems {
  public:
   ArrayItems(Diag_FTM& phone, const PkvSet& set);
   bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
+  // No request names both a subscription and an element.
+  bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && IsElement(item); }
   // Defined as an array, but kept in a file that notes arrays and not this one: read without knowing which element.
   bool IsUnclear(const PkvNvItem& item) const { return unclear_.contains(item.id); }
 

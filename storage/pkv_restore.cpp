@@ -42,7 +42,7 @@ class RestoreJob {
       ++count;
     }
     const auto packet = rest.first(std::max<size_t>(count, 1));
-    if (count == 0 && IsInexpressible(first)) {
+    if (count == 0 && arrays_.IsInexpressible(first)) {
       report_.Add(first, KRAL_PKV_SKIPPED, 0);
       return 1;
     }
@@ -58,9 +58,6 @@ class RestoreJob {
     }
     return packet.size();
   }
-
-  // No request names both a subscription and an element.
-  bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && arrays_.IsElement(item); }
 
   // In batches, each of which ends with its first refused item.
   void WritePacket(std::span<const PkvNvItem> packet, std::vector<uint16_t>& statuses) {

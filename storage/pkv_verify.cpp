@@ -27,8 +27,7 @@ class VerifyJob {
  private:
   // These give false when the caller has stopped the job.
   bool Compare(const PkvNvItem& item) {
-    // No request names both a subscription and an element.
-    if (item.subscription != 0 && arrays_.IsElement(item)) {
+    if (arrays_.IsInexpressible(item)) {
       report_.Add(item, KRAL_PKV_SKIPPED, 0);
       return !report_.stopped();
     }
