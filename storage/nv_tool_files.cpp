@@ -169,10 +169,10 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
       walk.Report(item->Title(), appended ? NvError::kNone : NvError::kCannotSetValue);
     }
   }
-  // The library's own file class holds no file without an item.
-  if (set.items.empty() && ChosenPkvWriter() == PkvWriter::kVarnPkvFile) return NvError::kNoValue;
   // A backup that lacks something is none.
   if (walk.failed()) return NvError::kCannotSetValue;
+  // The library's own file class holds no file without an item.
+  if (set.items.empty() && ChosenPkvWriter() == PkvWriter::kVarnPkvFile) return NvError::kNoValue;
   // Values need no handset, and the null port is none; one that is there signs them.
   const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
   if (has_handset) pkv::ReadIdentity(phone, set.properties);
