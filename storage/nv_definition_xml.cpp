@@ -16,7 +16,8 @@
 namespace kral::nv {
 namespace {
 
-// Data types within data types multiply, and so do the names of their members: what they come to in one file is limited.
+// Data types within data types multiply, and so do the names of their members: what they come to in one file is
+// limited.
 constexpr size_t kMostMembers = size_t{1} << 20;
 constexpr size_t kLongestMemberName = 255;
 constexpr size_t kMostNameBytes = size_t{32} << 20;

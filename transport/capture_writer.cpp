@@ -23,8 +23,6 @@ constexpr size_t kGoodPiece = size_t{64} << 10;
 constexpr size_t kBehind = 4 * kGoodPiece;
 constexpr size_t kSlice = size_t{16} << 10;  // what the system copies in a few microseconds
 
-
-
 uint64_t MicrosecondsNow() {
   const auto now = std::chrono::system_clock::now().time_since_epoch();
   return static_cast<uint64_t>(std::chrono::duration_cast<std::chrono::microseconds>(now).count());
@@ -160,8 +158,8 @@ void CaptureWriter::Run() {
   ended_.Set();
 }
 
-// Looks by itself whether anything came: to be woken by the first packet of each batch would hold the connection up more
-// than the looks cost. False at the end.
+// Looks by itself whether anything came: to be woken by the first packet of each batch would hold the connection up
+// more than the looks cost. False at the end.
 bool CaptureWriter::TakeBatch(Batch& batch) {
   batch.records.clear();
   batch.packets = 0;
