@@ -7,16 +7,20 @@
 #include <cstdint>
 #include <span>
 
+#include "kral/nv.h"
+
 namespace kral {
 
 class Diag_FTM;
 
 namespace nv {
 
-inline constexpr uint16_t kDone = 0;          // NV status: success
-inline constexpr uint16_t kNeverWritten = 5;  // ... the item has no value
-inline constexpr uint16_t kNoSuchItem = 6;    // ... the handset does not know the item, or has no such element
-inline constexpr uint16_t kReadOnly = 7;      // ... the item cannot be written
+// The statuses that matter here, under the names of this side.
+inline constexpr uint16_t kDone = KRAL_NV_STATUS_DONE;
+inline constexpr uint16_t kNeverWritten = KRAL_NV_STATUS_NEVER_WRITTEN;
+inline constexpr uint16_t kNoSuchItem = KRAL_NV_STATUS_UNKNOWN_ITEM;
+inline constexpr uint16_t kReadOnly = KRAL_NV_STATUS_READ_ONLY;
+
 inline constexpr uint16_t kEsnItem = 0;
 inline constexpr size_t kDataSize = 128;
 

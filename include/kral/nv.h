@@ -25,6 +25,10 @@ extern "C" {
 
 /** Status of an item that was read or written. */
 #define KRAL_NV_STATUS_DONE 0u
+/** Status of an item that was never written: it has no value. */
+#define KRAL_NV_STATUS_NEVER_WRITTEN 5u
+/** Status of an item that the handset does not know, and of an element that an array does not have. */
+#define KRAL_NV_STATUS_UNKNOWN_ITEM 6u
 /** Status of a write to an item that cannot be written. */
 #define KRAL_NV_STATUS_READ_ONLY 7u
 

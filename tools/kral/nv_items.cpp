@@ -16,10 +16,6 @@
 namespace kral::tool {
 namespace {
 
-// NV statuses of items that have no value.
-constexpr std::uint16_t kNeverWritten = 5;
-constexpr std::uint16_t kUnknown = 6;
-
 std::optional<std::uint16_t> ParseId(std::string_view text) {
   std::uint16_t id = 0;
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), id);
@@ -86,7 +82,8 @@ std::vector<std::string> Split(const std::string& numbers) {
 }
 
 NvReading::Kind KindOf(std::uint16_t failure) {
-  return failure == kNeverWritten || failure == kUnknown ? NvReading::Kind::kNoValue : NvReading::Kind::kRefused;
+  return failure == KRAL_NV_STATUS_NEVER_WRITTEN || failure == KRAL_NV_STATUS_UNKNOWN_ITEM ? NvReading::Kind::kNoValue
+                                                                                           : NvReading::Kind::kRefused;
 }
 
 ExitCode ExitOf(std::uint32_t code) {
@@ -112,9 +109,9 @@ ExitCode ExitOf(std::uint32_t code) {
 
 std::string DescribeNvStatus(std::uint16_t status) {
   switch (status) {
-    case kNeverWritten:
+    case KRAL_NV_STATUS_NEVER_WRITTEN:
       return "5, never written";
-    case kUnknown:
+    case KRAL_NV_STATUS_UNKNOWN_ITEM:
       return "6, unknown to the handset";
     case KRAL_NV_STATUS_READ_ONLY:
       return "7, read-only";
