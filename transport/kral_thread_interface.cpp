@@ -87,6 +87,7 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
   if (user_defined_) return BindUserTransport(user);
   // The closing has paused the thread already, unless it was reading a caller's transport.
   if (!QuietThread()) return false;
+  splitter_.DropPartialPacket();  // its rest will not come through another opening
   if (!null_port_) return port_.Open(static_cast<int32_t>(port_number)) == 1;
   port_.Close();
   return true;
@@ -96,6 +97,7 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
 bool CKralThreadInterface::BindUserTransport(const UserTransport& user) {
   if (port_.IsOpen() != 0 && port_.user_defined() && IsSame(bound_, user)) return true;
   if (!QuietThread()) return false;
+  splitter_.DropPartialPacket();
   bound_ = user;
   return port_.SetUserDefinedTransport(user.context, user.handle, user.send, user.receive, user.flush) == 1;
 }

@@ -24,6 +24,7 @@ using test::WithFcs;
 
 constexpr uint32_t kLong = 5000;
 constexpr uint32_t kShort = 20;
+constexpr uint32_t kBusy = 500;  // plenty for a reply, and soon over where none comes
 
 struct Reply {
   bool succeeded;
@@ -263,6 +264,29 @@ TEST_F(Engine, FlushDropsThePartialPacket) {
   EXPECT_TRUE(engine_->transport.FlushRxBuffer());
   AnswerWith({75, 1});
   EXPECT_TRUE(Ask({75}).succeeded);
+}
+
+TEST_F(Engine, WhatBrokeOffBelongsToTheConnectionThatHasEnded) {
+  engine_->sorter.SetCollection(true);
+  const auto open = [this](bool callers) { callers ? OpenUser() : Open(); };
+  for (const bool callers : {false, true}) {
+    for (const Bytes& frame : {PlainFrame({75, 1, 2}), PlainFrame({16, 1, 2, 3}), Bytes{0x7D, 0x7D}}) {
+      open(callers);
+      wire_.OnWrite({});
+      const uint64_t before = engine_->transport.counters().bytes_received;
+      wire_.ToHost(Bytes(frame.begin(), frame.end() - 1));
+      ASSERT_TRUE(Eventually([&] { return engine_->transport.counters().bytes_received > before; }));
+      if (callers) {
+        ASSERT_TRUE(engine_->transport.StopThread());
+      } else {
+        ASSERT_FALSE(Ask({75}, 16, kShort).succeeded);
+      }
+      open(callers);
+      AnswerWith({75, 1});
+      EXPECT_TRUE(Ask({75}, 16, kBusy).succeeded) << HexDump(frame);
+      EXPECT_EQ(engine_->asynchronous.size(), 0u) << "half a packet, and a reply for its other half";
+    }
+  }
 }
 
 TEST_F(Engine, CountsWhatCameAndWhatWasLost) {
