@@ -99,13 +99,28 @@ class Greeter {
     if (length == 0) return true;
 
     if (!WritePacket(port_, kExecuteData, kReadChipIdentity)) return Fail("Failed to write the Kivrat execute data");
+    // One read, whatever length was told: that tells only how much is worth waiting for.
     std::array<uint8_t, kMostIdentityData> data{};
-    const auto read = std::span(data).first(port_.Read(std::span(data).first(std::min(length, data.size()))));
+    const size_t enough = std::clamp(length, kIdentityAt + sizeof(uint32_t), data.size());
+    const auto read = std::span(data).first(port_.Read(data, enough));
     identity = LoadLe<uint32_t>(read, kIdentityAt);
     if (!identity) return Fail("Failed to read the Port buffer\n");
     phone_.log().WriteLine(kLogRet, "BXC ID read from PBL: %d \r \n", static_cast<int>(*identity));
-    if (length > data.size()) port_.Purge();  // or the rest would stand in front of the hello
+    if (length > data.size()) PassOver(length - data.size());
     return true;
+  }
+
+  // What is left of the identity's data would stand in front of the hello, also when it is still on its way.
+  void PassOver(size_t rest) {
+    Clock& clock = phone_.clock();
+    const uint32_t start = clock.TickMs();
+    std::array<uint8_t, 1024> waste{};
+    while (rest > 0 && clock.TickMs() - start < phone_.kivrat().read_time_out_ms) {
+      const auto piece = std::span(waste).first(std::min(rest, waste.size()));
+      if (port_.Read(piece) != piece.size()) return;
+      rest -= piece.size();
+    }
+    port_.Purge();
   }
 
   bool SwitchToImageTransfer() {

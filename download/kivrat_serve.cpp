@@ -11,6 +11,8 @@ namespace kral::kivrat {
 namespace {
 
 constexpr const char* kAborted = "Kivrat: the transfer was aborted";
+// A target that asks for nothing so often in a row will ask for nothing else.
+constexpr uint32_t kMostRequestsForNothing = 100;
 
 class Server {
  public:
@@ -21,12 +23,14 @@ class Server {
   }
 
   bool Run(const std::string& file_name) {
-    if (!phone_.port_borrowed() || !port_.Open()) return Fail("Failed KivratInit()");
+    if (!phone_.port_borrowed()) return Fail("Failed KivratInit()");
     if (const auto error = file_.Open(file_name)) {
       phone_.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
                              error.message().c_str());
+      port_.Keep();  // the target knows nothing of it and still waits: for a file of the right name
       return false;
     }
+    if (!port_.Open()) return Fail("Failed KivratInit()");
     if (progress_ && !progress_(0, file_.size())) return Fail(kAborted);
     if (!ServeRequests()) return false;
     file_.Close();
@@ -77,10 +81,12 @@ class Server {
   // not are served in order all the same.
   bool Serve(std::span<const uint8_t> request) {
     const size_t length = Field(request, kReadLengthAt);
-    if (request.size() < kReadDataSize || length == 0 || length > piece_.size()) {
+    if (request.size() < kReadDataSize || length > piece_.size()) {
       phone_.log().WriteLine(kLogErr, "Kivrat: a request for %u bytes", Field(request, kReadLengthAt));
       return false;
     }
+    if (length == 0) return ServeNothing();
+    requests_for_nothing_ = 0;
     size_t count = 0;
     const auto error = file_.Read(std::span(piece_).first(length), count);
     if (error || count == 0) {
@@ -93,6 +99,16 @@ class Server {
       return Fail("Failed to send the command from the host to the device \r \n");
     }
     served_ += count;
+    return GoesOn();
+  }
+
+  bool ServeNothing() {
+    if (++requests_for_nothing_ < kMostRequestsForNothing) return GoesOn();
+    phone_.log().WriteLine(kLogErr, "Kivrat: a request for 0 bytes, and %u before it", requests_for_nothing_ - 1);
+    return false;
+  }
+
+  bool GoesOn() {
     if (!progress_ || progress_(served_, std::max(served_, file_.size()))) return true;
     return Fail(kAborted);
   }
@@ -132,6 +148,7 @@ class Server {
   RawPort port_;
   FileReader file_;
   uint64_t served_ = 0;
+  uint32_t requests_for_nothing_ = 0;  // in a row
   std::vector<uint8_t> packet_;
   std::vector<uint8_t> piece_;
 };

@@ -12,6 +12,7 @@ namespace {
 // of many of them.
 constexpr size_t kDevicePiece = 4096;
 constexpr uint32_t kLookAroundMs = 50;
+constexpr uint32_t kQuietMs = 50;
 constexpr size_t kLongestDump = 64;  // the bytes of images are left out of the log
 
 }  // namespace
@@ -46,18 +47,22 @@ bool RawPort::Write(std::span<const uint8_t> packet) {
   return true;
 }
 
-size_t RawPort::Read(std::span<uint8_t> buffer) {
+size_t RawPort::Read(std::span<uint8_t> buffer, size_t enough) {
   if (port_ == nullptr) return 0;
   Clock& clock = phone_.clock();
   const uint32_t start = clock.TickMs();
+  uint32_t last = start;  // when something came
   size_t count = 0;
   bool promised = false;
   while (count < buffer.size()) {
     const auto room = static_cast<uint32_t>(buffer.size() - count);
     const uint32_t received = std::min(port_->Receive(buffer.data() + count, room), room);
     count += received;
-    const uint32_t passed = clock.TickMs() - start;
+    const uint32_t now = clock.TickMs();
+    const uint32_t passed = now - start;
+    if (received != 0) last = now;
     if (count == buffer.size() || passed >= read_time_out_ms_ || stopped()) break;
+    if (count >= enough && now - last >= kQuietMs) break;
     if (port_->gone()) {
       phone_.log().WriteLine(kLogErr, "RawPort: the device has gone");
       break;

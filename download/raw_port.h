@@ -35,7 +35,9 @@ class RawPort {
   // True when all of it was written.
   bool Write(std::span<const uint8_t> packet);
   // Waits for the full count, the time-out or the end of the device; gives the bytes read.
-  size_t Read(std::span<uint8_t> buffer);
+  size_t Read(std::span<uint8_t> buffer) { return Read(buffer, buffer.size()); }
+  // The same, but for a line that falls quiet once it has said enough.
+  size_t Read(std::span<uint8_t> buffer, size_t enough);
   void Purge();  // forgets what was received
   void Pause(uint32_t milliseconds);
 

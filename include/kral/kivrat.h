@@ -17,7 +17,8 @@
  *   KRAL_DIAG_DLOAD_F has just sent into its boot loader.
  * - From KRAL_Kivrat_Connect on the port belongs to the boot transfer, and requests of the handle give 0. It is given
  *   back at the end of KRAL_Kivrat_DownloadFlashProgrammer, by every failure, by KRAL_Kivrat_End and by a connect; the
- *   next request opens it for diagnostics again.
+ *   next request opens it for diagnostics again. Only a flash programmer whose file cannot be opened leaves everything
+ *   as it is: the target still waits, and can be given another file.
  * - Nothing is repeated inside an exchange. After a failure the target waits for ever, or until it is powered off and
  *   on: a new attempt begins with its hello.
  * - Every packet of the target is awaited for 5,000 ms.
@@ -69,8 +70,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* ver
 
 /**
  * Serves a flash programmer to the target that KRAL_Kivrat_Connect has left waiting. The file goes out from its front
- * to its end, in the pieces that the target asks for, whatever offsets it names. What the target says of the image
- * (its status) is told in the text log only.
+ * to its end, in the pieces that the target asks for, whatever offsets it names. Requests for nothing get nothing; a
+ * hundred of them in a row end the transfer. What the target says of the image (its status) is told in the text log
+ * only.
  *
  * @param handle           of a connected target
  * @param programmer_file  path of the file, in the target's own format

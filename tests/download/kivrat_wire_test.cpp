@@ -69,7 +69,7 @@ class KivratWire : public testing::Test {
     log_->Take();
     written_before_ = wire_.Written().size();
     says_.assign(says.begin(), says.end());
-    const auto say_next = [this, byte_by_byte](const Bytes&) {
+    say_next_ = [this, byte_by_byte](const Bytes&) {
       if (says_.empty()) return Bytes();
       const Bytes bytes = FromHex(says_.front());
       says_.pop_front();
@@ -77,8 +77,8 @@ class KivratWire : public testing::Test {
       for (const uint8_t byte : bytes) wire_.ToHost({byte});
       return Bytes();
     };
-    wire_.ToHost(say_next({}));
-    wire_.OnWrite(say_next);
+    wire_.ToHost(say_next_({}));
+    wire_.OnWrite(say_next_);
   }
 
   Texts Written() const {
@@ -103,6 +103,7 @@ class KivratWire : public testing::Test {
   std::shared_ptr<Diag_FTM> phone_;
   std::unique_ptr<test::PhoneLog> log_;
   std::deque<std::string> says_;
+  test::TestWire::Responder say_next_;
   size_t written_before_ = 0;
   test::TempFolder folder_;
 };
@@ -150,7 +151,9 @@ TEST_F(KivratWire, IdentityNeedsItsSecondWordOnly) {
     std::string sent;
     bool known;
   };
+  // What is told beforehand does not bound the one read: it takes what comes, up to 24 bytes.
   for (const Row& row : {Row{"08", kIdentity.substr(0, 8 * 3), true}, Row{"18", kIdentity.substr(0, 8 * 3), true},
+                         Row{"08", kIdentity, true}, Row{"04", kIdentity, true},
                          Row{"30", kIdentity + "77 77 77 77", true}, Row{"07", kIdentity.substr(0, 7 * 3), false}}) {
     Target({kHello, kReady, ExecuteResponse(row.told), row.sent, kHello});
     uint32_t version = 0;
@@ -158,6 +161,28 @@ TEST_F(KivratWire, IdentityNeedsItsSecondWordOnly) {
     EXPECT_EQ(kivrat::Connect(*phone_, version, &identity), row.known) << row.told;
     EXPECT_EQ(identity.value_or(0), row.known ? 0x008140E1u : 0u);
   }
+}
+
+TEST_F(KivratWire, IdentityDataThatComeLateAreNotTakenForTheHello) {
+  Bytes late = FromHex(kIdentity);
+  Target({kHello, kReady, ExecuteResponse("30"), kIdentity});
+  phone_->kivrat().read_time_out_ms = 5000;
+  // They come while they are waited for, else right in front of the hello.
+  const kivrat::Stop come_late = [&] {
+    if (says_.empty()) wire_.ToHost(std::exchange(late, {}));
+    return false;
+  };
+  wire_.OnWrite([&](const Bytes& written) {
+    if (HexText(written) != kSwitch) return say_next_(written);
+    Bytes bytes = std::exchange(late, {});
+    const Bytes hello = FromHex(kHello);
+    bytes.insert(bytes.end(), hello.begin(), hello.end());
+    return bytes;
+  });
+  uint32_t version = 0;
+  std::optional<uint32_t> identity;
+  EXPECT_TRUE(kivrat::Connect(*phone_, version, &identity, come_late));
+  EXPECT_EQ(identity, 0x008140E1u);
 }
 
 TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheConnect) {
@@ -282,7 +307,6 @@ TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheTransfer) {
            Row{"a length over the buffer", {header(4, 131073)}, read_failed, 0},
            Row{"a length of all ones", {header(3, 0xFFFFFFFF)}, read_failed, 0},
            Row{"a request without its fields", {header(3, 8)}, "Kivrat: a request for 0 bytes", 0},
-           Row{"a request for nothing", {ReadRequest(0, 0)}, "Kivrat: a request for 0 bytes", 0},
            Row{"a request over the buffer", {ReadRequest(0, 131073)}, "Kivrat: a request for 131073 bytes", 0},
            Row{"a request behind the end",
                {ReadRequest(0, 6), ReadRequest(6, 1)},
@@ -311,16 +335,34 @@ TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheTransfer) {
   }
 }
 
+TEST_F(KivratWire, RequestsForNothingGetNothingAndMayNotGoOnForEver) {
+  const std::string file = folder_.Add("programmer", "0123456789");
+  const std::string nothing = ReadRequest(0, 0) + " ";
+  Target({nothing + ReadRequest(0, 4), nothing + nothing + ReadRequest(4, 6), nothing + kEnd, kDoneResponse});
+  EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, file));
+  EXPECT_EQ(Written(), (Texts{"30 31 32 33", "34 35 36 37 38 39", kDone}));
+  std::string many;
+  for (int i = 0; i < 200; ++i) many += nothing;
+  Target({many + kEnd, kDoneResponse});
+  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, file));
+  EXPECT_TRUE(HasError("Kivrat: a request for 0 bytes, and 99 before it"));
+  Target({many + kEnd});
+  EXPECT_FALSE(
+      kivrat::DownloadFlashProgrammer(*phone_, file, [looks = 0](uint64_t, uint64_t) mutable { return ++looks < 5; }));
+  EXPECT_TRUE(HasError("Kivrat: the transfer was aborted"));
+}
+
 TEST_F(KivratWire, TransferNeedsAConnectAndAFile) {
   EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abc")));
   EXPECT_TRUE(HasError("Failed KivratInit()"));
   Target({""});
   EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("missing")));
-  EXPECT_FALSE(phone_->port_borrowed());
-  Target({""});
   EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("")));
-  EXPECT_EQ(Lines("16").size(), 1u);
-  EXPECT_FALSE(phone_->port_borrowed());
+  EXPECT_EQ(Lines("16").size(), 2u);
+  // Nothing has happened to the target, which takes the right file now.
+  EXPECT_TRUE(phone_->port_borrowed());
+  Target({ReadRequest(0, 3), kEnd, kDoneResponse});
+  EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("file")));
 }
 
 TEST_F(KivratWire, CallerEndsTheTransferBetweenTwoPieces) {
