@@ -59,7 +59,8 @@ uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImag
   } catch (const PhoneImageException& exception) {
     connection.log().WriteLine(kLogErr, "%s at 0x%08X, size 0x%X", exception.what(), exception.address(),
                                exception.count());
-    return KRAL_STREAM_WRITE_FAILED;
+    const bool reading = exception.kind() == PhoneImageException::Kind::kRead;
+    return reading ? KRAL_STREAM_FILE_NOT_READ : KRAL_STREAM_WRITE_FAILED;
   }
 }
 
@@ -173,6 +174,7 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
     ImageFile image;
     ImageFile header;
     uint32_t opened = image.Open(file, format);
+    if (opened == KRAL_STREAM_DATA_LOST) LogLoss(connection.log(), file, image.loss());
     if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
       opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
     if (opened != KRAL_STREAM_WRITTEN) return opened;
@@ -188,6 +190,7 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
   connection.BeginWork();
   if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
+    if (PassesTheEnd(address, image.size)) return KRAL_STREAM_PAST_END;
     const auto whole = MakeMemoryImage({image.data, image.size}, address);
     if (whole == nullptr) return KRAL_STREAM_WRITE_FAILED;
     if (header.size > stream::kLongestHeader) {

@@ -1,4 +1,6 @@
 // Exports of software download: name line, handle, operation.
+#include <algorithm>
+
 #include "download/download_client.h"
 #include "download/image_file.h"
 #include "frame/base/text_argument.h"
@@ -108,6 +110,18 @@ uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KR
   return WithoutPhone(result, [=] {
     if (image_file == nullptr || info == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
     return kral::GetImageInfo(image_file, format, *info);
+  });
+}
+
+uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64_t* bytes, uint32_t* result) {
+  return WithoutPhone(result, [=] {
+    if (hex_file == nullptr || line == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
+    kral::HexLoss loss;
+    const uint32_t value = kral::FindHexLoss(hex_file, loss);
+    if (value != KRAL_STREAM_WRITTEN) return value;
+    *line = static_cast<uint32_t>(std::min<uint64_t>(loss.line, UINT32_MAX));
+    if (bytes != nullptr) *bytes = loss.bytes;
+    return value;
   });
 }
 

@@ -65,10 +65,12 @@ uint32_t CheckProgrammer(const char* file, uint64_t& size) {
   return KRAL_STREAM_WRITTEN;
 }
 
-uint32_t CheckImage(const char* file, uint64_t& size) {
+uint32_t CheckImage(DataLogFileHandler& log, const char* file, uint64_t& size) {
   KRAL_IMAGE_INFO info{};
   try {
-    const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info);
+    HexLoss loss;
+    const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info, &loss);
+    if (result == KRAL_STREAM_DATA_LOST) LogLoss(log, file, loss);
     if (result != KRAL_STREAM_WRITTEN) return result;
   } catch (const std::exception&) {  // no memory or address space for it
     return KRAL_STREAM_FILE_NOT_DECODED;
@@ -102,7 +104,7 @@ FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const c
   std::vector<uint64_t> sizes(images.size());
   uint64_t total = programmer_size;
   for (uint32_t i = 0; i < images.size(); ++i) {
-    if (const uint32_t result = CheckImage(images[i], sizes[i])) return {result, i};
+    if (const uint32_t result = CheckImage(phone.log(), images[i], sizes[i])) return {result, i};
     total += sizes[i];
     if (phone.download().abort) return {KRAL_DOWNLOAD_ABORTED};
   }

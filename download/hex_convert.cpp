@@ -48,7 +48,12 @@ class MovedImage final : public PhoneImage {
   uint32_t GetStartAddress() override { return image_.GetStartAddress(); }
   uint8_t* GetPointer(uint32_t offset) override { return image_.GetPointer(offset); }
   void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override {
-    image_.Read(address - base_, buffer, count, region);
+    try {
+      image_.Read(address - base_, buffer, count, region);
+    } catch (const PhoneImageException&) {
+      read_failed_ = true;  // of which an encoder keeps no more than that it failed
+      throw;
+    }
   }
   void SetBaseAddress(uint32_t value, uint32_t) override { base_ = value; }
   void SetSize(uint32_t value, uint32_t region) override { image_.SetSize(value, region); }
@@ -57,9 +62,12 @@ class MovedImage final : public PhoneImage {
     image_.Write(address - base_, data, count, region);
   }
 
+  bool read_failed() const { return read_failed_; }
+
  private:
   PhoneImage& image_;
   uint32_t base_;
+  bool read_failed_ = false;
 };
 
 }  // namespace
@@ -90,11 +98,12 @@ uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32
   ImageFile binary;
   const uint32_t result = binary.Open(input, KRAL_IMAGE_FORMAT_BINARY);
   if (result != KRAL_STREAM_WRITTEN) return result;
+  if (PassesTheEnd(base, binary.image().GetSize(0))) return KRAL_STREAM_PAST_END;
   MovedImage image(binary.image(), base);
   HexPhoneImageDecoder encoder(false, false, true);
   AtomicTextSink file;
-  if (!file.Open(output) || !encoder.Encode(image, file) || !file.Commit()) return KRAL_HEX_NOT_WRITTEN;
-  return KRAL_STREAM_WRITTEN;
+  if (file.Open(output) && encoder.Encode(image, file) && file.Commit()) return KRAL_STREAM_WRITTEN;
+  return image.read_failed() ? KRAL_STREAM_FILE_NOT_READ : KRAL_HEX_NOT_WRITTEN;
 }
 
 }  // namespace kral

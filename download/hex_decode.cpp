@@ -1,4 +1,5 @@
 // Intel HEX into an image. The first pass finds the base address, the second loads the data.
+#include <algorithm>
 #include <array>
 #include <limits>
 #include <span>
@@ -97,11 +98,14 @@ bool HexPhoneImageDecoder::LoadData(PhoneImage& image, LineReader& lines) {
   image.SetBaseAddress(hex::kSecondRegionBase, 1);
   image.SetSize(0, 1);
 
+  loss_ = {};
+  beyond_.clear();
   Cursor cursor{kUnknown, 0, false};
   LineReader::Line line;
   while (lines.Next(line)) {
     if (!LoadRecord(image, line, cursor)) return false;
   }
+  LoseBeyond(image);
   return cursor.at_end;
 }
 
@@ -111,17 +115,8 @@ bool HexPhoneImageDecoder::LoadRecord(PhoneImage& image, const LineReader::Line&
   const char type = TypeAt(text, hex::kSecondTypeAt);
   cursor.at_end = type == '1';  // records behind the end-of-file record still count
   switch (type) {
-    case '0': {
-      // Data before the first extended address record is dropped, unchecked, on purpose.
-      if (cursor.extended_base == kUnknown) return true;
-      const auto length = ValueAt<uint16_t>(text, hex::kLengthAt, 2);
-      RecordBytes bytes;
-      const std::span<const uint8_t> record = CheckedBytes(line, length, bytes);
-      if (record.empty()) return false;
-      const uint32_t address = cursor.extended_base + ValueAt<uint16_t>(text, hex::kOffsetAt, 4);
-      image.Write(address, record.data() + hex::kHeaderBytes, length, cursor.region);
-      return true;
-    }
+    case '0':
+      return LoadBytes(image, line, cursor);
     case '1':
       return true;
     case '2':
@@ -144,6 +139,37 @@ bool HexPhoneImageDecoder::LoadRecord(PhoneImage& image, const LineReader::Line&
       return true;
     default:
       return false;
+  }
+}
+
+bool HexPhoneImageDecoder::LoadBytes(PhoneImage& image, const LineReader::Line& line, const Cursor& cursor) {
+  const auto length = ValueAt<uint16_t>(line.text, hex::kLengthAt, 2);
+  // Data before the first extended address record is dropped, unchecked, on purpose.
+  if (cursor.extended_base == kUnknown) {
+    Lose(length, line.number);
+    return true;
+  }
+  RecordBytes bytes;
+  const std::span<const uint8_t> record = CheckedBytes(line, length, bytes);
+  if (record.empty()) return false;
+  const uint32_t address = cursor.extended_base + ValueAt<uint16_t>(line.text, hex::kOffsetAt, 4);
+  image.Write(address, record.data() + hex::kHeaderBytes, length, cursor.region);
+  // The first record of a region sets its size without its distance from the base, and sizes are compared modulo 2^32.
+  const uint64_t end = uint64_t{address - image.GetBaseAddress(cursor.region)} + length;
+  if (end > image.GetSize(cursor.region)) beyond_.push_back({end, length, cursor.region, line.number});
+  return true;
+}
+
+void HexPhoneImageDecoder::Lose(uint64_t bytes, uint64_t line) {
+  if (loss_.bytes == 0 && bytes != 0) loss_.line = line;
+  loss_.bytes += bytes;
+}
+
+// Dropped data stand in front of all others, so that the first line is the first here too.
+void HexPhoneImageDecoder::LoseBeyond(PhoneImage& image) {
+  for (const Beyond& record : beyond_) {
+    const uint64_t size = image.GetSize(record.region);
+    if (record.end > size) Lose(std::min<uint64_t>(record.length, record.end - size), record.line);
   }
 }
 

@@ -5,12 +5,19 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "download/phone_image_decoder.h"
 
 namespace kral {
 
 class HexWriter;
+
+// Data of a file that its image does not hold: dropped by the reader, or behind the end of their region.
+struct HexLoss {
+  uint64_t bytes = 0;
+  uint64_t line = 0;  // of the first of them, from 1
+};
 
 class HexPhoneImageDecoder final : public PhoneImageDecoder {
  public:
@@ -28,21 +35,36 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
   bool start_is_linear() const { return start_is_linear_; }
   bool linear_addressing() const { return linear_addressing_; }
 
+  // What the last Decode lost. The reader takes no offence at it; whoever uses the image should.
+  const HexLoss& loss() const { return loss_; }
+
  private:
   struct Cursor {
     uint32_t extended_base;
     uint32_t region;
     bool at_end;  // the last record was the end-of-file record
   };
+  // A record that was written behind the end of its region, which later ones may move.
+  struct Beyond {
+    uint64_t end;  // from the region's base
+    uint32_t length;
+    uint32_t region;
+    uint64_t line;
+  };
 
   void FindBase(PhoneImage& image, LineReader& lines);
   bool LoadData(PhoneImage& image, LineReader& lines);
   bool LoadRecord(PhoneImage& image, const LineReader::Line& line, Cursor& cursor);
+  bool LoadBytes(PhoneImage& image, const LineReader::Line& line, const Cursor& cursor);
+  void Lose(uint64_t bytes, uint64_t line);
+  void LoseBeyond(PhoneImage& image);
   void EncodeRegion(PhoneImage& image, uint32_t region, HexWriter& writer) const;
 
   bool start_address_present_ = false;
   bool start_is_linear_ = false;    // set by a type 05 record
   bool linear_addressing_ = false;  // a type 04 or 05 record was seen
+  HexLoss loss_;
+  std::vector<Beyond> beyond_;
 };
 
 }  // namespace kral

@@ -5,7 +5,6 @@
 #include <array>
 #include <vector>
 
-#include "download/hex_phone_image_decoder.h"
 #include "download/phone_image_binary.h"
 #include "download/phone_image_dpaged.h"
 #include "download/text_source.h"
@@ -47,7 +46,7 @@ uint32_t ImageFile::Open(const std::string& path, uint32_t format) {
   if (format_ == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
   if (format_ != KRAL_IMAGE_FORMAT_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
   auto binary = std::make_unique<PhoneImageBinary>();
-  if (!binary->Open(path)) return KRAL_STREAM_FILE_NOT_OPENED;
+  if (!binary->Open(path)) return binary->too_large() ? KRAL_STREAM_FILE_TOO_LARGE : KRAL_STREAM_FILE_NOT_OPENED;
   image_ = std::move(binary);
   return KRAL_STREAM_WRITTEN;
 }
@@ -61,7 +60,21 @@ uint32_t ImageFile::OpenHex(const std::string& path) {
   } catch (const PhoneImageException&) {  // a process that has no address space left
     return KRAL_STREAM_FILE_NOT_DECODED;
   }
-  return decoder_->Decode(*image_, file) ? KRAL_STREAM_WRITTEN : KRAL_STREAM_FILE_NOT_DECODED;
+  if (!decoder_->Decode(*image_, file)) return KRAL_STREAM_FILE_NOT_DECODED;
+  loss_ = decoder_->loss();
+  if (loss_.bytes != 0) return KRAL_STREAM_DATA_LOST;
+  // A file whose base no record tells has the last address for it.
+  const bool passes = image_->GetSize(0) != 0 && PassesTheEnd(image_->GetBaseAddress(0), image_->GetSize(0));
+  return passes ? KRAL_STREAM_PAST_END : KRAL_STREAM_WRITTEN;
+}
+
+void LogLoss(DataLogFileHandler& log, const std::string& file, const HexLoss& loss) {
+  log.WriteLine(kLogErr, "%s: line %llu holds data that have no place in the image, %llu bytes are lost in all",
+                file.c_str(), static_cast<unsigned long long>(loss.line), static_cast<unsigned long long>(loss.bytes));
+}
+
+bool PassesTheEnd(uint32_t base, uint64_t size) {
+  return uint64_t{base} + size > uint64_t{1} << 32;
 }
 
 std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint32_t address) {
@@ -76,9 +89,10 @@ std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint
   }
 }
 
-uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info) {
+uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO& info, HexLoss* loss) try {
   ImageFile file;
   const uint32_t result = file.Open(path, format);
+  if (loss != nullptr) *loss = file.loss();
   if (result != KRAL_STREAM_WRITTEN) return result;
   KRAL_IMAGE_INFO found{};
   found.format = file.format();
@@ -91,6 +105,15 @@ uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO&
   }
   info = found;
   return KRAL_STREAM_WRITTEN;
+} catch (const PhoneImageException&) {
+  return KRAL_STREAM_FILE_NOT_READ;
+}
+
+uint32_t FindHexLoss(const std::string& path, HexLoss& loss) {
+  ImageFile file;
+  const uint32_t result = file.Open(path, KRAL_IMAGE_FORMAT_HEX);
+  loss = file.loss();
+  return result == KRAL_STREAM_DATA_LOST || result == KRAL_STREAM_PAST_END ? KRAL_STREAM_WRITTEN : result;
 }
 
 }  // namespace kral

@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "download/hex_phone_image_decoder.h"
+#include "download/image_file.h"
 #include "download/kova.h"
 #include "download/kova_format.h"
 #include "download/phone_image_dpaged.h"
@@ -47,6 +47,10 @@ uint32_t LoadFlashProgrammer(DownloadConnection& connection, const std::string& 
   TextFile text;
   if (!text.OpenForReading(file)) return KRAL_KOVA_FILE_NOT_OPENED;
   if (!decoder.Decode(image, text)) return KRAL_KOVA_FILE_NOT_DECODED;
+  if (decoder.loss().bytes != 0) {
+    LogLoss(log, file, decoder.loss());
+    return KRAL_KOVA_DATA_LOST;
+  }
 
   const bool sent = SendImage(connection, image, ChunkSize(maximum_packet));
   if (connection.aborted()) return KRAL_DOWNLOAD_ABORTED;

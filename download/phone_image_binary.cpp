@@ -1,7 +1,6 @@
 // Hands out the view of a mapped file within its bounds.
 #include "download/phone_image_binary.h"
 
-#include <cstring>
 #include <limits>
 
 namespace kral {
@@ -15,11 +14,10 @@ void CheckRegion(uint32_t region) {
 
 bool PhoneImageBinary::Open(const std::string& path) {
   base_ = size_ = start_ = 0;
-  if (file_.Open(path, false) == nullptr) return false;
-  if (file_.Size() > std::numeric_limits<uint32_t>::max()) {
-    file_.Close();
-    return false;
-  }
+  const bool mapped = file_.Open(path, false) != nullptr;
+  too_large_ = file_.too_large() || file_.Size() > std::numeric_limits<uint32_t>::max();
+  if (too_large_) file_.Close();
+  if (!mapped || too_large_) return false;
   size_ = GetTotalSize();
   return true;
 }
@@ -58,8 +56,8 @@ uint8_t* PhoneImageBinary::GetPointer(uint32_t offset) {
 
 void PhoneImageBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) {
   CheckRegion(region);
-  if (uint64_t{address} + count > GetTotalSize()) throw PhoneImageException::ReadFailure(address, count);
-  if (count != 0) std::memcpy(buffer, file_.view() + address, count);
+  const bool inside = uint64_t{address} + count <= GetTotalSize();
+  if (!inside || !file_.Copy(address, buffer, count)) throw PhoneImageException::ReadFailure(address, count);
 }
 
 void PhoneImageBinary::SetBaseAddress(uint32_t value, uint32_t region) {

@@ -15,8 +15,10 @@ class PhoneImageBinary final : public PhoneImage {
  public:
   using PhoneImage::PhoneImage;
 
-  // False when the file cannot be mapped (missing, empty, unreadable) or has more bytes than 32 bits can count.
+  // False when the file cannot be mapped (missing, empty, unreadable), and for one that is too large: more bytes than
+  // 32 bits can count, or than there is address space for.
   bool Open(const std::string& path);
+  bool too_large() const { return too_large_; }
   uint32_t last_error() const { return file_.last_error(); }  // of the system
 
   void Clear() override;  // throws "Write Failure", as Write does
@@ -37,6 +39,7 @@ class PhoneImageBinary final : public PhoneImage {
   uint32_t base_ = 0;
   uint32_t size_ = 0;
   uint32_t start_ = 0;
+  bool too_large_ = false;
 };
 
 }  // namespace kral

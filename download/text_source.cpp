@@ -79,12 +79,14 @@ bool LineReader::Next(Line& line) {
   if (length > 0 && buffer_[begin_ + length - 1] == '\r') --length;
   line.whole = line.whole && length <= limit_;
   line.text = std::string_view(buffer_).substr(begin_, std::min(length, limit_));
+  line.number = ++lines_;
   begin_ = newline != nullptr ? stop + 1 : end_;
   return true;
 }
 
 void LineReader::Rewind() {
   source_.Rewind();
+  lines_ = 0;
   begin_ = end_ = 0;
 }
 

@@ -3,6 +3,7 @@
 #define KRAL_DOWNLOAD_TEXT_SOURCE_H
 
 #include <cstddef>
+#include <cstdint>
 #include <cstdio>
 #include <memory>
 #include <span>
@@ -66,6 +67,7 @@ class LineReader {
   struct Line {
     std::string_view text;  // valid until the next call
     bool whole = true;      // false when the line is longer than the limit and was cut there
+    uint64_t number = 0;    // from 1
   };
 
   LineReader(TextSource& source, size_t limit);
@@ -79,6 +81,7 @@ class LineReader {
   TextSource& source_;
   const size_t limit_;
   std::string buffer_;
+  uint64_t lines_ = 0;
   size_t begin_ = 0;  // what is read but not yet handed out
   size_t end_ = 0;
 };

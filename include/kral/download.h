@@ -72,6 +72,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle);
 #define KRAL_KOVA_FILE_NOT_DECODED 2u /**< no Intel HEX file, or larger than 500 KiB */
 #define KRAL_KOVA_GO_FAILED 4u        /**< loaded, but the handset did not acknowledge the start */
 #define KRAL_KOVA_WRITE_FAILED 5u     /**< a piece was not acknowledged, or lies outside the image */
+#define KRAL_KOVA_DATA_LOST 6u        /**< data of the file have no place in its image (KRAL_HEX_FindLoss) */
 
 /**
  * Loads a flash programmer from an Intel HEX file into the handset's memory and starts it at its start address, which
@@ -171,6 +172,11 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const
 #define KRAL_STREAM_NOT_COMPLETED 8u    /**< the last acknowledgement did not come */
 #define KRAL_STREAM_THREAD_STUCK 9u     /**< the response thread did not stop */
 #define KRAL_STREAM_CLOSE_FAILED 10u    /**< everything is written, but the handset did not close the image */
+/* 11 is KRAL_HEX_NOT_WRITTEN. */
+#define KRAL_STREAM_DATA_LOST 12u      /**< data of a HEX file have no place in its image (KRAL_HEX_FindLoss) */
+#define KRAL_STREAM_FILE_TOO_LARGE 13u /**< a binary of 4 GiB and more, or of more than the process can map */
+#define KRAL_STREAM_PAST_END 14u       /**< the image would go on past address 0xFFFFFFFF */
+#define KRAL_STREAM_FILE_NOT_READ 15u  /**< the file could not be read to its end: it has become shorter meanwhile */
 
 /**
  * Writes an image file into flash.
@@ -182,7 +188,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const
  * @param      header_file path of the header that goes with the opening packet, at most 512 bytes; null for none
  * @param      method      KRAL_STREAM_MULTI_IMAGE or KRAL_STREAM_NOR
  * @param      block_size  as KRAL_STREAM_HELLO told; at most 16,376 bytes are written at a time, and fewer where bytes
- *                         have to be escaped
+ *                         have to be escaped. The frame check of blocks of 8,187 bytes and more covers a part of them
+ *                         only; a programmer that checks them whole never answers those and needs 8,186 here.
  * @param      window      as KRAL_STREAM_HELLO told; one write fewer is kept on its way. 0 counts as 65,536.
  * @param[out] result      KRAL_STREAM_... or KRAL_DOWNLOAD_ABORTED
  * @return 1 when every byte was acknowledged and the image closed
@@ -233,10 +240,23 @@ typedef char KRAL_IMAGE_INFO_SIZE_CHECK[sizeof(KRAL_IMAGE_INFO) == 28 ? 1 : -1];
  * @param      image_file path of the file
  * @param      format     KRAL_IMAGE_FORMAT_...
  * @param[out] info       what is in it
- * @param[out] result     KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_ARGUMENT or 0; may be null
+ * @param[out] result     KRAL_STREAM_FILE_..., ..._DATA_LOST, ..._PAST_END, ..._BAD_ARGUMENT or 0; may be null
  */
 KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info,
                                               uint32_t* result);
+
+/**
+ * Tells which data of an Intel HEX file have no place in its image. Such a file can be decoded, but what came out would
+ * not be what it holds; every other function refuses it. Data are lost in front of the first extended address record
+ * (type 02 or 04), and where the first record lies above the image's base and none behind it reaches as far.
+ *
+ * @param      hex_file path of the file
+ * @param[out] line     number of the first line of which data are lost, from 1; 0 when nothing is
+ * @param[out] bytes    bytes that are lost in all; may be null
+ * @param[out] result   KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_ARGUMENT or 0; may be null
+ * @return 1 when the file can be decoded, whether it loses data or not
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64_t* bytes, uint32_t* result);
 
 #define KRAL_HEX_TO_BINARY 0u
 #define KRAL_HEX_FROM_BINARY 1u
@@ -252,7 +272,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t f
  * @param         direction    KRAL_HEX_TO_BINARY or KRAL_HEX_FROM_BINARY
  * @param[in,out] base_address of the first byte: told by the HEX file, or given for it, then a multiple of 65,536. May
  *                             be null, for 0.
- * @param[out]    result       KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_IMAGE, ..._BAD_ARGUMENT,
+ * @param[out]    result       KRAL_STREAM_FILE_..., ..._DATA_LOST, ..._PAST_END, ..._BAD_IMAGE, ..._BAD_ARGUMENT,
  *                             KRAL_HEX_NOT_WRITTEN or 0; may be null
  */
 KRAL_API uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32_t direction,

@@ -13,6 +13,7 @@ namespace kral {
 
 uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   Close();
+  too_large_ = false;
   // Without O_NONBLOCK the name of a pipe would hang here.
   const int file = ::open(path.c_str(), (writable ? O_RDWR : O_RDONLY) | O_CLOEXEC | O_NONBLOCK);
   last_error_ = file < 0 ? static_cast<uint32_t>(errno) : 0;
@@ -22,7 +23,8 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   struct stat status {};
   last_error_ = ::fstat(file, &status) != 0 ? static_cast<uint32_t>(errno) : 0;
   const auto size = static_cast<uint64_t>(status.st_size);
-  if (last_error_ == 0 && size > std::numeric_limits<size_t>::max()) last_error_ = EFBIG;
+  too_large_ = last_error_ == 0 && size > std::numeric_limits<size_t>::max();
+  if (too_large_) last_error_ = EFBIG;
   if (last_error_ != 0) {
     Close();
     return nullptr;
@@ -31,6 +33,7 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   void* view =
       ::mmap(nullptr, static_cast<size_t>(size), writable ? PROT_READ | PROT_WRITE : PROT_READ, MAP_SHARED, file, 0);
   last_error_ = view == MAP_FAILED ? static_cast<uint32_t>(errno) : 0;
+  too_large_ = last_error_ == ENOMEM;
   if (view == MAP_FAILED) {
     Close();
     return nullptr;
@@ -38,6 +41,21 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   view_ = static_cast<uint8_t*>(view);
   size_ = size;
   return view_;
+}
+
+// Not out of the view: between any look at the size and the copy the file may shrink, and the signal that follows
+// cannot be told from any other. Both have the same pages.
+bool CMapFileToMemory::Copy(uint64_t offset, void* buffer, size_t count) const {
+  auto* bytes = static_cast<uint8_t*>(buffer);
+  while (count > 0) {
+    const ssize_t received = ::pread(static_cast<int>(file_), bytes, count, static_cast<off_t>(offset));
+    if (received < 0 && errno == EINTR) continue;
+    if (received <= 0) return false;
+    bytes += received;
+    offset += static_cast<uint64_t>(received);
+    count -= static_cast<size_t>(received);
+  }
+  return true;
 }
 
 void CMapFileToMemory::Close() {

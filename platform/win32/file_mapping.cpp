@@ -3,6 +3,9 @@
 
 #include <windows.h>
 
+#include <cstring>
+#include <limits>
+
 namespace kral {
 namespace {
 
@@ -14,6 +17,7 @@ HANDLE AsHandle(intptr_t file) {
 
 uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   Close();
+  too_large_ = false;
   const DWORD access = writable ? GENERIC_READ | GENERIC_WRITE : GENERIC_READ;
   const HANDLE file =
       ::CreateFileA(path.c_str(), access, FILE_SHARE_READ, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
@@ -23,6 +27,8 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
 
   LARGE_INTEGER size{};
   last_error_ = ::GetFileSizeEx(file, &size) == 0 ? ::GetLastError() : 0;
+  too_large_ = last_error_ == 0 && static_cast<uint64_t>(size.QuadPart) > std::numeric_limits<size_t>::max();
+  if (too_large_) last_error_ = ERROR_FILE_TOO_LARGE;
   if (last_error_ == 0) {
     mapping_ =
         ::CreateFileMappingA(file, nullptr, (writable ? PAGE_READWRITE : PAGE_READONLY) | SEC_COMMIT, 0, 0, nullptr);
@@ -31,6 +37,7 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   if (last_error_ == 0) {
     view_ = static_cast<uint8_t*>(::MapViewOfFile(mapping_, writable ? FILE_MAP_WRITE : FILE_MAP_READ, 0, 0, 0));
     last_error_ = view_ == nullptr ? ::GetLastError() : 0;
+    too_large_ = last_error_ == ERROR_NOT_ENOUGH_MEMORY;
   }
   if (last_error_ != 0) {
     Close();
@@ -38,6 +45,12 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   }
   size_ = static_cast<uint64_t>(size.QuadPart);
   return view_;
+}
+
+// Nobody can cut the file short while it is open here.
+bool CMapFileToMemory::Copy(uint64_t offset, void* buffer, size_t count) const {
+  if (count != 0) std::memcpy(buffer, view_ + offset, count);
+  return true;
 }
 
 void CMapFileToMemory::Close() {

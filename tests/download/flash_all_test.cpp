@@ -121,6 +121,7 @@ TEST_F(FlashAll, FollowsAHandsetThatComesBackAsAnotherDevice) {
 TEST_F(FlashAll, LooksAtEveryFileBeforeTheFirstPacket) {
   const std::string missing = folder_.Path("missing");
   const std::string broken = folder_.Add("broken.hex", test::kBrokenHex);
+  const std::string dropped = folder_.Add("dropped.hex", test::kDroppedHex);
   const std::string second_region = folder_.Add("second.hex", test::kTwoRegionsHex);
   struct Row {
     std::vector<const char*> images;
@@ -131,6 +132,7 @@ TEST_F(FlashAll, LooksAtEveryFileBeforeTheFirstPacket) {
                          Row{{image_.c_str(), nullptr}, KRAL_STREAM_BAD_ARGUMENT, 1},
                          Row{{missing.c_str()}, KRAL_STREAM_FILE_NOT_OPENED, 0},
                          Row{{image_.c_str(), broken.c_str()}, KRAL_STREAM_FILE_NOT_DECODED, 1},
+                         Row{{image_.c_str(), dropped.c_str()}, KRAL_STREAM_DATA_LOST, 1},
                          Row{{second_region.c_str()}, KRAL_STREAM_BAD_IMAGE, 0}}) {
     EXPECT_EQ(Flash(row.images), 0);
     EXPECT_EQ(result_, row.result);
@@ -198,7 +200,11 @@ TEST_F(FlashAll, StepsCanBeTakenOneByOne) {
   StartInBootLoader();
   EXPECT_EQ(KRAL_Kivrat_Connect(handle_, nullptr, nullptr), 1);
   EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, nullptr), 0);
-  EXPECT_FALSE(ports_.IsOpen(7)) << "any failure gives the port back";
+  EXPECT_EQ(KRAL_Kivrat_DownloadFlashProgrammer(handle_, programmer_.c_str()), 1) << "the target still waited";
+  handset_.faults().Add(handset::Lose(), handset::When::Nth(1));
+  StartInBootLoader();
+  EXPECT_EQ(KRAL_Kivrat_Connect(handle_, nullptr, nullptr), 0);
+  EXPECT_FALSE(ports_.IsOpen(7)) << "any other failure gives the port back";
   EXPECT_EQ(KRAL_Kivrat_Connect(0, &version, nullptr), 0);
 }
 

@@ -1,6 +1,7 @@
 // What the exports tell of image files, and conversions between them.
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <string>
 
 #include "kral/download.h"
@@ -60,6 +61,74 @@ TEST_F(ImageFiles, SecondRegionIsToldAndFitsIntoNoBinary) {
   EXPECT_EQ(info_.base[1], 0x08000000u);
   EXPECT_EQ(info_.size[1], 1u);
   EXPECT_EQ(Convert(file, folder_.Path("two.bin"), KRAL_HEX_TO_BINARY), KRAL_STREAM_BAD_IMAGE);
+}
+
+TEST_F(ImageFiles, ThatWouldLoseDataAreRefusedWithTheLineOfTheFirstLoss) {
+  using test::HexRecord;
+  const auto output = folder_.Add("output", "as it was");
+  const std::string base1 = HexRecord("020000040001");
+  const std::string hello = HexRecord("0500200068656C6C6F");  // at 0x20 of the extended address
+  const std::string end = ":00000001FF\n";
+  const struct {
+    const char* name;
+    std::string text;
+    uint32_t line;
+    uint64_t bytes;
+  } kRows[] = {
+      {"no extended address", test::kDroppedHex, 1, 5},
+      {"two records in front of the first one", hello + hello + base1 + HexRecord("0100000055") + end, 1, 10},
+      {"a start address is no base", HexRecord("0400000500010000") + hello + end, 2, 5},
+      {"one record above the base", base1 + hello + end, 2, 5},
+      {"falling order", base1 + hello + HexRecord("03000000616263") + end, 2, 5},
+      {"a later record reaches a part of it", base1 + hello + HexRecord("03001F00616263") + end, 2, 3},
+      {"a later record reaches all of it", base1 + hello + HexRecord("03002300616263") + end, 0, 0},
+      {"the end of the address space",
+       HexRecord("02000004FFFF") + HexRecord("02FFFC005555") + HexRecord("02FFFE005555") + end, 2, 4},
+      {"the second region above its base", base1 + HexRecord("0100000055") + HexRecord("020000040800") + hello + end, 4,
+       5},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.name);
+    const auto file = folder_.Add("file.hex", row.text);
+    const uint32_t result = row.bytes == 0 ? KRAL_STREAM_WRITTEN : KRAL_STREAM_DATA_LOST;
+    EXPECT_EQ(Info(file), result);
+    if (row.bytes != 0) {
+      EXPECT_EQ(Convert(file, output, KRAL_HEX_TO_BINARY), result);
+    }
+    uint32_t line = 77;
+    uint64_t bytes = 77;
+    uint32_t found = 77;
+    EXPECT_EQ(KRAL_HEX_FindLoss(file.c_str(), &line, &bytes, &found), 1);
+    EXPECT_EQ(line, row.line);
+    EXPECT_EQ(bytes, row.bytes);
+    EXPECT_EQ(found, 0u);
+  }
+  EXPECT_EQ(folder_.Content("output"), "as it was");
+  uint32_t line = 77;
+  uint32_t found = 77;
+  EXPECT_EQ(KRAL_HEX_FindLoss(folder_.Add("file.hex", test::kBrokenHex).c_str(), &line, nullptr, &found), 0);
+  EXPECT_EQ(found, KRAL_STREAM_FILE_NOT_DECODED);
+  EXPECT_EQ(KRAL_HEX_FindLoss(folder_.Path("missing").c_str(), &line, nullptr, &found), 0);
+  EXPECT_EQ(found, KRAL_STREAM_FILE_NOT_OPENED);
+  EXPECT_EQ(line, 77u);
+  EXPECT_EQ(KRAL_HEX_FindLoss(folder_.Path("file.hex").c_str(), nullptr, nullptr, nullptr), 0);
+}
+
+TEST_F(ImageFiles, EndWhereTheAddressesEnd) {
+  const auto output = folder_.Path("output");
+  uint32_t base = 0xFFFF0000;
+  EXPECT_EQ(Convert(folder_.Add("over", std::string(0x10001, 'x')), output, KRAL_HEX_FROM_BINARY, &base),
+            KRAL_STREAM_PAST_END);
+  EXPECT_FALSE(std::filesystem::exists(output));
+  EXPECT_EQ(Convert(folder_.Add("full", std::string(0x10000, 'x')), output, KRAL_HEX_FROM_BINARY, &base), 0u);
+  // Without a record that tells the base, it is the last address: the image would go on from 0.
+  const auto baseless = folder_.Add(
+      "baseless.hex", test::HexRecord("020000040000") + test::HexRecord("0400000500000000") +
+                          test::HexRecord("020000005555") + test::HexRecord("0100020055") + ":00000001FF\n");
+  EXPECT_EQ(Info(baseless), KRAL_STREAM_PAST_END);
+  const auto large = folder_.Add("large", "x");
+  std::filesystem::resize_file(large, uint64_t{5} << 30);
+  EXPECT_EQ(Info(large), KRAL_STREAM_FILE_TOO_LARGE);
 }
 
 TEST_F(ImageFiles, FailuresHaveTheirResultsAndLeaveTheOutputAlone) {

@@ -6,19 +6,15 @@
 
 #include "download/hex_phone_image_decoder.h"
 #include "download/phone_image_dpaged.h"
+#include "tests/support/hex_files.h"
 
 namespace kral {
 namespace {
 
 constexpr uint32_t kNoAddress = 0xFFFFFFFF;
 
-// A line of the digits and their checksum.
 std::string Record(const std::string& digits) {
-  unsigned long sum = 0;
-  for (size_t i = 0; i + 1 < digits.size(); i += 2) sum += std::stoul(digits.substr(i, 2), nullptr, 16);
-  char checksum[3];
-  std::snprintf(checksum, sizeof checksum, "%02lX", -sum & 0xFF);
-  return ":" + digits + checksum + "\n";
+  return test::HexRecord(digits);
 }
 
 const std::string kEnd = ":00000001FF\n";

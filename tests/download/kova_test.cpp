@@ -98,6 +98,9 @@ TEST_F(Kova, EveryFailureHasItsResult) {
   EXPECT_EQ(Load(folder_.Path("missing")), KRAL_KOVA_FILE_NOT_OPENED);
   EXPECT_EQ(Load(broken), KRAL_KOVA_FILE_NOT_DECODED);
   EXPECT_EQ(Load(large), KRAL_KOVA_FILE_NOT_DECODED);
+  EXPECT_EQ(Load(folder_.Add("dropped.hex", test::kDroppedHex)), KRAL_KOVA_DATA_LOST) << "and is not started";
+  EXPECT_TRUE(HasLine(KRAL_LOG_ERR, folder_.Path("dropped.hex") + ": line 1 holds data that have no place in the "
+                                                                  "image, 5 bytes are lost in all"));
   EXPECT_EQ(KRAL_KOVA_LoadFlashProgrammer(handle(), nullptr, 32, nullptr), 0);
   EXPECT_EQ(handset().loader().packets().size(), 0u) << "nothing was sent";
 

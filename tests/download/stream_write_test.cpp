@@ -60,6 +60,15 @@ TEST_F(StreamWrite, LargestBlocksFitTheirFramesWhateverTheBytes) {
   ExpectInFlash(bytes);
 }
 
+TEST_F(StreamWrite, ImagesEndWhereTheAddressesEnd) {
+  StartProgrammer();
+  const auto bytes = RandomBytes(300);
+  EXPECT_EQ(WriteMem(bytes, 0xFFFFFFFF - 298), KRAL_STREAM_PAST_END) << "its last byte would be written to 0";
+  EXPECT_EQ(handset().programmer().images().size(), 0u);
+  EXPECT_EQ(WriteMem(bytes, 0xFFFFFFFF - 299), KRAL_STREAM_WRITTEN) << ErrorText();
+  ExpectInFlash(bytes, 0xFFFFFFFF - 299);
+}
+
 TEST(StreamWriteSize, IsBoundByTheFrame) {
   const auto fitting = [](const std::vector<uint8_t>& bytes, uint32_t address = 0) {
     return CImageWriteCmdFramed::FittingSize(address, bytes);
@@ -226,6 +235,8 @@ TEST_F(StreamWrite, FilesOfBothFormatsAndWhatIsWrongWithThem) {
   const size_t images = handset().programmer().images().size();
   const auto two = folder.Add("two.hex", test::kTwoRegionsHex);
   EXPECT_EQ(write(two, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_BAD_IMAGE);
+  EXPECT_EQ(write(folder.Add("dropped.hex", test::kDroppedHex), KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_DATA_LOST);
+  EXPECT_NE(ErrorText().find("dropped.hex: line 1 holds data"), std::string::npos);
   EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_FILE_NOT_DECODED);
   EXPECT_EQ(write(binary, 7), KRAL_STREAM_BAD_ARGUMENT);
   EXPECT_EQ(write(folder.Add("empty", ""), KRAL_IMAGE_FORMAT_BY_CONTENT), KRAL_STREAM_FILE_NOT_OPENED);

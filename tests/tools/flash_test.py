@@ -115,6 +115,22 @@ class Flash(ToolTest):
                       ("write", "--dry-run", "--partition", self.path("missing"), binary)):
             self.expect_json(10, "flash", *words)
 
+    def test_files_that_lose_data_or_are_too_large_are_refused(self):
+        lossy = self.add("lossy.hex", b":020000040002F8\n:02001000AABB89\n:00000001FF\n")
+        large = self.add("large.bin", b"")
+        os.truncate(large, 5 << 30)
+        for file, reason, verbs in (
+                (lossy, "2 bytes of its data have no place in the image, the first of them on line 2",
+                 (("verify-image",), ("write", "--dry-run"), ("load", "--dry-run"), ("hex",))),
+                (large, "4 GiB", (("verify-image",), ("write", "--dry-run"), ("hex",)))):
+            for verb, *more in verbs:
+                words = ["flash", verb, *more, file] + ([self.path("output")] if verb == "hex" else [])
+                with self.subTest(words=words):
+                    self.assertIn(reason, self.expect_json(10, *words)["error"]["text"])
+        self.assertFalse(os.path.exists(self.path("output")))
+        full = self.add("full.bin", bytes(65537))
+        self.expect_json(2, "flash", "hex", "--base", "0xFFFF0000", full, self.path("output"))
+
     def test_hex_files_become_binaries_and_back(self):
         content = os.urandom(5000)
         binary, hexfile, back = self.add("a.bin", content), self.path("a.hex"), self.path("b.bin")

@@ -19,12 +19,34 @@ ToolError BadImage(const std::string& file, std::string_view why, std::string hi
   return {ExitCode::kBadFile, fmt::format("{}: {}", file, why), std::move(hint)};
 }
 
+std::string DescribeLoss(const std::string& file) {
+  std::uint32_t line = 0;
+  std::uint64_t bytes = 0;
+  KRAL_HEX_FindLoss(file.c_str(), &line, &bytes, nullptr);
+  return fmt::format("{} bytes of its data have no place in the image, the first of them on line {}", bytes, line);
+}
+
 KRAL_IMAGE_INFO ReadInfo(const std::string& file, std::uint32_t format) {
   KRAL_IMAGE_INFO info{};
   std::uint32_t result = 0;
   if (KRAL_IMAGE_GetInfo(file.c_str(), format, &info, &result) != 0) return info;
-  if (result == KRAL_STREAM_FILE_NOT_OPENED) {
-    throw BadImage(file, "the file is missing, empty or unreadable", "check its name and permissions");
+  switch (result) {
+    case KRAL_STREAM_FILE_NOT_OPENED:
+      throw BadImage(file, "the file is missing, empty or unreadable", "check its name and permissions");
+    case KRAL_STREAM_FILE_TOO_LARGE:
+      throw BadImage(file, "the file has 4 GiB or more, or more than this program can map",
+                     "addresses have 32 bits: split the image");
+    case KRAL_STREAM_FILE_NOT_READ:
+      throw BadImage(file, "the file became shorter while it was read", "wait until it is complete");
+    case KRAL_STREAM_DATA_LOST:
+      throw BadImage(file, DescribeLoss(file),
+                     "data need an extended address record (type 02 or 04) in front of them, and the lowest of a "
+                     "region must come first: kral flash hex writes such files from a binary");
+    case KRAL_STREAM_PAST_END:
+      throw BadImage(file, "its image would go on past address 0xFFFFFFFF",
+                     "each extended address record (type 02 or 04) must have data right behind it");
+    default:
+      break;
   }
   throw BadImage(file, "this is no sound Intel HEX file",
                  "a broken record, a missing end-of-file record, or data spread over more than 128 MiB; raw images are "

@@ -113,6 +113,7 @@ void FlashTarget::Load(const FlashImage& programmer, std::uint32_t maximum_packe
       throw InterruptedError();
     case KRAL_KOVA_FILE_NOT_OPENED:
     case KRAL_KOVA_FILE_NOT_DECODED:
+    case KRAL_KOVA_DATA_LOST:
       throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read as a flash programmer", programmer.file),
                       "kral flash verify-image FILE tells what is in it");
     case KRAL_KOVA_GO_FAILED:
@@ -175,8 +176,14 @@ ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_
     case KRAL_STREAM_FILE_NOT_OPENED:
     case KRAL_STREAM_FILE_NOT_DECODED:
     case KRAL_STREAM_BAD_IMAGE:
+    case KRAL_STREAM_DATA_LOST:
+    case KRAL_STREAM_FILE_TOO_LARGE:
+    case KRAL_STREAM_PAST_END:
       return {ExitCode::kBadFile, fmt::format("{} or its header cannot be used as an image", file),
               "kral flash verify-image FILE tells what is in it"};
+    case KRAL_STREAM_FILE_NOT_READ:
+      return {ExitCode::kBadFile, fmt::format("{} became shorter while it was written", file),
+              "the flash holds part of the image: write it again when the file is complete"};
     case KRAL_STREAM_OPEN_FAILED:
       if (timed_out) break;
       return {ExitCode::kRefused, fmt::format("the handset on {} refused to open {}", where, file),
@@ -187,7 +194,8 @@ ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_
                 "the flash holds part of the image: write it again; --log FILE shows the traffic"};
       }
       return {ExitCode::kLost, fmt::format("the handset on {} fell silent while {} was written", where, file),
-              "the flash holds part of the image: check cable and power and write it again"};
+              "the flash holds part of the image: check cable and power and write it again; a programmer that never "
+              "answers long blocks needs --block-size 8186"};
     case KRAL_STREAM_NOT_COMPLETED:
       return {ExitCode::kLost, fmt::format("the end of {} was not acknowledged on {}", file, where),
               "write the image again"};

@@ -171,6 +171,15 @@ void Convert(Context& context, const HexArguments& arguments) {
       throw ToolError(ExitCode::kUsage, fmt::format("the base 0x{:X} is no multiple of 0x10000", base),
                       "give a base such as --base 0x20000");
     }
+    if (result == KRAL_STREAM_PAST_END) {
+      throw ToolError(ExitCode::kUsage,
+                      fmt::format("{} bytes from 0x{:X} on go past address 0xFFFFFFFF", image.info.size[0], base),
+                      "give a lower base");
+    }
+    if (result != KRAL_HEX_NOT_WRITTEN) {
+      throw ToolError(ExitCode::kBadFile, fmt::format("{} changed while it was read", arguments.input),
+                      "wait until it is complete");
+    }
     throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written", arguments.output),
                     "check folder, permissions and room on the disk");
   }

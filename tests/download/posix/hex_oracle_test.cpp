@@ -9,6 +9,7 @@
 
 #include "download/hex_phone_image_decoder.h"
 #include "download/phone_image_dpaged.h"
+#include "kral/download.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {
@@ -83,6 +84,21 @@ TEST_F(HexOracle, DecodesWhatTheToolsWrite) {
       EXPECT_EQ(decoded, bytes);
     }
   }
+}
+
+// Below 64 KiB objcopy writes no extended address, and the reader drops what has none in front of it.
+TEST_F(HexOracle, OrdinaryFilesFromAddressZeroAreRefused) {
+  const std::string hex = folder_.Path("out.hex");
+  ASSERT_TRUE(Runs("objcopy -I binary -O ihex " + folder_.Add("in.bin", Generate(200000)) + " " + hex));
+  KRAL_IMAGE_INFO info{};
+  uint32_t result = 77;
+  EXPECT_EQ(KRAL_IMAGE_GetInfo(hex.c_str(), KRAL_IMAGE_FORMAT_BY_CONTENT, &info, &result), 0);
+  EXPECT_EQ(result, KRAL_STREAM_DATA_LOST);
+  uint32_t line = 0;
+  uint64_t bytes = 0;
+  EXPECT_EQ(KRAL_HEX_FindLoss(hex.c_str(), &line, &bytes, nullptr), 1);
+  EXPECT_EQ(line, 1u);
+  EXPECT_EQ(bytes, 65536u);
 }
 
 TEST_F(HexOracle, TheToolsReadWhatIsEncoded) {
