@@ -5,6 +5,8 @@
 
 #include <cstdint>
 
+#include "transport/reply.h"
+
 namespace kral {
 
 class Diag_FTM;
@@ -65,14 +67,14 @@ bool PokeDoubleWords(Diag_FTM& phone, uint32_t address, uint16_t count, const ui
 
 // --- Service (core_service.cpp) -----------------------------------------------------------------------------------
 
-bool PressKey(Diag_FTM& phone, uint8_t hold, uint8_t key);
+Reply PressKey(Diag_FTM& phone, uint8_t hold, uint8_t key);
 bool GetSwitches(Diag_FTM& phone, uint16_t* switches);
-bool SetSwitches(Diag_FTM& phone, uint16_t switches);
-bool EnterDownload(Diag_FTM& phone);
+Reply SetSwitches(Diag_FTM& phone, uint16_t switches);
+Reply EnterDownload(Diag_FTM& phone);
 bool SendServiceCode(Diag_FTM& phone, const char* code, uint8_t* result);
-bool FreezeSecurity(Diag_FTM& phone);
-bool BackUpNv(Diag_FTM& phone);
-bool ClearErrorRecord(Diag_FTM& phone, uint8_t record);
+Reply FreezeSecurity(Diag_FTM& phone);
+Reply BackUpNv(Diag_FTM& phone);
+Reply ClearErrorRecord(Diag_FTM& phone, uint8_t record);
 
 // The reply as it came, its command code included. `size`: in, the room; out, what was written.
 bool ReadErrorLog(Diag_FTM& phone, uint16_t* size, uint8_t* reply);

@@ -9,12 +9,14 @@
 namespace kral::diag {
 
 inline constexpr DiagRequest<> kVersion{0};
-inline constexpr DiagRequest<u32, u16> kPeekBytes{2};  // address, count; the reply ends with the data
-inline constexpr DiagRequest<u32, u16> kPeekWords{3};
-inline constexpr DiagRequest<u32, u16> kPeekDoubleWords{4};
-inline constexpr DiagRequest<u32, u16, Bytes> kPokeBytes{5};  // address, count, data; the reply ends with a status
-inline constexpr DiagRequest<u32, u16, Words> kPokeWords{6};
-inline constexpr DiagRequest<u32, u16, DoubleWords> kPokeDoubleWords{7};
+// Address and count, which the reply repeats; behind them its data, or the status of a poke.
+inline constexpr u8 kMemoryHeader = 7;
+inline constexpr DiagRequest<u32, u16> kPeekBytes{2, kMemoryHeader};
+inline constexpr DiagRequest<u32, u16> kPeekWords{3, kMemoryHeader};
+inline constexpr DiagRequest<u32, u16> kPeekDoubleWords{4, kMemoryHeader};
+inline constexpr DiagRequest<u32, u16, Bytes> kPokeBytes{5, kMemoryHeader};
+inline constexpr DiagRequest<u32, u16, Words> kPokeWords{6, kMemoryHeader};
+inline constexpr DiagRequest<u32, u16, DoubleWords> kPokeDoubleWords{7, kMemoryHeader};
 inline constexpr DiagRequest<u8, u8> kKeyPress{32};  // hold, key
 inline constexpr DiagRequest<u16> kModeControl{41};
 inline constexpr DiagRequest<> kErrorLogRead{42};

@@ -11,6 +11,7 @@
 #include "commands/outputs.h"
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 
 namespace kral::diag {
 namespace {
@@ -77,7 +78,7 @@ bool ReadExtendedBuildId(Diag_FTM& phone, uint32_t* hardware_version, uint32_t* 
   if (!hardware || !mobile) {
     phone.log().WriteLine(kLogErr, "KRAL_DIAG_EXT_BUILD_ID_F() -- reply of %d bytes is too short",
                           static_cast<int>(response.size()));
-    return false;
+    return Fail(BadReply(phone, "is too short"));
   }
   auto texts = response.subspan(reply::kTexts);
   const std::string revision_text = TakeText(texts);
@@ -104,7 +105,7 @@ bool ReadSerialNumber(Diag_FTM& phone, uint32_t* serial) {
   if (phone.target_type() != kTargetModem) {
     phone.log().WriteLine(kLogErr, "DIAG_READ_ESN(), Unknown target type!");
     Put(serial, kNoSerialNumber);  // written although the call fails
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the target type %d is unknown", phone.target_type()));
   }
 
   std::array<uint8_t, 4> item{};
@@ -115,7 +116,7 @@ bool ReadSerialNumber(Diag_FTM& phone, uint32_t* serial) {
   }
   if (status != nv::kDone) {
     phone.log().WriteLine(kLogRet, "DIAG_READ_ESN_F() -- failed NV Read, status %d", status);
-    return false;
+    return Fail(nv::Refusal(nv::kEsnItem, status));
   }
   const uint32_t number = *LoadLe<uint32_t>(item);
   phone.log().WriteLine(kLogRet, "DIAG_READ_ESN_F() -- completed ( iESN = 0x%X)", number);

@@ -6,6 +6,7 @@
 #include "commands/outputs.h"
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 
 namespace kral::diag {
 namespace {
@@ -13,6 +14,7 @@ namespace {
 bool IsMissing(Diag_FTM& phone, const char* name, const void* data, uint16_t count) {
   if (data != nullptr || count == 0) return false;
   phone.log().WriteLine(kLogErr, "%s() -- no data buffer", name);
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the data"));
   return true;
 }
 
@@ -26,7 +28,7 @@ bool Peek(Diag_FTM& phone, const char* name, const DiagRequest<u32, u16>& row, u
   if (reply.size() <= wanted) {  // the command code is never data
     phone.log().WriteLine(kLogErr, "%s() -- reply of %d bytes holds fewer than %d of data", name,
                           static_cast<int>(reply.size()), static_cast<int>(wanted));
-    return false;
+    return Fail(BadReply(phone, "holds fewer data than were asked for"));
   }
   const auto memory = reply.last(wanted);
   for (size_t i = 0; i < count; ++i) data[i] = *LoadLe<Element>(memory, i * sizeof(Element));
@@ -40,7 +42,7 @@ bool Poke(Diag_FTM& phone, const char* name, const DiagRequest<u32, u16, std::sp
   if (IsMissing(phone, name, data, count)) return false;
   if (!Send(phone, row, address, count, std::span(data, count))) return false;
   uint8_t reported = 0;
-  if (!phone.packet().Read8(reported)) return false;
+  if (!phone.packet().Read8(reported)) return Fail(BadReply(phone, "has no status"));
   Put(status, reported);
   return true;
 }

@@ -1,7 +1,10 @@
 // Switches the handset's operating mode, waits as each mode needs, and reads the mode back.
+#include <optional>
+
 #include "commands/core_diag.h"
 #include "commands/core_diag_format.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 
 namespace kral::diag {
 namespace {
@@ -44,18 +47,28 @@ bool HasReached(uint16_t mode, uint32_t state) {
   }
 }
 
+Failure NotReached(uint16_t mode, const std::optional<uint32_t>& told, uint32_t total) {
+  if (!told) return Failure(KRAL_ERROR_NO_ANSWER, "the handset does not tell its mode within %u ms", total);
+  return Failure(KRAL_ERROR_NO_ANSWER, "the handset is not in mode %d after %u ms, but tells state %u", mode, total,
+                 *told)
+      .Status(KRAL_ERROR_STATUS_COMMAND, *told);
+}
+
 // `mode` as the caller passed it: bits above the low four are sent nowhere, but they make the read-back time out.
 bool PollMode(Diag_FTM& phone, uint16_t mode, uint32_t total) {
   const uint32_t start = phone.clock().TickMs();
+  std::optional<uint32_t> told;
   for (;;) {
     uint32_t state = 0;
-    const bool reached = GetPhoneOperatingMode(phone, state) && HasReached(mode, state);
+    const bool answered = GetPhoneOperatingMode(phone, state);
+    if (answered) told = state;
+    const bool reached = answered && HasReached(mode, state);
     const uint32_t used = phone.clock().TickMs() - start;
     if (reached || used >= total) {
       phone.log().WriteLine(
           kLogRet, "DIAG_CONTROL_F -- mode switching status polling has %s (time used = %d, total timeout = %d) ms.",
           reached ? "succeeded" : "timeout", static_cast<int>(used), static_cast<int>(total));
-      return reached;
+      return reached || Fail(NotReached(mode, told, total));
     }
     phone.clock().SleepMs(kPollIntervalMs);
   }
@@ -84,16 +97,17 @@ bool GetPhoneOperatingMode(Diag_FTM& phone, uint32_t& state) {
     phone.log().WriteLine(kLogRet,
                           "GetPhoneOperatingMode() is not supported in ZTD target. "
                           "Use 0x4B, 0x32, 0x3, 0x0 to check diag service");
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "an application processor cannot be asked for its operating mode"));
   }
-  return Send(phone, kOperatingMode) && phone.packet().ResponseAt32(operating_mode_reply::kState, state);
+  if (!Send(phone, kOperatingMode)) return false;
+  return phone.packet().ResponseAt32(operating_mode_reply::kState, state) || Fail(BadReply(phone, "has no mode"));
 }
 
 bool ControlMode(Diag_FTM& phone, uint16_t mode) {
   const uint16_t sent_mode = mode & 15;
   phone.log().WriteLine(kLogFn, "KRAL_DIAG_CONTROL_F(eMode=%d)", sent_mode);
   // Not the last word: a handset may switch without answering, so the read-back decides where there is one.
-  const bool sent = Send(phone, kModeControl, sent_mode);
+  const bool sent = static_cast<bool>(Send(phone, kModeControl, sent_mode));
 
   switch (sent_mode) {
     case kModeFactoryTest:

@@ -7,6 +7,7 @@
 #include "commands/core_diag_format.h"
 #include "commands/outputs.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 
 namespace kral::diag {
 namespace {
@@ -24,7 +25,7 @@ bool ReadReply(Diag_FTM& phone, const char* name, const Row& row, uint16_t* size
   LogEntry(phone, name);
   if (size == nullptr || reply == nullptr) {
     phone.log().WriteLine(kLogErr, "%s() -- no reply buffer", name);
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the reply"));
   }
   if (!Send(phone, row)) return false;
   const auto response = phone.packet().response();
@@ -36,7 +37,7 @@ bool ReadReply(Diag_FTM& phone, const char* name, const Row& row, uint16_t* size
 
 }  // namespace
 
-bool PressKey(Diag_FTM& phone, uint8_t hold, uint8_t key) {
+Reply PressKey(Diag_FTM& phone, uint8_t hold, uint8_t key) {
   LogEntry(phone, "KRAL_DIAG_HS_KEY_F");
   return Send(phone, kKeyPress, hold, key);
 }
@@ -47,18 +48,18 @@ bool GetSwitches(Diag_FTM& phone, uint16_t* switches) {
   uint16_t word = 0;
   if (!phone.packet().ResponseAt16(1, word)) {
     phone.log().WriteLine(kLogErr, "KRAL_DIAG_GET_DIPSW_F() -- reply without a switch word");
-    return false;
+    return Fail(BadReply(phone, "has no switch word"));
   }
   Put(switches, word);
   return true;
 }
 
-bool SetSwitches(Diag_FTM& phone, uint16_t switches) {
+Reply SetSwitches(Diag_FTM& phone, uint16_t switches) {
   LogEntry(phone, "KRAL_DIAG_SET_DIPSW_F");
   return Send(phone, kSetSwitches, switches);
 }
 
-bool EnterDownload(Diag_FTM& phone) {
+Reply EnterDownload(Diag_FTM& phone) {
   LogEntry(phone, "KRAL_DIAG_DLOAD_F");
   return Send(phone, kEnterDownload);
 }
@@ -66,7 +67,7 @@ bool EnterDownload(Diag_FTM& phone) {
 bool SendServiceCode(Diag_FTM& phone, const char* code, uint8_t* result) {
   if (code == nullptr) {
     phone.log().WriteLine(kLogErr, "KRAL_SPC() -- no service programming code");
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no service programming code"));
   }
   // The code goes to the log in clear, on purpose: a station's log must show what was tried.
   phone.log().WriteLine(kLogFn, "KRAL_SPC( iSPC[6] = %c%c%c%c%c%c)", code[0], code[1], code[2], code[3], code[4],
@@ -75,22 +76,22 @@ bool SendServiceCode(Diag_FTM& phone, const char* code, uint8_t* result) {
   std::copy_n(code, digits.size(), digits.begin());
   if (!Send(phone, kServiceCode, digits)) return false;
   uint8_t accepted = 0;
-  if (!phone.packet().Read8(accepted)) return false;
+  if (!phone.packet().Read8(accepted)) return Fail(BadReply(phone, "has no result"));
   Put(result, accepted);
   return true;
 }
 
-bool FreezeSecurity(Diag_FTM& phone) {
+Reply FreezeSecurity(Diag_FTM& phone) {
   LogEntry(phone, "KRAL_DIAG_SECURITY_FREEZE_F");
   return Send(phone, kSecurityFreeze);
 }
 
-bool BackUpNv(Diag_FTM& phone) {
+Reply BackUpNv(Diag_FTM& phone) {
   LogEntry(phone, "KRAL_DIAG_NV_CNV_DIAG_BACKUP_F");
   return SendWithin(phone, kTimeOutNvBackup, kNvBackup, kNvBackupSubsystem, u16{0});
 }
 
-bool ClearErrorRecord(Diag_FTM& phone, uint8_t record) {
+Reply ClearErrorRecord(Diag_FTM& phone, uint8_t record) {
   LogEntry(phone, "KRAL_DIAG_ERR_CLEAR_F");
   return Send(phone, kErrorLogClear, record);
 }
@@ -110,7 +111,7 @@ bool ReadIs2000Status(Diag_FTM& phone, uint16_t* size, uint8_t* reply) {
 bool RefuseGsmCallControl(Diag_FTM& phone, const char* name) {
   LogEntry(phone, name);
   phone.log().WriteLine(kLogErr, "%s() -- no request is defined for this function", name);
-  return false;
+  return Fail(Failure(KRAL_ERROR_ARGUMENT, "no request is defined for %s", name));
 }
 
 }  // namespace kral::diag

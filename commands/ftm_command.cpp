@@ -2,6 +2,8 @@
 #include "commands/ftm_command.h"
 
 #include <algorithm>
+#include <array>
+#include <cstdio>
 #include <cstring>
 
 #include "frame/export_call.h"
@@ -38,7 +40,7 @@ void HandBack(Diag_FTM& phone, const Exchange& exchange) {
 bool SendCommand(Diag_FTM& phone, uint16_t mode_id, HeaderForm form, uint16_t command, const Exchange& exchange) {
   if (!IsComplete(exchange)) {
     phone.log().WriteLine(kLogErr, "FTM command %d is not sent: its payload or its response room is missing", command);
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the payload or the room for the response is missing"));
   }
   BeginCommand(phone, mode_id, form, command);
   AppendPayload(phone, exchange);
@@ -48,13 +50,15 @@ bool SendCommand(Diag_FTM& phone, uint16_t mode_id, HeaderForm form, uint16_t co
 }
 
 uint8_t ExportedCommand(KRAL_HANDLE handle, const Command& command, const uint8_t* payload, uint16_t payload_size,
-                        uint8_t* response, uint16_t* response_size) noexcept {
-  LogFormatted(handle, "KRAL_FTM_%s( payload_size = %d, response_size = %d )", command.name.data(), payload_size,
-               response_size != nullptr ? *response_size : 0);
+                        uint8_t* response, uint16_t* response_size) {
+  std::array<char, 64> function;
+  std::snprintf(function.data(), function.size(), "KRAL_FTM_%s", command.name.data());
   const Exchange exchange{payload, payload_size, response, response_size};
-  return OnPhone(handle, [&](Diag_FTM& phone) {
-    return SendCommand(phone, static_cast<u16>(phone.ftm().mode_id), HeaderForm::kPlain, command.id, exchange);
-  });
+  return ExportCall(handle, function.data())
+      .Logged("( payload_size = %d, response_size = %d )", payload_size, response_size != nullptr ? *response_size : 0)
+      .Run([&](Diag_FTM& phone) {
+        return SendCommand(phone, static_cast<u16>(phone.ftm().mode_id), HeaderForm::kPlain, command.id, exchange);
+      });
 }
 
 }  // namespace kral::ftm

@@ -23,7 +23,7 @@ bool SendCommand(Diag_FTM& phone, uint16_t mode_id, HeaderForm form, uint16_t co
 
 // The whole of an exported table command: log line, handle, command.
 uint8_t ExportedCommand(KRAL_HANDLE handle, const Command& command, const uint8_t* payload, uint16_t payload_size,
-                        uint8_t* response, uint16_t* response_size) noexcept;
+                        uint8_t* response, uint16_t* response_size);
 
 }  // namespace kral::ftm
 

@@ -7,6 +7,7 @@
 #include "commands/ftm_mode.h"
 #include "commands/ftm_sequencer.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 
 namespace kral::ftm {
 namespace {
@@ -14,8 +15,8 @@ namespace {
 constexpr u16 kLegacySelector = 0x0077;
 constexpr size_t kLegacyLengthOffset = 3;
 constexpr u16 kLegacyLengthBase = 5;  // the length byte counts what stands behind offset 4
-constexpr size_t kEchoedBytes = 3;    // a reply under code 59 repeats the code and the selector
-constexpr u16 kResponseRoom = 4096;
+constexpr size_t kLegacyEcho = 3;     // a reply under code 59 repeats the code and the selector
+constexpr size_t kEcho = 6;           // ... under code 75 subsystem, mode id and command id as well
 
 constexpr u32 kLayerSent = 0;
 constexpr u32 kLayerFailed = 1;
@@ -51,19 +52,22 @@ u16 LengthIn(std::span<const DataLength> table, u16 command) {
   return row != table.end() && row->command == command ? row->length : u16{0};
 }
 
-bool TransmitLegacy(Diag_FTM& phone) {
+Reply TransmitLegacy(Diag_FTM& phone) {
   CDiagPacket& packet = phone.packet();
   // One byte wide: a request of more than 260 bytes goes out with its length modulo 256.
   packet.request_area()[kLegacyLengthOffset] = static_cast<u8>(packet.request_length() - kLegacyLengthBase);
-  if (!phone.Send(packet)) return false;
+  const Reply reply = phone.Send(packet);
+  if (!reply) return reply;
   const auto request = packet.request();
   const auto response = packet.response();
-  if (response.size() < kEchoedBytes || !std::equal(request.begin(), request.begin() + kEchoedBytes, response.begin()))
-    return false;
+  if (response.size() < kLegacyEcho || !std::equal(request.begin(), request.begin() + kLegacyEcho, response.begin())) {
+    Fail(BadReply(phone, "does not repeat code and selector"));
+    return {ReplyKind::kOther, reply.code(), reply.bytes()};
+  }
   // Handsets pad this reply behind what the request's layout tells: the tail readers go on at the request's length.
   u8 surplus = 0;
   for (size_t size = response.size(); size > request.size(); --size) packet.Read8(surplus);
-  return true;
+  return reply;
 }
 
 // The sequencer's queue takes the request instead of the port.
@@ -80,20 +84,18 @@ bool Enqueue(Diag_FTM& phone, FtmSequencer& sequencer) {
   }
   if (!added) {
     phone.log().WriteLine(kLogErr, "Failed to add command to queue");
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the sequencer's queue did not take the request"));
   }
   phone.ftm().sequence_id = sequence_id;
   phone.log().WriteLine(kLogRet, "Assigned Sequence ID=%d", sequence_id);
   return true;
 }
 
-u32 SendAtOnce(Diag_FTM& phone) {
-  CDiagPacket& packet = phone.packet();
-  u16 size = kResponseRoom;
-  const bool answered = phone.SendSync(packet.request(), packet.response_area().data(), size, packet.request()[0],
-                                       phone.TimeOut(kTimeOutDefaultCommand));
-  packet.set_response_length(answered ? size : u16{0});
-  return answered ? kLayerSent : kLayerFailed;
+u32 SendAtOnce(Diag_FTM& phone, Reply& reply) {
+  reply = SendEchoed(phone, phone.TimeOut(kTimeOutDefaultCommand), kEcho, kEcho);
+  if (reply) return kLayerSent;
+  phone.packet().set_response_length(0);
+  return kLayerFailed;
 }
 
 bool IsSequencerCommand(std::span<const u8> request) {
@@ -101,16 +103,19 @@ bool IsSequencerCommand(std::span<const u8> request) {
          request[2] == kModeIdSequencer;
 }
 
-u32 ProcessClientRequestPacket(Diag_FTM& phone) {
+u32 ProcessClientRequestPacket(Diag_FTM& phone, Reply& reply) {
   const auto request = phone.packet().request();
   phone.log().WriteLine(kLogFn, "FTM_Sequencer_ProcessClientRequestPacket( iRequestPacketSize = %d )",
                         static_cast<int>(request.size()));
   FtmSequencer* sequencer = phone.ftm().sequencer;
-  if (sequencer == nullptr) return SendAtOnce(phone);
+  if (sequencer == nullptr) return SendAtOnce(phone, reply);
   if (IsSequencerCommand(request)) return sequencer->Process(phone, request);
   if (sequencer->active()) sequencer->Observe(request);
-  if (sequencer->holds_back()) return kLayerHeldBack;
-  return SendAtOnce(phone);
+  if (sequencer->holds_back()) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "the request is held back by the sequencer"));
+    return kLayerHeldBack;
+  }
+  return SendAtOnce(phone, reply);
 }
 
 }  // namespace
@@ -157,18 +162,22 @@ u16 RequestDataLength(u16 mode_id, u16 command) {
   }
 }
 
-bool Transmit(Diag_FTM& phone) {
+Reply Transmit(Diag_FTM& phone) {
   if (phone.ftm().command_code == kCommandCode59) return TransmitLegacy(phone);
   phone.packet().set_response_length(0);  // a request that the sequencer keeps has none
-  if (phone.ftm().queue_mode != 0 && phone.ftm().sequencer != nullptr) return Enqueue(phone, *phone.ftm().sequencer);
-  return ProcessClientRequestPacket(phone) == kLayerSent;
+  if (phone.ftm().queue_mode != 0 && phone.ftm().sequencer != nullptr) {
+    return Enqueue(phone, *phone.ftm().sequencer) ? ReplyKind::kExpected : ReplyKind::kNotSent;
+  }
+  Reply reply = ReplyKind::kNotSent;
+  if (ProcessClientRequestPacket(phone, reply) == kLayerSent) return reply ? reply : ReplyKind::kExpected;
+  return reply;
 }
 
 void FtmHeader::Begin(Diag_FTM& phone) const {
   BeginCommand(phone, static_cast<u16>(phone.ftm().mode_id), HeaderForm::kPlain, command);
 }
 
-bool FtmHeader::Transmit(Diag_FTM& phone) const {
+Reply FtmHeader::Transmit(Diag_FTM& phone, u32) const {
   return ftm::Transmit(phone);
 }
 

@@ -40,8 +40,9 @@ void BeginCommand(Diag_FTM& phone, u16 mode_id, HeaderForm form, u16 command);
 // The request data length that the dispatcher of a mode id expects in the extended header; 0 where none is known.
 u16 RequestDataLength(u16 mode_id, u16 command);
 
-// Sends what the default packet buffer holds; under code 75 by way of the queue or the sequencer when they are on.
-bool Transmit(Diag_FTM& phone);
+// Sends what the default packet buffer holds; under code 75 by way of the queue or the sequencer when they are on. A
+// request that the queue took counts as answered, with nothing.
+Reply Transmit(Diag_FTM& phone);
 
 // Rows of commands with arguments of their own: FtmRequest<u16> kSetChannel{8}. Current mode id, plain header.
 struct FtmHeader {
@@ -49,7 +50,7 @@ struct FtmHeader {
 
   constexpr u32 key() const { return command; }
   void Begin(Diag_FTM& phone) const;
-  bool Transmit(Diag_FTM& phone) const;
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const;
 };
 
 template <class... Fields>

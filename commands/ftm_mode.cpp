@@ -37,8 +37,9 @@ void WaitAfterGsmMode(Diag_FTM& phone) {
 bool QueryOperatingMode(Diag_FTM& phone, u32& state) {
   if (phone.target_type() != kTargetApplication) return diag::GetPhoneOperatingMode(phone, state);
   diag::GetPhoneOperatingMode(phone, state);  // only says in the log that there is no such query
-  state = phone.IsDiagServiceAlive() ? kServiceAlive : kServiceSilent;
-  return true;
+  const bool alive = phone.IsDiagServiceAlive();
+  state = alive ? kServiceAlive : kServiceSilent;
+  return alive;  // of a silent service nobody knows the mode
 }
 
 bool ReadBootFlag(Diag_FTM& phone, bool& is_ftm) {
@@ -47,7 +48,7 @@ bool ReadBootFlag(Diag_FTM& phone, bool& is_ftm) {
   if (!nv::Read(phone, kBootFlagItem, data, status)) return false;
   if (status != nv::kDone) {
     phone.log().WriteLine(kLogErr, "KRAL_IsFTM_Mode() - Failed to read NV FTM mode");
-    return false;
+    return Fail(nv::Refusal(kBootFlagItem, status));
   }
   is_ftm = data[0] != 0;
   return true;
@@ -67,7 +68,9 @@ bool GetModeId(Diag_FTM& phone, uint16_t* mode_id) {
 }
 
 bool SetCommandCode(Diag_FTM& phone, uint16_t code) {
-  if (code != kCommandCode59 && code != kCommandCode75) return false;
+  if (code != kCommandCode59 && code != kCommandCode75) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the command code %d is neither 59 nor 75", code));
+  }
   phone.ftm().command_code = code;
   return true;
 }
@@ -81,23 +84,26 @@ bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
   phone.packet().Reset();
   phone.ftm().last_rf_mode = rf_mode;  // also when the mode is refused below
   const auto mode_id = ModeIdForRfMode(rf_mode, phone.ftm().mode_id);
-  if (!mode_id) return false;
+  if (!mode_id) {
+    phone.log().WriteLine(kLogErr, "KRAL_FTM_SET_MODE() -- RF mode %d has no mode id", rf_mode);
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the RF mode %d is not one of the listed modes", rf_mode));
+  }
   phone.ftm().mode_id = *mode_id;
-  const bool sent = Send(phone, kSetMode, rf_mode);
+  const bool sent = static_cast<bool>(Send(phone, kSetMode, rf_mode));
   if (IsGsmMode(rf_mode)) WaitAfterGsmMode(phone);
   return sent;
 }
 
-bool SetChannel(Diag_FTM& phone, uint16_t channel) {
+Reply SetChannel(Diag_FTM& phone, uint16_t channel) {
   return Send(phone, kSetChannel, channel);
 }
 
-bool SetTxOn(Diag_FTM& phone) {
+Reply SetTxOn(Diag_FTM& phone) {
   phone.log().WriteLine(kLogFn, "KRAL_FTM_SET_TX_ON()");
   return Send(phone, kSetTxOn);
 }
 
-bool SetTxOff(Diag_FTM& phone) {
+Reply SetTxOff(Diag_FTM& phone) {
   phone.log().WriteLine(kLogFn, "KRAL_FTM_SET_TX_OFF()");
   return Send(phone, kSetTxOff);
 }
@@ -116,7 +122,7 @@ bool QueryFtm(Diag_FTM& phone, bool& is_ftm) {
       return ReadBootFlag(phone, is_ftm);
     default:
       phone.log().WriteLine(kLogErr, "KRAL_IsFTM_Mode() - Invalid Command Mode");
-      return false;
+      return Fail(Failure(KRAL_ERROR_ARGUMENT, "the command code %u is neither 59 nor 75", phone.ftm().command_code));
   }
 }
 
@@ -134,7 +140,7 @@ bool ChangeBootMode(Diag_FTM& phone, uint8_t ftm, uint8_t reset) {
   const bool written = nv::Write(phone, kBootFlagItem, flag, status);
   if (written && status != nv::kDone) {
     phone.log().WriteLine(kLogErr, "KRAL_ChangeFTM_BootMode() - Failed to write NV FTM mode");
-    return false;
+    return Fail(nv::Refusal(kBootFlagItem, status));
   }
   if (reset != 0) diag::ControlMode(phone, diag::kModeReset);  // a handset that resets need not answer
   return written;
@@ -143,7 +149,7 @@ bool ChangeBootMode(Diag_FTM& phone, uint8_t ftm, uint8_t reset) {
 bool ChangeModeRuntime(Diag_FTM& phone, uint8_t ftm) {
   if (phone.ftm().command_code != kCommandCode75) {
     phone.log().WriteLine(kLogErr, "KRAL_ChangeFTM_ModeRuntime: Failed: Does not support non FTM_COMMAND_75 mode");
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the mode can be changed with command code 75 only"));
   }
   bool is_ftm = false;
   if (!QueryFtm(phone, is_ftm)) return false;

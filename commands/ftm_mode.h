@@ -6,6 +6,8 @@
 #include <cstdint>
 #include <optional>
 
+#include "transport/reply.h"
+
 namespace kral {
 
 class Diag_FTM;
@@ -38,9 +40,9 @@ bool SetCommandCode(Diag_FTM& phone, uint16_t code);
 bool GetCommandCode(Diag_FTM& phone, uint16_t* code);
 
 bool SetMode(Diag_FTM& phone, uint16_t rf_mode);
-bool SetChannel(Diag_FTM& phone, uint16_t channel);
-bool SetTxOn(Diag_FTM& phone);
-bool SetTxOff(Diag_FTM& phone);
+Reply SetChannel(Diag_FTM& phone, uint16_t channel);
+Reply SetTxOn(Diag_FTM& phone);
+Reply SetTxOff(Diag_FTM& phone);
 
 // Asks whether the handset is in factory test mode. False when it cannot be told.
 bool QueryFtm(Diag_FTM& phone, bool& is_ftm);

@@ -12,14 +12,16 @@
 namespace {
 
 using kral::Diag_FTM;
-using kral::LogFormatted;
-using kral::LogName;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
+using kral::Fail;
+using kral::Failure;
 using kral::Put;
 using std::chrono::milliseconds;
 
 static_assert(sizeof(KRAL_EVENT) == kral::EventRecord::kSize);
 static_assert(KRAL_LONGEST_PACKET == kral::kMaximumPacket);
+
+constexpr const char* kNoFileName = "there is no file name";
 
 bool SetCollection(Diag_FTM& phone, bool on) {
   phone.sorter().SetCollection(on);
@@ -27,18 +29,22 @@ bool SetCollection(Diag_FTM& phone, bool on) {
 }
 
 bool TakeLog(Diag_FTM& phone, uint16_t* size, uint8_t* buffer, uint32_t time_out_ms) {
-  if (size == nullptr || buffer == nullptr) return false;
+  if (size == nullptr || buffer == nullptr)
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the packet"));
   const auto packet = phone.asynchronous().PopWithin(milliseconds(time_out_ms));
-  if (!packet || packet->size() > kral::kMaximumPacket) return false;
+  if (!packet || packet->size() > kral::kMaximumPacket) {
+    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "no packet is waiting, and none came within %u ms", time_out_ms));
+  }
   std::copy(packet->begin(), packet->end(), buffer);
   *size = static_cast<uint16_t>(packet->size());
   return true;
 }
 
 bool TakeEvent(Diag_FTM& phone, const char* function, KRAL_EVENT* event, uint32_t time_out_ms) {
-  if (event == nullptr) return false;
+  if (event == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no room for the event"));
   const auto record = phone.events().PopWithin(milliseconds(time_out_ms));
-  if (!record) return false;
+  if (!record)
+    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "no event is waiting, and none came within %u ms", time_out_ms));
   std::memcpy(event, record->bytes.data(), sizeof(*event));
   phone.log().WriteLine(kral::kLogRet, "%s() : event %d removed from queue", function,
                         event->event_id[0] | event->event_id[1] << 8);
@@ -48,7 +54,7 @@ bool TakeEvent(Diag_FTM& phone, const char* function, KRAL_EVENT* event, uint32_
 bool CountLogs(Diag_FTM& phone, uint32_t* count) {
   const auto waiting = static_cast<uint32_t>(phone.asynchronous().size());
   Put(count, waiting);  // 0 is told as well as given back
-  return waiting != 0;
+  return waiting != 0 || Fail(Failure(KRAL_ERROR_NO_ANSWER, "no packet is waiting"));
 }
 
 template <class Queue>
@@ -58,7 +64,7 @@ bool Empty(Queue& queue) {
 }
 
 bool ReadCounters(Diag_FTM& phone, KRAL_TRAFFIC_COUNTERS* counters) {
-  if (counters == nullptr) return false;
+  if (counters == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no room for the counters"));
   const kral::TrafficCounters c = phone.counters();
   *counters = {c.bytes_received,
                c.packets_received,
@@ -88,7 +94,8 @@ bool StartCapture(Diag_FTM& phone, const char* file_name) {
 }
 
 bool StartPlayback(Diag_FTM& phone, const char* file_name, uint32_t pace) {
-  return pace < kral::kPlayPaceCount && phone.StartPlayback(file_name, static_cast<kral::PlayPace>(pace));
+  if (pace >= kral::kPlayPaceCount) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the pace %u is not a listed one", pace));
+  return phone.StartPlayback(file_name, static_cast<kral::PlayPace>(pace));
 }
 
 bool SetPlaybackCallback(Diag_FTM& phone, KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
@@ -109,91 +116,81 @@ bool ReadPlaybackState(Diag_FTM& phone, int32_t* state, uint64_t* packets, uint6
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_DIAG_SetPhoneLoggingState(KRAL_HANDLE handle, uint8_t enable) {
-  LogFormatted(handle, "KRAL_DIAG_SetPhoneLoggingState(bEnableLogging=%d)", enable);
-  return OnPhoneAtOnce(handle, SetCollection, enable == 1);
+  return ExportCall(handle, __func__).Logged("(bEnableLogging=%d)", enable).RunAtOnce(SetCollection, enable == 1);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer) {
-  LogName(handle, "KRAL_DIAG_GetNextPhoneLog");
-  return OnPhoneAtOnce(handle, TakeLog, size, buffer, 0U);
+  return ExportCall(handle, __func__).RunAtOnce(TakeLog, size, buffer, 0U);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_WaitNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer,
                                              uint32_t time_out_ms) {
-  LogFormatted(handle, "KRAL_DIAG_WaitNextPhoneLog( iTimeOut_ms = %u )", time_out_ms);
-  return OnPhoneAtOnce(handle, TakeLog, size, buffer, time_out_ms);
+  return ExportCall(handle, __func__)
+      .Logged("( iTimeOut_ms = %u )", time_out_ms)
+      .RunAtOnce(TakeLog, size, buffer, time_out_ms);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearPhoneLogQueue(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_DIAG_ClearPhoneLogQueue");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return Empty(phone.asynchronous()); });
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) { return Empty(phone.asynchronous()); });
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetPhoneLogQueueSize(KRAL_HANDLE handle, uint32_t* count) {
-  LogName(handle, "KRAL_DIAG_GetPhoneLogQueueSize");
-  return OnPhoneAtOnce(handle, CountLogs, count);
+  return ExportCall(handle, __func__).RunAtOnce(CountLogs, count);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event) {
-  LogName(handle, "KRAL_DIAG_GetNextEvent");
-  return OnPhoneAtOnce(handle, TakeEvent, "KRAL_DIAG_GetNextEvent", event, 0U);
+  return ExportCall(handle, __func__).RunAtOnce(TakeEvent, __func__, event, 0U);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_WaitNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event, uint32_t time_out_ms) {
-  LogFormatted(handle, "KRAL_DIAG_WaitNextEvent( iTimeOut_ms = %u )", time_out_ms);
-  return OnPhoneAtOnce(handle, TakeEvent, "KRAL_DIAG_WaitNextEvent", event, time_out_ms);
+  return ExportCall(handle, __func__)
+      .Logged("( iTimeOut_ms = %u )", time_out_ms)
+      .RunAtOnce(TakeEvent, __func__, event, time_out_ms);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearEventQueue(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_DIAG_ClearEventQueue");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return Empty(phone.events()); });
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) { return Empty(phone.events()); });
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearCommandResponseQueue(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_DIAG_ClearCommandResponseQueue");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return Empty(phone.responses()); });
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) { return Empty(phone.responses()); });
 }
 
 uint8_t KRAL_CALL KRAL_ConfigureCollectionCallBacks(KRAL_HANDLE handle, KRAL_RAW_PACKET_CALLBACK packet,
                                                     KRAL_EVENT_CALLBACK event, uintptr_t value) {
-  LogName(handle, "KRAL_ConfigureCollectionCallBacks");
-  return OnPhoneAtOnce(handle, SetCollectionCallbacks, kral::CollectionCallbacks{packet, event, value});
+  return ExportCall(handle, __func__)
+      .RunAtOnce(SetCollectionCallbacks, kral::CollectionCallbacks{packet, event, value});
 }
 
 uint8_t KRAL_CALL KRAL_GetTrafficCounters(KRAL_HANDLE handle, KRAL_TRAFFIC_COUNTERS* counters) {
-  LogName(handle, "KRAL_GetTrafficCounters");
-  return OnPhoneAtOnce(handle, ReadCounters, counters);
+  return ExportCall(handle, __func__).RunAtOnce(ReadCounters, counters);
 }
 
 uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name) {
-  LogName(handle, "KRAL_StartCapture");
-  return file_name == nullptr ? 0 : OnPhoneAtOnce(handle, StartCapture, file_name);
+  return ExportCall(handle, __func__).Require(file_name != nullptr, kNoFileName).RunAtOnce(StartCapture, file_name);
 }
 
 uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_StopCapture");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return phone.StopCapture(); });
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) { return phone.StopCapture(); });
 }
 
 uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace) {
-  LogFormatted(handle, "KRAL_StartPlayback( iPace = %u )", pace);
-  return file_name == nullptr ? 0 : OnPhoneAtOnce(handle, StartPlayback, file_name, pace);
+  return ExportCall(handle, __func__)
+      .Logged("( iPace = %u )", pace)
+      .Require(file_name != nullptr, kNoFileName)
+      .RunAtOnce(StartPlayback, file_name, pace);
 }
 
-uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback,
-                                                 uintptr_t value) {
-  LogName(handle, "KRAL_ConfigurePlaybackCallBack");
-  return OnPhoneAtOnce(handle, SetPlaybackCallback, callback, value);
+uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
+  return ExportCall(handle, __func__).RunAtOnce(SetPlaybackCallback, callback, value);
 }
 
 uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_StopPlayback");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return phone.player().Stop(); });
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) { return phone.player().Stop(); });
 }
 
 uint8_t KRAL_CALL KRAL_GetPlaybackState(KRAL_HANDLE handle, int32_t* state, uint64_t* packets, uint64_t* skipped) {
-  LogName(handle, "KRAL_GetPlaybackState");
-  return OnPhoneAtOnce(handle, ReadPlaybackState, state, packets, skipped);
+  return ExportCall(handle, __func__).RunAtOnce(ReadPlaybackState, state, packets, skipped);
 }
 
 }  // extern "C"

@@ -12,14 +12,14 @@ namespace kral::diag {
 namespace {
 
 template <class Row, class... Fields>
-bool Configure(Diag_FTM& phone, const Row& row, uint32_t first_word, size_t data_size, const Fields&... fields) {
+Reply Configure(Diag_FTM& phone, const Row& row, uint32_t first_word, size_t data_size, const Fields&... fields) {
   phone.log().WriteLine(
       kLogFn, "KRAL_DIAG_SetExtendedLogMask( iOperation = 0x%X, piOperationData[0] = 0x%X, iOperationDataSize=%d)",
       row.header.operation, first_word, static_cast<int>(data_size));
   return Send(phone, row, fields...);
 }
 
-bool SetLogMask(Diag_FTM& phone, uint8_t equipment_id, const BitMask& mask) {
+Reply SetLogMask(Diag_FTM& phone, uint8_t equipment_id, const BitMask& mask) {
   return Configure(phone, kSetLogMask, equipment_id, log_config_reply::kMaskHeader + mask.bytes().size(),
                    u32{equipment_id}, static_cast<u32>(mask.bits()), mask.bytes());
 }
@@ -157,7 +157,7 @@ bool ClearAllLogCodes(Diag_FTM& phone, uint8_t equipment_id) {
   const auto items = GetItems(phone, equipment_id);
   // Only told, with another function's name: the handset is then sent a mask without bits. Kept.
   if (!items) phone.log().WriteLine(kLogErr, "KRAL_DIAG_AddExtendedLogCodes() -- failed to get log range");
-  return SetLogMask(phone, equipment_id, BitMask(items.value_or(0)));
+  return static_cast<bool>(SetLogMask(phone, equipment_id, BitMask(items.value_or(0))));
 }
 
 }  // namespace kral::diag

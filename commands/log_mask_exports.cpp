@@ -12,12 +12,9 @@
 namespace {
 
 using kral::Diag_FTM;
-using kral::LogFormatted;
-using kral::LogName;
+using kral::ExportCall;
 using kral::NameTable;
 using kral::NameTableKind;
-using kral::OnPhone;
-using kral::OnPhoneAtOnce;
 using kral::Put;
 namespace diag = kral::diag;
 
@@ -106,6 +103,8 @@ bool EnableCategory(Diag_FTM& phone, uint16_t category, bool on) {
   return false;
 }
 
+constexpr const char* kNoList = "there is no list";
+
 bool IsList(const uint16_t* ids, uint16_t count) {
   return ids != nullptr || count == 0;
 }
@@ -116,108 +115,110 @@ extern "C" {
 
 uint8_t KRAL_CALL KRAL_DIAG_SetExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code,
                                                uint16_t last_item) {
-  LogFormatted(handle, "KRAL_DIAG_SetExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X, iLastItem = %d )",
-               equipment_id, log_code, last_item);
-  return OnPhone(handle, diag::SetOnlyLogCode, equipment_id, log_code, last_item);
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d, iLogCode = 0x%X, iLastItem = %d )", equipment_id, log_code, last_item)
+      .Run(diag::SetOnlyLogCode, equipment_id, log_code, last_item);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code) {
-  LogFormatted(handle, "KRAL_DIAG_AddExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code);
-  return OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), true);
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code)
+      .Run(diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), true);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id, const uint16_t* log_codes,
                                                 uint16_t count) {
-  LogFormatted(handle, "KRAL_DIAG_AddExtendedLogCodes( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id,
-               count);
-  return IsList(log_codes, count)
-             ? OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), true)
-             : 0;
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id, count)
+      .Require(IsList(log_codes, count), kNoList)
+      .Run(diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), true);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code) {
-  LogFormatted(handle, "KRAL_DIAG_ClearExtendedLogCode( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code);
-  return OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), false);
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d, iLogCode = 0x%X )", equipment_id, log_code)
+      .Run(diag::ModifyLogCodes, equipment_id, diag::Ids(&log_code, 1), false);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCodes(KRAL_HANDLE handle, uint8_t equipment_id, const uint16_t* log_codes,
                                                   uint16_t count) {
-  LogFormatted(handle, "KRAL_DIAG_ClearExtendedLogCodes( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id,
-               count);
-  return IsList(log_codes, count)
-             ? OnPhone(handle, diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), false)
-             : 0;
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d, iLogCodeListSize = %d )", equipment_id, count)
+      .Require(IsList(log_codes, count), kNoList)
+      .Run(diag::ModifyLogCodes, equipment_id, diag::Ids(log_codes, count), false);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_ClearAllLogCodes(KRAL_HANDLE handle, uint8_t equipment_id) {
-  LogFormatted(handle, "KRAL_DIAG_ClearAllLogCodes( iEquipmentID = %d )", equipment_id);
-  return OnPhone(handle, diag::ClearAllLogCodes, equipment_id);
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d )", equipment_id)
+      .Run(diag::ClearAllLogCodes, equipment_id);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetLogRanges(KRAL_HANDLE handle, uint32_t* last_items) {
-  LogName(handle, "KRAL_DIAG_GetLogRanges");
-  return last_items == nullptr ? 0 : OnPhone(handle, ReadRanges, last_items);
+  return ExportCall(handle, __func__)
+      .Require(last_items != nullptr, "there is no room for the ranges")
+      .Run(ReadRanges, last_items);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetLogMask(KRAL_HANDLE handle, uint8_t equipment_id, uint32_t* bits, uint16_t* size,
                                        uint8_t* mask) {
-  LogFormatted(handle, "KRAL_DIAG_GetLogMask( iEquipmentID = %d )", equipment_id);
-  return OnPhone(handle, ReadLogMask, equipment_id, bits, size, mask);
+  return ExportCall(handle, __func__)
+      .Logged("( iEquipmentID = %d )", equipment_id)
+      .Run(ReadLogMask, equipment_id, bits, size, mask);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBit(KRAL_HANDLE handle, uint16_t event_id, uint8_t state) {
-  LogFormatted(handle, "KRAL_DIAG_SetEventMaskBit( iMaskID = %d, bMaskState = %d )", event_id, state);
-  return OnPhone(handle, diag::ControlEventReports, diag::Ids(&event_id, 1), state == 1, diag::EventChange::kListed);
+  return ExportCall(handle, __func__)
+      .Logged("( iMaskID = %d, bMaskState = %d )", event_id, state)
+      .Run(diag::ControlEventReports, diag::Ids(&event_id, 1), state == 1, diag::EventChange::kListed);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBits(KRAL_HANDLE handle, const uint16_t* event_ids, uint16_t count,
                                              uint8_t state) {
-  LogFormatted(handle, "KRAL_DIAG_SetEventMaskBits( iMaskID_ListSize = %d, bMaskState = %d )", count, state);
-  return IsList(event_ids, count) ? OnPhone(handle, diag::ControlEventReports, diag::Ids(event_ids, count), state == 1,
-                                            diag::EventChange::kListed)
-                                  : 0;
+  return ExportCall(handle, __func__)
+      .Logged("( iMaskID_ListSize = %d, bMaskState = %d )", count, state)
+      .Require(IsList(event_ids, count), kNoList)
+      .Run(diag::ControlEventReports, diag::Ids(event_ids, count), state == 1, diag::EventChange::kListed);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_SetEntireEventMaskState(KRAL_HANDLE handle, uint8_t state) {
-  LogFormatted(handle, "KRAL_DIAG_SetEntireEventMaskState( bMaskState = %d )", state);
-  return OnPhone(handle, diag::ControlEventReports, diag::Ids(), state == 1,
-                 state == 1 ? diag::EventChange::kAllOn : diag::EventChange::kAllOff);
+  return ExportCall(handle, __func__)
+      .Logged("( bMaskState = %d )", state)
+      .Run(diag::ControlEventReports, diag::Ids(), state == 1,
+           state == 1 ? diag::EventChange::kAllOn : diag::EventChange::kAllOff);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_GetEventMask(KRAL_HANDLE handle, uint16_t* bits, uint16_t* size, uint8_t* mask) {
-  LogName(handle, "KRAL_DIAG_GetEventMask");
-  return OnPhone(handle, ReadEventMask, bits, size, mask);
+  return ExportCall(handle, __func__).Run(ReadEventMask, bits, size, mask);
 }
 
 uint8_t KRAL_CALL KRAL_LoadNameTable(KRAL_HANDLE handle, uint32_t table, const char* file_name) {
-  LogFormatted(handle, "KRAL_LoadNameTable( iTable = %u )", table);
-  return OnPhoneAtOnce(handle, LoadTable, table, file_name);
+  return ExportCall(handle, __func__).Logged("( iTable = %u )", table).RunAtOnce(LoadTable, table, file_name);
 }
 
 uint8_t KRAL_CALL KRAL_GetEventText(KRAL_HANDLE handle, uint16_t event_id, uint16_t size, char* text) {
-  LogName(handle, "KRAL_GetEventText");
-  return OnPhoneAtOnce(handle, ReadName, NameTableKind::kEventTexts, event_id, size, text);
+  return ExportCall(handle, __func__).RunAtOnce(ReadName, NameTableKind::kEventTexts, event_id, size, text);
 }
 
 uint8_t KRAL_CALL KRAL_GetLogCodeText(KRAL_HANDLE handle, uint16_t log_code, uint16_t size, char* text) {
-  LogName(handle, "KRAL_GetLogCodeText");
-  return OnPhoneAtOnce(handle, ReadName, NameTableKind::kLogNames, log_code, size, text);
+  return ExportCall(handle, __func__).RunAtOnce(ReadName, NameTableKind::kLogNames, log_code, size, text);
 }
 
 uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListSize(KRAL_HANDLE handle, uint32_t* count) {
-  LogName(handle, "KRAL_ExtendedTextMessage_GetCategoryListSize");
-  return OnPhoneAtOnce(handle, CountCategories, count);
+  return ExportCall(handle, __func__).RunAtOnce(CountCategories, count);
 }
 
 uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListItem(KRAL_HANDLE handle, uint32_t index, uint16_t* category,
                                                                uint16_t size, char* name) {
-  LogFormatted(handle, "KRAL_ExtendedTextMessage_GetCategoryListItem( iIndex = %u )", index);
-  return OnPhoneAtOnce(handle, ReadCategory, index, category, size, name);
+  return ExportCall(handle, __func__)
+      .Logged("( iIndex = %u )", index)
+      .RunAtOnce(ReadCategory, index, category, size, name);
 }
 
 uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDLE handle, uint16_t category, uint8_t enable) {
-  LogFormatted(handle, "KRAL_ExtendedTextMessage_SetCategoryEnable( iCategory = %d, bEnable = %d )", category, enable);
-  return OnPhone(handle, EnableCategory, category, enable == 1);
+  return ExportCall(handle, __func__)
+      .Logged("( iCategory = %d, bEnable = %d )", category, enable)
+      .Run(EnableCategory, category, enable == 1);
 }
 
 }  // extern "C"

@@ -18,7 +18,9 @@ struct LogConfigHeader {
     phone.packet().Append32(115);
     phone.packet().Append32(operation);
   }
-  bool Transmit(Diag_FTM& phone) const { return phone.Send(phone.packet()); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, kEchoed, kEchoed); }
+
+  static constexpr std::size_t kEchoed = 8;
 };
 
 template <class... Fields>

@@ -7,6 +7,7 @@
 
 #include "commands/nv_format.h"
 #include "frame/base/little_endian.h"
+#include "frame/request_failure.h"
 
 namespace kral::nv {
 namespace {
@@ -56,14 +57,14 @@ bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchOb
   const auto total_status = LoadLe<u16>(reply, batch::kTotalStatus);
   if (!count || !total_status) {
     phone.log().WriteLine(kLogErr, "NV batch reply of %d bytes is too short", static_cast<int>(reply.size()));
-    return false;
+    return Fail(BadReply(phone, "is too short"));
   }
   outcome.total_status = *total_status;
   auto rest = reply.subspan(batch::kResults);
   for (u16 i = 0; i < *count; ++i) {
     if (rest.size() < batch::kItemHeader || rest.size() - batch::kItemHeader < rest[0]) {
       phone.log().WriteLine(kLogErr, "NV batch reply ends within item result %d of %d", i + 1, *count);
-      return false;
+      return Fail(BadReply(phone, "ends within an item result"));
     }
     outcome.last_item = *LoadLe<u16>(rest, batch::kResultItem);
     outcome.last_item_status = Judged(phone, outcome.last_item, rest[batch::kResultStatus]);
@@ -71,14 +72,14 @@ bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchOb
     if (outcome.last_item_status != kDone) {
       phone.log().WriteLine(kLogErr, "     Error Detected: iLastErrorNvId = %d, iLastItemStatus = %d )",
                             outcome.last_item, outcome.last_item_status);
-      return false;
+      return Fail(Refusal(outcome.last_item, outcome.last_item_status));
     }
     ++outcome.items_written;
     rest = rest.subspan(batch::kItemHeader + rest[0]);
   }
   if (*count == sent) return true;
   phone.log().WriteLine(kLogErr, "NV batch reply has %d item results for %d items", *count, sent);
-  return false;
+  return Fail(BadReply(phone, "has results for another number of items"));
 }
 
 bool SendPacket(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {

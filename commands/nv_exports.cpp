@@ -10,8 +10,7 @@
 
 namespace nv = kral::nv;
 using kral::Diag_FTM;
-using kral::LogName;
-using kral::OnPhone;
+using kral::ExportCall;
 using kral::Put;
 
 namespace {
@@ -19,6 +18,7 @@ namespace {
 bool IsMissing(Diag_FTM& phone, const char* name, const void* data, uint32_t count) {
   if (data != nullptr || count == 0) return false;
   phone.log().WriteLine(kral::kLogErr, "%s() -- its data are missing", name);
+  kral::Fail(kral::Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the data"));
   return true;
 }
 
@@ -55,7 +55,7 @@ bool ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, uint8_t* data, u
                         nv::ReadElement(phone, item, index, {data, length}, reported);
   // The status tells why, so it is handed out with a refusal, too.
   if (answered) Put(status, reported);
-  const bool passed = answered && reported == nv::kDone;
+  const bool passed = answered && (reported == nv::kDone || kral::Fail(nv::Refusal(item, reported)));
   phone.log().WriteLine(kral::kLogRet, "KRAL_DIAG_NV_READ_ARRAY_F () = %s", passed ? "PASS" : "FAIL");
   return passed;
 }
@@ -75,31 +75,28 @@ extern "C" {
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_READ_F(KRAL_HANDLE handle, uint16_t item, uint8_t* data, uint16_t length,
                                       uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_READ_F");
   const ItemRead read = [](Diag_FTM& phone, uint16_t id, uint16_t, std::span<uint8_t> bytes, uint16_t& reported) {
     return nv::Read(phone, id, bytes, reported);
   };
-  return OnPhone(handle, Read, "KRAL_DIAG_NV_READ_F", read, item, uint16_t{0}, data, length, status);
+  return ExportCall(handle, __func__).Run(Read, __func__, read, item, uint16_t{0}, data, length, status);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_F(KRAL_HANDLE handle, uint16_t item, const uint8_t* data, uint16_t length,
                                        uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_F");
-  return OnPhone(handle, [&](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Run([&](Diag_FTM& phone) {
     return !IsMissing(phone, "KRAL_DIAG_NV_WRITE_F", data, length) && Write(phone, item, {data, length}, status);
   });
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_READ_EXT_F(KRAL_HANDLE handle, uint16_t item, uint8_t* data, uint16_t context,
                                           uint16_t length, uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_READ_EXT_F");
-  return OnPhone(handle, Read, "KRAL_DIAG_NV_READ_EXT_F", nv::ReadExtended, item, context, data, length, status);
+  return ExportCall(handle, __func__)
+      .Run(Read, "KRAL_DIAG_NV_READ_EXT_F", nv::ReadExtended, item, context, data, length, status);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t item, const uint8_t* data, uint16_t context,
                                            uint16_t length, uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_EXT_F");
-  return OnPhone(handle, [&](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Run([&](Diag_FTM& phone) {
     phone.log().WriteLine(kral::kLogFn, "KRAL_DIAG_NV_WRITE_EXT_F (iItemID = %d, iLength = %d)", item, length);
     if (IsMissing(phone, "KRAL_DIAG_NV_WRITE_EXT_F", data, length)) return false;
     uint16_t reported = status == nullptr ? uint16_t{0} : *status;
@@ -111,14 +108,12 @@ uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t item, co
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_READ_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index, uint8_t* data,
                                             uint16_t length, uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_READ_ARRAY_F");
-  return OnPhone(handle, ReadElement, item, index, data, length, status);
+  return ExportCall(handle, __func__).Run(ReadElement, item, index, data, length, status);
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index, const uint8_t* data,
                                              uint16_t length, uint16_t* status) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_ARRAY_F");
-  return OnPhone(handle, [&](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Run([&](Diag_FTM& phone) {
     if (IsMissing(phone, "KRAL_DIAG_NV_WRITE_ARRAY_F", data, length)) return false;
     std::vector<uint8_t> element{index};
     element.insert(element.end(), data, data + length);
@@ -127,16 +122,14 @@ uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_ARRAY_F(KRAL_HANDLE handle, uint16_t item, 
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_SetBatchMode(KRAL_HANDLE handle, uint8_t start) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_SetBatchMode");
-  return OnPhone(handle, [start](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Run([start](Diag_FTM& phone) {
     nv::SetBatchMode(phone, start != 0);
     return true;
   });
 }
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE handle, const uint16_t* items, uint16_t count) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List");
-  return OnPhone(handle, [&](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Run([&](Diag_FTM& phone) {
     if (IsMissing(phone, "KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List", items, count)) return false;
     nv::SetReadOnlyList(phone, {items, count});
     return true;
@@ -145,8 +138,7 @@ uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE handle, c
 
 uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_FlushBatchQueue(KRAL_HANDLE handle, uint16_t* last_error_item,
                                                      uint16_t* last_total_status, uint8_t* last_item_status) {
-  LogName(handle, "KRAL_DIAG_NV_WRITE_FlushBatchQueue");
-  return OnPhone(handle, Flush, last_error_item, last_total_status, last_item_status);
+  return ExportCall(handle, __func__).Run(Flush, last_error_item, last_total_status, last_item_status);
 }
 
 }  // extern "C"

@@ -9,22 +9,22 @@ namespace kral::nv {
 
 inline constexpr u8 kSubsystem = 48;
 
+// Where the data stand, in request and reply: what is in front of them the reply repeats.
+inline constexpr u8 kItemData = 3;
+inline constexpr u8 kElementData = 4;
+inline constexpr u8 kExtendedData = 8;
+
 // The caller's buffer and status go out with a read as they stand. A write has exactly 128 data bytes and,
 // deliberately, no status behind them.
-inline constexpr DiagRequest<u16, Bytes, u16> kReadItem{38};
-inline constexpr DiagRequest<u16, u8> kReadElement{38};  // item, array index
-inline constexpr DiagRequest<u16, Block<kDataSize>> kWriteItem{39};
+inline constexpr DiagRequest<u16, Bytes, u16> kReadItem{38, kItemData};
+inline constexpr DiagRequest<u16, u8> kReadElement{38, kElementData};  // item, array index
+inline constexpr DiagRequest<u16, Block<kDataSize>> kWriteItem{39, kItemData};
 
 // The same for one subscription (the context).
 inline constexpr SubsystemRequest<u16, u16, u16, Bytes> kWriteBatch{kSubsystem, 0};  // items, payload size, zero
-inline constexpr SubsystemRequest<u16, u16, Bytes, u16> kReadExtended{kSubsystem, 1};
-inline constexpr SubsystemRequest<u16, u16, Block<kDataSize>, u16> kWriteExtended{kSubsystem, 2};
+inline constexpr SubsystemRequest<u16, u16, Bytes, u16> kReadExtended{kSubsystem, 1, kExtendedData};
+inline constexpr SubsystemRequest<u16, u16, Block<kDataSize>, u16> kWriteExtended{kSubsystem, 2, kExtendedData};
 static_assert(AreSorted(kWriteBatch, kReadExtended, kWriteExtended));
-
-// Where the data stand, in request and reply.
-inline constexpr size_t kItemData = 3;
-inline constexpr size_t kElementData = 4;
-inline constexpr size_t kExtendedData = 8;
 
 namespace batch {
 // A packet is full when its payload would reach this.

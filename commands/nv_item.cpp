@@ -7,9 +7,23 @@
 
 #include "commands/nv_format.h"
 #include "frame/base/little_endian.h"
+#include "frame/request_failure.h"
 
 namespace kral::nv {
 namespace {
+
+const char* StatusText(uint16_t status) {
+  switch (status) {
+    case KRAL_NV_STATUS_NEVER_WRITTEN:
+      return "never written";
+    case KRAL_NV_STATUS_UNKNOWN_ITEM:
+      return "no such item";
+    case KRAL_NV_STATUS_READ_ONLY:
+      return "read-only";
+    default:
+      return "not carried out";
+  }
+}
 
 using DataBlock = std::array<u8, kDataSize>;
 
@@ -28,9 +42,10 @@ std::optional<uint16_t> StatusAtEnd(std::span<const uint8_t> reply) {
 bool TakeRead(Diag_FTM& phone, size_t offset, std::span<uint8_t> data, uint16_t& status) {
   const auto reply = phone.packet().response();
   const auto reported = StatusAtEnd(reply);
-  if (!reported) return false;
+  if (!reported) return Fail(BadReply(phone, "has no status"));
   if (*reported == kDone) {
-    if (reply.size() < offset || reply.size() - offset < data.size()) return false;
+    if (reply.size() < offset || reply.size() - offset < data.size())
+      return Fail(BadReply(phone, "holds too few data"));
     std::copy_n(reply.begin() + static_cast<std::ptrdiff_t>(offset), data.size(), data.begin());
   }
   status = *reported;
@@ -38,13 +53,15 @@ bool TakeRead(Diag_FTM& phone, size_t offset, std::span<uint8_t> data, uint16_t&
 }
 
 bool AnswersInFull(Diag_FTM& phone) {
-  return phone.packet().response().size() >= phone.packet().request_length();
+  return phone.packet().response().size() >= phone.packet().request_length() ||
+         Fail(BadReply(phone, "is shorter than the request"));
 }
 
 bool TakeStatus(Diag_FTM& phone, uint16_t& status) {
   const auto reported = StatusAtEnd(phone.packet().response());
-  if (reported) status = *reported;
-  return reported.has_value();
+  if (!reported) return Fail(BadReply(phone, "has no status"));
+  status = *reported;
+  return true;
 }
 
 }  // namespace
@@ -77,6 +94,11 @@ bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const
   DataBlock block{index};
   std::copy_n(data.begin(), std::min(data.size(), block.size() - 1), block.begin() + 1);
   return Write(phone, item, block, status);
+}
+
+Failure Refusal(uint16_t item, uint16_t status) {
+  return Failure(KRAL_ERROR_REFUSED, "NV item %d: the handset gives status %d, %s", item, status, StatusText(status))
+      .Status(KRAL_ERROR_STATUS_NV, status);
 }
 
 }  // namespace kral::nv

@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <span>
 
+#include "frame/base/failure.h"
 #include "kral/nv.h"
 
 namespace kral {
@@ -37,6 +38,9 @@ bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16
 bool WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status);
 // The element's index stands in front of its data, which are cut at 127 bytes.
 bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status);
+
+// What to note where a status is a failure.
+Failure Refusal(uint16_t item, uint16_t status);
 
 }  // namespace nv
 }  // namespace kral

@@ -5,9 +5,9 @@
 //   Send(phone, kSetDipsw, switches);              // 30 lo hi
 //
 // What stands in front of the fields, and how the packet goes out, is the row's header type. A header has
-//   key()            by which a table of rows is sorted
-//   Begin(phone)     resets the default packet buffer and writes the header into it
-//   Transmit(phone)  sends what the buffer holds and awaits the reply
+//   key()                         by which a table of rows is sorted
+//   Begin(phone)                  resets the default packet buffer and writes the header into it
+//   Transmit(phone, time_out_ms)  sends what the buffer holds and awaits the reply
 #ifndef KRAL_COMMANDS_REQUEST_H
 #define KRAL_COMMANDS_REQUEST_H
 
@@ -83,19 +83,30 @@ void Compose(Diag_FTM& phone, const Request<Header, Fields...>& row, std::type_i
   (AppendField(phone.packet(), fields), ...);
 }
 
-// True when the reply arrived; it is then the response of the phone's default packet buffer.
+// The reply is the response of the phone's default packet buffer, too. What went wrong has been noted (base/failure.h).
 template <class Header, class... Fields>
-bool Send(Diag_FTM& phone, const Request<Header, Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
+Reply Send(Diag_FTM& phone, const Request<Header, Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
   Compose(phone, row, fields...);
-  return row.header.Transmit(phone);
+  return row.header.Transmit(phone, phone.TimeOut(kTimeOutDefaultCommand));
 }
 
 // The same with another time-out than the default one.
 template <class Header, class... Fields>
-bool SendWithin(Diag_FTM& phone, u32 time_out_id, const Request<Header, Fields...>& row,
-                std::type_identity_t<Field<Fields>>... fields) {
+Reply SendWithin(Diag_FTM& phone, u32 time_out_id, const Request<Header, Fields...>& row,
+                 std::type_identity_t<Field<Fields>>... fields) {
   Compose(phone, row, fields...);
-  return phone.Send(phone.packet(), phone.TimeOut(time_out_id));
+  return row.header.Transmit(phone, phone.TimeOut(time_out_id));
+}
+
+// A reply that repeats the beginning of its request tells itself from one to an earlier request with the same first
+// byte, which comes after that was given up. One of fewer than `least` bytes repeats nothing, and is judged by whoever
+// asked.
+inline Reply SendEchoed(Diag_FTM& phone, u32 time_out_ms, std::size_t echoed, std::size_t least) {
+  const auto request = phone.packet().request();
+  const auto head = request.first(std::min(echoed, request.size()));
+  return phone.Send(phone.packet(), time_out_ms, 0, [head, least](std::span<const u8> reply) {
+    return reply.size() < least || std::equal(head.begin(), head.end(), reply.begin());
+  });
 }
 
 // For the static_assert behind a table of rows.
@@ -108,16 +119,18 @@ constexpr bool AreSorted(const Rows&... rows) {
 // --- The two plain headers
 // --------------------------------------------------------------------------------------------
 
-// One byte, the command code.
+// One byte, the command code. The reply repeats so many bytes of the request, and has something behind them: some
+// handsets answer with the code and a status alone.
 struct DiagHeader {
   u8 code;
+  u8 echoed = 1;
 
   constexpr u32 key() const { return code; }
   void Begin(Diag_FTM& phone) const {
     phone.packet().Reset();
     phone.packet().Append8(code);
   }
-  bool Transmit(Diag_FTM& phone) const { return phone.Send(phone.packet()); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed + 1U); }
 };
 
 inline constexpr u8 kSubsystemDispatch = 75;
@@ -126,6 +139,7 @@ inline constexpr u8 kSubsystemDispatch = 75;
 struct SubsystemHeader {
   u8 subsystem;
   u16 command;
+  u8 echoed = 4;
 
   constexpr u32 key() const { return u32{subsystem} << 16 | command; }
   void Begin(Diag_FTM& phone) const {
@@ -134,7 +148,7 @@ struct SubsystemHeader {
     phone.packet().Append8(subsystem);
     phone.packet().Append16(command);
   }
-  bool Transmit(Diag_FTM& phone) const { return phone.Send(phone.packet()); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed); }
 };
 
 template <class... Fields>

@@ -4,6 +4,7 @@
 #include "commands/ftm_frame.h"
 #include "commands/nv_item.h"
 #include "frame/base/little_endian.h"
+#include "frame/request_failure.h"
 
 namespace kral::nv {
 namespace {
@@ -19,7 +20,8 @@ constexpr size_t kSize = 4;
 constexpr size_t kData = 6;
 
 bool ReachesDispatchers(const Diag_FTM& phone) {
-  return phone.ftm().command_code == ftm::kCommandCode75 && phone.ftm().queue_mode == 0;
+  return (phone.ftm().command_code == ftm::kCommandCode75 && phone.ftm().queue_mode == 0) ||
+         Fail(Failure(KRAL_ERROR_ARGUMENT, "RF NV items need command code 75 and no queue"));
 }
 
 // Sends what the packet buffer holds; the reply behind its header, or nothing when it is not about the item.
@@ -27,10 +29,10 @@ bool Exchange(Diag_FTM& phone, u16 item, std::span<const u8>& reply, u16& status
   if (!ftm::Transmit(phone)) return false;
   const auto response = phone.packet().response();
   const size_t header = ftm::HeaderSize(phone);
-  if (response.size() < header) return false;
+  if (response.size() < header) return Fail(BadReply(phone, "is too short"));
   reply = response.subspan(header);
   const auto reported = LoadLe<u16>(reply, kStatus);
-  if (!reported || LoadLe<u16>(reply, kItem) != item) return false;
+  if (!reported || LoadLe<u16>(reply, kItem) != item) return Fail(BadReply(phone, "is not about the item"));
   status = *reported;
   return true;
 }
@@ -46,7 +48,7 @@ bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t
   if (!Exchange(phone, item, reply, reported)) return false;
   if (reported == kDone) {
     const auto size = LoadLe<u16>(reply, kSize);
-    if (!size || reply.size() - kData < *size) return false;
+    if (!size || reply.size() - kData < *size) return Fail(BadReply(phone, "holds too few data"));
     const auto content = reply.subspan(kData, *size);
     data.assign(content.begin(), content.end());
   }
@@ -55,7 +57,11 @@ bool ReadRf(Diag_FTM& phone, uint16_t item, std::vector<uint8_t>& data, uint16_t
 }
 
 bool WriteRf(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
-  if (data.size() > kRfDataSize || !ReachesDispatchers(phone)) return false;
+  if (data.size() > kRfDataSize) {
+    return Fail(
+        Failure(KRAL_ERROR_ARGUMENT, "RF NV item %d: %zu bytes are more than %zu", item, data.size(), kRfDataSize));
+  }
+  if (!ReachesDispatchers(phone)) return false;
   ftm::BeginCommand(phone, kModeIdRfNv, ftm::HeaderForm::kPlain, kWrite);
   phone.packet().Append16(item);
   phone.packet().Append16(static_cast<u16>(data.size()));

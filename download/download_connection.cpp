@@ -3,6 +3,8 @@
 
 #include <chrono>
 
+#include "frame/base/failure.h"
+
 namespace kral {
 namespace {
 
@@ -23,19 +25,21 @@ class LeadingFlag {
 
 }  // namespace
 
+DownloadConnection::Status DownloadConnection::ServerHasNoFramer() {
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "a phone server downloads by itself"));
+  return kNotSent;
+}
+
 DownloadConnection::Status DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
                                                         uint32_t time_out_ms, std::vector<uint8_t>& reply) {
   reply.clear();
-  if (phone_.server_mode()) return kNotSent;
+  if (phone_.server_mode()) return ServerHasNoFramer();
   const LeadingFlag flag(phone_.transport().framer());
-  // No reply fills the room to the end: a size that still says so was not set.
   reply.resize(kMaximumPacket);
-  auto size = static_cast<uint16_t>(reply.size());
-  const bool done = phone_.SendSync(request, reply.data(), size, expected_code, time_out_ms);
-  const bool answered = size != kMaximumPacket;
-  reply.resize(answered ? size : 0);
-  if (done && answered) return kDone;
-  return answered ? kOtherReply : kNoReply;
+  const Reply told = phone_.SendSync(request, reply, expected_code, time_out_ms);
+  reply.resize(told.bytes().size());
+  if (told) return kDone;
+  return told.came() ? kOtherReply : kNoReply;
 }
 
 bool DownloadConnection::AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& reply) {
@@ -47,8 +51,8 @@ bool DownloadConnection::AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& 
 }
 
 DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
-  if (phone_.server_mode() || !phone_.IsPortOpen()) return kNotSent;
-  return phone_.transport().SendASync(request, time_out_ms, true) ? kDone : kNotSent;
+  if (phone_.server_mode()) return ServerHasNoFramer();
+  return phone_.SendASync(request, time_out_ms, true) ? kDone : kNotSent;
 }
 
 void DownloadConnection::BeginWork() {

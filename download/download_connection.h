@@ -49,6 +49,8 @@ class DownloadConnection {
   void Report(uint32_t done, uint32_t total);
 
  private:
+  static Status ServerHasNoFramer();
+
   Diag_FTM& phone_;
   bool reported_ = false;
   uint32_t last_report_ = 0;

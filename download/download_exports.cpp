@@ -1,5 +1,6 @@
 // Exports of software download: name line, handle, operation.
 #include <algorithm>
+#include <exception>
 
 #include "download/download_client.h"
 #include "download/image_file.h"
@@ -7,25 +8,24 @@
 #include "frame/export_call.h"
 
 namespace download = kral::download;
-using kral::LogFormatted;
-using kral::LogName;
-using kral::OnPhone;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
 using kral::TextOrEmpty;
 
 namespace {
 
-// For the functions that have no handset.
+// For the functions that have no handset: the result of download.h is handed out, and decides.
 template <class Operation>
-uint8_t WithoutPhone(uint32_t* result, Operation&& operation) noexcept {
-  try {
-    const uint32_t value = operation();
+uint8_t WithoutPhone(const char* function, uint32_t* result, Operation&& operation) {
+  return ExportCall(function).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+    uint32_t value = KRAL_STREAM_FILE_NOT_DECODED;
+    try {
+      value = operation();
+    } catch (const std::exception& exception) {
+      kral::Fail(kral::Failure(KRAL_ERROR_INTERNAL, "%s", exception.what()));
+    }
     if (result != nullptr) *result = value;
     return value == KRAL_STREAM_WRITTEN ? 1 : 0;
-  } catch (...) {
-    if (result != nullptr) *result = KRAL_STREAM_FILE_NOT_DECODED;
-    return 0;
-  }
+  });
 }
 
 }  // namespace
@@ -34,87 +34,84 @@ extern "C" {
 
 uint8_t KRAL_CALL KRAL_ConfigureDownloadCallBack(KRAL_HANDLE handle, KRAL_DOWNLOAD_PROGRESS_CALLBACK callback,
                                                  uintptr_t value) {
-  LogName(handle, "KRAL_ConfigureDownloadCallBack");
-  return OnPhoneAtOnce(handle, download::SetCallback, callback, value);
+  return ExportCall(handle, __func__).RunAtOnce(download::SetCallback, callback, value);
 }
 
 uint8_t KRAL_CALL KRAL_AbortDownload(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_AbortDownload");
-  return OnPhoneAtOnce(handle, download::Abort);
+  return ExportCall(handle, __func__).RunAtOnce(download::Abort);
 }
 
 uint8_t KRAL_CALL KRAL_KOVA_LoadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file,
                                                 uint32_t maximum_packet, uint32_t* result) {
-  LogFormatted(handle, "KRAL_KOVA_LoadFlashProgrammer( sFlashProgrammer = %s, iMaxPacket = %u )",
-               TextOrEmpty(programmer_file), maximum_packet);
-  return OnPhone(handle, download::LoadFlashProgrammer, programmer_file, maximum_packet, result);
+  return ExportCall(handle, __func__)
+      .Logged("( sFlashProgrammer = %s, iMaxPacket = %u )", TextOrEmpty(programmer_file), maximum_packet)
+      .Run(download::LoadFlashProgrammer, programmer_file, maximum_packet, result);
 }
 
 uint8_t KRAL_CALL KRAL_KOVA_NOP(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_KOVA_NOP");
-  return OnPhone(handle, download::KovaNop);
+  return ExportCall(handle, __func__).Run(download::KovaNop);
 }
 
 uint8_t KRAL_CALL KRAL_KOVA_RESET(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_KOVA_RESET");
-  return OnPhone(handle, download::KovaReset);
+  return ExportCall(handle, __func__).Run(download::KovaReset);
 }
 
 uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t* version) {
-  LogName(handle, "KRAL_KOVA_SW_VERSION");
-  return OnPhone(handle, download::KovaSoftwareVersion, version);
+  return ExportCall(handle, __func__).Run(download::KovaSoftwareVersion, version);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_HELLO(KRAL_HANDLE handle, uint32_t variant, uint32_t* block_size, uint16_t* window) {
-  LogFormatted(handle, "KRAL_STREAM_HELLO( iVariant = %u )", variant);
-  return OnPhone(handle, download::StreamHello, variant, block_size, window);
+  return ExportCall(handle, __func__)
+      .Logged("( iVariant = %u )", variant)
+      .Run(download::StreamHello, variant, block_size, window);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_ConfigureHello(KRAL_HANDLE handle, uint32_t tries, uint32_t delay_ms) {
-  LogFormatted(handle, "KRAL_STREAM_ConfigureHello( iTries = %u, iDelay_ms = %u )", tries, delay_ms);
-  return OnPhoneAtOnce(handle, download::ConfigureHello, tries, delay_ms);
+  return ExportCall(handle, __func__)
+      .Logged("( iTries = %u, iDelay_ms = %u )", tries, delay_ms)
+      .RunAtOnce(download::ConfigureHello, tries, delay_ms);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t mode) {
-  LogFormatted(handle, "KRAL_STREAM_SECURITY_MODE( iMode = %d )", mode);
-  return OnPhone(handle, download::SecurityMode, mode);
+  return ExportCall(handle, __func__).Logged("( iMode = %d )", mode).Run(download::SecurityMode, mode);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const char* table_file, uint8_t override_table,
                                               uint8_t* status) {
-  LogFormatted(handle, "KRAL_STREAM_PARTITION_TABLE( sTable = %s, bOverride = %d )", TextOrEmpty(table_file),
-               override_table);
-  return OnPhone(handle, download::PartitionTable, table_file, override_table, status);
+  return ExportCall(handle, __func__)
+      .Logged("( sTable = %s, bOverride = %d )", TextOrEmpty(table_file), override_table)
+      .Run(download::PartitionTable, table_file, override_table, status);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const char* image_file, uint32_t format,
                                              uint8_t image_type, const char* header_file, uint8_t method,
                                              uint32_t block_size, uint16_t window, uint32_t* result) {
-  LogFormatted(handle, "KRAL_STREAM_WriteImageFile( sImage = %s, iType = %d, sHeader = %s )", TextOrEmpty(image_file),
-               image_type, TextOrEmpty(header_file));
-  return OnPhone(handle, download::WriteImageFile, image_file, format, header_file,
-                 download::WriteArguments{image_type, method, block_size, window}, result);
+  return ExportCall(handle, __func__)
+      .Logged("( sImage = %s, iType = %d, sHeader = %s )", TextOrEmpty(image_file), image_type,
+              TextOrEmpty(header_file))
+      .Run(download::WriteImageFile, image_file, format, header_file,
+           download::WriteArguments{image_type, method, block_size, window}, result);
 }
 
 uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* data, uint32_t size, uint32_t address,
                                             uint8_t image_type, const uint8_t* header, uint32_t header_size,
                                             uint8_t method, uint32_t block_size, uint16_t window, uint32_t* result) {
-  LogFormatted(handle, "KRAL_STREAM_WriteImageMem( iSize = %u, iAddress = 0x%08X, iType = %d )", size, address,
-               image_type);
-  return OnPhone(handle, download::WriteImageMem, download::CallersBytes{data, size}, address,
-                 download::CallersBytes{header, header_size},
-                 download::WriteArguments{image_type, method, block_size, window}, result);
+  return ExportCall(handle, __func__)
+      .Logged("( iSize = %u, iAddress = 0x%08X, iType = %d )", size, address, image_type)
+      .Run(download::WriteImageMem, download::CallersBytes{data, size}, address,
+           download::CallersBytes{header, header_size},
+           download::WriteArguments{image_type, method, block_size, window}, result);
 }
 
 uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info, uint32_t* result) {
-  return WithoutPhone(result, [=] {
+  return WithoutPhone(__func__, result, [=] {
     if (image_file == nullptr || info == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
     return kral::GetImageInfo(image_file, format, *info);
   });
 }
 
 uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64_t* bytes, uint32_t* result) {
-  return WithoutPhone(result, [=] {
+  return WithoutPhone(__func__, result, [=] {
     if (hex_file == nullptr || line == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
     kral::HexLoss loss;
     const uint32_t value = kral::FindHexLoss(hex_file, loss);
@@ -127,7 +124,7 @@ uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64
 
 uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32_t direction, uint32_t* base_address,
                                    uint32_t* result) {
-  return WithoutPhone(result, [=] {
+  return WithoutPhone(__func__, result, [=] {
     uint32_t base = base_address == nullptr ? 0 : *base_address;
     if (input == nullptr || output == nullptr || direction > KRAL_HEX_FROM_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
     const uint32_t value = direction == KRAL_HEX_FROM_BINARY ? kral::BinaryToHex(input, output, base)

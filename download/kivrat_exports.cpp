@@ -15,10 +15,7 @@
 namespace {
 
 using kral::Diag_FTM;
-using kral::LogFormatted;
-using kral::LogName;
-using kral::OnPhone;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
 using kral::TextOrEmpty;
 
 bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms, uint32_t pre_done_delay_ms) {
@@ -91,48 +88,47 @@ bool GetHelloBehavior(Diag_FTM& phone, uint16_t* behavior) {
 extern "C" {
 
 KRAL_HANDLE KRAL_CALL KRAL_Kivrat_ConnectServer(uint32_t port) {
-  if (port > kral::Kral_ResourceManager::kAnyPort) return 0;
-  const KRAL_HANDLE handle = kral::Kral_ResourceManager::CreateContext(static_cast<uint16_t>(port));
-  LogName(handle, "KRAL_Kivrat_ConnectServer");
+  const KRAL_HANDLE handle =
+      ExportCall(__func__)
+          .Require(port <= kral::Kral_ResourceManager::kAnyPort, "the port number has more than 16 bits")
+          .Connecting([=] { return kral::Kral_ResourceManager::CreateContext(static_cast<uint16_t>(port)); });
+  if (handle != 0) ExportCall(handle, __func__).RunAtOnce([](Diag_FTM&) { return true; });
   return handle;
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_Configure(KRAL_HANDLE handle, uint32_t hello_retries, uint32_t retry_delay_ms,
                                         uint32_t pre_done_delay_ms) {
-  LogName(handle, "KRAL_Kivrat_Configure");
-  return OnPhoneAtOnce(handle, Configure, hello_retries, retry_delay_ms, pre_done_delay_ms);
+  return ExportCall(handle, __func__).RunAtOnce(Configure, hello_retries, retry_delay_ms, pre_done_delay_ms);
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* version, uint32_t* chip_identity) {
-  LogName(handle, "KRAL_Kivrat_Connect");
-  return OnPhone(handle, Connect, version, chip_identity);
+  return ExportCall(handle, __func__).Run(Connect, version, chip_identity);
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_DownloadFlashProgrammer(KRAL_HANDLE handle, const char* programmer_file) {
-  LogFormatted(handle, "KRAL_Kivrat_DownloadFlashProgrammer( sFile = %s )", TextOrEmpty(programmer_file));
-  return OnPhone(handle, DownloadFlashProgrammer, programmer_file);
+  return ExportCall(handle, __func__)
+      .Logged("( sFile = %s )", TextOrEmpty(programmer_file))
+      .Run(DownloadFlashProgrammer, programmer_file);
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_End(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_Kivrat_End");
-  return OnPhone(handle, End);
+  return ExportCall(handle, __func__).Run(End);
 }
 
 uint8_t KRAL_CALL KRAL_Kivrat_FlashAll(KRAL_HANDLE handle, const char* programmer_file, const char* const* image_files,
                                        const uint8_t* image_types, uint32_t image_count, uint32_t* result,
                                        uint32_t* failed_image) {
-  LogFormatted(handle, "KRAL_Kivrat_FlashAll( sFile = %s, iImages = %u )", TextOrEmpty(programmer_file), image_count);
-  return OnPhone(handle, FlashAll, programmer_file, image_files, image_types, image_count, result, failed_image);
+  return ExportCall(handle, __func__)
+      .Logged("( sFile = %s, iImages = %u )", TextOrEmpty(programmer_file), image_count)
+      .Run(FlashAll, programmer_file, image_files, image_types, image_count, result, failed_image);
 }
 
 uint8_t KRAL_CALL KRAL_SetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t behavior) {
-  LogName(handle, "KRAL_SetKivratHelloBehavior");
-  return OnPhone(handle, SetHelloBehavior, behavior);
+  return ExportCall(handle, __func__).Run(SetHelloBehavior, behavior);
 }
 
 uint8_t KRAL_CALL KRAL_GetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t* behavior) {
-  LogName(handle, "KRAL_GetKivratHelloBehavior");
-  return OnPhone(handle, GetHelloBehavior, behavior);
+  return ExportCall(handle, __func__).Run(GetHelloBehavior, behavior);
 }
 
 }  // extern "C"

@@ -14,28 +14,32 @@ bool OpenPort(Diag_FTM& phone, const OpenArguments& arguments) {
   return phone.OpenPort(arguments);
 }
 
-bool OpenAndAsk(Diag_FTM& phone) {
-  return phone.OpenPort({}) && phone.IsPhoneConnected();
-}
-
-bool ClosePort(Diag_FTM& phone) {
-  return phone.ClosePort();
+// Under the request lock; false, with the failure noted, also when there is no phone object.
+template <class Operation>
+bool OnPhone(KRAL_HANDLE handle, Operation operation) {
+  const auto phone = Kral_ResourceManager::GetPhone(handle);
+  if (!phone) return Fail(Failure(KRAL_ERROR_NO_PORT, "there is no phone server"));
+  const std::lock_guard lock(phone->request_lock());
+  return operation(*phone);
 }
 
 }  // namespace
 
-KRAL_HANDLE Connect(uint16_t port, OpenArguments arguments) {
+KRAL_HANDLE Connect(const char* function, uint16_t port, OpenArguments arguments) {
   const KRAL_HANDLE handle = Kral_ResourceManager::CreateContext(port);
+  if (handle == 0) return 0;
   arguments.handle = handle;
-  // A failed open is deliberately not told: the caller learns of it from the liveness check.
-  OnPhone(handle, OpenPort, arguments);
+  // A failed open is deliberately not told: the caller learns of it from the liveness check, or from the failure that
+  // is recorded under the new handle.
+  ExportCall(handle, function).Unlogged().Run(OpenPort, arguments);
   return handle;
 }
 
 KRAL_HANDLE ConnectWithVerify(uint16_t port) {
   const KRAL_HANDLE handle = Kral_ResourceManager::CreateContext(port);
+  if (handle == 0) return 0;
   // After a failed open the context keeps its use count: intended.
-  return OnPhone(handle, OpenPort, OpenArguments{}) == 1 ? handle : 0;
+  return OnPhone(handle, [](Diag_FTM& phone) { return phone.OpenPort({}); }) ? handle : 0;
 }
 
 // The end is compared as it is: where the tick count wraps around before it, the attempts end early. Intended.
@@ -46,7 +50,8 @@ KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms) {
   do {
     // Every attempt counts as a connect: the use count of the row grows by one each time.
     handle = Kral_ResourceManager::CreateContext(port);
-    const bool answers = OnPhone(handle, OpenAndAsk) == 1;
+    const bool answers =
+        handle != 0 && OnPhone(handle, [](Diag_FTM& phone) { return phone.OpenPort({}) && phone.IsPhoneConnected(); });
     clock.SleepMs(kAttemptIntervalMs);
     if (answers) return handle;
   } while (clock.TickMs() < end);
@@ -55,8 +60,7 @@ KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms) {
 }
 
 void Disconnect(KRAL_HANDLE handle) {
-  LogFormatted(handle, "KRAL_DisconnectServer()");
-  OnPhone(handle, ClosePort);
+  ExportCall(handle, "KRAL_DisconnectServer").Logged("()").Run(&Diag_FTM::ClosePort);
   Kral_ResourceManager::ReleaseContext(handle, false);
 }
 

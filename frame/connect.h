@@ -9,8 +9,8 @@
 
 namespace kral {
 
-// The handle, whether or not the port opened; 0 when there is no context for it.
-KRAL_HANDLE Connect(uint16_t port, OpenArguments arguments);
+// The handle, whether or not the port opened; 0 when there is no context for it. `function` is the exported one.
+KRAL_HANDLE Connect(const char* function, uint16_t port, OpenArguments arguments);
 
 // 0 also when the port does not open.
 KRAL_HANDLE ConnectWithVerify(uint16_t port);

@@ -12,40 +12,50 @@
 
 namespace {
 
-using kral::LogFormatted;
-using kral::LogName;
-using kral::OnPhone;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
+using kral::Fail;
+using kral::Failure;
+using kral::UnknownHandle;
 namespace table = kral::Kral_ResourceManager;
 
-// Functions without a handle have no log to tell of an exception: it becomes the result of a failure.
-template <class Result, class Function>
-Result Guarded(Result failure, Function function) noexcept {
-  try {
-    return function();
-  } catch (...) {
-    return failure;
-  }
+constexpr const char* kNoOutput = "there is no room for the output";
+
+// Functions without a handle have no log to tell of an exception: it becomes the record of a failure.
+template <class Operation>
+uint8_t Without(const char* function, Operation operation) {
+  return ExportCall(function).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t { return operation() ? 1 : 0; });
 }
 
-template <class Function>
-void Guarded(Function function) noexcept {
-  try {
-    function();
-  } catch (...) {
-  }
+template <class Operation>
+void Do(const char* function, Operation operation) {
+  Without(function, [&] {
+    operation();
+    return true;
+  });
+}
+
+bool IsRoom(const uint16_t* count, const uint16_t* ports) {
+  return count != nullptr && (ports != nullptr || *count == 0);
+}
+
+bool CannotList() {
+  return Fail(Failure(KRAL_ERROR_INTERNAL, "the system does not list its ports"));
 }
 
 uint16_t Low16(uint32_t port) {
   return static_cast<uint16_t>(port);
 }
 
-KRAL_HANDLE ConnectWith(uint32_t port, const kral::OpenArguments& arguments) noexcept {
-  return Guarded(KRAL_HANDLE{0}, [&] { return kral::Connect(Low16(port), arguments); });
+KRAL_HANDLE ConnectWith(const char* function, uint32_t port, const kral::OpenArguments& arguments) {
+  return ExportCall(function).Connecting([&] { return kral::Connect(function, Low16(port), arguments); });
 }
 
 bool IsReceiveMode(uint8_t mode) {
   return mode <= static_cast<uint8_t>(kral::ReceiveMode::kWakeOnData);
+}
+
+bool BadReceiveMode(uint8_t mode) {
+  return Fail(Failure(KRAL_ERROR_ARGUMENT, "the receive mode %d is neither 0 nor 1", mode));
 }
 
 }  // namespace
@@ -62,34 +72,36 @@ void KRAL_CALL KRAL_SetTargetType(uint8_t type) {
 
 void KRAL_CALL KRAL_GetLibraryVersion(char* text) {
   if (text == nullptr) return;
-  Guarded([text] {
+  Do(__func__, [text] {
     const std::string version = kral::LibraryVersion();
     std::copy_n(version.c_str(), version.size() + 1, text);
   });
 }
 
 uint8_t KRAL_CALL KRAL_SetDefaultReceiveMode(uint8_t mode) {
-  if (!IsReceiveMode(mode)) return 0;
-  table::SetDefaultReceiveMode(static_cast<kral::ReceiveMode>(mode));
-  return 1;
+  return Without(__func__, [mode] {
+    if (!IsReceiveMode(mode)) return BadReceiveMode(mode);
+    table::SetDefaultReceiveMode(static_cast<kral::ReceiveMode>(mode));
+    return true;
+  });
 }
 
 uint8_t KRAL_CALL KRAL_GetAllPortList(uint16_t* count, uint16_t* ports) {
-  if (count == nullptr || (ports == nullptr && *count > 0)) return 0;
-  return Guarded(uint8_t{0}, [&] { return uint8_t{table::AllPorts({ports, *count}, *count)}; });
+  return ExportCall(__func__).Require(IsRoom(count, ports), kNoOutput).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+    return table::AllPorts({ports, *count}, *count) || CannotList();
+  });
 }
 
 uint8_t KRAL_CALL KRAL_GetAvailablePhonesPortList(uint16_t* count, uint16_t* ports, uint16_t ignore_count,
                                                   const uint16_t* ignore_list) {
-  if (count == nullptr || (ports == nullptr && *count > 0)) return 0;
   const size_t ignored = ignore_list == nullptr ? 0 : ignore_count;
-  return Guarded(uint8_t{0}, [&] {
-    return uint8_t{table::AvailablePhonePorts({ports, *count}, *count, {ignore_list, ignored})};
+  return ExportCall(__func__).Require(IsRoom(count, ports), kNoOutput).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+    return table::AvailablePhonePorts({ports, *count}, *count, {ignore_list, ignored}) || CannotList();
   });
 }
 
 uint8_t KRAL_CALL KRAL_AddPortAliasEntry(uint16_t logical, uint16_t physical) {
-  Guarded([&] { table::AddPortAlias(logical, physical); });
+  Do(__func__, [&] { table::AddPortAlias(logical, physical); });
   return 1;
 }
 
@@ -99,31 +111,41 @@ uint8_t KRAL_CALL KRAL_ClearPortAliasList(void) {
 }
 
 uint8_t KRAL_CALL KRAL_GetComPortNumber(KRAL_HANDLE handle, uint16_t* port) {
-  LogName(handle, "KRAL_GetComPortNumber");
-  return port != nullptr && table::PortOf(handle, *port) ? 1 : 0;
+  return ExportCall(handle, __func__)
+      .Require(port != nullptr, kNoOutput)
+      .Alone(uint8_t{0}, uint8_t{1}, [=]() -> uint8_t {
+        if (table::PortOf(handle, *port)) return 1;
+        Fail(UnknownHandle(handle));
+        return 0;
+      });
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServer(uint32_t port) {
-  return ConnectWith(port, {});
+  return ConnectWith(__func__, port, {});
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithHandShake(uint32_t port) {
   kral::OpenArguments arguments;
   arguments.handshake = true;
-  return ConnectWith(port, arguments);
+  return ConnectWith(__func__, port, arguments);
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithVerify(uint32_t port) {
-  return Guarded(KRAL_HANDLE{0}, [=] { return kral::ConnectWithVerify(Low16(port)); });
+  return ExportCall(__func__).Connecting([=] { return kral::ConnectWithVerify(Low16(port)); });
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_LogicalPort(uint32_t logical_port) {
-  uint16_t physical = 0;
-  return table::ResolvePortAlias(Low16(logical_port), physical) ? ConnectWith(physical, {}) : 0;
+  return ExportCall(__func__).Connecting([=]() -> KRAL_HANDLE {
+    uint16_t physical = 0;
+    if (table::ResolvePortAlias(Low16(logical_port), physical))
+      return kral::Connect("KRAL_ConnectServer_LogicalPort", physical, {});
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no alias for the logical port %u", logical_port));
+    return 0;
+  });
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_t wait_ms) {
-  return Guarded(KRAL_HANDLE{0}, [=] { return kral::ConnectWithWait(Low16(port), wait_ms); });
+  return ExportCall(__func__).Connecting([=] { return kral::ConnectWithWait(Low16(port), wait_ms); });
 }
 
 KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_UserDefinedTransport(uint32_t port, uintptr_t transport, uintptr_t context,
@@ -133,36 +155,35 @@ KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_UserDefinedTransport(uint32_t port, uin
   kral::OpenArguments arguments;
   arguments.port = port;
   arguments.user = {transport, context, send, receive, flush};
-  return ConnectWith(port, arguments);
+  return ConnectWith(__func__, port, arguments);
 }
 
 void KRAL_CALL KRAL_DisconnectServer(KRAL_HANDLE handle) {
-  Guarded([handle] { kral::Disconnect(handle); });
+  Do(__func__, [handle] { kral::Disconnect(handle); });
 }
 
 void KRAL_CALL KRAL_DisconnectAllServers(void) {
-  Guarded([] { table::ReleaseAllContexts(); });
+  Do(__func__, [] { table::ReleaseAllContexts(); });
 }
 
 void KRAL_CALL KRAL_TerminateORBTServer(void) {
-  Guarded([] { kral::TerminateProcessByName("ORBTServer.exe"); });
+  Do(__func__, [] { kral::TerminateProcessByName("ORBTServer.exe"); });
 }
 
 uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_IsPhoneConnected");
-  return OnPhone(handle, [](kral::Diag_FTM& phone) { return phone.IsPhoneConnected(); });
+  return ExportCall(handle, __func__).Run([](kral::Diag_FTM& phone) { return phone.IsPhoneConnected(); });
 }
 
 uint8_t KRAL_CALL KRAL_SetReceiveMode(KRAL_HANDLE handle, uint8_t mode) {
-  LogFormatted(handle, "KRAL_SetReceiveMode( iMode = %d )", mode);
-  return OnPhoneAtOnce(handle, [mode](kral::Diag_FTM& phone) {
-    return IsReceiveMode(mode) && phone.SetReceiveMode(static_cast<kral::ReceiveMode>(mode));
+  return ExportCall(handle, __func__).Logged("( iMode = %d )", mode).RunAtOnce([mode](kral::Diag_FTM& phone) {
+    if (!IsReceiveMode(mode)) return BadReceiveMode(mode);
+    return phone.SetReceiveMode(static_cast<kral::ReceiveMode>(mode)) ||
+           Fail(Failure(KRAL_ERROR_ARGUMENT, "through a phone server nothing is received here"));
   });
 }
 
 uint8_t KRAL_CALL KRAL_SetData2DiagSearch(KRAL_HANDLE handle, uint8_t search) {
-  LogFormatted(handle, "KRAL_SetData2DiagSearch( bSearch = %d )", search);
-  return OnPhoneAtOnce(handle, [search](kral::Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Logged("( bSearch = %d )", search).RunAtOnce([search](kral::Diag_FTM& phone) {
     phone.SetData2DiagSearch(search == 1);
     return true;
   });

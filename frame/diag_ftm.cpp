@@ -6,6 +6,7 @@
 #include <string>
 #include <utility>
 
+#include "frame/base/failure.h"
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
 #include "platform/file_util.h"
@@ -95,7 +96,7 @@ bool Diag_FTM::ConfigureTimeOut(uint32_t id, int32_t milliseconds) {
   if (server_mode()) {
     // Refused, and yet stored: GetTimeOut gives the new value.
     log().WriteLine(kLogFn, "KRAL_ConfigureTimeOut() - error, this timeout cannot be set in ORBT mode");
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "time-out %u cannot be set through a phone server", id));
   }
   if (id == kTimeOutPortWrite) {
     transport().port().SetWriteTimeout(value);

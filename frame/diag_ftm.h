@@ -71,13 +71,22 @@ class Diag_FTM {
   CDiagPacket& packet(size_t index = 0) { return packets_[index]; }
 
   // Sends the buffer's request and awaits the reply that begins with the request's first byte, into the buffer's
-  // response. False after a time-out (which closes the port) and after any other first reply.
-  bool Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms = 0);
-  bool Send(CDiagPacket& packet) { return Send(packet, TimeOut(kTimeOutDefaultCommand)); }
+  // response. No reply within the time-out closes the port; any other first reply is in the buffer, too. `is_own` tells
+  // the reply from one to an earlier request (CKralThreadInterface::SendSync). What went wrong has been noted as the
+  // failure of the exported call under way.
+  Reply Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms = 0, const ReplyTest& is_own = {});
+  Reply Send(CDiagPacket& packet) { return Send(packet, TimeOut(kTimeOutDefaultCommand)); }
 
-  // The same over the caller's memory; response_size as CKralThreadInterface::SendSync tells.
-  bool SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint8_t expected_code,
-                uint32_t time_out_ms, uint32_t delay_ms = 0);
+  // The same over the caller's memory.
+  Reply SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
+                 uint32_t delay_ms = 0, const ReplyTest& is_own = {});
+  // Once more awaits the reply to the request that Send has sent, behind one that answered something else. Through a
+  // phone server no reply comes unasked.
+  Reply AwaitNext(CDiagPacket& packet, uint32_t time_out_ms, const ReplyTest& is_own = {});
+
+  // Direct mode: opens the port, and sends as the transport does. What went wrong has been noted.
+  Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
+  Reply SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
 
   // --- Collection (diag_ftm_collection.cpp) -----------------------------------------------------------------------
   TrafficCounters counters();
@@ -145,9 +154,9 @@ class Diag_FTM {
   void EndCollection();
   bool IsLoopbackAnswered();
   bool IsVersionAnswered();
-  bool SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> response, uint16_t& response_size,
-                         uint8_t expected_code, uint32_t time_out_ms);
-  void LogRefusal(uint8_t code);
+  Reply SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
+                          uint32_t time_out_ms);
+  Reply Noted(Reply reply, std::span<const uint8_t> request, uint32_t time_out_ms);
 
   std::recursive_mutex request_lock_;
   Clock& clock_;

@@ -5,6 +5,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
+#include "frame/request_failure.h"
 
 namespace kral {
 namespace {
@@ -24,7 +25,7 @@ constexpr uint32_t kStateAliveWithoutAnswer = 4;
 bool Diag_FTM::OpenPort(const OpenArguments& arguments) {
   last_open_ = arguments;
   GiveBackPort();
-  return Open(arguments);
+  return Open(arguments) || Fail(PortFailure(*this));
 }
 
 bool Diag_FTM::Open(const OpenArguments& arguments) {
@@ -125,7 +126,7 @@ bool Diag_FTM::IsPhoneConnected() {
   if (null_port_) return true;
   if (!IsPortOpen()) {
     clock_.SleepMs(1);
-    return false;
+    return Fail(PortFailure(*this));
   }
   switch (target_type()) {
     case kTargetApplication:
@@ -147,8 +148,11 @@ bool Diag_FTM::IsDiagServiceAlive() {
                   kDiagServicePing[0], kDiagServicePing[1]);
   if (!Send(ping, TimeOut(kTimeOutLiveness))) return false;
   const auto reply = ping.response();
-  return reply.size() > kDiagServicePing.size() &&
-         std::equal(kDiagServicePing.begin(), kDiagServicePing.end(), reply.begin());
+  if (reply.size() > kDiagServicePing.size() &&
+      std::equal(kDiagServicePing.begin(), kDiagServicePing.end(), reply.begin())) {
+    return true;
+  }
+  return Fail(BadReply(*this, "is not a diagnostic service's"));
 }
 
 bool Diag_FTM::IsLoopbackAnswered() {
@@ -160,7 +164,8 @@ bool Diag_FTM::IsLoopbackAnswered() {
   if (!Send(loopback, TimeOut(kTimeOutLiveness))) {
     return !server_mode() && transport().QueryState(kStateAliveWithoutAnswer) == 1 && transport().connected();
   }
-  if (loopback.response_length() != loopback.request_length()) return false;
+  if (loopback.response_length() != loopback.request_length())
+    return Fail(BadReply(*this, "does not repeat the loopback"));
   // Each comparison overwrites the one before: only the last, of the reply's third byte, decides. Kept, because
   // handsets that garble the rest of the loopback are in use.
   bool matches = false;
@@ -168,7 +173,7 @@ bool Diag_FTM::IsLoopbackAnswered() {
     uint8_t value = 0;
     matches = loopback.Read8(value) && value == expected;
   }
-  return matches;
+  return matches || Fail(BadReply(*this, "does not repeat the loopback"));
 }
 
 bool Diag_FTM::IsVersionAnswered() {
@@ -176,7 +181,8 @@ bool Diag_FTM::IsVersionAnswered() {
   version.Reset();
   version.Append8(kVersionRequest);
   log().WriteLine(kLogRet, "KRAL_IsPhoneConnected() -- pinging phone with version command, 0x%X", kVersionRequest);
-  return Send(version, TimeOut(kTimeOutLiveness)) && version.response_length() > 1;
+  if (!Send(version, TimeOut(kTimeOutLiveness))) return false;
+  return version.response_length() > 1 || Fail(BadReply(*this, "has no content"));
 }
 
 }  // namespace kral

@@ -1,49 +1,126 @@
-// What every exported function is made of: the log line, handle resolution, the per-handset lock, the no-exception
-// rule.
+// What every exported function is made of: the log line, the handle (resolved once), the per-handset lock, the record
+// of a failure, the no-exception rule.
+//
+//   return ExportCall(handle, __func__).Run(diag::ReadSerialNumber, serial);
+//   return ExportCall(handle, __func__).Logged("( iChannel = %d )", channel).Run(ftm::SetChannel, channel);
+//
+// The line is written when the operation is run, before the lock is waited for. Every form gives 0, or what stands for
+// it, for an unknown handle and after an exception; outputs are then untouched.
 #ifndef KRAL_FRAME_EXPORT_CALL_H
 #define KRAL_FRAME_EXPORT_CALL_H
 
 #include <cstdint>
+#include <functional>
+#include <memory>
 #include <mutex>
 #include <utility>
 
+#include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/types.h"
 
 namespace kral {
 
-// The bare name of an exported function, written whenever the active mask has flag 512.
-void LogName(KRAL_HANDLE handle, const char* name) noexcept;
+class ExportCall {
+ public:
+  // A function without a handle: its failures are found under handle 0, and nothing is logged.
+  explicit ExportCall(const char* function) noexcept;
+  ExportCall(KRAL_HANDLE handle, const char* function) noexcept;
+  ~ExportCall();
+  ExportCall(const ExportCall&) = delete;
+  ExportCall& operator=(const ExportCall&) = delete;
 
-// A formatted line with flag 512; only while logging is started.
-[[gnu::format(gnu_printf, 2, 3)]] void LogFormatted(KRAL_HANDLE handle, const char* format, ...) noexcept;
+  // The line shows another name than the function's own.
+  ExportCall& Named(const char* name) noexcept;
+  // The line goes on behind the name; written only while logging is started.
+  [[gnu::format(gnu_printf, 2, 3)]] ExportCall& Logged(const char* format, ...) noexcept;
+  // No line: what follows writes its own, or none.
+  ExportCall& Unlogged() noexcept;
 
-// Runs operation(phone, arguments...) under the request lock of the handset. 0 for an unknown handle and after an
-// exception; outputs are then untouched.
-template <class Operation, class... Arguments>
-uint8_t OnPhone(KRAL_HANDLE handle, Operation&& operation, Arguments&&... arguments) noexcept {
-  try {
-    const auto phone = Kral_ResourceManager::GetPhone(handle);
-    if (!phone) return 0;
-    const std::lock_guard lock(phone->request_lock());
-    return operation(*phone, std::forward<Arguments>(arguments)...) ? 1 : 0;
-  } catch (...) {
-    return 0;
+  // Runs operation(phone, arguments...) under the request lock of the handset: 1 when it gives true.
+  template <class Operation, class... Arguments>
+  uint8_t Run(Operation&& operation, Arguments&&... arguments) {
+    return Result(uint8_t{0}, uint8_t{0}, uint8_t{1}, [&](Diag_FTM& phone) -> uint8_t {
+      const std::lock_guard lock(phone.request_lock());
+      return std::invoke(operation, phone, std::forward<Arguments>(arguments)...) ? 1 : 0;
+    });
   }
-}
 
-// The same without the request lock: abort, text-log, queue and time-out calls must not wait for a running request.
-template <class Operation, class... Arguments>
-uint8_t OnPhoneAtOnce(KRAL_HANDLE handle, Operation&& operation, Arguments&&... arguments) noexcept {
-  try {
-    const auto phone = Kral_ResourceManager::GetPhone(handle);
-    if (!phone) return 0;
-    return operation(*phone, std::forward<Arguments>(arguments)...) ? 1 : 0;
-  } catch (...) {
-    return 0;
+  // The same without the request lock: abort, text-log, queue and time-out calls must not wait for a running request.
+  template <class Operation, class... Arguments>
+  uint8_t RunAtOnce(Operation&& operation, Arguments&&... arguments) {
+    return Result(uint8_t{0}, uint8_t{0}, uint8_t{1}, [&](Diag_FTM& phone) -> uint8_t {
+      return std::invoke(operation, phone, std::forward<Arguments>(arguments)...) ? 1 : 0;
+    });
   }
-}
+
+  // operation(phone) gives a result of its own, without the request lock. Anything but `passed` is recorded as a
+  // failure.
+  template <class Value, class Operation>
+  Value Result(Value unknown_handle, Value threw, Value passed, Operation&& operation) {
+    if (!Begin()) return unknown_handle;
+    return Judged(threw, passed, [&] { return operation(*phone_); });
+  }
+
+  // The same without a phone object: for a function without a handle, or one that has a use for a handle without one.
+  template <class Value, class Operation>
+  Value Alone(Value failed, Value passed, Operation&& operation) {
+    WriteName();
+    if (!IsPermitted()) return failed;
+    return Judged(failed, passed, std::forward<Operation>(operation));
+  }
+
+  // For the connect functions: operation() gives a handle, and 0 is a failure.
+  template <class Operation>
+  KRAL_HANDLE Connecting(Operation&& operation) {
+    KRAL_HANDLE handle = 0;
+    Alone(false, true, [&] {
+      handle = operation();
+      return handle != 0;
+    });
+    return handle;
+  }
+
+  // A result of 0 is an answer: recorded only with a failure that was noted.
+  ExportCall& Answering() noexcept;
+
+  // Unless it holds, nothing is done but the line: the failure is an argument's, "there is no response buffer".
+  ExportCall& Require(bool holds, const char* otherwise) noexcept;
+
+  // Null for an unknown handle.
+  const std::shared_ptr<Diag_FTM>& phone() const { return phone_; }
+
+ private:
+  template <class Value, class Operation>
+  Value Judged(Value failed, Value passed, Operation&& operation) {
+    try {
+      const Value value = operation();
+      if (value != passed) Failed();
+      return value;
+    } catch (...) {
+      Threw();
+      return failed;
+    }
+  }
+
+  void WriteName() noexcept;
+  bool Begin() noexcept;        // the line; false, with the failure recorded, when nothing is to be done
+  bool IsPermitted() noexcept;  // by what was required
+  void Failed() noexcept;       // records what was noted
+  void Threw() noexcept;
+
+  const KRAL_HANDLE handle_;
+  const char* const function_;
+  const char* name_;
+  bool has_line_ = true;
+  bool answering_ = false;
+  const char* otherwise_ = nullptr;  // what was required and does not hold
+  std::shared_ptr<Diag_FTM> phone_;
+  CallFailure failure_;
+};
+
+Failure UnknownHandle(KRAL_HANDLE handle);
 
 }  // namespace kral
 

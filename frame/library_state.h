@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "frame/last_error.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
 #include "platform/named_mutex.h"
@@ -39,6 +40,7 @@ struct LibraryState {
   std::atomic<bool> server_mode{false};
   std::atomic<uint8_t> target_type{0};
   std::atomic<ReceiveMode> default_receive_mode{ReceiveMode::kAsWritten};
+  LastErrors last_errors;
 
   // Guards everything below, for the length of a scan: never held while a port is opened, an object is built or
   // destroyed, or a callback runs.

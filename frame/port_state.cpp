@@ -40,12 +40,12 @@ int32_t PortState(Diag_FTM& phone) {
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state) {
-  kral::LogName(handle, "KRAL_GetPortState");
-  return kral::OnPhone(handle, [state](kral::Diag_FTM& phone) {
-    if (state == nullptr) return false;
-    *state = kral::PortState(phone);
-    return true;
-  });
+  return kral::ExportCall(handle, __func__)
+      .Require(state != nullptr, "there is no room for the state")
+      .Run([state](kral::Diag_FTM& phone) {
+        *state = kral::PortState(phone);
+        return true;
+      });
 }
 
 }  // extern "C"

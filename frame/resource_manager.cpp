@@ -7,6 +7,7 @@
 #include <string>
 #include <utility>
 
+#include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/library_state.h"
 
@@ -50,7 +51,10 @@ KRAL_HANDLE CreateContext(uint16_t port) {
   if (port == kAnyPort) {
     std::array<uint16_t, 1> found = {kAnyPort};
     uint16_t count = 0;
-    if (!AvailablePhonePorts(found, count, {}) || count == 0 || found[0] == kAnyPort) return 0;
+    if (!AvailablePhonePorts(found, count, {}) || count == 0 || found[0] == kAnyPort) {
+      Fail(Failure(KRAL_ERROR_NO_PORT, "no handset answers on any port"));
+      return 0;
+    }
     port = found[0];
   }
   auto& library = Library();
@@ -63,11 +67,19 @@ KRAL_HANDLE CreateContext(uint16_t port) {
     return shared->handle;
   }
   const auto free = std::find_if(rows.begin(), rows.end(), [](const Context& row) { return !row.in_use; });
-  if (free == rows.end()) return 0;
+  if (free == rows.end()) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%zu connections are in use, and there can be no more", rows.size()));
+    return 0;
+  }
   const std::string name =
       "Kral_ResourceManager::CreateContext() - #" + std::to_string(static_cast<int32_t>(library.context_counter++));
   auto mutex = library.mutex_maker(name);
-  if (!mutex) return 0;
+  if (!mutex) {
+    Fail(Failure(KRAL_ERROR_INTERNAL, "no named mutex for the connection could be made"));
+    return 0;
+  }
+  // On Windows the value may have been another connection's.
+  library.last_errors.Forget(mutex->value());
   free->in_use = true;
   free->handle = mutex->value();
   free->port = port;

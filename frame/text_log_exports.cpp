@@ -11,9 +11,7 @@
 namespace {
 
 using kral::Diag_FTM;
-using kral::LogFormatted;
-using kral::LogName;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
 
 bool StartLog(Diag_FTM& phone, const char* file_name) {
   phone.log().Start(file_name);
@@ -48,7 +46,6 @@ const char* AsynchronousKind(uint8_t code) {
 
 bool AddAsynchronous(Diag_FTM& phone, uint32_t flag, std::span<const uint8_t> message, bool with_code,
                      bool with_bytes) {
-  if (message.empty()) return false;
   if (!phone.log().Wants(flag)) return true;
   const std::string code = with_code ? std::to_string(message[0]).insert(0, 1, ' ') : "";
   const std::string bytes = with_bytes ? kral::HexDump(message).insert(0, ": ") : "";
@@ -62,44 +59,49 @@ bool AddAsynchronous(Diag_FTM& phone, uint32_t flag, std::span<const uint8_t> me
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_StartLogging(KRAL_HANDLE handle, const char* file_name) {
-  LogName(handle, "KRAL_StartLogging");
-  return file_name == nullptr ? 0 : OnPhoneAtOnce(handle, StartLog, file_name);
+  return ExportCall(handle, __func__)
+      .Require(file_name != nullptr, "there is no file name")
+      .RunAtOnce(StartLog, file_name);
 }
 
 uint8_t KRAL_CALL KRAL_StopLogging(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_StopLogging");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).RunAtOnce([](Diag_FTM& phone) {
     phone.log().Stop();
     return true;
   });
 }
 
 uint8_t KRAL_CALL KRAL_IsLoggingStarted(KRAL_HANDLE handle) {
-  LogName(handle, "KRAL_IsLoggingStarted");
-  return OnPhoneAtOnce(handle, [](Diag_FTM& phone) { return phone.log().started_result(); });
+  return ExportCall(handle, __func__).Answering().RunAtOnce([](Diag_FTM& phone) {
+    return phone.log().started_result();
+  });
 }
 
 uint8_t KRAL_CALL KRAL_SetLogFlags(KRAL_HANDLE handle, uint32_t mask) {
-  LogFormatted(handle, "KRAL_SetLogFlags( uiLogFlags = 0x%X )", mask);
-  return OnPhoneAtOnce(handle, [mask](Diag_FTM& phone) {
+  return ExportCall(handle, __func__).Logged("( uiLogFlags = 0x%X )", mask).RunAtOnce([mask](Diag_FTM& phone) {
     phone.log().SetFlags(mask);
     return true;
   });
 }
 
 uint8_t KRAL_CALL KRAL_AddUserMessageToTextLog(KRAL_HANDLE handle, uint32_t flag, const char* text, uint8_t echo) {
-  return text == nullptr ? 0 : OnPhoneAtOnce(handle, AddMessage, flag, text, echo == 1);
+  return ExportCall(handle, __func__)
+      .Unlogged()
+      .Require(text != nullptr, "there is no text")
+      .RunAtOnce(AddMessage, flag, text, echo == 1);
 }
 
 uint8_t KRAL_CALL KRAL_AddUserAsyncLogMessageToTextLog(KRAL_HANDLE handle, uint32_t flag, const uint8_t* message,
                                                        uint16_t size, uint8_t with_code, uint8_t with_bytes) {
   const size_t length = message == nullptr ? 0 : size;
-  return OnPhoneAtOnce(handle, AddAsynchronous, flag, std::span(message, length), with_code == 1, with_bytes == 1);
+  return ExportCall(handle, __func__)
+      .Unlogged()
+      .Require(length != 0, "there is no message")
+      .RunAtOnce(AddAsynchronous, flag, std::span(message, length), with_code == 1, with_bytes == 1);
 }
 
 void KRAL_CALL KRAL_ConfigureLibraryTextLogCallBack(KRAL_HANDLE handle, KRAL_TEXT_LOG_CALLBACK callback) {
-  LogName(handle, "KRAL_ConfigureLibraryTextLogCallBack");
-  OnPhoneAtOnce(handle, [=](Diag_FTM& phone) {
+  ExportCall(handle, __func__).RunAtOnce([=](Diag_FTM& phone) {
     phone.log().SetCallback(callback, handle);
     return true;
   });

@@ -11,11 +11,16 @@ bool IsOfPhone(uint32_t id) {
   return id < kral::kTimeOutCount;
 }
 
+bool BadId(uint32_t id) {
+  return kral::Fail(kral::Failure(KRAL_ERROR_ARGUMENT, "the time-out id %u is not one of 0 to 20", id));
+}
+
 bool Configure(kral::Diag_FTM& phone, uint32_t id, int32_t milliseconds) {
   if (IsOfPhone(id)) return phone.ConfigureTimeOut(id, milliseconds);
-  if (id != kral::kTimeOutSoftwareDownload) return false;
+  if (id != kral::kTimeOutSoftwareDownload) return BadId(id);
   const auto download = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
-  return download && download->ConfigureTimeOut(id, milliseconds);
+  if (download && download->ConfigureTimeOut(id, milliseconds)) return true;
+  return kral::Fail(kral::Failure(KRAL_ERROR_ARGUMENT, "time-out %u is the phone server's, and there is none", id));
 }
 
 int32_t Get(kral::Diag_FTM& phone, uint32_t id) {
@@ -30,17 +35,16 @@ int32_t Get(kral::Diag_FTM& phone, uint32_t id) {
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_ConfigureTimeOut(KRAL_HANDLE handle, uint32_t id, int32_t milliseconds) {
-  kral::LogFormatted(handle, "KRAL_ConfigureTimeOut( eTimeOutId = %d, iNewValue_ms = %d )", static_cast<int>(id),
-                     milliseconds);
-  return kral::OnPhoneAtOnce(handle, Configure, id, milliseconds);
+  return kral::ExportCall(handle, __func__)
+      .Logged("( eTimeOutId = %d, iNewValue_ms = %d )", static_cast<int>(id), milliseconds)
+      .RunAtOnce(Configure, id, milliseconds);
 }
 
 int32_t KRAL_CALL KRAL_GetTimeOut(KRAL_HANDLE handle, uint32_t id) {
-  kral::LogName(handle, "KRAL_GetTimeOut");
   int32_t milliseconds = 0;
-  kral::OnPhoneAtOnce(handle, [&](kral::Diag_FTM& phone) {
+  kral::ExportCall(handle, __func__).RunAtOnce([&](kral::Diag_FTM& phone) {
     milliseconds = Get(phone, id);
-    return true;
+    return IsOfPhone(id) || id == kral::kTimeOutSoftwareDownload || BadId(id);
   });
   return milliseconds;
 }

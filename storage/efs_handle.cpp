@@ -1,6 +1,7 @@
 // Opens and closes files and directories of the handset, also where answers get lost or come late.
 #include "storage/efs_handle.h"
 
+#include "frame/base/failure.h"
 #include "frame/base/text_argument.h"
 #include "storage/efs_request.h"
 #include "storage/efs_strays.h"
@@ -20,17 +21,17 @@ bool RemoteHandle::OpenWithRequest() {
   u32 unanswered = 0;
   for (int attempt = 0; attempt < kTries && !open_; ++attempt) {
     if (attempt > 0 && phone_.efs().abort) break;
-    const Answer answer = ExchangeOnce(phone_, time_out_ms_);
+    const Reply reply = ExchangeOnce(phone_, time_out_ms_);
     std::optional<Opened> opened;
-    if (answer == Answer::kOwn) opened = ReadOpened(phone_.packet().response());
+    if (reply) opened = ReadOpened(phone_.packet().response());
     if (opened && opened->error == kDone) {
       value_ = opened->value;
       handles_.in_use = value_;
       open_ = true;
     } else if (opened) {
       phone_.log().WriteLine(kLogErr, "EFS Open error code %u", opened->error);
-    } else if (answer == Answer::kNone || answer == Answer::kOwn) {
-      // It may have opened another handle all the same.
+    } else if (reply.refusal() == 0 && !reply.not_sent()) {
+      // It may have opened a handle all the same, also where the port was slow to take the request.
       ++unanswered;
       ++handles_.unanswered;
     }
@@ -46,6 +47,7 @@ bool RemoteHandle::Close() {
   if (!open_) return true;
   open_ = false;
   handles_.in_use.reset();
+  const KeepFailure keep;
   const bool closed = CloseHandle(phone_, close_, value_, time_out_ms_);
   CloseStrays(phone_);
   return closed;

@@ -2,7 +2,6 @@
 #ifndef KRAL_STORAGE_EFS_REQUEST_H
 #define KRAL_STORAGE_EFS_REQUEST_H
 
-#include <functional>
 #include <initializer_list>
 #include <optional>
 #include <string>
@@ -18,30 +17,21 @@ Path PathField(const char* path);
 // The terminated text at an offset of a reply; nothing when it has no end within what was received.
 std::optional<std::string> TextAt(std::span<const u8> reply, size_t offset);
 
-using ReplyTest = std::function<bool(std::span<const u8> reply)>;
-
-enum class Answer {
-  kOwn,
-  kRefused,  // with 19, 20, 21 or 24: not carried out
-  kNone,     // in time: it may have been carried out
-  kNotSent,
-};
-
 inline constexpr size_t kSidePacket = 1;  // for requests that leave the default packet buffer alone
 
 // Sends a buffer's request once. A reply that repeats another header, or is not `is_own`, answers an earlier request
 // that was given up: the right one is waited for behind it, for the rest of the time-out, so that one late answer does
 // not put every later one off by one.
-Answer ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own = {});
+Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own = {});
 
 // All of these act on the request in the phone's default packet buffer, where the reply is found afterwards.
 
 // False (logged) when a request with a path is longer than the handset takes.
 bool IsWithinLimit(Diag_FTM& phone);
 // Sends once; handles that late replies tell of are closed besides.
-Answer ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
+Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
 inline bool Exchange(Diag_FTM& phone, u32 time_out_ms) {
-  return ExchangeOnce(phone, time_out_ms) == Answer::kOwn;
+  return static_cast<bool>(ExchangeOnce(phone, time_out_ms));
 }
 // Sends until a reply of its own is accepted, at most five times and not after an abort. Each try opens a port that an
 // earlier one's time-out has closed.
@@ -55,7 +45,6 @@ bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields);
 
 // The code by which the handset refused the last try (19, 20, 21, 24); 0 when it did not.
 u8 LastRefusal(Diag_FTM& phone);
-inline constexpr u8 kBadCommand = 19;
 
 inline u32 DefaultTimeOut(const Diag_FTM& phone) {
   return phone.TimeOut(kTimeOutDefaultCommand);

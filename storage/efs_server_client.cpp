@@ -1,8 +1,8 @@
 // Jobs that the phone server does: removing trees and file-system images. In direct mode they are refused.
 #include "storage/efs_server_client.h"
 
+#include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
-#include "frame/export_call.h"
 #include "frame/orbt_server.h"
 
 namespace kral {
@@ -92,14 +92,12 @@ namespace efs {
 namespace {
 
 template <class Job>
-bool OnServer(KRAL_HANDLE handle, const Job& job) {
-  return OnPhone(handle, [&](Diag_FTM& phone) {
-           const auto efs = Kral_ResourceManager::GetFamily<EFS>(
-               handle, FamilySlot::kEfs, [](Diag_FTM&, KRAL_HANDLE) { return std::make_shared<EFS>(); });
-           if (efs) return job(*efs, phone);
-           phone.log().WriteLine(kLogErr, "EFS::EfsStarter - Not connected to Server");
-           return false;
-         }) != 0;
+bool OnServer(Diag_FTM& phone, const Job& job) {
+  const auto efs = Kral_ResourceManager::GetFamily<EFS>(phone.handle(), FamilySlot::kEfs,
+                                                        [](Diag_FTM&, KRAL_HANDLE) { return std::make_shared<EFS>(); });
+  if (efs) return job(*efs) || Fail(Failure(KRAL_ERROR_REFUSED, "the phone server did not carry the job out"));
+  phone.log().WriteLine(kLogErr, "EFS::EfsStarter - Not connected to Server");
+  return Fail(Failure(KRAL_ERROR_ARGUMENT, "only a phone server can do this, and the connection has none"));
 }
 
 std::string Text(const char* text) {
@@ -108,15 +106,12 @@ std::string Text(const char* text) {
 
 }  // namespace
 
-bool RemoveTree(KRAL_HANDLE handle, const char* folder) {
-  return OnServer(handle,
-                  [&](EFS& efs, Diag_FTM& phone) { return efs.EfsRmDir(phone.log(), phone.port(), Text(folder)); });
+bool RemoveTree(Diag_FTM& phone, const char* folder) {
+  return OnServer(phone, [&](EFS& efs) { return efs.EfsRmDir(phone.log(), phone.port(), Text(folder)); });
 }
 
-bool RunImageJob(KRAL_HANDLE handle, EfsImageJob job, const char* image_file) {
-  return OnServer(handle, [&](EFS& efs, Diag_FTM& phone) {
-    return efs.CreateCEFS(phone.log(), phone.port(), job, Text(image_file));
-  });
+bool RunImageJob(Diag_FTM& phone, EfsImageJob job, const char* image_file) {
+  return OnServer(phone, [&](EFS& efs) { return efs.CreateCEFS(phone.log(), phone.port(), job, Text(image_file)); });
 }
 
 }  // namespace efs

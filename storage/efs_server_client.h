@@ -13,6 +13,7 @@
 namespace kral {
 
 class DataLogFileHandler;
+class Diag_FTM;
 
 class EFS final : public FamilyObject {
  public:
@@ -36,8 +37,8 @@ class EFS final : public FamilyObject {
 namespace efs {
 
 // Null arguments are empty names. 0 in direct mode, where there is no server.
-bool RemoveTree(KRAL_HANDLE handle, const char* folder);
-bool RunImageJob(KRAL_HANDLE handle, EfsImageJob job, const char* image_file);
+bool RemoveTree(Diag_FTM& phone, const char* folder);
+bool RunImageJob(Diag_FTM& phone, EfsImageJob job, const char* image_file);
 
 }  // namespace efs
 }  // namespace kral

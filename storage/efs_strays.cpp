@@ -5,6 +5,7 @@
 #include <chrono>
 #include <utility>
 
+#include "frame/base/failure.h"
 #include "storage/efs_request.h"
 
 namespace kral::efs {
@@ -78,6 +79,7 @@ void CloseStrays(Diag_FTM& phone) {
   for (const Kind& kind : kKinds) {
     for (const u32 value : std::exchange((phone.efs().*kind.handles).strays, {})) {
       phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
+      const KeepFailure keep;
       CloseHandle(phone, kind.close, value, DefaultTimeOut(phone));
     }
   }
@@ -93,7 +95,7 @@ bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 t
   bool unanswered = false;
   for (int attempt = 0; attempt < kTries; ++attempt) {
     u32 error = 0;
-    if (ExchangePacket(phone, packet, time_out_ms) != Answer::kOwn || !packet.ResponseAt32(kErrorBehindHeader, error)) {
+    if (!ExchangePacket(phone, packet, time_out_ms) || !packet.ResponseAt32(kErrorBehindHeader, error)) {
       unanswered = true;
       continue;
     }

@@ -15,7 +15,7 @@ enum class Told { kState, kNothing, kFailure };
 Told AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, const char* path, u32& state) {
   u32 error = 0;
   const bool answered = Ask(phone, row, PathField(path)) && phone.packet().ResponseAt32(kErrorBehindHeader, error);
-  if (!answered && LastRefusal(phone) == kBadCommand) {
+  if (!answered && LastRefusal(phone) == refusal::kCommand) {
     phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait::%s is not supported by target", name);
     return Told::kFailure;
   }

@@ -35,10 +35,36 @@ constexpr std::array kTexts = {
 };
 static_assert(kTexts.size() == static_cast<uint32_t>(NvError::kCannotWriteFileItem) + 1);
 
+uint32_t ClassOf(NvError error) {
+  switch (error) {
+    case NvError::kIndexOutOfBound:
+    case NvError::kNotDefined:
+    case NvError::kNoValue:
+    case NvError::kCannotSetValue:
+    case NvError::kCannotGetValue:
+      return KRAL_ERROR_ARGUMENT;
+    case NvError::kNoConnection:
+      return KRAL_ERROR_NO_ANSWER;
+    case NvError::kCannotReadFileItem:
+    case NvError::kCannotWriteFileItem:
+      return KRAL_ERROR_REFUSED;
+    case NvError::kNoXmlParser:
+    case NvError::kUnknown:
+      return KRAL_ERROR_INTERNAL;
+    default:
+      return KRAL_ERROR_BAD_FILE;
+  }
+}
+
 }  // namespace
 
 const char* TextOf(uint32_t code) {
   return code < kTexts.size() ? kTexts[code] : "UNKNOWN";
+}
+
+Failure ToolFailure(NvError error) {
+  const auto code = static_cast<uint32_t>(error);
+  return Failure(ClassOf(error), "NV tool: %s", TextOf(code)).Status(KRAL_ERROR_STATUS_RESULT, code);
 }
 
 }  // namespace kral::nv

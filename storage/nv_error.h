@@ -4,6 +4,7 @@
 
 #include <cstdint>
 
+#include "frame/base/failure.h"
 #include "kral/nv_tool.h"
 
 namespace kral::nv {
@@ -37,6 +38,9 @@ enum class NvError : uint32_t {
 };
 
 const char* TextOf(uint32_t code);
+
+// The failure of which only the code is known.
+Failure ToolFailure(NvError error);
 
 }  // namespace kral::nv
 

@@ -17,21 +17,21 @@ inline std::shared_ptr<FamilyObject> MakeTool(Diag_FTM&, KRAL_HANDLE handle) {
   return std::make_shared<NVTool_Manager>(handle);
 }
 
-// Runs operation(tool, phone) under the request lock of the handset.
+// Runs operation(tool, phone) under the request lock of the handset. Where nobody said more, the error code is the
+// failure.
 template <class Operation>
-uint32_t OnTool(KRAL_HANDLE handle, const char* name, Operation&& operation) noexcept {
-  LogName(handle, name);
-  NvError error = NvError::kNoConnection;
-  try {
-    const auto phone = Kral_ResourceManager::GetPhone(handle);
-    const auto tool = Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, FamilySlot::kNvManager, MakeTool);
-    if (phone && tool) {
-      const std::lock_guard lock(phone->request_lock());
-      error = tool->is_moving() ? NvError::kUnknown : operation(*tool, *phone);
-    }
-  } catch (...) {
-    error = NvError::kUnknown;
-  }
+uint32_t OnTool(KRAL_HANDLE handle, const char* function, Operation&& operation) {
+  const NvError error =
+      ExportCall(handle, function)
+          .Result(NvError::kNoConnection, NvError::kUnknown, NvError::kNone, [&](Diag_FTM& phone) {
+            const auto tool = Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, FamilySlot::kNvManager, MakeTool);
+            const std::lock_guard lock(phone.request_lock());
+            const NvError told = !tool               ? NvError::kNoConnection
+                                 : tool->is_moving() ? NvError::kUnknown
+                                                     : operation(*tool, phone);
+            if (told != NvError::kNone && !IsFailureNoted()) Fail(ToolFailure(told));
+            return told;
+          });
   return static_cast<uint32_t>(error);
 }
 

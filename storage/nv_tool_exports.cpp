@@ -120,166 +120,165 @@ uint32_t ClearValue(KRAL_HANDLE handle, const char* name, Key key) {
 extern "C" {
 
 uint32_t KRAL_CALL KRAL_NV_GetErrorText(KRAL_HANDLE handle, uint32_t code, char* text, uint32_t size) {
-  kral::LogName(handle, "KRAL_NV_GetErrorText");
-  return static_cast<uint32_t>(Give(TextOf(code), text, size));
+  return static_cast<uint32_t>(kral::ExportCall(handle, __func__).Alone(NvError::kUnknown, NvError::kNone, [&] {
+    return Give(TextOf(code), text, size);
+  }));
 }
 
 uint32_t KRAL_CALL KRAL_NV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_NV_CALLBACK callback) {
-  return OnToolAlways(handle, "KRAL_NV_ConfigureCallBack",
-                      [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetCallback(callback); });
+  return OnToolAlways(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetCallback(callback); });
 }
 
 // --- Definitions -----------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVDefinitionFile(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_LoadNVDefinitionFile", [&](NVTool_Manager& tool, Diag_FTM& phone) {
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM& phone) {
     return tool.LoadDefinitions(phone, TextOrEmpty(file), NvDefinitionKind::kDefinitions);
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVDataTypeDictinary(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_LoadNVDataTypeDictinary", [&](NVTool_Manager& tool, Diag_FTM& phone) {
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM& phone) {
     return tool.LoadDefinitions(phone, TextOrEmpty(file), NvDefinitionKind::kDictionary);
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearNVDefinition(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearNVDefinition",
-                      [](NVTool_Manager& tool, Diag_FTM&) { tool.ClearDefinitions(); });
+  return OnToolAlways(handle, __func__, [](NVTool_Manager& tool, Diag_FTM&) { tool.ClearDefinitions(); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNumOfNVDefinition(KRAL_HANDLE handle, uint32_t* count) {
-  return OnToolAlways(handle, "KRAL_NV_GetNumOfNVDefinition", [&](NVTool_Manager& tool, Diag_FTM&) {
+  return OnToolAlways(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) {
     Put(count, static_cast<uint32_t>(tool.definitions().numbered_count()));
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNumOfNVEfsDefinition(KRAL_HANDLE handle, uint32_t* count) {
-  return OnToolAlways(handle, "KRAL_NV_GetNumOfNVEfsDefinition", [&](NVTool_Manager& tool, Diag_FTM&) {
+  return OnToolAlways(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) {
     Put(count, static_cast<uint32_t>(tool.definitions().file_count()));
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionByIndex(KRAL_HANDLE handle, uint32_t index, char* text, uint32_t size) {
-  return GiveDefinition(handle, "KRAL_NV_GetNVDefinitionByIndex", AtIndex{index}, Buffer{text, size});
+  return GiveDefinition(handle, __func__, AtIndex{index}, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionByIndexStringLength(KRAL_HANDLE handle, uint32_t index, uint32_t* length) {
-  return GiveDefinition(handle, "KRAL_NV_GetNVDefinitionByIndexStringLength", AtIndex{index}, Length{length});
+  return GiveDefinition(handle, __func__, AtIndex{index}, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionByEfsFilename(KRAL_HANDLE handle, const char* efs_file, char* text,
                                                         uint32_t size) {
-  return GiveDefinition(handle, "KRAL_NV_GetNVDefinitionByEfsFilename", efs_file, Buffer{text, size});
+  return GiveDefinition(handle, __func__, efs_file, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionByEfsFilenameStringLength(KRAL_HANDLE handle, const char* efs_file,
                                                                     uint32_t* length) {
-  return GiveDefinition(handle, "KRAL_NV_GetNVDefinitionByEfsFilenameStringLength", efs_file, Length{length});
+  return GiveDefinition(handle, __func__, efs_file, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionFieldNames(KRAL_HANDLE handle, uint32_t index, char* text, uint32_t size) {
-  return GiveFieldNames(handle, "KRAL_NV_GetNVDefinitionFieldNames", index, Buffer{text, size});
+  return GiveFieldNames(handle, __func__, index, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDefinitionFieldNamesStringLength(KRAL_HANDLE handle, uint32_t index, uint32_t* length) {
-  return GiveFieldNames(handle, "KRAL_NV_GetNVDefinitionFieldNamesStringLength", index, Length{length});
+  return GiveFieldNames(handle, __func__, index, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDataTypeDefinition(KRAL_HANDLE handle, const char* type_name, char* text,
                                                    uint32_t size) {
-  return GiveType(handle, "KRAL_NV_GetNVDataTypeDefinition", type_name, Buffer{text, size});
+  return GiveType(handle, __func__, type_name, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVDataTypeDefinitionStringLength(KRAL_HANDLE handle, const char* type_name,
                                                                uint32_t* length) {
-  return GiveType(handle, "KRAL_NV_GetNVDataTypeDefinitionStringLength", type_name, Length{length});
+  return GiveType(handle, __func__, type_name, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenames(KRAL_HANDLE handle, char* text, uint32_t size) {
-  return GiveFileNames(handle, "KRAL_NV_GetNVEfsFilenames", Buffer{text, size});
+  return GiveFileNames(handle, __func__, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenamesStringLength(KRAL_HANDLE handle, uint32_t* length) {
-  return GiveFileNames(handle, "KRAL_NV_GetNVEfsFilenamesStringLength", Length{length});
+  return GiveFileNames(handle, __func__, Length{length});
 }
 
 // --- Values ----------------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                        uint8_t* data, uint32_t* size) {
-  return GetBytes(handle, "KRAL_NV_GetNVValueByteStreamByIndex", AtIndex{index}, array_index, data, size);
+  return GetBytes(handle, __func__, AtIndex{index}, array_index, data, size);
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                       uint8_t* data, uint32_t* size) {
-  return GetBytes(handle, "KRAL_NV_GetNVValueByteStreamByNVID", item, array_index, data, size);
+  return GetBytes(handle, __func__, item, array_index, data, size);
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                        const uint8_t* data, uint32_t size) {
-  return SetBytes(handle, "KRAL_NV_SetNVValueByteStreamByIndex", AtIndex{index}, array_index, data, size);
+  return SetBytes(handle, __func__, AtIndex{index}, array_index, data, size);
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                       const uint8_t* data, uint32_t size) {
-  return SetBytes(handle, "KRAL_NV_SetNVValueByteStreamByNVID", item, array_index, data, size);
+  return SetBytes(handle, __func__, item, array_index, data, size);
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index, char* text,
                                                    uint32_t size) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByIndex", AtIndex{index}, array_index, Buffer{text, size});
+  return GiveValue(handle, __func__, AtIndex{index}, array_index, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByIndexStringLength(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                                uint32_t* length) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByIndexStringLength", AtIndex{index}, array_index, Length{length});
+  return GiveValue(handle, __func__, AtIndex{index}, array_index, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index, char* text,
                                                   uint32_t size) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByNVID", item, array_index, Buffer{text, size});
+  return GiveValue(handle, __func__, item, array_index, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByNVIDStringLength(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                               uint32_t* length) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByNVIDStringLength", item, array_index, Length{length});
+  return GiveValue(handle, __func__, item, array_index, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByEfsFilename(KRAL_HANDLE handle, const char* efs_file, char* text,
                                                          uint32_t size) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByEfsFilename", efs_file, 0, Buffer{text, size});
+  return GiveValue(handle, __func__, efs_file, 0, Buffer{text, size});
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByEfsFilenameStringLength(KRAL_HANDLE handle, const char* efs_file,
                                                                      uint32_t* length) {
-  return GiveValue(handle, "KRAL_NV_GetNVValueStringByEfsFilenameStringLength", efs_file, 0, Length{length});
+  return GiveValue(handle, __func__, efs_file, 0, Length{length});
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetNVValueStringByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                    const char* text) {
-  return SetString(handle, "KRAL_NV_SetNVValueStringByIndex", AtIndex{index}, array_index, text);
+  return SetString(handle, __func__, AtIndex{index}, array_index, text);
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetNVValueStringByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                   const char* text) {
-  return SetString(handle, "KRAL_NV_SetNVValueStringByNVID", item, array_index, text);
+  return SetString(handle, __func__, item, array_index, text);
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetNVValueStringByEfsFilename(KRAL_HANDLE handle, const char* efs_file, const char* text) {
-  return SetString(handle, "KRAL_NV_SetNVValueStringByEfsFilename", efs_file, 0, text);
+  return SetString(handle, __func__, efs_file, 0, text);
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearNVValueByIndex(KRAL_HANDLE handle, uint32_t index) {
-  return ClearValue(handle, "KRAL_NV_ClearNVValueByIndex", AtIndex{index});
+  return ClearValue(handle, __func__, AtIndex{index});
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearNVValueByNVID(KRAL_HANDLE handle, uint16_t item) {
-  return ClearValue(handle, "KRAL_NV_ClearNVValueByNVID", item);
+  return ClearValue(handle, __func__, item);
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearNVValues(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearNVValues", [](NVTool_Manager& tool, Diag_FTM&) { tool.ClearValues(); });
+  return OnToolAlways(handle, __func__, [](NVTool_Manager& tool, Diag_FTM&) { tool.ClearValues(); });
 }
 
 }  // extern "C"

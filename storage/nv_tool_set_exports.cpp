@@ -36,35 +36,33 @@ extern "C" {
 // --- Sets ------------------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVsFromMobile(KRAL_HANDLE handle) {
-  return OnTool(handle, "KRAL_NV_LoadNVsFromMobile",
-                [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.LoadFromMobile(phone); });
+  return OnTool(handle, __func__, [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.LoadFromMobile(phone); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVsFromPKV(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadNVsFromPKV", &NVTool_Manager::LoadFromPkv, file);
+  return OnFile(handle, __func__, &NVTool_Manager::LoadFromPkv, file);
 }
 
 uint32_t KRAL_CALL KRAL_NV_LoadNVsFromSource(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadNVsFromSource", &NVTool_Manager::LoadFromSource, file);
+  return OnFile(handle, __func__, &NVTool_Manager::LoadFromSource, file);
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVsToMobile(KRAL_HANDLE handle) {
-  return OnTool(handle, "KRAL_NV_WriteNVsToMobile",
-                [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.WriteToMobile(phone); });
+  return OnTool(handle, __func__, [](NVTool_Manager& tool, Diag_FTM& phone) { return tool.WriteToMobile(phone); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVsToPKV(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_WriteNVsToPKV", &NVTool_Manager::WriteToPkv, file);
+  return OnFile(handle, __func__, &NVTool_Manager::WriteToPkv, file);
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_WriteNVsToSource", &NVTool_Manager::WriteToSource, file);
+  return OnFile(handle, __func__, &NVTool_Manager::WriteToSource, file);
 }
 
 // --- Single items ----------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status) {
-  return OnTool(handle, "KRAL_NV_ReadNVItemFromMobileByNVID", [&](NVTool_Manager& tool, Diag_FTM& phone) {
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM& phone) {
     uint16_t told = 0;
     const NvError error = tool.ReadItem(phone, item, told);
     if (error != NvError::kNoConnection) Put(status, told);
@@ -73,49 +71,47 @@ uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByNVID(KRAL_HANDLE handle, uint16
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByNVID", item, status);
+  return WriteItem(handle, __func__, item, status);
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t* status) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByIndex", AtIndex{index}, status);
+  return WriteItem(handle, __func__, AtIndex{index}, status);
 }
 
 uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
-  return OnTool(handle, "KRAL_NV_ReadNVItemFromMobileByEfsFilename",
+  return OnTool(handle, __func__,
                 [&](NVTool_Manager& tool, Diag_FTM& phone) { return tool.ReadItem(phone, TextOrEmpty(efs_file)); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByEfsFilename(KRAL_HANDLE handle, const char* efs_file) {
-  return WriteItem(handle, "KRAL_NV_WriteNVItemToMobileByEfsFilename", efs_file, nullptr);
+  return WriteItem(handle, __func__, efs_file, nullptr);
 }
 
 // --- Filters ---------------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_LoadReadFilter(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadReadFilter", &NVTool_Manager::LoadReadFilter, file);
+  return OnFile(handle, __func__, &NVTool_Manager::LoadReadFilter, file);
 }
 
 uint32_t KRAL_CALL KRAL_NV_LoadWriteFilter(KRAL_HANDLE handle, const char* file) {
-  return OnFile(handle, "KRAL_NV_LoadWriteFilter", &NVTool_Manager::LoadWriteFilter, file);
+  return OnFile(handle, __func__, &NVTool_Manager::LoadWriteFilter, file);
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearReadFilters(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearReadFilters",
-                      [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearReadFilters(phone); });
+  return OnToolAlways(handle, __func__, [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearReadFilters(phone); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_ClearWriteFilters(KRAL_HANDLE handle) {
-  return OnToolAlways(handle, "KRAL_NV_ClearWriteFilters",
-                      [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearWriteFilters(phone); });
+  return OnToolAlways(handle, __func__, [](NVTool_Manager& tool, Diag_FTM& phone) { tool.ClearWriteFilters(phone); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_CreateNVFilter(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_CreateNVFilter",
+  return OnTool(handle, __func__,
                 [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(TextOrEmpty(file), true); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_CreateComplementNVFilter",
+  return OnTool(handle, __func__,
                 [&](NVTool_Manager& tool, Diag_FTM&) { return tool.CreateFilter(TextOrEmpty(file), false); });
 }
 
@@ -123,31 +119,28 @@ uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle, const ch
 
 uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                     const char* html_file) {
-  return OnTool(handle, "KRAL_NV_PKV_Diff", [&](NVTool_Manager& tool, Diag_FTM& phone) {
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM& phone) {
     return tool.ComparePkv(phone, TextOrEmpty(first_pkv), TextOrEmpty(second_pkv), TextOrEmpty(html_file));
   });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file) {
-  return OnTool(handle, "KRAL_NV_GenerateQDF",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.GenerateQdf(TextOrEmpty(file)); });
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) { return tool.GenerateQdf(TextOrEmpty(file)); });
 }
 
 // --- Subscriptions ---------------------------------------------------------------------------------------------------
 
 uint32_t KRAL_CALL KRAL_NV_SetTargetSupportMultiSIM(KRAL_HANDLE handle, uint8_t supported) {
-  return OnToolAlways(handle, "KRAL_NV_SetTargetSupportMultiSIM",
-                      [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetMultiSim(supported != 0); });
+  return OnToolAlways(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) { tool.SetMultiSim(supported != 0); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_GetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t* subscription) {
-  return OnToolAlways(handle, "KRAL_NV_GetCurrentSubscriptionIndex",
+  return OnToolAlways(handle, __func__,
                       [&](NVTool_Manager& tool, Diag_FTM&) { Put(subscription, tool.subscription()); });
 }
 
 uint32_t KRAL_CALL KRAL_NV_SetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t subscription) {
-  return OnTool(handle, "KRAL_NV_SetCurrentSubscriptionIndex",
-                [&](NVTool_Manager& tool, Diag_FTM&) { return tool.SetSubscription(subscription); });
+  return OnTool(handle, __func__, [&](NVTool_Manager& tool, Diag_FTM&) { return tool.SetSubscription(subscription); });
 }
 
 }  // extern "C"

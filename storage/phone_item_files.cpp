@@ -69,7 +69,7 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vec
   const Answer answer = Status(path.c_str(), mode, size, status);
   if (answer == Answer::kLost) return answer;
   // A handset without a file system, or without this folder.
-  if (answer == Answer::kRefused ? refusal_ == efs::kBadCommand : status == efs::kMissing) return Answer::kAnswered;
+  if (answer == Answer::kRefused ? refusal_ == refusal::kCommand : status == efs::kMissing) return Answer::kAnswered;
   const uint32_t kind = mode & efs::kModeKind;
   if (status == efs::kDone && kind != efs::kFolder) {
     // Listings give entries of kinds that they do not know as folders: item files of some handsets are among them.

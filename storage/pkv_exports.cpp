@@ -8,9 +8,9 @@
 
 namespace pkv = kral::pkv;
 using kral::Diag_FTM;
-using kral::LogName;
-using kral::OnPhone;
-using kral::OnPhoneAtOnce;
+using kral::ExportCall;
+using kral::Fail;
+using kral::Failure;
 using kral::TextOrEmpty;
 
 namespace {
@@ -49,14 +49,12 @@ bool GetCounts(Diag_FTM& phone, KRAL_PKV_COUNTS* counts) {
 
 using ServerJob = bool (kral::SoftwareDownload::*)(const std::string& file, uint32_t options);
 
-uint8_t RunOnServer(KRAL_HANDLE handle, const char* name, ServerJob job, const char* file, uint32_t options) {
-  LogName(handle, name);
-  return OnPhone(handle, [&](Diag_FTM& phone) {
-    const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(handle);
-    if (server && ((*server).*job)(TextOrEmpty(file), options)) return true;
-    phone.log().WriteLine(kral::kLogErr, "%s() - %s", name, server ? "the download agent failed" : "no phone server");
-    return false;
-  });
+bool RunOnServer(Diag_FTM& phone, const char* name, ServerJob job, const char* file, uint32_t options) {
+  const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
+  if (server && ((*server).*job)(TextOrEmpty(file), options)) return true;
+  phone.log().WriteLine(kral::kLogErr, "%s() - %s", name, server ? "the download agent failed" : "no phone server");
+  return server ? Fail(Failure(KRAL_ERROR_REFUSED, "the phone server's download agent failed"))
+                : Fail(Failure(KRAL_ERROR_ARGUMENT, "only a phone server can do this, and the connection has none"));
 }
 
 }  // namespace
@@ -64,42 +62,38 @@ uint8_t RunOnServer(KRAL_HANDLE handle, const char* name, ServerJob job, const c
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_PKV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_PKV_CALLBACK callback) {
-  LogName(handle, "KRAL_PKV_ConfigureCallBack");
-  return OnPhoneAtOnce(handle, SetCallback, callback);
+  return ExportCall(handle, __func__).RunAtOnce(SetCallback, callback);
 }
 
 uint8_t KRAL_CALL KRAL_PKV_ConfigureBackup(KRAL_HANDLE handle, uint16_t first_item, uint16_t last_item,
                                            uint16_t subscriptions) {
-  LogName(handle, "KRAL_PKV_ConfigureBackup");
-  return OnPhone(handle, pkv::ConfigureBackup, first_item, last_item, subscriptions);
+  return ExportCall(handle, __func__).Run(pkv::ConfigureBackup, first_item, last_item, subscriptions);
 }
 
 uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNTS* counts) {
-  LogName(handle, "KRAL_PKV_GetCounts");
-  return OnPhone(handle, GetCounts, counts);
+  return ExportCall(handle, __func__).Run(GetCounts, counts);
 }
 
 uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
-  LogName(handle, "KRAL_NV_BackupNVFromMobile");  // deliberately not the function's own name
-  return OnPhone(handle, Run, pkv::Backup, file, status);
+  // The line deliberately does not show the function's own name.
+  return ExportCall(handle, __func__).Named("KRAL_NV_BackupNVFromMobile").Run(Run, pkv::Backup, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_RestoreNVFromPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
-  LogName(handle, "KRAL_RestoreNVFromPKV");
-  return OnPhone(handle, Run, pkv::Restore, file, status);
+  return ExportCall(handle, __func__).Run(Run, pkv::Restore, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_PKV_Verify(KRAL_HANDLE handle, const char* file, uint32_t* status) {
-  LogName(handle, "KRAL_PKV_Verify");
-  return OnPhone(handle, Run, pkv::Verify, file, status);
+  return ExportCall(handle, __func__).Run(Run, pkv::Verify, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_UploadPkvFile(KRAL_HANDLE handle, const char* file, uint32_t options) {
-  return RunOnServer(handle, "KRAL_UploadPkvFile", &kral::SoftwareDownload::UploadPkvFile, file, options);
+  return ExportCall(handle, __func__).Run(RunOnServer, __func__, &kral::SoftwareDownload::UploadPkvFile, file, options);
 }
 
 uint8_t KRAL_CALL KRAL_DownloadPkvFile(KRAL_HANDLE handle, const char* file, uint32_t options) {
-  return RunOnServer(handle, "KRAL_DownloadPkvFile", &kral::SoftwareDownload::DownloadPkvFile, file, options);
+  return ExportCall(handle, __func__)
+      .Run(RunOnServer, __func__, &kral::SoftwareDownload::DownloadPkvFile, file, options);
 }
 
 }  // extern "C"

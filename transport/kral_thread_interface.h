@@ -12,6 +12,7 @@
 #include "transport/chunk_splitter.h"
 #include "transport/hdlc_framer.h"
 #include "transport/receive_loop.h"
+#include "transport/reply.h"
 #include "transport/serial_port.h"
 #include "transport/thread_control.h"
 #include "transport/traffic_counters.h"
@@ -59,14 +60,18 @@ class CKralThreadInterface {
   void SetSleepDivisor(uint32_t divisor);
 
   // --- Requests (kral_thread_requests.cpp) --------------------------------------------------------------------------
-  // response_size: in, the room; out, what was received less the two FCS bytes, at most the room. A reply with another
-  // first byte fails the request at once and is given out all the same. A time-out closes the port.
-  bool SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint8_t expected_code,
-                uint32_t time_out_ms, uint32_t delay_ms);
+  // `room` takes what is received, FCS bytes included where they fit; the reply's bytes are those in front of them. A
+  // reply with another first byte ends the request and is given out all the same. One with the expected first byte that
+  // fails `is_own` answers an earlier request: it is passed over, and the right one awaited for the rest of the
+  // time-out. A time-out closes the port.
+  Reply SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
+                 uint32_t delay_ms, const ReplyTest& is_own = {});
+  // Awaits another reply to the request that was sent last; a time-out leaves the port open.
+  Reply AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms, const ReplyTest& is_own = {});
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
-  bool SendRaw(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size, uint32_t time_out_ms);
-  // Awaits no reply.
-  bool SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
+  Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
+  // Awaits no reply: expected means written.
+  Reply SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
 
   // Empties the response queue of what was read before this call; every synchronous request begins with it.
   void ForgetReplies();
@@ -106,9 +111,9 @@ class CKralThreadInterface {
   void WakeReceiver();
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
-  bool AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
-                     uint8_t expected_code, uint32_t time_out_ms);
-  bool PollRecord(uint8_t* response, uint16_t& response_size, uint32_t time_out_ms);
+  Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
+  ReplyKind WhyNotWritten() const;
+  ReplyKind WhyNoReply(uint64_t garbled_before) const;
   void TimedOut(std::span<const uint8_t> request);
   bool AskForUnframedMode();
   bool ReturnToFramedMode();

@@ -30,39 +30,44 @@ bool BeginsWithAt(std::span<const uint8_t> request) {
   return request.size() >= 2 && request[0] == 'A' && request[1] == 'T';
 }
 
-size_t CopyRecord(const Packet& record, uint8_t* response, uint16_t room) {
-  const size_t count = std::min<size_t>(record.size(), room);
-  std::copy_n(record.begin(), count, response);
-  return count;
+// What of a record the room takes, less the FCS bytes at the record's end.
+std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> room) {
+  const size_t count = std::min(record.size(), room.size());
+  std::copy_n(record.begin(), count, room.begin());
+  const size_t length = record.size() > kFcsBytes ? record.size() - kFcsBytes : 0;
+  return room.first(std::min(length, count));
 }
 
 }  // namespace
 
-bool CKralThreadInterface::SendSync(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
-                                    uint8_t expected_code, uint32_t time_out_ms, uint32_t delay_ms) {
-  if (sorter_ == nullptr) return false;
+Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
+                                     uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
+  if (sorter_ == nullptr) return ReplyKind::kNotSent;
   LogRequest("SEND (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
     if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
-    return false;
+    return ReplyKind::kNullPort;
   }
 
-  bool succeeded = false;
+  Reply reply;
   if (Transmit(request, time_out_ms)) {
     LogWritten(time_out_ms, start);
     if (delay_ms != 0) clock_.SleepMs(delay_ms);
     const uint32_t read_start = clock_.TickMs();
-    succeeded = AwaitResponse(request, response, response_size, expected_code, time_out_ms);
-    if (log_ && succeeded) {
+    reply = AwaitNext(room, expected_code, time_out_ms, is_own);
+    if (!reply.came() || (!reply && clock_.TickMs() - read_start > time_out_ms)) TimedOut(request);
+    if (log_ && reply) {
       log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
     } else if (log_) {
       log_->WriteLine(kLogErr, "Error. Send Sync Read failed.");
     }
+  } else {
+    reply = WhyNotWritten();
   }
-  if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", succeeded ? 1 : 0);
-  return succeeded;
+  if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", reply ? 1 : 0);
+  return reply;
 }
 
 // Only replies to the request that follows shall count. What has been read already answers an earlier one: it is let
@@ -73,26 +78,34 @@ void CKralThreadInterface::ForgetReplies() {
   sorter_->responses().Clear();
 }
 
-bool CKralThreadInterface::AwaitResponse(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
-                                         uint8_t expected_code, uint32_t time_out_ms) {
+Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
+                                      const ReplyTest& is_own) {
   const uint32_t start = clock_.TickMs();
-  const auto record = sorter_->responses().PopWithin(std::chrono::milliseconds(time_out_ms));
-  if (!record || record->empty()) {
-    TimedOut(request);
-    return false;
+  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
+  for (uint32_t waited = 0;; waited = std::min(clock_.TickMs() - start, time_out_ms)) {
+    const auto record = sorter_->responses().PopWithin(std::chrono::milliseconds(time_out_ms - waited));
+    if (!record || record->empty()) return WhyNoReply(garbled_before);
+    const auto bytes = CopyRecord(*record, room);
+    if (record->front() != expected_code) {
+      // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
+      if (log_) {
+        log_->WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
+                        record->front(), expected_code);
+      }
+      return {ReplyKind::kOther, record->front(), bytes};
+    }
+    if (!is_own || is_own(bytes)) return {ReplyKind::kExpected, expected_code, bytes};
+    if (log_) log_->WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
   }
-  CopyRecord(*record, response, response_size);
-  const size_t length = record->size() > kFcsBytes ? record->size() - kFcsBytes : 0;
-  response_size = static_cast<uint16_t>(std::min<size_t>(length, response_size));
-  if (record->front() == expected_code) return true;
+}
 
-  // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
-  if (log_) {
-    log_->WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
-                    record->front(), expected_code);
-  }
-  if (clock_.TickMs() - start > time_out_ms) TimedOut(request);
-  return false;
+ReplyKind CKralThreadInterface::WhyNotWritten() const {
+  return port_.gone() ? ReplyKind::kGone : ReplyKind::kWriteFailed;
+}
+
+ReplyKind CKralThreadInterface::WhyNoReply(uint64_t garbled_before) const {
+  if (port_.gone()) return ReplyKind::kGone;
+  return splitter_.deframer().bad_fcs() != garbled_before ? ReplyKind::kGarbled : ReplyKind::kNone;
 }
 
 // A handset that does not answer is given up: the next request finds the port closed and opens it afresh.
@@ -102,54 +115,57 @@ void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
   Close();
 }
 
-bool CKralThreadInterface::SendRaw(std::span<const uint8_t> request, uint8_t* response, uint16_t& response_size,
-                                   uint32_t time_out_ms) {
-  if (sorter_ == nullptr) return false;
+Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
+  if (sorter_ == nullptr) return ReplyKind::kNotSent;
   LogRequest("SEND RAW (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
     if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
-    return false;
+    return ReplyKind::kNullPort;
   }
 
   if (IsUnframed(packet_mode()) && BeginsWithAt(request)) splitter_.SetAtReplyMode(true);
-  bool succeeded = false;
+  Reply reply;
   if (Transmit(request, time_out_ms)) {
     LogWritten(time_out_ms, start);
-    succeeded = PollRecord(response, response_size, time_out_ms);
-    if (log_ && !succeeded) log_->WriteLine(kLogErr, "Error. Read failed.");
+    reply = PollRecord(room, time_out_ms);
+    if (log_ && !reply) log_->WriteLine(kLogErr, "Error. Read failed.");
+  } else {
+    reply = WhyNotWritten();
   }
   splitter_.SetAtReplyMode(false);
-  return succeeded;
+  return reply;
 }
 
-bool CKralThreadInterface::PollRecord(uint8_t* response, uint16_t& response_size, uint32_t time_out_ms) {
+Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_out_ms) {
   const uint32_t start = clock_.TickMs();
+  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (;;) {
     if (const auto record = sorter_->responses().Pop()) {
-      response_size = static_cast<uint16_t>(CopyRecord(*record, response, response_size));
+      const size_t count = std::min(record->size(), room.size());
+      std::copy_n(record->begin(), count, room.begin());
       if (log_) {
         log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
       }
-      return true;
+      return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
     }
-    if (clock_.TickMs() - start >= time_out_ms) return false;
+    if (clock_.TickMs() - start >= time_out_ms) return WhyNoReply(garbled_before);
     clock_.SleepMs(1);
   }
 }
 
-bool CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
+Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
   LogRequest("SEND_ASYNC (%d bytes):%s", request);
   if (null_port_) {
     if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
-    return false;
+    return ReplyKind::kNullPort;
   }
   const uint32_t start = clock_.TickMs();
   const auto size = static_cast<uint32_t>(request.size());
-  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) return false;
+  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) return WhyNotWritten();
   LogWritten(time_out_ms, start);
-  return true;
+  return ReplyKind::kExpected;
 }
 
 bool CKralThreadInterface::Transmit(std::span<const uint8_t> request, uint32_t time_out_ms) {
@@ -180,10 +196,10 @@ bool CKralThreadInterface::NeedsPhoneFor(uint32_t mode) const {
 }
 
 bool CKralThreadInterface::AskForUnframedMode() {
-  std::array<uint8_t, kMaximumPacket> reply{};
-  uint16_t size = reply.size();
+  std::array<uint8_t, kMaximumPacket> room;
   const uint8_t request = kUnframedModeRequest;
-  return SendSync({&request, 1}, reply.data(), size, request, kUnframedModeMs, 0) && size >= 2 && reply[1] == 1;
+  const Reply reply = SendSync({&request, 1}, room, request, kUnframedModeMs, 0);
+  return reply && reply.bytes().size() >= 2 && reply.bytes()[1] == 1;
 }
 
 // The framer reads the handset's answer itself, so the receive thread must not.

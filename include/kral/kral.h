@@ -29,6 +29,7 @@
 #include "kral/diag.h"
 #include "kral/download.h"
 #include "kral/efs.h"
+#include "kral/error.h"
 #include "kral/ftm.h"
 #include "kral/kivrat.h"
 #include "kral/log.h"

@@ -194,7 +194,7 @@ TEST_F(Connection, RefusalsAreNamedAndNothingElseIs) {
   const auto send = [&](uint8_t code, uint32_t time_out) {
     phone.packet().Reset();
     phone.packet().Append8(code);
-    return phone.Send(phone.packet(), time_out);
+    return static_cast<bool>(phone.Send(phone.packet(), time_out));
   };
   for (const auto& [reply, line] : kRefusals) {
     handset_.Expect("26").Reply(reply);
@@ -208,9 +208,14 @@ TEST_F(Connection, RefusalsAreNamedAndNothingElseIs) {
   // The caller's buffer may hold anything: a time-out is not taken for a refusal.
   handset_.Expect("26");
   std::array<uint8_t, 4> response = {19, 19, 19, 19};
-  uint16_t size = 4;
-  EXPECT_FALSE(phone.SendSync(std::array<uint8_t, 1>{0x26}, response.data(), size, 0x26, 20));
+  EXPECT_EQ(phone.SendSync(std::array<uint8_t, 1>{0x26}, response, 0x26, 20).kind(), ReplyKind::kNone);
   EXPECT_EQ(log.Count(kRefusals[0].second), 0u);
+  // And where it happens to hold the same refusal as the reply, the reply is one all the same.
+  for (int i = 0; i < 3; ++i) {
+    handset_.Expect("26").Reply("13 26 00 00");
+    EXPECT_EQ(phone.SendSync(std::array<uint8_t, 1>{0x26}, response, 0x26, 1000).refusal(), refusal::kCommand);
+  }
+  EXPECT_EQ(log.Count(kRefusals[0].second), 3u);
 }
 
 TEST_F(Connection, EmptyRequestFailsWithoutTraffic) {

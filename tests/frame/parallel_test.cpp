@@ -36,12 +36,12 @@ void InParallel(uint16_t count, const std::function<void(uint16_t)>& work) {
 
 // A request that is answered by the handset of that port only.
 bool AnswersAs(KRAL_HANDLE handle, uint8_t code, uint32_t time_out) {
-  return OnPhone(handle, [=](Diag_FTM& phone) {
-           phone.packet().Reset();
-           phone.packet().Append8(200);
-           uint8_t answer = 0;
-           return phone.Send(phone.packet(), time_out) && phone.packet().ResponseAt8(1, answer) && answer == code;
-         }) == 1;
+  return ExportCall(handle, "AnswersAs").Unlogged().Run([=](Diag_FTM& phone) {
+    phone.packet().Reset();
+    phone.packet().Append8(200);
+    uint8_t answer = 0;
+    return phone.Send(phone.packet(), time_out) && phone.packet().ResponseAt8(1, answer) && answer == code;
+  }) == 1;
 }
 
 // Connects, asks, times out, asks again and disconnects, over and over.

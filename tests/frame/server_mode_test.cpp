@@ -30,7 +30,7 @@ class ServerMode : public testing::Test {
   bool Send(Diag_FTM& phone, uint8_t code) {
     phone.packet().Reset();
     phone.packet().Append8(code);
-    return phone.Send(phone.packet(), 100);
+    return static_cast<bool>(phone.Send(phone.packet(), 100));
   }
 
   test::ScriptedServer server_;
@@ -93,9 +93,9 @@ TEST_F(ServerMode, ReplyIsCutToTheRoom) {
   auto& phone = Connected();
   server_.answer = [](auto) { return std::vector<uint8_t>{38, 1, 2, 3, 4, 5, 6}; };
   std::array<uint8_t, 5> response = {0xCC, 0xCC, 0xCC, 0xCC, 0xCC};
-  uint16_t size = 4;
-  EXPECT_TRUE(phone.SendSync(std::array<uint8_t, 1>{38}, response.data(), size, 38, 100));
-  EXPECT_EQ(size, 4);
+  const Reply reply = phone.SendSync(std::array<uint8_t, 1>{38}, std::span(response).first(4), 38, 100);
+  EXPECT_TRUE(reply);
+  EXPECT_EQ(reply.bytes().size(), 4u);
   EXPECT_EQ(response, (std::array<uint8_t, 5>{38, 1, 2, 3, 0xCC}));
   server_.answer = [](auto) { return std::vector<uint8_t>(100000, 38); };
   EXPECT_TRUE(Send(phone, 38));

@@ -55,19 +55,19 @@ TEST_F(TextLogExports, NullTextsGiveZero) {
 TEST_F(TextLogExports, FormattedLinesNeedAStartedLogAndPlainOnesOnlyTheMask) {
   test::PhoneLog log(handle_);
   log.Take();
-  LogName(handle_, "plain");
-  LogFormatted(handle_, "formatted %d", 1);
+  ExportCall(handle_, "plain").RunAtOnce([](Diag_FTM&) { return true; });
+  ExportCall(handle_, "formatted").Logged(" %d", 1);
   EXPECT_EQ(log.Take(), Lines{"512 plain"});
   KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
   KRAL_StopLogging(handle_);
   log.Take();
-  LogFormatted(handle_, "formatted %d", 2);
+  ExportCall(handle_, "formatted").Logged(" %d", 2);
   EXPECT_EQ(log.Take(), Lines{"512 formatted 2"}) << "the switch stays set after a stop";
 }
 
 TEST_F(TextLogExports, LongFormattedLineIsCut) {
   KRAL_StartLogging(handle_, folder_.Path("log.txt").c_str());
-  LogFormatted(handle_, "%s", std::string(20000, 'm').c_str());
+  ExportCall(handle_, "").Logged("%s", std::string(20000, 'm').c_str());
   EXPECT_EQ(Bodies("log.txt").back(), "LOG_C_HIGH_LEVEL_START," + std::string(8015, 'm'));
 }
 

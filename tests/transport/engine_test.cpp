@@ -26,9 +26,9 @@ constexpr uint32_t kLong = 5000;
 constexpr uint32_t kShort = 20;
 constexpr uint32_t kBusy = 500;  // plenty for a reply, and soon over where none comes
 
-struct Reply {
+struct Taken {
   bool succeeded;
-  uint16_t size;
+  size_t size;  // the room, when nothing came
   Bytes bytes;  // the whole buffer
 };
 
@@ -41,15 +41,16 @@ class Engine : public testing::Test {
   void AnswerWith(Bytes payload) {
     wire_.OnWrite([frame = PlainFrame(payload)](const Bytes&) { return frame; });
   }
-  Reply Ask(const Bytes& request, uint16_t room = 16, uint32_t time_out_ms = kLong) {
-    Reply reply{false, room, Bytes(room, 0xEE)};
-    reply.succeeded = engine_->transport.SendSync(request, reply.bytes.data(), reply.size, request[0], time_out_ms, 0);
-    return reply;
+  Taken Ask(const Bytes& request, uint16_t room = 16, uint32_t time_out_ms = kLong) {
+    Bytes buffer(room, 0xEE);
+    return ToTaken(engine_->transport.SendSync(request, buffer, request[0], time_out_ms, 0), buffer);
   }
-  Reply AskRaw(const Bytes& request, uint16_t room = 16, uint32_t time_out_ms = kLong) {
-    Reply reply{false, room, Bytes(room, 0xEE)};
-    reply.succeeded = engine_->transport.SendRaw(request, reply.bytes.data(), reply.size, time_out_ms);
-    return reply;
+  Taken AskRaw(const Bytes& request, uint16_t room = 16, uint32_t time_out_ms = kLong) {
+    Bytes buffer(room, 0xEE);
+    return ToTaken(engine_->transport.SendRaw(request, buffer, time_out_ms), buffer);
+  }
+  static Taken ToTaken(const Reply& reply, const Bytes& buffer) {
+    return {static_cast<bool>(reply), reply.came() ? reply.bytes().size() : buffer.size(), buffer};
   }
   // The lines of the calling thread's part of the engine, without those of the threads, and without times.
   LogLines::Lines EngineLines() {
@@ -74,7 +75,7 @@ TEST_F(Engine, ReplyOfTheRequestedCodeSucceedsWithoutItsFcsBytesCounted) {
   Open();
   AnswerWith({75, 1, 2, 3});
   engine_->log.Take();
-  const Reply reply = Ask({75, 50});
+  const Taken reply = Ask({75, 50});
   EXPECT_TRUE(reply.succeeded);
   EXPECT_EQ(reply.size, 4);
   const Bytes record = WithFcs({75, 1, 2, 3});
@@ -92,7 +93,7 @@ TEST_F(Engine, ResponseIsCutAtTheRoom) {
   Open();
   AnswerWith({75, 1, 2, 3});
   for (const Case& c : {Case{0, 0}, Case{1, 1}, Case{3, 3}, Case{4, 4}, Case{5, 4}, Case{6, 4}, Case{100, 4}}) {
-    const Reply reply = Ask({75}, c.room);
+    const Taken reply = Ask({75}, c.room);
     EXPECT_TRUE(reply.succeeded) << c.room;
     EXPECT_EQ(reply.size, c.size) << c.room;
   }
@@ -107,7 +108,7 @@ TEST_F(Engine, FirstOtherReplyFailsTheRequestAtOnceAndIsGivenOut) {
     return both;
   });
   engine_->log.Take();
-  const Reply reply = Ask({75});
+  const Taken reply = Ask({75});
   EXPECT_FALSE(reply.succeeded);
   EXPECT_EQ(reply.size, 2);
   EXPECT_EQ(reply.bytes[0], 19);
@@ -124,7 +125,7 @@ TEST_F(Engine, LateReplyIsNotTakenForTheNextOnes) {
   wire_.ToHost(PlainFrame({75, 0xBA, 0xD0}));
   ASSERT_TRUE(Eventually([this] { return engine_->responses.size() == 1; }));
   AnswerWith({75, 1});
-  const Reply reply = Ask({75});
+  const Taken reply = Ask({75});
   EXPECT_TRUE(reply.succeeded);
   EXPECT_EQ(reply.bytes[1], 1);
 }
@@ -145,7 +146,7 @@ TEST_F(Engine, ReplyThatCameTwiceDoesNotFailTheNextRequest) {
 TEST_F(Engine, TimeOutClosesThePortAndKeepsTheRequest) {
   Open();
   engine_->log.Take();
-  const Reply reply = Ask({75, 9}, 16, kShort);
+  const Taken reply = Ask({75, 9}, 16, kShort);
   EXPECT_FALSE(reply.succeeded);
   EXPECT_EQ(reply.bytes, Bytes(16, 0xEE));
   EXPECT_FALSE(engine_->transport.connected());
@@ -184,7 +185,7 @@ TEST_F(Engine, RawTakesWhateverComesFirstWithItsFcsBytes) {
   Open();
   AnswerWith({19, 1});
   engine_->log.Take();
-  const Reply reply = AskRaw({75});
+  const Taken reply = AskRaw({75});
   EXPECT_TRUE(reply.succeeded);
   EXPECT_EQ(reply.size, 4);
   EXPECT_EQ(Bytes(reply.bytes.begin(), reply.bytes.begin() + 4), WithFcs({19, 1}));
@@ -192,7 +193,7 @@ TEST_F(Engine, RawTakesWhateverComesFirstWithItsFcsBytes) {
   EXPECT_EQ(AskRaw({75}, 3).size, 3);
 
   wire_.OnWrite({});
-  const Reply none = AskRaw({75}, 16, kShort);
+  const Taken none = AskRaw({75}, 16, kShort);
   EXPECT_FALSE(none.succeeded);
   EXPECT_EQ(none.size, 16);
   EXPECT_TRUE(engine_->transport.connected()) << "a raw time-out does not close the port";
@@ -210,7 +211,7 @@ TEST_F(Engine, AtRequestInAnUnframedModeReadsUpToOk) {
     }
     return Bytes{1, 2, 3};
   });
-  const Reply reply = AskRaw(at);
+  const Taken reply = AskRaw(at);
   EXPECT_EQ(reply.size, 5);
   EXPECT_EQ(Bytes(reply.bytes.begin(), reply.bytes.begin() + 5), (Bytes{'x', '\r', '\n', 'O', 'K'}));
   EXPECT_EQ(wire_.Written(), std::vector<Bytes>{at}) << "unframed";

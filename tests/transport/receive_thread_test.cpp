@@ -33,8 +33,7 @@ struct Modes : testing::TestWithParam<std::tuple<ReceiveMode, bool>> {
   bool Answers() {
     wire.OnWrite([](const Bytes&) { return PlainFrame({5, 6}); });
     Bytes response(8);
-    uint16_t size = 8;
-    return engine->transport.SendSync(Bytes{5}, response.data(), size, 5, 5000, 0);
+    return static_cast<bool>(engine->transport.SendSync(Bytes{5}, response, 5, 5000, 0));
   }
 
   TestWire wire;
