@@ -6,6 +6,7 @@
 #include <array>
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <span>
@@ -76,6 +77,26 @@ class Diag_FTM {
   // failure of the exported call under way.
   Reply Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms = 0, const ReplyTest& is_own = {});
   Reply Send(CDiagPacket& packet) { return Send(packet, TimeOut(kTimeOutDefaultCommand)); }
+
+  // After a request whose answer is still owed the next one may be answered by it, where the reply does not tell. With
+  // this on, Send and Synchronize ask for a loopback first, which tells: what comes in front of its echo is passed
+  // over.
+  void SetResynchronise(bool on) { resynchronise_ = on; }
+  // Asks for it where it is due. `passed_over` sees the replies in front. Not the echo within the time-out: the request
+  // that was to follow counts as not answered, and is better not sent.
+  Reply Synchronise(uint32_t time_out_ms, const std::function<void(std::span<const uint8_t>)>& passed_over = {});
+
+  // On for as long as it lives, whatever the caller has set. For whoever holds the request lock.
+  class Resynchronising {
+   public:
+    explicit Resynchronising(Diag_FTM& phone) : phone_(phone) { ++phone_.resynchronising_; }
+    ~Resynchronising() { --phone_.resynchronising_; }
+    Resynchronising(const Resynchronising&) = delete;
+    Resynchronising& operator=(const Resynchronising&) = delete;
+
+   private:
+    Diag_FTM& phone_;
+  };
 
   // The same over the caller's memory.
   Reply SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
@@ -179,6 +200,9 @@ class Diag_FTM {
   OpenArguments last_open_;
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
+  bool answer_owed_ = false;          // by the handset, to a request that was given up
+  uint32_t resynchronising_ = 0;
+  uint32_t loopbacks_ = 0;  // numbers those that resynchronise
   bool retired_ = false;
   bool port_borrowed_ = false;
 
@@ -189,6 +213,7 @@ class Diag_FTM {
   std::atomic<uint32_t> handle_{0};
   std::atomic<bool> data_to_diagnostic_search_{true};
   std::atomic<bool> framed_{true};
+  std::atomic<bool> resynchronise_{false};
 };
 
 }  // namespace kral

@@ -1,13 +1,24 @@
 // Sends the requests of a phone object, over its transport or through the phone server; names refusals in the log.
 #include <algorithm>
-#include <string>
+#include <array>
 #include <vector>
 
+#include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
 #include "frame/orbt_server.h"
 #include "frame/request_failure.h"
 
 namespace kral {
+namespace {
+
+constexpr std::array<uint8_t, 1> kLoopbackRequest{123};
+
+// Of a request whose reply was another one the own reply may still be on its way, too.
+bool MayComeLater(const Reply& reply) {
+  return !reply && !reply.not_sent() && reply.refusal() == 0 && reply.kind() != ReplyKind::kGone;
+}
+
+}  // namespace
 
 Reply Diag_FTM::Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
   const auto request = packet.request();
@@ -15,7 +26,8 @@ Reply Diag_FTM::Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_m
     Fail(Failure(KRAL_ERROR_INTERNAL, "an empty request was to be sent"));
     return ReplyKind::kNotSent;
   }
-  const Reply reply = SendSync(request, packet.response_area(), request[0], time_out_ms, delay_ms, is_own);
+  Reply reply = Synchronise(time_out_ms);
+  if (reply) reply = SendSync(request, packet.response_area(), request[0], time_out_ms, delay_ms, is_own);
   packet.set_response_length(static_cast<uint16_t>(reply.bytes().size()));
   return reply;
 }
@@ -28,6 +40,7 @@ Reply Diag_FTM::SendSync(std::span<const uint8_t> request, std::span<uint8_t> ro
   }
   const Reply reply = server_mode() ? SendThroughServer(request, room, expected_code, time_out_ms)
                                     : transport().SendSync(request, room, expected_code, time_out_ms, delay_ms, is_own);
+  answer_owed_ = answer_owed_ || MayComeLater(reply);
   if (const char* const refusal = RefusalText(reply.refusal())) log().WriteLine(kLogErr, "ERROR:\t%s", refusal);
   return Noted(reply, request, time_out_ms);
 }
@@ -47,6 +60,36 @@ Reply Diag_FTM::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> roo
 Reply Diag_FTM::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
   const Reply reply = IsPortOpen() ? transport().SendASync(request, time_out_ms, start_flag) : ReplyKind::kPortClosed;
   return Noted(reply, request, time_out_ms);
+}
+
+Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::span<const uint8_t>)>& passed_over) {
+  if (!answer_owed_ || !(resynchronise_ || resynchronising_ > 0) || server_mode() || !framed_) {
+    return ReplyKind::kExpected;
+  }
+  if (!IsPortOpen()) return Noted(ReplyKind::kPortClosed, kLoopbackRequest, time_out_ms);
+  std::array<uint8_t, 6> loopback{kLoopbackRequest[0], 'S'};  // the liveness check's has other content
+  StoreLe(loopback, 2, ++loopbacks_);
+  const ReplyTest is_own = [&](std::span<const uint8_t> reply) {
+    if (std::equal(loopback.begin(), loopback.end(), reply.begin(), reply.end())) return true;
+    if (passed_over) passed_over(reply);
+    return false;
+  };
+  std::array<uint8_t, kMaximumPacket> room;
+  const uint32_t start = clock_.TickMs();
+  Reply reply = transport().SendSync(loopback, room, loopback[0], time_out_ms, 0, is_own);
+  while (reply.kind() == ReplyKind::kOther) {
+    // A handset that does not know the loopback refuses it, and repeats it: that tells as well.
+    if (reply.refusal() != 0 && reply.bytes().size() > loopback.size() &&
+        std::equal(loopback.begin(), loopback.end(), reply.bytes().begin() + 1)) {
+      reply = {ReplyKind::kExpected, reply.code(), reply.bytes()};
+      break;
+    }
+    is_own(reply.bytes());
+    const uint32_t elapsed = std::min(clock_.TickMs() - start, time_out_ms);
+    reply = transport().AwaitNext(room, loopback[0], time_out_ms - elapsed, is_own);
+  }
+  if (reply) answer_owed_ = false;
+  return Noted(reply, loopback, time_out_ms);
 }
 
 Reply Diag_FTM::SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,

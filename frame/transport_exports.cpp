@@ -44,7 +44,9 @@ bool HandBack(const Reply& reply, std::span<const uint8_t> room, uint16_t* respo
 
 bool SendSync(Diag_FTM& phone, Request request, uint16_t* response_size, uint8_t* response, uint32_t time_out_ms) {
   const auto room = Room(response_size, response);
-  return HandBack(phone.SendSync(request, room, request[0], time_out_ms), room, response_size);
+  Reply reply = phone.Synchronise(time_out_ms);
+  if (reply) reply = phone.SendSync(request, room, request[0], time_out_ms);
+  return HandBack(reply, room, response_size);
 }
 
 bool SendASync(Diag_FTM& phone, Request request, uint32_t time_out_ms, uint8_t start_flag) {
@@ -106,6 +108,11 @@ bool SetWriteSizeLimit(Diag_FTM& phone, uint32_t bytes) {
   return true;
 }
 
+bool SetResynchronise(Diag_FTM& phone, bool on) {
+  phone.SetResynchronise(on);
+  return true;
+}
+
 bool SetRawPacketCallback(Diag_FTM& phone, KRAL_RAW_PACKET_CALLBACK callback, uintptr_t value) {
   phone.sorter().SetRawPacketCallback(callback, value);
   return true;
@@ -162,6 +169,10 @@ uint8_t KRAL_CALL KRAL_SetRTS_State(KRAL_HANDLE handle, uint8_t state) {
   return ExportCall(handle, __func__)
       .Logged("(bSetRTS_High=%d)", state)
       .Run(SetPortLine, SetLine{&kral::CSerialPort::SetRTS}, state);
+}
+
+uint8_t KRAL_CALL KRAL_SetResynchronise(KRAL_HANDLE handle, uint8_t on) {
+  return ExportCall(handle, __func__).Logged("( bOn = %d )", on).RunAtOnce(SetResynchronise, on == 1);
 }
 
 uint8_t KRAL_CALL KRAL_SetSendDataSerialWriteSizeLimit(KRAL_HANDLE handle, uint32_t bytes) {

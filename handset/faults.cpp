@@ -58,6 +58,9 @@ Fault Refuse(Refusal refusal) {
 Fault Refuse(uint8_t code) {
   return {Kind::kRefuse, code};
 }
+Fault Lag(uint32_t milliseconds) {
+  return {Kind::kLag, milliseconds};
+}
 Fault Ignore() {
   return {Kind::kIgnore};
 }
@@ -136,6 +139,9 @@ std::vector<Outgoing> FaultPlan::Deliver(const Strike& strike, ByteView packet, 
 
   outgoing.delay_ms = delay_ms;
   if (const Fault* late = strike.Find(Kind::kDelay)) outgoing.delay_ms += late->value;
+  for (const Fault& fault : strike.faults) {
+    if (fault.kind == Kind::kLag) outgoing.lag_ms += fault.value;
+  }
   if (const Fault* split = strike.Find(Kind::kSplit)) {
     outgoing.piece = split->value;
     outgoing.gap_ms = split->gap_ms;

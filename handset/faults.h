@@ -44,6 +44,7 @@ struct Fault {
     kSplit,
     kMerge,
     kDelay,
+    kLag,
     kAfterNextRequest,
     kLose,
     kCorrupt,
@@ -63,6 +64,9 @@ struct Fault {
 Fault Split(uint32_t piece, uint32_t gap_ms = 0);  // read in pieces
 Fault Merge();                                     // held back, and read together with the next reply
 Fault Delay(uint32_t milliseconds);
+// The handset works on the request so long before it answers, and on what has come meanwhile only afterwards: answers
+// stay in order, and one late answer holds all behind it up.
+Fault Lag(uint32_t milliseconds);
 Fault AfterNextRequest();  // comes too late: when the next request has arrived
 Fault Lose();              // the request was carried out, its reply is gone
 Fault Duplicate();

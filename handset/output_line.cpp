@@ -119,7 +119,15 @@ uint64_t OutputLine::dropped() const {
 }
 
 void OutputLine::Insert(Outgoing outgoing) {
-  const uint32_t due = clock_.TickMs() + outgoing.delay_ms;
+  const uint32_t now = clock_.TickMs();
+  lags_ = lags_ && IsBefore(now, busy_until_);
+  uint32_t due = now + outgoing.delay_ms;
+  if (outgoing.lag_ms > 0) due = (lags_ ? busy_until_ : now) + outgoing.lag_ms;
+  if (lags_ && IsBefore(due, busy_until_)) due = busy_until_;
+  if (outgoing.lag_ms > 0) {
+    busy_until_ = due;
+    lags_ = true;
+  }
   // Nothing goes in front of a frame whose first bytes have left.
   const auto first = frames_.begin() + (!frames_.empty() && frames_.front().taken > 0 ? 1 : 0);
   auto place = frames_.end();

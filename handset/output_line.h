@@ -17,6 +17,7 @@ struct Outgoing {
 
   Bytes bytes;
   uint32_t delay_ms = 0;
+  uint32_t lag_ms = 0;  // of work, one answer after the other
   size_t piece = 0;     // bytes handed out per read; 0: as many as fit
   uint32_t gap_ms = 0;  // between two pieces
   Hold hold = Hold::kNone;
@@ -66,6 +67,8 @@ class OutputLine {
   std::function<void()> listener_;
   std::deque<Frame> frames_;
   std::deque<Outgoing> held_for_request_;
+  uint32_t busy_until_ = 0;  // tick; with work that lags
+  bool lags_ = false;
   Bytes held_for_reply_;
   size_t queued_bytes_ = 0;
   uint64_t dropped_ = 0;

@@ -41,6 +41,12 @@ bool IsWithinLimit(Diag_FTM& phone) {
 
 Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own) {
   NoteLateReplies(phone);
+  const Reply synchronised =
+      phone.Synchronise(time_out_ms, [&](std::span<const u8> late) { NoteLateReply(phone, late); });
+  if (!synchronised) {
+    packet.set_response_length(0);
+    return synchronised;
+  }
   const u32 start = phone.clock().TickMs();
   const ReplyTest own_or_noted = [&](std::span<const u8> reply) {
     if (IsOwnReply(packet.request(), reply, is_own)) return true;

@@ -79,6 +79,7 @@ class PhoneItems {
   void MakeFolders(const std::string& path);
 
   Diag_FTM& phone_;
+  const Diag_FTM::Resynchronising resynchronising_{phone_};  // replies to item requests do not name their file
   NvBatch callers_batch_;
   KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
   KRAL_EFS_DIRECTORY_CALLBACK callers_directory_callback_;

@@ -133,6 +133,27 @@ typedef void(KRAL_CALL* KRAL_RAW_PACKET_CALLBACK)(uint32_t length, const uint8_t
 KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCallBacks(KRAL_HANDLE handle, KRAL_RAW_PACKET_CALLBACK callback,
                                                    uintptr_t value);
 
+/**
+ * Chooses whether a request that follows one without an answer is preceded by a loopback (an addition to the protocol's
+ * own exchange, one more request on the wire).
+ *
+ * A handset answers in order, and may answer late: after the time-out. Replies that repeat their request (NV items,
+ * memory, factory test commands, subsystem requests) are compared with it, and a late one is passed over. Some repeat
+ * nothing (switches, error log, build identity, KRAL_SendSync): there a late reply would be taken for the next request's.
+ * With this on the library sends a loopback with a number of its own first, and passes over everything in front of its
+ * echo. When the echo does not come within the time-out of the request, that counts as not answered and is not sent.
+ * KRAL_SendRAW and the download functions are left as they are.
+ *
+ * Off by default; always on in backups, restores, comparisons and the NV tool.
+ *
+ * @param handle  from a connect function
+ * @param on      1: on; other values: off
+ * @return 1, or 0 for an unknown handle
+ *
+ * Wait: none. Any thread.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetResynchronise(KRAL_HANDLE handle, uint8_t on);
+
 /* --- The port ----------------------------------------------------------------------------------------------------- */
 
 /**

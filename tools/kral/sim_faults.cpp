@@ -24,12 +24,13 @@ struct Kind {
   std::string_view meaning;
 };
 
-constexpr std::array<Kind, 12> kKinds{{
+constexpr std::array<Kind, 13> kKinds{{
     {"corrupt", "", [](std::uint32_t) { return handset::Corrupt(); }, "wrong frame check"},
     {"delay", "ms", [](std::uint32_t value) { return handset::Delay(value); }, "late reply"},
     {"duplicate", "", [](std::uint32_t) { return handset::Duplicate(); }, "the reply comes twice"},
     {"hang-up", "", [](std::uint32_t) { return handset::HangUp(); }, "the device vanishes"},
     {"ignore", "", [](std::uint32_t) { return handset::Ignore(); }, "the request is not carried out: silence"},
+    {"lag", "ms", [](std::uint32_t value) { return handset::Lag(value); }, "slow worker: late, and in order"},
     {"late", "", [](std::uint32_t) { return handset::AfterNextRequest(); }, "the reply comes after the next request"},
     {"lose", "", [](std::uint32_t) { return handset::Lose(); }, "carried out, but the reply is gone"},
     {"merge", "", [](std::uint32_t) { return handset::Merge(); }, "the reply is read together with the next one"},
