@@ -1,6 +1,8 @@
 // Exchanges and writes of the download protocols over the phone object's transport.
 #include "download/download_connection.h"
 
+#include "frame/base/guarded_call.h"
+
 #include <chrono>
 
 #include "frame/base/failure.h"
@@ -74,7 +76,9 @@ void DownloadConnection::Report(uint32_t done, uint32_t total) {
   reported_ = true;
   last_report_ = done;
   const auto callback = phone_.download().progress_callback.load();
-  if (callback != nullptr) callback(phone_.handle(), done, total, phone_.download().callback_value);
+  if (callback == nullptr) return;
+  const uintptr_t value = phone_.download().callback_value;
+  CallGuarded([&] { callback(phone_.handle(), done, total, value); });
 }
 
 }  // namespace kral

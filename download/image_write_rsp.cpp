@@ -4,7 +4,9 @@
 #include <chrono>
 
 #include "download/stream_format.h"
+#include "frame/base/at_exit.h"
 #include "frame/base/little_endian.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 namespace {
@@ -37,17 +39,18 @@ bool CImageWriteRsp::StopThread() {
 // The writer gets a head start, which the first reply ends: with a narrow window it would stand still for the rest.
 void CImageWriteRsp::Run() {
   CReplyRcvrCont receiver(*this, agent_, finished_, log_);
+  const AtExit ended([this] { thread_ended_.Set(); });
   thread_started_.Set();
   auto patience = kHeadStart;
   while (!stop_.WaitFor(0)) {
     try {
       if (const auto frame = responses_.PopWithin(patience)) receiver.OnFrame(*frame);
     } catch (...) {
+      PassForcedUnwind();
       agent_.Fail();  // out of memory: the reply is lost, and the thread must not be
     }
     patience = kPoll;
   }
-  thread_ended_.Set();
 }
 
 WriteReply CImageWriteRspFramed::ParseReply(std::span<const uint8_t> payload) {

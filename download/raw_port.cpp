@@ -17,7 +17,8 @@ constexpr size_t kLongestDump = 64;  // the bytes of images are left out of the 
 
 }  // namespace
 
-RawPort::~RawPort() {
+// May call the caller's flush function, in which its host can end the thread.
+RawPort::~RawPort() noexcept(false) {
   if (!keep_) GiveBack();
 }
 

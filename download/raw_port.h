@@ -17,7 +17,7 @@ namespace kral {
 class RawPort {
  public:
   explicit RawPort(Diag_FTM& phone) : phone_(phone) {}
-  ~RawPort();
+  ~RawPort() noexcept(false);
   RawPort(const RawPort&) = delete;
   RawPort& operator=(const RawPort&) = delete;
 

@@ -8,6 +8,7 @@
 #include "frame/library_state.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 namespace {
@@ -103,6 +104,7 @@ std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle) try {
   auto phone = MakePhone(handle, port);
   return phone && Own(handle, &ContextObjects::phone, phone) ? phone : nullptr;
 } catch (...) {
+  PassForcedUnwind();
   return nullptr;
 }
 
@@ -118,6 +120,7 @@ std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slo
   auto object = make(*phone, handle);
   return object && Own(handle, FamilyIn{slot}, object) ? Joined(phone, std::move(object)) : nullptr;
 } catch (...) {
+  PassForcedUnwind();
   return nullptr;
 }
 
@@ -132,6 +135,7 @@ std::shared_ptr<SoftwareDownload> GetSoftwareDownload(KRAL_HANDLE handle) try {
       factory.make_software_download("KRAL-SW Download", *phone->server_port());
   return download && Own(handle, &ContextObjects::download, download) ? download : nullptr;
 } catch (...) {
+  PassForcedUnwind();
   return nullptr;
 }
 

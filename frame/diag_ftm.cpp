@@ -38,7 +38,8 @@ Diag_FTM::Diag_FTM(uint16_t port, Clock& clock, DeviceOpener opener)
   parts_->transport->SetLogger(&parts_->log);
   // The dispatcher's thread shares the parts: only a stop ends it, and so it must be, should the rest of this fail.
   dispatching_.reset(&parts_->dispatcher);
-  if (!parts_->dispatcher.RegisterListener(&parts_->sorter, nullptr, parts_)) return;
+  // Without a thread for it no port is opened (OpenDirect), and the next opening tries again.
+  parts_->dispatcher.RegisterListener(&parts_->sorter, nullptr, parts_);
   parts_->transport->Attach(&parts_->dispatcher, &parts_->sorter);
   ApplyDefaults();
 }

@@ -6,6 +6,7 @@
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
 #include "frame/request_failure.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 namespace {
@@ -47,6 +48,7 @@ void Diag_FTM::OpenThroughServer() {
       listener_registered_ = true;
     }
   } catch (...) {
+    PassForcedUnwind();
     log().WriteLine(kLogErr, "ORBT server exception caught while connecting in Diag_FTM::OpenPort().");
   }
 }
@@ -55,6 +57,12 @@ void Diag_FTM::OpenDirect(const OpenArguments& arguments) {
   log().WriteLine(kLogFn, "VARN Internal: OpenPort()");
   if (port_ == kNullPort) null_port_ = true;
   if (arguments.user.send != nullptr) SetData2DiagSearch(false);
+  // Nothing that comes in would ever reach a request.
+  if (!dispatcher().EnsureThread(parts_)) {
+    log().WriteLine(kLogErr, "Error. No thread for the dispatcher of port %d.", port());
+    connected_ = false;
+    return;
+  }
   transport().SetOpenFlags(arguments.handshake, arguments.second_flag);
   connected_ = transport().Open(port_, arguments.user, parts_);
 }
@@ -109,6 +117,7 @@ void Diag_FTM::UnregisterFromServer() {
   } catch (const OrbtServerException&) {
     log().WriteLine(kLogErr, "ORBT server exception caught while removing an event listener in Diag_FTM::ClosePort().");
   } catch (...) {
+    PassForcedUnwind();
     log().WriteLine(kLogErr, "Unknown exception caught while removing an event listener in Diag_FTM::ClosePort().");
   }
 }

@@ -8,6 +8,7 @@
 #include "frame/library_state.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 namespace {
@@ -49,6 +50,7 @@ bool CopyServerPorts(std::vector<std::string> (OrbtServer::*list)(), std::span<u
     const auto server = PortInfo();
     if (server) names = (*server.*list)();
   } catch (...) {
+    PassForcedUnwind();
     return false;
   }
   const size_t copied = std::min(names.size(), ports.size());

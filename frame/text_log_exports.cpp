@@ -24,7 +24,7 @@ bool AddMessage(Diag_FTM& phone, uint32_t flag, const char* text, bool echo) {
     std::fputs(text, stdout);
     std::fflush(stdout);
   }
-  phone.log().WriteLine(flag, "%s", text);
+  phone.log().WriteText(flag, text);
   return true;
 }
 

@@ -2,6 +2,7 @@
 #include <cstring>
 
 #include "commands/outputs.h"
+#include "frame/base/guarded_call.h"
 #include "storage/efs_client.h"
 #include "storage/efs_handle.h"
 #include "storage/efs_request.h"
@@ -101,7 +102,7 @@ bool List(Diag_FTM& phone, const std::string& folder, uint8_t filter, KRAL_EFS_E
     if (selected < room) entries[selected] = read->record;
     ++selected;
     if (const auto callback = phone.efs().directory_callback.load()) {
-      callback(&read->record, phone.efs().callback_context);
+      CallGuarded([&] { callback(&read->record, phone.efs().callback_context); });
     }
   }
   Put(count, selected);

@@ -3,15 +3,18 @@
 
 #include "frame/base/failure.h"
 #include "frame/base/text_argument.h"
+#include "platform/forced_unwind.h"
 #include "storage/efs_request.h"
 #include "storage/efs_strays.h"
 
 namespace kral::efs {
 
-RemoteHandle::~RemoteHandle() {
+// The closing is logged, and so may come to a function in which the host ends the thread.
+RemoteHandle::~RemoteHandle() noexcept(false) {
   try {
     Close();
   } catch (...) {
+    PassForcedUnwind();
     // Out of memory on the way out: the handset keeps it open.
   }
 }

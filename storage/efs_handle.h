@@ -8,7 +8,7 @@ namespace kral::efs {
 
 class RemoteHandle {
  public:
-  ~RemoteHandle();
+  ~RemoteHandle() noexcept(false);
   RemoteHandle(const RemoteHandle&) = delete;
   RemoteHandle& operator=(const RemoteHandle&) = delete;
 

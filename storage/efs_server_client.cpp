@@ -4,6 +4,7 @@
 #include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/orbt_server.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 
@@ -29,6 +30,7 @@ bool EFS::Initialize(DataLogFileHandler& log, uint16_t port) {
   } catch (const OrbtServerException&) {
     log.WriteLine(kLogErr, "EFS::initialize - COM exception thrown. ");
   } catch (...) {
+    PassForcedUnwind();
     log.WriteLine(kLogErr, "EFS::initialize - Unknown exception thrown.");
   }
   Forget();
@@ -68,6 +70,7 @@ bool EFS::EfsStarter(DataLogFileHandler& log, uint16_t port, const char* failure
     log.WriteLine(kLogErr, "EFS::EfsStarter - COM exception thrown. ");
     Forget();
   } catch (...) {
+    PassForcedUnwind();
     log.WriteLine(kLogErr, "EFS::EfsStarter - Unknown exception thrown.");
     Forget();
   }

@@ -4,6 +4,7 @@
 
 #include <vector>
 
+#include "frame/base/guarded_call.h"
 #include "frame/base/little_endian.h"
 #include "storage/efs_client.h"
 #include "storage/efs_format.h"
@@ -24,7 +25,8 @@ inline uintptr_t AddressOf(const void* memory) {
 // Calls the transfer callback, if there is one. What the phone's packet buffer holds may not survive it.
 inline void Report(Diag_FTM& phone, const TransferEnds& ends, u32 operation, u32 done, u32 total) {
   if (const auto callback = phone.efs().transfer_callback.load()) {
-    callback(ends.source, ends.destination, operation, 0, done, total, phone.efs().callback_context);
+    const KRAL_HANDLE context = phone.efs().callback_context;
+    CallGuarded([&] { callback(ends.source, ends.destination, operation, 0, done, total, context); });
   }
 }
 

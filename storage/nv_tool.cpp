@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "frame/base/guarded_call.h"
 #include "storage/nv_value.h"
 
 namespace kral::nv {
@@ -14,7 +15,8 @@ void NVTool_Manager::Walk::Report(const std::string& title, NvError error) {
   // An item that the handset has no value for is no failure of the set.
   failed_ = failed_ || (error != NvError::kNone && error != NvError::kNoValue);
   if (tool_.callback_ == nullptr) return;
-  tool_.callback_(operation_, done_, total_, title.c_str(), static_cast<uint32_t>(error), tool_.handle_);
+  CallGuarded(
+      [&] { tool_.callback_(operation_, done_, total_, title.c_str(), static_cast<uint32_t>(error), tool_.handle_); });
 }
 
 // --- Definitions -----------------------------------------------------------------------------------------------------

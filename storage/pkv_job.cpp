@@ -1,4 +1,5 @@
 // The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
+#include "frame/base/guarded_call.h"
 #include "storage/pkv_jobs.h"
 
 #include <algorithm>
@@ -69,7 +70,11 @@ void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
   ++reported_;
   if (stopped_) return;
   const auto callback = phone_.pkv().callback.load();
-  if (callback != nullptr && callback(&record, path, reported_, counts.total, phone_.handle()) == 0) stopped_ = true;
+  if (callback == nullptr) return;
+  // One that fails does not say that it is to go on.
+  uint8_t go_on = 0;
+  CallGuarded([&] { go_on = callback(&record, path, reported_, counts.total, phone_.handle()); });
+  stopped_ = go_on == 0;
 }
 
 uint32_t StatusOf(PkvResult result) {

@@ -1,8 +1,12 @@
 // The pace of a playback. What packets mean is left to the dispatcher's listeners, as for those from a port.
 #include "transport/capture_player.h"
 
+#include <functional>
 #include <utility>
 
+#include "frame/base/at_exit.h"
+#include "frame/base/guarded_call.h"
+#include "platform/forced_unwind.h"
 #include "transport/event_report.h"
 #include "transport/kral_event_listener.h"
 #include "transport/kral_events.h"
@@ -41,17 +45,9 @@ bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& disp
   skipped_ = 0;
   ended_.Reset();
   sorter.SetCollection(true);
+  std::function<void()> body = [this, reader = CaptureReader(std::move(source)),
+                                line = Line{pace, dispatcher, sorter}]() mutable { Play(reader, line); };
   state_ = PlayState::kPlaying;
-  auto body = [this, reader = CaptureReader(std::move(source)), line = Line{pace, dispatcher, sorter}]() mutable {
-    PlayState state = PlayState::kStopped;
-    try {
-      state = Run(reader, line);
-    } catch (...) {
-      state = PlayState::kCut;  // out of memory
-    }
-    state_ = state;
-    ended_.Set();
-  };
   if (thread_.Start(std::move(body), std::move(owner))) return true;
   state_ = PlayState::kStopped;
   return false;
@@ -69,6 +65,20 @@ bool CapturePlayer::Stop(uint32_t time_out_ms) {
   }
   thread_.Join();
   return true;
+}
+
+void CapturePlayer::Play(CaptureReader& reader, const Line& line) {
+  PlayState state = PlayState::kStopped;
+  const AtExit ended([&] {
+    state_ = state;
+    ended_.Set();
+  });
+  try {
+    state = Run(reader, line);
+  } catch (...) {
+    PassForcedUnwind();
+    state = PlayState::kCut;  // out of memory
+  }
 }
 
 PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
@@ -114,7 +124,8 @@ void CapturePlayer::CallBack(const CaptureRecord& record) {
     value = callback_value_;
   }
   if (callback == nullptr) return;
-  callback(record.microseconds, static_cast<uint32_t>(record.packet.size()), record.packet.data(), value);
+  const auto size = static_cast<uint32_t>(record.packet.size());
+  CallGuarded([&] { callback(record.microseconds, size, record.packet.data(), value); });
 }
 
 // Also keeps the dispatcher's own queue, which has no bound, from taking in the whole file.

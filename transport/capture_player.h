@@ -66,6 +66,7 @@ class CapturePlayer {
     CKralEventListener& sorter;
   };
 
+  void Play(CaptureReader& reader, const Line& line);
   PlayState Run(CaptureReader& reader, const Line& line);
   void CallBack(const CaptureRecord& record);
   bool AwaitRoom(const Line& line);
@@ -74,7 +75,7 @@ class CapturePlayer {
   bool Sleep(std::chrono::microseconds time);  // false when it was told to stop
 
   std::mutex control_mutex_;  // one start or stop at a time
-  std::mutex mutex_;  // of what follows
+  std::mutex mutex_;          // of what follows
   std::condition_variable changed_;
   bool stop_requested_ = false;
   KRAL_PLAYBACK_CALLBACK callback_ = nullptr;

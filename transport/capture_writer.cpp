@@ -8,6 +8,7 @@
 #include <thread>
 #include <utility>
 
+#include "frame/base/at_exit.h"
 #include "frame/base/little_endian.h"
 #include "frame/base/text_log.h"
 #include "platform/file_util.h"
@@ -151,11 +152,13 @@ bool CaptureWriter::Stop(uint32_t time_out_ms) {
 }
 
 void CaptureWriter::Run() {
+  const AtExit ended([this] {
+    sink_ = {};
+    ended_.Set();
+  });
   Batch batch;
   bool failed = false;
   while (TakeBatch(batch)) WriteBatch(batch, failed);
-  sink_ = {};
-  ended_.Set();
 }
 
 // Looks by itself whether anything came: to be woken by the first packet of each batch would hold the connection up

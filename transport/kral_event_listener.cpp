@@ -6,6 +6,7 @@
 #include <cstring>
 #include <utility>
 
+#include "frame/base/guarded_call.h"
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
 #include "transport/capture_writer.h"
@@ -90,7 +91,7 @@ void CKralEventListener::QueueAsynchronous(Packet packet) {
   }
   const CollectionCallbacks callbacks = collection_callbacks();
   if (callbacks.packet != nullptr) {
-    callbacks.packet(static_cast<uint32_t>(packet.size()), packet.data(), callbacks.value);
+    CallGuarded([&] { callbacks.packet(static_cast<uint32_t>(packet.size()), packet.data(), callbacks.value); });
   }
   if (packet[0] == kEventReportCode) QueueEvents(packet, callbacks);
   if (capture_ != nullptr) capture_->Append(packet);
@@ -109,7 +110,7 @@ void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, cons
     if (callbacks.event != nullptr) {
       KRAL_EVENT record;
       std::memcpy(&record, event->record.bytes.data(), sizeof(record));
-      callbacks.event(&record, callbacks.value);
+      CallGuarded([&] { callbacks.event(&record, callbacks.value); });
     }
     events_.Stage(event->record);
   }
@@ -171,7 +172,8 @@ void CKralEventListener::CallRawPacketCallback(std::span<const uint8_t> packet) 
     callback = callback_;
     value = callback_value_;
   }
-  if (callback != nullptr) callback(static_cast<uint32_t>(packet.size()), packet.data(), value);
+  if (callback == nullptr) return;
+  CallGuarded([&] { callback(static_cast<uint32_t>(packet.size()), packet.data(), value); });
 }
 
 void CKralEventListener::AddEventHandler(EventHandler* handler) {

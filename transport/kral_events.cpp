@@ -7,14 +7,11 @@
 #include <thread>
 #include <utility>
 
+#include "frame/base/at_exit.h"
+#include "platform/forced_unwind.h"
 #include "platform/message_pump.h"
 
 namespace kral {
-namespace {
-
-constexpr uint32_t kStartMs = 1000;
-
-}  // namespace
 
 CKralEvents::~CKralEvents() {
   Stop();
@@ -23,9 +20,15 @@ CKralEvents::~CKralEvents() {
 bool CKralEvents::RegisterListener(PacketListener* listener, const PacketFilter* filter, std::shared_ptr<void> owner) {
   if (listener == nullptr) return false;
   const std::lock_guard lock(listeners_mutex_);
-  if (!thread_.running() && !StartThread(std::move(owner))) return false;
   listeners_.push_back({listener, filter});
-  return true;
+  return EnsureThread(std::move(owner));
+}
+
+bool CKralEvents::EnsureThread(std::shared_ptr<void> owner) {
+  // In front of the lock, which a running thread holds for as long as a callback takes.
+  if (thread_.running()) return true;
+  const std::lock_guard lock(listeners_mutex_);
+  return StartThread(std::move(owner));
 }
 
 bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
@@ -37,9 +40,9 @@ bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
     dispatched_ = 0;
     backlog_ = 0;
   }
-  started_.Reset();
   stopped_.Reset();
-  if (thread_.Start([this] { Run(); }, std::move(owner))) return started_.WaitFor(kStartMs);
+  // How soon it is given a processor does not matter: what is pushed meanwhile waits.
+  if (thread_.Start([this] { Run(); }, std::move(owner))) return true;
   EndAccepting();
   return false;
 }
@@ -114,22 +117,22 @@ void CKralEvents::EndAccepting() {
 }
 
 void CKralEvents::Run() {
-  started_.Set();
-  if (OnThreadStart()) {
-    std::vector<Packet> batch;
-    while (TakeBatch(batch)) {
-      for (Packet& packet : batch) {
-        if (stop_requested_) break;
-        Dispatch(std::move(packet));
-        backlog_.fetch_sub(1, std::memory_order_relaxed);
-      }
-      EndBatch();
-    }
-    OnThreadEnd();
-  } else {
+  // Also when a host ends the thread inside a callback: nothing more is taken, and a stop need not wait.
+  const AtExit ended([this] {
     EndAccepting();
+    stopped_.Set();
+  });
+  if (!OnThreadStart()) return;
+  std::vector<Packet> batch;
+  while (TakeBatch(batch)) {
+    for (Packet& packet : batch) {
+      if (stop_requested_) break;
+      Dispatch(std::move(packet));
+      backlog_.fetch_sub(1, std::memory_order_relaxed);
+    }
+    EndBatch();
   }
-  stopped_.Set();
+  OnThreadEnd();
 }
 
 bool CKralEvents::TakeBatch(std::vector<Packet>& batch) {
@@ -156,6 +159,7 @@ void CKralEvents::ForEachListener(Call call) {
       const Registration entry = listeners_[i];  // a copy: the list may grow meanwhile
       if (entry.listener != nullptr) call(entry, i + 1 == count);
     } catch (...) {
+      PassForcedUnwind();
       // A listener's failure costs it this packet, not the others theirs.
     }
   }

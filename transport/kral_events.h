@@ -32,8 +32,10 @@ class CKralEvents {
 
   // Listeners are called on the dispatcher thread, in registration order; one with a filter only for what it accepts.
   // The first registration starts the thread, and so does the first one after a stop; `owner` holds this object and
-  // the listeners, and is kept alive by the thread until it ends.
+  // the listeners, and is kept alive by the thread until it ends. False where there is no thread to be had: the
+  // listener is registered all the same, and EnsureThread may have more luck.
   bool RegisterListener(PacketListener* listener, const PacketFilter* filter, std::shared_ptr<void> owner);
+  bool EnsureThread(std::shared_ptr<void> owner);  // true when it runs; never waits for a listener
   // The first pair with that listener. Waits for a call that is under way on the dispatcher thread, so a listener
   // that may block is taken out after Stop, or lives as long as the owner.
   void UnregisterListener(PacketListener* listener);
@@ -90,7 +92,6 @@ class CKralEvents {
   std::vector<Registration> listeners_;
   bool dispatching_ = false;
 
-  ManualResetEvent started_{"KRAL_EVENTS_STARTED"};
   ManualResetEvent stopped_{"KRAL_EVENTS_STOPPED"};
   WorkerThread thread_;  // last: nothing above may be gone while it is parked
 };

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "frame/base/text_log.h"
+#include "platform/forced_unwind.h"
 #include "transport/kral_event_listener.h"
 #include "transport/kral_events.h"
 
@@ -44,10 +45,10 @@ void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> pac
 
 void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   if (gathered_.empty()) return;
-  const size_t count = gathered_.size();
+  // Counted first: whoever has been given a packet finds it counted.
+  packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
   if (dispatcher != nullptr) dispatcher->PushAll(gathered_);
   gathered_.clear();
-  packets.fetch_add(count, std::memory_order_relaxed);
 }
 
 void CKralThreadInterface::SetLogger(DataLogFileHandler* log) {
@@ -72,6 +73,7 @@ bool CKralThreadInterface::Open(uint32_t port_number, const UserTransport& user,
   try {
     connected_ = OpenPort(port_number, user) && RunThread(std::move(owner));
   } catch (...) {
+    PassForcedUnwind();
     failure = "Port open failed with exception";
     connected_ = false;
   }

@@ -3,8 +3,10 @@
 
 #include <chrono>
 
+#include "frame/base/at_exit.h"
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
+#include "platform/forced_unwind.h"
 #include "transport/chunk_splitter.h"
 #include "transport/hdlc_framer.h"
 #include "transport/serial_port.h"
@@ -13,15 +15,14 @@
 namespace kral {
 namespace {
 
-constexpr size_t kReadSize = 40960;
-
 // How long a wait goes without looking around. Everything that matters ends it at once.
 constexpr uint32_t kIdleWaitMs = 1000;
 
 }  // namespace
 
 void ReceiveLoop::Run() {
-  buffer_.resize(kReadSize);
+  // Also when its host ends the thread inside a function of its own.
+  const AtExit left([this] { control_.AcknowledgeStop(); });
   acknowledged_pause_ = 0;
   sleep_counter_ = 0;
   while (!control_.stop_requested()) {
@@ -37,7 +38,9 @@ void ReceiveLoop::Run() {
       clock_.SleepMs(1);
     }
   }
-  Leave();
+  if (DataLogFileHandler* const log = log_) {
+    log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
+  }
 }
 
 // The counter moves only when the thread sleeps: with a divisor of 1 every turn sleeps, with a larger one only the
@@ -80,6 +83,7 @@ bool ReceiveLoop::ReadChunk() {
   try {
     Split(count);
   } catch (...) {
+    PassForcedUnwind();
     // Out of memory: the chunk is lost, and the thread must not be.
     splitter_.DropPartialPacket();
   }
@@ -108,13 +112,6 @@ void ReceiveLoop::Split(uint32_t count) {
     log->WriteLine(kLogIo, "THREAD READ (%d bytes): %s ", static_cast<int>(count), HexDump(chunk).c_str());
   }
   splitter_.Feed(chunk);
-}
-
-void ReceiveLoop::Leave() {
-  if (DataLogFileHandler* const log = log_) {
-    log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
-  }
-  control_.AcknowledgeStop();
 }
 
 }  // namespace kral

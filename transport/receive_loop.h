@@ -48,7 +48,6 @@ class ReceiveLoop {
   bool ReadChunk();
   void Split(uint32_t count);
   void SetSplitting(bool splitting);
-  void Leave();
 
   Clock& clock_;
   CProtAHDLC& framer_;
@@ -66,8 +65,9 @@ class ReceiveLoop {
   bool splitting_ = false;
   uint64_t chunks_ = 0;
 
-  // The thread's own.
-  std::vector<uint8_t> buffer_;
+  // The thread's own. Memory that is refused once it runs has nobody to be told to.
+  static constexpr size_t kReadSize = 40960;
+  std::vector<uint8_t> buffer_ = std::vector<uint8_t>(kReadSize);
   uint32_t sleep_counter_ = 0;
   uint32_t acknowledged_pause_ = 0;
 };

@@ -2,7 +2,9 @@
 // checked before anybody believes them.
 #include <algorithm>
 
+#include "frame/base/guarded_call.h"
 #include "frame/base/text_log.h"
+#include "platform/forced_unwind.h"
 #include "transport/serial_port.h"
 
 namespace kral {
@@ -17,6 +19,16 @@ uint32_t Believable(uint32_t told, uint32_t possible, const char* function, Data
   return std::min(told, possible);
 }
 
+struct CallersException {};
+
+// One of the caller's transport functions; its exception ends what it was called for, as a device's does.
+template <class Function, class... Arguments>
+uint32_t CallTransport(Function function, Arguments... arguments) {
+  uint32_t result = 0;
+  if (!CallGuarded([&] { result = function(arguments...); })) throw CallersException();
+  return result;
+}
+
 }  // namespace
 
 uint32_t CSerialPort::Send(const uint8_t* bytes, uint32_t count) {
@@ -28,6 +40,7 @@ uint32_t CSerialPort::Send(const uint8_t* bytes, uint32_t count) {
     if (log) log->WriteLine(kLogRetDev, "CSerialPort::Send(bytes_sent=%d) ... OK", result);
     return result;
   } catch (...) {
+    PassForcedUnwind();
     if (log) log->WriteLine(kLogErr, "CSerialPort::Send(bytes_sent=%d)--exception occurred", sent);
     return 0;
   }
@@ -61,7 +74,7 @@ uint32_t CSerialPort::SendToUser(const uint8_t* bytes, uint32_t count, uint32_t&
   const UserTransport user = User();
   if (user.send == nullptr) return 1;  // "one byte" without moving any
   uint32_t written = count;
-  if (user.send(user.context, user.handle, count, bytes, &written) != 0) return 0;
+  if (CallTransport(user.send, user.context, user.handle, count, bytes, &written) != 0) return 0;
   sent = Believable(written, count, "Send", log_);
   return sent;
 }
@@ -75,6 +88,7 @@ uint32_t CSerialPort::Receive(uint8_t* buffer, uint32_t count) {
     if (received > 0 && log) log->WriteLine(kLogRetDev, "CSerialPort::Receive(wRec=%d) ... OK", received);
     return result;
   } catch (...) {
+    PassForcedUnwind();
     if (log) {
       log->WriteLine(kLogErr, "CSerialPort::Receive(wRec=%d, nByte=%d)--exception occurred", received, count);
       log->WriteLine(kLogErr, "CSerialPort::Receive() returns=%d", 0);
@@ -100,7 +114,7 @@ uint32_t CSerialPort::ReceiveFromUser(uint8_t* buffer, uint32_t count, uint32_t&
   const UserTransport user = User();
   if (user.receive == nullptr) return 1;  // "one byte" without moving any
   uint32_t delivered = count;
-  if (user.receive(user.context, user.handle, &delivered, buffer) != 0) return 0;
+  if (CallTransport(user.receive, user.context, user.handle, &delivered, buffer) != 0) return 0;
   received = Believable(delivered, count, "Receive", log_);
   return received;
 }
@@ -115,8 +129,9 @@ uint32_t CSerialPort::FlushPCBuffer() {
   const UserTransport user = User();
   if (user.flush == nullptr) return 1;
   try {
-    user.flush(user.context, user.handle);
+    CallTransport(user.flush, user.context, user.handle);
   } catch (...) {
+    PassForcedUnwind();
     if (DataLogFileHandler* log = log_) log->WriteLine(kLogErr, "CSerialPort::FlushPCBuffer()--exception occurred");
   }
   return 0;  // 0 after the caller's flush, 1 without one: the asymmetry is part of the interface

@@ -2,24 +2,22 @@
 // owner's affair.
 #include "transport/worker_thread.h"
 
-#include <algorithm>
-#include <iterator>
+#include <exception>
 #include <mutex>
-#include <system_error>
 #include <utility>
-#include <vector>
+
+#include "frame/base/at_exit.h"
+#include "platform/signals.h"
+#include "transport/thread_maker.h"
 
 namespace kral {
 namespace {
 
-struct ParkedThread {
-  std::thread thread;
-  std::shared_ptr<const WorkerThread::Progress> progress;
-};
+using Progress = WorkerThread::Progress;
 
 struct ParkingLot {
   std::mutex mutex;
-  std::vector<ParkedThread> threads;
+  std::shared_ptr<Progress> first;
 };
 
 // Never destroyed: a parked thread must not be joined, nor its handle thrown away, while the process ends.
@@ -28,22 +26,34 @@ ParkingLot& Lot() {
   return *lot;
 }
 
+ThreadMaker& Maker() {
+  static ThreadMaker& maker = *new ThreadMaker;
+  return maker;
+}
+
 }  // namespace
 
+void SetThreadMaker(ThreadMaker maker) {
+  Maker() = std::move(maker);
+}
+
 size_t ReapParkedThreads() {
-  std::vector<ParkedThread> ended;
+  std::shared_ptr<Progress> ended;
   size_t left = 0;
   {
     ParkingLot& lot = Lot();
     const std::lock_guard lock(lot.mutex);
-    const auto first_ended = std::partition(lot.threads.begin(), lot.threads.end(), [](const ParkedThread& parked) {
-      return !parked.progress->owner_released;
-    });
-    std::move(first_ended, lot.threads.end(), std::back_inserter(ended));
-    lot.threads.erase(first_ended, lot.threads.end());
-    left = lot.threads.size();
+    for (std::shared_ptr<Progress>* at = &lot.first; *at;) {
+      if ((*at)->owner_released) {
+        std::shared_ptr<Progress> taken = std::exchange(*at, (*at)->next_parked);
+        taken->next_parked = std::exchange(ended, taken);
+      } else {
+        at = &(*at)->next_parked;
+        ++left;
+      }
+    }
   }
-  for (ParkedThread& parked : ended) parked.thread.join();
+  for (; ended; ended = std::exchange(ended->next_parked, nullptr)) ended->parked.join();
   return left;
 }
 
@@ -51,22 +61,26 @@ WorkerThread::~WorkerThread() {
   if (!thread_.joinable()) return;
   ParkingLot& lot = Lot();
   const std::lock_guard lock(lot.mutex);
-  lot.threads.push_back({std::move(thread_), progress_});
+  progress_->parked = std::move(thread_);
+  progress_->next_parked = std::exchange(lot.first, progress_);
 }
 
 bool WorkerThread::Start(std::function<void()> body, std::shared_ptr<void> owner) {
   ReapParkedThreads();
   if (running()) return false;
   Join();
-  progress_ = std::make_shared<Progress>();
   try {
-    thread_ = std::thread([body = std::move(body), owner = std::move(owner), progress = progress_]() mutable {
+    progress_ = std::make_shared<Progress>();
+    auto run = [body = std::move(body), owner = std::move(owner), progress = progress_]() mutable {
+      const AtExit ended([&] {
+        progress->body_ended.store(true, std::memory_order_release);
+        owner.reset();  // may destroy the WorkerThread itself
+        progress->owner_released.store(true, std::memory_order_release);
+      });
       body();
-      progress->body_ended.store(true, std::memory_order_release);
-      owner.reset();  // may destroy the WorkerThread itself
-      progress->owner_released.store(true, std::memory_order_release);
-    });
-  } catch (const std::system_error&) {
+    };
+    CallWithSignalsBlocked([&] { thread_ = Maker() ? Maker()(std::move(run)) : std::thread(std::move(run)); });
+  } catch (const std::exception&) {
     return false;
   }
   return true;

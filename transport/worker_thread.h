@@ -19,7 +19,8 @@ class WorkerThread {
   WorkerThread& operator=(const WorkerThread&) = delete;
 
   // Runs `body` on a thread of its own; `owner`, which holds this object, lives at least until the body has returned.
-  // False while an earlier body still runs, and when the system gives no thread.
+  // The host's signal handlers don't run on it. False while an earlier body still runs, and when the system gives no
+  // thread or memory.
   bool Start(std::function<void()> body, std::shared_ptr<void> owner);
   bool running() const { return thread_.joinable() && !progress_->body_ended.load(std::memory_order_acquire); }
   // For a body that has announced its end: waits for the moment it takes to leave.
@@ -28,6 +29,9 @@ class WorkerThread {
   struct Progress {
     std::atomic<bool> body_ended{false};
     std::atomic<bool> owner_released{false};  // the thread touches nothing of the library any more
+    // Once it is parked. Parking takes no memory: it must not fail.
+    std::thread parked;
+    std::shared_ptr<Progress> next_parked;
   };
 
  private:

@@ -6,12 +6,74 @@
 #include <array>
 #include <cstdarg>
 
+#include "frame/base/at_exit.h"
+#include "frame/base/guarded_call.h"
 #include "frame/base/little_endian.h"
 #include "frame/base/text_log_format.h"
 #include "platform/file_util.h"
+#include "platform/forced_unwind.h"
 #include "platform/local_time.h"
+#include "platform/signals.h"
 
 namespace kral {
+namespace {
+
+using Line = std::array<char, kLineCapacity>;
+
+// The callback's own thread is in it: without a bound, a callback that calls what logs would be called for that line.
+thread_local bool in_callback = false;
+
+// Bytes of the control character that begins here, 0 for none. C2 80 to C2 9F are those of UTF-8. A tab is none: lines
+// of the library hold some, and it does no harm.
+size_t ControlLength(std::string_view text) {
+  const auto first = static_cast<uint8_t>(text[0]);
+  if ((first < 0x20 && first != '\t') || first == 0x7F) return 1;
+  const auto second = static_cast<uint8_t>(text.size() > 1 ? text[1] : 0);
+  return first == 0xC2 && second >= 0x80 && second < 0xA0 ? 2 : 0;
+}
+
+// The ends that lines of the library have. Behind one nothing follows that could look like another line.
+std::string_view WithoutEnd(std::string_view text) {
+  for (const std::string_view end : {"\r \n", "\r\n", "\n"}) {
+    if (text.ends_with(end)) return text.substr(0, text.size() - end.size());
+  }
+  return text;
+}
+
+bool HoldsControl(std::string_view text) {
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (ControlLength(text.substr(i)) != 0) return true;
+  }
+  return false;
+}
+
+// Control characters become \x and two digits: what a handset calls itself must not look like a line of the library,
+// nor be a command to the terminal that shows the log. Gives the new length; what has no room is cut.
+size_t Escape(Line& line, size_t length) {
+  constexpr char kDigits[] = "0123456789ABCDEF";
+  constexpr size_t kEscaped = 4;
+  const Line plain = line;
+  const std::string_view text = WithoutEnd({plain.data(), length});
+  const std::string_view end(text.end(), plain.data() + length);
+  size_t written = 0;
+  for (size_t i = 0; i < text.size();) {
+    const size_t control = ControlLength(text.substr(i));
+    if (written + std::max<size_t>(control * kEscaped, 1) >= line.size()) break;
+    if (control == 0) line[written++] = text[i++];
+    for (const size_t next = i + control; control != 0 && i < next; ++i) {
+      const auto byte = static_cast<uint8_t>(text[i]);
+      for (const char c : {'\\', 'x', kDigits[byte >> 4], kDigits[byte & 0xF]}) line[written++] = c;
+    }
+  }
+  if (written + end.size() < line.size()) {
+    std::copy(end.begin(), end.end(), line.begin() + static_cast<std::ptrdiff_t>(written));
+    written += end.size();
+  }
+  line[written] = 0;
+  return written;
+}
+
+}  // namespace
 
 DataLogFileHandler::DataLogFileHandler(Clock& clock) : clock_(clock), start_tick_(clock.TickMs()) {}
 
@@ -20,7 +82,7 @@ DataLogFileHandler::~DataLogFileHandler() = default;
 void DataLogFileHandler::WriteLine(uint32_t flag, const char* format, ...) {
   if (!Wants(flag)) return;
 
-  std::array<char, kLineCapacity> line;
+  Line line;
   const size_t indentation = Indentation(flag);
   std::fill_n(line.begin(), indentation, ' ');
   const size_t room = line.size() - indentation;
@@ -29,23 +91,47 @@ void DataLogFileHandler::WriteLine(uint32_t flag, const char* format, ...) {
   const int formatted = std::vsnprintf(line.data() + indentation, room, format, arguments);
   va_end(arguments);
   if (formatted < 0) return;  // an argument that cannot be printed at all
-  const size_t length = indentation + std::min(static_cast<size_t>(formatted), room - 1);
+  size_t length = indentation + std::min(static_cast<size_t>(formatted), room - 1);
+  if (HoldsControl(WithoutEnd({line.data(), length}))) length = Escape(line, length);
+  Deliver(flag, line.data(), length);
+}
 
+void DataLogFileHandler::WriteText(uint32_t flag, const char* text) {
+  if (!Wants(flag)) return;
+  Line line;
+  const size_t indentation = Indentation(flag);
+  std::fill_n(line.begin(), indentation, ' ');
+  const std::string_view taken = std::string_view(text).substr(0, line.size() - 1 - indentation);
+  std::copy(taken.begin(), taken.end(), line.begin() + static_cast<std::ptrdiff_t>(indentation));
+  const size_t length = indentation + taken.size();
+  line[length] = 0;
+  Deliver(flag, line.data(), length);
+}
+
+void DataLogFileHandler::Deliver(uint32_t flag, const char* text, size_t length) {
   TextLogCallback callback = nullptr;
   uint32_t handle = 0;
   {
     const std::lock_guard lock(mutex_);
-    WriteToFile(flag, line.data());
+    try {
+      WriteToFile(flag, text);
+    } catch (...) {
+      PassForcedUnwind();  // no memory for the file's name: as when it cannot be opened
+    }
     callback = callback_;
     handle = callback_handle_;
   }
-  if (callback != nullptr) CallBack(callback, handle, flag, {line.data(), length});
+  if (callback != nullptr && !in_callback) CallBack(callback, handle, flag, {text, length});
 }
 
 void DataLogFileHandler::WriteToFile(uint32_t flag, const char* text) {
   if (!logging_started_) return;
   if (!file_ && !file_name_.empty()) file_.reset(OpenToWriteText(file_name_));
   if (!file_) return;  // a file that cannot be opened is not reported: its lines are dropped
+  CallWithoutPipeSignal([&] { WriteStamped(flag, text); });
+}
+
+void DataLogFileHandler::WriteStamped(uint32_t flag, const char* text) {
   if (relative_time_stamps_) {
     std::fprintf(file_.get(), "%d\t", static_cast<int>(clock_.TickMs() - start_tick_));
   } else {
@@ -63,7 +149,9 @@ void DataLogFileHandler::CallBack(TextLogCallback callback, uint32_t handle, uin
   StoreLe(std::span(record), text_log_record::kMilliseconds, clock_.TickMs() - start_tick_);
   text = text.substr(0, text_log_record::kTextCapacity);
   std::copy(text.begin(), text.end(), record.begin() + text_log_record::kText);
-  callback(text_log_record::kSize, record.data(), handle);
+  in_callback = true;
+  const AtExit returned([] { in_callback = false; });
+  CallGuarded([&] { callback(text_log_record::kSize, record.data(), handle); });
 }
 
 void DataLogFileHandler::Start(const char* file_name) {

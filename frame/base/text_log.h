@@ -29,8 +29,11 @@ class DataLogFileHandler {
   // True when a line with this flag would go anywhere: callers test it before building costly texts.
   bool Wants(uint32_t flag) const { return (active_mask_.load(std::memory_order_relaxed) & flag) != 0; }
 
-  // The only path into the log. Callable from any thread; the callback runs outside the internal lock.
+  // The library's path into the log. Callable from any thread; the callback runs outside the internal lock, and what it
+  // causes to be written on its thread goes to the file only. Control characters of the arguments are escaped.
   [[gnu::format(gnu_printf, 3, 4)]] void WriteLine(uint32_t flag, const char* format, ...);
+  // A line of the caller's, as it is.
+  void WriteText(uint32_t flag, const char* text);
 
   void Start(const char* file_name);  // adopts the stored mask; the file opens with the next line, truncated
   void Stop();                        // closes the file; the callback keeps receiving lines
@@ -56,7 +59,9 @@ class DataLogFileHandler {
     bool on;
   };
 
+  void Deliver(uint32_t flag, const char* text, size_t length);
   void WriteToFile(uint32_t flag, const char* text);  // lock held
+  void WriteStamped(uint32_t flag, const char* text);
   void CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text);
 
   Clock& clock_;

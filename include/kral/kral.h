@@ -17,7 +17,10 @@
  * - Any thread may call with any handle; requests of one handle are carried out one after the other. Connect,
  *   disconnect and enumeration are made from one thread. Text-log, queue, time-out and abort calls never wait for a
  *   running request. Callbacks come on the library's own threads and must not call functions that send requests.
- * - No C++ exception leaves a function. Functions are __cdecl on Windows, with undecorated names.
+ * - No C++ exception leaves a function. One that leaves a callback ends there: the operation goes on, or is stopped
+ *   where the callback's result would have decided. On Linux a host may end a thread inside a callback (pthread_exit),
+ *   as interpreters do that are going down. The library's threads run none of the host's signal handlers.
+ * - Functions are __cdecl on Windows, with undecorated names.
  */
 #ifndef KRAL_KRAL_H
 #define KRAL_KRAL_H

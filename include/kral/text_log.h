@@ -8,6 +8,9 @@
  *   categories are written. A new handset's mask is empty until KRAL_SetLogFlags or KRAL_StartLogging.
  * - A line of the file is the time, a tab, and ",CATEGORY,text". The time is minutes:seconds:milliseconds. The name
  *   is that of the lowest bit of the flag. Device lines are indented by four blanks, framing lines by two.
+ * - Control characters in what a line quotes (a handset's texts, an argument) are written as \x and two hexadecimal
+ *   digits, those of UTF-8 (C2 80 to C2 9F) byte by byte; tabs stay. KRAL_AddUserMessageToTextLog writes them as they
+ *   are.
  * - The functions may be called from any thread and never wait for a running request.
  */
 #ifndef KRAL_TEXT_LOG_H
@@ -45,7 +48,8 @@ extern "C" {
 
 /**
  * Takes a line of the log, on the thread that wrote it: a thread of the caller, or one of the connection's own. It
- * must not send requests.
+ * must not send requests. It may call other functions of the library: the lines that these write on its thread, of any
+ * handset, go to the files only and not back to it.
  *
  * | offset | size | field                                                                      |
  * |--------|------|----------------------------------------------------------------------------|
@@ -66,7 +70,7 @@ typedef void(KRAL_CALL* KRAL_TEXT_LOG_CALLBACK)(uint32_t size, const void* recor
  * is not reported, its lines are dropped. While a log is being written, starts the new one in its place.
  *
  * A terminal, the null device, and a pipe that somebody reads already are opened too. Each line then waits until it is
- * taken, and with it the thread that writes it.
+ * taken, and with it the thread that writes it. Lines that nobody reads any more are dropped.
  *
  * @param handle     from a connect function
  * @param file_name  terminated

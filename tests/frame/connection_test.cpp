@@ -3,7 +3,10 @@
 
 #include <algorithm>
 #include <array>
+#include <future>
 #include <string>
+#include <system_error>
+#include <thread>
 #include <vector>
 
 #include "frame/diag_ftm.h"
@@ -14,6 +17,7 @@
 #include "kral/transport.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
+#include "transport/thread_maker.h"
 
 namespace kral {
 namespace {
@@ -29,6 +33,7 @@ class Connection : public testing::Test {
   ~Connection() override {
     KRAL_DisconnectAllServers();
     KRAL_SetTargetType(0);
+    SetThreadMaker({});
   }
 
   KRAL_HANDLE ConnectThroughCable() {
@@ -58,6 +63,35 @@ TEST_F(Connection, ConnectGivesItsHandleWhetherOrNotThePortOpened) {
   const KRAL_HANDLE out_of_range = KRAL_ConnectServer(256);
   EXPECT_NE(out_of_range, 0u);
   EXPECT_EQ(KRAL_IsPhoneConnected(out_of_range), 0);
+}
+
+TEST_F(Connection, ThreadsThatStartLateCostNothing) {
+  std::promise<void> gate;
+  SetThreadMaker([opened = gate.get_future().share()](std::function<void()> body) {
+    return std::thread([opened, body = std::move(body)] {
+      opened.wait();
+      body();
+    });
+  });
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  gate.set_value();
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 0), 4000);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+}
+
+TEST_F(Connection, WithoutADispatcherThreadConnectsFailAndSaySo) {
+  SetThreadMaker([](std::function<void()>) -> std::thread {
+    throw std::system_error(std::make_error_code(std::errc::resource_unavailable_try_again));
+  });
+  EXPECT_EQ(KRAL_ConnectServerWithVerify(kPort), 0u);
+  EXPECT_EQ(ports_.opens().size(), 0u);
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 0), 4000);
+  test::PhoneLog log(handle);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
+  EXPECT_TRUE(log.Has("16 Error. No thread for the dispatcher of port 12."));
+  SetThreadMaker({});
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1) << "as soon as there are threads again";
 }
 
 TEST_F(Connection, PortTakesItsLow16Bits) {

@@ -228,19 +228,58 @@ TEST_F(TextLog, FileThatCannotBeOpenedCostsTheCallbackNothing) {
   EXPECT_TRUE(log_.started_result());
 }
 
-TEST_F(TextLog, CallbackMayWriteIntoTheLog) {
+TEST_F(TextLog, LinesThatTheCallbackCausesGoToTheFileOnly) {
   static DataLogFileHandler* log;
   log = &log_;
-  static int depth;
-  depth = 0;
-  log_.SetFlags(kLogFn);
+  static int calls;
+  calls = 0;
+  log_.Start(folder_.Path("log.txt").c_str());
   log_.SetCallback(
       [](uint32_t, const void*, uint32_t) {
-        if (++depth == 1) log->WriteLine(kLogFn, "again");
+        if (++calls < 100) log->WriteLine(kLogFn, "of the callback");
       },
       0);
   log_.WriteLine(kLogFn, "once");
-  EXPECT_EQ(depth, 2);
+  EXPECT_EQ(calls, 1);
+  log_.WriteLine(kLogFn, "again");
+  EXPECT_EQ(calls, 2);
+  EXPECT_EQ(FileLines("log.txt").size(), 4u);
+}
+
+TEST_F(TextLog, ExceptionOfTheCallbackStaysWithIt) {
+  static int calls;
+  calls = 0;
+  log_.Start(folder_.Path("log.txt").c_str());
+  log_.SetCallback(
+      [](uint32_t, const void*, uint32_t) {
+        ++calls;
+        throw 1;
+      },
+      0);
+  for (int i = 0; i < 2; ++i) EXPECT_NO_THROW(log_.WriteLine(kLogFn, "text"));
+  EXPECT_EQ(calls, 2);
+  EXPECT_EQ(FileLines("log.txt").size(), 2u);
+}
+
+// What a handset calls itself must not pass for a line of the library, nor reach a terminal as a command.
+TEST_F(TextLog, ControlCharactersOfArgumentsAreEscaped) {
+  log_.Start(folder_.Path("log.txt").c_str());
+  log_.WriteLine(kLogFn, "model %s",
+                 "A\n00:00:000\t,LOG_ERR,forged\r\x1B[2J\x7F\xC2\x9B"
+                 "gr\xC3\xBCn");
+  log_.WriteLine(kLogErr, "ERROR:\t%s\n", "B\n");
+  log_.WriteLine(kLogErr, "%s", (std::string(12280, 'x') + std::string(20, '\x1B')).c_str());
+
+  const std::vector<std::string> expected = {
+      "LOG_FN,model A\\x0A00:00:000\t,LOG_ERR,forged\\x0D\\x1B[2J\\x7F\\xC2\\x9Bgr\xC3\xBCn",
+      "LOG_ERR,ERROR:\tB\\x0A",
+      "",  // the second line's own end
+      "LOG_ERR," + std::string(12280, 'x') + "\\x1B\\x1B\\x1B",
+  };
+  const auto lines = FileLines("log.txt");
+  ASSERT_EQ(lines.size(), expected.size());
+  for (size_t i = 0; i < lines.size(); ++i) EXPECT_EQ(lines[i].empty() ? "" : Body(lines[i]), expected[i]);
+  EXPECT_EQ(Text(0), expected[0].substr(7)) << "the callback is given the same";
 }
 
 TEST_F(TextLog, CategoriesAreOffUntilRegisteredAsOn) {

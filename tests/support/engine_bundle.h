@@ -2,6 +2,8 @@
 #ifndef KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
 #define KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
 
+#include <gtest/gtest.h>
+
 #include <chrono>
 #include <memory>
 #include <thread>
@@ -44,19 +46,6 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
   CKralThreadInterface transport;
 };
 
-// Ends the threads with the test, whatever its outcome.
-class EngineGuard {
- public:
-  explicit EngineGuard(std::shared_ptr<EngineBundle> bundle) : bundle_(std::move(bundle)) {}
-  ~EngineGuard() { bundle_->Shut(); }
-  EngineGuard(const EngineGuard&) = delete;
-  EngineGuard& operator=(const EngineGuard&) = delete;
-  EngineBundle* operator->() const { return bundle_.get(); }
-
- private:
-  std::shared_ptr<EngineBundle> bundle_;
-};
-
 template <class Condition>
 bool Eventually(Condition condition, std::chrono::milliseconds limit = std::chrono::seconds(5)) {
   const auto deadline = std::chrono::steady_clock::now() + limit;
@@ -66,6 +55,22 @@ bool Eventually(Condition condition, std::chrono::milliseconds limit = std::chro
   }
   return true;
 }
+
+// Ends the threads with the test, whatever its outcome. On a busy machine that takes longer than a stop may wait: what
+// the threads use of the test must not go before they have.
+class EngineGuard {
+ public:
+  explicit EngineGuard(std::shared_ptr<EngineBundle> bundle) : bundle_(std::move(bundle)) {}
+  ~EngineGuard() {
+    EXPECT_TRUE(Eventually([this] { return bundle_->Shut(); }, std::chrono::seconds(60)));
+  }
+  EngineGuard(const EngineGuard&) = delete;
+  EngineGuard& operator=(const EngineGuard&) = delete;
+  EngineBundle* operator->() const { return bundle_.get(); }
+
+ private:
+  std::shared_ptr<EngineBundle> bundle_;
+};
 
 }  // namespace kral::test
 

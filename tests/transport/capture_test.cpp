@@ -282,6 +282,13 @@ TEST_F(Playback, EndsAsTheFileDoes) {
   EXPECT_FALSE(player_.Start({}, PlayPace::kAtOnce, bundle_->dispatcher, bundle_->sorter, nullptr));
 }
 
+TEST_F(Playback, FailingCallbackCostsNoPacket) {
+  player_.SetCallback([](uint64_t, uint32_t, const uint8_t*, uintptr_t) { throw 1; }, 0);
+  ASSERT_TRUE(Play(Capture({{16, 1}, {31, 1}}), PlayPace::kAtOnce));
+  EXPECT_TRUE(Ends(PlayState::kDone));
+  EXPECT_EQ(bundle_->asynchronous.size(), 2u);
+}
+
 TEST_F(Playback, WaitsForItsReaderAndCanBeStopped) {
   const Packet file = Capture(std::vector<Packet>(5000, Packet{16, 1}));
   ASSERT_TRUE(Play(file, PlayPace::kForLogReader));

@@ -6,6 +6,7 @@
 
 #include "tests/support/engine_bundle.h"
 #include "tests/support/fake_clock.h"
+#include "tests/support/scarce_memory.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {
@@ -165,6 +166,29 @@ TEST(ReceiveThread, FailedOpenLeavesThePortClosedAndSaysSo) {
     EXPECT_FALSE(engine->transport.connected());
     EXPECT_TRUE(Has(engine->log.Take(), line)) << line;
   }
+}
+
+TEST(ReceiveThread, NeedsNoMemoryOnceItRuns) {
+  TestWire wire;
+  EngineGuard engine(EngineBundle::Make(wire.AsDevice(), SystemClock(), 0));
+  constexpr size_t kChunk = 40960;
+  const test::ScarceMemory none(kChunk);
+  ASSERT_TRUE(engine->OpenDevice());
+  wire.ToHost(PlainFrame({1, 2}));
+  EXPECT_TRUE(Eventually([&] { return engine->responses.size() == 1; }));
+}
+
+TEST(WorkerThread, IsParkedWithoutMemory) {
+  ManualResetEvent leave("leave");
+  auto worker = std::make_unique<WorkerThread>();
+  ASSERT_TRUE(worker->Start([&leave] { leave.WaitFor(60000); }, nullptr));
+  {
+    const test::ScarceMemory none(1);
+    worker.reset();
+  }
+  EXPECT_EQ(ReapParkedThreads(), 1u);
+  leave.Set();
+  EXPECT_TRUE(Eventually([] { return ReapParkedThreads() == 0; }));
 }
 
 TEST(ReceiveThread, BlockedReceiveFunctionBoundsTheStopAndTheThreadEndsLater) {

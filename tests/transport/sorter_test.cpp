@@ -116,6 +116,19 @@ TEST_F(Sorter, EveryEventIsLoggedWithItsPayload) {
   EXPECT_EQ(lines[2], "8  Event payload data: 11 22 ");
 }
 
+TEST_F(Sorter, FailingCallbacksCostNoPacket) {
+  static int calls;
+  calls = 0;
+  log_.log()->SetCallback([](uint32_t, const void*, uint32_t) { throw ++calls; }, 0);
+  const auto packet = [](uint32_t, const uint8_t*, uintptr_t) { throw ++calls; };
+  sorter_.SetRawPacketCallback(packet, 0);
+  sorter_.SetCollectionCallbacks({packet, [](const KRAL_EVENT*, uintptr_t) { throw ++calls; }, 0});
+  sorter_.SetCollection(true);
+  sorter_.OnPacket(kReport);
+  EXPECT_EQ(calls, 6) << "three callbacks, and three lines";
+  EXPECT_EQ(Counts(), (Sorted{0, 1, 1}));
+}
+
 TEST_F(Sorter, UnreadEventsDropTheOldest) {
   sorter_.SetCollection(true);
   for (size_t i = 0; i < kQueueCapacity + 1; ++i) sorter_.OnPacket(Packet(kReport));
