@@ -44,7 +44,12 @@ void CImageWriteRsp::Run() {
   auto patience = kHeadStart;
   while (!stop_.WaitFor(0)) {
     try {
-      if (const auto frame = responses_.PopWithin(patience)) receiver.OnFrame(*frame);
+      if (const auto frame = responses_.PopWithin(patience)) {
+        receiver.OnFrame(*frame);
+      } else if (responses_.closed()) {
+        agent_.Fail();  // no reply will come any more
+        break;
+      }
     } catch (...) {
       PassForcedUnwind();
       agent_.Fail();  // out of memory: the reply is lost, and the thread must not be

@@ -30,7 +30,8 @@ int32_t PortState(Diag_FTM& phone) {
   CKralThreadInterface& transport = phone.transport();
   if (transport.null_port()) return KRAL_PORT_OPEN;
   CSerialPort& port = transport.port();
-  if (transport.connected() || phone.port_borrowed()) return port.gone() ? KRAL_PORT_GONE : KRAL_PORT_OPEN;
+  if (port.gone()) return KRAL_PORT_GONE;
+  if (transport.connected() || phone.port_borrowed()) return KRAL_PORT_OPEN;
   if (port.user_defined()) return KRAL_PORT_CLOSED;
   return StateAfter(port.open_result().error);
 }

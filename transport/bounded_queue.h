@@ -69,15 +69,38 @@ class BoundedQueue {
   // came before the call: no signal can be left over from a queue since cleared.
   std::optional<Record> PopWithin(std::chrono::milliseconds time_out) {
     std::unique_lock lock(mutex_);
-    not_empty_.wait_for(lock, time_out, [this] { return closed_ || !records_.empty(); });
+    const uint64_t known = told_interrupts_;
+    not_empty_.wait_for(lock, time_out, [this, known] { return closed_ || interrupts_ != known || !records_.empty(); });
+    if (records_.empty()) told_interrupts_ = interrupts_;
     return TakeFront();
   }
 
-  // Nobody waits in this queue any more.
+  // Nobody waits in this queue until it is opened again; what is in it can be taken.
   void Close() {
     const std::lock_guard lock(mutex_);
     closed_ = true;
     not_empty_.notify_all();
+  }
+  void Reopen() {
+    const std::lock_guard lock(mutex_);
+    closed_ = false;
+  }
+  bool closed() const {
+    const std::lock_guard lock(mutex_);
+    return closed_;
+  }
+
+  // What fills the queue is gone. Ends the waits under way, and the next one that finds nothing: its reader may have
+  // been busy with a record. Those behind it wait as ever, or a reader that tries again and again would never rest.
+  void Interrupt() {
+    const std::lock_guard lock(mutex_);
+    ++interrupts_;
+    not_empty_.notify_all();
+  }
+  // It is back: an interruption that nobody has been told of is none any more.
+  void ForgetInterrupt() {
+    const std::lock_guard lock(mutex_);
+    told_interrupts_ = interrupts_;
   }
 
   void Clear() {
@@ -134,6 +157,8 @@ class BoundedQueue {
   uint64_t pushed_ = 0;
   uint64_t dropped_ = 0;
   bool closed_ = false;
+  uint64_t interrupts_ = 0;
+  uint64_t told_interrupts_ = 0;
 };
 
 using PacketQueue = BoundedQueue<Packet>;

@@ -70,6 +70,18 @@ void CKralEventListener::TakePacket(Packet packet) {
   }
 }
 
+void CKralEventListener::EndWaits() {
+  responses_.Close();
+  asynchronous_.Interrupt();
+  events_.Interrupt();
+}
+
+void CKralEventListener::AllowWaits() {
+  responses_.Reopen();
+  asynchronous_.ForgetInterrupt();
+  events_.ForgetInterrupt();
+}
+
 bool CKralEventListener::IsWatched() const {
   const DataLogFileHandler* const log = log_;
   return has_callbacks_ || (log != nullptr && log->Wants(kLogIo | kLogAsync));

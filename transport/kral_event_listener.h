@@ -66,6 +66,9 @@ class CKralEventListener : public PacketListener {
   // Before the first packet; both outlive the sorter. The texts of events, and where collected packets go as well.
   void SetNames(const NameTables* names) { names_ = names; }
   void SetCapture(CaptureWriter* capture) { capture_ = capture; }
+  // Nothing comes any more, until AllowWaits: waits for a response end at once, and so does one wait for the others.
+  void EndWaits();
+  void AllowWaits();
   // While collection is off, asynchronous packets are dropped.
   void SetCollection(bool on) { collecting_ = on; }
   bool collecting() const { return collecting_; }

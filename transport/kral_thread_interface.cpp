@@ -14,6 +14,9 @@ namespace {
 
 constexpr uint32_t kAcknowledgeMs = 1000;
 
+// What was read from a device before it went is on its way to the queues for microseconds, unless a callback holds it.
+constexpr uint32_t kLastPacketsMs = 20;
+
 bool IsSame(const UserTransport& a, const UserTransport& b) {
   return a.handle == b.handle && a.context == b.context && a.send == b.send && a.receive == b.receive &&
          a.flush == b.flush;
@@ -24,6 +27,10 @@ bool IsSame(const UserTransport& a, const UserTransport& b) {
 CKralThreadInterface::CKralThreadInterface(Clock& clock, DeviceOpener opener)
     : clock_(clock), port_(clock, std::move(opener)), framer_(clock) {
   framer_.SetPort(&port_);
+  loop_.SetGoneHandler([this] {
+    if (log_) log_->WriteLine(kLogErr, "Error. The device has gone: its port is closed");
+    EndWaits();
+  });
 }
 
 CKralThreadInterface::~CKralThreadInterface() {
@@ -89,7 +96,7 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
   if (user_defined_) return BindUserTransport(user);
   // The closing has paused the thread already, unless it was reading a caller's transport.
   if (!QuietThread()) return false;
-  splitter_.DropPartialPacket();  // its rest will not come through another opening
+  BeginTraffic();
   if (!null_port_) return port_.Open(static_cast<int32_t>(port_number)) == 1;
   port_.Close();
   return true;
@@ -99,7 +106,7 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
 bool CKralThreadInterface::BindUserTransport(const UserTransport& user) {
   if (port_.IsOpen() != 0 && port_.user_defined() && IsSame(bound_, user)) return true;
   if (!QuietThread()) return false;
-  splitter_.DropPartialPacket();
+  BeginTraffic();
   bound_ = user;
   return port_.SetUserDefinedTransport(user.context, user.handle, user.send, user.receive, user.flush) == 1;
 }
@@ -135,7 +142,21 @@ bool CKralThreadInterface::Close() {
   connected_ = false;
   PauseThread();
   if (!null_port_) port_.Close();
+  if (port_.gone()) EndWaits();  // a write may have noticed it first
   return true;
+}
+
+// Whoever waits for a device that is gone waits in vain, but for what came before.
+void CKralThreadInterface::EndWaits() {
+  if (sorter_ == nullptr || waits_ended_.exchange(true)) return;
+  if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kLastPacketsMs);
+  sorter_->EndWaits();
+}
+
+void CKralThreadInterface::BeginTraffic() {
+  splitter_.DropPartialPacket();  // its rest will not come through another opening
+  waits_ended_ = false;
+  if (sorter_ != nullptr) sorter_->AllowWaits();
 }
 
 bool CKralThreadInterface::PauseThread() {

@@ -51,7 +51,8 @@ class CKralThreadInterface {
   bool StopThread();
   bool PauseThread();
   void ResumeThread();
-  bool connected() const { return connected_; }
+  // A port whose device is gone counts as closed: the next request opens it again.
+  bool connected() const { return connected_ && !port_.gone(); }
   bool null_port() const { return null_port_; }
 
   void SetOpenFlags(bool send_loopback, bool keep_buffers);
@@ -109,6 +110,8 @@ class CKralThreadInterface {
   bool QuietThread();
   bool RunThread(std::shared_ptr<void> owner);
   void WakeReceiver();
+  void BeginTraffic();  // nothing reads
+  void EndWaits();
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
   Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
@@ -126,6 +129,7 @@ class CKralThreadInterface {
   CKralEventListener* sorter_ = nullptr;
   std::atomic<bool> connected_{false};
   std::atomic<bool> null_port_{false};
+  std::atomic<bool> waits_ended_{false};  // since the port was opened
   bool user_defined_ = false;
   bool paused_ = false;
   std::vector<uint8_t> timed_out_request_;

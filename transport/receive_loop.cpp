@@ -31,12 +31,15 @@ void ReceiveLoop::Run() {
     if (!wake_on_data) SleepByRule();
     if (IsPaused()) {
       if (wake_on_data) control_.WaitForChange(changes_seen, kIdleWaitMs);
-    } else if (!wake_on_data) {
+      continue;
+    }
+    if (!wake_on_data) {
       ReadChunk();
     } else if (WaitForBytes(changes_seen) && !ReadChunk()) {
       // Nothing came from where something was promised, or from a caller's function, which cannot be waited on.
       clock_.SleepMs(1);
     }
+    if (port_.CloseIfGone() && on_gone_) on_gone_();
   }
   if (DataLogFileHandler* const log = log_) {
     log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");

@@ -5,7 +5,9 @@
 #include <atomic>
 #include <condition_variable>
 #include <cstdint>
+#include <functional>
 #include <mutex>
+#include <utility>
 #include <vector>
 
 #include "platform/clock.h"
@@ -30,6 +32,8 @@ class ReceiveLoop {
       : clock_(clock), framer_(framer), port_(port), control_(control), splitter_(splitter) {}
 
   void SetLogger(DataLogFileHandler* log) { log_ = log; }
+  // Before Run. Called on the receive thread when it has found the device gone and closed the port.
+  void SetGoneHandler(std::function<void()> handler) { on_gone_ = std::move(handler); }
   void SetMode(ReceiveMode mode) { mode_ = mode; }
   void SetReadTimeOut(uint32_t milliseconds) { read_time_out_ms_ = milliseconds; }
   void SetSleepDivisor(uint32_t divisor) { sleep_divisor_ = divisor == 0 ? 1 : divisor; }
@@ -54,6 +58,7 @@ class ReceiveLoop {
   CSerialPort& port_;
   ThreadControl& control_;
   ChunkSplitter& splitter_;
+  std::function<void()> on_gone_;
   std::atomic<DataLogFileHandler*> log_{nullptr};
   std::atomic<ReceiveMode> mode_{ReceiveMode::kAsWritten};
   std::atomic<uint32_t> read_time_out_ms_{500};

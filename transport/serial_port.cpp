@@ -70,6 +70,10 @@ uint32_t CSerialPort::Open(int32_t number) {
   std::shared_ptr<SerialDevice> device = OpenDevice(number);
   if (!device) {
     last_error_ = OpenErrorCode(open_result_.error);
+    {
+      const std::lock_guard lock(mutex_);
+      gone_ = gone_ && open_result_.error == DeviceError::kNoSuchPort;
+    }
     if (log) {
       log->WriteLine(kLogErr, "CSerialPort::Open(COM%d) failed: %s (%u)", number, open_result_.text.c_str(),
                      open_result_.system_code);
@@ -78,11 +82,10 @@ uint32_t CSerialPort::Open(int32_t number) {
   }
   Prepare(*device);
   baud_rate_ = device->BaudRate();
+  const std::lock_guard lock(mutex_);
   fine_timer_.emplace();
-  {
-    const std::lock_guard lock(mutex_);
-    device_ = std::move(device);
-  }
+  device_ = std::move(device);
+  gone_ = false;
   open_ = true;
   return 1;
 }
@@ -114,12 +117,11 @@ uint32_t CSerialPort::SetUserDefinedTransport(uintptr_t context, uintptr_t handl
                                               UserReceiveFunction receive, UserFlushFunction flush) {
   Close();
   const bool complete = send != nullptr && receive != nullptr && flush != nullptr;
-  {
-    const std::lock_guard lock(mutex_);
-    user_ = {handle, context, send, receive, flush};
-  }
+  const std::lock_guard lock(mutex_);
+  user_ = {handle, context, send, receive, flush};
   user_defined_ = true;
   if (complete) fine_timer_.emplace();
+  gone_ = false;
   open_ = complete;
   return complete ? 1 : 0;
 }
@@ -129,15 +131,28 @@ uint32_t CSerialPort::IsOpen() const {
 }
 
 uint32_t CSerialPort::Close() {
-  open_ = false;
-  fine_timer_.reset();
   std::shared_ptr<SerialDevice> device;
   {
     const std::lock_guard lock(mutex_);
-    device.swap(device_);
+    device = LetGo();
   }
   if (device) device->Wake();
   return 1;
+}
+
+bool CSerialPort::CloseIfGone() {
+  std::shared_ptr<SerialDevice> device;
+  const std::lock_guard lock(mutex_);
+  if (!device_ || !device_->gone()) return false;
+  device = LetGo();
+  return true;
+}
+
+std::shared_ptr<SerialDevice> CSerialPort::LetGo() {
+  open_ = false;
+  fine_timer_.reset();
+  gone_ = gone_ || (device_ && device_->gone());
+  return std::exchange(device_, nullptr);
 }
 
 bool CSerialPort::SetBaudRate(uint32_t rate) {
@@ -209,8 +224,8 @@ const DeviceResult& CSerialPort::open_result() const {
 }
 
 bool CSerialPort::gone() const {
-  const auto device = Device();
-  return device && device->gone();
+  const std::lock_guard lock(mutex_);
+  return gone_ || (device_ && device_->gone());
 }
 
 bool CSerialPort::CanWait() const {

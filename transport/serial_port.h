@@ -44,9 +44,9 @@ inline constexpr int32_t kPortNotPermitted = -197;
 inline constexpr int32_t kPortNoSuchDevice = -198;
 inline constexpr int32_t kPortOtherError = -200;
 
-// Send belongs to the thread that issues requests, Receive and WaitReadable to the receive thread; Wake may be called
-// from anywhere. Open, Close and the settings are made while nobody receives; should a reader be late to leave, the
-// device lives until it has.
+// Send belongs to the thread that issues requests, Receive, WaitReadable and CloseIfGone to the receive thread; Wake
+// may be called from anywhere. Open, Close and the settings are made while nobody receives; should a reader be late to
+// leave, the device lives until it has.
 class CSerialPort {
  public:
   explicit CSerialPort(Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
@@ -77,7 +77,11 @@ class CSerialPort {
 
   int32_t last_error() const;
   bool user_defined() const;
-  bool gone() const;  // the device has vanished under the open port
+  // The device vanished under the open port, and has not been there since.
+  bool gone() const;
+  // True when this call has closed the port, because its device is gone. At once, and not with the next request: a
+  // device that comes back is the same one again only where nobody holds the old one any more.
+  bool CloseIfGone();
 
   // Wake-on-data receiving: true when bytes may be read; false after the time-out, a Wake, or when there is no
   // device that can be waited on (a caller's transport).
@@ -97,6 +101,7 @@ class CSerialPort {
   uint32_t SendToUser(const uint8_t* bytes, uint32_t count, uint32_t& sent);
   uint32_t ReceiveFromDevice(uint8_t* buffer, uint32_t count, uint32_t& received);
   uint32_t ReceiveFromUser(uint8_t* buffer, uint32_t count, uint32_t& received);
+  std::shared_ptr<SerialDevice> LetGo();  // locked
   int32_t Record(const DeviceResult& result);
 
   Clock& clock_;
@@ -111,9 +116,10 @@ class CSerialPort {
   std::atomic<bool> send_loopback_{false};
   std::atomic<bool> keep_buffers_{false};
   DeviceResult open_result_;
-  std::optional<FineTimer> fine_timer_;
 
-  mutable std::mutex mutex_;  // guards what follows, for the moment of a copy
+  mutable std::mutex mutex_;             // guards what follows, for the moment of a copy
+  std::optional<FineTimer> fine_timer_;  // while the port is open
+  bool gone_ = false;                    // of a device that is no longer held
   std::shared_ptr<SerialDevice> device_;
   UserTransport user_;
 };

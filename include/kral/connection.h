@@ -204,7 +204,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
 #define KRAL_PORT_BUSY 3          /* could not be opened: another program holds it */
 #define KRAL_PORT_NOT_PERMITTED 4 /* could not be opened: not allowed to this user */
 #define KRAL_PORT_FAILED 5        /* could not be opened for another reason; the text log tells which */
-#define KRAL_PORT_GONE 6          /* vanished while it was open */
+#define KRAL_PORT_GONE 6          /* vanished while it was open, and has not been there since */
 
 /**
  * Tells whether the port of a handset is open, and if not why. Opens nothing and sends nothing. A connection through

@@ -1,10 +1,16 @@
 // What a caller is told of a port that is not open.
 #include <gtest/gtest.h>
 
+#include <array>
+#include <chrono>
+#include <future>
 #include <utility>
 
 #include "frame/resource_manager.h"
 #include "kral/connection.h"
+#include "kral/log.h"
+#include "kral/transport.h"
+#include "tests/support/engine_bundle.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/handset_ports.h"
 
@@ -12,6 +18,7 @@ namespace kral {
 namespace {
 
 constexpr uint16_t kPort = 12;
+constexpr uint32_t kTooLong = 20000;  // of a wait that shall end long before
 
 int32_t StateOf(KRAL_HANDLE handle) {
   int32_t state = -1;
@@ -50,6 +57,62 @@ TEST_F(PortStates, FunctionsOfTheCallerAreOpenWhenTheyAreComplete) {
   EXPECT_EQ(StateOf(KRAL_ConnectServer_UserDefinedTransport(301, 0, connection.transport().context(),
                                                             &handset::CallerTransport::Send, nullptr, nullptr)),
             KRAL_PORT_CLOSED);
+}
+
+TEST_F(PortStates, UnplugInIdleClosesThePortAndTheNextRequestOpensItAgain) {
+  for (const uint8_t receive_mode : {0, 1}) {
+    const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+    KRAL_SetReceiveMode(handle, receive_mode);
+    ASSERT_EQ(KRAL_IsPhoneConnected(handle), 1);
+    handset_.HangUp();
+    EXPECT_TRUE(test::Eventually([this] { return !ports_.IsOpen(kPort); })) << "held until the next request";
+    EXPECT_EQ(StateOf(handle), KRAL_PORT_GONE);
+    EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 0) << "it counts as closed";
+    handset_.PlugIn();
+    EXPECT_EQ(StateOf(handle), KRAL_PORT_GONE) << "nobody has opened it yet";
+    EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+    EXPECT_EQ(StateOf(handle), KRAL_PORT_OPEN);
+    KRAL_DisconnectServer(handle);
+  }
+}
+
+TEST_F(PortStates, UnplugEndsEveryWaitAtOnce) {
+  static constexpr uint8_t kRequest = 0x26;
+  const auto send_sync = [](KRAL_HANDLE handle) {
+    std::array<uint8_t, 8> reply{};
+    uint16_t size = reply.size();
+    return KRAL_SendSync(handle, 1, &kRequest, &size, reply.data(), kTooLong);
+  };
+  const auto send_raw = [](KRAL_HANDLE handle) {
+    std::array<uint8_t, 8> reply{};
+    uint16_t size = reply.size();
+    return KRAL_SendRAW(handle, 1, &kRequest, &size, reply.data(), kTooLong);
+  };
+  const auto await_log = [](KRAL_HANDLE handle) {
+    std::array<uint8_t, KRAL_LONGEST_PACKET> packet{};
+    uint16_t size = 0;
+    return KRAL_DIAG_WaitNextPhoneLog(handle, &size, packet.data(), kTooLong);
+  };
+  const auto await_event = [](KRAL_HANDLE handle) {
+    KRAL_EVENT event{};
+    return KRAL_DIAG_WaitNextEvent(handle, &event, kTooLong);
+  };
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  for (const auto request : {+send_sync, +send_raw}) {
+    ASSERT_EQ(KRAL_IsPhoneConnected(handle), 1);
+    handset_.faults().Add(handset::HangUp(), handset::When::Nth(1));
+    const auto start = std::chrono::steady_clock::now();
+    auto log = std::async(std::launch::async, await_log, handle);
+    auto event = std::async(std::launch::async, await_event, handle);
+    EXPECT_EQ(request(handle), 0);
+    EXPECT_EQ(log.get(), 0);
+    EXPECT_EQ(event.get(), 0);
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(kTooLong / 2));
+    EXPECT_EQ(StateOf(handle), KRAL_PORT_GONE) << "and not closed by a time-out";
+    EXPECT_FALSE(ports_.IsOpen(kPort));
+    handset_.faults().Clear();
+    handset_.PlugIn();
+  }
 }
 
 TEST_F(PortStates, MissingOutputGivesZero) {

@@ -3,9 +3,12 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <chrono>
 #include <functional>
 #include <initializer_list>
 #include <thread>
+#include <vector>
 
 namespace kral {
 namespace {
@@ -44,6 +47,34 @@ TEST(BoundedQueue, ClearForgetsRecordsAndTheirSignal) {
   queue.Publish();
   EXPECT_EQ(queue.pushed(), 2u);
   EXPECT_EQ(queue.PopWithin(milliseconds(5)), std::nullopt);
+}
+
+TEST(BoundedQueue, InterruptEndsTheWaitsUnderWayOrTheNextOneThatFindsNothing) {
+  constexpr milliseconds kLong{20000};
+  const auto start = std::chrono::steady_clock::now();
+  PacketQueue queue;
+  std::atomic<int> ended{0};
+  std::vector<std::thread> readers;
+  for (int i = 0; i < 3; ++i) {
+    readers.emplace_back([&] {
+      EXPECT_EQ(queue.PopWithin(kLong), std::nullopt);
+      ++ended;
+    });
+  }
+  while (ended < 3) {  // again for one that had not begun to wait
+    std::this_thread::sleep_for(milliseconds(5));
+    queue.Interrupt();
+  }
+  for (std::thread& reader : readers) reader.join();
+  queue.ForgetInterrupt();
+  queue.Push(Numbered(1));
+  queue.Interrupt();
+  EXPECT_EQ(queue.PopWithin(kLong), Numbered(1));
+  EXPECT_EQ(queue.PopWithin(kLong), std::nullopt);
+  EXPECT_LT(std::chrono::steady_clock::now() - start, kLong / 2);
+  const auto rest = std::chrono::steady_clock::now();
+  EXPECT_EQ(queue.PopWithin(milliseconds(20)), std::nullopt);
+  EXPECT_GE(std::chrono::steady_clock::now() - rest, milliseconds(19)) << "told already";
 }
 
 TEST(BoundedQueue, WaitEndsWithWhatIsPushedOrPublished) {

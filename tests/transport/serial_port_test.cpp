@@ -241,6 +241,29 @@ TEST_F(SerialPortTest, ADriverThatTakesNothingEndsWithTheDeadlineOrTheDevice) {
   EXPECT_TRUE(port_.gone());
 }
 
+TEST_F(SerialPortTest, AVanishedDeviceIsLetGoAndStaysGoneUntilThePortIsThereAgain) {
+  struct Case {
+    DeviceError next_open;
+    bool gone;
+  };
+  for (const Case& c : {Case{DeviceError::kNoSuchPort, true}, Case{DeviceError::kBusy, false},
+                        Case{DeviceError::kNotPermitted, false}, Case{DeviceError::kNone, false}}) {
+    open_failure_ = {};
+    OpenQuietly();
+    EXPECT_FALSE(port_.CloseIfGone());
+    script_.gone = true;
+    EXPECT_TRUE(port_.CloseIfGone());
+    EXPECT_FALSE(port_.CloseIfGone()) << "once";
+    EXPECT_EQ(script_.alive, 0);
+    EXPECT_EQ(port_.IsOpen(), 0u);
+    script_.gone = false;
+    EXPECT_TRUE(port_.gone());
+    open_failure_.error = c.next_open;
+    port_.Open(5);
+    EXPECT_EQ(port_.gone(), c.gone);
+  }
+}
+
 TEST_F(SerialPortTest, ReceiveTakesWhatIsThereUpToTheRoom) {
   OpenQuietly();
   Bytes buffer(8);
