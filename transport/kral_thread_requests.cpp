@@ -57,7 +57,12 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
     if (delay_ms != 0) clock_.SleepMs(delay_ms);
     const uint32_t read_start = clock_.TickMs();
     reply = AwaitNext(room, expected_code, time_out_ms, is_own);
-    if (!reply.came() || (!reply && clock_.TickMs() - read_start > time_out_ms)) TimedOut(request);
+    if (reply.kind() == ReplyKind::kGone) {
+      if (log_) log_->WriteLine(kLogErr, "Request not answered: the device has gone");
+      Close();
+    } else if (!reply.came() || (!reply && clock_.TickMs() - read_start > time_out_ms)) {
+      TimedOut(request);
+    }
     if (log_ && reply) {
       log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
     } else if (log_) {
@@ -142,6 +147,7 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
   const uint32_t start = clock_.TickMs();
   const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (;;) {
+    const bool ended = sorter_->responses().closed();
     if (const auto record = sorter_->responses().Pop()) {
       const size_t count = std::min(record->size(), room.size());
       std::copy_n(record->begin(), count, room.begin());
@@ -150,7 +156,7 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
       }
       return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
     }
-    if (clock_.TickMs() - start >= time_out_ms) return WhyNoReply(garbled_before);
+    if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply(garbled_before);
     clock_.SleepMs(1);
   }
 }
@@ -215,7 +221,7 @@ bool CKralThreadInterface::ReturnToFramedMode() {
 }
 
 bool CKralThreadInterface::FlushRxBuffer() {
-  if (!connected_) return false;
+  if (!connected()) return false;
   // The purge's own result tells nothing: a caller's transport reports 0 for every flush it made.
   if (!null_port_) port_.FlushPCBuffer();
   splitter_.DropPartialPacket();
