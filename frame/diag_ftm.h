@@ -45,7 +45,7 @@ class Diag_FTM {
   Diag_FTM& operator=(const Diag_FTM&) = delete;
 
   // --- Connection -------------------------------------------------------------------------------------------------
-  // Remembers the arguments: a port that is closed later is reopened with those of the last explicit open.
+  // Remembers the caller's functions: a port that is closed later is reopened with them, and otherwise with all zero.
   bool OpenPort(const OpenArguments& arguments);
   bool ClosePort();
   bool IsPhoneConnected();
@@ -168,6 +168,7 @@ class Diag_FTM {
 
   void ApplyDefaults();
   void ReadStationFile();
+  bool Reopen();
   bool Open(const OpenArguments& arguments);
   void OpenThroughServer();
   void OpenDirect(const OpenArguments& arguments);
@@ -197,7 +198,7 @@ class Diag_FTM {
   DownloadSettings download_;
   std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
 
-  OpenArguments last_open_;
+  UserTransport user_;  // of the last explicit open
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
   bool answer_owed_ = false;          // by the handset, to a request that was given up

@@ -24,9 +24,16 @@ constexpr uint32_t kStateAliveWithoutAnswer = 4;
 }  // namespace
 
 bool Diag_FTM::OpenPort(const OpenArguments& arguments) {
-  last_open_ = arguments;
+  user_ = arguments.user;
   GiveBackPort();
   return Open(arguments) || Fail(PortFailure(*this));
+}
+
+// Without the handshake: its answers would be taken for those to the request that the port is opened for.
+bool Diag_FTM::Reopen() {
+  OpenArguments arguments;
+  arguments.user = user_;
+  return Open(arguments);
 }
 
 bool Diag_FTM::Open(const OpenArguments& arguments) {
@@ -69,7 +76,7 @@ void Diag_FTM::OpenDirect(const OpenArguments& arguments) {
 
 bool Diag_FTM::IsPortOpen() {
   if (server_mode()) return !retired_;
-  if (!transport().connected()) Open(last_open_);
+  if (!transport().connected()) Reopen();
   connected_ = transport().connected();
   return connected_;
 }
@@ -81,10 +88,9 @@ CSerialPort* Diag_FTM::BorrowPort() {
   connected_ = false;
   if (!transport().StopThread()) return nullptr;
   transport().SetOpenFlags(false, true);
-  const UserTransport& user = last_open_.user;
-  const bool opened = user.send != nullptr ? port.SetUserDefinedTransport(user.context, user.handle, user.send,
-                                                                          user.receive, user.flush) == 1
-                                           : port.Open(port_) == 1;
+  const bool opened = user_.send != nullptr ? port.SetUserDefinedTransport(user_.context, user_.handle, user_.send,
+                                                                           user_.receive, user_.flush) == 1
+                                            : port.Open(port_) == 1;
   port_borrowed_ = opened;
   return opened ? &port : nullptr;
 }
@@ -131,7 +137,7 @@ void Diag_FTM::Retire() {
 }
 
 bool Diag_FTM::IsPhoneConnected() {
-  if (!connected_) Open(last_open_);
+  if (!connected_) Reopen();
   if (null_port_) return true;
   if (!IsPortOpen()) {
     clock_.SleepMs(1);

@@ -13,7 +13,8 @@
  *   and returned zero-extended.
  * - Values that carry a caller's pointer are uintptr_t. Multi-byte fields of handset records are little-endian.
  * - Calls that send a request may block for the time-out they name (KRAL_ConfigureTimeOut). A request that gets no
- *   answer closes the port; the next request on the handle opens it again with the arguments of the last connect.
+ *   answer closes the port, and so does the handset's going away; the next request on the handle opens it again, with
+ *   the functions of the last connect where it gave any, and without a handshake.
  * - Any thread may call with any handle; requests of one handle are carried out one after the other. Connect,
  *   disconnect and enumeration are made from one thread. Text-log, queue, time-out and abort calls never wait for a
  *   running request. Callbacks come on the library's own threads and must not call functions that send requests.

@@ -275,15 +275,12 @@ TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
   EXPECT_EQ(KRAL_FlushRxBuffer(handle), 0);
   EXPECT_FALSE(ports_.IsOpen(kPort));
   handset_.faults().Clear();
-  // Late answers to the handshake would be taken for those to the requests behind it.
-  for (const uint64_t n : {1u, 2u}) handset_.faults().Add(handset::Ignore(), When::Nth(n));
   KRAL_ConfigureTimeOut(handle, 1, 1000);
   const size_t before = handset_.received().size();
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
   EXPECT_EQ(ports_.opens(), (Ports{kPort, kPort}));
-  const auto received = handset_.received();
-  EXPECT_EQ(received.at(before), 0x7B) << "opened with the arguments of the connect: the handshake frame comes first";
-  EXPECT_EQ(received.size() - before, 3 * 14u + 4) << "two handshake frames, loopback and version";
+  EXPECT_EQ(handset_.received().size() - before, 14u + 4)
+      << "loopback and version: the answers to another handshake would be taken for theirs";
 }
 
 TEST_F(Connection, CallersTransportIsReopenedWithTheSameFunctions) {
