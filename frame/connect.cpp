@@ -42,10 +42,14 @@ KRAL_HANDLE ConnectWithVerify(uint16_t port) {
   return OnPhone(handle, [](Diag_FTM& phone) { return phone.OpenPort({}); }) ? handle : 0;
 }
 
-// The end is compared as it is: where the tick count wraps around before it, the attempts end early. Intended.
-KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms) {
-  Clock& clock = SystemClock();
-  const uint32_t end = clock.TickMs() + wait_ms;
+// The end is compared as it is: where the tick count wraps around before it, the attempts end early. Intended. Where it
+// wraps in the last attempt the time that has passed ends them, or they would go on for another round of the count.
+KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms, Clock& clock) {
+  const uint32_t start = clock.TickMs();
+  const auto has_time = [&clock, start, wait_ms] {
+    const uint32_t now = clock.TickMs();
+    return now < start + wait_ms && now - start < wait_ms;
+  };
   KRAL_HANDLE handle = 0;
   do {
     // Every attempt counts as a connect: the use count of the row grows by one each time.
@@ -54,7 +58,7 @@ KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms) {
         handle != 0 && OnPhone(handle, [](Diag_FTM& phone) { return phone.OpenPort({}) && phone.IsPhoneConnected(); });
     clock.SleepMs(kAttemptIntervalMs);
     if (answers) return handle;
-  } while (clock.TickMs() < end);
+  } while (has_time());
   if (handle != 0) Disconnect(handle);
   return 0;
 }

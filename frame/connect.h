@@ -16,7 +16,7 @@ KRAL_HANDLE Connect(const char* function, uint16_t port, OpenArguments arguments
 KRAL_HANDLE ConnectWithVerify(uint16_t port);
 
 // Tries until the handset answers or the time is up.
-KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms);
+KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms, Clock& clock = SystemClock());
 
 void Disconnect(KRAL_HANDLE handle);
 

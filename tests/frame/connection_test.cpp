@@ -9,12 +9,14 @@
 #include <thread>
 #include <vector>
 
+#include "frame/connect.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "handset/caller_transport.h"
 #include "kral/connection.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"
+#include "tests/support/fake_clock.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
 #include "transport/thread_maker.h"
@@ -124,6 +126,18 @@ TEST_F(Connection, WaitOfZeroMakesOneAttempt) {
 TEST_F(Connection, EachAttemptOfAWaitCounts) {
   EXPECT_EQ(KRAL_ConnectServerWithWait(kNoHandset, 35), 0u);
   EXPECT_TRUE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "one release for several attempts";
+}
+
+TEST_F(Connection, WaitEndsThoughTheTickCountWrapsInItsLastAttempt) {
+  test::FakeClock clock(0xFFFFFF00);
+  int attempts = 0;
+  Kral_ResourceManager::SetDeviceOpener([&](int, DeviceResult& result) {
+    clock.Advance(++attempts < 1000 ? 250 : 0xFFFFFFD0 - clock.TickMs());  // an end for what would have none
+    result.error = DeviceError::kNoSuchPort;
+    return std::unique_ptr<SerialDevice>();
+  });
+  EXPECT_EQ(ConnectWithWait(kNoHandset, 200, clock), 0u);
+  EXPECT_LT(attempts, 10);
 }
 
 TEST_F(Connection, WaitEndsWithTheFirstAnswer) {
