@@ -118,7 +118,7 @@ class FloodLine {
 class FloodDevice final : public SerialDevice {
  public:
   explicit FloodDevice(FloodLine& line) : line_(line) {}
-  size_t Write(std::span<const uint8_t> bytes) override { return line_.Write(bytes); }
+  size_t Write(std::span<const uint8_t> bytes, uint32_t) override { return line_.Write(bytes); }
   size_t OutputRoom() override { return 4096; }
   size_t Read(std::span<uint8_t> buffer) override { return line_.Read(buffer); }
   size_t InputWaiting() override { return 0; }

@@ -26,9 +26,9 @@ class SerialDevice {
  public:
   virtual ~SerialDevice() = default;
 
-  // Writes one piece and waits for its completion or for the write time-outs (1 ms per byte + 50 ms).
-  // Returns the bytes taken by the driver.
-  virtual size_t Write(std::span<const uint8_t> bytes) = 0;
+  // Writes one piece and waits for its completion, or for what is shorter: the time that its bytes may need (1 ms per
+  // byte + 50 ms) or `longest_ms`. Returns the bytes taken by the driver.
+  virtual size_t Write(std::span<const uint8_t> bytes, uint32_t longest_ms) = 0;
 
   // Room in the driver's output queue, of 4,096 bytes; 4,096 when the system cannot tell.
   virtual size_t OutputRoom() = 0;

@@ -109,8 +109,7 @@ void CSerialPort::Prepare(SerialDevice& device) const {
   device.SetDtr(false);
   if (!keep_buffers_) device.PurgeBoth();
   if (!send_loopback_) return;
-  device.Write(kLoopbackFrame);
-  device.Write(kLoopbackFrame);
+  for (int i = 0; i < 2; ++i) device.Write(kLoopbackFrame, write_timeout_);
 }
 
 uint32_t CSerialPort::SetUserDefinedTransport(uintptr_t context, uintptr_t handle, UserSendFunction send,

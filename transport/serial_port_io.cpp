@@ -54,7 +54,10 @@ uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_
   const uint32_t time_out = write_timeout_;
   do {
     const uint32_t piece = std::min(count - sent, limit);
-    const auto taken = static_cast<uint32_t>(std::min<size_t>(device->Write({bytes + sent, piece}), piece));
+    const uint32_t left = time_out - std::min(clock_.TickMs() - start, time_out);
+    // A millisecond even so: a driver may be done with a piece as good as at once.
+    const size_t written = device->Write({bytes + sent, piece}, std::max(left, 1U));
+    const auto taken = static_cast<uint32_t>(std::min<size_t>(written, piece));
     sent += taken;
     if (clock_.TickMs() - start > time_out) {
       // A late write counts as failed even if everything was written: the reply could no longer be told from the

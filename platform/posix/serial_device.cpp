@@ -64,7 +64,7 @@ class Tty final : public SerialDevice {
   Tty(FileDescriptor fd, WakeEvent wake) : fd_(std::move(fd)), wake_(std::move(wake)) {}
   ~Tty() override;
 
-  size_t Write(std::span<const uint8_t> bytes) override;
+  size_t Write(std::span<const uint8_t> bytes, uint32_t longest_ms) override;
   size_t OutputRoom() override { return kDriverBuffer - std::min(Queued(), kDriverBuffer); }
   size_t Read(std::span<uint8_t> buffer) override;
   size_t InputWaiting() override;
@@ -86,15 +86,16 @@ class Tty final : public SerialDevice {
   FileDescriptor fd_;
   WakeEvent wake_;
   std::atomic<bool> gone_{false};
+  std::atomic<bool> stalled_{false};  // the last write ran out of time
   uint32_t baud_rate_ = kFirstBaudRate;
 };
 
-// A close with bytes still queued may block for half a minute in the kernel: give them the time of a write, no more.
+// A close with bytes still queued may block for half a minute in the kernel: give them the time of a write, no more,
+// and none where they have just had it.
 Tty::~Tty() {
   const size_t queued = Queued();
-  if (queued > 0 && !WaitQueueBelow(1, steady_clock::now() + milliseconds(queued) + kWriteConstant)) {
-    ::tcflush(fd_.get(), TCOFLUSH);
-  }
+  const auto time = stalled_ ? milliseconds(0) : milliseconds(queued) + kWriteConstant;
+  if (queued > 0 && !WaitQueueBelow(1, steady_clock::now() + time)) ::tcflush(fd_.get(), TCOFLUSH);
   ::ioctl(fd_.get(), TIOCNXCL);
 }
 
@@ -114,9 +115,11 @@ bool Tty::WaitQueueBelow(size_t level, steady_clock::time_point deadline) const 
 
 // Done when the driver holds the bytes; where it holds a whole buffer of them, when it has room again, as the end of
 // a write means room on the other home.
-size_t Tty::Write(std::span<const uint8_t> bytes) {
-  const auto deadline = steady_clock::now() + milliseconds(bytes.size()) + kWriteConstant;
+size_t Tty::Write(std::span<const uint8_t> bytes, uint32_t longest_ms) {
+  const auto deadline =
+      steady_clock::now() + std::min(milliseconds(bytes.size()) + kWriteConstant, milliseconds(longest_ms));
   size_t done = 0;
+  stalled_ = false;
   while (done < bytes.size() && !gone_) {
     const ssize_t written = ::write(fd_.get(), bytes.data() + done, bytes.size() - done);
     if (written > 0) {
@@ -130,9 +133,11 @@ size_t Tty::Write(std::span<const uint8_t> bytes) {
     }
     const auto left = std::chrono::ceil<milliseconds>(deadline - steady_clock::now()).count();
     std::array<pollfd, 1> watched = {{{fd_.get(), POLLOUT, 0}}};
-    if (left <= 0 || !PollFor(watched, static_cast<uint32_t>(left))) break;
+    if (left > 0 && PollFor(watched, static_cast<uint32_t>(left))) continue;
+    stalled_ = true;
+    break;
   }
-  WaitQueueBelow(kDriverBuffer, deadline);
+  if (!WaitQueueBelow(kDriverBuffer, deadline)) stalled_ = true;
   return done;
 }
 

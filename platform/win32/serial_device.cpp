@@ -86,7 +86,7 @@ class ComPort final : public SerialDevice {
         wake_(std::move(wake)),
         pending_(file_.get()) {}
 
-  size_t Write(std::span<const uint8_t> bytes) override;
+  size_t Write(std::span<const uint8_t> bytes, uint32_t longest_ms) override;
   size_t OutputRoom() override;
   size_t Read(std::span<uint8_t> buffer) override;
   size_t InputWaiting() override;
@@ -136,13 +136,13 @@ size_t ComPort::Finish(BOOL started, OVERLAPPED& overlapped, DWORD longest) {
   return 0;
 }
 
-size_t ComPort::Write(std::span<const uint8_t> bytes) {
+size_t ComPort::Write(std::span<const uint8_t> bytes, uint32_t longest_ms) {
   if (gone_) return 0;
   OVERLAPPED overlapped{};
   overlapped.hEvent = write_event_.get();
   const auto count = static_cast<DWORD>(bytes.size());
   const BOOL started = ::WriteFile(file_.get(), bytes.data(), count, nullptr, &overlapped);
-  return Finish(started, overlapped, count + kWriteGrace);
+  return Finish(started, overlapped, std::min<DWORD>(count + kWriteGrace, longest_ms));
 }
 
 size_t ComPort::Read(std::span<uint8_t> buffer) {
@@ -194,6 +194,10 @@ void ComPort::Purge(DWORD what) {
 
 bool ComPort::WaitReadable(uint32_t milliseconds) {
   using std::chrono::steady_clock;
+  if (gone_) {  // known, so the caller's loop must not spin; who finds it out below is told at once
+    ::WaitForSingleObject(wake_.get(), milliseconds);
+    return false;
+  }
   const auto deadline = steady_clock::now() + std::chrono::milliseconds(milliseconds);
   auto left = static_cast<DWORD>(milliseconds);
   if (InputWaiting() > 0) return true;
@@ -214,7 +218,6 @@ bool ComPort::WaitReadable(uint32_t milliseconds) {
     left = static_cast<DWORD>(std::clamp<int64_t>(rest, 0, milliseconds));
     if (left == 0) return false;
   }
-  ::WaitForSingleObject(wake_.get(), left);
   return false;
 }
 

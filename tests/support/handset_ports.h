@@ -88,7 +88,9 @@ class HandsetPorts {
       const std::lock_guard lock(state_->mutex);
       state_->open.erase(port_);
     }
-    size_t Write(std::span<const uint8_t> bytes) override { return handset_->FromHost(bytes) ? bytes.size() : 0; }
+    size_t Write(std::span<const uint8_t> bytes, uint32_t) override {
+      return handset_->FromHost(bytes) ? bytes.size() : 0;
+    }
     size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override { return handset_->ToHost(buffer); }
     size_t InputWaiting() override { return 0; }

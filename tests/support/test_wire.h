@@ -71,7 +71,7 @@ class TestWire {
   class Device final : public SerialDevice {
    public:
     explicit Device(TestWire& wire) : wire_(wire) {}
-    size_t Write(std::span<const uint8_t> bytes) override { return wire_.Write(bytes); }
+    size_t Write(std::span<const uint8_t> bytes, uint32_t) override { return wire_.Write(bytes); }
     size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override { return wire_.Read(buffer); }
     size_t InputWaiting() override { return 0; }

@@ -32,6 +32,7 @@ struct Script {
 
   Bytes written;
   std::vector<size_t> pieces;
+  std::vector<uint32_t> times;  // that each piece was given
   std::vector<std::string> calls;
   int alive = 0;
 };
@@ -41,9 +42,10 @@ class FakeDevice : public SerialDevice {
   FakeDevice(Script& script, FakeClock& clock) : script_(script), clock_(clock) { ++script_.alive; }
   ~FakeDevice() override { --script_.alive; }
 
-  size_t Write(std::span<const uint8_t> bytes) override {
+  size_t Write(std::span<const uint8_t> bytes, uint32_t longest_ms) override {
     if (script_.throws) throw std::runtime_error("write");
     script_.pieces.push_back(bytes.size());
+    script_.times.push_back(longest_ms);
     const size_t taken = std::min(bytes.size(), script_.takes_at_most);
     script_.written.insert(script_.written.end(), bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(taken));
     clock_.Advance(script_.write_takes_ms);
@@ -215,6 +217,15 @@ TEST_F(SerialPortTest, ALateWriteCountsAsFailedThoughAllOfItWasWritten) {
     EXPECT_EQ(port_.Send(bytes.data(), 10), c.sent) << c.takes_ms << " of " << c.time_out;
     EXPECT_EQ(script_.written.size(), 10u);
   }
+}
+
+TEST_F(SerialPortTest, APieceHasWhatIsLeftOfTheTimeOut) {
+  OpenQuietly();
+  port_.SetWriteSizeLimit(4);
+  script_.write_takes_ms = 150;
+  const Bytes bytes(12);
+  EXPECT_EQ(port_.Send(bytes.data(), 12), 0u);
+  EXPECT_EQ(script_.times, (std::vector<uint32_t>{300, 150, 1}));
 }
 
 TEST_F(SerialPortTest, PartialWritesGoOnWhileTheDriverHasRoom) {

@@ -28,7 +28,7 @@ std::unique_ptr<SerialDevice> OpenDevice(const std::string& path) {
 }
 
 std::string Ask(SerialDevice& device, std::string_view request) {
-  device.Write(EncodeFrame(FromHex(request)));
+  device.Write(EncodeFrame(FromHex(request)), 5000);
   FrameDecoder decoder;
   std::optional<Bytes> payload;
   Bytes buffer(4096);

@@ -13,6 +13,7 @@
 #include "platform/environment.h"
 #include "platform/pseudo_terminal.h"
 #include "tests/support/temp_folder.h"
+#include "transport/serial_port.h"
 
 namespace kral {
 namespace {
@@ -71,7 +72,7 @@ class SerialDeviceTest : public testing::Test {
 TEST_F(SerialDeviceTest, EveryByteValuePassesUnchangedBothWays) {
   Bytes all(256);
   std::iota(all.begin(), all.end(), uint8_t{0});
-  EXPECT_EQ(near_->Write(all), all.size());
+  EXPECT_EQ(near_->Write(all, kLong), all.size());
   EXPECT_EQ(ReadAll(*far_, all.size()), all);
   EXPECT_EQ(far_->Write(all), all.size());
   EXPECT_EQ(ReadAll(*near_, all.size()), all);
@@ -131,7 +132,7 @@ TEST_F(SerialDeviceTest, AVanishedWireIsNoticedAndDoesNotSpin) {
   while (!near_->gone() && near_->WaitReadable(kLong)) near_->Read(buffer);
   EXPECT_TRUE(near_->gone());
   EXPECT_EQ(near_->Read(buffer), 0u);
-  EXPECT_EQ(near_->Write(buffer), 0u);
+  EXPECT_EQ(near_->Write(buffer, kLong), 0u);
   EXPECT_GE(TimeOf([this] { EXPECT_FALSE(near_->WaitReadable(20)); }), milliseconds(19));
 }
 
@@ -140,10 +141,24 @@ TEST_F(SerialDeviceTest, AWriteThatNobodyTakesEndsInItsTime) {
   size_t taken = piece.size();
   milliseconds last{};
   for (int i = 0; i < 1000 && taken == piece.size(); ++i) {
-    last = TimeOf([&] { taken = near_->Write(piece); });
+    last = TimeOf([&] { taken = near_->Write(piece, kLong); });
   }
   EXPECT_LT(taken, piece.size());
   EXPECT_GE(last, milliseconds(249));
+}
+
+TEST_F(SerialDeviceTest, ARequestThatNobodyReadsIsOverWithItsTimeOut) {
+  near_.reset();
+  CSerialPort port;
+  ASSERT_EQ(port.Open(kNumber), 1u);
+  port.SetWriteTimeout(100);
+  const Bytes request(16000);
+  EXPECT_LT(TimeOf([&] {
+              EXPECT_LT(port.Send(request.data(), 16000), 16000u);
+              port.Close();
+            }),
+            milliseconds(2000))
+      << "not the 4 s that a piece of it may need";
 }
 
 TEST_F(SerialDeviceTest, PurgingDropsWhatHasBeenReceived) {

@@ -65,7 +65,7 @@ class ComPortTest : public testing::Test {
 
 TEST_F(ComPortTest, BytesGoBothWaysInBothReceiveModesInAnyOrder) {
   for (const bool waiting : {false, true, true, false, true, false, false}) {
-    ASSERT_EQ(port_->Write(kLoopback), kLoopback.size());
+    ASSERT_EQ(port_->Write(kLoopback, 5000), kLoopback.size());
     EXPECT_EQ(ReadAll(kLoopback.size(), waiting), kLoopback);
     EXPECT_EQ(port_->InputWaiting(), 0u);
   }
@@ -92,7 +92,7 @@ TEST_F(ComPortTest, AWaitEndsWithAWakeOrItsTime) {
 }
 
 TEST_F(ComPortTest, PurgingDropsWhatAWaitHasAlreadyTaken) {
-  ASSERT_EQ(port_->Write(kLoopback), kLoopback.size());
+  ASSERT_EQ(port_->Write(kLoopback, 5000), kLoopback.size());
   ASSERT_TRUE(port_->WaitReadable(kLong));
   std::this_thread::sleep_for(milliseconds(50));
   port_->PurgeInput();
