@@ -97,6 +97,8 @@ Tty::~Tty() {
   const auto time = stalled_ ? milliseconds(0) : milliseconds(queued) + kWriteConstant;
   if (queued > 0 && !WaitQueueBelow(1, steady_clock::now() + time)) ::tcflush(fd_.get(), TCOFLUSH);
   ::ioctl(fd_.get(), TIOCNXCL);
+  // The lock ends with the last copy of the descriptor, and children of a fork have one each.
+  ::flock(fd_.get(), LOCK_UN);
 }
 
 size_t Tty::Queued() const {

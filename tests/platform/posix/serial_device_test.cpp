@@ -3,7 +3,11 @@
 
 #include <gtest/gtest.h>
 
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <array>
 #include <chrono>
 #include <numeric>
 #include <optional>
@@ -96,6 +100,24 @@ TEST_F(SerialDeviceTest, ASecondOpenerIsBusyUntilTheFirstCloses) {
   near_.reset();
   EXPECT_TRUE(Open());
   EXPECT_EQ(opened_, DeviceError::kNone);
+}
+
+TEST_F(SerialDeviceTest, AChildOfAForkDoesNotKeepThePortBusy) {
+  std::array<int, 2> pipe{};
+  ASSERT_EQ(::pipe(pipe.data()), 0);
+  const pid_t child = ::fork();
+  ASSERT_GE(child, 0);
+  if (child == 0) {
+    ::close(pipe[1]);
+    char byte = 0;
+    [[maybe_unused]] const auto end = ::read(pipe[0], &byte, 1);  // until the parent has closed its end
+    ::_exit(0);
+  }
+  ::close(pipe[0]);
+  near_.reset();
+  EXPECT_TRUE(Open()) << "the child still has its copy of the descriptor";
+  ::close(pipe[1]);
+  ::waitpid(child, nullptr, 0);
 }
 
 TEST_F(SerialDeviceTest, WhatIsNoSerialDeviceIsNoSuchPort) {
