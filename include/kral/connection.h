@@ -6,8 +6,10 @@
  *
  * - A connect takes one of 50 contexts, one per port. A second connect to the same port gives the same handle and
  *   counts: the context and its connection live until every connect has been released.
- * - Connect, disconnect and enumeration are made from one thread. A disconnect waits until a request that another
- *   thread is running on the handset has ended.
+ * - Any thread may connect and disconnect, several at the same time as well. A disconnect waits until a request that
+ *   another thread is running on the handset has ended. KRAL_GetAvailablePhonesPortList and a connect to KRAL_PORT_ANY
+ *   close every connection of the process, those of other threads too; a handset that another thread connects meanwhile
+ *   may find its port closed again, and opens it with its next request.
  * - Release every handle before the library is unloaded.
  */
 #ifndef KRAL_CONNECTION_H
@@ -150,8 +152,11 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_
 
 /**
  * Functions of a caller-supplied transport. Each is given the caller's two values first and returns 0 for success.
- * The send function runs on the thread that makes a request, the receive function on the receive thread of the
- * connection; both may run at the same time.
+ *
+ * The send function runs on the thread that makes a request. The receive function runs on the receive thread of the
+ * connection, and on the calling thread while that one is paused or stopped: in KRAL_SetPacketMode from 1 to 0 and in
+ * the boot transfer (kivrat.h). The flush function runs on the calling thread, in KRAL_FlushRxBuffer and in the same
+ * two. Send or flush and the receive function may run at the same time; none runs twice at a time.
  */
 /** Writes `count` bytes; `*written` is preset to `count`. */
 typedef uint32_t(KRAL_CALL* KRAL_SEND_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t count,
@@ -169,7 +174,8 @@ typedef uint32_t(KRAL_CALL* KRAL_FLUSH_FUNCTION)(uintptr_t context, uintptr_t tr
  * @param port       number of the context; KRAL_PORT_NULL is the null port even here
  * @param transport  the caller's handle of the transport, handed to each function
  * @param context    another value of the caller, handed to each function in front
- * @param send, receive, flush  all three are needed for the connection to open
+ * @param send  null: the COM port of that number is opened, as KRAL_ConnectServer does
+ * @param receive, flush  both are needed beside a send function for the connection to open
  * @return the handle; 0 when all 50 contexts are taken
  */
 KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer_UserDefinedTransport(uint32_t port, uintptr_t transport,

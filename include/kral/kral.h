@@ -15,9 +15,9 @@
  * - Calls that send a request may block for the time-out they name (KRAL_ConfigureTimeOut). A request that gets no
  *   answer closes the port, and so does the handset's going away; the next request on the handle opens it again, with
  *   the functions of the last connect where it gave any, and without a handshake.
- * - Any thread may call with any handle; requests of one handle are carried out one after the other. Connect,
- *   disconnect and enumeration are made from one thread. Text-log, queue, time-out and abort calls never wait for a
- *   running request. Callbacks come on the library's own threads and must not call functions that send requests.
+ * - Any thread may call with any handle, connect and disconnect; requests of one handle are carried out one after the
+ *   other. Text-log, queue, time-out and abort calls never wait for a running request. Callbacks come on the library's
+ *   own threads and must not call functions that send requests.
  * - No C++ exception leaves a function. One that leaves a callback ends there: the operation goes on, or is stopped
  *   where the callback's result would have decided. On Linux a host may end a thread inside a callback (pthread_exit),
  *   as interpreters do that are going down. The library's threads run none of the host's signal handlers.

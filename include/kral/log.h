@@ -79,7 +79,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextPhoneLog(KRAL_HANDLE handle, uint16_
  * @param[out] size         as above
  * @param[out] buffer       as above
  * @param      time_out_ms  0 does not wait
- * @return 1, or 0 when no packet came in time
+ * @return 1, or 0 when no packet came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer,
                                                       uint32_t time_out_ms);
@@ -111,7 +111,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT
  * @param      handle       from a connect function; released meanwhile, it ends the wait
  * @param[out] event        the event
  * @param      time_out_ms  0 does not wait
- * @return 1, or 0 when no event came in time
+ * @return 1, or 0 when no event came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event, uint32_t time_out_ms);
 

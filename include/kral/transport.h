@@ -5,8 +5,10 @@
  * Beside the rules of kral.h:
  *
  * - A request is framed by the library: flag bytes, escapes and FCS are not part of what is given here.
- * - A closed port is opened again by the three send functions and by a packet mode that the handset must agree to;
- *   the other functions give 0 while the port is closed.
+ * - A closed port is opened again by the three send functions and by a packet mode that the handset must agree to.
+ *   KRAL_FlushRxBuffer, KRAL_SetDTR_State and KRAL_SetRTS_State give 0 while the port is closed; what only sets
+ *   something works then as well.
+ * - Time-out 7 bounds the writing of a whole request to a port; a caller's send function takes its own time.
  * - One request of a handle is on its way at a time: a call waits until one of another thread has ended.
  */
 #ifndef KRAL_TRANSPORT_H
