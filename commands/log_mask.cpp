@@ -6,6 +6,7 @@
 
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 #include "transport/name_table.h"
 
 namespace kral::diag {
@@ -19,9 +20,20 @@ Reply Configure(Diag_FTM& phone, const Row& row, uint32_t first_word, size_t dat
   return Send(phone, row, fields...);
 }
 
-Reply SetLogMask(Diag_FTM& phone, uint8_t equipment_id, const BitMask& mask) {
-  return Configure(phone, kSetLogMask, equipment_id, log_config_reply::kMaskHeader + mask.bytes().size(),
-                   u32{equipment_id}, static_cast<u32>(mask.bits()), mask.bytes());
+// A reply has a status in front of its data or has none; only its length tells which. A refusal is noted.
+bool IsDone(std::span<const uint8_t> response, size_t data_size) {
+  constexpr size_t kStatusAt = log_config_reply::kHeader;
+  if (response.size() != kStatusAt + log_config_reply::kStatus + data_size) return true;
+  const uint32_t status = *LoadLe<uint32_t>(response, kStatusAt);
+  return status == 0 || Fail(Failure(KRAL_ERROR_REFUSED, "the handset refused the log configuration: status %u", status)
+                                 .Status(KRAL_ERROR_STATUS_COMMAND, status));
+}
+
+bool SetLogMask(Diag_FTM& phone, uint8_t equipment_id, const BitMask& mask) {
+  const size_t data_size = log_config_reply::kMaskHeader + mask.bytes().size();
+  return Configure(phone, kSetLogMask, equipment_id, data_size, u32{equipment_id}, static_cast<u32>(mask.bits()),
+                   mask.bytes()) &&
+         IsDone(phone.packet().response(), data_size);  // it repeats what was set
 }
 
 bool IsMaskPossible(uint32_t items) {
@@ -61,21 +73,35 @@ std::optional<uint32_t> GetItems(Diag_FTM& phone, uint8_t equipment_id) {
   return (*ranges)[equipment_id];
 }
 
+struct Asked {
+  uint32_t equipment_id;
+  uint32_t items;
+};
+
 struct ToldMask {
   uint32_t equipment_id;
   uint32_t items;
   std::span<const uint8_t> bytes;
 };
 
-// The mask ends the reply, and a status may stand in front of it: it begins where its number of items fits the rest.
-std::optional<ToldMask> FindMask(std::span<const uint8_t> response) {
-  constexpr size_t kHeader = log_config_reply::kMaskHeader;
-  for (size_t at = log_config_reply::kHeader; at + kHeader <= response.size(); ++at) {
+// The mask ends the reply exactly, behind its header; in front of that there may be a status. Anywhere else, or with
+// more or fewer bytes than it announces, nothing tells a header from mask bytes that look like one.
+// What is wrong has been noted.
+std::optional<ToldMask> FindMask(Diag_FTM& phone, const Asked& asked) {
+  const auto response = phone.packet().response();
+  for (const size_t at : {log_config_reply::kHeader, log_config_reply::kHeader + log_config_reply::kStatus}) {
+    if (at + log_config_reply::kMaskHeader > response.size()) break;
     const auto tail = response.subspan(at);
-    const uint32_t items = *LoadLe<uint32_t>(tail, sizeof(uint32_t));
-    const auto bytes = tail.subspan(kHeader);
-    if (BitMask::BytesFor(items) == bytes.size()) return ToldMask{*LoadLe<uint32_t>(tail), items, bytes};
+    const ToldMask told{*LoadLe<uint32_t>(tail), *LoadLe<uint32_t>(tail, sizeof(uint32_t)),
+                        tail.subspan(log_config_reply::kMaskHeader)};
+    if (told.equipment_id < kEquipmentIds && BitMask::BytesFor(told.items) == told.bytes.size()) {
+      return IsDone(response, tail.size()) ? std::optional(told) : std::nullopt;
+    }
+    // The header that was to come, with a mask that does not fit. (A status and an equipment id are no such header.)
+    const bool is_header = told.equipment_id == asked.equipment_id && told.items == asked.items;
+    if (is_header && asked.items >= kEquipmentIds) break;
   }
+  Fail(BadReply(phone, "holds no mask of the length that it tells"));
   return std::nullopt;
 }
 
@@ -85,6 +111,7 @@ std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone)
   if (!Configure(phone, kRetrieveLogRanges, 0, 0)) return std::nullopt;
   const auto response = phone.packet().response();
   if (response.size() < log_config_reply::kHeader + log_config_reply::kRanges) return std::nullopt;
+  if (!IsDone(response, log_config_reply::kRanges)) return std::nullopt;
   const auto tail = response.last(log_config_reply::kRanges);
   std::array<uint32_t, kEquipmentIds> ranges{};
   for (size_t i = 0; i < ranges.size(); ++i) ranges[i] = *LoadLe<uint32_t>(tail, i * sizeof(uint32_t));
@@ -95,7 +122,7 @@ std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_
   if (!IsMaskPossible(items) || !Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) {
     return std::nullopt;
   }
-  const auto told = FindMask(phone.packet().response());
+  const auto told = FindMask(phone, {equipment_id, items});
   if (!told) return std::nullopt;
   BitMask mask(items);
   if (told->equipment_id != equipment_id) {
@@ -157,7 +184,7 @@ bool ClearAllLogCodes(Diag_FTM& phone, uint8_t equipment_id) {
   const auto items = GetItems(phone, equipment_id);
   // Only told, with another function's name: the handset is then sent a mask without bits. Kept.
   if (!items) phone.log().WriteLine(kLogErr, "KRAL_DIAG_AddExtendedLogCodes() -- failed to get log range");
-  return static_cast<bool>(SetLogMask(phone, equipment_id, BitMask(items.value_or(0))));
+  return SetLogMask(phone, equipment_id, BitMask(items.value_or(0)));
 }
 
 }  // namespace kral::diag

@@ -42,6 +42,7 @@ inline constexpr u32 kItemsPerEquipmentId = 4096;
 
 namespace log_config_reply {
 inline constexpr std::size_t kHeader = 8;
+inline constexpr std::size_t kStatus = 4;                  // some handsets; 0: done
 inline constexpr std::size_t kRanges = 4 * kEquipmentIds;  // at the end: the number of items of each equipment id
 inline constexpr std::size_t kMaskHeader = 8;  // equipment id and bits, in front of the mask, which ends the reply
 }  // namespace log_config_reply

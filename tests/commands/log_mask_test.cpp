@@ -156,6 +156,12 @@ std::string Ranges(const std::string& of_equipment_1) {
   return text;
 }
 
+// A mask whose reply always has the same length.
+std::string Area(std::string reply) {
+  for (int i = 2; i < 512; ++i) reply += " 00";
+  return reply;
+}
+
 // Each answer to the request for ranges is followed, where there is one, by the answer to that for the mask.
 TEST_F(Masks, AnswersThatCannotBeTrustedChangeNothing) {
   const std::string good = Ranges("09 00 00 00");
@@ -176,7 +182,13 @@ TEST_F(Masks, AnswersThatCannotBeTrustedChangeNothing) {
       {"longer mask of another one", good, "73 00 00 00 04 00 00 00 02 00 00 00 11 00 00 00 81 01 01", "02 00"},
       {"mask that fits nothing", good, "73 00 00 00 04 00 00 00 02 00 00 00 11 00 00 00 81 01", nullptr},
       {"mask", good, "73 00 00 00 04 00 00 00 01 00 00 00 09 00 00 00 81 01", "83 01"},
-      {"mask behind a status", good, "73 00 00 00 04 00 00 00 77 77 77 77 01 00 00 00 09 00 00 00 81 01", "83 01"},
+      {"mask behind a status", good, "73 00 00 00 04 00 00 00 00 00 00 00 01 00 00 00 09 00 00 00 81 01", "83 01"},
+      {"status of a refusal", good, "73 00 00 00 04 00 00 00 02 00 00 00 01 00 00 00 09 00 00 00 81 01", nullptr},
+      {"a byte too many, zeros at its end", Ranges("40 00 00 00"),
+       "73 00 00 00 04 00 00 00 01 00 00 00 40 00 00 00 81 00 00 00 00 00 00 00 00", nullptr},
+      {"mask bytes that look like a header", Ranges("40 00 00 00"),
+       "73 00 00 00 04 00 00 00 01 00 00 00 40 00 00 00 21 00 00 00 00 00 00 00 01", nullptr},
+      {"mask in an area of 512 bytes", good, Area("73 00 00 00 04 00 00 00 01 00 00 00 09 00 00 00 81 01"), nullptr},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -190,6 +202,15 @@ TEST_F(Masks, AnswersThatCannotBeTrustedChangeNothing) {
   }
   EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes() -- failed to get log range"), 4u);
   EXPECT_EQ(CountLines(16, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask"), 2u);
+
+  handset().Expect("73 00 00 00 01 00 00 00").Reply(good);
+  handset()
+      .Expect("73 00 00 00 04 00 00 00 01 00 00 00")
+      .Reply("73 00 00 00 04 00 00 00 01 00 00 00 09 00 00 00 81 01");
+  handset()
+      .Expect("73 00 00 00 03 00 00 00 01 00 00 00 09 00 00 00 83 01")
+      .Reply("73 00 00 00 03 00 00 00 02 00 00 00 01 00 00 00 09 00 00 00 83 01");
+  EXPECT_EQ(KRAL_DIAG_AddExtendedLogCode(handle(), 1, 0x1001), 0) << "the mask is refused by a status";
 
   uint32_t bits = 7;
   std::array<uint8_t, 16> mask{};
