@@ -13,6 +13,10 @@ constexpr size_t kBufferSize = 0x10000;
 
 }  // namespace
 
+void TextFile::Closer::operator()(std::FILE* file) const {
+  CloseStream(file);
+}
+
 bool TextFile::OpenForReading(const std::string& path) {
   file_.reset(OpenToRead(path));
   return file_ != nullptr;
@@ -25,7 +29,7 @@ bool TextFile::OpenForWriting(const std::string& path) {
 
 bool TextFile::Close() {
   std::FILE* file = file_.release();
-  return file == nullptr || std::fclose(file) == 0;
+  return file == nullptr || CloseStream(file);
 }
 
 size_t TextFile::Read(std::span<char> buffer) {

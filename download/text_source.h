@@ -39,7 +39,7 @@ class TextFile final : public TextSource, public TextSink {
 
  private:
   struct Closer {
-    void operator()(std::FILE* file) const { std::fclose(file); }
+    void operator()(std::FILE* file) const;
   };
 
   std::unique_ptr<std::FILE, Closer> file_;

@@ -14,8 +14,13 @@
 namespace kral {
 
 // Each opens an ordinary file for a stream of its own; null for everything else. None waits, as a pipe would have it.
+// A file that is open to be written is open nowhere else: neither of these two shares it with the other, nor is one
+// written by two. (On Linux other programs, and file systems that know no locks, may do so all the same.)
 std::FILE* OpenToRead(const std::string& path);
 std::FILE* OpenToWrite(const std::string& path);  // emptied, or made
+// Closes what these two have opened; false when not everything reached the file.
+bool CloseStream(std::FILE* stream);
+
 // For lines, which end as the system ends them. Terminals, the null device and their like, and pipes that somebody
 // reads are welcome too; writing to these waits for whoever reads.
 std::FILE* OpenToWriteText(const std::string& path);
@@ -49,7 +54,7 @@ class FileReader {
 
 // A file being written under a temporary name beside its target. Until Commit the target stays as it was; without a
 // Commit the destructor removes what was written. After a failed Write every later step fails. Only ordinary files are
-// replaced, and links lead to what is.
+// replaced, and links lead to what is. Whoever was allowed what with the target is so with the file in its place.
 class AtomicFile {
  public:
   AtomicFile();

@@ -2,12 +2,14 @@
 #include "platform/file_util.h"
 
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
+#include <optional>
 #include <utility>
 
 #include "platform/posix/file_descriptor.h"
@@ -45,18 +47,24 @@ std::error_code OpenIf(bool (*is_wanted)(mode_t mode), const std::string& path, 
   return {};
 }
 
-std::FILE* OpenStream(bool (*is_wanted)(mode_t mode), const std::string& path, int flags) {
-  FileDescriptor file;
-  if (OpenIf(is_wanted, path, flags, file)) return nullptr;
-  std::FILE* stream = ::fdopen(file.get(), (flags & O_ACCMODE) == O_RDONLY ? "rb" : "wb");
+std::FILE* MakeStream(FileDescriptor file, const char* mode) {
+  std::FILE* stream = ::fdopen(file.get(), mode);
   if (stream != nullptr) file.Release();
   return stream;
 }
 
-// Where a new file takes the place of what a path leads to.
-std::error_code FindTarget(const std::string& path, std::string& target) {
+// Some file systems know no locks: that keeps nobody from a file.
+bool IsHeldByAnother(int file, int lock) {
+  return ::flock(file, lock | LOCK_NB) != 0 && errno == EWOULDBLOCK;
+}
+
+// Where a new file takes the place of what a path leads to. `mode` is that of a file which is there, or stays as it is.
+std::error_code FindTarget(const std::string& path, std::string& target, std::optional<mode_t>& mode) {
   struct stat status {};
-  if (::stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode)) return KindError(status.st_mode);
+  if (::stat(path.c_str(), &status) == 0) {
+    if (!S_ISREG(status.st_mode)) return KindError(status.st_mode);
+    mode = status.st_mode & (S_IRWXU | S_IRWXG | S_IRWXO);
+  }
   target = path;
   if (::lstat(path.c_str(), &status) != 0 || !S_ISLNK(status.st_mode)) return {};
   const std::unique_ptr<char, void (*)(void*)> resolved(::realpath(path.c_str(), nullptr), std::free);
@@ -65,18 +73,43 @@ std::error_code FindTarget(const std::string& path, std::string& target) {
   return {};
 }
 
+// A new name is on the disk once its folder is. One that may not be read, or that cannot be synchronised, is left to
+// the system.
+std::error_code SyncFolderOf(const std::string& path) {
+  const size_t slash = path.rfind('/');
+  const std::string folder = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+  const FileDescriptor file(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!file.valid() || ::fsync(file.get()) == 0 || errno == EINVAL || errno == ENOTSUP) return {};
+  return LastError();
+}
+
 }  // namespace
 
 std::FILE* OpenToRead(const std::string& path) {
-  return OpenStream(IsOrdinary, path, O_RDONLY);
+  FileDescriptor file;
+  if (OpenIf(IsOrdinary, path, O_RDONLY, file) || IsHeldByAnother(file.get(), LOCK_SH)) return nullptr;
+  return MakeStream(std::move(file), "rb");
 }
 
 std::FILE* OpenToWrite(const std::string& path) {
-  return OpenStream(IsOrdinary, path, O_WRONLY | O_CREAT | O_TRUNC);
+  FileDescriptor file;
+  if (OpenIf(IsOrdinary, path, O_WRONLY | O_CREAT, file) || IsHeldByAnother(file.get(), LOCK_EX)) return nullptr;
+  // Only now: what another writes or reads is not emptied under it.
+  if (::ftruncate(file.get(), 0) != 0) return nullptr;
+  return MakeStream(std::move(file), "wb");
+}
+
+// A child process made meanwhile has the file open, too, and would keep it locked as long as it lives.
+bool CloseStream(std::FILE* stream) {
+  const bool flushed = std::fflush(stream) == 0;
+  ::flock(::fileno(stream), LOCK_UN);
+  return std::fclose(stream) == 0 && flushed;
 }
 
 std::FILE* OpenToWriteText(const std::string& path) {
-  return OpenStream(TakesLines, path, O_WRONLY | O_CREAT | O_TRUNC);
+  FileDescriptor file;
+  if (OpenIf(TakesLines, path, O_WRONLY | O_CREAT | O_TRUNC, file)) return nullptr;
+  return MakeStream(std::move(file), "wb");
 }
 
 struct FileReader::State {
@@ -138,12 +171,19 @@ AtomicFile::~AtomicFile() {
 std::error_code AtomicFile::Open(const std::string& path) {
   if (state_->file.valid()) return std::make_error_code(std::errc::device_or_resource_busy);
   State& state = *state_;
-  state.failed = FindTarget(path, state.path);
+  std::optional<mode_t> mode;
+  state.failed = FindTarget(path, state.path, mode);
   if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
     state.temporary = state.path + "." + std::to_string(::getpid()) + "." + std::to_string(attempt) + ".tmp";
-    state.file = FileDescriptor(::open(state.temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666));
-    if (state.file.valid()) return {};
+    state.file =
+        FileDescriptor(::open(state.temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, mode.value_or(0666)));
+    if (state.file.valid()) {
+      // The umask holds for new files only. A file system without modes has none to keep.
+      if (mode) [[maybe_unused]]
+        const int ignored = ::fchmod(state.file.get(), *mode);
+      return {};
+    }
     if (errno != EEXIST) break;
   }
   return state.failed = LastError();
@@ -170,7 +210,7 @@ std::error_code AtomicFile::Commit() {
   if (::fsync(state.file.get()) != 0) return state.failed = LastError();
   if (::rename(state.temporary.c_str(), state.path.c_str()) != 0) return state.failed = LastError();
   state.file = FileDescriptor();
-  return {};
+  return state.failed = SyncFolderOf(state.path);
 }
 
 }  // namespace kral

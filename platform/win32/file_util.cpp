@@ -10,6 +10,7 @@
 #include <cstring>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "platform/win32/last_error.h"
 #include "platform/win32/win_handle.h"
@@ -56,9 +57,10 @@ std::FILE* MakeStream(WinHandle file, int flags, const char* mode) {
 }
 
 // Emptied only when it is known to be what is wanted.
-std::FILE* OpenEmptied(bool (*is_wanted)(HANDLE file), const std::string& path, int flags, const char* mode) {
+std::FILE* OpenEmptied(bool (*is_wanted)(HANDLE file), const std::string& path, DWORD sharing, int flags,
+                       const char* mode) {
   WinHandle file;
-  if (OpenIf(is_wanted, path, {GENERIC_WRITE, kShareAll, OPEN_ALWAYS}, file)) return nullptr;
+  if (OpenIf(is_wanted, path, {GENERIC_WRITE, sharing, OPEN_ALWAYS}, file)) return nullptr;
   if (IsOrdinary(file.get()) && !::SetEndOfFile(file.get())) return nullptr;
   return MakeStream(std::move(file), flags, mode);
 }
@@ -95,22 +97,36 @@ std::error_code FindTarget(const std::string& path, std::string& target) {
   return (attributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0 ? Resolve(path, target) : std::error_code();
 }
 
+// The access list of a file that is replaced. A file system without any has none to keep.
+void KeepAccess(const std::string& from, const std::string& to) {
+  DWORD size = 0;
+  ::GetFileSecurityA(from.c_str(), DACL_SECURITY_INFORMATION, nullptr, 0, &size);
+  std::vector<uint8_t> list(size);
+  if (size != 0 && ::GetFileSecurityA(from.c_str(), DACL_SECURITY_INFORMATION, list.data(), size, &size)) {
+    ::SetFileSecurityA(to.c_str(), DACL_SECURITY_INFORMATION, list.data());
+  }
+}
+
 }  // namespace
 
 std::FILE* OpenToRead(const std::string& path) {
   WinHandle file;
-  if (OpenIf(IsOrdinary, path, {GENERIC_READ, kShareAll, OPEN_EXISTING}, file)) return nullptr;
+  if (OpenIf(IsOrdinary, path, {GENERIC_READ, FILE_SHARE_READ, OPEN_EXISTING}, file)) return nullptr;
   return MakeStream(std::move(file), _O_RDONLY | _O_BINARY, "rb");
 }
 
 std::FILE* OpenToWrite(const std::string& path) {
-  return OpenEmptied(IsOrdinary, path, _O_BINARY, "wb");
+  return OpenEmptied(IsOrdinary, path, FILE_SHARE_READ, _O_BINARY, "wb");
+}
+
+bool CloseStream(std::FILE* stream) {
+  return std::fclose(stream) == 0;
 }
 
 std::FILE* OpenToWriteText(const std::string& path) {
   // Only one may have a COM port open, and a handset may be behind it.
   if (::_strnicmp(DeviceName(path).c_str(), "COM", 3) == 0) return nullptr;
-  return OpenEmptied(TakesLines, path, _O_TEXT, "w");
+  return OpenEmptied(TakesLines, path, kShareAll, _O_TEXT, "w");
 }
 
 struct FileReader::State {
@@ -184,7 +200,10 @@ std::error_code AtomicFile::Open(const std::string& path) {
         state.path + "." + std::to_string(::GetCurrentProcessId()) + "." + std::to_string(attempt) + ".tmp";
     state.file = WinHandle(
         ::CreateFileA(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
-    if (state.file.valid()) return {};
+    if (state.file.valid()) {
+      KeepAccess(state.path, state.temporary);
+      return {};
+    }
     if (::GetLastError() != ERROR_FILE_EXISTS) break;
   }
   return state.failed = LastError();

@@ -79,5 +79,19 @@ TEST_F(Pipes, DevicesAndFoldersAreNotReplacedAndLinksLeadToWhatIs) {
   EXPECT_EQ(folder_.Content("inner/target"), "new");
 }
 
+TEST(AtomicFileTest, TheFileInTheTargetsPlaceHasItsMode) {
+  const test::TempFolder folder;
+  const mode_t umask = ::umask(022);
+  for (const unsigned mode : {0600u, 0640u, 0666u, 0755u}) {
+    const std::string path = folder.Add("target", "old");
+    ASSERT_EQ(::chmod(path.c_str(), mode), 0);
+    EXPECT_FALSE(ReplaceWholeFile(path, {}));
+    EXPECT_EQ(static_cast<unsigned>(std::filesystem::status(path).permissions()), mode);
+  }
+  EXPECT_FALSE(ReplaceWholeFile(folder.Path("new"), {}));
+  EXPECT_EQ(static_cast<unsigned>(std::filesystem::status(folder.Path("new")).permissions()), 0644u);
+  ::umask(umask);
+}
+
 }  // namespace
 }  // namespace kral
