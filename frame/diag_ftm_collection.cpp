@@ -15,7 +15,7 @@ TrafficCounters Diag_FTM::counters() {
 
 bool Diag_FTM::StartCapture(const char* file_name) {
   if (capture().Start([file_name] { return OpenCaptureFile(file_name); }, parts_)) return true;
-  log().WriteLine(kLogErr, "Capture file: %s cannot be written, or a capture runs already", file_name);
+  log().WriteLine(kLogErr, "Capture file: %s cannot be written or is in use, or a capture runs already", file_name);
   return false;
 }
 
@@ -35,7 +35,8 @@ bool Diag_FTM::StopCapture() {
 bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
   // Through a phone server there is no dispatcher to play into.
   if (!server_mode() && player().Start(OpenCaptureSource(file_name), pace, dispatcher(), sorter(), parts_)) return true;
-  log().WriteLine(kLogErr, "Capture file: %s cannot be read, or a file is played already", file_name);
+  log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",
+                  file_name);
   return false;
 }
 

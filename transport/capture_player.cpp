@@ -53,14 +53,20 @@ bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& disp
   return false;
 }
 
+void CapturePlayer::RequestStop() {
+  const std::lock_guard lock(mutex_);
+  stop_requested_ = true;
+  changed_.notify_all();
+}
+
 bool CapturePlayer::Stop(uint32_t time_out_ms) {
+  if (thread_id_.load() == std::this_thread::get_id()) {
+    RequestStop();  // whoever else starts or stops may be waiting for this thread
+    return true;
+  }
   const std::lock_guard control(control_mutex_);
   if (thread_.running()) {
-    {
-      const std::lock_guard lock(mutex_);
-      stop_requested_ = true;
-      changed_.notify_all();
-    }
+    RequestStop();
     if (!ended_.WaitFor(time_out_ms)) return false;
   }
   thread_.Join();
@@ -69,19 +75,21 @@ bool CapturePlayer::Stop(uint32_t time_out_ms) {
 
 void CapturePlayer::Play(CaptureReader& reader, const Line& line) {
   PlayState state = PlayState::kStopped;
+  thread_id_ = std::this_thread::get_id();
   const AtExit ended([&] {
+    thread_id_ = std::thread::id();
     state_ = state;
     ended_.Set();
   });
   try {
-    state = Run(reader, line);
+    state = Run(std::move(reader), line);
   } catch (...) {
     PassForcedUnwind();
     state = PlayState::kCut;  // out of memory
   }
 }
 
-PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
+PlayState CapturePlayer::Run(CaptureReader reader, const Line& line) {
   const uint64_t batch = line.pace == PlayPace::kForEventReader ? kEventBatch : kLogBatch;
   CaptureRecord record;
   previous_microseconds_ = 0;
@@ -103,6 +111,7 @@ PlayState CapturePlayer::Run(CaptureReader& reader, const Line& line) {
     }
     if (line.pace == PlayPace::kAsRecorded && !AwaitTurn(record.microseconds)) return PlayState::kStopped;
     CallBack(record);
+    if (!GoesOn()) return PlayState::kStopped;
     line.dispatcher.Push(record.packet);
     ++played_;
     ++played_in_all_;
@@ -138,7 +147,7 @@ bool CapturePlayer::AwaitRoom(const Line& line) {
     }
     return true;
   };
-  if (!Sleep({})) return false;
+  if (!GoesOn()) return false;
   while (!has_room()) {
     if (!Sleep(kLookAgain)) return false;
   }
@@ -148,7 +157,7 @@ bool CapturePlayer::AwaitRoom(const Line& line) {
 // What was played is where its readers look for it before the end is told.
 bool CapturePlayer::AwaitListeners(const Line& line) {
   while (!line.dispatcher.WaitUntilDispatched(kDispatchMs)) {
-    if (!Sleep({})) return false;
+    if (!GoesOn()) return false;
   }
   return true;
 }
@@ -166,6 +175,11 @@ bool CapturePlayer::AwaitTurn(uint64_t microseconds) {
   const uint64_t gap = microseconds - before;
   previous_due_ += std::chrono::microseconds(gap > kLongestGap ? 0 : gap);
   return previous_due_ <= now || Sleep(std::chrono::duration_cast<std::chrono::microseconds>(previous_due_ - now));
+}
+
+bool CapturePlayer::GoesOn() {
+  const std::lock_guard lock(mutex_);
+  return !stop_requested_;
 }
 
 bool CapturePlayer::Sleep(std::chrono::microseconds time) {

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <thread>
 
 #include "kral/log.h"
 #include "transport/capture_reader.h"
@@ -48,7 +49,9 @@ class CapturePlayer {
   // dispatcher and the sorter. False without a source, and while another file is played.
   bool Start(CaptureSource source, PlayPace pace, CKralEvents& dispatcher, CKralEventListener& sorter,
              std::shared_ptr<void> owner);
-  bool Stop(uint32_t time_out_ms = 1000);  // false when the thread, held up in a listener, did not end in time
+  // False when the thread, held up in a listener, did not end in time. Called by the callback, it waits for nothing:
+  // the playback ends in front of the packet that the callback was shown.
+  bool Stop(uint32_t time_out_ms = 1000);
 
   // Called on the thread with every packet just before it is played. A call that is under way when it is changed ends.
   void SetCallback(KRAL_PLAYBACK_CALLBACK callback, uintptr_t value);
@@ -67,12 +70,14 @@ class CapturePlayer {
   };
 
   void Play(CaptureReader& reader, const Line& line);
-  PlayState Run(CaptureReader& reader, const Line& line);
+  PlayState Run(CaptureReader reader, const Line& line);  // the file is closed when it has ended
   void CallBack(const CaptureRecord& record);
   bool AwaitRoom(const Line& line);
   bool AwaitListeners(const Line& line);
   bool AwaitTurn(uint64_t microseconds);
   bool Sleep(std::chrono::microseconds time);  // false when it was told to stop
+  bool GoesOn();                               // so does this
+  void RequestStop();
 
   std::mutex control_mutex_;  // one start or stop at a time
   std::mutex mutex_;          // of what follows
@@ -86,7 +91,8 @@ class CapturePlayer {
   std::atomic<uint64_t> played_in_all_{0};
   std::atomic<uint64_t> skipped_{0};
 
-  uint64_t previous_microseconds_ = 0;  // the thread's own
+  std::atomic<std::thread::id> thread_id_;  // of the thread that plays
+  uint64_t previous_microseconds_ = 0;      // the thread's own
   std::chrono::steady_clock::time_point previous_due_;
   ManualResetEvent ended_{"KRAL_PLAYBACK_ENDED"};
   WorkerThread thread_;  // last: nothing above may be gone while it is parked

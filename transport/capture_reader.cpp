@@ -15,7 +15,7 @@ namespace kral {
 
 CaptureSource OpenCaptureSource(const std::string& path) {
   const std::shared_ptr<std::FILE> file(OpenToRead(path), [](std::FILE* opened) {
-    if (opened != nullptr) std::fclose(opened);
+    if (opened != nullptr) CloseStream(opened);
   });
   if (!file) return {};
   return [file](std::span<uint8_t> buffer) -> std::optional<size_t> {

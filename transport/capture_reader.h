@@ -16,7 +16,7 @@ namespace kral {
 // file that cannot be read on.
 using CaptureSource = std::function<std::optional<size_t>(std::span<uint8_t> buffer)>;
 
-// An empty function when the file cannot be opened.
+// An empty function when the file cannot be opened, and while a capture writes it.
 CaptureSource OpenCaptureSource(const std::string& path);
 
 struct CaptureRecord {

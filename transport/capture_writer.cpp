@@ -62,7 +62,7 @@ uint64_t CountWholeRecords(std::span<const uint8_t> bytes) {
 
 CaptureSink OpenCaptureFile(const std::string& path) {
   const std::shared_ptr<std::FILE> file(OpenToWrite(path), [](std::FILE* opened) {
-    if (opened != nullptr) std::fclose(opened);
+    if (opened != nullptr) CloseStream(opened);
   });
   if (!file) return {};
   // Pieces are large already; without a buffer the result tells what the system has taken.

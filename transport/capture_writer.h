@@ -25,7 +25,8 @@ class DataLogFileHandler;
 // Destroyed with the end of the capture.
 using CaptureSink = std::function<size_t(std::span<const uint8_t> bytes)>;
 
-// A file of that name, emptied first; an empty function when it cannot be opened.
+// A file of that name, emptied first; an empty function when it cannot be opened, and when another capture writes it or
+// it is played.
 CaptureSink OpenCaptureFile(const std::string& path);
 
 enum class CaptureState : uint8_t {

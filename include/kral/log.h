@@ -365,7 +365,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDL
  * @param handle     from a connect function
  * @param file_name  an ordinary file, emptied first
  * @return 1; 0 when the file cannot be written, and, with no file touched, while another capture of the handle runs or
- *         has not written its rest
+ *         has not written its rest, or while the file is written by another capture or played
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name);
 
@@ -404,15 +404,15 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
  * @param handle     from a connect function
  * @param file_name  written by KRAL_StartCapture
  * @param pace       KRAL_PLAY_...
- * @return 1 when the playback has begun; 0 when the file cannot be read, while another is played, and through a phone
- *         server
+ * @return 1 when the playback has begun; 0 when the file cannot be read or a capture writes it, while another is
+ *         played, and through a phone server
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace);
 
 /**
  * Sees a packet of a file just before it is played, with the time at which it was collected. It comes on the thread of
- * the playback, which waits while it runs, and must not call functions that send requests. Packets that are left out are
- * not seen.
+ * the playback, which waits while it runs, and must not call functions that send requests. Packets that are left out
+ * are not seen.
  *
  * @param microseconds  since 1970-01-01 UTC, by the clock of the PC that wrote the file
  * @param length        bytes of the packet
@@ -433,7 +433,12 @@ typedef void(KRAL_CALL* KRAL_PLAYBACK_CALLBACK)(uint64_t microseconds, uint32_t 
 KRAL_API uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback,
                                                           uintptr_t value);
 
-/** Ends a playback before its time. @return 1; 0 when a callback did not come back within 1,000 ms */
+/**
+ * Ends a playback before its time. Called by the callback for playbacks, it waits for nothing: the playback ends when
+ * the callback returns, without the packet that it was shown.
+ *
+ * @return 1; 0 when a callback did not come back within 1,000 ms
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);
 
 /**

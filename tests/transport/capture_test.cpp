@@ -241,6 +241,26 @@ TEST(CaptureFile, RecordsInFrontOfTheOneThatTheDiskCutAreNoLoss) {
   EXPECT_EQ(ReadAll(disk.content()).packets.size(), 3u);
 }
 
+TEST(CaptureFile, IsWrittenByOneAloneAndNeverUnderAPlayback) {
+  const test::TempFolder folder;
+  const std::string path = folder.Path("capture");
+  CaptureWriter first;
+  CaptureWriter second;
+  const auto open = [&path] { return OpenCaptureFile(path); };
+  ASSERT_TRUE(first.Start(open, nullptr));
+  first.Append(kPackets[0]);
+  EXPECT_FALSE(second.Start(open, nullptr)) << "half of each would be lost";
+  EXPECT_FALSE(OpenCaptureSource(path)) << "it has no end yet";
+  EXPECT_TRUE(first.Stop());
+  EXPECT_EQ(std::filesystem::file_size(path), 30u) << "as large as the first one has made it";
+  std::vector<CaptureSource> players = {OpenCaptureSource(path), OpenCaptureSource(path)};
+  EXPECT_TRUE(players[0] && players[1]) << "any number may play it";
+  EXPECT_FALSE(second.Start(open, nullptr));
+  EXPECT_EQ(std::filesystem::file_size(path), 30u);
+  players.clear();
+  EXPECT_TRUE(second.Start(open, nullptr));
+}
+
 // --- Playback -------------------------------------------------------------------------------------------------------
 
 class Playback : public testing::Test {
@@ -300,6 +320,22 @@ TEST_F(Playback, WaitsForItsReaderAndCanBeStopped) {
   ASSERT_TRUE(Play(file, PlayPace::kAtOnce));
   EXPECT_TRUE(Ends(PlayState::kDone));
   EXPECT_EQ(bundle_->asynchronous.dropped(), 5000u) << "like a handset, it waits for nobody";
+}
+
+TEST_F(Playback, ItsCallbackMayStopIt) {
+  static CapturePlayer* player;
+  player = &player_;
+  static std::atomic<int> seen;
+  seen = 0;
+  const auto stop = [](uint64_t, uint32_t, const uint8_t*, uintptr_t) {
+    ++seen;
+    EXPECT_TRUE(player->Stop(60'000)) << "without a wait for itself";
+  };
+  player_.SetCallback(stop, 0);
+  ASSERT_TRUE(Play(Capture(std::vector<Packet>(20, Packet{16, 1})), PlayPace::kForLogReader));
+  EXPECT_TRUE(Ends(PlayState::kStopped));
+  EXPECT_EQ(seen, 1);
+  EXPECT_EQ(player_.played(), 0u) << "not even the one that was shown";
 }
 
 TEST_F(Playback, IsDoneOnceItsPacketsAreThroughAndCanBeFollowedAtOnce) {
