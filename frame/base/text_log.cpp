@@ -4,7 +4,10 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <cstdarg>
+#include <system_error>
+#include <utility>
 
 #include "frame/base/at_exit.h"
 #include "frame/base/guarded_call.h"
@@ -111,27 +114,33 @@ void DataLogFileHandler::WriteText(uint32_t flag, const char* text) {
 void DataLogFileHandler::Deliver(uint32_t flag, const char* text, size_t length) {
   TextLogCallback callback = nullptr;
   uint32_t handle = 0;
+  std::string fault;
   {
     const std::lock_guard lock(mutex_);
     try {
-      WriteToFile(flag, text);
+      fault = WriteToFile(flag, text);
     } catch (...) {
       PassForcedUnwind();  // no memory for the file's name: as when it cannot be opened
     }
     callback = callback_;
     handle = callback_handle_;
   }
-  if (callback != nullptr && !in_callback) CallBack(callback, handle, flag, {text, length});
+  if (callback == nullptr || in_callback) return;
+  if (!fault.empty()) CallBack(callback, handle, kLogErr, fault);
+  CallBack(callback, handle, flag, {text, length});
 }
 
-void DataLogFileHandler::WriteToFile(uint32_t flag, const char* text) {
-  if (!logging_started_) return;
+// Gives what whoever sees the lines should know of the file: nothing, or once that it does not take them all.
+std::string DataLogFileHandler::WriteToFile(uint32_t flag, const char* text) {
+  if (!logging_started_) return {};
   if (!file_ && !file_name_.empty()) file_.reset(OpenToWriteText(file_name_));
-  if (!file_) return;  // a file that cannot be opened is not reported: its lines are dropped
-  CallWithoutPipeSignal([&] { WriteStamped(flag, text); });
+  if (!file_) return {};  // a file that cannot be opened is not reported: its lines are dropped
+  std::string fault;
+  CallWithoutPipeSignal([&] { fault = WriteStamped(flag, text); });
+  return fault;
 }
 
-void DataLogFileHandler::WriteStamped(uint32_t flag, const char* text) {
+std::string DataLogFileHandler::WriteStamped(uint32_t flag, const char* text) {
   if (relative_time_stamps_) {
     std::fprintf(file_.get(), "%d\t", static_cast<int>(clock_.TickMs() - start_tick_));
   } else {
@@ -140,7 +149,12 @@ void DataLogFileHandler::WriteStamped(uint32_t flag, const char* text) {
     std::fprintf(file_.get(), "%02d:%02d:%03d\t", now.minute, now.second, now.millisecond);
   }
   std::fprintf(file_.get(), ",%s,%s\n", CategoryName(flag).data(), text);
-  std::fflush(file_.get());  // a station that dies leaves its log whole
+  // A station that dies leaves its log whole.
+  if (std::fflush(file_.get()) == 0 && std::ferror(file_.get()) == 0) return {};
+  const std::error_code error(errno, std::generic_category());
+  std::clearerr(file_.get());  // the next line is tried again
+  if (std::exchange(loss_told_, true)) return {};
+  return "Text log: lines are lost, " + file_name_ + " cannot be written: " + error.message();
 }
 
 void DataLogFileHandler::CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text) {
@@ -162,6 +176,7 @@ void DataLogFileHandler::Start(const char* file_name) {
     file_name_ = file_name;
     active_mask_ = stored_mask_;
     logging_started_ = true;
+    loss_told_ = false;
     attached = file_ != nullptr;
   }
   if (attached) {

@@ -60,8 +60,8 @@ class DataLogFileHandler {
   };
 
   void Deliver(uint32_t flag, const char* text, size_t length);
-  void WriteToFile(uint32_t flag, const char* text);  // lock held
-  void WriteStamped(uint32_t flag, const char* text);
+  std::string WriteToFile(uint32_t flag, const char* text);  // lock held
+  std::string WriteStamped(uint32_t flag, const char* text);
   void CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text);
 
   Clock& clock_;
@@ -73,6 +73,7 @@ class DataLogFileHandler {
 
   mutable std::mutex mutex_;  // guards what follows
   std::string file_name_;     // empty when stopped
+  bool loss_told_ = false;    // of this file
   std::unique_ptr<std::FILE, FileCloser> file_;
   uint32_t stored_mask_ = kDefaultLogMask;
   TextLogCallback callback_ = nullptr;

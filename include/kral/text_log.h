@@ -70,7 +70,8 @@ typedef void(KRAL_CALL* KRAL_TEXT_LOG_CALLBACK)(uint32_t size, const void* recor
  * is not reported, its lines are dropped. While a log is being written, starts the new one in its place.
  *
  * A terminal, the null device, and a pipe that somebody reads already are opened too. Each line then waits until it is
- * taken, and with it the thread that writes it. Lines that nobody reads any more are dropped.
+ * taken, and with it the thread that writes it. A file that does not take a line (a full disk, a pipe whose reader has
+ * gone) costs that line; the callback is told once, by a line of its own in front.
  *
  * @param handle     from a connect function
  * @param file_name  terminated
