@@ -2,10 +2,98 @@
 #include "platform/xml_document.h"
 
 #include <algorithm>
+#include <optional>
 
 #include "platform/file_util.h"
 
 namespace kral {
+namespace {
+
+// The characters of a document that markup is made of; all others are one and the same. They look alike in the
+// encodings in use: one byte, or two or four with zeros around it.
+class Markup {
+ public:
+  explicit Markup(std::span<const uint8_t> bytes) : bytes_(bytes) {
+    const auto zero = [&](size_t at) { return at < bytes.size() && bytes[at] == 0; };
+    if (bytes.size() < 4) return;
+    if (bytes[0] == 0xFE || bytes[0] == 0xFF) {  // a byte order mark
+      unit_ = zero(2) && zero(3) ? 4 : 2;
+      place_ = bytes[0] == 0xFE ? 1 : 0;
+    } else if (zero(0) || zero(1)) {
+      unit_ = zero(1) && (zero(0) || zero(2)) ? 4 : 2;
+      place_ = zero(0) ? unit_ - 1 : 0;
+    }
+  }
+
+  size_t size() const { return bytes_.size() / unit_; }
+  char operator[](size_t index) const {
+    const auto unit = bytes_.subspan(index * unit_, unit_);
+    for (size_t i = 0; i < unit_; ++i) {
+      if (i != place_ && unit[i] != 0) return '\0';
+    }
+    return static_cast<char>(unit[place_]);
+  }
+  bool StartsAt(size_t index, std::string_view text) const {
+    if (index + text.size() > size()) return false;
+    for (size_t i = 0; i < text.size(); ++i) {
+      if ((*this)[index + i] != text[i]) return false;
+    }
+    return true;
+  }
+  // The place of the last character of the text, or the end.
+  size_t EndOf(std::string_view text, size_t from) const {
+    while (from < size() && !StartsAt(from, text)) ++from;
+    return std::min(from + text.size() - 1, size());
+  }
+
+ private:
+  std::span<const uint8_t> bytes_;
+  size_t unit_ = 1;
+  size_t place_ = 0;  // of the byte that is not zero
+};
+
+// From its '<'. Gives the place of its '>', or the end; nothing for a tag beyond the limits.
+std::optional<size_t> EndOfTag(const Markup& markup, size_t begin) {
+  char quote = '\0';
+  size_t attributes = 0;
+  for (size_t at = begin; at < markup.size(); ++at) {
+    const char character = markup[at];
+    if (quote != '\0') {
+      if (character == quote) quote = '\0';
+    } else if (character == '>') {
+      return at;
+    } else if (character == '"' || character == '\'') {
+      quote = character;
+    } else if (character == '=') {
+      ++attributes;
+    }
+    if (at - begin >= kXmlTagLimit || attributes > kXmlAttributeLimit) return std::nullopt;
+  }
+  return markup.size();
+}
+
+}  // namespace
+
+bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem) {
+  const Markup markup(document);
+  for (size_t at = 0; at < markup.size(); ++at) {
+    if (markup[at] != '<') continue;
+    if (markup.StartsAt(at, "<!--")) {
+      at = markup.EndOf("-->", at + 4);
+    } else if (markup.StartsAt(at, "<![CDATA[")) {
+      at = markup.EndOf("]]>", at);
+    } else if (markup.StartsAt(at, "<?")) {
+      at = markup.EndOf("?>", at);
+    } else if (const auto end = EndOfTag(markup, at)) {
+      at = *end;
+    } else {
+      problem = "an element has more than " + std::to_string(kXmlAttributeLimit) +
+                " attributes or a tag of more than " + std::to_string(kXmlTagLimit) + " characters";
+      return false;
+    }
+  }
+  return true;
+}
 
 const std::string* XmlElement::Attribute(std::string_view wanted) const {
   for (const auto& [attribute, value] : attributes) {

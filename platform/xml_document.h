@@ -26,15 +26,22 @@ struct XmlElement {
 enum class XmlResult {
   kOk,
   kNoParser,   // the system's parser cannot be had
-  kMalformed,  // not well-formed, too deep, too large, or with a document type declaration
+  kMalformed,  // not well-formed, too deep, too large, with a document type declaration, or beyond a limit
 };
 
 inline constexpr size_t kXmlSizeLimit = size_t{64} << 20;
 inline constexpr size_t kXmlDepthLimit = 64;
+// Of a tag. Parsers compare each attribute with all before it: many thousands of one element take minutes.
+inline constexpr size_t kXmlTagLimit = size_t{64} << 10;
+inline constexpr size_t kXmlAttributeLimit = 64;
 
 // On anything but kOk the reason is in `problem` and `root` is as before.
 XmlResult ParseXml(std::span<const uint8_t> document, XmlElement& root, std::string& problem);
 XmlResult LoadXml(const std::string& path, XmlElement& root, std::string& problem);
+
+// For the bodies of ParseXml, before the system's parser sees the document: false, with the reason, when a tag is
+// beyond its limits.
+bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem);
 
 // For text and attribute values: & < > " ' become entities.
 std::string EscapeXml(std::string_view text);

@@ -78,6 +78,7 @@ XmlResult ParseXml(std::span<const uint8_t> document, XmlElement& root, std::str
     problem = "the document is too large";
     return XmlResult::kMalformed;
   }
+  if (!HasBoundedTags(document, problem)) return XmlResult::kMalformed;
   const std::unique_ptr<xmlTextReader, FreeReader> reader(
       xmlReaderForMemory(reinterpret_cast<const char*>(document.data()), static_cast<int>(document.size()), nullptr,
                          nullptr, XML_PARSE_NONET | XML_PARSE_NOCDATA));

@@ -159,6 +159,7 @@ XmlResult Malformed(std::string& problem, std::string reason) {
 XmlResult ParseXml(std::span<const uint8_t> document, XmlElement& root, std::string& problem) {
   if (document.empty()) return Malformed(problem, "the document is empty");
   if (document.size() > kXmlSizeLimit) return Malformed(problem, "the document is too large");
+  if (!HasBoundedTags(document, problem)) return XmlResult::kMalformed;
   const ComOnThisThread com;
   const Owned<IXMLDOMDocument2> parsed = MakeDocument();
   if (!parsed) {

@@ -255,7 +255,15 @@ TEST(Xml, HostileDocumentsAreRefused) {
   std::string deep;
   for (int i = 0; i < 100; ++i) deep += "<a>";
   for (int i = 0; i < 100; ++i) deep += "</a>";
+  std::string many = "<a";  // a parser of attributes alone takes half a minute for these
+  for (int i = 0; i < 40000; ++i) many += " a" + std::to_string(i) + "='>'";
+  many += "/>";
+  std::string wide = "\xFF\xFE";
+  for (const char character : many) wide += {character, '\0'};
   const std::string documents[] = {
+      many,
+      wide,
+      "<!-- > --><?a > ?><a><![CDATA[<a]]><a v='" + std::string(kXmlTagLimit, 'x') + "'/></a>",
       "",
       "no xml",
       "<a><b></a>",
