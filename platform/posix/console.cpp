@@ -15,9 +15,11 @@ constexpr int kInterrupted = 130;
 std::atomic<std::atomic<bool>*> interrupt_flag{nullptr};
 static_assert(std::atomic<std::atomic<bool>*>::is_always_lock_free && std::atomic<bool>::is_always_lock_free);
 
-void OnSignal(int) {
+void OnSignal(int number) {
   std::atomic<bool>* flag = interrupt_flag.load();
-  if (flag == nullptr || flag->exchange(true)) ::_exit(kInterrupted);
+  if (flag == nullptr) ::_exit(kInterrupted);
+  // Kernel and shell both tell of a closed terminal.
+  if (flag->exchange(true) && number != SIGHUP) ::_exit(kInterrupted);
 }
 
 int Descriptor(StandardStream stream) {
@@ -53,9 +55,18 @@ void CatchInterrupts(std::atomic<bool>* flag) {
   } else {
     action.sa_handler = SIG_DFL;
   }
-  // Without SA_RESTART, so that a blocking read of the terminal ends.
+  // A write that waits for a slow reader is no failure. Whoever waits for long looks at the flag.
+  action.sa_flags = SA_RESTART;
   ::sigaction(SIGINT, &action, nullptr);
   ::sigaction(SIGTERM, &action, nullptr);
+  struct sigaction former {};
+  if (::sigaction(SIGHUP, nullptr, &former) == 0 && former.sa_handler != SIG_IGN) {
+    ::sigaction(SIGHUP, &action, nullptr);
+  }
+}
+
+void OutliveClosedPipes() {
+  ::signal(SIGPIPE, SIG_IGN);
 }
 
 }  // namespace kral

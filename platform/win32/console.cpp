@@ -15,10 +15,14 @@ constexpr UINT kInterrupted = 130;
 // The system calls the handler on a thread of its own, without an argument to carry this.
 std::atomic<std::atomic<bool>*> interrupt_flag{nullptr};
 
-BOOL WINAPI OnControl(DWORD) {
+BOOL WINAPI OnControl(DWORD event) {
   std::atomic<bool>* flag = interrupt_flag.load();
   if (flag == nullptr) return FALSE;
-  if (flag->exchange(true)) ::ExitProcess(kInterrupted);
+  const bool was_set = flag->exchange(true);
+  const bool is_key = event == CTRL_C_EVENT || event == CTRL_BREAK_EVENT;
+  // A closed window, a log-off: the program is ended when this returns, or after some seconds. Its own end comes first.
+  if (!is_key) ::Sleep(INFINITE);
+  if (was_set) ::ExitProcess(kInterrupted);
   return TRUE;
 }
 
@@ -54,5 +58,7 @@ void CatchInterrupts(std::atomic<bool>* flag) {
   interrupt_flag = flag;
   ::SetConsoleCtrlHandler(OnControl, flag != nullptr);
 }
+
+void OutliveClosedPipes() {}  // they never end a program
 
 }  // namespace kral

@@ -3,6 +3,7 @@ import json
 import os
 import signal
 import subprocess
+import time
 
 import tool
 from tool import PATIENCE, ToolTest, clean_environment, start
@@ -92,6 +93,9 @@ class Files(ToolTest):
             os.mkdir(self.path("x"))
             answer = self.fs(11, "get", "-r", ":/", self.path("x"))
             tree = self.fs(0, "tree")["entries"]
+            self.fs(0, "mkdir", ":/c1")
+            self.fs(0, "put", local, ":/c1/\x9b31m\x7f\u00e4")
+            self.assertEqual([entry["name"] for entry in self.fs(0, "ls", ":/c1")["entries"]], ["\x9b31m\x7f\u00e4"])
         # "." and ".." are the directory itself and the one above, in any listing.
         self.assertEqual(len(answer["left_out"]), len(names) - 1)
         self.assertEqual(len(tree), len(names))
@@ -100,16 +104,30 @@ class Files(ToolTest):
 
     def test_interrupted_copy_tells_how_far_it_got_and_leaves_nothing(self):
         local = self.add("f", bytes(200000))
-        with self.handset("--fault", "delay=20,of=4B1305"):
-            process = start("-p", "7", "--json", "fs", "put", local, ":/f", ports=self.ports)
-            event = json.loads(process.stderr.readline())
-            process.send_signal(signal.SIGINT)
-            out, _ = process.communicate(timeout=PATIENCE)
-            self.assertEqual((process.returncode, json.loads(out)["error"]["name"]), (130, "interrupted"))
-            self.assertEqual(self.fs(0, "ls")["entries"], [])
+        # A terminal that is closed says so twice: by the system, and by its shell.
+        for signals in ((signal.SIGINT,), (signal.SIGHUP, signal.SIGHUP)):
+            with self.subTest(signals=signals), self.handset("--fault", "delay=20,of=4B1305"):
+                process = start("-p", "7", "--json", "fs", "put", local, ":/f", ports=self.ports)
+                event = json.loads(process.stderr.readline())
+                for number in signals:
+                    process.send_signal(number)
+                    time.sleep(0.02)
+                out, _ = process.communicate(timeout=PATIENCE)
+                self.assertEqual((process.returncode, json.loads(out)["error"]["name"]), (130, "interrupted"))
+                self.assertEqual(self.fs(0, "ls")["entries"], [])
         self.assertEqual((event["event"], event["subject"], event["total"]), ("progress", local, 400000))
         self.assertGreater(event["done"], 0)
         self.assertGreater(event["seconds_left"], 0)
+
+    def test_copy_goes_on_when_nobody_reads_its_progress(self):
+        local = self.add("f", bytes(30000))
+        with self.handset("--fault", "delay=20,of=4B1305"):
+            process = start("-p", "7", "--json", "fs", "put", local, ":/f", ports=self.ports)
+            process.stderr.readline()
+            process.stderr.close()
+            self.assertTrue(json.loads(process.stdout.read())["ok"])
+            process.stdout.close()
+            self.assertEqual(process.wait(timeout=PATIENCE), 0)
 
     def test_terminal_gets_a_bar(self):
         local = self.add("f", bytes(12000))

@@ -63,6 +63,11 @@ class Ports(ToolTest):
         self.assertIn("COM13", error["text"])
         self.assertIn("-p", error["hint"])
 
+    def test_log_that_does_not_hold_all_lines_is_told(self):
+        with self.handset():
+            done = self.expect(0, "-p", "7", "info", "--log", "/dev/full")
+            self.assertRegex(done.err, "^kral: Text log: lines are lost, /dev/full cannot be written: .*\n$")
+
     def test_missing_and_impossible_ports_are_no_port(self):
         self.ports = {7: "/nonexistent/tty"}
         for number in ("7", "0", "300"):

@@ -1,7 +1,10 @@
 """Logs and events: switched, shown, captured, played and counted."""
+import array
+import fcntl
 import json
 import os
 import signal
+import termios
 import time
 
 from tool import PATIENCE, ToolTest, start, wait_until
@@ -82,6 +85,27 @@ class Traffic(ToolTest):
                 if code == 0:
                     self.assertEqual(packets, json.loads(out)["packets"])
             os.remove(file)
+
+    def test_reader_may_be_slow_and_may_leave(self):
+        def waiting(stream):
+            count = array.array("i", [0])
+            fcntl.ioctl(stream, termios.FIONREAD, count)
+            return count[0]
+
+        with self.handset("--events", "5000", "--burst", "50"):
+            tail = ("-p", "7", "--json", "event", "tail", "--on", "7")
+            slow = start(*tail, ports=self.ports)
+            wait_until(lambda: waiting(slow.stdout) > 60000)  # of 65,536 that a pipe holds
+            time.sleep(0.2)
+            slow.send_signal(signal.SIGINT)
+            out, err = slow.communicate(timeout=PATIENCE)
+            self.assertEqual((slow.returncode, json.loads(out.splitlines()[-1])["ok"]), (0, True), err)
+            gone = start(*tail, ports=self.ports)
+            gone.stdout.readline()
+            gone.stdout.close()
+            err = gone.stderr.read()
+            gone.stderr.close()
+            self.assertEqual(gone.wait(timeout=PATIENCE), 1, err)
 
     def test_files_that_cannot_be_used_are_bad_files(self):
         foreign = self.add("foreign", b"not a capture file at all")

@@ -97,6 +97,7 @@ class ToolTest(unittest.TestCase):
         done = self.expect(code, *words, "--json")
         answer = json.loads(done.out)
         self.assertEqual(done.out.count("\n"), 1)
+        self.assertNotRegex(done.out, "[\x00-\x09\x0b-\x1f\x7f-\x9f]", "a terminal may obey it")
         self.assertEqual(answer["ok"], code == 0)
         if code != 0:
             self.assertEqual(answer["error"]["code"], code)

@@ -20,6 +20,7 @@ struct Line {
   std::string text;
 };
 std::deque<Line> lines;
+std::optional<std::string> log_file_trouble;
 
 void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   if (record == nullptr || size <= kTextOffset) return;
@@ -32,6 +33,10 @@ void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   const auto length =
       end == nullptr ? room : static_cast<std::size_t>(static_cast<const char*>(end) - (bytes + kTextOffset));
   const std::lock_guard lock(mutex);
+  if (std::string_view(bytes + kTextOffset, length).starts_with("Text log: ")) {
+    log_file_trouble = std::string(bytes + kTextOffset, length);
+    return;
+  }
   if (lines.size() == kMostLines) lines.pop_front();
   lines.push_back({flag, std::string(bytes + kTextOffset, length)});
 }
@@ -54,6 +59,11 @@ std::vector<std::string> ErrorLines(std::uint32_t flags) {
     if ((line.flag & flags) != 0) found.push_back(line.text);
   }
   return found;
+}
+
+std::optional<std::string> LogFileTrouble() {
+  const std::lock_guard lock(mutex);
+  return log_file_trouble;
 }
 
 std::optional<std::string> FindErrorLine(std::string_view part) {

@@ -18,6 +18,8 @@ void CollectErrorLines(KRAL_HANDLE handle);  // from now on, through the text-lo
 void ForgetErrorLines();                     // before a request
 // Those since then, errors and results.
 std::vector<std::string> ErrorLines(std::uint32_t flags = kExplainingLines);
+// Why the file of the text log does not hold all lines; nothing when it does.
+std::optional<std::string> LogFileTrouble();
 // The last of them that holds a text.
 std::optional<std::string> FindErrorLine(std::string_view part);
 

@@ -14,6 +14,7 @@ std::atomic<bool> interrupted{false};
 
 void CatchInterrupts() {
   kral::CatchInterrupts(&interrupted);
+  OutliveClosedPipes();
 }
 
 bool Interrupted() {

@@ -1,4 +1,5 @@
-// Ctrl-C and termination requests: the first one asks the running verb to stop, the second ends the process.
+// Ctrl-C, termination requests and a closed terminal: the first one asks the running verb to stop, a second request
+// ends the process. A closed pipe ends nothing by itself: the write fails.
 #ifndef KRAL_TOOLS_INTERRUPT_H
 #define KRAL_TOOLS_INTERRUPT_H
 

@@ -6,6 +6,7 @@
 #include <array>
 #include <string_view>
 
+#include "tools/kral/error_lines.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/verbs.h"
@@ -39,8 +40,14 @@ void AllowOptionsAnywhere(CLI::App& app) {
   }
 }
 
+// The verb has done its work all the same.
+void TellLogFileTrouble(const Context& context) {
+  if (const auto trouble = LogFileTrouble()) context.out.Note(*trouble);
+}
+
 int End(const Context& context, const ToolError& error) {
   try {
+    TellLogFileTrouble(context);
     context.out.Failure(error, context.found);
   } catch (const std::exception&) {  // nobody is left to be told
   }
@@ -76,6 +83,7 @@ int Run(int argc, char** argv) {
   try {
     app.parse(argc, argv);
     context.run();
+    TellLogFileTrouble(context);
     return static_cast<int>(ExitCode::kDone);
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() == 0) return app.exit(error);  // --help, --version

@@ -36,7 +36,7 @@ void Output::Result(const Json& members, std::string_view text) const {
 
 void Output::Stream(const Json& members, std::string_view text) const {
   if (json_) {
-    WriteData(members.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n");
+    WriteData(JsonLine(members));
   } else {
     WriteData(text);
   }
@@ -45,16 +45,16 @@ void Output::Stream(const Json& members, std::string_view text) const {
 void Output::Note(std::string_view text) const {
   if (json_) {
     const Json object{{"event", "note"}, {"text", text}};
-    fmt::print(stderr, "{}\n", object.dump(-1, ' ', false, Json::error_handler_t::replace));
+    WriteAside(JsonLine(object));
   } else {
-    fmt::print(stderr, "kral: {}\n", text);
+    WriteAside(fmt::format("kral: {}\n", text));
   }
 }
 
 void Output::Failure(const ToolError& error, const Json& members) const {
   if (!json_) {
-    fmt::print(stderr, "kral: {}\n", error.what());
-    if (!error.hint().empty()) fmt::print(stderr, "      {}\n", error.hint());
+    WriteAside(fmt::format("kral: {}\n", error.what()));
+    if (!error.hint().empty()) WriteAside(fmt::format("      {}\n", error.hint()));
     return;
   }
   Json object = members;
@@ -68,8 +68,28 @@ void Output::Failure(const ToolError& error, const Json& members) const {
 void Output::WriteObject(bool ok, const Json& members) const {
   Json object{{"ok", ok}};
   object.update(members);
-  // Texts may come from command lines and from the system: an invalid UTF-8 byte is replaced, never fatal.
-  WriteData(object.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n");
+  WriteData(JsonLine(object));
+}
+
+void WriteAside(std::string_view text) noexcept {
+  std::fwrite(text.data(), 1, text.size(), stderr);
+}
+
+std::string JsonLine(const Json& object) {
+  const std::string text = object.dump(-1, ' ', false, Json::error_handler_t::replace);
+  std::string line;
+  line.reserve(text.size() + 1);
+  // They stand in strings only.
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    const auto at = [&text](std::size_t place) { return static_cast<unsigned char>(text[place]); };
+    const bool is_control = at(i) == 0xC2 && i + 1 < text.size() && at(i + 1) < 0xA0;
+    if (is_control || at(i) == 0x7F) {
+      line += fmt::format("\\u{:04x}", at(is_control ? ++i : i));
+    } else {
+      line += text[i];
+    }
+  }
+  return line + "\n";
 }
 
 std::string Printable(std::string_view text) {

@@ -38,6 +38,13 @@ class Output {
   bool json_ = false;
 };
 
+// On the standard error. That nobody reads it any more is no reason to stop anything.
+void WriteAside(std::string_view text) noexcept;
+
+// One line. Texts may come from command lines, from the system and from handsets: an invalid UTF-8 byte is replaced,
+// and the controls that JSON lets pass (DEL, 80 to 9F), which a terminal may obey, are escaped like all others.
+std::string JsonLine(const Json& object);
+
 // A text of the handset made fit for a terminal and for JSON: padding cut, anything but printable ASCII shown as '?'.
 std::string Printable(std::string_view text);
 

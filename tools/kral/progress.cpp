@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <array>
 #include <cmath>
-#include <cstdio>
 #include <utility>
 
 #include "platform/console.h"
@@ -133,8 +132,7 @@ void Progress::DrawBar() {
     room -= bar.size();
   }
   title = Shortened(title, room);
-  fmt::print(stderr, "\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width);
-  std::fflush(stderr);
+  WriteAside(fmt::format("\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width));
   drawn_width_ = width;
 }
 
@@ -152,13 +150,12 @@ void Progress::WriteObject() const {
     object["per_second"] = std::round(rate * 10) / 10;
     if (total_ > 0) object["seconds_left"] = SecondsLeft(rate);
   }
-  fmt::print(stderr, "{}\n", object.dump());
+  WriteAside(JsonLine(object));
 }
 
 void Progress::Wipe() {
   if (drawn_width_ == 0) return;
-  fmt::print(stderr, "\r{:<{}}\r", "", std::exchange(drawn_width_, 0));
-  std::fflush(stderr);
+  WriteAside(fmt::format("\r{:<{}}\r", "", std::exchange(drawn_width_, 0)));
 }
 
 }  // namespace kral::tool
