@@ -16,6 +16,17 @@ bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBA
                   KRAL_EFS_DIRECTORY_CALLBACK directory);
 bool Abort(Diag_FTM& phone);
 
+// What is made of many transfers and listings, each of which forgets earlier calls of Abort, ends with one of them.
+class AbortWatch {
+ public:
+  explicit AbortWatch(Diag_FTM& phone) : aborts_(phone.efs().aborts), before_(aborts_) {}
+  bool aborted() const { return aborts_ != before_; }  // since this was made
+
+ private:
+  const std::atomic<uint32_t>& aborts_;
+  const uint32_t before_;
+};
+
 // --- Transfers (efs_write.cpp, efs_read.cpp) ------------------------------------------------------------------------
 bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool WriteFromMemory(Diag_FTM& phone, const uint8_t* buffer, uint32_t size, const char* efs_file);

@@ -63,6 +63,7 @@ void PhoneItems::TellUnlisted(const std::string& folder, uint32_t status, std::v
 
 PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vector<FoundFile>& files,
                                     std::vector<UnlistedFolder>& unlisted) {
+  if (aborts_.aborted()) return Answer::kRefused;
   uint32_t mode = 0;
   uint32_t size = 0;
   uint32_t status = 0;
@@ -82,6 +83,7 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vec
   }
   std::vector<KRAL_EFS_ENTRY> entries;
   if (!List(path, entries)) {
+    if (aborts_.aborted()) return Answer::kRefused;
     if (Unanswered() == Answer::kLost) return Answer::kLost;
     TellUnlisted(path, kRefusedStatus, unlisted);
     return Answer::kAnswered;
@@ -107,7 +109,7 @@ PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files, std::vec
   for (const char* folder : kFolders) {
     if (Walk(folder, 1, files, unlisted) == Answer::kLost) return Answer::kLost;
   }
-  return Answer::kAnswered;
+  return aborts_.aborted() ? Answer::kRefused : Answer::kAnswered;
 }
 
 PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {

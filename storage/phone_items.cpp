@@ -35,12 +35,11 @@ PhoneItems::PhoneItems(Diag_FTM& phone)
     : phone_(phone),
       callers_batch_(std::exchange(phone.nv_batch(), {})),
       callers_transfer_callback_(phone.efs().transfer_callback.exchange(nullptr)),
-      callers_directory_callback_(phone.efs().directory_callback.exchange(nullptr)) {}
+      aborts_(phone) {}
 
 PhoneItems::~PhoneItems() {
   phone_.nv_batch() = std::move(callers_batch_);
   phone_.efs().transfer_callback = callers_transfer_callback_;
-  phone_.efs().directory_callback = callers_directory_callback_;
 }
 
 PhoneItems::Answer PhoneItems::Try(const std::function<bool()>& ask) {

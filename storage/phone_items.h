@@ -13,6 +13,7 @@
 
 #include "frame/diag_ftm.h"
 #include "storage/efs_backup.h"
+#include "storage/efs_client.h"
 #include "storage/pkv_format.h"
 
 namespace kral {
@@ -28,7 +29,7 @@ class PhoneItems {
   // As many full items as one packet of a batch takes.
   static constexpr size_t kMostInBatch = 9;
 
-  // Takes the batch queue and the EFS callbacks away from the caller while it lives.
+  // Takes the batch queue and the EFS transfer callback away from the caller while it lives.
   explicit PhoneItems(Diag_FTM& phone);
   ~PhoneItems();
   PhoneItems(const PhoneItems&) = delete;
@@ -55,7 +56,7 @@ class PhoneItems {
     uint32_t status;
   };
   // Appends what the item folders hold. A handset without them, or without a file system, has none; other folders that
-  // cannot be listed are logged and told.
+  // cannot be listed are logged and told. The caller's directory callback sees the entries. An abort ends it early.
   Answer FindFiles(std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   Answer FindFiles(std::vector<FoundFile>& files);  // kRefused when there are unlisted ones
   // Of a file or folder, when the status is 0.
@@ -82,7 +83,7 @@ class PhoneItems {
   const Diag_FTM::Resynchronising resynchronising_{phone_};  // replies to item requests do not name their file
   NvBatch callers_batch_;
   KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
-  KRAL_EFS_DIRECTORY_CALLBACK callers_directory_callback_;
+  const efs::AbortWatch aborts_;
   size_t walked_ = 0;                           // folders and what is listed as one
   uint8_t refusal_ = 0;                         // the code of the last Try that was refused
   std::set<std::string, std::less<>> folders_;  // that were made, or were there

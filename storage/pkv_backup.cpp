@@ -74,12 +74,14 @@ std::vector<Wanted> WantedItems(Diag_FTM& phone) {
 
 class BackupJob {
  public:
-  explicit BackupJob(Diag_FTM& phone) : phone_(phone), items_(phone) {}
+  explicit BackupJob(Diag_FTM& phone) : phone_(phone), aborts_(phone), items_(phone) {}
 
   uint32_t Run(PkvSet& set) {
     std::vector<PhoneItems::FoundFile> files;
     std::vector<PhoneItems::UnlistedFolder> unlisted;
-    if (items_.FindFiles(files, unlisted) == Answer::kLost) return KRAL_PKV_STATUS_LOST;
+    const Answer found = items_.FindFiles(files, unlisted);
+    if (aborts_.aborted()) return KRAL_PKV_STATUS_STOPPED;
+    if (found == Answer::kLost) return KRAL_PKV_STATUS_LOST;
     const std::vector<Wanted> items = WantedItems(phone_);
     JobReport report(phone_, items.size() + unlisted.size() + files.size());
     for (const Wanted& item : items) {
@@ -126,7 +128,7 @@ class BackupJob {
   bool ReadFile(const PhoneItems::FoundFile& found, PkvSet& set, JobReport& report) {
     PkvEfsFile file{.path = found.path, .mode = found.mode, .bytes = {}};
     uint32_t status = 0;
-    if (items_.ReadFile(file, status, found.size) == Answer::kLost) return false;
+    if (items_.ReadFile(file, status, found.size) == Answer::kLost || report.stopped()) return false;
     // Less than the handset lists would be a backup that looks whole. The same for more than a file of ours holds.
     if (status == 0 && (file.bytes.size() < found.size || file.bytes.size() > bytes_left_)) {
       status = PhoneItems::kRefusedStatus;
@@ -138,6 +140,7 @@ class BackupJob {
   }
 
   Diag_FTM& phone_;
+  const efs::AbortWatch aborts_;
   PhoneItems items_;
   size_t bytes_left_ = kMostFileBytes;
 };

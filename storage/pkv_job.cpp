@@ -41,7 +41,7 @@ bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, u
   return true;
 }
 
-JobReport::JobReport(Diag_FTM& phone, size_t total) : phone_(phone) {
+JobReport::JobReport(Diag_FTM& phone, size_t total) : phone_(phone), aborts_(phone) {
   phone.pkv().counts = {};
   phone.pkv().counts.total = static_cast<uint32_t>(total);
 }
@@ -68,7 +68,7 @@ void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
   KRAL_PKV_COUNTS& counts = phone_.pkv().counts;
   ++*CounterOf(counts, record.result);
   ++reported_;
-  if (stopped_) return;
+  if (stopped()) return;
   const auto callback = phone_.pkv().callback.load();
   if (callback == nullptr) return;
   // One that fails does not say that it is to go on.

@@ -9,6 +9,7 @@
 #include <string>
 
 #include "frame/diag_ftm.h"
+#include "storage/efs_client.h"
 #include "storage/pkv_set.h"
 
 namespace kral::pkv {
@@ -30,16 +31,18 @@ class JobReport {
   JobReport(const JobReport&) = delete;
   JobReport& operator=(const JobReport&) = delete;
 
-  // Each item and file is reported once. After the caller has stopped the job they are counted only.
+  // Each item and file is reported once. After the caller has stopped the job, by the callback or by an abort, they are
+  // counted only.
   void Add(const PkvNvItem& item, uint32_t result, uint32_t status);
   void Add(const PkvEfsFile& file, uint32_t result, uint32_t status);
-  bool stopped() const { return stopped_; }
+  bool stopped() const { return stopped_ || aborts_.aborted(); }
   const KRAL_PKV_COUNTS& counts() const;
 
  private:
   void Add(KRAL_PKV_ITEM& record, const char* path);
 
   Diag_FTM& phone_;
+  const efs::AbortWatch aborts_;
   uint32_t reported_ = 0;
   bool stopped_ = false;
 };

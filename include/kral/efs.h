@@ -140,7 +140,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_
 
 /**
  * Ends the transfer or listing that runs on another thread, before its next packet or the next try of one that is not
- * answered; it then gives 0. Each of them forgets earlier calls when it starts.
+ * answered; it then gives 0. Each of them forgets earlier calls when it starts. A backup, restore or comparison
+ * (pkv.h) is stopped as its callback would stop it.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle);
 

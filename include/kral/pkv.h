@@ -15,6 +15,9 @@
  *   written in every case but for an unknown handle, and may be null.
  * - The work takes as long as its requests: plan for one round trip per item of a backup or comparison, and for 1.2 of
  *   a restore. The callback tells how far it is and can end it; other requests on the handle wait for its end.
+ * - A backup lists the item folders first. Until that is done the total is not known and the callback is not called;
+ *   the directory callback (KRAL_ConfigureEfs2CallBacks) is, with every entry. KRAL_AbortEFS_Operation ends the work
+ *   also then, and in the midst of a file.
  */
 #ifndef KRAL_PKV_H
 #define KRAL_PKV_H
@@ -35,7 +38,7 @@ extern "C" {
 #define KRAL_PKV_STATUS_NOTHING_READ 22u       /**< the handset gave no item and no file */
 #define KRAL_PKV_STATUS_NOT_WRITTEN 23u        /**< the handset refused something, or reads back otherwise */
 #define KRAL_PKV_STATUS_DIFFERENT 256u         /**< file and handset differ */
-#define KRAL_PKV_STATUS_STOPPED 257u           /**< the callback wanted it so */
+#define KRAL_PKV_STATUS_STOPPED 257u           /**< the callback or KRAL_AbortEFS_Operation wanted it so */
 #define KRAL_PKV_STATUS_UNEXPECTED 0xFFFFFFFFu /**< the library itself failed: out of memory, for instance */
 
 /** What became of an item or a file. */

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <map>
+#include <thread>
 
 #include "kral/nv.h"
 #include "kral/nv_tool.h"
@@ -393,20 +394,50 @@ TEST_F(PkvBackup, TheCallbackEndsEachOfThem) {
   EXPECT_EQ(folder_.Content("phone.pkv"), before);
 }
 
+TEST_F(PkvBackup, AnAbortEndsEachOfThemAlsoWhileFoldersAreListed) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  const std::string before = folder_.Content("phone.pkv");
+  static int listed;
+  listed = 0;
+  KRAL_ConfigureEfs2CallBacks(handle(), nullptr, [](const KRAL_EFS_ENTRY*, KRAL_HANDLE handle) {
+    if (++listed == 1) KRAL_AbortEFS_Operation(handle);
+  });
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_STOPPED);
+  EXPECT_EQ(listed, 1);
+  EXPECT_TRUE(g_results.empty());
+  KRAL_ConfigureEfs2CallBacks(handle(), nullptr, nullptr);
+
+  // In the midst of a file, which is not called refused.
+  KRAL_ConfigureTimeOut(handle(), 0, 200);
+  handset().faults().Add(handset::Ignore(), When::Always().Of("4B 13 04 00"));
+  handset().ClearTrace();
+  std::jthread other([this](const std::stop_token& stop) {
+    while (!stop.stop_requested() && RequestsOf({75, 19, 4}) == 0) std::this_thread::yield();
+    KRAL_AbortEFS_Operation(handle());
+  });
+  EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_STOPPED);
+  EXPECT_EQ(Counts(), "21 40 0 0 0 2");
+  EXPECT_EQ(folder_.Content("phone.pkv"), before);
+}
+
 TEST_F(PkvBackup, WhatTheCallerHadUnderWayStays) {
   Furnish();
   static int calls;
-  calls = 0;
+  static int listed;
+  calls = listed = 0;
   KRAL_ConfigureEfs2CallBacks(
       handle(), [](uintptr_t, uintptr_t, uint32_t, uint32_t, uint32_t, uint32_t, KRAL_HANDLE) { ++calls; },
-      [](const KRAL_EFS_ENTRY*, KRAL_HANDLE) { ++calls; });
+      [](const KRAL_EFS_ENTRY*, KRAL_HANDLE) { ++listed; });
   KRAL_DIAG_NV_WRITE_SetBatchMode(handle(), 1);
   uint8_t data = 0x77;
   uint16_t status = 0;
   KRAL_DIAG_NV_WRITE_F(handle(), 1000, &data, 1, &status);
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  EXPECT_GT(listed, 3) << "the folders are listed, which takes its time";
+  listed = 0;
   ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u);
-  EXPECT_EQ(calls, 0);
+  EXPECT_EQ(calls + listed, 0);
   EXPECT_EQ(KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle(), nullptr, nullptr, nullptr), 1);
   EXPECT_TRUE(handset().nv().Value(1000).has_value());
   KRAL_EfsPutItemFromMem(handle(), "/nv/items/x", &data, 1);

@@ -6,9 +6,6 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <chrono>
-#include <condition_variable>
-#include <mutex>
 #include <utility>
 
 #include "tools/kral/error_lines.h"
@@ -22,7 +19,6 @@ namespace {
 constexpr std::uint32_t kNoSuchFile = 2;
 constexpr std::uint32_t kExists = 6;
 constexpr std::size_t kMostEntries = 200'000;  // of all directories that a verb lists; more is a handset gone wrong
-constexpr std::chrono::milliseconds kInterruptPoll{100};
 
 // The callbacks carry the handle and nothing else.
 RemoteFiles* current = nullptr;
@@ -93,24 +89,12 @@ bool RemoteStatus::is_item() const {
 RemoteFiles::RemoteFiles(const SessionOptions& options) : session_(options) {
   current = this;
   KRAL_ConfigureEfs2CallBacks(session_.handle(), &RemoteFiles::OnChunk, &RemoteFiles::OnEntry);
-  interrupt_watch_ =
-      std::jthread([handle = session_.handle()](const std::stop_token& stop) { AbortWhenInterrupted(stop, handle); });
+  interrupt_watch_.emplace(session_.handle());
 }
 
 RemoteFiles::~RemoteFiles() {
   KRAL_ConfigureEfs2CallBacks(session_.handle(), nullptr, nullptr);
   current = nullptr;
-}
-
-// A silent handset brings no callback in which Ctrl-C could be seen. The abort is repeated: what begins in that moment
-// forgets it.
-void RemoteFiles::AbortWhenInterrupted(const std::stop_token& stop, KRAL_HANDLE handle) {
-  std::mutex mutex;
-  std::condition_variable_any stopped;
-  std::unique_lock lock(mutex);
-  while (!stopped.wait_for(lock, stop, kInterruptPoll, [&] { return stop.stop_requested(); })) {
-    if (Interrupted()) KRAL_AbortEFS_Operation(handle);
-  }
 }
 
 void KRAL_CALL RemoteFiles::OnChunk(std::uintptr_t, std::uintptr_t, std::uint32_t, std::uint32_t, std::uint32_t done,

@@ -8,9 +8,9 @@
 #include <span>
 #include <string>
 #include <string_view>
-#include <thread>
 #include <vector>
 
+#include "tools/kral/abort_on_interrupt.h"
 #include "tools/kral/session.h"
 
 namespace kral::tool {
@@ -79,7 +79,6 @@ class RemoteFiles {
   static void KRAL_CALL OnChunk(std::uintptr_t source, std::uintptr_t destination, std::uint32_t operation,
                                 std::uint32_t reserved, std::uint32_t done, std::uint32_t total, KRAL_HANDLE handle);
   static void KRAL_CALL OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle);
-  static void AbortWhenInterrupted(const std::stop_token& stop, KRAL_HANDLE handle);
   template <class Request>
   void Transfer(std::string_view what, Request&& request);
   ToolError Refusal(std::string_view what, std::uint32_t error_number) const;
@@ -88,8 +87,8 @@ class RemoteFiles {
   Watch watch_;
   std::string listed_;  // the directory whose entries arrive
   std::vector<RemoteEntry> entries_;
-  std::size_t entry_count_ = 0;   // of everything listed
-  std::jthread interrupt_watch_;  // last: it uses the connection
+  std::size_t entry_count_ = 0;                      // of everything listed
+  std::optional<AbortOnInterrupt> interrupt_watch_;  // last: it uses the connection
 };
 
 }  // namespace kral::tool

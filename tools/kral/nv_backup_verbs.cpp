@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "tools/kral/abort_on_interrupt.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/nv_items.h"
 #include "tools/kral/progress.h"
@@ -71,8 +72,13 @@ class JobRun {
   std::uint32_t Run(Session& session, Job job, const std::string& file) {
     session.Begin();
     KRAL_PKV_ConfigureCallBack(session.handle(), OnItem);
+    KRAL_ConfigureEfs2CallBacks(session.handle(), nullptr, OnEntry);
     std::uint32_t status = KRAL_PKV_STATUS_LOST;
-    job(session.handle(), file.c_str(), &status);
+    {
+      const AbortOnInterrupt watch(session.handle());
+      job(session.handle(), file.c_str(), &status);
+    }
+    KRAL_ConfigureEfs2CallBacks(session.handle(), nullptr, nullptr);
     KRAL_PKV_ConfigureCallBack(session.handle(), nullptr);
     KRAL_PKV_GetCounts(session.handle(), &counts_);
     return status;
@@ -110,9 +116,16 @@ class JobRun {
   static std::uint8_t KRAL_CALL OnItem(const KRAL_PKV_ITEM* item, const char* path, std::uint32_t done,
                                        std::uint32_t total, KRAL_HANDLE) {
     running_->Note(*item, path);
+    if (std::exchange(running_->listed_, 0) != 0) running_->progress_.Describe("");
     running_->progress_.SetTotal(total);
     running_->progress_.Update(done);
     return Interrupted() ? 0 : 1;
+  }
+
+  // What a backup will read is found out first.
+  static void KRAL_CALL OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE) {
+    running_->progress_.Describe(entry->name);
+    running_->progress_.Update(++running_->listed_);
   }
 
   void Note(const KRAL_PKV_ITEM& item, const char* path) {
@@ -147,6 +160,7 @@ class JobRun {
   const Words words_;
   const bool keeps_all_;  // or only those that went wrong
   Progress progress_;
+  std::uint64_t listed_ = 0;
   KRAL_PKV_COUNTS counts_{};
   Json items_ = Json::array();
   std::string text_;
