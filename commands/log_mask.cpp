@@ -129,7 +129,10 @@ std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_
     phone.log().WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask");
     return other == OtherMask::kNothingOn ? std::optional(std::move(mask)) : std::nullopt;
   }
-  if (told->items != items) return std::nullopt;
+  if (told->items != items) {
+    Fail(BadReply(phone, "holds a mask of another length than the ranges tell"));
+    return std::nullopt;
+  }
   std::copy(told->bytes.begin(), told->bytes.end(), mask.bytes().begin());
   return mask;
 }
