@@ -52,6 +52,7 @@ struct EfsSettings {
   std::atomic<uint16_t> write_packet_size{524};
   std::atomic<bool> abort{false};
   std::atomic<uint32_t> aborts{0};  // how often that was set
+  bool gave_up = false;             // an abort has ended the wait for an answer that did not come
   std::atomic<KRAL_EFS_TRANSFER_CALLBACK> transfer_callback{nullptr};
   std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
   std::atomic<KRAL_HANDLE> callback_context{0};

@@ -114,7 +114,7 @@ bool List(Diag_FTM& phone, const std::string& folder, uint8_t filter, KRAL_EFS_E
 }  // namespace
 
 bool ListDirectory(Diag_FTM& phone, const char* folder, uint8_t filter, KRAL_EFS_ENTRY* entries, u32* count) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   const std::string path = folder == nullptr || *folder == '\0' ? "/" : folder;
   if (List(phone, path, filter, entries, count)) return true;
   phone.log().WriteLine(kLogErr, "KRAL_EfsDirectory( sFolderPath = %s ) - Failed", path.c_str());

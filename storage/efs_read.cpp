@@ -102,7 +102,7 @@ bool Read(Diag_FTM& phone, const char* efs_file, const FileStatus& status, const
 }  // namespace
 
 bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   FileStatus status;
   if (!StatExisting(phone, efs_file, status)) return false;
   const char* const name = TextOrEmpty(local_file);
@@ -126,7 +126,7 @@ bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
 }
 
 bool ReadToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   if (size == nullptr || (buffer == nullptr && *size > 0)) return false;
   FileStatus status;
   if (!StatExisting(phone, efs_file, status)) return false;

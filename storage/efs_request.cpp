@@ -86,6 +86,20 @@ bool AskComposed(Diag_FTM& phone, Tries tries) {
   return ExchangeUntil(phone, time_out_ms, {}, [](std::span<const u8>) { return true; });
 }
 
+void ForgetAbort(Diag_FTM& phone) {
+  phone.efs().abort = false;
+  phone.efs().gave_up = false;
+}
+
+u32 CleanUpTimeOut(Diag_FTM& phone, u32 time_out_ms) {
+  constexpr u32 kMomentMs = 50;
+  return phone.efs().gave_up ? std::min(time_out_ms, kMomentMs) : time_out_ms;
+}
+
+int CleanUpTries(Diag_FTM& phone) {
+  return phone.efs().gave_up ? 1 : kTries;
+}
+
 bool IsAborted(Diag_FTM& phone, const char* operation) {
   if (!phone.efs().abort) return false;
   phone.log().WriteLine(kLogErr, "EFS %s aborted", operation);

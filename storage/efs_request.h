@@ -37,6 +37,12 @@ inline bool Exchange(Diag_FTM& phone, u32 time_out_ms) {
 // earlier one's time-out has closed.
 bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
 
+// Every transfer and listing begins with it.
+void ForgetAbort(Diag_FTM& phone);
+// What cleans up behind an aborted one. A handset that was silent when the abort came is told, but hardly waited for.
+u32 CleanUpTimeOut(Diag_FTM& phone, u32 time_out_ms);
+int CleanUpTries(Diag_FTM& phone);
+
 // Whether the transfer or listing is to end; logged when it is.
 bool IsAborted(Diag_FTM& phone, const char* operation);
 

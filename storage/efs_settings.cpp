@@ -21,6 +21,7 @@ bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBA
 bool Abort(Diag_FTM& phone) {
   ++phone.efs().aborts;
   phone.efs().abort = true;
+  phone.responses().EndWaits();
   return true;
 }
 

@@ -93,7 +93,9 @@ bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 t
   packet.Append16(close.header.command);
   packet.Append32(value);
   bool unanswered = false;
-  for (int attempt = 0; attempt < kTries; ++attempt) {
+  time_out_ms = CleanUpTimeOut(phone, time_out_ms);
+  const int tries = CleanUpTries(phone);
+  for (int attempt = 0; attempt < tries; ++attempt) {
     u32 error = 0;
     if (!ExchangePacket(phone, packet, time_out_ms) || !packet.ResponseAt32(kErrorBehindHeader, error)) {
       unanswered = true;

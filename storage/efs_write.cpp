@@ -36,9 +36,11 @@ bool HasRoom(Diag_FTM& phone, u32 size) {
 // Tried like every packet of a transfer, also after an abort.
 bool Remove(Diag_FTM& phone, const char* efs_file) {
   bool unanswered = false;
-  for (int attempt = 0; attempt < kTries; ++attempt) {
+  const int tries = CleanUpTries(phone);
+  for (int attempt = 0; attempt < tries; ++attempt) {
     u32 error = 0;
-    if (!Unlink(phone, efs_file, &error)) {
+    Compose(phone, kUnlink, PathField(efs_file));
+    if (!Exchange(phone, CleanUpTimeOut(phone, DefaultTimeOut(phone))) || !ReadFromEnd(phone, {&error})) {
       unanswered = true;
       continue;
     }
@@ -132,14 +134,14 @@ bool WriteLocalFile(Diag_FTM& phone, const char* local_file, const char* efs_fil
 }  // namespace
 
 bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   const bool passed = WriteLocalFile(phone, local_file, efs_file);
   phone.log().WriteLine(passed ? kLogRet : kLogErr, "KRAL_EfsWrite() - %s", passed ? "PASS" : "FAIL");
   return passed;
 }
 
 bool WriteFromMemory(Diag_FTM& phone, const u8* buffer, u32 size, const char* efs_file) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   if (buffer == nullptr && size > 0) return false;
   Source source{.size = size, .ends = {AddressOf(buffer), AddressOf(efs_file)}};
   source.read = [buffer](u32 offset, std::span<u8> chunk) {

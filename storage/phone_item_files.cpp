@@ -158,6 +158,7 @@ PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t& status)
     file.bytes.resize(size);
     return Answer::kAnswered;
   }
+  if (aborts_.aborted()) return Answer::kRefused;
   // Lost, or only not to be had: a handset that still answers tells.
   return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
 }

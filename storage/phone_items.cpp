@@ -48,7 +48,7 @@ PhoneItems::Answer PhoneItems::Try(const std::function<bool()>& ask) {
     phone_.packet().response_area()[0] = 0;  // no refusal of an earlier request, should this one not be sent
     if (ask()) return Answer::kAnswered;
     refusal_ = efs::LastRefusal(phone_);
-    if (refusal_ != 0) return Answer::kRefused;
+    if (refusal_ != 0 || aborts_.aborted()) return Answer::kRefused;
   }
   return Unanswered();
 }

@@ -3,6 +3,7 @@
 #ifndef KRAL_TRANSPORT_BOUNDED_QUEUE_H
 #define KRAL_TRANSPORT_BOUNDED_QUEUE_H
 
+#include <atomic>
 #include <chrono>
 #include <condition_variable>
 #include <cstddef>
@@ -65,14 +66,21 @@ class BoundedQueue {
     return TakeFront();
   }
 
-  // The oldest record, or nothing after the time-out. 0 does not wait. Any record that is there counts, also one that
-  // came before the call: no signal can be left over from a queue since cleared.
-  std::optional<Record> PopWithin(std::chrono::milliseconds time_out) {
+  // The oldest record, or nothing after the time-out, or once `abort` is set. 0 does not wait. Any record that is there
+  // counts, also one that came before the call: no signal can be left over from a queue since cleared.
+  std::optional<Record> PopWithin(std::chrono::milliseconds time_out, const std::atomic<bool>* abort = nullptr) {
     std::unique_lock lock(mutex_);
     const uint64_t known = told_interrupts_;
-    not_empty_.wait_for(lock, time_out, [this, known] { return closed_ || interrupts_ != known || !records_.empty(); });
+    not_empty_.wait_for(lock, time_out, [this, known, abort] {
+      return closed_ || interrupts_ != known || !records_.empty() || (abort != nullptr && abort->load());
+    });
     if (records_.empty()) told_interrupts_ = interrupts_;
     return TakeFront();
+  }
+  // After an abort has been set.
+  void EndWaits() {
+    const std::lock_guard lock(mutex_);
+    not_empty_.notify_all();
   }
 
   // Nobody waits in this queue until it is opened again; what is in it can be taken.

@@ -139,8 +139,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_
                                                        KRAL_EFS_DIRECTORY_CALLBACK directory);
 
 /**
- * Ends the transfer or listing that runs on another thread, before its next packet or the next try of one that is not
- * answered; it then gives 0. Each of them forgets earlier calls when it starts. A backup, restore or comparison
+ * Ends the transfer or listing that runs on another thread, before its next packet; it then gives 0. The answer to a
+ * packet that is under way is waited for only a moment: with a silent handset the function is back within 250 ms, and a
+ * part of a file may stay there. Each of them forgets earlier calls when it starts. A backup, restore or comparison
  * (pkv.h) is stopped as its callback would stop it.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle);
