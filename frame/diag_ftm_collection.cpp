@@ -1,4 +1,5 @@
 // What a phone object keeps of the traffic that nobody asked for: counters, the capture file, playback.
+#include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/diag_ftm_parts.h"
 
@@ -16,7 +17,7 @@ TrafficCounters Diag_FTM::counters() {
 bool Diag_FTM::StartCapture(const char* file_name) {
   if (capture().Start([file_name] { return OpenCaptureFile(file_name); }, parts_)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be written or is in use, or a capture runs already", file_name);
-  return false;
+  return Fail(FileFailure(file_name, "cannot be written or is in use, or a capture runs already"));
 }
 
 // What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher; while a
@@ -37,7 +38,7 @@ bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
   if (!server_mode() && player().Start(OpenCaptureSource(file_name), pace, dispatcher(), sorter(), parts_)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",
                   file_name);
-  return false;
+  return Fail(FileFailure(file_name, "cannot be read or is being written, or a file is played already"));
 }
 
 // Nobody may wait for packets of a handset that is gone.

@@ -14,6 +14,20 @@ bool IsOwnReply(std::span<const u8> request, std::span<const u8> reply, const Re
          (!is_own || is_own(reply));
 }
 
+// While a request is under way. What is sent after an abort, to clean up, is not ended by it.
+class AbortScope {
+ public:
+  explicit AbortScope(Diag_FTM& phone) : phone_(phone) {
+    phone.transport().SetAbort(phone.efs().abort ? nullptr : &phone.efs().abort);
+  }
+  ~AbortScope() { phone_.transport().SetAbort(nullptr); }
+  AbortScope(const AbortScope&) = delete;
+  AbortScope& operator=(const AbortScope&) = delete;
+
+ private:
+  Diag_FTM& phone_;
+};
+
 }  // namespace
 
 Path PathField(const char* path) {
@@ -41,6 +55,7 @@ bool IsWithinLimit(Diag_FTM& phone) {
 
 Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own) {
   NoteLateReplies(phone);
+  const AbortScope scope(phone);
   const Reply synchronised =
       phone.Synchronise(time_out_ms, [&](std::span<const u8> late) { NoteLateReply(phone, late); });
   if (!synchronised) {
@@ -61,6 +76,7 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     const u32 elapsed = std::min(phone.clock().TickMs() - start, time_out_ms);
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own_or_noted);
   }
+  if (reply.kind() == ReplyKind::kAborted) phone.efs().gave_up = true;
   return reply;
 }
 

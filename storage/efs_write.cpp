@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <functional>
 
+#include "frame/base/failure.h"
 #include "frame/base/text_argument.h"
 #include "platform/file_util.h"
 #include "storage/efs_handle.h"
@@ -111,8 +112,9 @@ bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
   const bool written = WriteChunks(phone, file.value(), packet_size, source);
   if (!written) phone.log().WriteLine(kLogErr, "EFS2WriteEntireFile() failed");
   const bool closed = file.Close();
-  if (written && closed && !IsAborted(phone, "Write")) return true;
+  if (!IsAborted(phone, "Write") && written && closed) return true;
   // What is there now is a part of the file.
+  const KeepFailure keep;
   if (!Remove(phone, efs_file)) phone.log().WriteLine(kLogErr, "EFS Write leaves a part of %s behind", efs_file);
   return false;
 }

@@ -3,8 +3,10 @@
 #define KRAL_TRANSPORT_KRAL_THREAD_INTERFACE_H
 
 #include <atomic>
+#include <chrono>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <span>
 #include <vector>
 
@@ -69,6 +71,9 @@ class CKralThreadInterface {
                  uint32_t delay_ms, const ReplyTest& is_own = {});
   // Awaits another reply to the request that was sent last; a time-out leaves the port open.
   Reply AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms, const ReplyTest& is_own = {});
+  // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
+  // handset that is only slow may answer for a moment still. The port stays open.
+  void SetAbort(const std::atomic<bool>* abort) { abort_ = abort; }
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
   Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
   // Awaits no reply: expected means written.
@@ -114,6 +119,7 @@ class CKralThreadInterface {
   void EndWaits();
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
+  std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);
   Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
   ReplyKind WhyNotWritten() const;
   ReplyKind WhyNoReply(uint64_t garbled_before) const;
@@ -130,6 +136,7 @@ class CKralThreadInterface {
   std::atomic<bool> connected_{false};
   std::atomic<bool> null_port_{false};
   std::atomic<bool> waits_ended_{false};  // since the port was opened
+  const std::atomic<bool>* abort_ = nullptr;  // of whoever holds the request lock
   bool user_defined_ = false;
   bool paused_ = false;
   std::vector<uint8_t> timed_out_request_;

@@ -57,10 +57,11 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
     if (delay_ms != 0) clock_.SleepMs(delay_ms);
     const uint32_t read_start = clock_.TickMs();
     reply = AwaitNext(room, expected_code, time_out_ms, is_own);
+    const bool has_time = reply.came() && (reply || clock_.TickMs() - read_start <= time_out_ms);
     if (reply.kind() == ReplyKind::kGone) {
       if (log_) log_->WriteLine(kLogErr, "Request not answered: the device has gone");
       Close();
-    } else if (!reply.came() || (!reply && clock_.TickMs() - read_start > time_out_ms)) {
+    } else if (!has_time && reply.kind() != ReplyKind::kAborted) {
       TimedOut(request);
     }
     if (log_ && reply) {
@@ -88,7 +89,7 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
   const uint32_t start = clock_.TickMs();
   const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (uint32_t waited = 0;; waited = std::min(clock_.TickMs() - start, time_out_ms)) {
-    const auto record = sorter_->responses().PopWithin(std::chrono::milliseconds(time_out_ms - waited));
+    const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
     if (!record || record->empty()) return WhyNoReply(garbled_before);
     const auto bytes = CopyRecord(*record, room);
     if (record->front() != expected_code) {
@@ -104,12 +105,20 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
   }
 }
 
+std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
+  constexpr std::chrono::milliseconds kMoment{80};
+  auto record = sorter_->responses().PopWithin(time_out, abort_);
+  if (!record && abort_ != nullptr && *abort_) record = sorter_->responses().PopWithin(std::min(time_out, kMoment));
+  return record;
+}
+
 ReplyKind CKralThreadInterface::WhyNotWritten() const {
   return port_.gone() ? ReplyKind::kGone : ReplyKind::kWriteFailed;
 }
 
 ReplyKind CKralThreadInterface::WhyNoReply(uint64_t garbled_before) const {
   if (port_.gone()) return ReplyKind::kGone;
+  if (abort_ != nullptr && *abort_) return ReplyKind::kAborted;
   return splitter_.deframer().bad_fcs() != garbled_before ? ReplyKind::kGarbled : ReplyKind::kNone;
 }
 
