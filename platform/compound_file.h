@@ -1,5 +1,5 @@
-// Compound documents (structured storage): a tree of storages and streams, loaded and saved whole. The system's
-// writer does the saving: OLE structured storage on Windows, libgsf on Linux. Loading is our own, see the reader for why.
+// Compound documents (structured storage): a tree of storages and streams, loaded and saved whole. OLE structured
+// storage does the saving on Windows, a writer of our own on Linux. Loading is our own on both, see the reader for why.
 #ifndef KRAL_PLATFORM_COMPOUND_FILE_H
 #define KRAL_PLATFORM_COMPOUND_FILE_H
 

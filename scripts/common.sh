@@ -41,7 +41,7 @@ machine_sources() {
 }
 
 # What every build needs, and what the 32-bit Windows home needs beside it.
-build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libgsf-1-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev python3
+build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev python3
   libxml2-utils srecord libgsf-bin python3-olefile)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)

@@ -60,6 +60,8 @@ bool IsHeldByAnother(int file, int lock) {
 
 // Where a new file takes the place of what a path leads to. `mode` is that of a file which is there, or stays as it is.
 std::error_code FindTarget(const std::string& path, std::string& target, std::optional<mode_t>& mode) {
+  // A temporary file beside nothing could be made, but never moved there.
+  if (path.empty()) return std::make_error_code(std::errc::no_such_file_or_directory);
   struct stat status {};
   if (::stat(path.c_str(), &status) == 0) {
     if (!S_ISREG(status.st_mode)) return KindError(status.st_mode);

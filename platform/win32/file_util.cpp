@@ -89,6 +89,8 @@ std::error_code Resolve(const std::string& path, std::string& target) {
 
 // Where a new file takes the place of what a path leads to.
 std::error_code FindTarget(const std::string& path, std::string& target) {
+  // A temporary file beside nothing could be made, but never moved there.
+  if (path.empty()) return std::make_error_code(std::errc::no_such_file_or_directory);
   if (!DeviceName(path).empty()) return std::make_error_code(std::errc::invalid_argument);
   target = path;
   const DWORD attributes = ::GetFileAttributesA(path.c_str());

@@ -85,6 +85,27 @@ TEST_P(PkvOracle, GsfListsEveryStreamAndReadsThem) {
   }
 }
 
+// More sectors of the allocation table than the header lists.
+TEST(CompoundFileOracle, OlefileReadsALargeOne) {
+  const test::TempFolder folder;
+  CompoundStorage root;
+  std::vector<uint8_t>& bytes = root.OpenOrAddStream("large").bytes;
+  bytes.resize(9'000'000);
+  for (size_t i = 0; i < bytes.size(); ++i) bytes[i] = static_cast<uint8_t>(i * 2654435761u >> 24);
+  ASSERT_EQ(SaveCompoundFile(folder.Path("large"), root), "");
+  const std::string copy =
+      "import olefile, sys\n"
+      "ole = olefile.OleFileIO(sys.argv[1], raise_defects=olefile.DEFECT_POTENTIAL)\n"
+      "open(sys.argv[2], 'wb').write(ole.openstream('large').read())\n";
+  const std::string command =
+      "/usr/bin/python3 " + folder.Add("copy.py", copy) + " " + folder.Path("large") + " " + folder.Path("copy");
+  ASSERT_EQ(std::system(command.c_str()), 0) << "the scripts install python3-olefile";
+  EXPECT_TRUE(folder.Content("copy") == std::string(bytes.begin(), bytes.end()));
+  CompoundStorage read;
+  ASSERT_EQ(LoadCompoundFile(folder.Path("large"), read), "");
+  EXPECT_TRUE(read.FindStream("large")->bytes == bytes);
+}
+
 INSTANTIATE_TEST_SUITE_P(BothWriters, PkvOracle, testing::Values(PkvWriter::kStorageClasses, PkvWriter::kVarnPkvFile));
 
 }  // namespace
