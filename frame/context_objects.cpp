@@ -108,7 +108,7 @@ std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle) try {
   return nullptr;
 }
 
-std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make) try {
+std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make) {
   const auto phone = GetPhone(handle);
   if (!phone || (IsServerModeOnly(slot) && !phone->server_mode())) return nullptr;
   if (auto object = Owned(handle, FamilyIn{slot})) return Joined(phone, std::move(object));
@@ -117,11 +117,15 @@ std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slo
   // lock may ask for a family object.
   const std::lock_guard building(phone->request_lock());
   if (auto object = Owned(handle, FamilyIn{slot})) return Joined(phone, std::move(object));
-  auto object = make(*phone, handle);
-  return object && Own(handle, FamilyIn{slot}, object) ? Joined(phone, std::move(object)) : nullptr;
-} catch (...) {
-  PassForcedUnwind();
-  return nullptr;
+  std::shared_ptr<FamilyObject> object;
+  try {
+    object = make(*phone, handle);
+    if (!object || !Own(handle, FamilyIn{slot}, object)) return nullptr;
+  } catch (...) {
+    PassForcedUnwind();
+    return nullptr;
+  }
+  return Joined(phone, std::move(object));
 }
 
 std::shared_ptr<SoftwareDownload> GetSoftwareDownload(KRAL_HANDLE handle) try {

@@ -19,6 +19,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/types.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 
@@ -99,6 +100,7 @@ class ExportCall {
       if (value != passed) Failed();
       return value;
     } catch (...) {
+      PassForcedUnwind();  // a caller's thread may end inside a callback
       Threw();
       return failed;
     }

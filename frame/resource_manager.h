@@ -66,7 +66,8 @@ bool PortOf(KRAL_HANDLE handle, uint16_t& port);
 
 // The family object of a slot, made by `make` on the first call, under the handset's request lock; null when there is
 // no phone object, when `make` gives null or throws, and, for the server-mode slots, in direct mode. An empty `make`
-// only looks and never waits. The pointer keeps the phone object alive too.
+// only looks and never waits. The pointer keeps the phone object alive too. One that is there is never told to be
+// missing: a lack of memory for the pointer is thrown.
 using FamilyMaker = std::function<std::shared_ptr<FamilyObject>(Diag_FTM& phone, KRAL_HANDLE handle)>;
 std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slot, const FamilyMaker& make);
 

@@ -56,7 +56,7 @@ class LyingLoader {
   class Device final : public SerialDevice {
    public:
     explicit Device(LyingLoader& loader) : loader_(loader) {}
-    size_t Write(std::span<const uint8_t> bytes) override {
+    size_t Write(std::span<const uint8_t> bytes, uint32_t) override {
       loader_.written_.insert(loader_.written_.end(), bytes.begin(), bytes.end());
       loader_.Say();
       return bytes.size();
