@@ -121,8 +121,13 @@ bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
 
 bool WriteLocalFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
   FileReader file;
-  if (file.Open(TextOrEmpty(local_file), FileReader::Others::kMayWrite) || file.size() > UINT32_MAX) {
+  if (file.Open(TextOrEmpty(local_file), FileReader::Others::kMayWrite)) {
     phone.log().WriteLine(kLogErr, "fopen() failed to open PC file %s", TextOrEmpty(local_file));
+    return false;
+  }
+  if (file.size() > UINT32_MAX) {
+    phone.log().WriteLine(kLogErr, "PC file %s has %llu bytes, more than a file of the handset can have",
+                          TextOrEmpty(local_file), static_cast<unsigned long long>(file.size()));
     return false;
   }
   Source source{.size = static_cast<u32>(file.size()), .ends = {AddressOf(local_file), AddressOf(efs_file)}};

@@ -270,6 +270,11 @@ TEST_F(EfsTransfer, FailuresOfTheHandsetAreNamed) {
   const std::string nowhere = folder_.Path("no/such/folder");
   EXPECT_EQ(KRAL_EfsRead(handle(), nowhere.c_str(), "/locked"), 0);
   EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "fopen() failed to open PC file " + nowhere));
+  const std::string huge = folder_.Add("huge", "");
+  std::filesystem::resize_file(huge, uint64_t{1} << 32);
+  EXPECT_EQ(KRAL_EfsWrite(handle(), huge.c_str(), "/huge"), 0);
+  EXPECT_TRUE(
+      HasLine(KRAL_LOG_ERR, "PC file " + huge + " has 4294967296 bytes, more than a file of the handset can have"));
 }
 
 TEST_F(EfsTransfer, HandsetWithoutDescriptorsRefusesCleanly) {
