@@ -75,7 +75,7 @@ EfsError EfsService::OpenNode(const std::string& path, uint32_t flags, uint32_t 
     return tree_.Create(path, EfsKind::kFile, permissions, &node);
   }
   if (node->kind == EfsKind::kDirectory) return EfsError::kIsDirectory;
-  if (node->kind == EfsKind::kItemFile) return EfsError::kInvalid;
+  if (node->kind == EfsKind::kItemFile && (!opens_item_files_ || IsWritable(flags))) return EfsError::kInvalid;
   if (IsReadable(flags) && !node->Permits(kOwnerReads)) return EfsError::kNoAccess;
   if (IsWritable(flags) && !node->Permits(kOwnerWrites)) return EfsError::kNoAccess;
   if (IsWritable(flags) && (flags & kTruncate) != 0) tree_.Truncate(*node);
@@ -261,6 +261,11 @@ size_t EfsService::open_descriptors() const {
 size_t EfsService::open_directories() const {
   const std::lock_guard lock(mutex_);
   return directories_.size();
+}
+
+void EfsService::OpenItemFiles(bool open) {
+  const std::lock_guard lock(mutex_);
+  opens_item_files_ = open;
 }
 
 void EfsService::SetWriteLimit(size_t bytes) {

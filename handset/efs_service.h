@@ -34,6 +34,9 @@ class EfsService final : public Service {
   size_t open_directories() const;
 
   // --- Behaviour ----------------------------------------------------------------------------------------------------
+  // Some handsets let item files be read as plain ones, which is the only way to one of more bytes than a request
+  // takes.
+  void OpenItemFiles(bool open);
   // A write takes so many bytes at most; 0 takes none and tells no error.
   void SetWriteLimit(size_t bytes);
   // Worn memory: files keep a wrong byte at this offset.
@@ -84,6 +87,7 @@ class EfsService final : public Service {
   std::map<uint32_t, OpenDirectory> directories_;
   size_t most_descriptors_ = 16;
   size_t most_directories_ = 4;
+  bool opens_item_files_ = false;
   size_t write_limit_ = SIZE_MAX;
   std::optional<uint32_t> bad_offset_;
   std::map<std::string, std::string> shown_names_;

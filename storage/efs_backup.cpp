@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <map>
+#include <optional>
 
 #include "frame/base/little_endian.h"
 
@@ -47,21 +48,24 @@ EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_vie
   directory_ = &storage_->OpenOrAddStorage(pkv::kEfsDirectory);
   data_ = &storage_->OpenOrAddStorage(pkv::kEfsData);
   for (const auto& [number, entry] : NumberedStreams(*directory_)) {
-    if (entry->bytes.size() > pkv::kEntryPath)
-      numbers_[{entry->bytes.begin() + pkv::kEntryPath, entry->bytes.end()}] = number;
+    if (entry->bytes.size() <= pkv::kEntryPath) continue;
+    const std::string path(entry->bytes.begin() + pkv::kEntryPath, entry->bytes.end());
+    numbers_.emplace(pkv::PathKey(path), number);
   }
   for (const CompoundStorage* part : {directory_, data_}) {
-    const auto streams = NumberedStreams(*part);
-    if (!streams.empty()) next_number_ = std::max(next_number_, streams.rbegin()->first + 1);
+    for (const auto& [number, stream] : NumberedStreams(*part)) used_.insert(number);
   }
 }
 
 bool EfsEntryStorage::Write(const PkvEfsFile& file) {
   if (access_ == pkv::Access::kRead) return false;
-  const auto [known, added] = numbers_.emplace(file.path, next_number_);
+  const auto [known, added] = numbers_.emplace(pkv::PathKey(file.path), next_number_);
+  if (added) {
+    while (!used_.insert(next_number_).second) ++next_number_;
+    known->second = next_number_;
+  }
   const std::string name = pkv::EntryName(known->second);
   if (added) {
-    ++next_number_;
     directory_->streams.push_back({name, {}});  // no search: the number is new
     data_->streams.push_back({name, {}});
   }
@@ -70,6 +74,16 @@ bool EfsEntryStorage::Write(const PkvEfsFile& file) {
   entry.bytes = EntryRecord(file);
   content.bytes = file.bytes;
   return true;
+}
+
+void EfsEntryStorage::Remove(std::string_view path) {
+  const auto known = numbers_.find(pkv::PathKey(path));
+  if (known == numbers_.end()) return;
+  const std::string name = pkv::EntryName(known->second);
+  const auto is_of_path = [&name](const CompoundStream& stream) { return stream.name == name; };
+  directory_->streams.remove_if(is_of_path);
+  data_->streams.remove_if(is_of_path);
+  numbers_.erase(known);
 }
 
 bool EfsEntryStorage::Read(std::vector<PkvEfsFile>& files, std::string& problem) const {
@@ -95,16 +109,23 @@ CEFSItemBackup::CEFSItemBackup(CompoundStorage& configuration, pkv::Access acces
 
 void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>& files) {
   const auto is_item = [](const PkvEfsFile& file) { return file.is_item_file(); };
-  const auto write_all = [&](EfsEntryStorage&& storage, bool items) {
-    for (const PkvEfsFile& file : files) {
-      if (file.is_item_file() == items) storage.Write(file);
-    }
+  const auto open = [&](auto& storage, std::string_view name, bool needed) {
+    // A place without files is not made.
+    if (needed || configuration.FindStorage(name) != nullptr) storage.emplace(configuration, pkv::Access::kReadWrite);
   };
-  // A place without files is not made.
-  if (std::any_of(files.begin(), files.end(), is_item))
-    write_all(CItemFileStgAccess(configuration, pkv::Access::kReadWrite), true);
-  if (!std::all_of(files.begin(), files.end(), is_item))
-    write_all(CEFSBackup(configuration, pkv::Access::kReadWrite), false);
+  std::optional<CItemFileStgAccess> item_files;
+  std::optional<CEFSBackup> others;
+  open(item_files, pkv::kItemFiles, std::any_of(files.begin(), files.end(), is_item));
+  open(others, pkv::kEfsBackup, !std::all_of(files.begin(), files.end(), is_item));
+  for (const PkvEfsFile& file : files) {
+    if (is_item(file)) {
+      if (others) others->Remove(file.path);
+      item_files->Write(file);
+    } else {
+      if (item_files) item_files->Remove(file.path);
+      others->Write(file);
+    }
+  }
 }
 
 }  // namespace kral

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <map>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -21,6 +22,7 @@ struct PkvEfsFile {
   std::vector<uint8_t> bytes;
 
   bool is_item_file() const { return (mode & 0xF000) == 0xE000; }
+  uint32_t permissions() const { return mode & 0777; }
   bool operator==(const PkvEfsFile&) const = default;
 };
 
@@ -29,6 +31,8 @@ class EfsEntryStorage {
  public:
   // Appends a file, or puts it in the place of the one with its path. False when the storage was opened for reading.
   bool Write(const PkvEfsFile& file);
+  // The file with this path, if it is there.
+  void Remove(std::string_view path);
   // Appends the files in the order of their numbers; `problem` names a damaged entry.
   bool Read(std::vector<PkvEfsFile>& files, std::string& problem) const;
 
@@ -40,8 +44,9 @@ class EfsEntryStorage {
   const pkv::Access access_;
   CompoundStorage* directory_ = nullptr;
   CompoundStorage* data_ = nullptr;
-  std::map<std::string, uint32_t> numbers_;  // by path
-  uint32_t next_number_ = 0;
+  std::map<std::string, uint32_t> numbers_;  // by pkv::PathKey
+  std::set<uint32_t> used_;
+  uint32_t next_number_ = 0;  // none below it is free
 };
 
 // The item files.
@@ -70,7 +75,7 @@ class CEFSItemBackup final : public CEFSBackup {
   CompoundStorage* items_ = nullptr;
 };
 
-// Both kinds at once: item files to one place, all others to the other.
+// Both kinds at once: item files to one place, all others to the other. One that was in the other place leaves it.
 void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>& files);
 
 }  // namespace kral

@@ -32,6 +32,8 @@ bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file
 bool WriteFromMemory(Diag_FTM& phone, const uint8_t* buffer, uint32_t size, const char* efs_file);
 bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool ReadToMemory(Diag_FTM& phone, const char* efs_file, uint8_t* buffer, uint32_t* size);
+// As a plain file whatever it is, of `size` bytes at least and at most, for who has asked for its status already.
+bool ReadOpenedToMemory(Diag_FTM& phone, const char* efs_file, uint8_t* buffer, uint32_t* size);
 
 // --- Item files (efs_item.cpp) ---------------------------------------------------------------------------------------
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file);

@@ -91,12 +91,31 @@ bool ReadItem(Diag_FTM& phone, const char* efs_file, u32 size, const Sink& sink)
   return false;
 }
 
+bool ReadOpened(Diag_FTM& phone, const char* efs_file, u32 size, const Sink& sink) {
+  RemoteFile file(phone);
+  return file.Open(efs_file, kOpenToRead, kModeOfReading) && sink.open() && ReadChunks(phone, file.value(), size, sink);
+}
+
 bool Read(Diag_FTM& phone, const char* efs_file, const FileStatus& status, const Sink& sink) {
   if (IsAborted(phone, "Read")) return false;
-  if (status.is_item_file()) return ReadItem(phone, efs_file, status.size, sink);
-  RemoteFile file(phone);
-  return file.Open(efs_file, kOpenToRead, kModeOfReading) && sink.open() &&
-         ReadChunks(phone, file.value(), status.size, sink);
+  return status.is_item_file() ? ReadItem(phone, efs_file, status.size, sink)
+                               : ReadOpened(phone, efs_file, status.size, sink);
+}
+
+// Into a buffer of `room` bytes; `done` of them are filled.
+Sink SinkOfMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32 room, u32& done) {
+  Sink sink{.ends = {AddressOf(efs_file), AddressOf(buffer)}};
+  sink.open = [] { return true; };
+  sink.write = [&phone, &done, buffer, room](std::span<const u8> bytes) {
+    if (bytes.size() > room - done) {
+      phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes of the buffer", room);
+      return false;
+    }
+    std::copy(bytes.begin(), bytes.end(), buffer + done);
+    done += static_cast<u32>(bytes.size());
+    return true;
+  };
+  return sink;
 }
 
 }  // namespace
@@ -131,23 +150,20 @@ bool ReadToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) 
   FileStatus status;
   if (!StatExisting(phone, efs_file, status)) return false;
   const u32 room = *size;
-  u32 done = 0;
-  Sink sink{.ends = {AddressOf(efs_file), AddressOf(buffer)}};
-  sink.open = [] { return true; };
-  sink.write = [&](std::span<const u8> bytes) {
-    if (bytes.size() > room - done) {
-      phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes of the buffer", room);
-      return false;
-    }
-    std::copy(bytes.begin(), bytes.end(), buffer + done);
-    done += static_cast<u32>(bytes.size());
-    return true;
-  };
   if (status.size > room) {
     phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes of the buffer", room);
     return false;
   }
-  if (!Read(phone, efs_file, status, sink)) return false;
+  u32 done = 0;
+  if (!Read(phone, efs_file, status, SinkOfMemory(phone, efs_file, buffer, room, done))) return false;
+  *size = done;
+  return true;
+}
+
+bool ReadOpenedToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) {
+  phone.efs().abort = false;
+  u32 done = 0;
+  if (!ReadOpened(phone, efs_file, *size, SinkOfMemory(phone, efs_file, buffer, *size, done))) return false;
   *size = done;
   return true;
 }

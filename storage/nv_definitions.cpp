@@ -5,6 +5,8 @@
 #include <charconv>
 #include <utility>
 
+#include "storage/pkv_format.h"
+
 namespace kral::nv {
 namespace {
 
@@ -19,8 +21,9 @@ std::string NvItem::Title() const {
 }
 
 std::optional<uint16_t> RfIdOfPath(std::string_view path) {
-  if (!path.starts_with(kRfFolder)) return std::nullopt;
-  const std::string_view digits = path.substr(kRfFolder.size());
+  const std::string key = pkv::PathKey(path);
+  if (!key.starts_with(kRfFolder)) return std::nullopt;
+  const std::string_view digits = std::string_view(key).substr(kRfFolder.size());
   uint16_t id = 0;
   const auto result = std::from_chars(digits.data(), digits.data() + digits.size(), id);
   if (digits.size() != kRfDigits || result.ec != std::errc() || result.ptr != digits.data() + digits.size()) {
@@ -61,7 +64,7 @@ NvItem* NvDefinitions::Find(uint16_t id) {
 }
 
 NvItem* NvDefinitions::Find(std::string_view path) {
-  const auto item = by_path_.find(std::string(path));
+  const auto item = by_path_.find(pkv::PathKey(path));
   return item == by_path_.end() ? nullptr : &files_[item->second];
 }
 
@@ -69,7 +72,7 @@ bool NvDefinitions::Put(NvItem item) {
   auto& items = item.is_file() ? files_ : numbered_;
   size_t index = items.size();
   if (item.is_file()) {
-    index = by_path_.try_emplace(item.path, index).first->second;
+    index = by_path_.try_emplace(pkv::PathKey(item.path), index).first->second;
     if (item.id) by_rf_id_[*item.id] = index;
   } else {
     index = by_id_.try_emplace(*item.id, index).first->second;
@@ -79,6 +82,7 @@ bool NvDefinitions::Put(NvItem item) {
     return false;
   }
   const bool was_generic = items[index].generic;
+  if (item.mode == 0) item.mode = items[index].mode;  // the handset's file is the same
   items[index] = std::move(item);
   return !was_generic;
 }

@@ -39,6 +39,7 @@ struct NvItem {
   uint16_t max_index = 0;  // of the highest element; 0: no array
   bool compressed = false;
   bool generic = false;  // made up for an item that nobody defined
+  uint32_t mode = 0;     // kind and permissions of the file where it was seen last; 0: nowhere
   bool will_read = true;
   bool will_write = true;
   std::map<NvSlot, NvBytes> values;
@@ -48,7 +49,8 @@ struct NvItem {
   std::string Title() const;  // "NV ID 453" or the path, for log lines
 };
 
-// The id in the path of an RF NV item: /nv/item_files/rfnv/00020001 is 20001; nothing for other paths.
+// The id in the path of an RF NV item: /nv/item_files/rfnv/00020001 is 20001, also without the first slash; nothing for
+// other paths.
 std::optional<uint16_t> RfIdOfPath(std::string_view path);
 
 // Whether a path can get a generic definition: it fits a request and can stand in XML, reports and logs.
@@ -67,10 +69,10 @@ class NvDefinitions {
 
   NvItem* At(size_t index);  // null beyond the end
   NvItem* Find(uint16_t id);
-  NvItem* FindNumbered(uint16_t id);  // no file
-  NvItem* Find(std::string_view path);
+  NvItem* FindNumbered(uint16_t id);    // no file
+  NvItem* Find(std::string_view path);  // however it is spelled
 
-  // The item takes the place of one with the same id or path, whose values are gone: true when that was not made up.
+  // The item takes the place of one with the same id or file, whose values are gone: true when that was not made up.
   bool Put(NvItem item);
   void Clear();
 
@@ -83,9 +85,9 @@ class NvDefinitions {
  private:
   std::vector<NvItem> numbered_;
   std::vector<NvItem> files_;
-  std::unordered_map<uint16_t, size_t> by_id_;     // of numbered items
-  std::unordered_map<uint16_t, size_t> by_rf_id_;  // of files
-  std::unordered_map<std::string, size_t> by_path_;
+  std::unordered_map<uint16_t, size_t> by_id_;       // of numbered items
+  std::unordered_map<uint16_t, size_t> by_rf_id_;    // of files
+  std::unordered_map<std::string, size_t> by_path_;  // pkv::PathKey
   std::unordered_map<std::string, NvTypePtr> types_;
 };
 

@@ -8,6 +8,7 @@
 
 #include "platform/file_util.h"
 #include "storage/nv_xml.h"
+#include "storage/pkv_format.h"
 
 namespace kral::nv {
 namespace {
@@ -55,7 +56,7 @@ bool NvFilter::Passes(const NvItem& item) const {
                                         [](uint16_t id, const auto& range) { return id < range.first; });
     if (above != ids_.begin() && *item.id <= std::prev(above)->second) return true;
   }
-  return HoldsAny(item.name, parts_) || HoldsAny(item.path, parts_);
+  return HoldsAny(item.name, parts_) || (item.is_file() && HoldsAny(pkv::PathKey(item.path), parts_));
 }
 
 void NvFilter::Sort() {
@@ -130,8 +131,9 @@ NvError NvFilter::Read(const XmlElement& root, std::string& problem) {
 NvError SaveFilter(const std::string& path, std::span<const NvItem* const> items) {
   std::string text = "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n<NvFilter>\n";
   for (const NvItem* item : items) {
-    text += item->is_file() ? "  <NV_NAME_SUBSTRING_LIST>" + EscapeXml(item->path) + "</NV_NAME_SUBSTRING_LIST>\n"
-                            : "  <NV>" + std::to_string(*item->id) + "</NV>\n";
+    text += item->is_file()
+                ? "  <NV_NAME_SUBSTRING_LIST>" + EscapeXml(pkv::PathKey(item->path)) + "</NV_NAME_SUBSTRING_LIST>\n"
+                : "  <NV>" + std::to_string(*item->id) + "</NV>\n";
   }
   text += "</NvFilter>\n";
   const std::vector<uint8_t> bytes(text.begin(), text.end());

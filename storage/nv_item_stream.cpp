@@ -20,7 +20,7 @@ void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, pkv::A
   uint16_t flags = 0;
   for (size_t position = 0; pkv::ParseArrayRecord(bytes.subspan(position), item, flags); position += kArrayRecordSize) {
     if ((flags & pkv::kRecordInUse) != 0) {
-      positions_[item.id] = position;
+      records_[item.id][position] = item.index;
     } else {
       free_slots_.insert(position);
     }
@@ -36,15 +36,19 @@ PkvNvItem CNVItemStream::ItemAt(size_t position) const {
 }
 
 bool CNVItemStream::Find(uint16_t id, PkvNvItem& item) const {
-  const auto found = positions_.find(id);
-  if (found == positions_.end()) return false;
-  item = ItemAt(found->second);
+  const auto found = records_.find(id);
+  if (found == records_.end()) return false;
+  item = ItemAt(found->second.rbegin()->first);
   return true;
 }
 
 std::vector<PkvNvItem> CNVItemStream::Items() const {
   std::vector<size_t> positions;
-  for (const auto& [id, position] : positions_) positions.push_back(position);
+  for (const auto& [id, records] : records_) {
+    std::map<uint16_t, size_t> last;
+    for (const auto& [position, index] : records) last[index] = position;
+    for (const auto& [index, position] : last) positions.push_back(position);
+  }
   std::sort(positions.begin(), positions.end());
   std::vector<PkvNvItem> items;
   items.reserve(positions.size());
@@ -53,7 +57,7 @@ std::vector<PkvNvItem> CNVItemStream::Items() const {
 }
 
 size_t CNVItemStream::ClaimPosition(uint16_t id) {
-  if (const auto known = positions_.find(id); known != positions_.end()) return known->second;
+  if (const auto known = records_.find(id); known != records_.end()) return known->second.rbegin()->first;
   size_t position = 0;
   if (!free_slots_.empty()) {
     position = *free_slots_.begin();
@@ -63,26 +67,30 @@ size_t CNVItemStream::ClaimPosition(uint16_t id) {
     position = stream_->bytes.size() / kArrayRecordSize * kArrayRecordSize;
     stream_->bytes.resize(position + kArrayRecordSize);
   }
-  positions_[id] = position;
   return position;
 }
 
 size_t CNVItemStream::Write(const PkvNvItem& item) {
   if (!writable()) return 0;
   const auto record = pkv::ArrayRecord(item);
-  const auto position = static_cast<ptrdiff_t>(ClaimPosition(item.id));  // first: it may move the bytes
-  std::copy(record.begin(), record.end(), stream_->bytes.begin() + position);
+  const size_t position = ClaimPosition(item.id);  // first: it may move the bytes
+  std::copy(record.begin(), record.end(), stream_->bytes.begin() + static_cast<ptrdiff_t>(position));
+  records_[item.id][position] = item.index;
   return record.size();
 }
 
-bool CNVItemStream::Delete(uint16_t id) {
-  const auto found = positions_.find(id);
-  if (!writable() || found == positions_.end()) return false;
-  const auto record = stream_->bytes.begin() + static_cast<ptrdiff_t>(found->second);
-  std::fill(record + pkv::kArrayFlags, record + kArrayRecordSize, uint8_t{0});
-  free_slots_.insert(found->second);
-  positions_.erase(found);
-  return true;
+bool CNVItemStream::Delete(uint16_t id, std::optional<uint16_t> index) {
+  const auto found = records_.find(id);
+  if (!writable() || found == records_.end()) return false;
+  const size_t count = std::erase_if(found->second, [&](const auto& record) {
+    if (index && record.second != *index) return false;
+    const auto begin = stream_->bytes.begin() + static_cast<ptrdiff_t>(record.first);
+    std::fill(begin + pkv::kArrayFlags, begin + kArrayRecordSize, uint8_t{0});
+    free_slots_.insert(record.first);
+    return true;
+  });
+  if (found->second.empty()) records_.erase(found);
+  return count > 0;
 }
 
 }  // namespace kral

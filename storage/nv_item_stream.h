@@ -3,6 +3,7 @@
 #define KRAL_STORAGE_NV_ITEM_STREAM_H
 
 #include <map>
+#include <optional>
 #include <set>
 #include <vector>
 
@@ -21,13 +22,16 @@ class CNVItemStream {
 
   // By id: of several records with one id the last counts.
   bool Find(uint16_t id, PkvNvItem& item) const;
-  std::vector<PkvNvItem> Items() const;  // in the order of their records
+  // In the order of their records. Records of one id with different index words are items of their own, as others write
+  // arrays; of several with the same index word the last counts.
+  std::vector<PkvNvItem> Items() const;
 
   // In place when the id is there, else into the lowest free slot, else at the end. Gives the bytes written: 136, or
   // 0 when the stream was opened for reading.
   size_t Write(const PkvNvItem& item);
-  // Leaves a free slot; false when there is no such item and when the stream was opened for reading.
-  bool Delete(uint16_t id);
+  // Leaves free slots where the id, or the id with this index word, was; false when it was nowhere and when the stream
+  // was opened for reading.
+  bool Delete(uint16_t id, std::optional<uint16_t> index = std::nullopt);
 
  private:
   bool writable() const { return stream_ != nullptr && access_ == pkv::Access::kReadWrite; }
@@ -38,8 +42,8 @@ class CNVItemStream {
   pkv::Access access_ = pkv::Access::kRead;
   uint16_t subscription_ = 0;
   bool open_ = false;
-  std::map<uint16_t, size_t> positions_;  // of the items, by id
-  std::set<size_t> free_slots_;           // the lowest is used first
+  std::map<uint16_t, std::map<size_t, uint16_t>> records_;  // by id: where they are, and their index words
+  std::set<size_t> free_slots_;                             // the lowest is used first
 };
 
 }  // namespace kral

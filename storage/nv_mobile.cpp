@@ -16,6 +16,10 @@ using Answer = PhoneItems::Answer;
 
 }  // namespace
 
+uint32_t ModeOfNewFile(size_t size) {
+  return (size <= KRAL_EFS_ITEM_SIZE ? efs::kItemFile : efs::kPlainFile) | efs::kModeOfNewFiles;
+}
+
 NvAnswer NvMobile::Judged(Answer answer, uint16_t status) {
   switch (answer) {
     case Answer::kAnswered:
@@ -40,7 +44,7 @@ PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
   return numbered;
 }
 
-NvAnswer NvMobile::Read(const NvItem& item, uint16_t element, NvBytes& stored) {
+NvAnswer NvMobile::Read(NvItem& item, uint16_t element, NvBytes& stored) {
   if (!CanName(item)) return {Kind::kRefused, kNeverWritten};
   if (item.is_file()) {
     uint16_t status = kDone;
@@ -80,7 +84,7 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
   return Judged(answer, status);
 }
 
-NvAnswer NvMobile::ReadFile(const NvItem& item, NvBytes& stored) {
+NvAnswer NvMobile::ReadFile(NvItem& item, NvBytes& stored) {
   uint32_t mode = 0;
   uint32_t size = 0;
   uint32_t error = 0;
@@ -91,8 +95,9 @@ NvAnswer NvMobile::ReadFile(const NvItem& item, NvBytes& stored) {
     phone_.log().WriteLine(kLogErr, "%s has %u bytes, too many for an item", item.path.c_str(), size);
     return {Kind::kRefused};
   }
+  item.mode = mode;
   PkvEfsFile file{item.path, mode, {}};
-  const Answer answer = items_.ReadFile(file, error, size);
+  const Answer answer = items_.ReadTold(file, size, error);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   stored = std::move(file.bytes);
   return {error == 0 ? Kind::kOk : Kind::kRefused};
@@ -104,10 +109,16 @@ NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored
   uint32_t error = 0;
   const Answer told = items_.Status(item.path.c_str(), file.mode, size, error);
   if (told != Answer::kAnswered) return Judged(told, 0);
-  // What is a plain file already stays one; permissions of files that are there stay, too.
-  const bool as_item_file = stored.size() <= KRAL_EFS_ITEM_SIZE && (error != efs::kDone || file.is_item_file());
-  file.mode = as_item_file ? efs::kItemFile : efs::kPlainFile;
-  const Answer answer = items_.WriteFile(file, error);
+  // A file that is there stays what it is; another one becomes what it was where it was seen.
+  const bool is_there = error == efs::kDone;
+  if (!is_there) file.mode = item.mode != 0 ? item.mode : ModeOfNewFile(stored.size());
+  Answer answer = items_.WriteFile(file, error);
+  // An item file that outgrows its requests is removed, and made anew as a plain one.
+  const bool is_new = !is_there || (file.is_item_file() && stored.size() > KRAL_EFS_ITEM_SIZE);
+  const bool is_mode_known = is_there || item.mode != 0;
+  if (answer == Answer::kAnswered && error == efs::kDone && is_new && is_mode_known) {
+    answer = items_.SetPermissions(file, error);
+  }
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   return {error == 0 ? Kind::kOk : Kind::kRefused};
 }

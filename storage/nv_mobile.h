@@ -20,6 +20,9 @@ struct NvAnswer {
   bool done() const { return kind == Kind::kOk; }
 };
 
+// Of a file that nobody has seen yet, by the size of its value.
+uint32_t ModeOfNewFile(size_t size);
+
 // One walk over items: what it has found out about the handset, it does not ask again.
 class NvMobile {
  public:
@@ -30,14 +33,14 @@ class NvMobile {
 
   // Values as they are kept (storage/nv_value.h). What gets no answer in spite of several tries counts as refused as
   // long as the handset answers others.
-  NvAnswer Read(const NvItem& item, uint16_t element, NvBytes& stored);
+  NvAnswer Read(NvItem& item, uint16_t element, NvBytes& stored);  // and the mode of a file
   NvAnswer Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored);
 
   // The files in the folders in which handsets keep item files. False when they could not all be listed.
   bool ListItemFiles(std::vector<PhoneItems::FoundFile>& files);
 
  private:
-  NvAnswer ReadFile(const NvItem& item, NvBytes& stored);
+  NvAnswer ReadFile(NvItem& item, NvBytes& stored);
   NvAnswer WriteFile(const NvItem& item, std::span<const uint8_t> stored);
   NvAnswer Judged(PhoneItems::Answer answer, uint16_t status);
   PkvNvItem Numbered(const NvItem& item, uint16_t element) const;

@@ -37,7 +37,7 @@ constexpr const char* kTableHead =
     "<th>Difference</th></tr>\n";
 
 // Numbered items first, then files.
-using Key = std::tuple<std::string, uint32_t, uint16_t, uint16_t>;  // path, id, subscription, index
+using Key = std::tuple<std::string, uint32_t, uint16_t, uint16_t>;  // key of the path, id, subscription, index
 
 struct Pair {
   std::optional<NvBytes> first;
@@ -49,7 +49,9 @@ void Collect(const PkvSet& set, std::optional<NvBytes> Pair::*side, Pairs& pairs
   for (const PkvNvItem& item : set.items) {
     pairs[{"", item.id, item.subscription, item.index}].*side = NvBytes(item.data.begin(), item.data.end());
   }
-  for (const PkvEfsFile& file : set.files) pairs[{file.path, 0, uint16_t{0}, uint16_t{0}}].*side = file.bytes;
+  for (const PkvEfsFile& file : set.files) {
+    pairs[{pkv::PathKey(file.path), 0, uint16_t{0}, uint16_t{0}}].*side = file.bytes;
+  }
 }
 
 using Members = std::vector<std::pair<std::string, std::string>>;

@@ -16,8 +16,6 @@
 namespace kral::nv {
 namespace {
 
-constexpr uint32_t kModeOfFiles = 0x81B6;  // a file that everybody reads and writes
-
 NvError ErrorOf(const PkvOutcome& outcome) {
   switch (outcome.result) {
     case PkvResult::kDone:
@@ -26,6 +24,8 @@ NvError ErrorOf(const PkvOutcome& outcome) {
       return NvError::kNoPkvStorage;
     case PkvResult::kDamagedItem:
       return NvError::kBadPkvItem;
+    case PkvResult::kNoItem:
+      return NvError::kNoValue;
     case PkvResult::kCannotOpen:
     case PkvResult::kCannotWrite:
       break;
@@ -36,6 +36,7 @@ NvError ErrorOf(const PkvOutcome& outcome) {
 NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
   const PkvOutcome outcome = ReadPkv(file, set);
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());  // begins with the path
+  pkv::LogUnread(phone, file, set);
   return ErrorOf(outcome);
 }
 
@@ -129,7 +130,10 @@ NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const PkvEfsFile& entry) {
     }
     item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
   }
-  return item->will_read ? TakeStored(phone, *item, {}, entry.bytes) : NvError::kNone;
+  if (!item->will_read) return NvError::kNone;
+  const NvError error = TakeStored(phone, *item, {}, entry.bytes);
+  if (error == NvError::kNone) item->mode = entry.mode;
+  return error;
 }
 
 bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value,
@@ -140,9 +144,8 @@ bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slo
     return false;
   }
   if (item.is_file()) {
-    const bool as_item_file = stored->size() <= KRAL_EFS_ITEM_SIZE;
-    set.files.push_back(
-        {item.path, as_item_file ? kModeOfFiles | KRAL_EFS_MODE_ITEM_FILE : kModeOfFiles, std::move(*stored)});
+    const uint32_t mode = item.mode != 0 ? item.mode : ModeOfNewFile(stored->size());
+    set.files.push_back({item.path, mode, std::move(*stored)});
     return true;
   }
   PkvNvItem entry;
@@ -171,8 +174,6 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   }
   // A backup that lacks something is none.
   if (walk.failed()) return NvError::kCannotSetValue;
-  // The library's own file class holds no file without an item.
-  if (set.items.empty() && ChosenPkvWriter() == PkvWriter::kVarnPkvFile) return NvError::kNoValue;
   // Values need no handset, and the null port is none; one that is there signs them.
   const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
   if (has_handset) pkv::ReadIdentity(phone, set.properties);
@@ -292,7 +293,9 @@ NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, co
 }
 
 NvError NVTool_Manager::GenerateQdf(const std::string& file) {
-  return SaveText(file, QdfText(definitions_), NvError::kCannotOpenQdf);
+  const std::string text = QdfText(definitions_);
+  // An older list is worth more than an empty one.
+  return text.empty() ? NvError::kNoValue : SaveText(file, text, NvError::kCannotOpenQdf);
 }
 
 }  // namespace kral::nv

@@ -39,13 +39,15 @@ bool NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
   const bool listed = mobile.ListItemFiles(files);
   if (!listed) phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
   for (const auto& [path, mode, size] : files) {
-    const std::string other = path.starts_with('/') ? path.substr(1) : "/" + path;
-    if (definitions_.Find(path) != nullptr || definitions_.Find(other) != nullptr) continue;
+    if (NvItem* const known = definitions_.Find(path)) {
+      known->mode = mode;
+      continue;
+    }
     if (size > kLongestValue || !IsUsualPath(path)) {
       phone.log().WriteLine(kLogErr, "A file of %u bytes is left out: it is too large or its name is unusual", size);
       continue;
     }
-    Define(phone, GenericFile(path, size));
+    Define(phone, GenericFile(path, size)).mode = mode;
   }
   return listed;
 }

@@ -24,7 +24,6 @@ constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
 
 constexpr uint32_t kUnanswered = 0xFFFFFFFF;  // in place of an error number
-constexpr uint32_t kPermissions = 0777;
 
 // A folder's entries for itself and for the one above it.
 bool IsDots(std::string_view path) {
@@ -143,32 +142,37 @@ PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) 
   uint32_t mode = 0;
   uint32_t size = 0;
   const Answer sized = Status(file.path.c_str(), mode, size, status);
-  return sized == Answer::kAnswered && status == efs::kDone && size > KRAL_EFS_ITEM_SIZE ? ReadPlainFile(file, status)
-                                                                                         : sized;
+  return sized == Answer::kAnswered && status == efs::kDone && size > KRAL_EFS_ITEM_SIZE
+             ? ReadPlainFile(file, size, status)
+             : sized;
 }
 
-PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t& status) {
-  uint32_t mode = 0;
-  uint32_t size = 0;
-  const Answer answer = Status(file.path.c_str(), mode, size, status);
-  if (answer != Answer::kAnswered || status != efs::kDone) return answer;
+PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t size, uint32_t& status) {
+  status = efs::kDone;
   if (size > kLargestFile) return Answer::kRefused;
   file.bytes.resize(size);
-  if (efs::ReadToMemory(phone_, file.path.c_str(), file.bytes.data(), &size)) {
+  if (efs::ReadOpenedToMemory(phone_, file.path.c_str(), file.bytes.data(), &size)) {
     file.bytes.resize(size);
     return Answer::kAnswered;
   }
   if (aborts_.aborted()) return Answer::kRefused;
+  uint32_t mode = 0;
   // Lost, or only not to be had: a handset that still answers tells.
   return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
 }
 
-PhoneItems::Answer PhoneItems::ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size) {
+PhoneItems::Answer PhoneItems::ReadTold(PkvEfsFile& file, uint32_t size, uint32_t& status) {
   file.bytes.clear();
-  const bool item = file.is_item_file() && known_size <= KRAL_EFS_ITEM_SIZE;
-  const Answer answer = item ? ReadItemFile(file, status) : ReadPlainFile(file, status);
+  const bool item = file.is_item_file() && size <= KRAL_EFS_ITEM_SIZE;
+  const Answer answer = item ? ReadItemFile(file, status) : ReadPlainFile(file, size, status);
   if (answer != Answer::kAnswered) status = kRefusedStatus;
   return answer;
+}
+
+PhoneItems::Answer PhoneItems::ReadPresent(PkvEfsFile& file, uint32_t& status) {
+  uint32_t size = 0;
+  const Answer told = Status(file.path.c_str(), file.mode, size, status);
+  return told == Answer::kAnswered && status == efs::kDone ? ReadTold(file, size, status) : told;
 }
 
 void PhoneItems::MakeFolders(const std::string& path) {
@@ -211,11 +215,19 @@ PhoneItems::Answer PhoneItems::WriteFile(const PkvEfsFile& file, uint32_t& statu
   const bool item = file.is_item_file() && file.bytes.size() <= KRAL_EFS_ITEM_SIZE;
   const Answer answer = item ? WriteItemFile(file, status) : WritePlainFile(file, status);
   if (answer != Answer::kAnswered) status = kRefusedStatus;
-  const auto permissions = static_cast<uint16_t>(file.mode & kPermissions);
-  if (status != efs::kDone || permissions == 0) return answer;
-  // A handset that does not let them be changed keeps its own.
-  const Answer changed = Try([&] { return efs::ChangeMode(phone_, file.path.c_str(), permissions, nullptr); });
-  return changed == Answer::kLost ? changed : answer;
+  return answer;
+}
+
+PhoneItems::Answer PhoneItems::SetPermissions(const PkvEfsFile& file, uint32_t& status) {
+  const auto permissions = static_cast<uint16_t>(file.permissions());
+  const Answer answer = Try([&] {
+    status = efs::kDone;
+    return efs::ChangeMode(phone_, file.path.c_str(), permissions, &status);
+  });
+  if (answer != Answer::kAnswered) status = kRefusedStatus;
+  if (status != efs::kDone)
+    phone_.log().WriteLine(kLogErr, "%s: permissions %o refused, error %u", file.path.c_str(), permissions, status);
+  return answer;
 }
 
 }  // namespace kral

@@ -61,9 +61,13 @@ class PhoneItems {
   Answer FindFiles(std::vector<FoundFile>& files);  // kRefused when there are unlisted ones
   // Of a file or folder, when the status is 0.
   Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
-  // By path and mode. An item file that is known to be larger than an item request takes is read as a plain one.
-  Answer ReadFile(PkvEfsFile& file, uint32_t& status, size_t known_size);
-  Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with folders and permissions
+  // By path, and by the mode and size that the handset told. An item file that is larger than an item request takes is
+  // read as a plain one, which not every handset lets happen.
+  Answer ReadTold(PkvEfsFile& file, uint32_t size, uint32_t& status);
+  // By path; the mode is what the handset tells now.
+  Answer ReadPresent(PkvEfsFile& file, uint32_t& status);
+  Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with its folders; permissions are the handset's
+  Answer SetPermissions(const PkvEfsFile& file, uint32_t& status);
 
  private:
   Answer Try(const std::function<bool()>& ask);
@@ -73,7 +77,7 @@ class PhoneItems {
   void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
   bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
   Answer ReadItemFile(PkvEfsFile& file, uint32_t& status);
-  Answer ReadPlainFile(PkvEfsFile& file, uint32_t& status);
+  Answer ReadPlainFile(PkvEfsFile& file, uint32_t size, uint32_t& status);
   Answer WriteItemFile(const PkvEfsFile& file, uint32_t& status);
   Answer WritePlainFile(const PkvEfsFile& file, uint32_t& status);
   std::optional<uint32_t> ItemError(bool reading) const;

@@ -83,7 +83,7 @@ class BackupJob {
     if (aborts_.aborted()) return KRAL_PKV_STATUS_STOPPED;
     if (found == Answer::kLost) return KRAL_PKV_STATUS_LOST;
     const std::vector<Wanted> items = WantedItems(phone_);
-    JobReport report(phone_, items.size() + unlisted.size() + files.size());
+    JobReport report(phone_, items.size() + unlisted.size() + files.size(), 0);
     for (const Wanted& item : items) {
       if (!ReadItem(item, set, report)) return End(report);
     }
@@ -128,7 +128,10 @@ class BackupJob {
   bool ReadFile(const PhoneItems::FoundFile& found, PkvSet& set, JobReport& report) {
     PkvEfsFile file{.path = found.path, .mode = found.mode, .bytes = {}};
     uint32_t status = 0;
-    if (items_.ReadFile(file, status, found.size) == Answer::kLost || report.stopped()) return false;
+    // An item file comes whole with one request; a plain one may have grown since it was listed.
+    const Answer answer =
+        file.is_item_file() ? items_.ReadTold(file, found.size, status) : items_.ReadPresent(file, status);
+    if (answer == Answer::kLost || report.stopped()) return false;
     // Less than the handset lists would be a backup that looks whole. The same for more than a file of ours holds.
     if (status == 0 && (file.bytes.size() < found.size || file.bytes.size() > bytes_left_)) {
       status = PhoneItems::kRefusedStatus;

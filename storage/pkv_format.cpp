@@ -83,6 +83,17 @@ std::string RfNvPath(uint32_t item) {
   return Format("/nv/item_files/rfnv/%08d", static_cast<int>(item));
 }
 
+std::string PathKey(std::string_view path) {
+  std::string key;
+  key.reserve(path.size() + 1);
+  while (!path.empty()) {
+    const std::string_view name = path.substr(0, path.find('/'));
+    path.remove_prefix(std::min(name.size() + 1, path.size()));
+    if (!name.empty()) key.append(1, '/').append(name);
+  }
+  return key.empty() ? "/" : key;
+}
+
 std::array<uint8_t, kArrayRecordSize> ArrayRecord(const PkvNvItem& item) {
   std::array<uint8_t, kArrayRecordSize> record{};
   StoreLe<uint16_t>(record, 0, kArrayRecordSize);

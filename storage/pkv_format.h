@@ -59,6 +59,11 @@ std::optional<uint32_t> EntryOfName(std::string_view name);
 // Where an RF NV item lives in the handset's file system.
 std::string RfNvPath(uint32_t item);
 
+// What tells whether two paths are one file: with a slash in front, none doubled and none at the end. Handsets list
+// some folders without the first one, definitions and callers write it; what goes to the handset stays as it was
+// spelled.
+std::string PathKey(std::string_view path);
+
 // --- Records --------------------------------------------------------------------------------------------------------
 
 inline constexpr size_t kItemDataSize = 128;

@@ -6,6 +6,7 @@
 #include <charconv>
 #include <string_view>
 
+#include "kral/efs.h"
 #include "storage/nv_tool.h"
 
 namespace kral::pkv {
@@ -41,13 +42,15 @@ bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, u
   return true;
 }
 
-JobReport::JobReport(Diag_FTM& phone, size_t total) : phone_(phone), aborts_(phone) {
+JobReport::JobReport(Diag_FTM& phone, size_t total, size_t passed_over)
+    : phone_(phone), aborts_(phone), passed_over_(static_cast<uint32_t>(passed_over)) {
   phone.pkv().counts = {};
-  phone.pkv().counts.total = static_cast<uint32_t>(total);
+  phone.pkv().counts.total = static_cast<uint32_t>(total + passed_over);
+  phone.pkv().counts.skipped = passed_over_;
 }
 
 JobReport::~JobReport() {
-  phone_.pkv().counts.not_reached += phone_.pkv().counts.total - reported_;
+  phone_.pkv().counts.not_reached += phone_.pkv().counts.total - passed_over_ - reported_;
 }
 
 const KRAL_PKV_COUNTS& JobReport::counts() const {
@@ -73,7 +76,7 @@ void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
   if (callback == nullptr) return;
   // One that fails does not say that it is to go on.
   uint8_t go_on = 0;
-  CallGuarded([&] { go_on = callback(&record, path, reported_, counts.total, phone_.handle()); });
+  CallGuarded([&] { go_on = callback(&record, path, reported_, counts.total - passed_over_, phone_.handle()); });
   stopped_ = go_on == 0;
 }
 
@@ -85,6 +88,8 @@ uint32_t StatusOf(PkvResult result) {
       return KRAL_PKV_STATUS_NO_STORAGE;
     case PkvResult::kDamagedItem:
       return KRAL_PKV_STATUS_BAD_ITEM;
+    case PkvResult::kNoItem:
+      return KRAL_PKV_STATUS_NOTHING_READ;
     case PkvResult::kCannotOpen:
     case PkvResult::kCannotWrite:
       break;
@@ -92,10 +97,20 @@ uint32_t StatusOf(PkvResult result) {
   return KRAL_PKV_STATUS_CANNOT_OPEN;
 }
 
+void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set) {
+  constexpr size_t kMostLines = 20;
+  for (size_t i = 0; i < std::min(set.unread.size(), kMostLines); ++i) {
+    phone.log().WriteLine(kLogErr, "%s: %s; passed over", path.c_str(), set.unread[i].c_str());
+  }
+  if (set.unread.empty()) return;
+  phone.log().WriteLine(kLogErr, "%s: %u parts passed over", path.c_str(), static_cast<unsigned>(set.unread.size()));
+}
+
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
   phone.pkv().counts = {};
   const PkvOutcome outcome = ReadPkv(path, set);
   if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  LogUnread(phone, path, set);
   if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
   phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
   return KRAL_PKV_STATUS_BAD_ITEM;
@@ -131,6 +146,13 @@ std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties) {
     if (error == std::errc() && end == digits.data() + digits.size()) ids.insert(id);
   }
   return ids;
+}
+
+bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present) {
+  if (kept.bytes != present.bytes) return false;
+  if (kept.mode == 0) return true;
+  const bool same_kind = kept.is_item_file() == present.is_item_file() || kept.bytes.size() > KRAL_EFS_ITEM_SIZE;
+  return same_kind && kept.permissions() == present.permissions();
 }
 
 ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {

@@ -10,6 +10,7 @@
 
 #include "frame/diag_ftm.h"
 #include "storage/efs_client.h"
+#include "storage/nv_definitions.h"
 #include "storage/pkv_set.h"
 
 namespace kral::pkv {
@@ -26,7 +27,8 @@ void ReadIdentity(Diag_FTM& phone, PkvProperties& properties);
 // What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
 class JobReport {
  public:
-  JobReport(Diag_FTM& phone, size_t total);
+  // `passed_over` of the file are counted as skipped; the callback does not get them.
+  JobReport(Diag_FTM& phone, size_t total, size_t passed_over);
   ~JobReport();  // what was not reported was not reached
   JobReport(const JobReport&) = delete;
   JobReport& operator=(const JobReport&) = delete;
@@ -43,9 +45,13 @@ class JobReport {
 
   Diag_FTM& phone_;
   const efs::AbortWatch aborts_;
+  const uint32_t passed_over_;
   uint32_t reported_ = 0;
   bool stopped_ = false;
 };
+
+// Tells the log what a file holds beside what was read.
+void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set);
 
 // Reads the file of a restore or a comparison; what is wrong with it goes to the log.
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
@@ -60,6 +66,10 @@ void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties);
 // The ids of that note; nothing where there is none.
 std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties);
 
+// Whether the handset holds what the file keeps: content, kind and permissions. A file that is too large for an item
+// file has come back as a plain one. A mode of 0 is unknown.
+bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present);
+
 // Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
 // those that the file notes. Where it has no such note, those that are defined so.
 class ArrayItems {
@@ -68,8 +78,11 @@ class ArrayItems {
   bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
   // No request names both a subscription and an element.
   bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && IsElement(item); }
-  // Defined as an array, but kept in a file that notes arrays and not this one: read without knowing which element.
-  bool IsUnclear(const PkvNvItem& item) const { return unclear_.contains(item.id); }
+  // An index that no request can name: it would become another element's. Or an item that is defined as an array, but
+  // kept in a file that notes arrays and not this one: read without knowing which element.
+  bool HasNoPlace(const PkvNvItem& item) const {
+    return item.index > nv::kHighestElement || unclear_.contains(item.id);
+  }
 
  private:
   std::set<uint16_t> ids_;

@@ -14,7 +14,10 @@ using Answer = PhoneItems::Answer;
 class RestoreJob {
  public:
   RestoreJob(Diag_FTM& phone, const PkvSet& set)
-      : items_(phone), set_(set), arrays_(phone, set), report_(phone, set.items.size() + set.files.size()) {}
+      : items_(phone),
+        set_(set),
+        arrays_(phone, set),
+        report_(phone, set.items.size() + set.files.size(), set.unread.size()) {}
 
   uint32_t Run() {
     std::span<const PkvNvItem> rest(set_.items);  // subscription 0 comes first
@@ -32,13 +35,13 @@ class RestoreJob {
   // As many items as go together; gives how many these were.
   size_t RestorePacket(std::span<const PkvNvItem> rest) {
     const PkvNvItem& first = rest.front();
-    if (arrays_.IsUnclear(first)) {
+    if (arrays_.HasNoPlace(first)) {
       report_.Add(first, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
       return 1;
     }
     size_t count = 0;
     while (count < std::min(rest.size(), PhoneItems::kMostInBatch) && rest[count].subscription == 0 &&
-           !arrays_.IsUnclear(rest[count])) {
+           !arrays_.HasNoPlace(rest[count])) {
       ++count;
     }
     const auto packet = rest.first(std::max<size_t>(count, 1));
@@ -97,19 +100,31 @@ class RestoreJob {
     report_.Add(item, equal ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);
   }
 
+  // A file that cannot be written may be there already, read-only as it was when it was backed up.
   void RestoreFile(const PkvEfsFile& file) {
-    uint32_t status = 0;
-    const Answer written = lost_ ? Answer::kLost : items_.WriteFile(file, status);
+    uint32_t refusal = 0;
+    const Answer written = lost_ ? Answer::kLost : items_.WriteFile(file, refusal);
     lost_ = written == Answer::kLost;
     if (lost_) return report_.Add(file, KRAL_PKV_NOT_REACHED, 0);
-    if (written == Answer::kRefused || status != 0) {
-      return report_.Add(file, KRAL_PKV_REFUSED, status != 0 ? status : PhoneItems::kRefusedStatus);
-    }
-    PkvEfsFile present{.path = file.path, .mode = file.mode, .bytes = {}};
-    const Answer read = items_.ReadFile(present, status, file.bytes.size());
+    PkvEfsFile present{.path = file.path, .mode = 0, .bytes = {}};
+    uint32_t status = 0;
+    const Answer read = ReadBack(file, present, status);
     lost_ = read == Answer::kLost;
-    if (read != Answer::kAnswered || status != 0) return report_.Add(file, KRAL_PKV_NOT_READ_BACK, status);
-    report_.Add(file, present.bytes == file.bytes ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);
+    const bool was_read = read == Answer::kAnswered && status == 0;
+    const bool equal = was_read && IsSameFile(file, present);
+    if (refusal != 0) return report_.Add(file, equal ? KRAL_PKV_SKIPPED : KRAL_PKV_REFUSED, refusal);
+    if (!was_read) return report_.Add(file, KRAL_PKV_NOT_READ_BACK, status);
+    report_.Add(file, equal ? KRAL_PKV_DONE : KRAL_PKV_DIFFERENT, 0);
+  }
+
+  // Content first: the permissions may be such that it cannot be read afterwards.
+  Answer ReadBack(const PkvEfsFile& file, PkvEfsFile& present, uint32_t& status) {
+    const Answer answer = items_.ReadPresent(present, status);
+    if (answer != Answer::kAnswered || status != 0 || present.bytes != file.bytes) return answer;
+    if (file.mode == 0 || present.permissions() == file.permissions()) return answer;
+    if (items_.SetPermissions(file, status) == Answer::kLost) return Answer::kLost;
+    uint32_t size = 0;
+    return items_.Status(file.path.c_str(), present.mode, size, status);
   }
 
   PhoneItems items_;

@@ -10,6 +10,7 @@
 #include "frame/base/text_log.h"
 #include "platform/station_switch.h"
 #include "storage/nv_storage.h"
+#include "storage/pkv_unread.h"
 #include "storage/varn_pkv_file.h"
 
 namespace kral {
@@ -22,11 +23,38 @@ auto KeyOf(const PkvNvItem& item) {
   return std::tuple(item.subscription, item.id, item.index);
 }
 
-// The first one of several with the same key stays.
-void Normalize(std::vector<PkvNvItem>& items) {
+// The first one of several with the same key stays; the others are told when they are different.
+void Normalize(std::vector<PkvNvItem>& items, std::vector<std::string>& dropped) {
   std::stable_sort(items.begin(), items.end(), [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); });
-  const auto same = [](const PkvNvItem& a, const PkvNvItem& b) { return KeyOf(a) == KeyOf(b); };
-  items.erase(std::unique(items.begin(), items.end(), same), items.end());
+  const auto is_again = [&](const PkvNvItem& first, const PkvNvItem& item) {
+    if (KeyOf(first) != KeyOf(item)) return false;
+    if (first != item) dropped.push_back("NV ID " + std::to_string(item.id) + ": a second value");
+    return true;
+  };
+  items.erase(std::unique(items.begin(), items.end(), is_again), items.end());
+}
+
+void Normalize(std::vector<PkvEfsFile>& files, std::vector<std::string>& dropped) {
+  std::map<std::string, size_t> kept;
+  size_t count = 0;
+  for (size_t i = 0; i < files.size(); ++i) {
+    const auto [known, added] = kept.emplace(pkv::PathKey(files[i].path), count);
+    if (added) {
+      if (count != i) files[count] = std::move(files[i]);
+      ++count;
+      continue;
+    }
+    const PkvEfsFile& first = files[known->second];
+    if (first.mode != files[i].mode || first.bytes != files[i].bytes) {
+      dropped.push_back(files[i].path + ": a second content");
+    }
+  }
+  files.resize(count);
+}
+
+void Normalize(PkvSet& set) {
+  Normalize(set.items, set.unread);
+  Normalize(set.files, set.unread);
 }
 
 // A record in use that tells another length is out of step: its value would be part of another one's.
@@ -62,9 +90,13 @@ bool ReadConfiguration(CompoundStorage& configuration, PkvSet& set, std::string&
   CEFSItemBackup backup(configuration, pkv::Access::kRead);
   // Behind the configuration's own items, which come first where both have one.
   if (backup.items() != nullptr && !AppendItems(*backup.items(), set.items, problem)) return false;
-  Normalize(set.items);
-  return CItemFileStgAccess(configuration, pkv::Access::kRead).Read(set.files, problem) &&
-         backup.Read(set.files, problem);
+  if (!CItemFileStgAccess(configuration, pkv::Access::kRead).Read(set.files, problem) ||
+      !backup.Read(set.files, problem)) {
+    return false;
+  }
+  set.unread = pkv::UnreadParts(configuration);
+  Normalize(set);
+  return true;
 }
 
 // Plain items into the arrays; an array has one item per id, so indexed ones go beside it.
@@ -110,7 +142,8 @@ PkvOutcome ReadPkv(const std::string& path, PkvSet& set) {
   if (std::string problem = file.Open(path); !problem.empty()) return {PkvResult::kCannotOpen, std::move(problem)};
   CompoundStorage* const configuration = file.FindConfiguration();
   if (configuration == nullptr) return {PkvResult::kNoStorage, path + ": holds no phone configuration"};
-  PkvSet read{.items = {}, .files = {}, .properties = file.properties()};
+  PkvSet read;
+  read.properties = file.properties();
   std::string problem;
   if (!ReadConfiguration(*configuration, read, problem)) return {PkvResult::kDamagedItem, path + ": " + problem};
   set = std::move(read);
@@ -124,7 +157,10 @@ PkvWriter ChosenPkvWriter() {
 PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandler* log, PkvWriter writer) {
   PkvSet valid = set;
   std::erase_if(valid.items, [](const PkvNvItem& item) { return item.status != 0; });
-  Normalize(valid.items);
+  Normalize(valid);
+  if (writer == PkvWriter::kVarnPkvFile && valid.items.empty()) {
+    return {PkvResult::kNoItem, path + ": not written, VARN_PkvFile holds no file without an NV item"};
+  }
   try {
     if (writer == PkvWriter::kVarnPkvFile) {
       WriteWithVarnPkvFile(path, valid);

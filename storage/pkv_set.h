@@ -18,6 +18,7 @@ struct PkvSet {
   std::vector<PkvNvItem> items;
   std::vector<PkvEfsFile> files;
   PkvProperties properties{PkvVersionText(), {}};
+  std::vector<std::string> unread;  // of the file that was read: what it holds beside these, a line for each part
 };
 
 enum class PkvResult {
@@ -25,6 +26,7 @@ enum class PkvResult {
   kCannotOpen,   // not there, not readable, no compound document
   kNoStorage,    // a compound document, but no PKV file
   kDamagedItem,  // an item or a file in it cannot be read
+  kNoItem,       // not written: VARN_PkvFile holds no file without an item
   kCannotWrite,
 };
 
@@ -36,7 +38,9 @@ struct PkvOutcome {
   bool done() const { return result == PkvResult::kDone; }
 };
 
-// Items come in rising order of subscription, id and index, each of these once. On a failure the set is as before.
+// Items come in rising order of subscription, id and index, each of these once; files in their own order, each path
+// once, however it is spelled. What comes a second time with another content is unread. On a failure the set is as
+// before.
 PkvOutcome ReadPkv(const std::string& path, PkvSet& set);
 
 enum class PkvWriter { kStorageClasses, kVarnPkvFile };
@@ -45,7 +49,7 @@ enum class PkvWriter { kStorageClasses, kVarnPkvFile };
 // environment variable KRAL_USE_PKV_FILE (Linux) is there.
 PkvWriter ChosenPkvWriter();
 
-// Items whose status is not 0 have no value and are left out. VARN_PkvFile writes no file without an item. The file is
+// Items whose status is not 0 have no value and are left out. The file is
 // replaced in one step; after a failure it is as it was. `log`, if given, gets a line per item and one at the end.
 PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandler* log = nullptr,
                     PkvWriter writer = ChosenPkvWriter());

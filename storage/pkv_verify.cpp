@@ -10,7 +10,10 @@ using Answer = PhoneItems::Answer;
 class VerifyJob {
  public:
   VerifyJob(Diag_FTM& phone, const PkvSet& set)
-      : items_(phone), set_(set), arrays_(phone, set), report_(phone, set.items.size() + set.files.size()) {}
+      : items_(phone),
+        set_(set),
+        arrays_(phone, set),
+        report_(phone, set.items.size() + set.files.size(), set.unread.size()) {}
 
   uint32_t Run() {
     for (const PkvNvItem& item : set_.items) {
@@ -27,12 +30,12 @@ class VerifyJob {
  private:
   // These give false when the caller has stopped the job.
   bool Compare(const PkvNvItem& item) {
-    if (arrays_.IsInexpressible(item)) {
-      report_.Add(item, KRAL_PKV_SKIPPED, 0);
+    if (arrays_.HasNoPlace(item)) {
+      report_.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
       return !report_.stopped();
     }
-    if (arrays_.IsUnclear(item)) {
-      report_.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+    if (arrays_.IsInexpressible(item)) {
+      report_.Add(item, KRAL_PKV_SKIPPED, 0);
       return !report_.stopped();
     }
     PkvNvItem present = item;
@@ -43,10 +46,10 @@ class VerifyJob {
   }
 
   bool Compare(const PkvEfsFile& file) {
-    PkvEfsFile present{.path = file.path, .mode = file.mode, .bytes = {}};
+    PkvEfsFile present{.path = file.path, .mode = 0, .bytes = {}};
     uint32_t status = 0;
-    const Answer answer = lost_ ? Answer::kLost : items_.ReadFile(present, status, file.bytes.size());
-    Add(file, answer, status == 0 && present.bytes == file.bytes, status);
+    const Answer answer = lost_ ? Answer::kLost : items_.ReadPresent(present, status);
+    Add(file, answer, status == 0 && IsSameFile(file, present), status);
     return !report_.stopped();
   }
 

@@ -50,8 +50,7 @@ struct Target {
       array.Open(configuration, subscription, pkv::Access::kReadWrite);
   }
   void Write(const PkvNvItem& item) {
-    PkvNvItem present;
-    if (array.Find(item.id, present) && present.index == item.index) array.Delete(item.id);
+    array.Delete(item.id, item.index);
     numbered.Write(item);
   }
 

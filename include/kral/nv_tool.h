@@ -8,7 +8,8 @@
  * - Every function returns an error code, 0 for success (KRAL_NV_GetErrorText has the texts). An unknown handle gives
  *   16; 0xFFFFFFFF stands for a failure of the machine, such as a lack of memory.
  * - Definitions, values, filters and the current subscription belong to the handle and live until its release.
- * - An item is a numbered NV item or a file of the handset, known by its full path. Items that are kept as
+ * - An item is a numbered NV item or a file of the handset, known by its full path; a missing first slash and doubled
+ *   ones make no difference. Items that are kept as
  *   "/nv/item_files/rfnv/" and eight decimal digits are RF NV items: they are files and have an NV id too.
  * - An index counts all definitions from 0, in the order in which they were loaded: first the numbered items
  *   (KRAL_NV_GetNumOfNVDefinition of them), then the files (KRAL_NV_GetNumOfNVEfsDefinition).
@@ -270,7 +271,11 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle,
 KRAL_API uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                              const char* html_file);
 
-/** Writes all values as a list: item, name, subscription, array index, value; tabs between. 15: it cannot be made. */
+/**
+ * Writes all values as a list: item, name, subscription, array index, value; tabs between.
+ *
+ * @return 0; 10 when there is no value (an older list stays as it is); 15 when it cannot be made
+ */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* file);
 
 /* --- Subscriptions ------------------------------------------------------------------------------------------------ */

@@ -30,12 +30,13 @@ extern "C" {
 
 /** Ends of the work. */
 #define KRAL_PKV_STATUS_DONE 0u
-#define KRAL_PKV_STATUS_CANNOT_OPEN 7u         /**< the file cannot be read, or cannot be written */
-#define KRAL_PKV_STATUS_INCOMPLETE 12u         /**< backup: the file is written, but the handset refused something */
-#define KRAL_PKV_STATUS_LOST 16u               /**< the handset does not answer */
-#define KRAL_PKV_STATUS_NO_STORAGE 18u         /**< the file is no PKV file */
-#define KRAL_PKV_STATUS_BAD_ITEM 20u           /**< something in the file is damaged, or it holds nothing */
-#define KRAL_PKV_STATUS_NOTHING_READ 22u       /**< the handset gave no item and no file */
+#define KRAL_PKV_STATUS_CANNOT_OPEN 7u /**< the file cannot be read, or cannot be written */
+#define KRAL_PKV_STATUS_INCOMPLETE 12u /**< backup: the file is written, but the handset refused something */
+#define KRAL_PKV_STATUS_LOST 16u       /**< the handset does not answer */
+#define KRAL_PKV_STATUS_NO_STORAGE 18u /**< the file is no PKV file */
+#define KRAL_PKV_STATUS_BAD_ITEM 20u   /**< something in the file is damaged, or it holds nothing */
+/** The handset gave no item and no file; or files only, where the station's writer needs an item (docs/pkv.md). */
+#define KRAL_PKV_STATUS_NOTHING_READ 22u
 #define KRAL_PKV_STATUS_NOT_WRITTEN 23u        /**< the handset refused something, or reads back otherwise */
 #define KRAL_PKV_STATUS_DIFFERENT 256u         /**< file and handset differ */
 #define KRAL_PKV_STATUS_STOPPED 257u           /**< the callback or KRAL_AbortEFS_Operation wanted it so */
@@ -64,7 +65,7 @@ typedef char KRAL_PKV_ITEM_SIZE_CHECK[sizeof(KRAL_PKV_ITEM) == 16 ? 1 : -1];
 
 /** How many of each result there were. */
 typedef struct KRAL_PKV_COUNTS {
-  uint32_t total; /**< items and files in all; the others add up to it */
+  uint32_t total; /**< items, files and what the PKV file holds beside (skipped); the others add up to it */
   uint32_t done;
   uint32_t skipped;
   uint32_t refused;
@@ -77,8 +78,9 @@ typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
 
 /**
  * Called once for every item and file, with its final result, on the thread that called the function, until it stops
- * the work: what a restore had written together with the last one is then in the counts only. It must not call
- * functions of the handle; another backup, restore or comparison would give KRAL_PKV_STATUS_UNEXPECTED.
+ * the work: what a restore had written together with the last one is then in the counts only. So are, as skipped, parts
+ * of a PKV file that can be no item and no file (the text log names them). It must not call functions of the handle;
+ * another backup, restore or comparison would give KRAL_PKV_STATUS_UNEXPECTED.
  *
  * @param item    lives for the call only
  * @param path    of a file; null for an NV item
@@ -126,15 +128,20 @@ KRAL_API uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, cons
  * An item that the handset refuses as read-only (status 7) is skipped when it holds the value already, or is in the
  * list of KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List. Elements of array items can be written for subscription 0 only, and
  * are skipped for others. An item that is defined as an array now, in a file that notes its arrays and not this one,
- * is refused (0xFFFF): it was read without knowing which element it is. Items queued in batch mode stay queued.
+ * is refused (0xFFFF): it was read without knowing which element it is; so is an element with an index above 255. Items
+ * queued in batch mode stay queued.
+ *
+ * Files get their permissions, and are read back with kind and permissions. One that cannot be written, but is there
+ * with the same content, kind and permissions, is skipped.
  *
  * @return 1 when everything was written, or skipped
  */
 KRAL_API uint8_t KRAL_CALL KRAL_RestoreNVFromPKV(KRAL_HANDLE handle, const char* file, uint32_t* status);
 
 /**
- * Compares the items and files of a PKV file with those of the handset, which is not changed. Elements of array items
- * of another subscription than 0 cannot be asked for and are skipped. An addition to the interface.
+ * Compares the items and files of a PKV file with those of the handset, which is not changed; files with their kind and
+ * permissions. Elements of array items of another subscription than 0 cannot be asked for and are skipped, those with
+ * an index above 255 are refused. An addition to the interface.
  *
  * @return 1 when the handset holds everything, but for what was skipped, as it is in the file
  */

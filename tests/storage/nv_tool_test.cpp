@@ -7,6 +7,7 @@
 #include <tuple>
 #include <vector>
 
+#include "kral/pkv.h"
 #include "storage/nv_compression.h"
 #include "storage/nv_filter.h"
 #include "storage/pkv_set.h"
@@ -127,6 +128,79 @@ TEST_F(NvTool, ItemFilesOfTheHandsetGetGenericDefinitions) {
   EXPECT_EQ(status, 0);
   EXPECT_EQ(Value(20006), "1,2,3");
   EXPECT_GE(CountRequests("4B 0B 24 00 00 00 26 4E"), 1u) << "in factory test mode, by its dispatcher";
+}
+
+TEST_F(NvTool, AFileIsOneItemHoweverItsPathIsSpelled) {
+  constexpr const char* kPath = "/nv/item_files/conf/known";
+  ASSERT_EQ(Load("<NvEfsItem fullpathname='" + std::string(kPath) + "' name='KNOWN'>" + kTwoBytes + "</NvEfsItem>" +
+                 "<NvEfsItem fullpathname='nv/bare'>" + kTwoBytes + "</NvEfsItem>"),
+            0u);
+  handset().efs().AddItemFile(kPath, FromHex("01 02"));  // handsets list it without the slash
+  const std::string backup = Path("backup.pkv");
+  ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 0, 1), 1);
+  ASSERT_EQ(KRAL_BackupNVFromMobileToPKV(handle(), backup.c_str(), nullptr), 1) << ErrorText();
+  ASSERT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), backup.c_str()), 0u) << ErrorText();
+  EXPECT_EQ(FileValue(kPath), "1,2");
+  EXPECT_EQ(FileValue("nv/item_files/conf/known"), "1,2");
+  ASSERT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), "nv//item_files/conf/known", "3,4"), 0u);
+  const std::string filter =
+      folder_.Add("filter.xml",
+                  "<NvFilter><NV_NAME_SUBSTRING_LIST>/nv/item_files,/nv/bare</NV_NAME_SUBSTRING_LIST>"
+                  "</NvFilter>");
+  ASSERT_EQ(KRAL_NV_LoadWriteFilter(handle(), filter.c_str()), 0u);
+  EXPECT_TRUE(HasLine(KRAL_LOG_NV_MANAGER_DEBUG, "nv/bare:WILL_WRITE"));
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
+  EXPECT_EQ(HexText(*handset().efs().File(kPath)), "03 04");
+  EXPECT_EQ(nv::RfIdOfPath("nv/item_files/rfnv/00020001"), 20001);
+
+  PkvSet set;
+  set.files = {{"nv/x", 0xE1B6, FromHex("01")}, {"nv/y", 0xE1B6, FromHex("02")}};
+  ASSERT_TRUE(WritePkv(Path("first.pkv"), set).done());
+  for (PkvEfsFile& file : set.files) file.path = "/" + file.path;
+  ASSERT_TRUE(WritePkv(Path("second.pkv"), set).done());
+  ASSERT_EQ(KRAL_NV_PKV_Diff(handle(), Path("first.pkv").c_str(), Path("second.pkv").c_str(), Path("page").c_str()),
+            0u);
+  EXPECT_NE(
+      folder_.Content("page").find("0 items differ, 0 are only in the first, 0 only in the second, 2 are the same"),
+      std::string::npos);
+}
+
+TEST_F(NvTool, FilesKeepTheKindAndModeThatWereSeen) {
+  const std::tuple<const char*, uint32_t> kFiles[] = {{"/nv/item_files/conf/plain", 0x8180},
+                                                      {"/nv/item_files/conf/item", 0xE1A4}};
+  const auto add = [&] {
+    handset().efs().AddFile("/nv/item_files/conf/plain", FromHex("01"), 0600);
+    handset().efs().AddItemFile("/nv/item_files/conf/item", FromHex("02"));
+  };
+  const auto expect_modes_after_writing = [&](const char* from) {
+    SCOPED_TRACE(from);
+    for (const auto& [path, mode] : kFiles) KRAL_EfsDelete(handle(), path, nullptr);
+    EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
+    for (const auto& [path, mode] : kFiles) EXPECT_EQ(handset().efs().Mode(path), mode) << path;
+  };
+  add();
+  ASSERT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u) << ErrorText();
+  const auto pkv = Pkv();
+  PkvSet set;
+  ASSERT_TRUE(ReadPkv(pkv, set).done());
+  ASSERT_EQ(set.files.size(), 2u);
+  for (const PkvEfsFile& file : set.files) EXPECT_EQ(file.mode, file.bytes[0] == 1 ? 0x8180u : 0xE1A4u) << file.path;
+  expect_modes_after_writing("handset");
+  KRAL_NV_ClearNVDefinition(handle());
+  ASSERT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u) << ErrorText();
+  expect_modes_after_writing("PKV file");
+
+  // An item file that outgrows its requests.
+  KRAL_NV_ClearNVDefinition(handle());
+  add();
+  ASSERT_EQ(Load("<NvEfsItem fullpathname='/nv/item_files/conf/item'><DataType><Member typeid='word8' "
+                 "num_of_element='2000'/></DataType></NvEfsItem>"),
+            0u);
+  std::string value = "1";
+  for (int i = 1; i < 2000; ++i) value += ",1";
+  ASSERT_EQ(KRAL_NV_SetNVValueStringByEfsFilename(handle(), "/nv/item_files/conf/item", value.c_str()), 0u);
+  EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u) << ErrorText();
+  EXPECT_EQ(handset().efs().Mode("/nv/item_files/conf/item"), 0x81A4u);
 }
 
 TEST_F(NvTool, SingleItemsTellTheHandsetsStatus) {
@@ -545,6 +619,9 @@ TEST_F(NvTool, ComparisonShowsWhatDiffers) {
   EXPECT_EQ(folder_.Content("list.qdf"),
             "NV ID 1\tSAME\t0\t0\t1,2\nNV ID 2\tA&B\t0\t0\t1,77\nNV ID 4\tRIGHT\t0\t0\t5,6\n");
   EXPECT_EQ(KRAL_NV_GenerateQDF(handle(), Path("no/list").c_str()), 15u);
+  KRAL_NV_ClearNVValues(handle());
+  EXPECT_EQ(KRAL_NV_GenerateQDF(handle(), Path("list.qdf").c_str()), 10u);
+  EXPECT_TRUE(folder_.Content("list.qdf").starts_with("NV ID 1")) << "an older list stays";
 }
 
 }  // namespace

@@ -10,6 +10,7 @@
 #include "kral/pkv.h"
 #include "storage/pkv_set.h"
 #include "tests/support/efs_fixture.h"
+#include "tests/support/failing_allocation.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
 
@@ -201,16 +202,20 @@ TEST_F(PkvBackup, ElementsGoToTheElementsOfArrays) {
   PkvSet set;
   for (uint16_t index = 0; index < 4; ++index)
     set.items.push_back({.id = 5, .index = index, .data = {uint8_t(index + 1)}});
+  set.items.push_back({.id = 5, .index = 0x101, .data = {0xEE}});
   set.items.push_back({.id = 5, .index = 1, .subscription = 1, .data = {9}});
   ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
   EXPECT_EQ(g_results["5"], Result(KRAL_PKV_DONE, 0));
   EXPECT_EQ(g_results["5[2]"], Result(KRAL_PKV_DONE, 0));
   EXPECT_EQ(g_results["5[3]"], Result(KRAL_PKV_REFUSED, 6));  // the array has three
+  EXPECT_EQ(g_results["5[257]"], Result(KRAL_PKV_REFUSED, 0xFFFF));
+  EXPECT_EQ(handset().nv().Element(5, 1).value_or(Bytes{0})[0], 2) << "not written by an index cut to a byte";
   EXPECT_EQ(g_results["5[1]/1"], Result(KRAL_PKV_SKIPPED, 0));
   EXPECT_EQ(handset().nv().Element(5, 2).value_or(Bytes{0})[0], 3);
   EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
   EXPECT_EQ(g_results["5[1]"], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(g_results["5[257]"], Result(KRAL_PKV_REFUSED, 0xFFFF));
   EXPECT_EQ(g_results["5[1]/1"], Result(KRAL_PKV_SKIPPED, 0)) << "not compared with the element of subscription 0";
 }
 
@@ -463,6 +468,9 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
     EXPECT_EQ(job(0, "none.pkv", nullptr), 0);
   }
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "no folder/phone.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
+  uint32_t status = 0;
+  EXPECT_EQ(KRAL_BackupNVFromMobileToPKV(handle(), "", &status), 0);
+  EXPECT_EQ(status, KRAL_PKV_STATUS_CANNOT_OPEN);
   ASSERT_TRUE(WritePkv(folder_.Path("empty.pkv"), {}).done());
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV, "empty.pkv"), KRAL_PKV_STATUS_BAD_ITEM);
   EXPECT_TRUE(handset().requests().empty());
@@ -492,6 +500,16 @@ TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
   EXPECT_EQ(Read().files[0].path, "/nv/items/good");
 }
 
+TEST_F(PkvBackup, ItemFilesBeyondARequestAreReadWhereTheHandsetOpensThem) {
+  const std::string large = "/nv/item_files/rfnv/00020204";
+  handset().efs().AddItemFile(large, RandomBytes(2000));
+  handset().efs().OpenItemFiles(true);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  ASSERT_EQ(Read().files.size(), 1u);
+  EXPECT_EQ(Read().files[0].bytes, RandomBytes(2000));
+  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u) << ErrorText();
+}
+
 // This handset opens no item file as a plain one, so that one beyond an item request cannot be had whole.
 TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
   const std::string large = "/nv/item_files/rfnv/00020204";
@@ -514,6 +532,104 @@ TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
   EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
   EXPECT_EQ(g_results["/nv/items/last"], Result(KRAL_PKV_DONE, 0));
+}
+
+TEST_F(PkvBackup, PermissionsComeBackAndARefusalOfThemIsTold) {
+  const std::string with_none = "/nv/items/none";
+  PkvSet set;
+  set.files = {{kRfFile, 0xE124, {1, 2}}, {with_none, 0x8000, {3}}};
+  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  Run(KRAL_RestoreNVFromPKV);
+  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DONE, 0));
+  EXPECT_EQ(handset().efs().Mode(kRfFile), 0xE124u);
+  EXPECT_EQ(g_results[with_none], Result(KRAL_PKV_DONE, 0)) << ErrorText();
+  EXPECT_EQ(handset().efs().Mode(with_none), 0x8000u);
+
+  Remove(kRfFile);
+  handset().faults().Add(handset::Refuse(20), When::Always().Of("4B 13 12 00"));
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DIFFERENT, 0)) << "content alike, permissions not";
+  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
+  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DIFFERENT, 0));
+}
+
+TEST_F(PkvBackup, AReadOnlyFileIsSkippedWhenItIsEqual) {
+  const std::string plain = "/nv/items/plain";
+  handset().efs().AddFile(plain, RandomBytes(600), 0444);
+  handset().efs().AddItemFile(kRfFile, RandomBytes(30));
+  ASSERT_EQ(KRAL_EFS2_DIAG_CHMOD(handle(), kRfFile, 0444, nullptr), 1);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_SKIPPED, 13));
+  EXPECT_EQ(g_results[plain].first, KRAL_PKV_SKIPPED);
+  handset().efs().AddFile(plain, RandomBytes(600, 2), 0444);
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
+  EXPECT_EQ(g_results[plain].first, KRAL_PKV_REFUSED);
+}
+
+// "nv/x" beside "/nv/x", as other programs and older versions of this one wrote them.
+TEST_F(PkvBackup, AFileThatIsThereTwiceIsRestoredOnce) {
+  CompoundStorage root;
+  CompoundStorage& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
+  int number = 0;
+  for (const std::string path : {"/nv/items/x", "nv/items/x"}) {
+    const std::string name = "0000000" + std::to_string(number++);
+    Bytes entry = handset::FromHex("B6 81 00 00 01 00 00 00");
+    entry.insert(entry.end(), path.begin(), path.end());
+    files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream(name).bytes = entry;
+    files.OpenOrAddStorage("EFS_Data").OpenOrAddStream(name).bytes = {static_cast<uint8_t>(number)};
+  }
+  ASSERT_EQ(SaveCompoundFile(folder_.Path("phone.pkv"), root), "");
+  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
+  EXPECT_EQ(Counts(), "1 1 0 0 0 0") << "the second one counts as skipped";
+  EXPECT_NE(ErrorText().find("nv/items/x: a second content; passed over"), std::string::npos) << ErrorText();
+  EXPECT_EQ(handset().efs().File("/nv/items/x"), Bytes{1});
+  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u);
+}
+
+TEST_F(PkvBackup, APlainFileIsAskedForItsSizeOnce) {
+  const std::string path = "/nv/items/plain";
+  handset().efs().AddFile(path, RandomBytes(600));
+  Bytes request = {75, 19, 15, 0};
+  request.insert(request.end(), path.begin(), path.end());
+  for (const Job job : {KRAL_BackupNVFromMobileToPKV, KRAL_PKV_Verify}) {
+    handset().ClearTrace();
+    ASSERT_EQ(Run(job), 0u) << ErrorText();
+    EXPECT_EQ(RequestsOf(request), 1u);
+  }
+}
+
+TEST_F(PkvBackup, ALackOfMemoryLeavesNothingOut) {
+  const std::string definition =
+      "<NvDefinition version='1.0'><NvItem id='5' maxIndex='1'><DataType><Member typeid='word8'/></DataType></NvItem>"
+      "</NvDefinition>";
+  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), folder_.Add("array.xml", definition).c_str()), 0u);
+  ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 1), 1);
+  ASSERT_EQ(KRAL_PKV_ConfigureCallBack(handle(), nullptr), 1);
+  handset().nv().MakeArray(5, 2);
+  for (uint8_t index = 0; index < 2; ++index) handset().nv().SetElement(5, index, Bytes{7});
+  handset().efs().AddItemFile(kRfFile, RandomBytes(300));
+  ShortenTimeOuts(20);
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
+  const PkvSet whole = Read();
+  size_t done = 0;
+  size_t failed = 0;
+  for (bool short_of_memory = true; short_of_memory;) {
+    const std::string path = folder_.Path("phone.pkv");
+    uint32_t status = 0;
+    {
+      const test::FailingAllocation failing(done + failed + 1);
+      KRAL_BackupNVFromMobileToPKV(handle(), path.c_str(), &status);
+      short_of_memory = failing.has_failed();
+    }
+    handset().efs().OnReset();  // it may never have been told to close what it had opened
+    status == 0 ? ++done : ++failed;
+    if (status != 0) continue;
+    const PkvSet set = Read();
+    EXPECT_EQ(set.items, whole.items) << "allocation " << done + failed;
+    EXPECT_EQ(set.files, whole.files) << "allocation " << done + failed;
+  }
+  EXPECT_GT(failed, 50u);
 }
 
 // Only what is not there has no files.

@@ -6,7 +6,9 @@
 #include <optional>
 #include <tuple>
 
+#include "kral/pkv.h"
 #include "storage/nv_storage.h"
+#include "storage/pkv_jobs.h"
 #include "storage/pkv_set.h"
 #include "storage/varn_pkv_file.h"
 #include "tests/support/temp_folder.h"
@@ -264,6 +266,66 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
   }
 }
 
+// Others keep the elements of an array as records of one id.
+TEST_F(PkvFiles, RecordsOfOneIdWithDifferentIndexesAreItemsOfTheirOwn) {
+  CompoundStorage root;
+  std::vector<uint8_t>& records = root.OpenOrAddStream("NV_ITEM_ARRAY").bytes;
+  for (const PkvNvItem& item : {Item(5, 1), Item(5, 2, 1), Item(5, 9, 2), Item(6, 4), Item(5, 3, 2)}) {
+    const auto record = pkv::ArrayRecord(item);
+    records.insert(records.end(), record.begin(), record.end());
+  }
+  ASSERT_EQ(SaveCompoundFile(Path(), root), "");
+  PkvSet set;
+  ASSERT_TRUE(ReadPkv(Path(), set).done());
+  EXPECT_EQ(set.items, (std::vector<PkvNvItem>{Item(5, 1), Item(5, 2, 1), Item(5, 3, 2), Item(6, 4)}));
+
+  // What is written takes the place of its own record, and of no other.
+  VARN_PkvFile file;
+  file.open(Path());
+  file << Item(5, 0x11) << Item(5, 0x33, 2);
+  file.writeToDisk();
+  ASSERT_TRUE(ReadPkv(Path(), set).done());
+  EXPECT_EQ(set.items, (std::vector<PkvNvItem>{Item(5, 0x11), Item(5, 2, 1), Item(5, 0x33, 2), Item(6, 4)}));
+}
+
+TEST_F(PkvFiles, WhatNoReaderTakesIsTold) {
+  PkvSet set;
+  set.items = {Item(1, 1), Item(2, 2, 1)};
+  set.files = {{"/nv/x", 0x81FF, {1}}};
+  ASSERT_TRUE(WritePkv(Path(), set).done());
+  CompoundStorage root;
+  ASSERT_EQ(LoadCompoundFile(Path(), root), "");
+  CompoundStorage& configuration = *root.FindStorage("Default_Phone_Configuration");
+  configuration.OpenOrAddStream("NV_ITEM_ARRAY_SIM_0");
+  configuration.OpenOrAddStorage("NV_NUMBERED_ITEMS_SIM_70000");
+  configuration.OpenOrAddStorage("NV_NUMBERED_ITEMS").OpenOrAddStorage("00065536").OpenOrAddStream("00000000");
+  configuration.OpenOrAddStorage("NV_NUMBERED_ITEMS").OpenOrAddStream("00000001");
+  configuration.OpenOrAddStorage("EFS_Backup").OpenOrAddStorage("EFS_Data").OpenOrAddStream("00000009");
+  configuration.OpenOrAddStorage("EFS_Backup").OpenOrAddStorage("EFS_Dir").OpenOrAddStream("nine");
+  configuration.OpenOrAddStorage("Provisioning_Item_Files").OpenOrAddStream("EFS_Dir");
+  configuration.OpenOrAddStorage("Provisioning_Item_Files").OpenOrAddStream("EFS_Data");
+  configuration.OpenOrAddStream("Feature_Mask");
+  configuration.OpenOrAddStream("NV_ITEM_ARRAY").bytes.resize(137);
+  ASSERT_EQ(SaveCompoundFile(Path(), root), "");
+  PkvSet read;
+  const PkvOutcome outcome = ReadPkv(Path(), read);
+  ASSERT_TRUE(outcome.done()) << outcome.text;
+  EXPECT_EQ(read.items, set.items);
+  EXPECT_EQ(read.files, set.files);
+  std::sort(read.unread.begin(), read.unread.end());
+  EXPECT_EQ(read.unread, (std::vector<std::string>{
+                             "EFS_Backup/EFS_Data/00000009: a content without an entry",
+                             "EFS_Backup/EFS_Dir/nine: no number of a file",
+                             "NV_ITEM_ARRAY: a part of a record at its end",
+                             "NV_ITEM_ARRAY_SIM_0: no such subscription",
+                             "NV_NUMBERED_ITEMS/00000001: a stream, no storage",
+                             "NV_NUMBERED_ITEMS/00065536: no item has this number",
+                             "NV_NUMBERED_ITEMS_SIM_70000: no such subscription",
+                             "Provisioning_Item_Files/EFS_Data: a stream, no storage",
+                             "Provisioning_Item_Files/EFS_Dir: a stream, no storage",
+                         }));
+}
+
 TEST_F(PkvFiles, AFileThatCannotBeWrittenStaysAsItWas) {
   for (const PkvWriter writer : {PkvWriter::kStorageClasses, PkvWriter::kVarnPkvFile}) {
     const PkvOutcome outcome = WritePkv(folder_.Path("no such folder/phone.pkv"), ExampleSet(), nullptr, writer);
@@ -271,7 +333,7 @@ TEST_F(PkvFiles, AFileThatCannotBeWrittenStaysAsItWas) {
     EXPECT_FALSE(outcome.text.empty());
   }
   folder_.Add("phone.pkv", "precious");
-  EXPECT_EQ(WritePkv(Path(), {}, nullptr, PkvWriter::kVarnPkvFile).result, PkvResult::kCannotWrite);
+  EXPECT_EQ(pkv::StatusOf(WritePkv(Path(), {}, nullptr, PkvWriter::kVarnPkvFile).result), KRAL_PKV_STATUS_NOTHING_READ);
   EXPECT_EQ(folder_.Content("phone.pkv"), "precious");
 }
 
@@ -321,10 +383,12 @@ TEST_F(PkvFiles, WhatIsAddedToAFileKeepsItsPropertiesAndReplacesFilesOfItsPaths)
   file << Item(60000, 1);
   set.files[1].bytes = {9, 8};
   set.files[2].bytes = {7};
+  set.files[1].mode = 0x81A4;  // now no item file
   for (size_t i : {1, 2}) file << set.files[i];
   file.writeToDisk();
   PkvSet joined;
   ASSERT_TRUE(ReadPkv(Path(), joined).done());
+  std::swap(set.files[1], set.files[2]);  // it went behind those of its kind
   EXPECT_EQ(joined.files, set.files);
   EXPECT_EQ(joined.properties.values, set.properties.values);
 }
