@@ -35,9 +35,15 @@ std::size_t Number(const XmlElement& element, std::string_view name, std::size_t
   return value;
 }
 
+// Names and paths; these are the same with and without a slash in front.
+std::string KeyOf(std::string_view text) {
+  return std::string(text.substr(text.starts_with('/') ? 1 : 0));
+}
+
 // RF NV items are files that have an id, too, in eight digits.
 std::optional<std::uint16_t> RfIdOf(std::string_view path) {
-  constexpr std::string_view kFolder = "/nv/item_files/rfnv/";
+  constexpr std::string_view kFolder = "nv/item_files/rfnv/";
+  if (path.starts_with('/')) path.remove_prefix(1);
   if (!path.starts_with(kFolder) || path.size() != kFolder.size() + 8) return std::nullopt;
   return ParseId(path.substr(kFolder.size()));
 }
@@ -167,8 +173,8 @@ void NvItems::ListItems() {
     const NvItem& item = items_.back();
     // Numbered items come before the files that have an id, too, and go before them.
     if (item.id) by_id_.try_emplace(*item.id, items_.size() - 1);
-    if (!item.path.empty()) by_text_.try_emplace(item.path, items_.size() - 1);
-    if (!item.name.empty()) by_text_.try_emplace(item.name, items_.size() - 1);
+    if (!item.path.empty()) by_text_.try_emplace(KeyOf(item.path), items_.size() - 1);
+    if (!item.name.empty()) by_text_.try_emplace(KeyOf(item.name), items_.size() - 1);
   }
 }
 
@@ -182,7 +188,7 @@ NvItem NvItems::Find(std::uint16_t id) const {
 
 NvItem NvItems::Find(const std::string& which) const {
   if (const auto id = ParseId(which)) return Find(*id);
-  if (const auto found = by_text_.find(which); found != by_text_.end()) return items_[found->second];
+  if (const auto found = by_text_.find(KeyOf(which)); found != by_text_.end()) return items_[found->second];
   if (which.find('/') == std::string::npos) {
     throw ToolError(ExitCode::kUsage, fmt::format("there is no item {}", which),
                     "give an NV id, a path of the handset, or the name of an item in a file given by --defs");
