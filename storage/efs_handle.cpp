@@ -53,6 +53,8 @@ bool RemoteHandle::Close() {
   const KeepFailure keep;
   const bool closed = CloseHandle(phone_, close_, value_, time_out_ms_);
   CloseStrays(phone_);
+  // As with strays.
+  if (!closed && phone_.efs().gave_up) handles_.strays.push_back(value_);
   return closed;
 }
 

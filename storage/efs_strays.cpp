@@ -77,10 +77,13 @@ bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count)
 
 void CloseStrays(Diag_FTM& phone) {
   for (const Kind& kind : kKinds) {
-    for (const u32 value : std::exchange((phone.efs().*kind.handles).strays, {})) {
+    auto& strays = (phone.efs().*kind.handles).strays;
+    for (const u32 value : std::exchange(strays, {})) {
       phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
       const KeepFailure keep;
-      CloseHandle(phone, kind.close, value, DefaultTimeOut(phone));
+      const bool closed = CloseHandle(phone, kind.close, value, DefaultTimeOut(phone));
+      // After an abort a silent handset is not waited for: it is told with the next operation.
+      if (!closed && phone.efs().gave_up) strays.push_back(value);
     }
   }
 }

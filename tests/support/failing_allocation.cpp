@@ -1,6 +1,8 @@
 // Takes the place of `new` and `delete` in the whole test program; malloc and free do the work, as sanitizers see them.
 #include "tests/support/failing_allocation.h"
 
+#include <atomic>
+#include <cstdint>
 #include <cstdlib>
 #include <new>
 
@@ -9,6 +11,7 @@ namespace {
 
 thread_local size_t to_go = 0;  // 0: none fails
 thread_local bool failed = false;
+std::atomic<size_t> refused_from{SIZE_MAX};
 
 }  // namespace
 
@@ -25,11 +28,20 @@ bool FailingAllocation::has_failed() const {
   return failed;
 }
 
+ScarceMemory::ScarceMemory(size_t from) {
+  refused_from = from;
+}
+
+ScarceMemory::~ScarceMemory() {
+  refused_from = SIZE_MAX;
+}
+
 static void* Allocate(size_t size) {
   if (to_go > 0 && --to_go == 0) {
     failed = true;
     throw std::bad_alloc();
   }
+  if (size >= refused_from) throw std::bad_alloc();
   if (void* const memory = std::malloc(size > 0 ? size : 1)) return memory;
   throw std::bad_alloc();
 }

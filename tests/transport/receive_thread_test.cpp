@@ -6,7 +6,7 @@
 
 #include "tests/support/engine_bundle.h"
 #include "tests/support/fake_clock.h"
-#include "tests/support/scarce_memory.h"
+#include "tests/support/failing_allocation.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {
