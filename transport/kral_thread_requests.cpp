@@ -178,7 +178,10 @@ Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t
   }
   const uint32_t start = clock_.TickMs();
   const auto size = static_cast<uint32_t>(request.size());
-  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) return WhyNotWritten();
+  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) {
+    if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+    return WhyNotWritten();
+  }
   LogWritten(time_out_ms, start);
   return ReplyKind::kExpected;
 }

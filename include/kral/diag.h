@@ -165,7 +165,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SET_DIPSW_F(KRAL_HANDLE handle, uint16_t sw
  * Sends the service programming code, which unlocks protected settings. The code appears in the text log in clear.
  *
  * @param      handle  from a connect function
- * @param      code    six ASCII digits; no terminator is needed
+ * @param      code    six ASCII digits. Exactly six characters are read: no terminator is needed, and a shorter text
+ *                     is read beyond its end
  * @param[out] result  the last byte of the answer: 1 when the handset accepted the code
  * @return 1 when the handset answered, whatever it thought of the code
  */

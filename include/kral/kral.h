@@ -7,8 +7,9 @@
  * - The handle comes first. It is what a connect function returned; 0 is never valid. An unknown or released handle
  *   gives 0, causes no traffic and leaves the outputs untouched.
  *   A value that was released may come back from a later connect; programs forget it with the release.
- * - Results are uint8_t: 1 for success, 0 for failure. Why a call failed is told in the text log of the handset
- *   (text_log.h). A status that the handset itself reports comes back through an output argument.
+ * - Results are uint8_t: 1 for success, 0 for failure. KRAL_GetLastError (error.h) says why a call failed, and so does
+ *   the text log of the handset (text_log.h). A status that the handset itself reports comes back through an output
+ *   argument. KRAL_NV_ functions return an error code instead, 0 for success.
  * - Outputs are written on success only. The caller owns all buffers; sizes are in bytes. Narrow integers are passed
  *   and returned zero-extended.
  * - Values that carry a caller's pointer are uintptr_t. Multi-byte fields of handset records are little-endian.

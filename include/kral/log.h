@@ -218,7 +218,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCodes(KRAL_HANDLE handle, u
  *
  * @param handle        from a connect function
  * @param equipment_id  0 to 15
- * @return 1 when the handset has taken the mask
+ * @return 1 when the handset has answered the mask that it was sent: with its ranges unknown, that mask names no item,
+ *         and what was on may still be
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearAllLogCodes(KRAL_HANDLE handle, uint8_t equipment_id);
 

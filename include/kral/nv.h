@@ -114,7 +114,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE 
  * was
  * @param[out] last_total_status  of the last packet, as the handset told
  * @param[out] last_item_status   of that item; 0 when it is read-only and in the list
- * @return 1 when every packet was answered and no item failed
+ * @return 1 when every packet was answered, with a result for each of its items, and no item failed
  *
  * Wait: time-out 0 for each packet.
  */

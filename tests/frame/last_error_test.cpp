@@ -177,6 +177,16 @@ TEST_F(LastError, NamesWhatWasWrong) {
   EXPECT_STREQ(Record(0).text, "there is no alias for the logical port 4711");
 }
 
+TEST_F(LastError, SilentServiceOfAnApplicationProcessorIsNoMode) {
+  Connect([] { KRAL_SetTargetType(1); });
+  handset().faults().Add(handset::Ignore(), When::Always());
+  uint8_t is_ftm = 7;
+  EXPECT_EQ(KRAL_IsFTM_Mode(handle(), &is_ftm), 0);
+  EXPECT_EQ(Record(handle()).code, uint32_t{KRAL_ERROR_NO_ANSWER});
+  EXPECT_EQ(is_ftm, 7);
+  EXPECT_EQ(KRAL_ChangeFTM_ModeRuntime(handle(), 0), 0);
+}
+
 TEST_F(LastError, PortThatDoesNotOpenIsToldByTheHandleOfTheConnect) {
   Kral_ResourceManager::SetDeviceOpener([](int, DeviceResult& result) {
     result = {DeviceError::kBusy, 16, "busy"};

@@ -225,6 +225,11 @@ TEST_F(Engine, SendWithoutReplyOnlyWrites) {
   EXPECT_EQ(wire_.Written(), std::vector<Bytes>{PlainFrame({7}, true)});
   EXPECT_EQ(EngineLines(),
             (LogLines::Lines{"1 SEND_ASYNC (1 bytes):07 ", "4 OK\t Timeout=80", "4 WRITE STACK TIME (ms):\t"}));
+
+  wire_.FailWrites(true);
+  engine_->transport.port().SetWriteTimeout(0);
+  EXPECT_EQ(engine_->transport.SendASync(Bytes{7}, 80, true).kind(), ReplyKind::kWriteFailed);
+  EXPECT_EQ(EngineLines(), (LogLines::Lines{"1 SEND_ASYNC (1 bytes):07 ", "16 Error. Send data failed."}));
 }
 
 TEST_F(Engine, PacketModeNeedsTheHandsetsConsentBetweenFramedAndTheFirstUnframedMode) {
