@@ -161,7 +161,7 @@ bool ReadToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) 
 }
 
 bool ReadOpenedToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) {
-  phone.efs().abort = false;
+  ForgetAbort(phone);
   u32 done = 0;
   if (!ReadOpened(phone, efs_file, *size, SinkOfMemory(phone, efs_file, buffer, *size, done))) return false;
   *size = done;
