@@ -3,6 +3,8 @@
 
 #include <algorithm>
 
+#include "frame/base/failure.h"
+
 namespace kral {
 namespace {
 
@@ -11,6 +13,17 @@ constexpr uint32_t kMostTimeOutsInARow = 10;
 // How often a wait looks for an abort.
 constexpr uint32_t kSliceMs = 20;
 constexpr uint32_t kProgressLineEvery = 0x80000;  // addresses
+
+Failure NotAcknowledged(const std::optional<DownloadAgent::OtherReply>& reply, uint32_t acknowledged) {
+  if (!reply) {
+    return Failure(KRAL_ERROR_LOST, "the handset went away when it had acknowledged %u bytes", acknowledged)
+        .Offset(acknowledged);
+  }
+  return Failure(KRAL_ERROR_LINK, "a write was answered with %zu bytes of code %d instead of an acknowledgement",
+                 reply->size, reply->code)
+      .Status(KRAL_ERROR_STATUS_REPLY, reply->code)
+      .Offset(acknowledged);
+}
 
 }  // namespace
 
@@ -58,11 +71,19 @@ BlockWriter::Turn BlockWriter::AwaitTurn(uint32_t total) {
     if (acknowledged != acknowledged_) time_outs_in_a_row_ = 0;
     acknowledged_ = acknowledged;
     connection_.Report(acknowledged, total);
-    if (wait == DownloadAgent::Wait::kFailed || connection_.aborted()) return Turn::kGiveUp;
+    if (connection_.aborted()) return Turn::kGiveUp;
+    if (wait == DownloadAgent::Wait::kFailed) {
+      Fail(NotAcknowledged(agent_.other_reply(), acknowledged));
+      return Turn::kGiveUp;
+    }
     if (wait == DownloadAgent::Wait::kReady) return Turn::kTake;
     if (agent_.done()) return Turn::kNothing;
     if (!timer.expired()) continue;
-    return ++time_outs_in_a_row_ < kMostTimeOutsInARow ? Turn::kSendAgain : Turn::kGiveUp;
+    if (++time_outs_in_a_row_ < kMostTimeOutsInARow) return Turn::kSendAgain;
+    Fail(Failure(KRAL_ERROR_LOST, "the handset acknowledges nothing any more: %u of %u bytes are in flash",
+                 acknowledged, total)
+             .Offset(acknowledged));
+    return Turn::kGiveUp;
   }
 }
 

@@ -112,10 +112,16 @@ std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t a
   return result;
 }
 
-void DownloadAgent::Fail() {
+void DownloadAgent::Fail(const std::optional<OtherReply>& reply) {
   const std::lock_guard lock(mutex_);
   failed_ = true;
+  other_reply_ = reply;
   changed_.notify_all();
+}
+
+std::optional<DownloadAgent::OtherReply> DownloadAgent::other_reply() const {
+  const std::lock_guard lock(mutex_);
+  return other_reply_;
 }
 
 void DownloadAgent::CountSent() {

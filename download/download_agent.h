@@ -4,6 +4,7 @@
 #define KRAL_DOWNLOAD_DOWNLOAD_AGENT_H
 
 #include <condition_variable>
+#include <cstddef>
 #include <cstdint>
 #include <mutex>
 #include <optional>
@@ -43,7 +44,14 @@ class DownloadAgent {
   };
   // Nothing, and nothing changed, for an address that is not outstanding.
   std::optional<Acknowledged> Acknowledge(uint32_t address);
-  void Fail();  // the error event
+  // What came instead of an acknowledgement.
+  struct OtherReply {
+    size_t size = 0;
+    uint8_t code = 0;
+  };
+  // The error event; nothing for a line from which no reply will come.
+  void Fail(const std::optional<OtherReply>& reply);
+  std::optional<OtherReply> other_reply() const;  // of the last one; for the writer
 
   // --- Both -------------------------------------------------------------------------------------------------------
   void CountSent();
@@ -64,6 +72,7 @@ class DownloadAgent {
   CFinalBlock final_block_;
   bool acknowledgement_arrived_ = false;  // reset by the wait that it ends
   bool failed_ = false;
+  std::optional<OtherReply> other_reply_;
   uint32_t blocks_sent_ = 0;
   uint32_t blocks_acknowledged_ = 0;
   uint32_t bytes_acknowledged_ = 0;

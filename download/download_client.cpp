@@ -5,6 +5,7 @@
 #include <optional>
 
 #include "download/download_connection.h"
+#include "download/download_failure.h"
 #include "download/image_file.h"
 #include "download/image_set_up.h"
 #include "download/kova.h"
@@ -45,7 +46,8 @@ uint32_t ResultOf(WriteOutcome outcome) {
 
 uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImage* header,
                     const WriteArguments& arguments) {
-  if (arguments.block_size == 0) return KRAL_STREAM_BAD_ARGUMENT;  // before anything is erased for it
+  // Before anything is erased for it.
+  if (arguments.block_size == 0) return BadArgument(KRAL_STREAM_BAD_ARGUMENT, "blocks of 0 bytes cannot be written");
   const WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
   try {
     switch (arguments.method) {
@@ -54,12 +56,17 @@ uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImag
       case KRAL_STREAM_NOR:
         return ResultOf(CWriteNORImageFramed(connection).Write(image, arguments.image_type, header, requested));
       default:
+        Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no method %d of writing an image", arguments.method));
         return KRAL_STREAM_BAD_ARGUMENT;
     }
   } catch (const PhoneImageException& exception) {
     connection.log().WriteLine(kLogErr, "%s at 0x%08X, size 0x%X", exception.what(), exception.address(),
                                exception.count());
     const bool reading = exception.kind() == PhoneImageException::Kind::kRead;
+    Fail(Failure(reading ? KRAL_ERROR_BAD_FILE : KRAL_ERROR_INTERNAL,
+                 "%u bytes at 0x%08X of the image could not be read: its file became shorter meanwhile",
+                 exception.count(), exception.address())
+             .Offset(exception.address()));
     return reading ? KRAL_STREAM_FILE_NOT_READ : KRAL_STREAM_WRITE_FAILED;
   }
 }
@@ -72,6 +79,7 @@ bool GiveResultOf(Diag_FTM& phone, uint32_t result_of_exceptions, uint32_t* resu
     value = operation();
   } catch (const std::exception& exception) {
     phone.log().WriteLine(kLogErr, "download : %s", exception.what());
+    Fail(Failure(KRAL_ERROR_INTERNAL, "no memory for the download: %s", exception.what()));
   }
   return Give(value, result);
 }
@@ -80,12 +88,15 @@ bool GiveResultOf(Diag_FTM& phone, uint32_t result_of_exceptions, uint32_t* resu
 bool IsRefused(Diag_FTM& phone, const char* name) {
   if (!phone.server_mode()) return false;
   phone.log().WriteLine(kLogErr, "%s() : FAIL in ORBT mode", name);
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "%s needs direct mode: a phone server downloads by itself", name));
   return true;
 }
 
 bool IsNull(const CallersBytes& bytes) {
   return bytes.data == nullptr && bytes.size != 0;
 }
+
+constexpr const char* kNoFile = "there is no file name";
 
 }  // namespace
 
@@ -110,7 +121,7 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
   if (IsRefused(phone, "KRAL_KOVA_LoadFlashProgrammer")) return Give(KRAL_KOVA_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
-  if (file == nullptr) return Give(KRAL_KOVA_FILE_NOT_OPENED, result);
+  if (file == nullptr) return Give(BadArgument(KRAL_KOVA_FILE_NOT_OPENED, kNoFile), result);
   // What throws is the image, for which there is no address space.
   return GiveResultOf(phone, KRAL_KOVA_FILE_NOT_DECODED, result,
                       [&] { return kova::LoadFlashProgrammer(connection, file, maximum_packet); });
@@ -157,7 +168,7 @@ bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
   if (IsRefused(phone, "KRAL_STREAM_PARTITION_TABLE")) return false;
   DownloadConnection connection(phone);
-  if (file == nullptr) return false;
+  if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, kNoFile));
   std::optional<uint8_t> answer;
   const bool accepted = CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
   if (answer && status != nullptr) *status = *answer;
@@ -169,7 +180,7 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   if (IsRefused(phone, "KRAL_STREAM_WriteImageFile")) return Give(KRAL_STREAM_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
-  if (file == nullptr) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
+  if (file == nullptr) return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, kNoFile), result);
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
     ImageFile image;
     ImageFile header;
@@ -178,7 +189,7 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
     if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
       opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
     if (opened != KRAL_STREAM_WRITTEN) return opened;
-    if (image.has_second_region()) return KRAL_STREAM_BAD_IMAGE;
+    if (const uint32_t refused = image.RefuseSecondRegion(file)) return refused;
     return WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments);
   });
 }
@@ -188,12 +199,18 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
   if (IsRefused(phone, "KRAL_STREAM_WriteImageMem")) return Give(KRAL_STREAM_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
-  if (IsNull(image) || IsNull(header)) return Give(KRAL_STREAM_BAD_ARGUMENT, result);
+  if (IsNull(image) || IsNull(header)) {
+    return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there are no bytes of the image or its header"), result);
+  }
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
-    if (PassesTheEnd(address, image.size)) return KRAL_STREAM_PAST_END;
+    if (PassesTheEnd(address, image.size)) {
+      Fail(Failure(KRAL_ERROR_ARGUMENT, "%u bytes from 0x%08X on go past address 0xFFFFFFFF", image.size, address));
+      return KRAL_STREAM_PAST_END;
+    }
     const auto whole = MakeMemoryImage({image.data, image.size}, address);
     if (whole == nullptr) return KRAL_STREAM_WRITE_FAILED;
     if (header.size > stream::kLongestHeader) {
+      Fail(HeaderTooLong(header.size));
       connection.log().WriteLine(kLogErr, "multi-image open failed\n");
       return KRAL_STREAM_OPEN_FAILED;
     }

@@ -3,6 +3,7 @@
 #include <exception>
 
 #include "download/download_client.h"
+#include "download/download_failure.h"
 #include "download/image_file.h"
 #include "frame/base/text_argument.h"
 #include "frame/export_call.h"
@@ -105,14 +106,18 @@ uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* d
 
 uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KRAL_IMAGE_INFO* info, uint32_t* result) {
   return WithoutPhone(__func__, result, [=] {
-    if (image_file == nullptr || info == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
+    if (image_file == nullptr || info == nullptr) {
+      return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no image file, or no room for what is in it");
+    }
     return kral::GetImageInfo(image_file, format, *info);
   });
 }
 
 uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64_t* bytes, uint32_t* result) {
   return WithoutPhone(__func__, result, [=] {
-    if (hex_file == nullptr || line == nullptr) return KRAL_STREAM_BAD_ARGUMENT;
+    if (hex_file == nullptr || line == nullptr) {
+      return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no HEX file, or no room for the line");
+    }
     kral::HexLoss loss;
     const uint32_t value = kral::FindHexLoss(hex_file, loss);
     if (value != KRAL_STREAM_WRITTEN) return value;
@@ -126,7 +131,9 @@ uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32
                                    uint32_t* result) {
   return WithoutPhone(__func__, result, [=] {
     uint32_t base = base_address == nullptr ? 0 : *base_address;
-    if (input == nullptr || output == nullptr || direction > KRAL_HEX_FROM_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
+    if (input == nullptr || output == nullptr || direction > KRAL_HEX_FROM_BINARY) {
+      return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no file to read or write, or no such direction");
+    }
     const uint32_t value = direction == KRAL_HEX_FROM_BINARY ? kral::BinaryToHex(input, output, base)
                                                              : kral::HexToBinary(input, output, base);
     if (value == KRAL_STREAM_WRITTEN && base_address != nullptr) *base_address = base;

@@ -6,6 +6,7 @@
 
 #include "download/download_client.h"
 #include "download/download_connection.h"
+#include "download/download_failure.h"
 #include "download/image_file.h"
 #include "download/kivrat.h"
 #include "platform/file_util.h"
@@ -60,7 +61,10 @@ class WholeWay {
 // Nothing is sent to a handset for files that turn out useless half-way.
 uint32_t CheckProgrammer(const char* file, uint64_t& size) {
   FileReader reader;
-  if (reader.Open(file) || reader.size() == 0) return KRAL_STREAM_FILE_NOT_OPENED;
+  if (reader.Open(file) || reader.size() == 0) {
+    Fail(NotOpened(file));
+    return KRAL_STREAM_FILE_NOT_OPENED;
+  }
   size = reader.size();
   return KRAL_STREAM_WRITTEN;
 }
@@ -73,10 +77,13 @@ uint32_t CheckImage(DataLogFileHandler& log, const char* file, uint64_t& size) {
     if (result == KRAL_STREAM_DATA_LOST) LogLoss(log, file, loss);
     if (result != KRAL_STREAM_WRITTEN) return result;
   } catch (const std::exception&) {  // no memory or address space for it
+    Fail(Failure(KRAL_ERROR_INTERNAL, "there is no memory for a look at %.200s", file));
     return KRAL_STREAM_FILE_NOT_DECODED;
   }
   size = info.size[0];
-  return info.size[1] == 0 ? KRAL_STREAM_WRITTEN : KRAL_STREAM_BAD_IMAGE;
+  if (info.size[1] == 0) return KRAL_STREAM_WRITTEN;
+  Fail(FileFailure(file, "has a second region at 0x08000000, which would be left out"));
+  return KRAL_STREAM_BAD_IMAGE;
 }
 
 bool BootTransfer(Diag_FTM& phone, const WholeWay& whole) {
@@ -106,12 +113,12 @@ FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const c
   for (uint32_t i = 0; i < images.size(); ++i) {
     if (const uint32_t result = CheckImage(phone.log(), images[i], sizes[i])) return {result, i};
     total += sizes[i];
-    if (phone.download().abort) return {KRAL_DOWNLOAD_ABORTED};
+    if (phone.download().abort) return {Aborted()};
   }
 
   WholeWay whole(phone, total);
   const auto failed = [&whole](uint32_t result, uint32_t image = KRAL_FLASH_NO_IMAGE) {
-    return FlashOutcome{whole.aborted() ? KRAL_DOWNLOAD_ABORTED : result, image};
+    return FlashOutcome{whole.aborted() ? Aborted() : result, image};
   };
   if (!BootTransfer(phone, whole)) return failed(KRAL_FLASH_CONNECT_FAILED);
   if (!ServeFlashProgrammer(phone, programmer)) {

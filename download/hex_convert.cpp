@@ -17,21 +17,27 @@ constexpr uint32_t kBaseUnit = 0x10000;
 // The text of an encoder on its way to a file that is replaced in one step.
 class AtomicTextSink final : public TextSink {
  public:
-  bool Open(const std::string& path) { return !file_.Open(path); }
+  bool Open(const std::string& path) { return Good(file_.Open(path)); }
   bool Write(std::string_view text) override {
     pending_ += text;
     return pending_.size() < kPiece || Flush();
   }
-  bool Commit() { return Flush() && !file_.Commit(); }
+  bool Commit() { return Flush() && Good(file_.Commit()); }
+  const std::error_code& error() const { return error_; }
 
  private:
+  bool Good(const std::error_code& error) {
+    if (error) error_ = error;
+    return !error;
+  }
   bool Flush() {
     const auto error = file_.Write({reinterpret_cast<const uint8_t*>(pending_.data()), pending_.size()});
     pending_.clear();
-    return !error;
+    return Good(error);
   }
 
   AtomicFile file_;
+  std::error_code error_;
   std::string pending_;
 };
 
@@ -70,40 +76,54 @@ class MovedImage final : public PhoneImage {
   bool read_failed_ = false;
 };
 
+uint32_t NotWritten(const std::string& output, const std::error_code& error) {
+  Fail(FileFailure(output, "cannot be written").System(error));
+  return KRAL_HEX_NOT_WRITTEN;
+}
+
 }  // namespace
 
 uint32_t HexToBinary(const std::string& input, const std::string& output, uint32_t& base) {
   ImageFile hex;
   const uint32_t result = hex.Open(input, KRAL_IMAGE_FORMAT_HEX);
   if (result != KRAL_STREAM_WRITTEN) return result;
-  if (hex.has_second_region()) return KRAL_STREAM_BAD_IMAGE;
+  if (const uint32_t refused = hex.RefuseSecondRegion(input)) return refused;
   AtomicFile file;
-  if (file.Open(output)) return KRAL_HEX_NOT_WRITTEN;
+  if (const auto error = file.Open(output)) return NotWritten(output, error);
   const uint32_t size = hex.image().GetSize(0);
   const uint32_t first = hex.image().GetBaseAddress(0);
   std::vector<uint8_t> piece(kPiece);
   for (uint32_t done = 0; done < size;) {
     const uint32_t count = std::min(kPiece, size - done);
     hex.image().Read(first + done, piece.data(), count, 0);
-    if (file.Write(std::span(piece).first(count))) return KRAL_HEX_NOT_WRITTEN;
+    if (const auto error = file.Write(std::span(piece).first(count))) return NotWritten(output, error);
     done += count;
   }
-  if (file.Commit()) return KRAL_HEX_NOT_WRITTEN;
+  if (const auto error = file.Commit()) return NotWritten(output, error);
   base = first;
   return KRAL_STREAM_WRITTEN;
 }
 
 uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32_t base) {
-  if (base % kBaseUnit != 0) return KRAL_STREAM_BAD_ARGUMENT;
+  if (base % kBaseUnit != 0) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "the base 0x%08X is no multiple of 0x10000", base));
+    return KRAL_STREAM_BAD_ARGUMENT;
+  }
   ImageFile binary;
   const uint32_t result = binary.Open(input, KRAL_IMAGE_FORMAT_BINARY);
   if (result != KRAL_STREAM_WRITTEN) return result;
-  if (PassesTheEnd(base, binary.image().GetSize(0))) return KRAL_STREAM_PAST_END;
+  if (PassesTheEnd(base, binary.image().GetSize(0))) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%u bytes from 0x%08X on go past address 0xFFFFFFFF", binary.image().GetSize(0),
+                 base));
+    return KRAL_STREAM_PAST_END;
+  }
   MovedImage image(binary.image(), base);
   HexPhoneImageDecoder encoder(false, false, true);
   AtomicTextSink file;
   if (file.Open(output) && encoder.Encode(image, file) && file.Commit()) return KRAL_STREAM_WRITTEN;
-  return image.read_failed() ? KRAL_STREAM_FILE_NOT_READ : KRAL_HEX_NOT_WRITTEN;
+  if (!image.read_failed()) return NotWritten(output, file.error());
+  Fail(FileFailure(input, "became shorter while it was read"));
+  return KRAL_STREAM_FILE_NOT_READ;
 }
 
 }  // namespace kral

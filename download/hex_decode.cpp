@@ -65,10 +65,12 @@ bool IsChecked(const LineReader::Line& line, size_t data_length) {
 }  // namespace
 
 bool HexPhoneImageDecoder::Decode(PhoneImage& image, TextSource& file) try {
+  fault_ = {};
   LineReader lines(file, hex::kMostCharacters);
   FindBase(image, lines);
   return LoadData(image, lines);
 } catch (const PhoneImageException&) {
+  fault_.what = "holds data that lie outside of the image, or for which there is no memory";
   return false;
 }
 
@@ -103,9 +105,12 @@ bool HexPhoneImageDecoder::LoadData(PhoneImage& image, LineReader& lines) {
   Cursor cursor{kUnknown, 0, false};
   LineReader::Line line;
   while (lines.Next(line)) {
+    fault_.line = line.number;
+    fault_.what = "holds no sound Intel HEX record";
     if (!LoadRecord(image, line, cursor)) return false;
   }
   LoseBeyond(image);
+  fault_.what = "is the last one, but holds no end-of-file record";
   return cursor.at_end;
 }
 

@@ -19,6 +19,12 @@ struct HexLoss {
   uint64_t line = 0;  // of the first of them, from 1
 };
 
+// Why a Decode failed, and at which line.
+struct HexFault {
+  const char* what = "";  // "holds ...", said of the line
+  uint64_t line = 0;      // 0 for a file without any
+};
+
 class HexPhoneImageDecoder final : public PhoneImageDecoder {
  public:
   HexPhoneImageDecoder() = default;
@@ -37,6 +43,8 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
 
   // What the last Decode lost. The reader takes no offence at it; whoever uses the image should.
   const HexLoss& loss() const { return loss_; }
+  // Of the last Decode that failed.
+  const HexFault& fault() const { return fault_; }
 
  private:
   struct Cursor {
@@ -64,6 +72,7 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
   bool start_is_linear_ = false;    // set by a type 05 record
   bool linear_addressing_ = false;  // a type 04 or 05 record was seen
   HexLoss loss_;
+  HexFault fault_;
   std::vector<Beyond> beyond_;
 };
 

@@ -5,6 +5,7 @@
 #include <array>
 #include <vector>
 
+#include "download/download_failure.h"
 #include "download/phone_image_binary.h"
 #include "download/phone_image_dpaged.h"
 #include "download/text_source.h"
@@ -44,28 +45,67 @@ uint32_t CountPayload(PhoneImage& image, uint32_t region) {
 uint32_t ImageFile::Open(const std::string& path, uint32_t format) {
   format_ = format == KRAL_IMAGE_FORMAT_BY_CONTENT ? FormatByContent(path) : format;
   if (format_ == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
-  if (format_ != KRAL_IMAGE_FORMAT_BINARY) return KRAL_STREAM_BAD_ARGUMENT;
+  if (format_ != KRAL_IMAGE_FORMAT_BINARY) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no image format %u", format));
+    return KRAL_STREAM_BAD_ARGUMENT;
+  }
   auto binary = std::make_unique<PhoneImageBinary>();
-  if (!binary->Open(path)) return binary->too_large() ? KRAL_STREAM_FILE_TOO_LARGE : KRAL_STREAM_FILE_NOT_OPENED;
+  if (!binary->Open(path)) {
+    Fail(binary->too_large() ? FileFailure(path, "has 4 GiB or more, or more than this process can map")
+                             : download::NotOpened(path));
+    return binary->too_large() ? KRAL_STREAM_FILE_TOO_LARGE : KRAL_STREAM_FILE_NOT_OPENED;
+  }
   image_ = std::move(binary);
   return KRAL_STREAM_WRITTEN;
 }
 
 uint32_t ImageFile::OpenHex(const std::string& path) {
   TextFile file;
-  if (!file.OpenForReading(path)) return KRAL_STREAM_FILE_NOT_OPENED;
+  if (!file.OpenForReading(path)) {
+    Fail(download::NotOpened(path));
+    return KRAL_STREAM_FILE_NOT_OPENED;
+  }
   decoder_ = std::make_unique<HexPhoneImageDecoder>();
   try {
     image_ = std::make_unique<PhoneImageDPaged>(kMaximumKib, decoder_.get());
   } catch (const PhoneImageException&) {  // a process that has no address space left
+    Fail(Failure(KRAL_ERROR_INTERNAL, "there is no address space for an image of %u KiB", kMaximumKib));
     return KRAL_STREAM_FILE_NOT_DECODED;
   }
-  if (!decoder_->Decode(*image_, file)) return KRAL_STREAM_FILE_NOT_DECODED;
+  if (!decoder_->Decode(*image_, file)) {
+    Fail(NotDecoded(path, decoder_->fault()));
+    return KRAL_STREAM_FILE_NOT_DECODED;
+  }
   loss_ = decoder_->loss();
-  if (loss_.bytes != 0) return KRAL_STREAM_DATA_LOST;
+  if (loss_.bytes != 0) {
+    Fail(DataLost(path, loss_));
+    return KRAL_STREAM_DATA_LOST;
+  }
   // A file whose base no record tells has the last address for it.
-  const bool passes = image_->GetSize(0) != 0 && PassesTheEnd(image_->GetBaseAddress(0), image_->GetSize(0));
-  return passes ? KRAL_STREAM_PAST_END : KRAL_STREAM_WRITTEN;
+  if (image_->GetSize(0) == 0 || !PassesTheEnd(image_->GetBaseAddress(0), image_->GetSize(0))) {
+    return KRAL_STREAM_WRITTEN;
+  }
+  Fail(FileFailure(path, "goes on past address 0xFFFFFFFF"));
+  return KRAL_STREAM_PAST_END;
+}
+
+uint32_t ImageFile::RefuseSecondRegion(const std::string& path) {
+  if (!has_second_region()) return KRAL_STREAM_WRITTEN;
+  Fail(FileFailure(path, "has a second region at 0x08000000, which would be left out"));
+  return KRAL_STREAM_BAD_IMAGE;
+}
+
+Failure NotDecoded(const std::string& file, const HexFault& fault) {
+  if (fault.line == 0) return FileFailure(file, "holds no Intel HEX record");
+  const auto line = static_cast<unsigned long long>(fault.line);
+  return Failure(KRAL_ERROR_BAD_FILE, "line %llu of the file %.120s %s", line, file.c_str(), fault.what)
+      .Line(static_cast<uint32_t>(fault.line));
+}
+
+Failure DataLost(const std::string& file, const HexLoss& loss) {
+  return Failure(KRAL_ERROR_BAD_FILE, "line %llu of the file %.120s holds data that have no place in the image",
+                 static_cast<unsigned long long>(loss.line), file.c_str())
+      .Line(static_cast<uint32_t>(loss.line));
 }
 
 void LogLoss(DataLogFileHandler& log, const std::string& file, const HexLoss& loss) {
@@ -85,6 +125,7 @@ std::unique_ptr<PhoneImage> MakeMemoryImage(std::span<const uint8_t> bytes, uint
     if (size != 0) image->Write(address, bytes.data(), size, 0);
     return image;
   } catch (const PhoneImageException&) {
+    Fail(Failure(KRAL_ERROR_INTERNAL, "there is no memory for a copy of %u bytes", size));
     return nullptr;
   }
 }
@@ -105,7 +146,8 @@ uint32_t GetImageInfo(const std::string& path, uint32_t format, KRAL_IMAGE_INFO&
   }
   info = found;
   return KRAL_STREAM_WRITTEN;
-} catch (const PhoneImageException&) {
+} catch (const PhoneImageException& exception) {
+  Fail(FileFailure(path, "became shorter while it was read").Offset(exception.address()));
   return KRAL_STREAM_FILE_NOT_READ;
 }
 

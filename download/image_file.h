@@ -9,12 +9,13 @@
 
 #include "download/hex_phone_image_decoder.h"
 #include "download/phone_image.h"
+#include "frame/base/failure.h"
 #include "frame/base/text_log.h"
 #include "kral/download.h"
 
 namespace kral {
 
-// An image with the decoder that it needs.
+// An image with the decoder that it needs. What does not give 0 here has noted its failure.
 class ImageFile {
  public:
   // Gives KRAL_STREAM_FILE_..., ..._DATA_LOST, ..._PAST_END, ..._BAD_ARGUMENT or 0. The format may be found by content.
@@ -25,6 +26,8 @@ class ImageFile {
   uint32_t regions() const { return format_ == KRAL_IMAGE_FORMAT_HEX ? KRAL_IMAGE_REGIONS : 1; }
   // Whether there are bytes that a download, or a binary file, would leave out.
   bool has_second_region() { return regions() > 1 && image_->GetSize(1) != 0; }
+  // KRAL_STREAM_BAD_IMAGE, or 0.
+  uint32_t RefuseSecondRegion(const std::string& path);
   const HexLoss& loss() const { return loss_; }  // of a HEX file that could be decoded
 
  private:
@@ -36,6 +39,9 @@ class ImageFile {
   std::unique_ptr<PhoneImage> image_;  // borrows the decoder
 };
 
+// Of a decoder that has just failed; of data that were just lost.
+Failure NotDecoded(const std::string& file, const HexFault& fault);
+Failure DataLost(const std::string& file, const HexLoss& loss);
 void LogLoss(DataLogFileHandler& log, const std::string& file, const HexLoss& loss);
 
 // Whether so many bytes from there on do not fit into 32 bits of addresses: they would go on at 0.

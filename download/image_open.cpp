@@ -18,6 +18,11 @@ bool IsAcknowledgement(const std::vector<uint8_t>& reply) {
 
 }  // namespace
 
+Failure HeaderTooLong(uint32_t size) {
+  return Failure(KRAL_ERROR_ARGUMENT, "a header of %u bytes is too long: an opening packet takes %u", size,
+                 static_cast<unsigned>(kLongestHeader));
+}
+
 WriteLimits CImageOpen::Limited(const WriteLimits& requested) {
   return {std::min(requested.block_size, kMostWriteData), std::max(requested.window, 1u)};
 }
@@ -54,7 +59,8 @@ bool CImageOpen::Close() {
   if (reply.size() != 1) {
     log.WriteLine(kLogErr, "error - response to MI close: size %u expected %u\n", static_cast<unsigned>(reply.size()),
                   1u);
-    return false;
+    return Fail(
+        Failure(KRAL_ERROR_LINK, "the answer to the closing of the image has %zu bytes instead of 1", reply.size()));
   }
   if (reply[0] != kCloseReply) {
     log.WriteLine(kLogErr, "error - response to MI close: rsp %u\n", static_cast<unsigned>(reply[0]));
@@ -67,14 +73,20 @@ bool CImageOpenFramed::OpenMulti(uint8_t type, PhoneImage* header, const WriteLi
   std::vector<uint8_t> request = {kOpen, type};
   if (header != nullptr) {
     const uint32_t size = header->GetSize(0);
-    if (size > kLongestHeader) return false;
+    if (size > kLongestHeader) return Fail(HeaderTooLong(size));
     request.resize(request.size() + size);
     header->Read(header->GetBaseAddress(0), request.data() + 2, size, 0);
   }
   std::vector<uint8_t> reply;
   const auto status = Exchange(request, kOpenReply, reply);
-  if (status != DownloadConnection::kDone || reply.size() != kStatusReplySize || reply[kStatusAt] != kStatusDone) {
-    return false;
+  if (status != DownloadConnection::kDone) return false;
+  if (reply.size() != kStatusReplySize) {
+    return Fail(Failure(KRAL_ERROR_LINK, "the answer to the opening of the image has %zu bytes", reply.size()));
+  }
+  if (reply[kStatusAt] != kStatusDone) {
+    return Fail(
+        Failure(KRAL_ERROR_REFUSED, "the handset refused to open an image of type %d with %d", type, reply[kStatusAt])
+            .Status(KRAL_ERROR_STATUS_LOADER, reply[kStatusAt]));
   }
   limits = Limited(requested);
   return true;

@@ -8,8 +8,11 @@
 
 #include "download/download_connection.h"
 #include "download/phone_image.h"
+#include "frame/base/failure.h"
 
 namespace kral {
+
+Failure HeaderTooLong(uint32_t size);
 
 struct WriteLimits {
   uint32_t block_size = 0;

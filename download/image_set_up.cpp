@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "download/stream_format.h"
+#include "frame/base/failure.h"
 #include "platform/file_util.h"
 
 namespace kral {
@@ -29,6 +30,15 @@ void LogRefusal(DataLogFileHandler& log, uint8_t status) {
   }
 }
 
+Failure Refusal(uint8_t status) {
+  const char* const reason = status == kUseOverride   ? "it differs from the one in flash and may not replace it"
+                             : status == kBadFormat   ? "it has a bad format"
+                             : status == kEraseFailed ? "the one in flash cannot be erased"
+                                                      : "for a reason of its own";
+  return Failure(KRAL_ERROR_REFUSED, "the handset refused the partition table with %d: %s", status, reason)
+      .Status(KRAL_ERROR_STATUS_LOADER, status);
+}
+
 }  // namespace
 
 bool CImageSecMode::Send(uint8_t mode) {
@@ -42,8 +52,10 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   std::vector<uint8_t> table;
   if (const auto error = ReadWholeFile(table_file, kPartitionTableSize, table)) {
     if (error == std::errc::file_too_large) {
+      Fail(FileFailure(table_file, "has more than the 512 bytes of a partition table"));
       log.WriteLine(kLogErr, "partition : file exceeds 512 bytes");
     } else {
+      Fail(FileFailure(table_file, "cannot be opened").System(error));
       log.WriteLine(kLogErr, "partition : failed to open file %s", table_file.c_str());
     }
     return false;
@@ -54,11 +66,14 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   std::copy(table.begin(), table.end(), request.begin() + 2);
   std::vector<uint8_t> reply;
   const auto sent = connection_.Exchange(request, kPartitionTableReply, time_out_ms_, reply);
-  if (sent != DownloadConnection::kDone || reply.size() != kStatusReplySize) return false;
+  if (sent != DownloadConnection::kDone) return false;
+  if (reply.size() != kStatusReplySize) {
+    return Fail(Failure(KRAL_ERROR_LINK, "the answer to the partition table has %zu bytes", reply.size()));
+  }
   status = reply[kStatusAt];
   if (*status == kStatusDone) return true;
   LogRefusal(log, *status);
-  return false;
+  return Fail(Refusal(*status));
 }
 
 }  // namespace kral

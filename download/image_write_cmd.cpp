@@ -5,6 +5,7 @@
 #include <array>
 
 #include "download/stream_format.h"
+#include "frame/base/failure.h"
 #include "frame/base/little_endian.h"
 #include "transport/hdlc_frame.h"
 
@@ -37,7 +38,7 @@ size_t CountEscaped(std::span<const uint8_t> bytes) {
 bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data) {
   if (data.size() > stream::kMostWriteData) {
     connection_.log().WriteLine(kLogErr, "write command too long\n");
-    return false;
+    return Fail(Failure(KRAL_ERROR_INTERNAL, "a write command of %zu bytes is too long", data.size()));
   }
   packet_.resize(stream::kWriteBufferSize);
   const auto header = Header(address);

@@ -47,12 +47,12 @@ void CImageWriteRsp::Run() {
       if (const auto frame = responses_.PopWithin(patience)) {
         receiver.OnFrame(*frame);
       } else if (responses_.closed()) {
-        agent_.Fail();  // no reply will come any more
+        agent_.Fail({});  // no reply will come any more
         break;
       }
     } catch (...) {
       PassForcedUnwind();
-      agent_.Fail();  // out of memory: the reply is lost, and the thread must not be
+      agent_.Fail({});  // out of memory: the reply is lost, and the thread must not be
     }
     patience = kPoll;
   }

@@ -10,6 +10,8 @@ namespace {
 
 using Hello = std::array<uint8_t, kHelloSize>;
 
+constexpr const char* kReadFailed = "Failed to read the Port buffer\n";
+
 class Greeter {
  public:
   Greeter(Diag_FTM& phone, const Stop& stop) : phone_(phone), port_(phone) {
@@ -39,12 +41,14 @@ class Greeter {
  private:
   enum class Heard { kHello, kNothing, kOther };
 
-  bool Fail(const char* text) {
+  // The line of the log, and what callers are told.
+  bool Fail(const char* text, const Failure& failure) {
     phone_.log().WriteLine(kLogErr, "%s", text);
-    return false;
+    return kral::Fail(failure);
   }
-  bool ReadWhole(std::span<uint8_t> packet) {
-    return port_.Read(packet) == packet.size() || Fail("Failed to read the Port buffer\n");
+  bool ReadWhole(std::span<uint8_t> packet, const char* what) {
+    const size_t count = port_.Read(packet);
+    return count == packet.size() || Fail(kReadFailed, port_.NotRead(what, count, packet.size()));
   }
 
   // Silence, and a port that is not there (yet), are all that the retries are for.
@@ -52,7 +56,7 @@ class Greeter {
     for (uint32_t retries = phone_.kivrat().hello_retries;; --retries) {
       const Heard heard = port_.Open() ? ReadHello(hello) : Heard::kNothing;
       if (heard == Heard::kHello) return true;
-      if (!phone_.port_borrowed()) Fail("Failed KivratInit()");
+      if (!phone_.port_borrowed()) Fail("Failed KivratInit()", port_.NotOpened());
       if (heard == Heard::kOther || retries == 0 || port_.stopped()) return false;
       if (port_.gone()) port_.GiveBack();  // it may come back as another device
       port_.Pause(phone_.kivrat().retry_delay_ms);
@@ -62,11 +66,11 @@ class Greeter {
   Heard ReadHello(Hello& hello) {
     const size_t count = port_.Read(hello);
     if (count != hello.size()) {
-      Fail("Failed to read the Port buffer\n");
+      Fail(kReadFailed, port_.NotRead("the hello of the boot loader", count, hello.size()));
       return count == 0 ? Heard::kNothing : Heard::kOther;
     }
     if (!IsPacket(hello, kHello)) {
-      Fail("The packet recieved from the device is not a HELLO_REQ");
+      Fail("The packet recieved from the device is not a HELLO_REQ", OtherPacket(hello, "a hello"));
       return Heard::kOther;
     }
     phone_.log().WriteLine(kLogRet, "Kivrat Hello recieved from the device\n");
@@ -78,7 +82,10 @@ class Greeter {
     StoreLe<uint32_t>(hello, kCommandAt, kHelloResponse);
     StoreLe<uint32_t>(hello, kStatusAt, 0);
     StoreLe<uint32_t>(hello, kModeAt, mode);
-    if (!port_.Write(hello)) return Fail("Failed to write to the KIVRAT_HELLO_RSP from the host to the Device");
+    if (!port_.Write(hello)) {
+      return Fail("Failed to write to the KIVRAT_HELLO_RSP from the host to the Device",
+                  port_.NotWritten("the answer to the hello"));
+    }
     phone_.log().WriteLine(kLogRet, "Kivrat Hello Response sent to the device\n");
     return true;
   }
@@ -86,25 +93,35 @@ class Greeter {
   bool ReadIdentity(const Hello& hello, std::optional<uint32_t>& identity) {
     if (!Respond(hello, kModeCommand)) return false;
     std::array<uint8_t, kHeaderSize> ready{};
-    if (!ReadWhole(ready) || !IsPacket(ready, kCommandReady)) return Fail("The command mode is not ready \r \n");
+    const bool read = ReadWhole(ready, "the readiness for commands");
+    if (!read || !IsPacket(ready, kCommandReady)) {
+      if (read) kral::Fail(OtherPacket(ready, "its readiness for commands"));
+      phone_.log().WriteLine(kLogErr, "%s", "The command mode is not ready \r \n");
+      return false;
+    }
 
-    if (!WritePacket(port_, kExecute, kReadChipIdentity)) return Fail("Failed to write the Kivrat command execute");
+    if (!WritePacket(port_, kExecute, kReadChipIdentity)) {
+      return Fail("Failed to write the Kivrat command execute", port_.NotWritten("the request for the chip identity"));
+    }
     phone_.log().WriteLine(kLogRet, "Kivrat command execute sent to the device\n");
     std::array<uint8_t, kExecuteResponseSize> response{};
-    if (!ReadWhole(response)) return false;
+    if (!ReadWhole(response, "the response to the request for the chip identity")) return false;
     if (!IsPacket(response, kExecuteResponse)) {
-      return Fail("The packet received from the device is not an execute response");
+      return Fail("The packet received from the device is not an execute response",
+                  OtherPacket(response, "an execute response"));
     }
     const size_t length = Field(response, kDataLengthAt);
     if (length == 0) return true;
 
-    if (!WritePacket(port_, kExecuteData, kReadChipIdentity)) return Fail("Failed to write the Kivrat execute data");
+    if (!WritePacket(port_, kExecuteData, kReadChipIdentity)) {
+      return Fail("Failed to write the Kivrat execute data", port_.NotWritten("the request for the identity's data"));
+    }
     // One read, whatever length was told: that tells only how much is worth waiting for.
     std::array<uint8_t, kMostIdentityData> data{};
     const size_t enough = std::clamp(length, kIdentityAt + sizeof(uint32_t), data.size());
-    const auto read = std::span(data).first(port_.Read(data, enough));
-    identity = LoadLe<uint32_t>(read, kIdentityAt);
-    if (!identity) return Fail("Failed to read the Port buffer\n");
+    const auto told = std::span(data).first(port_.Read(data, enough));
+    identity = LoadLe<uint32_t>(told, kIdentityAt);
+    if (!identity) return Fail(kReadFailed, port_.NotRead("the chip identity", told.size(), enough));
     phone_.log().WriteLine(kLogRet, "BXC ID read from PBL: %d \r \n", static_cast<int>(*identity));
     if (length > data.size()) PassOver(length - data.size());
     return true;
@@ -124,7 +141,9 @@ class Greeter {
   }
 
   bool SwitchToImageTransfer() {
-    if (!WritePacket(port_, kSwitchMode, kModeImageTransfer)) return Fail("Failed to write the Kivrat switch mode");
+    if (!WritePacket(port_, kSwitchMode, kModeImageTransfer)) {
+      return Fail("Failed to write the Kivrat switch mode", port_.NotWritten("the switch to the image transfer"));
+    }
     phone_.log().WriteLine(kLogRet, "Kivrat swtich mode sent to the device\n");
     return true;
   }

@@ -8,6 +8,7 @@
 #include "download/download_connection.h"
 #include "download/flash_all.h"
 #include "download/kivrat.h"
+#include "frame/base/failure.h"
 #include "frame/base/text_argument.h"
 #include "frame/export_call.h"
 #include "frame/orbt_server.h"
@@ -16,6 +17,8 @@ namespace {
 
 using kral::Diag_FTM;
 using kral::ExportCall;
+using kral::Fail;
+using kral::Failure;
 using kral::TextOrEmpty;
 
 bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms, uint32_t pre_done_delay_ms) {
@@ -50,15 +53,19 @@ bool End(Diag_FTM& phone) {
 bool FlashAll(Diag_FTM& phone, const char* programmer, const char* const* images, const uint8_t* types, uint32_t count,
               uint32_t* result, uint32_t* failed_image) {
   kral::download::FlashOutcome outcome{KRAL_STREAM_BAD_ARGUMENT};
-  if (programmer != nullptr && images != nullptr) {
+  if (programmer == nullptr || images == nullptr || count == 0) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no flash programmer, or there are no images"));
+  } else {
     const std::span all(images, count);
     const auto missing = std::find(all.begin(), all.end(), nullptr);
     if (missing != all.end()) {
       outcome.image = static_cast<uint32_t>(missing - all.begin());
-    } else if (count != 0) {
+      Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no name of image %u", outcome.image));
+    } else {
       try {
         outcome = kral::download::FlashAll(phone, programmer, all, types);
       } catch (const std::exception&) {  // no memory
+        Fail(Failure(KRAL_ERROR_INTERNAL, "there is no memory for the download"));
         phone.GiveBackPort();
         outcome = {KRAL_STREAM_WRITE_FAILED};
       }
@@ -69,16 +76,21 @@ bool FlashAll(Diag_FTM& phone, const char* programmer, const char* const* images
   return outcome.result == KRAL_STREAM_WRITTEN;
 }
 
+Failure NotInDirectMode() {
+  return Failure(KRAL_ERROR_ARGUMENT, "direct mode has no hello behavior: it is a phone server's");
+}
+
 bool SetHelloBehavior(Diag_FTM& phone, uint16_t behavior) {
   const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
-  if (!server) return false;
+  if (!server) return Fail(NotInDirectMode());
   server->SetKivratHelloBehavior(behavior);
   return true;
 }
 
 bool GetHelloBehavior(Diag_FTM& phone, uint16_t* behavior) {
   const auto server = kral::Kral_ResourceManager::GetSoftwareDownload(phone.handle());
-  if (!server || behavior == nullptr) return false;
+  if (!server) return Fail(NotInDirectMode());
+  if (behavior == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no room for the number"));
   *behavior = server->kivrat_hello_behavior();
   return true;
 }

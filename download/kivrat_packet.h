@@ -7,6 +7,7 @@
 
 #include "download/kivrat_format.h"
 #include "download/raw_port.h"
+#include "frame/base/failure.h"
 #include "frame/base/little_endian.h"
 
 namespace kral::kivrat {
@@ -19,6 +20,14 @@ inline uint32_t Field(std::span<const uint8_t> packet, size_t offset) {
 // True for a whole packet of that kind, its length field included.
 inline bool IsPacket(std::span<const uint8_t> packet, uint32_t command) {
   return Field(packet, kCommandAt) == command && Field(packet, kLengthAt) == packet.size();
+}
+
+// A packet that is none of that kind.
+inline Failure OtherPacket(std::span<const uint8_t> packet, const char* wanted) {
+  const uint32_t command = Field(packet, kCommandAt);
+  return Failure(KRAL_ERROR_LINK, "the boot loader sent packet %u of %u bytes instead of %s", command,
+                 Field(packet, kLengthAt), wanted)
+      .Status(KRAL_ERROR_STATUS_LOADER, command);
 }
 
 // A packet of so many fields behind its header.

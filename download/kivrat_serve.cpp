@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <vector>
 
+#include "download/download_failure.h"
 #include "download/kivrat.h"
 #include "download/kivrat_packet.h"
 #include "platform/file_util.h"
@@ -10,7 +11,6 @@
 namespace kral::kivrat {
 namespace {
 
-constexpr const char* kAborted = "Kivrat: the transfer was aborted";
 // A target that asks for nothing so often in a row will ask for nothing else.
 constexpr uint32_t kMostRequestsForNothing = 100;
 
@@ -23,32 +23,46 @@ class Server {
   }
 
   bool Run(const std::string& file_name) {
-    if (!phone_.port_borrowed()) return Fail("Failed KivratInit()");
+    if (!phone_.port_borrowed()) {
+      return Fail("Failed KivratInit()", Failure(KRAL_ERROR_ARGUMENT, "no boot loader has been connected to"));
+    }
     if (const auto error = file_.Open(file_name)) {
       phone_.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
                              error.message().c_str());
+      kral::Fail(FileFailure(file_name, "cannot be opened").System(error));
       port_.Keep();  // the target knows nothing of it and still waits: for a file of the right name
       return false;
     }
-    if (!port_.Open()) return Fail("Failed KivratInit()");
-    if (progress_ && !progress_(0, file_.size())) return Fail(kAborted);
+    if (!port_.Open()) return Fail("Failed KivratInit()", port_.NotOpened());
+    if (progress_ && !progress_(0, file_.size())) return Abort();
     if (!ServeRequests()) return false;
     file_.Close();
     return Finish();
   }
 
  private:
-  bool Fail(const char* text) {
+  // The line of the log, and what callers are told.
+  bool Fail(const char* text, const Failure& failure) {
     phone_.log().WriteLine(kLogErr, "%s", text);
+    return kral::Fail(failure);
+  }
+  bool Abort() {
+    phone_.log().WriteLine(kLogErr, "Kivrat: the transfer was aborted");
+    download::Aborted();
     return false;
   }
-
-  void LogLength(uint32_t length) { phone_.log().WriteLine(kLogErr, "Kivrat: a packet of %u bytes", length); }
+  bool RefuseLength(uint32_t length) {
+    phone_.log().WriteLine(kLogErr, "Kivrat: a packet of %u bytes", length);
+    return kral::Fail(Failure(KRAL_ERROR_LINK, "the boot loader sent a packet of %u bytes, as it says", length));
+  }
 
   bool ServeRequests() {
     for (;;) {
       std::span<const uint8_t> packet;
-      if (!ReadPacket(packet)) return Fail("Failed to read the command from the opened port \r \n");
+      if (!ReadPacket(packet)) {
+        phone_.log().WriteLine(kLogErr, "%s", "Failed to read the command from the opened port \r \n");
+        return false;
+      }
       const uint32_t command = Field(packet, kCommandAt);
       if (command == kEndOfTransfer) {
         phone_.log().WriteLine(kLogRet, "Kivrat: the target ends the transfer, status %u", Field(packet, kEndStatusAt));
@@ -57,7 +71,7 @@ class Server {
       if (command != kReadData) {
         phone_.log().WriteLine(kLogErr, "Recieved %d instead of KIVRAT_END_TRANSFER (command -> %d) \r\n",
                                static_cast<int>(command), static_cast<int>(kEndOfTransfer));
-        return false;
+        return kral::Fail(OtherPacket(packet, "a request or the end of the transfer"));
       }
       if (!Serve(packet)) return false;
     }
@@ -66,15 +80,16 @@ class Server {
   // Header first, then as much as it tells.
   bool ReadPacket(std::span<const uint8_t>& packet) {
     const auto header = std::span(packet_).first(kHeaderSize);
-    if (port_.Read(header) != header.size()) return false;
+    if (!ReadWhole(header, "the next request of the boot loader")) return false;
     const size_t length = Field(header, kLengthAt);
-    if (length < kHeaderSize || length > packet_.size()) {
-      LogLength(Field(header, kLengthAt));
-      return false;
-    }
-    const auto rest = std::span(packet_).subspan(kHeaderSize, length - kHeaderSize);
+    if (length < kHeaderSize || length > packet_.size()) return RefuseLength(Field(header, kLengthAt));
     packet = std::span(packet_).first(length);
-    return port_.Read(rest) == rest.size();
+    return ReadWhole(std::span(packet_).subspan(kHeaderSize, length - kHeaderSize), "a request of the boot loader");
+  }
+
+  bool ReadWhole(std::span<uint8_t> bytes, const char* what) {
+    const size_t count = port_.Read(bytes);
+    return count == bytes.size() || kral::Fail(port_.NotRead(what, count, bytes.size()));
   }
 
   // The next bytes of the file, whatever offset the target names: it asks for consecutive pieces, and those that do
@@ -83,7 +98,8 @@ class Server {
     const size_t length = Field(request, kReadLengthAt);
     if (request.size() < kReadDataSize || length > piece_.size()) {
       phone_.log().WriteLine(kLogErr, "Kivrat: a request for %u bytes", Field(request, kReadLengthAt));
-      return false;
+      return kral::Fail(Failure(KRAL_ERROR_LINK, "the boot loader asks for %u bytes at once in %zu bytes",
+                                Field(request, kReadLengthAt), request.size()));
     }
     if (length == 0) return ServeNothing();
     requests_for_nothing_ = 0;
@@ -93,10 +109,14 @@ class Server {
       phone_.log().WriteLine(kLogErr, "Kivrat: the file has no more than %llu bytes, %u are asked for at %u",
                              static_cast<unsigned long long>(served_), Field(request, kReadLengthAt),
                              Field(request, kReadOffsetAt));
-      return false;
+      const auto served = static_cast<unsigned long long>(served_);
+      Failure failure(KRAL_ERROR_BAD_FILE, "the flash programmer ends after %llu bytes, and the boot loader wants more",
+                      served);
+      return kral::Fail(failure.System(error).Offset(served_));
     }
     if (!port_.Write(std::span(piece_).first(count))) {
-      return Fail("Failed to send the command from the host to the device \r \n");
+      return Fail("Failed to send the command from the host to the device \r \n",
+                  port_.NotWritten("a piece of the flash programmer").Offset(served_));
     }
     served_ += count;
     return GoesOn();
@@ -105,38 +125,34 @@ class Server {
   bool ServeNothing() {
     if (++requests_for_nothing_ < kMostRequestsForNothing) return GoesOn();
     phone_.log().WriteLine(kLogErr, "Kivrat: a request for 0 bytes, and %u before it", requests_for_nothing_ - 1);
-    return false;
+    return kral::Fail(
+        Failure(KRAL_ERROR_LINK, "the boot loader asks for nothing, %u times in a row", requests_for_nothing_));
   }
 
-  bool GoesOn() {
-    if (!progress_ || progress_(served_, std::max(served_, file_.size()))) return true;
-    return Fail(kAborted);
-  }
+  bool GoesOn() { return !progress_ || progress_(served_, std::max(served_, file_.size())) || Abort(); }
 
   bool Finish() {
     if (const uint32_t delay = phone_.kivrat().pre_done_delay_ms) {
       phone_.log().WriteLine(kLogRet, "Waiting %d ms before Kivrat Done", static_cast<int>(delay));
       port_.Pause(delay);
-      if (port_.stopped()) return Fail(kAborted);
+      if (port_.stopped()) return Abort();
     }
     if (!WritePacket(port_, kDone)) {
       phone_.log().WriteLine(kLogErr, "Failed to send the KIVRAT_DONE_REQ (command -> %d) as expected \r\n",
                              static_cast<int>(kDone));
-      return false;
+      return kral::Fail(port_.NotWritten("the end of the transfer"));
     }
     const auto response = std::span(packet_).first(kDoneResponseSize);
-    if (port_.Read(response) != response.size()) {
-      return Fail("Failed to recieve the KIVRAT_DONE_RSP as expected \r\n");
+    if (!ReadWhole(response, "the answer to the end of the transfer")) {
+      phone_.log().WriteLine(kLogErr, "%s", "Failed to recieve the KIVRAT_DONE_RSP as expected \r\n");
+      return false;
     }
     if (Field(response, kCommandAt) != kDoneResponse) {
       phone_.log().WriteLine(kLogErr, "Recieved %d instead of KIVRAT_DONE_RSP (command -> %d) \r\n",
                              static_cast<int>(Field(response, kCommandAt)), static_cast<int>(kDoneResponse));
-      return false;
+      return kral::Fail(OtherPacket(response, "an answer to the end of the transfer"));
     }
-    if (!IsPacket(response, kDoneResponse)) {
-      LogLength(Field(response, kLengthAt));
-      return false;
-    }
+    if (!IsPacket(response, kDoneResponse)) return RefuseLength(Field(response, kLengthAt));
     phone_.log().WriteLine(kLogRet, "Kivrat: image transfer status %u", Field(response, kDoneStatusAt));
     phone_.log().WriteLine(kLogRet, "Flash programmer successfully downloaded using Kivrat Protocol!\n");
     phone_.clock().SleepMs(phone_.kivrat().settle_ms);

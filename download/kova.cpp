@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "download/kova_format.h"
+#include "frame/base/failure.h"
 
 namespace kral::kova {
 namespace {
@@ -51,7 +52,9 @@ bool SoftwareVersion(DownloadConnection& connection, uint8_t& version) {
   const uint8_t request = kSoftwareVersion;
   std::vector<uint8_t> reply;
   const auto status = connection.Exchange({&request, 1}, kSoftwareVersionReply, connection.time_out_ms(), reply);
-  if (status != DownloadConnection::kDone || reply.size() < 2) return false;
+  if (status != DownloadConnection::kDone) return false;
+  if (reply.size() < 2)
+    return Fail(Failure(KRAL_ERROR_LINK, "the loader's answer holds no version").Command({&request, 1}));
   version = reply[1];
   return true;
 }

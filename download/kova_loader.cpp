@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <vector>
 
+#include "download/download_failure.h"
 #include "download/image_file.h"
 #include "download/kova.h"
 #include "download/kova_format.h"
@@ -21,11 +22,11 @@ bool SendImage(DownloadConnection& connection, PhoneImage& image, uint32_t chunk
   for (uint32_t sent = 0; sent < size && !connection.aborted();) {
     connection.Report(sent, size);
     const uint32_t count = std::min(chunk_size, size - sent);
-    if (count == 0) return false;  // packets too small to carry anything
+    if (count == 0) return Fail(Failure(KRAL_ERROR_ARGUMENT, "packets of that size carry no data"));
     try {
       image.Read(start + sent, chunk.data(), count, 0);
     } catch (const PhoneImageException&) {
-      return false;
+      return Fail(Failure(KRAL_ERROR_BAD_FILE, "the flash programmer has nothing at its start address 0x%08X", start));
     }
     if (!Write32(connection, start + sent, std::span(chunk).first(count))) return false;
     sent += count;
@@ -45,15 +46,22 @@ uint32_t LoadFlashProgrammer(DownloadConnection& connection, const std::string& 
   HexPhoneImageDecoder decoder(true, true, true);
   PhoneImageDPaged image(kMaximumKib, &decoder);
   TextFile text;
-  if (!text.OpenForReading(file)) return KRAL_KOVA_FILE_NOT_OPENED;
-  if (!decoder.Decode(image, text)) return KRAL_KOVA_FILE_NOT_DECODED;
+  if (!text.OpenForReading(file)) {
+    Fail(download::NotOpened(file));
+    return KRAL_KOVA_FILE_NOT_OPENED;
+  }
+  if (!decoder.Decode(image, text)) {
+    Fail(NotDecoded(file, decoder.fault()));
+    return KRAL_KOVA_FILE_NOT_DECODED;
+  }
   if (decoder.loss().bytes != 0) {
+    Fail(DataLost(file, decoder.loss()));
     LogLoss(log, file, decoder.loss());
     return KRAL_KOVA_DATA_LOST;
   }
 
   const bool sent = SendImage(connection, image, ChunkSize(maximum_packet));
-  if (connection.aborted()) return KRAL_DOWNLOAD_ABORTED;
+  if (connection.aborted()) return download::Aborted();
   if (!sent) {
     log.WriteLine(kLogErr, "image load failed");
     return KRAL_KOVA_WRITE_FAILED;

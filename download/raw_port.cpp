@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "frame/base/hex_dump.h"
+#include "frame/request_failure.h"
 
 namespace kral {
 namespace {
@@ -78,6 +79,25 @@ size_t RawPort::Read(std::span<uint8_t> buffer, size_t enough) {
 
 void RawPort::Purge() {
   if (port_ != nullptr) port_->FlushPCBuffer();
+}
+
+Failure RawPort::NotOpened() const {
+  if (phone_.server_mode()) return Failure(KRAL_ERROR_ARGUMENT, "a boot transfer needs direct mode");
+  return PortFailure(phone_);
+}
+
+Failure RawPort::NotRead(const char* what, size_t count, size_t size) const {
+  if (stopped()) return Failure(KRAL_ERROR_ABORTED, "the boot transfer was aborted while %s was awaited", what);
+  if (gone())
+    return Failure(KRAL_ERROR_LOST, "the device on COM%d went away while %s was awaited", phone_.port(), what);
+  if (count == 0) return Failure(KRAL_ERROR_NO_ANSWER, "%s did not come within %u ms", what, read_time_out_ms_);
+  return Failure(KRAL_ERROR_LINK, "of %s came %zu of %zu bytes", what, count, size);
+}
+
+Failure RawPort::NotWritten(const char* what) const {
+  if (gone())
+    return Failure(KRAL_ERROR_LOST, "the device on COM%d went away while %s was written", phone_.port(), what);
+  return Failure(KRAL_ERROR_LINK, "%s could not be written to COM%d", what, phone_.port());
 }
 
 void RawPort::Pause(uint32_t milliseconds) {

@@ -7,6 +7,7 @@
 #include <functional>
 #include <span>
 
+#include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 
 namespace kral {
@@ -39,6 +40,12 @@ class RawPort {
   // The same, but for a line that falls quiet once it has said enough.
   size_t Read(std::span<uint8_t> buffer, size_t enough);
   void Purge();  // forgets what was received
+
+  // Why Open was refused, a Read of `what` gave fewer bytes, a Write of it was not done.
+  Failure NotOpened() const;
+  Failure NotRead(const char* what, size_t count, size_t size) const;
+  Failure NotWritten(const char* what) const;
+
   void Pause(uint32_t milliseconds);
 
  private:

@@ -31,7 +31,8 @@ const char* TextOf(WriteReply result) {
 void CReplyRcvrCont::OnFrame(std::span<const uint8_t> frame) {
   if (!response_.Accepts(frame)) return;
   if (frame.size() < kShortestFrame) log_.WriteLine(kLogErr, "yes: size too small\n");
-  const WriteReply result = parser_.ParseReply(frame.first(frame.size() - std::min(frame.size(), kFcsBytes)));
+  const auto payload = frame.first(frame.size() - std::min(frame.size(), kFcsBytes));
+  const WriteReply result = parser_.ParseReply(payload);
   switch (result) {
     case WriteReply::kAcknowledged:
       return;
@@ -41,7 +42,7 @@ void CReplyRcvrCont::OnFrame(std::span<const uint8_t> frame) {
       return;
     default:
       log_.WriteLine(kLogErr, "%s", TextOf(result));
-      agent_.Fail();
+      agent_.Fail(DownloadAgent::OtherReply{payload.size(), payload.empty() ? uint8_t{0} : payload[0]});
   }
 }
 

@@ -5,6 +5,7 @@
 #include <array>
 #include <vector>
 
+#include "download/download_failure.h"
 #include "download/stream_format.h"
 #include "frame/base/little_endian.h"
 
@@ -29,12 +30,18 @@ std::array<uint8_t, kRequestSize> HelloRequest() {
 }
 
 std::optional<HelloReply> ExchangeHello(DownloadConnection& connection, uint32_t variant, uint32_t time_out_ms) {
-  if (variant != kHelloVariant) return std::nullopt;
+  if (variant != kHelloVariant) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "no hello exchange of variant %u is known", variant));
+    return std::nullopt;
+  }
   std::vector<uint8_t> reply;
   if (connection.Exchange(HelloRequest(), kHelloReply, time_out_ms, reply) != DownloadConnection::kDone) {
     return std::nullopt;
   }
-  return ParseHelloReply(std::span(reply).first(std::min(reply.size(), kReplyRoom)));
+  const auto answer = ParseHelloReply(std::span(reply).first(std::min(reply.size(), kReplyRoom)));
+  if (!answer)
+    Fail(Failure(KRAL_ERROR_LINK, "an answer of %zu bytes to the hello is no flash programmer's", reply.size()));
+  return answer;
 }
 
 }  // namespace
@@ -67,6 +74,7 @@ std::optional<HelloReply> Hello(DownloadConnection& connection, const DownloadSe
   const HelloReply limits = answer.value_or(HelloReply{});
   log.WriteLine(answer ? kLogRet : kLogErr, "HELLO command %s, block size %u, window size %u",
                 answer ? "succeeded" : "failed", limits.block_size, static_cast<unsigned>(limits.window));
+  if (!answer && connection.aborted()) download::Aborted();
   return answer;
 }
 

@@ -2,6 +2,7 @@
 #include "download/write_image.h"
 
 #include "download/block_writer.h"
+#include "download/download_failure.h"
 
 namespace kral {
 namespace {
@@ -105,6 +106,21 @@ bool CWriteImage::WriteLoop(PhoneImage& image, const WriteLimits& limits, CImage
 
 WriteOutcome CWriteImage::Failed(WriteOutcome outcome, const char* text) {
   connection_.log().WriteLine(kLogErr, "%s", text);
+  switch (outcome) {
+    case WriteOutcome::kAborted:
+      download::Aborted();
+      break;
+    case WriteOutcome::kNotCompleted:
+      Fail(Failure(KRAL_ERROR_LOST, "the last block was not acknowledged within %u ms", time_out_ms_));
+      break;
+    case WriteOutcome::kNoThread:
+    case WriteOutcome::kThreadNotStarted:
+    case WriteOutcome::kThreadNotStopped:
+      Fail(Failure(KRAL_ERROR_INTERNAL, "the response thread does not obey: %s", text));
+      break;
+    default:  // noted by the opener and the writer
+      break;
+  }
   return outcome;
 }
 
