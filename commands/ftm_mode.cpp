@@ -137,7 +137,7 @@ bool ChangeBootMode(Diag_FTM& phone, uint8_t ftm, uint8_t reset) {
   if (!diag::ControlMode(phone, diag::kModeOfflineDigital)) return false;
   u16 status = 0;
   const std::array<u8, 1> flag{ftm};
-  const bool written = nv::Write(phone, kBootFlagItem, flag, status);
+  const bool written{nv::Write(phone, kBootFlagItem, flag, status)};
   if (written && status != nv::kDone) {
     phone.log().WriteLine(kLogErr, "KRAL_ChangeFTM_BootMode() - Failed to write NV FTM mode");
     return Fail(nv::Refusal(kBootFlagItem, status));

@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "commands/checked_reply.h"
 #include "commands/nv_format.h"
 #include "frame/base/little_endian.h"
 #include "frame/request_failure.h"
@@ -24,8 +25,7 @@ class BatchModeEnd {
 };
 
 // Moves as many items as a packet takes from the queue into its payload.
-u16 FillPayload(Diag_FTM& phone, std::vector<u8>& payload) {
-  auto& queue = phone.nv_batch().queue;
+u16 FillPayload(Diag_FTM& phone, std::deque<NvQueueItem>& queue, std::vector<u8>& payload) {
   u16 count = 0;
   while (!queue.empty()) {
     const auto& [item, data] = queue.front();
@@ -42,16 +42,16 @@ u16 FillPayload(Diag_FTM& phone, std::vector<u8>& payload) {
   return count;
 }
 
-u8 Judged(Diag_FTM& phone, u16 item, u8 status) {
-  const auto& read_only = phone.nv_batch().read_only;
+u8 Judged(Diag_FTM& phone, std::span<const u16> read_only, u16 item, u8 status) {
   if (status != kReadOnly || std::find(read_only.begin(), read_only.end(), item) == read_only.end()) return status;
   phone.log().WriteLine(kLogRet, "     Found item in the read-only list so no failure: iNvId = %d ", item);
   return kDone;
 }
 
-// Reads the item results up to the first failing one. A reply that holds fewer than it tells counts as a failure, as
-// does one that tells of more or fewer items than were sent.
-bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchObserver& observer) {
+// Reads the item results up to the first failing one. A reply that holds fewer than it tells cannot be used, nor can
+// one that tells of more or fewer items than were sent.
+bool TakeResults(Diag_FTM& phone, u16 sent, std::span<const u16> read_only, BatchOutcome& outcome,
+                 const BatchObserver& observer) {
   const auto reply = phone.packet().response();
   const auto count = LoadLe<u16>(reply, batch::kResultCount);
   const auto total_status = LoadLe<u16>(reply, batch::kTotalStatus);
@@ -67,12 +67,13 @@ bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchOb
       return Fail(BadReply(phone, "ends within an item result"));
     }
     outcome.last_item = *LoadLe<u16>(rest, batch::kResultItem);
-    outcome.last_item_status = Judged(phone, outcome.last_item, rest[batch::kResultStatus]);
+    outcome.last_item_status = Judged(phone, read_only, outcome.last_item, rest[batch::kResultStatus]);
     if (observer) observer(outcome.last_item, outcome.last_item_status);
     if (outcome.last_item_status != kDone) {
       phone.log().WriteLine(kLogErr, "     Error Detected: iLastErrorNvId = %d, iLastItemStatus = %d )",
                             outcome.last_item, outcome.last_item_status);
-      return Fail(Refusal(outcome.last_item, outcome.last_item_status));
+      Fail(Refusal(outcome.last_item, outcome.last_item_status));
+      return true;
     }
     ++outcome.items_written;
     rest = rest.subspan(batch::kItemHeader + rest[0]);
@@ -82,16 +83,17 @@ bool TakeResults(Diag_FTM& phone, u16 sent, BatchOutcome& outcome, const BatchOb
   return Fail(BadReply(phone, "has results for another number of items"));
 }
 
-bool SendPacket(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
+Reply SendPacket(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const u16> read_only, BatchOutcome& outcome,
+                 const BatchObserver& observer) {
   std::vector<u8> payload;
   payload.reserve(batch::kPayloadLimit);
-  const u16 count = FillPayload(phone, payload);
-  if (!Send(phone, kWriteBatch, count, static_cast<u16>(payload.size()), u16{0}, Bytes(payload))) {
+  const u16 count = FillPayload(phone, list, payload);
+  const Reply reply = Send(phone, kWriteBatch, count, static_cast<u16>(payload.size()), u16{0}, Bytes(payload));
+  if (!reply) {
     phone.log().WriteLine(kLogErr,
                           "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Error occurred during send sync operation.");
-    return false;
   }
-  return TakeResults(phone, count, outcome, observer);
+  return Checked(reply, [&] { return TakeResults(phone, count, read_only, outcome, observer); });
 }
 
 }  // namespace
@@ -117,17 +119,25 @@ void SetReadOnlyList(Diag_FTM& phone, std::span<const uint16_t> items) {
   }
 }
 
-bool FlushBatchQueue(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
+Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const uint16_t> read_only,
+                 BatchOutcome& outcome, const BatchObserver& observer) {
   outcome = {};
+  Reply reply(ReplyKind::kExpected);  // of nothing to send, too
+  while (reply && outcome.last_item_status == kDone && !list.empty()) {
+    reply = SendPacket(phone, list, read_only, outcome, observer);
+  }
+  return reply;
+}
+
+bool FlushBatchQueue(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
   const BatchModeEnd end(phone);
-  const auto& queue = phone.nv_batch().queue;
+  NvBatch& callers = phone.nv_batch();
   phone.log().WriteLine(kLogRet, "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Queue size = %d",
-                        static_cast<int>(queue.size()));
-  bool written = true;
-  while (written && !queue.empty()) written = SendPacket(phone, outcome, observer);
+                        static_cast<int>(callers.queue.size()));
+  const Reply reply = WriteBatch(phone, callers.queue, callers.read_only, outcome, observer);
   phone.log().WriteLine(kLogRet, "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Number Items Written = %d",
                         static_cast<int>(outcome.items_written));
-  return written;
+  return reply && outcome.last_item_status == kDone;
 }
 
 }  // namespace kral::nv

@@ -3,6 +3,7 @@
 #define KRAL_COMMANDS_NV_BATCH_H
 
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <span>
 
@@ -25,6 +26,12 @@ struct BatchOutcome {
 
 // Each item result as it is read; status 0 also for an item of the read-only list that was refused as such.
 using BatchObserver = std::function<void(uint16_t item, uint8_t status)>;
+
+// Sends a list of items, which it empties packet by packet. The reply is the expected one when all packets were
+// answered in full, up to the first failing item: the outcome has its status. An item of `read_only` does not fail by
+// being refused as such.
+Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const uint16_t> read_only,
+                 BatchOutcome& outcome, const BatchObserver& observer = {});
 
 // Sends what is queued and leaves batch mode, whatever happens. True when every item was answered and none failed;
 // the first failing item ends the flush behind its packet, and what is still queued is dropped.

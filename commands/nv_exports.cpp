@@ -23,7 +23,8 @@ bool IsMissing(Diag_FTM& phone, const char* name, const void* data, uint32_t cou
 }
 
 // Data and status of a read; a null status goes out as 0.
-using ItemRead = bool (*)(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status);
+using ItemRead = kral::Reply (*)(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data,
+                                 uint16_t& status);
 
 bool Read(Diag_FTM& phone, const char* name, ItemRead read, uint16_t item, uint16_t context, uint8_t* data,
           uint16_t length, uint16_t* status) {

@@ -5,6 +5,7 @@
 #include <array>
 #include <optional>
 
+#include "commands/checked_reply.h"
 #include "commands/nv_format.h"
 #include "frame/base/little_endian.h"
 #include "frame/request_failure.h"
@@ -66,31 +67,34 @@ bool TakeStatus(Diag_FTM& phone, uint16_t& status) {
 
 }  // namespace
 
-bool Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status) {
-  return Send(phone, kReadItem, item, Bytes(data), status) && AnswersInFull(phone) &&
-         TakeRead(phone, kItemData, data, status);
+Reply Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status) {
+  const Reply reply = Send(phone, kReadItem, item, Bytes(data), status);
+  return Checked(reply, [&] { return AnswersInFull(phone) && TakeRead(phone, kItemData, data, status); });
 }
 
-bool ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status) {
-  return Send(phone, kReadExtended, item, context, Bytes(data), status) && AnswersInFull(phone) &&
-         TakeRead(phone, kExtendedData, data, status);
+Reply ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status) {
+  const Reply reply = Send(phone, kReadExtended, item, context, Bytes(data), status);
+  return Checked(reply, [&] { return AnswersInFull(phone) && TakeRead(phone, kExtendedData, data, status); });
 }
 
-bool ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status) {
-  return Send(phone, kReadElement, item, index) && TakeRead(phone, kElementData, data, status);
+Reply ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status) {
+  const Reply reply = Send(phone, kReadElement, item, index);
+  return Checked(reply, [&] { return TakeRead(phone, kElementData, data, status); });
 }
 
-bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
+Reply Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status) {
   const DataBlock block = Filled(data);
-  return Send(phone, kWriteItem, item, Block<kDataSize>(block)) && TakeStatus(phone, status);
+  const Reply reply = Send(phone, kWriteItem, item, Block<kDataSize>(block));
+  return Checked(reply, [&] { return TakeStatus(phone, status); });
 }
 
-bool WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status) {
+Reply WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status) {
   const DataBlock block = Filled(data);
-  return Send(phone, kWriteExtended, item, context, Block<kDataSize>(block), status) && TakeStatus(phone, status);
+  const Reply reply = Send(phone, kWriteExtended, item, context, Block<kDataSize>(block), status);
+  return Checked(reply, [&] { return TakeStatus(phone, status); });
 }
 
-bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status) {
+Reply WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status) {
   DataBlock block{index};
   std::copy_n(data.begin(), std::min(data.size(), block.size() - 1), block.begin() + 1);
   return Write(phone, item, block, status);

@@ -1,5 +1,5 @@
-// NV items: the handset's numbered non-volatile settings, up to 128 bytes each. Every function is one request. They
-// give true when the handset answered, and hand out its status, which the caller has to look at.
+// NV items: the handset's numbered non-volatile settings, up to 128 bytes each. Every function is one request. The
+// reply is the expected one when the handset told a status, which the caller has to look at.
 #ifndef KRAL_COMMANDS_NV_ITEM_H
 #define KRAL_COMMANDS_NV_ITEM_H
 
@@ -9,6 +9,7 @@
 
 #include "frame/base/failure.h"
 #include "kral/nv.h"
+#include "transport/reply.h"
 
 namespace kral {
 
@@ -25,19 +26,19 @@ inline constexpr uint16_t kReadOnly = KRAL_NV_STATUS_READ_ONLY;
 inline constexpr uint16_t kEsnItem = 0;
 inline constexpr size_t kDataSize = 128;
 
-// Reads one item into `data`, whose present bytes, and the status, go out with the request. False when no reply
-// came or one shorter than the request. True with a non-zero status leaves the data untouched.
-bool Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status);
-bool ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status);
+// Reads one item into `data`, whose present bytes, and the status, go out with the request. A reply shorter than the
+// request cannot be used. A non-zero status leaves the data untouched.
+Reply Read(Diag_FTM& phone, uint16_t item, std::span<uint8_t> data, uint16_t& status);
+Reply ReadExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<uint8_t> data, uint16_t& status);
 
 // Reads one element of an array item; the status goes out only.
-bool ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status);
+Reply ReadElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<uint8_t> data, uint16_t& status);
 
-// Writes one item: always 128 data bytes, the given ones zero-filled or cut. True whenever a reply with a status came.
-bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status);
-bool WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status);
+// Writes one item: always 128 data bytes, the given ones zero-filled or cut.
+Reply Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16_t& status);
+Reply WriteExtended(Diag_FTM& phone, uint16_t item, uint16_t context, std::span<const uint8_t> data, uint16_t& status);
 // The element's index stands in front of its data, which are cut at 127 bytes.
-bool WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status);
+Reply WriteElement(Diag_FTM& phone, uint16_t item, uint8_t index, std::span<const uint8_t> data, uint16_t& status);
 
 // What to note where a status is a failure.
 Failure Refusal(uint16_t item, uint16_t status);

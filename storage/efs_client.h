@@ -7,6 +7,7 @@
 
 #include "frame/diag_ftm.h"
 #include "kral/efs.h"
+#include "transport/reply.h"
 
 namespace kral::efs {
 
@@ -32,8 +33,6 @@ bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file
 bool WriteFromMemory(Diag_FTM& phone, const uint8_t* buffer, uint32_t size, const char* efs_file);
 bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool ReadToMemory(Diag_FTM& phone, const char* efs_file, uint8_t* buffer, uint32_t* size);
-// As a plain file whatever it is, of `size` bytes at least and at most, for who has asked for its status already.
-bool ReadOpenedToMemory(Diag_FTM& phone, const char* efs_file, uint8_t* buffer, uint32_t* size);
 
 // --- Item files (efs_item.cpp) ---------------------------------------------------------------------------------------
 bool PutItemFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
@@ -42,8 +41,8 @@ bool GetItemToFile(Diag_FTM& phone, const char* local_file, const char* efs_file
 
 // --- Directories (efs_directory.cpp, efs_names.cpp) ------------------------------------------------------------------
 bool ListDirectory(Diag_FTM& phone, const char* folder, uint8_t filter, KRAL_EFS_ENTRY* entries, uint32_t* count);
-bool MakeDirectory(Diag_FTM& phone, const char* folder, uint32_t* error_number);
-bool RemoveDirectory(Diag_FTM& phone, const char* folder, uint32_t* error_number);
+bool MakeDirectoryOnce(Diag_FTM& phone, const char* folder, uint32_t* error_number);  // also when it is there
+Reply RemoveDirectory(Diag_FTM& phone, const char* folder, uint32_t* error_number);
 
 // --- Names and files, one request each (efs_names.cpp) ---------------------------------------------------------------
 struct FileStatus {
@@ -58,8 +57,6 @@ struct FileStatus {
   bool exists() const { return error_number == 0; }
   bool is_item_file() const;
 };
-// Every field is written when the handset answers; those behind the errno count only when it is 0.
-bool Stat(Diag_FTM& phone, const char* path, FileStatus& status);
 struct StatOutputs {
   uint32_t* error_number;
   uint32_t* mode;
@@ -70,12 +67,12 @@ struct StatOutputs {
   uint32_t* change_time;
 };
 bool StatInto(Diag_FTM& phone, const char* path, const StatOutputs& outputs);
-bool Unlink(Diag_FTM& phone, const char* path, uint32_t* error_number);
-bool CreateLink(Diag_FTM& phone, const char* target, const char* link, uint32_t* error_number);
+Reply Unlink(Diag_FTM& phone, const char* path, uint32_t* error_number);
+Reply CreateLink(Diag_FTM& phone, const char* target, const char* link, uint32_t* error_number);
 bool ReadLink(Diag_FTM& phone, const char* link, uint32_t* error_number, char* target, uint32_t size);
-bool Rename(Diag_FTM& phone, const char* old_path, const char* new_path, uint32_t* error_number);
-bool ChangeMode(Diag_FTM& phone, const char* path, uint16_t mode, uint32_t* error_number);
-bool Access(Diag_FTM& phone, const char* path, uint16_t permission_bits, uint32_t* error_number);
+Reply Rename(Diag_FTM& phone, const char* old_path, const char* new_path, uint32_t* error_number);
+Reply ChangeMode(Diag_FTM& phone, const char* path, uint16_t mode, uint32_t* error_number);
+Reply Access(Diag_FTM& phone, const char* path, uint16_t permission_bits, uint32_t* error_number);
 
 // --- The file system (efs_file_system.cpp, efs_sync.cpp) -------------------------------------------------------------
 bool FileSystemStatus(Diag_FTM& phone, const char* path, uint32_t* error_number, KRAL_EFS_STATFS* status);

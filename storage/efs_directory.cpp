@@ -2,10 +2,10 @@
 #include <cstring>
 
 #include "commands/outputs.h"
-#include "frame/base/guarded_call.h"
 #include "storage/efs_client.h"
 #include "storage/efs_handle.h"
 #include "storage/efs_request.h"
+#include "storage/efs_transfer.h"
 
 namespace kral::efs {
 namespace {
@@ -36,15 +36,16 @@ bool IsSelected(u32 type, uint8_t filter) {
 }
 
 // Nothing (logged) when the reply tells an error, or has a name without end.
-std::optional<Entry> ParseEntry(Diag_FTM& phone, std::span<const u8> reply) {
+std::optional<Entry> ParseEntry(Diag_FTM& phone, const char* folder, std::span<const u8> reply) {
   auto name = TextAt(reply, entry::kName);
-  if (const u32 error = LoadLe<u32>(reply, entry::kError).value_or(kDone); error != kDone) {
+  if (const u32 error = LoadLe<u32>(reply, entry::kError).value_or(kDone); !IsDone(error, folder)) {
     phone.log().WriteLine(kLogErr, "EFS Readdir error code %u", error);
     return std::nullopt;
   }
   if (!name) {
     phone.log().WriteLine(kLogErr, "EFS Readdir reply of %u bytes has no name with an end",
                           static_cast<u32>(reply.size()));
+    Fail(BadReply(phone, "has no name with an end"));
     return std::nullopt;
   }
   const auto field = [&](size_t offset) { return *LoadLe<u32>(reply, offset); };
@@ -58,14 +59,14 @@ std::optional<Entry> ParseEntry(Diag_FTM& phone, std::span<const u8> reply) {
   return result;
 }
 
-std::optional<Entry> ReadEntry(Diag_FTM& phone, u32 directory, u32 sequence) {
+std::optional<Entry> ReadEntry(Diag_FTM& phone, const char* folder, u32 directory, u32 sequence) {
   Compose(phone, kReadDirectory, directory, sequence);
   std::optional<Entry> read;
   const auto is_own = [&](std::span<const u8> reply) {
     return LoadLe<u32>(reply, kHandleAt) == directory && LoadLe<u32>(reply, entry::kSequence) == sequence;
   };
   ExchangeUntil(phone, PacketTimeOut(phone), is_own, [&](std::span<const u8> reply) {
-    read = ParseEntry(phone, reply);
+    read = ParseEntry(phone, folder, reply);
     return read.has_value();
   });
   return read;
@@ -80,45 +81,56 @@ bool SetFullName(KRAL_EFS_ENTRY& record, const std::string& folder, const std::s
   return true;
 }
 
-bool List(Diag_FTM& phone, const std::string& folder, uint8_t filter, KRAL_EFS_ENTRY* entries, u32* count) {
+// False (logged) when its name does not fit.
+bool Complete(Diag_FTM& phone, const std::string& folder, Entry& entry) {
+  if (SetFullName(entry.record, folder, entry.name)) return true;
+  const auto size = static_cast<u32>(entry.name.size());
+  phone.log().WriteLine(kLogErr, "EFS Readdir name of %u bytes does not fit behind its directory", size);
+  return Fail(
+      Failure(KRAL_ERROR_LINK, "an entry of %s has a name of %u bytes, which fits nowhere", folder.c_str(), size));
+}
+
+}  // namespace
+
+bool ListEntries(Diag_FTM& phone, const std::string& folder, uint8_t filter, const EntrySink& sink) {
+  ForgetAbort(phone);
   RemoteDirectory directory(phone);
   if (!directory.Open(folder.c_str())) return false;
-  const u32 room = entries == nullptr || count == nullptr ? 0 : *count;
-  u32 selected = 0;
   for (u32 sequence = kFirstEntry;; ++sequence) {
-    if (IsAborted(phone, "Readdir") || sequence > kMostEntries) return false;
-    auto read = ReadEntry(phone, directory.value(), sequence);
+    if (IsAborted(phone, "Readdir")) return false;
+    if (sequence > kMostEntries) {
+      return Fail(Failure(KRAL_ERROR_LINK, "the listing of %s has no end", folder.c_str()));
+    }
+    auto read = ReadEntry(phone, folder.c_str(), directory.value(), sequence);
     if (!read) {
       IsAborted(phone, "Readdir");
       return false;
     }
     if (read->name.empty()) break;
     if (!IsSelected(read->type, filter)) continue;
-    if (!SetFullName(read->record, folder, read->name)) {
-      phone.log().WriteLine(kLogErr, "EFS Readdir name of %u bytes does not fit behind its directory",
-                            static_cast<u32>(read->name.size()));
-      return false;
-    }
-    if (selected < room) entries[selected] = read->record;
-    ++selected;
-    if (const auto callback = phone.efs().directory_callback.load()) {
-      CallGuarded([&] { callback(&read->record, phone.efs().callback_context); });
-    }
+    if (!Complete(phone, folder, *read) || !sink(read->record)) return false;
   }
-  Put(count, selected);
   // The entries are there: a handle that cannot be closed is logged, and no reason to withhold them.
   directory.Close();
   return true;
 }
 
-}  // namespace
-
 bool ListDirectory(Diag_FTM& phone, const char* folder, uint8_t filter, KRAL_EFS_ENTRY* entries, u32* count) {
-  ForgetAbort(phone);
   const std::string path = folder == nullptr || *folder == '\0' ? "/" : folder;
-  if (List(phone, path, filter, entries, count)) return true;
-  phone.log().WriteLine(kLogErr, "KRAL_EfsDirectory( sFolderPath = %s ) - Failed", path.c_str());
-  return false;
+  const u32 room = entries == nullptr || count == nullptr ? 0 : *count;
+  u32 selected = 0;
+  const auto take = [&](const KRAL_EFS_ENTRY& entry) {
+    if (selected < room) entries[selected] = entry;
+    ++selected;
+    TellCaller(phone, entry);
+    return true;
+  };
+  if (!ListEntries(phone, path, filter, take)) {
+    phone.log().WriteLine(kLogErr, "KRAL_EfsDirectory( sFolderPath = %s ) - Failed", path.c_str());
+    return false;
+  }
+  Put(count, selected);
+  return true;
 }
 
 }  // namespace kral::efs

@@ -66,7 +66,7 @@ uint8_t KRAL_CALL KRAL_EfsDirectory(KRAL_HANDLE handle, const char* folder, uint
 }
 
 uint8_t KRAL_CALL KRAL_EfsMkDir(KRAL_HANDLE handle, const char* folder, uint32_t* error_number) {
-  return ExportCall(handle, __func__).Run(efs::MakeDirectory, folder, error_number);
+  return ExportCall(handle, __func__).Run(efs::MakeDirectoryOnce, folder, error_number);
 }
 
 uint8_t KRAL_CALL KRAL_EfsRmDir(KRAL_HANDLE handle, const char* folder, uint32_t* error_number) {

@@ -1,7 +1,6 @@
 // Opens and closes files and directories of the handset, also where answers get lost or come late.
 #include "storage/efs_handle.h"
 
-#include "frame/base/failure.h"
 #include "frame/base/text_argument.h"
 #include "platform/forced_unwind.h"
 #include "storage/efs_request.h"
@@ -12,6 +11,7 @@ namespace kral::efs {
 // The closing is logged, and so may come to a function in which the host ends the thread.
 RemoteHandle::~RemoteHandle() noexcept(false) {
   try {
+    const KeepFailure keep;
     Close();
   } catch (...) {
     PassForcedUnwind();
@@ -19,15 +19,17 @@ RemoteHandle::~RemoteHandle() noexcept(false) {
   }
 }
 
-bool RemoteHandle::OpenWithRequest() {
+bool RemoteHandle::OpenWithRequest(const char* path) {
   if (!IsWithinLimit(phone_)) return false;
   u32 unanswered = 0;
   for (int attempt = 0; attempt < kTries && !open_; ++attempt) {
-    if (attempt > 0 && phone_.efs().abort) break;
-    const Reply reply = ExchangeOnce(phone_, time_out_ms_);
+    if (attempt > 0 && IsAborted(phone_, "request")) break;
     std::optional<Opened> opened;
-    if (reply) opened = ReadOpened(phone_.packet().response());
-    if (opened && opened->error == kDone) {
+    const Reply reply = Checked(ExchangeOnce(phone_, time_out_ms_), [&] {
+      opened = ReadOpened(phone_.packet().response());
+      return opened || Fail(BadReply(phone_, "is too short"));
+    });
+    if (opened && IsDone(opened->error, path)) {
       value_ = opened->value;
       handles_.in_use = value_;
       open_ = true;
@@ -50,7 +52,6 @@ bool RemoteHandle::Close() {
   if (!open_) return true;
   open_ = false;
   handles_.in_use.reset();
-  const KeepFailure keep;
   const bool closed = CloseHandle(phone_, close_, value_, time_out_ms_);
   CloseStrays(phone_);
   // As with strays.
@@ -58,7 +59,8 @@ bool RemoteHandle::Close() {
   return closed;
 }
 
-RemoteFile::RemoteFile(Diag_FTM& phone) : RemoteHandle(phone, kClose, phone.efs().files, DefaultTimeOut(phone)) {}
+RemoteFile::RemoteFile(Diag_FTM& phone, const char* path)
+    : RemoteHandle(phone, kClose, phone.efs().files, DefaultTimeOut(phone)), path_(TextOrEmpty(path)) {}
 
 bool RemoteFile::CanOpen(Diag_FTM& phone, const char* path) {
   Compose(phone, kOpen, kOpenToRead, kModeOfReading, PathField(path));
@@ -67,10 +69,10 @@ bool RemoteFile::CanOpen(Diag_FTM& phone, const char* path) {
   return false;
 }
 
-bool RemoteFile::Open(const char* path, u32 flags, u32 mode) {
-  Compose(phone_, kOpen, flags, mode, PathField(path));
-  if (OpenWithRequest()) return true;
-  phone_.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", TextOrEmpty(path));
+bool RemoteFile::Open(u32 flags, u32 mode) {
+  Compose(phone_, kOpen, flags, mode, PathField(path_));
+  if (OpenWithRequest(path_)) return true;
+  phone_.log().WriteLine(kLogErr, "EFS2FileOpen() failed to open file %s", path_);
   return false;
 }
 
@@ -79,7 +81,7 @@ RemoteDirectory::RemoteDirectory(Diag_FTM& phone)
 
 bool RemoteDirectory::Open(const char* path) {
   Compose(phone_, kOpenDirectory, PathField(path));
-  return OpenWithRequest();
+  return OpenWithRequest(path);
 }
 
 }  // namespace kral::efs

@@ -12,15 +12,15 @@ class RemoteHandle {
   RemoteHandle(const RemoteHandle&) = delete;
   RemoteHandle& operator=(const RemoteHandle&) = delete;
 
-  bool Close();  // true when the handset confirmed it, and when nothing is open
+  bool Close();  // true when the handset confirmed it, and when nothing is open; else it has been noted
   u32 value() const { return value_; }
 
  protected:
   RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, EfsOpenHandles& handles, u32 time_out_ms)
       : phone_(phone), close_(close), handles_(handles), time_out_ms_(time_out_ms) {}
 
-  // Sends the opening request that the phone's packet buffer holds.
-  bool OpenWithRequest();
+  // Sends the opening request of a path that the phone's packet buffer holds.
+  bool OpenWithRequest(const char* path);
 
   Diag_FTM& phone_;
 
@@ -34,10 +34,14 @@ class RemoteHandle {
 
 class RemoteFile final : public RemoteHandle {
  public:
-  explicit RemoteFile(Diag_FTM& phone);
+  RemoteFile(Diag_FTM& phone, const char* path);
   // Whether its path leaves the opening request short enough. A failure is logged; nothing is sent.
   static bool CanOpen(Diag_FTM& phone, const char* path);
-  bool Open(const char* path, u32 flags, u32 mode);  // a failure is logged
+  bool Open(u32 flags, u32 mode);  // a failure is logged
+  const char* path() const { return path_; }
+
+ private:
+  const char* const path_;
 };
 
 class RemoteDirectory final : public RemoteHandle {

@@ -12,16 +12,18 @@ namespace {
 
 // For requests that answer with an error number at the end and nothing else.
 template <class... Fields>
-bool AskForError(Diag_FTM& phone, u32* error_number, const EfsRequest<Fields...>& row,
-                 std::type_identity_t<Field<Fields>>... fields) {
+Reply AskForError(Diag_FTM& phone, u32* error_number, const EfsRequest<Fields...>& row,
+                  std::type_identity_t<Field<Fields>>... fields) {
   u32 error = 0;
-  if (!Ask(phone, row, fields...) || !ReadFromEnd(phone, {&error})) return false;
-  Put(error_number, error);
-  return true;
+  const Reply reply = Ask(phone, row, fields...);
+  return Checked(reply, [&] {
+    if (!ReadFromEnd(phone, {&error})) return false;
+    Put(error_number, error);
+    return true;
+  });
 }
 
-bool AskStat(Diag_FTM& phone, Tries tries, const char* path, FileStatus& status) {
-  if (!Ask(phone, tries, kStat, PathField(path))) return false;
+bool TakeStat(Diag_FTM& phone, const char* path, FileStatus& status) {
   FileStatus s;
   if (!ReadFromEnd(
           phone, {&s.change_time, &s.modify_time, &s.access_time, &s.link_count, &s.size, &s.mode, &s.error_number})) {
@@ -43,17 +45,14 @@ bool FileStatus::is_item_file() const {
   return exists() && (mode & kModeKind) == kItemFile;
 }
 
-bool Stat(Diag_FTM& phone, const char* path, FileStatus& status) {
-  return AskStat(phone, Tries::kOne, path, status);
-}
-
-bool StatInTransfer(Diag_FTM& phone, const char* path, FileStatus& status) {
-  return AskStat(phone, Tries::kTransfer, path, status);
+Reply Stat(Diag_FTM& phone, Tries tries, const char* path, FileStatus& status) {
+  const Reply reply = Ask(phone, tries, kStat, PathField(path));
+  return Checked(reply, [&] { return TakeStat(phone, path, status); });
 }
 
 bool StatInto(Diag_FTM& phone, const char* path, const StatOutputs& outputs) {
   FileStatus status;
-  if (!Stat(phone, path, status)) return false;
+  if (!Stat(phone, Tries::kOne, path, status)) return false;
   Put(outputs.error_number, status.error_number);
   if (!status.exists()) return true;
   Put(outputs.mode, status.mode);
@@ -65,38 +64,43 @@ bool StatInto(Diag_FTM& phone, const char* path, const StatOutputs& outputs) {
   return true;
 }
 
-bool Unlink(Diag_FTM& phone, const char* path, u32* error_number) {
+Reply Unlink(Diag_FTM& phone, const char* path, u32* error_number) {
   return AskForError(phone, error_number, kUnlink, PathField(path));
 }
 
-bool RemoveDirectory(Diag_FTM& phone, const char* folder, u32* error_number) {
+Reply RemoveDirectory(Diag_FTM& phone, const char* folder, u32* error_number) {
   return AskForError(phone, error_number, kRemoveDirectory, PathField(folder));
 }
 
-bool CreateLink(Diag_FTM& phone, const char* target, const char* link, u32* error_number) {
+Reply CreateLink(Diag_FTM& phone, const char* target, const char* link, u32* error_number) {
   return AskForError(phone, error_number, kSymbolicLink, PathField(target), PathField(link));
 }
 
-bool Rename(Diag_FTM& phone, const char* old_path, const char* new_path, u32* error_number) {
+Reply Rename(Diag_FTM& phone, const char* old_path, const char* new_path, u32* error_number) {
   return AskForError(phone, error_number, kRename, PathField(old_path), PathField(new_path));
 }
 
-bool ChangeMode(Diag_FTM& phone, const char* path, uint16_t mode, u32* error_number) {
+Reply ChangeMode(Diag_FTM& phone, const char* path, uint16_t mode, u32* error_number) {
   return AskForError(phone, error_number, kChangeMode, mode, PathField(path));
 }
 
-bool Access(Diag_FTM& phone, const char* path, uint16_t permission_bits, u32* error_number) {
+Reply Access(Diag_FTM& phone, const char* path, uint16_t permission_bits, u32* error_number) {
   return AskForError(phone, error_number, kAccess, permission_bits, PathField(path));
 }
 
 bool ReadLink(Diag_FTM& phone, const char* link, u32* error_number, char* target, u32 size) {
   u32 error = 0;
-  if (!Ask(phone, kReadLink, PathField(link)) || !phone.packet().ResponseAt32(kErrorBehindHeader, error)) return false;
+  if (!Ask(phone, kReadLink, PathField(link)) || !ReadAt(phone, kErrorBehindHeader, error)) return false;
   if (error == kDone) {
     const auto text = TextAt(phone.packet().response(), kLinkText);
-    if (!text || (target != nullptr && text->size() >= size)) {
-      phone.log().WriteLine(kLogErr, "KRAL_EfsReadLink() -- %s", text ? "no room for the target" : "target has no end");
-      return false;
+    if (!text) {
+      phone.log().WriteLine(kLogErr, "KRAL_EfsReadLink() -- target has no end");
+      return Fail(BadReply(phone, "has a target without an end"));
+    }
+    if (target != nullptr && text->size() >= size) {
+      phone.log().WriteLine(kLogErr, "KRAL_EfsReadLink() -- no room for the target");
+      return Fail(Failure(KRAL_ERROR_ARGUMENT, "the target of %s has %zu bytes, more than the buffer of %u takes",
+                          TextOrEmpty(link), text->size(), size));
     }
     if (target != nullptr) std::memcpy(target, text->c_str(), text->size() + 1);
   }
@@ -104,13 +108,12 @@ bool ReadLink(Diag_FTM& phone, const char* link, u32* error_number, char* target
   return true;
 }
 
-bool MakeDirectory(Diag_FTM& phone, const char* folder, u32* error_number) {
+Reply MakeDirectory(Diag_FTM& phone, const char* folder, u32& error) {
   Compose(phone, kMakeDirectory, kModeOfNewDirectories, PathField(folder));
-  u32 error = 0;
-  if (!IsWithinLimit(phone) || !Exchange(phone, PacketTimeOut(phone)) ||
-      !phone.packet().ResponseAt32(kErrorBehindHeader, error)) {
-    return false;
-  }
+  if (!IsWithinLimit(phone)) return ReplyKind::kNotSent;
+  const Reply reply =
+      Checked(ExchangeOnce(phone, PacketTimeOut(phone)), [&] { return ReadAt(phone, kErrorBehindHeader, error); });
+  if (!reply) return reply;
   if (error == kExists) {
     phone.log().WriteLine(kLogRet, "KRAL_EFS2_DIAG_MKDIR() - Results mkdir_rsp.errnum = %d : Directory already exists",
                           static_cast<int>(error));
@@ -118,8 +121,14 @@ bool MakeDirectory(Diag_FTM& phone, const char* folder, u32* error_number) {
     phone.log().WriteLine(error == kDone ? kLogRet : kLogErr, "KRAL_EFS2_DIAG_MKDIR() - Results mkdir_rsp.errnum = %d",
                           static_cast<int>(error));
   }
+  return reply;
+}
+
+bool MakeDirectoryOnce(Diag_FTM& phone, const char* folder, u32* error_number) {
+  u32 error = 0;
+  if (!MakeDirectory(phone, folder, error)) return false;
   Put(error_number, error);
-  return error == kDone || error == kExists;
+  return error == kExists || IsDone(error, folder);
 }
 
 }  // namespace kral::efs

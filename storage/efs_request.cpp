@@ -3,11 +3,34 @@
 
 #include <algorithm>
 
-#include "frame/base/failure.h"
+#include "frame/base/text_argument.h"
 #include "storage/efs_strays.h"
 
 namespace kral::efs {
 namespace {
+
+constexpr const char* kTooShort = "is too short";
+
+// What stands in front of the path.
+struct KnownError {
+  u32 number;
+  const char* phrase;
+};
+constexpr KnownError kErrors[] = {
+    {kMissing, "no such file"},
+    {kExists, "there is already a file"},
+    {kBadDescriptor, "the handset has no open handle of"},
+    {13, "no permission for"},
+    {20, "a part of the path is no folder:"},
+    {21, "a folder and not a file:"},
+    {22, "the handset finds something invalid about"},
+    {24, "too many files are open for"},
+    {27, "too large for the handset:"},
+    {28, "no room on the handset for"},
+    {36, "a name is too long in"},
+    {39, "the folder is not empty:"},
+    {40, "too many links in"},
+};
 
 bool IsOwnReply(std::span<const u8> request, std::span<const u8> reply, const ReplyTest& is_own) {
   return reply.size() >= kHeaderSize && std::equal(request.begin(), request.begin() + kHeaderSize, reply.begin()) &&
@@ -86,19 +109,20 @@ Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own) {
   return reply;
 }
 
-bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts) {
+Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts) {
+  Reply reply;
   for (int attempt = 0; attempt < kTries; ++attempt) {
     // With a handset that is silent, an abort would otherwise wait for every try.
-    if (attempt > 0 && IsAborted(phone, "request")) return false;
-    const Reply reply = ExchangeOnce(phone, time_out_ms, is_own);
-    if (reply && accepts(reply.bytes())) return true;
+    if (attempt > 0 && IsAborted(phone, "request")) return ReplyKind::kAborted;
+    reply = Checked(ExchangeOnce(phone, time_out_ms, is_own), [&] { return accepts(phone.packet().response()); });
+    if (reply) break;
   }
-  return false;
+  return reply;
 }
 
-bool AskComposed(Diag_FTM& phone, Tries tries) {
+Reply AskComposed(Diag_FTM& phone, Tries tries) {
   const u32 time_out_ms = DefaultTimeOut(phone);
-  if (tries == Tries::kOne) return static_cast<bool>(ExchangeOnce(phone, time_out_ms));
+  if (tries == Tries::kOne) return ExchangeOnce(phone, time_out_ms);
   return ExchangeUntil(phone, time_out_ms, {}, [](std::span<const u8>) { return true; });
 }
 
@@ -125,14 +149,27 @@ bool IsAborted(Diag_FTM& phone, const char* operation) {
 
 bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields) {
   CDiagPacket& packet = phone.packet();
-  if (packet.response_length() < kHeaderSize + fields.size() * sizeof(u32)) return false;
+  if (packet.response_length() < kHeaderSize + fields.size() * sizeof(u32)) return Fail(BadReply(phone, kTooShort));
   return std::all_of(fields.begin(), fields.end(), [&](u32* field) { return packet.Read32(*field); });
 }
 
-u8 LastRefusal(Diag_FTM& phone) {
-  u8 code = 0;
-  phone.packet().ResponseAt8(0, code);
-  return IsRefusal(code) ? code : u8{0};
+bool ReadAt(Diag_FTM& phone, size_t offset, u32& field) {
+  return phone.packet().ResponseAt32(offset, field) || Fail(BadReply(phone, kTooShort));
+}
+
+bool IsDone(u32 error, const char* path) {
+  if (error == kDone) return true;
+  const auto* const known = std::find_if(std::begin(kErrors), std::end(kErrors),
+                                         [error](const KnownError& row) { return row.number == error; });
+  const Failure failure =
+      known == std::end(kErrors)
+          ? Failure(KRAL_ERROR_REFUSED, "the handset gives error %u for %s", error, TextOrEmpty(path))
+          : Failure(KRAL_ERROR_REFUSED, "%s %s", known->phrase, TextOrEmpty(path));
+  return Fail(Failure(failure).Status(KRAL_ERROR_STATUS_EFS, error));
+}
+
+bool Contradicts(Diag_FTM& phone) {
+  return Fail(BadReply(phone, "contradicts itself or the request"));
 }
 
 }  // namespace kral::efs

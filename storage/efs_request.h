@@ -6,7 +6,9 @@
 #include <optional>
 #include <string>
 
+#include "commands/checked_reply.h"
 #include "frame/base/little_endian.h"
+#include "frame/request_failure.h"
 #include "storage/efs_format.h"
 
 namespace kral::efs {
@@ -30,12 +32,9 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
 bool IsWithinLimit(Diag_FTM& phone);
 // Sends once; handles that late replies tell of are closed besides.
 Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
-inline bool Exchange(Diag_FTM& phone, u32 time_out_ms) {
-  return static_cast<bool>(ExchangeOnce(phone, time_out_ms));
-}
 // Sends until a reply of its own is accepted, at most five times and not after an abort. Each try opens a port that an
-// earlier one's time-out has closed.
-bool ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
+// earlier one's time-out has closed. Whoever does not accept a reply has noted why.
+Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
 
 // Every transfer and listing begins with it.
 void ForgetAbort(Diag_FTM& phone);
@@ -43,14 +42,21 @@ void ForgetAbort(Diag_FTM& phone);
 u32 CleanUpTimeOut(Diag_FTM& phone, u32 time_out_ms);
 int CleanUpTries(Diag_FTM& phone);
 
-// Whether the transfer or listing is to end; logged when it is.
+// Whether the transfer or listing is to end; logged and noted when it is.
 bool IsAborted(Diag_FTM& phone, const char* operation);
 
-// Reads double words from the end of the reply backwards; false when it does not hold that many behind its header.
+// Reads double words from the end of the reply backwards; false (noted) when it does not hold that many behind its
+// header.
 bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields);
 
-// The code by which the handset refused the last try (19, 20, 21, 24); 0 when it did not.
-u8 LastRefusal(Diag_FTM& phone);
+// Reads a double word at an offset of the reply; false (noted) when the reply ends before.
+bool ReadAt(Diag_FTM& phone, size_t offset, u32& field);
+
+// Whether the handset's error number is that of success. If not, it is noted as what became of the file or folder.
+bool IsDone(u32 error, const char* path);
+
+// A reply whose fields contradict each other or the request. Logged by whoever found it; always false.
+bool Contradicts(Diag_FTM& phone);
 
 inline u32 DefaultTimeOut(const Diag_FTM& phone) {
   return phone.TimeOut(kTimeOutDefaultCommand);
@@ -62,17 +68,17 @@ inline u32 PacketTimeOut(Diag_FTM& phone) {
 // Requests that stand alone are sent once. Those of a transfer that change nothing are repeated until answered.
 enum class Tries { kOne, kTransfer };
 
-bool AskComposed(Diag_FTM& phone, Tries tries);
+Reply AskComposed(Diag_FTM& phone, Tries tries);
 
 // A request with a path and the default time-out.
 template <class... Fields>
-bool Ask(Diag_FTM& phone, Tries tries, const EfsRequest<Fields...>& row,
-         std::type_identity_t<Field<Fields>>... fields) {
+Reply Ask(Diag_FTM& phone, Tries tries, const EfsRequest<Fields...>& row,
+          std::type_identity_t<Field<Fields>>... fields) {
   Compose(phone, row, fields...);
-  return IsWithinLimit(phone) && AskComposed(phone, tries);
+  return IsWithinLimit(phone) ? AskComposed(phone, tries) : ReplyKind::kNotSent;
 }
 template <class... Fields>
-bool Ask(Diag_FTM& phone, const EfsRequest<Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
+Reply Ask(Diag_FTM& phone, const EfsRequest<Fields...>& row, std::type_identity_t<Field<Fields>>... fields) {
   return Ask(phone, Tries::kOne, row, fields...);
 }
 

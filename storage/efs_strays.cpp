@@ -100,12 +100,16 @@ bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 t
   const int tries = CleanUpTries(phone);
   for (int attempt = 0; attempt < tries; ++attempt) {
     u32 error = 0;
-    if (!ExchangePacket(phone, packet, time_out_ms) || !packet.ResponseAt32(kErrorBehindHeader, error)) {
+    const Reply reply = Checked(ExchangePacket(phone, packet, time_out_ms), [&] {
+      return packet.ResponseAt32(kErrorBehindHeader, error) ||
+             Fail(Failure(KRAL_ERROR_LINK, "the reply to the closing of a handle is too short"));
+    });
+    if (!reply) {
       unanswered = true;
       continue;
     }
     // A handset that does not know the handle any more has closed it on a try whose answer was lost.
-    if (error == kDone || (unanswered && error == kBadDescriptor)) return true;
+    if (IsDone(error, "what is to be closed") || (unanswered && error == kBadDescriptor)) return true;
   }
   phone.log().WriteLine(kLogErr, "EFS2 handle %u could not be closed", value);
   return false;

@@ -1,6 +1,7 @@
 // Has the handset write its file system out, and waits for it.
 #include <algorithm>
 
+#include "frame/base/text_argument.h"
 #include "storage/efs_client.h"
 #include "storage/efs_request.h"
 
@@ -9,25 +10,27 @@ namespace {
 
 constexpr u32 kPollMs = 100;
 
-enum class Told { kState, kNothing, kFailure };
+// What the handset told. A state is there when the error number is that of success.
+struct SyncAnswer {
+  u32 error = kDone;
+  u32 state = 0;
+};
 
-// One of the two requests. A failure is logged; an answer that got lost may come with the next one.
-Told AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, const char* path, u32& state) {
-  u32 error = 0;
-  const bool answered = Ask(phone, row, PathField(path)) && phone.packet().ResponseAt32(kErrorBehindHeader, error);
-  if (!answered && LastRefusal(phone) == refusal::kCommand) {
+// One of the two requests. A failure is logged.
+Reply AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, const char* path, SyncAnswer& answer) {
+  const Reply reply = Checked(Ask(phone, row, PathField(path)), [&] {
+    return ReadAt(phone, kErrorBehindHeader, answer.error) &&
+           (answer.error != kDone || ReadAt(phone, kSyncState, answer.state));
+  });
+  if (reply.refusal() == refusal::kCommand) {
     phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait::%s is not supported by target", name);
-    return Told::kFailure;
-  }
-  if (!answered) return LastRefusal(phone) == 0 ? Told::kNothing : Told::kFailure;
-  if (error != kDone) {
+  } else if (reply.kind() == ReplyKind::kOther && reply.refusal() == 0) {
+    phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait: the reply to %s tells no state", name);
+  } else if (reply && !IsDone(answer.error, path)) {
     phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait received ERRNO %d when sending %s command",
-                          static_cast<int>(error), name);
-    return Told::kFailure;
+                          static_cast<int>(answer.error), name);
   }
-  if (phone.packet().ResponseAt32(kSyncState, state)) return Told::kState;
-  phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait: the reply to %s tells no state", name);
-  return Told::kFailure;
+  return reply;
 }
 
 }  // namespace
@@ -35,23 +38,26 @@ Told AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, co
 bool SyncWithWait(Diag_FTM& phone, const char* path, u32 time_out_ms) {
   const u32 start = phone.clock().TickMs();
   const auto elapsed = [&] { return phone.clock().TickMs() - start; };
-  u32 state = 0;
-  if (AskState(phone, kSyncWithoutWait, "_EFS2_DIAG_SYNC_NO_WAIT", path, state) != Told::kState) return false;
-  if (state == kInSync) {
+  SyncAnswer answer;
+  Reply reply = AskState(phone, kSyncWithoutWait, "_EFS2_DIAG_SYNC_NO_WAIT", path, answer);
+  if (!reply || answer.error != kDone) return false;
+  if (answer.state == kInSync) {
     phone.log().WriteLine(kLogRet, "KRAL_EFS2_SyncWithWait::already in sync message is received at %d ms",
                           static_cast<int>(elapsed()));
     return true;
   }
   for (u32 waited = elapsed(); waited < time_out_ms; waited = elapsed()) {
     phone.clock().SleepMs(std::min(kPollMs, time_out_ms - waited));
-    const Told told = AskState(phone, kSyncStatus, "_EFS2_DIAG_GET_SYNC_STATUS", path, state);
-    if (told == Told::kFailure) return false;
-    if (told == Told::kNothing || state != kInSync) continue;
+    reply = AskState(phone, kSyncStatus, "_EFS2_DIAG_GET_SYNC_STATUS", path, answer);
+    if (reply.kind() == ReplyKind::kOther || answer.error != kDone) return false;
+    // An answer that got lost may come with the next one.
+    if (!reply || answer.state != kInSync) continue;
     phone.log().WriteLine(kLogRet, "KRAL_EFS2_SyncWithWait::sync is complete is received at %d ms",
                           static_cast<int>(elapsed()));
     return true;
   }
   phone.log().WriteLine(kLogErr, "KRAL_EFS2_SyncWithWait::not in sync after %d ms", static_cast<int>(elapsed()));
+  if (reply) Fail(Failure(KRAL_ERROR_NO_ANSWER, "%s is not in sync after %u ms", TextOrEmpty(path), time_out_ms));
   return false;
 }
 

@@ -1,10 +1,13 @@
-// What transfers in both directions share: who they are for, and the progress they report.
+// The parts of which transfers are made, and the progress they tell. None knows who it is for: what the caller is told,
+// the exported transfers pass on.
 #ifndef KRAL_STORAGE_EFS_TRANSFER_H
 #define KRAL_STORAGE_EFS_TRANSFER_H
 
+#include <functional>
+#include <span>
+#include <string>
 #include <vector>
 
-#include "frame/base/guarded_call.h"
 #include "frame/base/little_endian.h"
 #include "storage/efs_client.h"
 #include "storage/efs_format.h"
@@ -12,22 +15,15 @@
 
 namespace kral::efs {
 
-// As the transfer callback names them: the address of a path's text or of a buffer.
-struct TransferEnds {
-  uintptr_t source;
-  uintptr_t destination;
-};
+// Who is told how far a transfer has come; empty: nobody. What the phone's packet buffer holds may not survive it.
+using Progress = std::function<void(u32 operation, u32 done, u32 total)>;
 
-inline uintptr_t AddressOf(const void* memory) {
-  return reinterpret_cast<uintptr_t>(memory);
-}
+// The caller's transfer callback, whichever it is at the time. It names the ends of a transfer by the address of a
+// path's text or of a buffer.
+Progress CallersProgress(Diag_FTM& phone, const void* source, const void* destination);
 
-// Calls the transfer callback, if there is one. What the phone's packet buffer holds may not survive it.
-inline void Report(Diag_FTM& phone, const TransferEnds& ends, u32 operation, u32 done, u32 total) {
-  if (const auto callback = phone.efs().transfer_callback.load()) {
-    const KRAL_HANDLE context = phone.efs().callback_context;
-    CallGuarded([&] { callback(ends.source, ends.destination, operation, 0, done, total, context); });
-  }
+inline void Tell(const Progress& progress, u32 operation, u32 done, u32 total) {
+  if (progress) progress(operation, done, total);
 }
 
 // Whether a read or write reply answers the packet at this offset. That to an earlier packet, come late, does not.
@@ -35,15 +31,29 @@ inline bool IsOfChunk(std::span<const u8> reply, u32 descriptor, u32 offset) {
   return LoadLe<u32>(reply, kHandleAt) == descriptor && LoadLe<u32>(reply, kTransferOffset) == offset;
 }
 
-// The single requests of which transfers are made, with the tries of a transfer.
+// --- Whole transfers ------------------------------------------------------------------------------------------------
 
-// Stat (efs_names.cpp).
-bool StatInTransfer(Diag_FTM& phone, const char* path, FileStatus& status);
-// The file system that holds a path (efs_file_system.cpp); false also when the reply is too short for its fields.
-bool AskStatus(Diag_FTM& phone, Tries tries, const char* path, u32& error, KRAL_EFS_STATFS& status);
-// Fetches an item file whole (efs_item.cpp). `data` is untouched on failure.
-bool GetItem(Diag_FTM& phone, Tries tries, const char* efs_file, u32 length, const TransferEnds& ends,
-             std::vector<u8>& data);
+bool WriteMemory(Diag_FTM& phone, std::span<const u8> bytes, const char* efs_file, const Progress& progress);
+// As a plain file whatever it is, of `size` bytes at least and at most, for who has asked for its status already.
+bool ReadPlainFile(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size);
+
+// Gets every entry of the handset's types that the filter selects; false, with the reason noted, ends the listing.
+using EntrySink = std::function<bool(const KRAL_EFS_ENTRY& entry)>;
+void TellCaller(Diag_FTM& phone, const KRAL_EFS_ENTRY& entry);  // the directory callback
+bool ListEntries(Diag_FTM& phone, const std::string& folder, uint8_t filter, const EntrySink& sink);
+
+// --- The single requests of which they are made ---------------------------------------------------------------------
+// Their reply is the expected one when the handset told an error number, and what belongs to 0 if it is that. An error
+// number is noted by whoever cannot do with it.
+
+// Every field is written when the handset answers; those behind the error number count only when it is 0.
+Reply Stat(Diag_FTM& phone, Tries tries, const char* path, FileStatus& status);
+// The file system that holds a path (efs_file_system.cpp).
+Reply AskStatus(Diag_FTM& phone, Tries tries, const char* path, u32& error, KRAL_EFS_STATFS& status);
+Reply MakeDirectory(Diag_FTM& phone, const char* folder, u32& error);
+// Item files whole (efs_item.cpp). `data` is untouched on failure.
+Reply PutItem(Diag_FTM& phone, const char* efs_file, std::span<const u8> data, u32& error);
+Reply GetItem(Diag_FTM& phone, Tries tries, const char* efs_file, u32 length, std::vector<u8>& data, u32& error);
 
 }  // namespace kral::efs
 

@@ -19,11 +19,7 @@ constexpr std::array<const char*, 5> kFolders = {"/nv/items", "nv/item_files/con
 // What a hostile handset may not exceed.
 constexpr int kDeepest = 8;
 constexpr uint32_t kMostEntries = 20000;  // of one folder; files in all, folders in all
-constexpr uint32_t kUsualEntries = 256;
-constexpr int kListings = 3;  // of a folder that changes meanwhile
 constexpr uint32_t kLargestFile = 1 << 20;
-
-constexpr uint32_t kUnanswered = 0xFFFFFFFF;  // in place of an error number
 
 // A folder's entries for itself and for the one above it.
 bool IsDots(std::string_view path) {
@@ -35,7 +31,7 @@ bool IsDots(std::string_view path) {
 
 PhoneItems::Answer PhoneItems::Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status) {
   efs::FileStatus found;
-  const Answer answer = Try([&] { return efs::Stat(phone_, path, found); });
+  const Answer answer = Try([&] { return efs::Stat(phone_, efs::Tries::kOne, path, found); });
   mode = found.mode;
   size = found.size;
   status = answer == Answer::kAnswered ? found.error_number : kRefusedStatus;
@@ -43,16 +39,12 @@ PhoneItems::Answer PhoneItems::Status(const char* path, uint32_t& mode, uint32_t
 }
 
 bool PhoneItems::List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries) {
-  entries.resize(kUsualEntries);
-  for (int i = 0; i < kListings; ++i) {
-    auto count = static_cast<uint32_t>(entries.size());
-    if (!efs::ListDirectory(phone_, folder.c_str(), KRAL_EFS_FILTER_ALL, entries.data(), &count)) return false;
-    if (count > kMostEntries) return false;
-    const bool complete = count <= entries.size();
-    entries.resize(count);
-    if (complete) return true;
-  }
-  return false;
+  return efs::ListEntries(phone_, folder, KRAL_EFS_FILTER_ALL, [&](const KRAL_EFS_ENTRY& entry) {
+    entries.push_back(entry);
+    efs::TellCaller(phone_, entry);
+    return entries.size() <= kMostEntries ||
+           Fail(Failure(KRAL_ERROR_LINK, "the folder %s has too many entries", folder.c_str()));
+  });
 }
 
 void PhoneItems::TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted) {
@@ -117,25 +109,10 @@ PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {
   return answer == Answer::kAnswered && !unlisted.empty() ? Answer::kRefused : answer;
 }
 
-// The error number of the item request that has just failed; nothing when it was not answered.
-std::optional<uint32_t> PhoneItems::ItemError(bool reading) const {
-  const auto request = phone_.packet().request();
-  const auto reply = phone_.packet().response();
-  if (reply.size() < efs::kHeaderSize + sizeof(uint32_t) || request.size() < efs::kHeaderSize ||
-      !std::equal(request.begin(), request.begin() + efs::kHeaderSize, reply.begin())) {
-    return std::nullopt;
-  }
-  const auto error = LoadLe<uint32_t>(reply, reading ? efs::kItemError : reply.size() - sizeof(uint32_t));
-  return error && *error != efs::kDone ? error : std::nullopt;
-}
-
 PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) {
   const Answer answer = Try([&] {
     status = efs::kDone;
-    if (efs::GetItem(phone_, efs::Tries::kOne, file.path.c_str(), KRAL_EFS_ITEM_SIZE, {}, file.bytes)) return true;
-    const auto error = ItemError(true);
-    status = error.value_or(kRefusedStatus);
-    return error.has_value();
+    return efs::GetItem(phone_, efs::Tries::kOne, file.path.c_str(), KRAL_EFS_ITEM_SIZE, file.bytes, status);
   });
   if (answer != Answer::kAnswered || status != efs::kDone || file.bytes.size() < KRAL_EFS_ITEM_SIZE) return answer;
   // All that a request takes; there may be more.
@@ -151,7 +128,7 @@ PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t size, ui
   status = efs::kDone;
   if (size > kLargestFile) return Answer::kRefused;
   file.bytes.resize(size);
-  if (efs::ReadOpenedToMemory(phone_, file.path.c_str(), file.bytes.data(), &size)) {
+  if (efs::ReadPlainFile(phone_, file.path.c_str(), file.bytes.data(), &size)) {
     file.bytes.resize(size);
     return Answer::kAnswered;
   }
@@ -179,13 +156,9 @@ void PhoneItems::MakeFolders(const std::string& path) {
   for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
     const std::string folder = path.substr(0, end);
     if (folders_.contains(folder)) continue;
-    bool made = false;
-    const Answer answer = Try([&] {
-      uint32_t error = kUnanswered;
-      made = efs::MakeDirectory(phone_, folder.c_str(), &error);
-      return error != kUnanswered;
-    });
-    if (made) folders_.insert(folder);
+    uint32_t error = 0;
+    const Answer answer = Try([&] { return efs::MakeDirectory(phone_, folder.c_str(), error); });
+    if (answer == Answer::kAnswered && (error == efs::kDone || error == efs::kExists)) folders_.insert(folder);
     if (answer == Answer::kLost) return;
   }
 }
@@ -193,18 +166,13 @@ void PhoneItems::MakeFolders(const std::string& path) {
 PhoneItems::Answer PhoneItems::WriteItemFile(const PkvEfsFile& file, uint32_t& status) {
   return Try([&] {
     status = efs::kDone;
-    if (efs::PutItemFromMemory(phone_, file.path.c_str(), file.bytes.data(), static_cast<uint32_t>(file.bytes.size())))
-      return true;
-    const auto error = ItemError(false);
-    status = error.value_or(kRefusedStatus);
-    return error.has_value();
+    return efs::PutItem(phone_, file.path.c_str(), file.bytes, status);
   });
 }
 
 PhoneItems::Answer PhoneItems::WritePlainFile(const PkvEfsFile& file, uint32_t& status) {
   status = efs::kDone;
-  const auto size = static_cast<uint32_t>(file.bytes.size());
-  if (efs::WriteFromMemory(phone_, file.bytes.data(), size, file.path.c_str())) return Answer::kAnswered;
+  if (efs::WriteMemory(phone_, file.bytes, file.path.c_str(), {})) return Answer::kAnswered;
   uint32_t mode = 0;
   uint32_t present = 0;
   return Status(file.path.c_str(), mode, present, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;

@@ -5,7 +5,6 @@
 
 #include <cstdint>
 #include <functional>
-#include <optional>
 #include <set>
 #include <span>
 #include <string>
@@ -29,9 +28,7 @@ class PhoneItems {
   // As many full items as one packet of a batch takes.
   static constexpr size_t kMostInBatch = 9;
 
-  // Takes the batch queue and the EFS transfer callback away from the caller while it lives.
-  explicit PhoneItems(Diag_FTM& phone);
-  ~PhoneItems();
+  explicit PhoneItems(Diag_FTM& phone) : phone_(phone), aborts_(phone) {}
   PhoneItems(const PhoneItems&) = delete;
   PhoneItems& operator=(const PhoneItems&) = delete;
 
@@ -70,8 +67,7 @@ class PhoneItems {
   Answer SetPermissions(const PkvEfsFile& file, uint32_t& status);
 
  private:
-  Answer Try(const std::function<bool()>& ask);
-  bool Echoes16(size_t offset, uint16_t value) const;
+  Answer Try(const std::function<Reply()>& ask);
   Answer Unanswered();
   Answer Walk(const std::string& path, int depth, std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
@@ -80,13 +76,10 @@ class PhoneItems {
   Answer ReadPlainFile(PkvEfsFile& file, uint32_t size, uint32_t& status);
   Answer WriteItemFile(const PkvEfsFile& file, uint32_t& status);
   Answer WritePlainFile(const PkvEfsFile& file, uint32_t& status);
-  std::optional<uint32_t> ItemError(bool reading) const;
   void MakeFolders(const std::string& path);
 
   Diag_FTM& phone_;
   const Diag_FTM::Resynchronising resynchronising_{phone_};  // replies to item requests do not name their file
-  NvBatch callers_batch_;
-  KRAL_EFS_TRANSFER_CALLBACK callers_transfer_callback_;
   const efs::AbortWatch aborts_;
   size_t walked_ = 0;                           // folders and what is listed as one
   uint8_t refusal_ = 0;                         // the code of the last Try that was refused
