@@ -5,6 +5,7 @@
 
 #include "commands/core_diag.h"
 #include "commands/nv_item.h"
+#include "frame/base/failure.h"
 #include "platform/file_util.h"
 #include "storage/phone_items.h"
 #include "storage/pkv_jobs.h"
@@ -156,6 +157,9 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
   // Before the many requests that would otherwise be in vain.
   if (const std::error_code error = AtomicFile().Open(path)) {
     phone.log().WriteLine(kLogErr, "%s: %s", path.c_str(), error.message().c_str());
+    Fail(FileFailure(path, "cannot be written")
+             .System(error)
+             .Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_CANNOT_OPEN));
     return KRAL_PKV_STATUS_CANNOT_OPEN;
   }
   ReadIdentity(phone, set.properties);
@@ -165,7 +169,7 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
     return status;
   }
   const PkvOutcome outcome = WritePkv(path, set, &phone.log());
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  if (!outcome.done()) NoteFile(phone, outcome);
   return outcome.done() ? status : StatusOf(outcome.result);
 }
 

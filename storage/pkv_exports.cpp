@@ -28,13 +28,51 @@ class Running {
   bool& flag_;
 };
 
+// What a job as a whole came to. What was noted before may be something that it got over; only of files more is known
+// where they are opened.
+Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& counts) {
+  switch (status) {
+    case KRAL_PKV_STATUS_INCOMPLETE:
+      return Failure(KRAL_ERROR_REFUSED, "%s lacks %u of %u items and files, which the handset refused", file,
+                     counts.refused, counts.total);
+    case KRAL_PKV_STATUS_NOTHING_READ:
+      return Failure(KRAL_ERROR_REFUSED, "the handset gave nothing for %s: %u of %u items and files were refused", file,
+                     counts.refused, counts.total);
+    case KRAL_PKV_STATUS_NOT_WRITTEN:
+      return Failure(KRAL_ERROR_REFUSED,
+                     "of %s the handset refused %u of %u items and files, and %u read back otherwise", file,
+                     counts.refused, counts.total, counts.different + counts.not_read_back);
+    case KRAL_PKV_STATUS_DIFFERENT:
+      return Failure(KRAL_ERROR_MISMATCH, "%u of %u items and files of %s differ on the handset, and %u were refused",
+                     counts.different, counts.total, file, counts.refused);
+    case KRAL_PKV_STATUS_LOST:
+      return Failure(KRAL_ERROR_LOST, "the handset stopped answering with %u of %u items and files not reached",
+                     counts.not_reached, counts.total);
+    case KRAL_PKV_STATUS_STOPPED:
+      return Failure(KRAL_ERROR_ABORTED, "the callback stopped it with %u of %u items and files not reached",
+                     counts.not_reached, counts.total);
+    default:
+      return Failure(KRAL_ERROR_BAD_FILE, "%s is damaged, or no PKV file", file);
+  }
+}
+
+bool IsOfFile(uint32_t status) {
+  return status == KRAL_PKV_STATUS_CANNOT_OPEN || status == KRAL_PKV_STATUS_NO_STORAGE ||
+         status == KRAL_PKV_STATUS_BAD_ITEM;
+}
+
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   kral::Put(status, uint32_t{KRAL_PKV_STATUS_UNEXPECTED});
-  if (phone.pkv().running) return false;
+  if (phone.pkv().running) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a backup, restore or comparison is under way")
+                    .Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_UNEXPECTED));
+  }
   const Running running(phone.pkv().running);
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
-  return result == KRAL_PKV_STATUS_DONE;
+  if (result == KRAL_PKV_STATUS_DONE) return true;
+  if (IsOfFile(result) && kral::IsFailureNoted()) return false;
+  return Fail(Judgement(result, TextOrEmpty(file), phone.pkv().counts).Status(KRAL_ERROR_STATUS_RESULT, result));
 }
 
 bool SetCallback(Diag_FTM& phone, KRAL_PKV_CALLBACK callback) {

@@ -6,6 +6,7 @@
 #include <charconv>
 #include <string_view>
 
+#include "frame/base/failure.h"
 #include "kral/efs.h"
 #include "storage/nv_tool.h"
 
@@ -35,7 +36,10 @@ uint32_t* CounterOf(KRAL_PKV_COUNTS& counts, uint32_t result) {
 
 bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions) {
   constexpr uint16_t kMostSubscriptions = 16;
-  if (first_item > last_item || subscriptions < 1 || subscriptions > kMostSubscriptions) return false;
+  if (first_item > last_item || subscriptions < 1 || subscriptions > kMostSubscriptions) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "items %d to %d in %d subscriptions cannot be backed up", first_item,
+                        last_item, subscriptions));
+  }
   phone.pkv().first_item = first_item;
   phone.pkv().last_item = last_item;
   phone.pkv().subscriptions = subscriptions;
@@ -106,13 +110,20 @@ void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set) {
   phone.log().WriteLine(kLogErr, "%s: %u parts passed over", path.c_str(), static_cast<unsigned>(set.unread.size()));
 }
 
+void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome) {
+  phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  Fail(Failure(KRAL_ERROR_BAD_FILE, "%s", outcome.text.c_str())
+           .Status(KRAL_ERROR_STATUS_RESULT, StatusOf(outcome.result)));
+}
+
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
   phone.pkv().counts = {};
   const PkvOutcome outcome = ReadPkv(path, set);
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+  if (!outcome.done()) NoteFile(phone, outcome);
   LogUnread(phone, path, set);
   if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
   phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
+  Fail(FileFailure(path, "holds no item and no file").Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_BAD_ITEM));
   return KRAL_PKV_STATUS_BAD_ITEM;
 }
 

@@ -53,7 +53,9 @@ class JobReport {
 // Tells the log what a file holds beside what was read.
 void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set);
 
-// Reads the file of a restore or a comparison; what is wrong with it goes to the log.
+// What is wrong with a file is logged, and noted as the failure.
+void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome);
+// Reads the file of a restore or a comparison.
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
 uint32_t StatusOf(PkvResult result);
 

@@ -2,7 +2,9 @@
 // becomes of late answers: they are nobody else's, and the handles that they tell of are closed.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <array>
+#include <atomic>
 #include <chrono>
 #include <thread>
 
@@ -209,6 +211,35 @@ TEST_F(EfsFaults, HandlesThatLateAnswersTellOfAreClosed) {
   EXPECT_EQ(KRAL_EfsReadMem(handle(), "/f", back.data(), &size), 1) << LogText();
   EXPECT_EQ(back, data_);
   EXPECT_EQ(handset().efs().open_descriptors(), 0u) << LogText();
+}
+
+TEST_F(EfsFaults, AWriteThatFailedMayHaveOpenedAFile) {
+  static std::atomic<int> failing;
+  struct Slow {  // delivers an opening request, and says that it did not
+    static uint32_t KRAL_CALL Send(uintptr_t context, uintptr_t value, uint32_t count, const uint8_t* data,
+                                   uint32_t* written) {
+      const uint32_t sent = handset::CallerTransport::Send(context, value, count, data, written);
+      constexpr uint8_t kOpen[] = {0x4B, 0x13, 0x02};
+      const bool opens = std::search(data, data + count, std::begin(kOpen), std::end(kOpen)) != data + count;
+      return opens && failing-- > 0 ? 1 : sent;
+    }
+  };
+  handset().efs().AddFile("/f", data_);
+  Disconnect();
+  const KRAL_HANDLE slow =
+      KRAL_ConnectServer_UserDefinedTransport(2, transport().handle_value(), transport().context(), &Slow::Send,
+                                              &handset::CallerTransport::Receive, &handset::CallerTransport::Flush);
+  ASSERT_NE(slow, 0u);
+  KRAL_SetReceiveMode(slow, 1);
+  for (const int failures : {1, 5}) {
+    failing = failures;
+    Bytes back(data_.size());
+    auto size = static_cast<uint32_t>(back.size());
+    EXPECT_EQ(KRAL_EfsReadMem(slow, "/f", back.data(), &size), failures < 5 ? 1 : 0);
+    EXPECT_EQ(handset().efs().open_descriptors(), 0u) << failures;
+  }
+  EXPECT_EQ(failing, 0);
+  KRAL_DisconnectServer(slow);
 }
 
 // The caller's transport of the other tests stays open whatever happens.

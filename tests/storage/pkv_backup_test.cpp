@@ -443,12 +443,31 @@ TEST_F(PkvBackup, WhatTheCallerHadUnderWayStays) {
   listed = 0;
   ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u);
   EXPECT_EQ(calls + listed, 0);
+
+  // What another thread configures meanwhile is not undone at the end.
+  static int later_calls;
+  later_calls = 0;
+  KRAL_PKV_ConfigureCallBack(
+      handle(), [](const KRAL_PKV_ITEM*, const char*, uint32_t done, uint32_t, KRAL_HANDLE context) -> uint8_t {
+        if (done == 1) {
+          std::thread([context] {
+            KRAL_ConfigureEfs2CallBacks(
+                context,
+                [](uintptr_t, uintptr_t, uint32_t, uint32_t, uint32_t, uint32_t, KRAL_HANDLE) { ++later_calls; },
+                nullptr);
+          }).join();
+        }
+        return 1;
+      });
+  ASSERT_EQ(Run(KRAL_PKV_Verify), 0u);
+  EXPECT_EQ(later_calls, 0);
   EXPECT_EQ(KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle(), nullptr, nullptr, nullptr), 1);
   EXPECT_TRUE(handset().nv().Value(1000).has_value());
   KRAL_EfsPutItemFromMem(handle(), "/nv/items/x", &data, 1);
   uint32_t size = 1;
   KRAL_EfsReadMem(handle(), "/nv/items/x", &data, &size);
-  EXPECT_GT(calls, 0);
+  EXPECT_EQ(calls, 0);
+  EXPECT_GT(later_calls, 0);
 }
 
 TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
