@@ -49,16 +49,17 @@ Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& coun
       return Failure(KRAL_ERROR_LOST, "the handset stopped answering with %u of %u items and files not reached",
                      counts.not_reached, counts.total);
     case KRAL_PKV_STATUS_STOPPED:
-      return Failure(KRAL_ERROR_ABORTED, "the callback stopped it with %u of %u items and files not reached",
+      return Failure(KRAL_ERROR_ABORTED, "stopped by the caller with %u of %u items and files not reached",
                      counts.not_reached, counts.total);
     default:
       return Failure(KRAL_ERROR_BAD_FILE, "%s is damaged, or no PKV file", file);
   }
 }
 
-bool IsOfFile(uint32_t status) {
+// What fails at the file, whether or not the handset has answered.
+bool IsOfFile(uint32_t status, const KRAL_PKV_COUNTS& counts) {
   return status == KRAL_PKV_STATUS_CANNOT_OPEN || status == KRAL_PKV_STATUS_NO_STORAGE ||
-         status == KRAL_PKV_STATUS_BAD_ITEM;
+         status == KRAL_PKV_STATUS_BAD_ITEM || (status == KRAL_PKV_STATUS_NOTHING_READ && counts.done > 0);
 }
 
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
@@ -71,7 +72,7 @@ bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   if (result == KRAL_PKV_STATUS_DONE) return true;
-  if (IsOfFile(result) && kral::IsFailureNoted()) return false;
+  if (IsOfFile(result, phone.pkv().counts) && kral::IsFailureNoted()) return false;
   return Fail(Judgement(result, TextOrEmpty(file), phone.pkv().counts).Status(KRAL_ERROR_STATUS_RESULT, result));
 }
 
