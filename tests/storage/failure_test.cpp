@@ -184,7 +184,7 @@ TEST_F(StorageFailure, OfFilesNamesTheFile) {
   };
   handset().efs().AddDirectory("/d");
   for (const Row& row : kRows) {
-    handset().efs().SetTotalBlocks(std::string_view(row.what) == "too large" ? 5 : 100000);
+    handset().efs().SetTotalBlocks(std::string_view(row.what) == "too large" ? 8 : 100000);
     Check(row);
   }
 
