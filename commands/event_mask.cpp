@@ -4,18 +4,26 @@
 #include "commands/log_mask.h"
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
+#include "frame/request_failure.h"
 #include "transport/name_table.h"
 
 namespace kral::diag {
 namespace {
 
-bool SetEventMask(Diag_FTM& phone, const BitMask& mask) {
-  if (!Send(phone, kSetEventMask, u8{0}, u16{0}, static_cast<u16>(mask.bits()), mask.bytes())) return false;
+// The byte is 0 when the handset has done as asked.
+bool IsAccepted(Diag_FTM& phone, const char* function) {
   uint8_t error = 0;
-  if (!phone.packet().ResponseAt8(event_mask_reply::kError, error)) return false;
+  if (!phone.packet().ResponseAt8(event_mask_reply::kError, error)) return Fail(BadReply(phone, "has no error byte"));
   if (error == 0) return true;
-  phone.log().WriteLine(kLogErr, "DIAG_EVENT_MASK_SET_F() -- Error code %d fails", error);
-  return false;
+  phone.log().WriteLine(kLogErr, "%s() -- Error code %d fails", function, error);
+  return Fail(Failure(KRAL_ERROR_REFUSED, "the handset refused the event mask with error %d", error)
+                  .Status(KRAL_ERROR_STATUS_COMMAND, error)
+                  .Command(phone.packet().request()));
+}
+
+bool SetEventMask(Diag_FTM& phone, const BitMask& mask) {
+  return Send(phone, kSetEventMask, u8{0}, u16{0}, static_cast<u16>(mask.bits()), mask.bytes()) &&
+         IsAccepted(phone, "DIAG_EVENT_MASK_SET_F");
 }
 
 bool AreAllowed(Diag_FTM& phone, Ids events) {
@@ -23,9 +31,15 @@ bool AreAllowed(Diag_FTM& phone, Ids events) {
   for (const uint16_t event : events) {
     if (phone.names().Allows(NameTableKind::kAllowedEvents, event)) continue;
     phone.log().WriteLine(kLogErr, "KRAL_DIAG_SetEventMaskBits()--event ID 0x%X is not allowed", event);
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "event %d is not in the table of allowed events", event));
     allowed = false;
   }
   return allowed;
+}
+
+Failure OutOfRange(uint16_t event, const BitMask& mask) {
+  if (mask.bits() == 0) return Failure(KRAL_ERROR_ARGUMENT, "event %d: the handset has no events", event);
+  return Failure(KRAL_ERROR_ARGUMENT, "event %d is not one of the handset's, 0 to %zu", event, mask.bits() - 1);
 }
 
 bool SetListed(Diag_FTM& phone, BitMask& mask, Ids events, bool on) {
@@ -33,7 +47,7 @@ bool SetListed(Diag_FTM& phone, BitMask& mask, Ids events, bool on) {
     if (event >= mask.bits()) {
       phone.log().WriteLine(kLogErr, "KRAL_DIAG_SetEventMaskBits()--event ID 0x%X is outside the handset's range",
                             event);
-      return false;
+      return Fail(OutOfRange(event, mask));
     }
     phone.log().WriteLine(kLogRet, "KRAL_DIAG_SetEventMaskBits() -- adding event code %d", event);
     mask.Set(event, on);
@@ -45,20 +59,20 @@ bool SetListed(Diag_FTM& phone, BitMask& mask, Ids events, bool on) {
 
 std::optional<BitMask> GetEventMask(Diag_FTM& phone) {
   phone.log().WriteLine(kLogFn, "DIAG_EVENT_MASK_GET_F()");
-  if (!Send(phone, kGetEventMask, u8{0}, u16{0})) return std::nullopt;
-  uint8_t error = 0;
-  if (!phone.packet().ResponseAt8(event_mask_reply::kError, error)) return std::nullopt;
-  if (error != 0) {
-    phone.log().WriteLine(kLogErr, "DIAG_EVENT_MASK_GET_F() -- Error code %d fails", error);
+  if (!Send(phone, kGetEventMask, u8{0}, u16{0}) || !IsAccepted(phone, "DIAG_EVENT_MASK_GET_F")) return std::nullopt;
+  uint16_t bits = 0;
+  if (!phone.packet().ResponseAt16(event_mask_reply::kBits, bits)) {
+    Fail(BadReply(phone, "has no number of events"));
     return std::nullopt;
   }
-  uint16_t bits = 0;
-  if (!phone.packet().ResponseAt16(event_mask_reply::kBits, bits)) return std::nullopt;
   // One byte more than the mask has where the number divides by 8: this text alone counts so.
   phone.log().WriteLine(kLogRet, "DIAG_EVENT_MASK_GET_F() -- NUM_BITS = %d, Mask Size (bytes)= %d", bits, bits / 8 + 1);
   BitMask mask(bits);
   const auto response = phone.packet().response();
-  if (response.size() < event_mask_reply::kMask + mask.bytes().size()) return std::nullopt;
+  if (response.size() < event_mask_reply::kMask + mask.bytes().size()) {
+    Fail(BadReply(phone, "is too short for the mask that it announces"));
+    return std::nullopt;
+  }
   std::copy_n(response.begin() + event_mask_reply::kMask, mask.bytes().size(), mask.bytes().begin());
   return mask;
 }

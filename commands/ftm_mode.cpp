@@ -86,7 +86,7 @@ bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
   const auto mode_id = ModeIdForRfMode(rf_mode, phone.ftm().mode_id);
   if (!mode_id) {
     phone.log().WriteLine(kLogErr, "KRAL_FTM_SET_MODE() -- RF mode %d has no mode id", rf_mode);
-    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the RF mode %d is not one of the listed modes", rf_mode));
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the RF mode %d is not one of the listed modes, 2 to 92", rf_mode));
   }
   phone.ftm().mode_id = *mode_id;
   const bool sent = static_cast<bool>(Send(phone, kSetMode, rf_mode));

@@ -2,7 +2,6 @@
 #include "commands/log_mask.h"
 
 #include <algorithm>
-#include <utility>
 
 #include "frame/base/little_endian.h"
 #include "frame/diag_ftm.h"
@@ -52,9 +51,25 @@ bool AreAllowed(Diag_FTM& phone, Ids codes, const char* function) {
   for (const uint16_t code : codes) {
     if (phone.names().Allows(NameTableKind::kAllowedLogs, code)) continue;
     phone.log().WriteLine(kLogErr, "%s()--log code 0x%X is not allowed", function, code);
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "log code 0x%04X is not in the table of allowed logs", code));
     allowed = false;
   }
   return allowed;
+}
+
+Failure OutOfRange(uint8_t equipment_id, uint16_t code, uint32_t items) {
+  if (items == 0) {
+    return Failure(KRAL_ERROR_ARGUMENT, "log code 0x%04X: the handset has no logs of equipment id %d", code,
+                   equipment_id);
+  }
+  const uint32_t first = equipment_id * kItemsPerEquipmentId;
+  return Failure(KRAL_ERROR_ARGUMENT, "log code 0x%04X is not one of equipment id %d, 0x%04X to 0x%04X", code,
+                 equipment_id, first, first + items - 1);
+}
+
+Failure TooManyItems(uint8_t equipment_id, uint32_t items) {
+  return Failure(KRAL_ERROR_LINK, "the handset tells %u logs of equipment id %d, more than a mask can have", items,
+                 equipment_id);
 }
 
 // Codes that the handset has no bit for must not end up in another's.
@@ -64,13 +79,17 @@ bool AreInRange(Diag_FTM& phone, uint8_t equipment_id, Ids codes, uint32_t items
   if (outside == codes.end()) return true;
   phone.log().WriteLine(kLogErr, "%s()--log code 0x%X is outside the range of equipment ID %d", function, *outside,
                         equipment_id);
-  return false;
+  return Fail(OutOfRange(equipment_id, *outside, items));
 }
 
 std::optional<uint32_t> GetItems(Diag_FTM& phone, uint8_t equipment_id) {
+  if (equipment_id >= kEquipmentIds) Fail(NoEquipmentId(equipment_id));
   const auto ranges = equipment_id < kEquipmentIds ? GetLogRanges(phone) : std::nullopt;
-  if (!ranges || !IsMaskPossible((*ranges)[equipment_id])) return std::nullopt;
-  return (*ranges)[equipment_id];
+  if (!ranges) return std::nullopt;
+  const uint32_t items = (*ranges)[equipment_id];
+  if (IsMaskPossible(items)) return items;
+  Fail(TooManyItems(equipment_id, items));
+  return std::nullopt;
 }
 
 struct Asked {
@@ -107,10 +126,17 @@ std::optional<ToldMask> FindMask(Diag_FTM& phone, const Asked& asked) {
 
 }  // namespace
 
+Failure NoEquipmentId(uint8_t equipment_id) {
+  return Failure(KRAL_ERROR_ARGUMENT, "the equipment id %d is not one of 0 to %zu", equipment_id, kEquipmentIds - 1);
+}
+
 std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone) {
   if (!Configure(phone, kRetrieveLogRanges, 0, 0)) return std::nullopt;
   const auto response = phone.packet().response();
-  if (response.size() < log_config_reply::kHeader + log_config_reply::kRanges) return std::nullopt;
+  if (response.size() < log_config_reply::kHeader + log_config_reply::kRanges) {
+    Fail(BadReply(phone, "is too short for the ranges"));
+    return std::nullopt;
+  }
   if (!IsDone(response, log_config_reply::kRanges)) return std::nullopt;
   const auto tail = response.last(log_config_reply::kRanges);
   std::array<uint32_t, kEquipmentIds> ranges{};
@@ -119,15 +145,19 @@ std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone)
 }
 
 std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items, OtherMask other) {
-  if (!IsMaskPossible(items) || !Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) {
+  if (!IsMaskPossible(items)) {
+    Fail(TooManyItems(equipment_id, items));
     return std::nullopt;
   }
+  if (!Configure(phone, kGetLogMask, equipment_id, sizeof(u32), u32{equipment_id})) return std::nullopt;
   const auto told = FindMask(phone, {equipment_id, items});
   if (!told) return std::nullopt;
   BitMask mask(items);
   if (told->equipment_id != equipment_id) {
     phone.log().WriteLine(kLogErr, "DIAG_ModifyExtendedLogCodes: Error fetching current log mask");
-    return other == OtherMask::kNothingOn ? std::optional(std::move(mask)) : std::nullopt;
+    if (other == OtherMask::kNothingOn) return mask;
+    Fail(BadReply(phone, "holds the mask of another equipment id"));
+    return std::nullopt;
   }
   if (told->items != items) {
     Fail(BadReply(phone, "holds a mask of another length than the ranges tell"));
@@ -173,7 +203,7 @@ bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16
   if (!AreAllowed(phone, codes, kName) || !AreInRange(phone, equipment_id, codes, items, kName)) return false;
   if (!IsMaskPossible(items)) {
     phone.log().WriteLine(kLogErr, "%s()--a mask of %d items does not fit into a request", kName, items);
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a mask of %d logs does not fit into a request", items));
   }
   BitMask mask(items);
   mask.Set(*ItemOf(equipment_id, code, items), true);
@@ -183,7 +213,7 @@ bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16
 }
 
 bool ClearAllLogCodes(Diag_FTM& phone, uint8_t equipment_id) {
-  if (equipment_id >= kEquipmentIds) return false;
+  if (equipment_id >= kEquipmentIds) return Fail(NoEquipmentId(equipment_id));
   const auto items = GetItems(phone, equipment_id);
   // Only told, with another function's name: the handset is then sent a mask without bits. Kept.
   if (!items) phone.log().WriteLine(kLogErr, "KRAL_DIAG_AddExtendedLogCodes() -- failed to get log range");

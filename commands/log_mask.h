@@ -10,6 +10,7 @@
 
 #include "commands/bit_mask.h"
 #include "commands/log_mask_format.h"
+#include "frame/base/failure.h"
 
 namespace kral {
 
@@ -26,6 +27,8 @@ std::optional<std::array<uint32_t, kEquipmentIds>> GetLogRanges(Diag_FTM& phone)
 enum class OtherMask : uint8_t { kFailure, kNothingOn };
 // The mask as the handset has it, `items` long; nothing when it cannot be had.
 std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t items, OtherMask other);
+
+Failure NoEquipmentId(uint8_t equipment_id);
 
 bool ModifyLogCodes(Diag_FTM& phone, uint8_t equipment_id, Ids codes, bool activate);
 bool SetOnlyLogCode(Diag_FTM& phone, uint8_t equipment_id, uint16_t code, uint16_t items);

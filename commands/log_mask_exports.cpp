@@ -13,7 +13,10 @@ namespace {
 
 using kral::Diag_FTM;
 using kral::ExportCall;
+using kral::Fail;
+using kral::Failure;
 using kral::NameTable;
+using kral::NameTableFault;
 using kral::NameTableKind;
 using kral::Put;
 namespace diag = kral::diag;
@@ -29,14 +32,21 @@ bool ReadRanges(Diag_FTM& phone, uint32_t* last_items) {
 }
 
 bool PutMask(const kral::BitMask& mask, uint16_t* size, uint8_t* bytes) {
-  if (mask.bytes().size() > *size) return false;
+  if (mask.bytes().size() > *size) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the mask of %zu bytes does not fit into %d", mask.bytes().size(), *size));
+  }
   std::copy(mask.bytes().begin(), mask.bytes().end(), bytes);
   *size = static_cast<uint16_t>(mask.bytes().size());
   return true;
 }
 
+Failure NoRoom() {
+  return Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the mask");
+}
+
 bool ReadLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t* bits, uint16_t* size, uint8_t* bytes) {
-  if (size == nullptr || bytes == nullptr || equipment_id >= diag::kEquipmentIds) return false;
+  if (size == nullptr || bytes == nullptr) return Fail(NoRoom());
+  if (equipment_id >= diag::kEquipmentIds) return Fail(diag::NoEquipmentId(equipment_id));
   const auto ranges = diag::GetLogRanges(phone);
   if (!ranges) return false;
   const auto mask = diag::GetLogMask(phone, equipment_id, (*ranges)[equipment_id], diag::OtherMask::kFailure);
@@ -46,7 +56,7 @@ bool ReadLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_t* bits, uint16_t
 }
 
 bool ReadEventMask(Diag_FTM& phone, uint16_t* bits, uint16_t* size, uint8_t* bytes) {
-  if (size == nullptr || bytes == nullptr) return false;
+  if (size == nullptr || bytes == nullptr) return Fail(NoRoom());
   const auto mask = diag::GetEventMask(phone);
   if (!mask || !PutMask(*mask, size, bytes)) return false;
   Put(bits, static_cast<uint16_t>(mask->bits()));
@@ -54,14 +64,18 @@ bool ReadEventMask(Diag_FTM& phone, uint16_t* bits, uint16_t* size, uint8_t* byt
 }
 
 bool LoadTable(Diag_FTM& phone, uint32_t table, const char* file_name) {
-  if (table >= kral::kNameTableCount) return false;
+  if (table >= kral::kNameTableCount) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "the table %u is not one of 0 to %zu", table, kral::kNameTableCount - 1));
+  }
   std::shared_ptr<const NameTable> loaded;
   if (file_name != nullptr) {
-    std::string error;
-    loaded = NameTable::Load(file_name, error);
+    NameTableFault fault;
+    loaded = NameTable::Load(file_name, fault);
     if (!loaded) {
-      phone.log().WriteLine(kral::kLogErr, "KRAL_LoadNameTable() -- %s: %s", file_name, error.c_str());
-      return false;
+      phone.log().WriteLine(kral::kLogErr, "KRAL_LoadNameTable() -- %s: %s", file_name, fault.text.c_str());
+      Failure failure(KRAL_ERROR_BAD_FILE, "the table %.150s cannot be read: %.80s", file_name, fault.text.c_str());
+      failure.System(fault.system_error);
+      return Fail(fault.line == 0 ? failure : failure.Line(fault.line));
     }
   }
   phone.names().Set(static_cast<NameTableKind>(table), std::move(loaded));
@@ -69,7 +83,7 @@ bool LoadTable(Diag_FTM& phone, uint32_t table, const char* file_name) {
 }
 
 bool PutText(const std::string& text, uint16_t size, char* output) {
-  if (output == nullptr || size == 0) return false;
+  if (output == nullptr || size == 0) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no room for the name"));
   const size_t length = std::min<size_t>(text.size(), size - 1U);
   std::memcpy(output, text.data(), length);
   output[length] = '\0';
@@ -79,7 +93,8 @@ bool PutText(const std::string& text, uint16_t size, char* output) {
 bool ReadName(Diag_FTM& phone, NameTableKind kind, uint16_t id, uint16_t size, char* output) {
   const auto table = phone.names().Get(kind);
   const std::string* const name = table->Find(id);
-  return name != nullptr && PutText(*name, size, output);
+  if (name == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the table has no name for %d", id));
+  return PutText(*name, size, output);
 }
 
 bool CountCategories(Diag_FTM& phone, uint32_t* count) {
@@ -89,7 +104,10 @@ bool CountCategories(Diag_FTM& phone, uint32_t* count) {
 
 bool ReadCategory(Diag_FTM& phone, uint32_t index, uint16_t* category, uint16_t size, char* name) {
   const auto table = phone.names().Get(NameTableKind::kMessageCategories);
-  if (index >= table->rows().size() || !PutText(table->rows()[index].name, size, name)) return false;
+  if (index >= table->rows().size()) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no category %u in a table of %zu", index, table->rows().size()));
+  }
+  if (!PutText(table->rows()[index].name, size, name)) return false;
   Put(category, table->rows()[index].id);
   return true;
 }
@@ -100,7 +118,7 @@ bool EnableCategory(Diag_FTM& phone, uint16_t category, bool on) {
   }
   phone.log().WriteLine(kral::kLogErr, "KRAL_ExtendedTextMessage_SetCategoryEnable() -- no category %d in the table",
                         category);
-  return false;
+  return Fail(Failure(KRAL_ERROR_ARGUMENT, "message category %d is not in the table of categories", category));
 }
 
 constexpr const char* kNoList = "there is no list";

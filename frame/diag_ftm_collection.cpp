@@ -2,6 +2,7 @@
 #include "frame/base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/diag_ftm_parts.h"
+#include "platform/file_util.h"
 
 namespace kral {
 
@@ -15,9 +16,13 @@ TrafficCounters Diag_FTM::counters() {
 }
 
 bool Diag_FTM::StartCapture(const char* file_name) {
+  const bool running = capture().state() != CaptureState::kNone;
   if (capture().Start([file_name] { return OpenCaptureFile(file_name); }, parts_)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be written or is in use, or a capture runs already", file_name);
-  return Fail(FileFailure(file_name, "cannot be written or is in use, or a capture runs already"));
+  // One that was running and has ended meanwhile was none in the way.
+  return Fail(running && capture().state() != CaptureState::kNone
+                  ? Failure(KRAL_ERROR_ARGUMENT, "a capture runs already, or waits for its disk")
+                  : FileFailure(file_name, "cannot be written or is in use"));
 }
 
 // What has been read from the port by now belongs to the capture, also where it still waits for the dispatcher; while a
@@ -30,7 +35,11 @@ bool Diag_FTM::StopCapture() {
     log().WriteLine(kLogErr, "Capture file: it ends in front of %u packets that still wait for callbacks",
                     static_cast<unsigned>(dispatcher().backlog()));
   }
-  return capture().Stop();
+  if (capture().Stop()) return true;
+  return Fail(
+      capture().state() == CaptureState::kNone
+          ? Failure(KRAL_ERROR_BAD_FILE, "the capture file does not hold all packets, or no capture was running")
+          : Failure(KRAL_ERROR_NO_ANSWER, "packets of the capture still wait for the disk"));
 }
 
 bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
@@ -38,7 +47,11 @@ bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
   if (!server_mode() && player().Start(OpenCaptureSource(file_name), pace, dispatcher(), sorter(), parts_)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",
                   file_name);
-  return Fail(FileFailure(file_name, "cannot be read or is being written, or a file is played already"));
+  if (server_mode()) return Fail(Failure(KRAL_ERROR_ARGUMENT, "nothing can be played through a phone server"));
+  if (player().state() == PlayState::kPlaying) return Fail(Failure(KRAL_ERROR_ARGUMENT, "a file is played already"));
+  FileReader reader;
+  const auto error = reader.Open(file_name);
+  return Fail(FileFailure(file_name, error ? "cannot be read" : "is being written").System(error));
 }
 
 // Nobody may wait for packets of a handset that is gone.

@@ -41,11 +41,11 @@ bool TakeSeparator(std::string_view& line) {
 
 }  // namespace
 
-std::shared_ptr<const NameTable> NameTable::Parse(std::string_view text, std::string& error) {
+std::shared_ptr<const NameTable> NameTable::Parse(std::string_view text, NameTableFault& fault) {
   auto table = std::make_shared<NameTable>();
   if (text.starts_with(kByteOrderMark)) text.remove_prefix(kByteOrderMark.size());
-  const auto fail = [&error](size_t number, const char* reason) {
-    error = "line " + std::to_string(number) + ": " + reason;
+  const auto fail = [&fault](size_t number, const char* reason) {
+    fault = {"line " + std::to_string(number) + ": " + reason, static_cast<uint32_t>(number), {}};
     return nullptr;
   };
   for (size_t number = 1; !text.empty(); ++number) {
@@ -63,13 +63,13 @@ std::shared_ptr<const NameTable> NameTable::Parse(std::string_view text, std::st
   return table;
 }
 
-std::shared_ptr<const NameTable> NameTable::Load(const std::string& path, std::string& error) {
+std::shared_ptr<const NameTable> NameTable::Load(const std::string& path, NameTableFault& fault) {
   std::vector<uint8_t> bytes;
-  if (const auto failure = ReadWholeFile(path, kLargestFile, bytes)) {
-    error = failure.message();
+  if (const auto error = ReadWholeFile(path, kLargestFile, bytes)) {
+    fault = {error.message(), 0, error};
     return nullptr;
   }
-  return Parse({reinterpret_cast<const char*>(bytes.data()), bytes.size()}, error);
+  return Parse({reinterpret_cast<const char*>(bytes.data()), bytes.size()}, fault);
 }
 
 const std::string* NameTable::Find(uint16_t id) const {

@@ -9,6 +9,7 @@
 #include <mutex>
 #include <string>
 #include <string_view>
+#include <system_error>
 #include <unordered_map>
 #include <vector>
 
@@ -19,6 +20,13 @@ struct NameTableRow {
   std::string name;  // may be empty
 };
 
+// Why a table cannot be read.
+struct NameTableFault {
+  std::string text;
+  uint32_t line = 0;  // from 1; 0 where it is the whole file's
+  std::error_code system_error;
+};
+
 // One row a line: an id, decimal or hex with 0x in front, then the name, separated by blanks, a tab or a comma. Empty
 // lines and lines that begin with # count for nothing. An id stands once.
 class NameTable {
@@ -26,9 +34,9 @@ class NameTable {
   static constexpr size_t kLargestFile = size_t{4} << 20;
   static constexpr size_t kLongestName = 255;
 
-  // Null when the text cannot be read; `error` then names the line and what is wrong with it.
-  static std::shared_ptr<const NameTable> Parse(std::string_view text, std::string& error);
-  static std::shared_ptr<const NameTable> Load(const std::string& path, std::string& error);
+  // Null when the text cannot be read; the fault then names the line, in its text too, and what is wrong with it.
+  static std::shared_ptr<const NameTable> Parse(std::string_view text, NameTableFault& fault);
+  static std::shared_ptr<const NameTable> Load(const std::string& path, NameTableFault& fault);
 
   const std::vector<NameTableRow>& rows() const { return rows_; }  // as in the file
   const std::string* Find(uint16_t id) const;                      // null when there is no such row

@@ -59,7 +59,12 @@ class Files(ToolTest):
                                 (("mkdir", "/none/x"), "no such file"), (("put", local, ":/none/x"), "no such file"),
                                 (("mkdir", "/file"), "exists already")):
                 with self.subTest(words=words):
-                    self.assertIn(text, self.fs(7, *words)["error"]["text"])
+                    error = self.fs(7, *words)["error"]
+                    self.assertIn(text, error["text"])
+                    self.assertEqual(error["status"]["kind"], "efs")
+            for words in (("cat", ":/nope"), ("stat", "/nope"), ("get", ":/nope"), ("ls", "/nope"), ("rm", "/nope")):
+                with self.subTest(words=words):
+                    self.assertIn("no such file /nope on COM7", self.fs(7, *words)["error"]["text"])
 
     def test_mistakes_are_found_before_anything_is_copied(self):
         with self.handset():

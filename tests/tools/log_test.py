@@ -114,7 +114,10 @@ class Traffic(ToolTest):
             self.expect_json(10, "log", "play", "/nonexistent/capture")
             self.ask(10, "log", "capture", "/nonexistent/capture")
             self.ask(10, "log", "capture", "/dev/full")
-            self.ask(10, "log", "list", "--names", foreign)
+            error = self.ask(10, "log", "list", "--names", foreign)["error"]
+            self.assertEqual((error["function"], error["line"]), ("KRAL_LoadNameTable", 1))
+            error = self.ask(10, "log", "list", "--names", "/nonexistent/names")["error"]
+            self.assertGreater(error["system_error"], 0)
             self.ask(2, "log", "on")
             self.ask(2, "event", "on", "0x10-0x0F")
             self.ask(2, "event", "on", "0-65535")

@@ -40,16 +40,38 @@ class Failures(ToolTest):
                 process.communicate()
 
     def test_each_has_its_code_and_text(self):
-        for fault, words, code, text, hint, reply in (
-                ("ignore", ["info"], 5, "COM7", "", ""),
-                ("lose,of=7C", ["--time-out", "300", "raw", "7C"], 5, "command 7C", "still answers", ""),
-                ("refuse=24,of=29", ["raw", "29 05 00"], 7, "invalid for the current mode", "", "18"),
-                ("wrong=0x55,of=7C", ["raw", "7C"], 6, "", "", "")):
+        for fault, words, code, text, hint, status, reply in (
+                ("ignore", ["info"], 5, "COM7", "", None, ""),
+                ("lose,of=7C", ["--time-out", "300", "raw", "7C"], 5, "no answer to command 124 within 300 ms",
+                 "still answers", None, ""),
+                ("refuse=24,of=29", ["raw", "29 05 00"], 7, "not in the present operating mode", "kral mode ftm",
+                 {"kind": "refusal", "value": 24}, "18"),
+                ("wrong=0x55,of=7C", ["raw", "7C"], 6, "a reply of 85", "other program",
+                 {"kind": "reply", "value": 0x55}, "55")):
             with self.subTest(fault=fault), self.handset("--fault", fault):
                 answer = self.ask(code, *words)
-                self.assertIn(text, answer["error"]["text"])
-                self.assertIn(hint, answer["error"]["hint"])
+                error = answer["error"]
+                self.assertIn(text, error["text"])
+                self.assertIn("COM7", error["text"])
+                self.assertIn(hint, error["hint"])
+                self.assertEqual(error.get("status"), status)
+                self.assertEqual(error.get("function"), "KRAL_SendSync" if "raw" in words else None)
                 self.assertIn(reply, answer.get("reply", "")[:2])
+
+    def test_what_the_library_refuses_is_a_mistake_and_names_number_and_range(self):
+        with self.handset():
+            self.ask(0, "mode", "ftm")
+            for words, text, function in (
+                    (("ftm", "mode", "9999"), "RF mode 9999 is not one of the listed modes, 2 to 92",
+                     "KRAL_FTM_SET_MODE"),
+                    (("log", "on", "0x1FFF"), "log code 0x1FFF is not one of equipment id 1, 0x1000 to 0x1",
+                     "KRAL_DIAG_AddExtendedLogCodes"),
+                    (("event", "on", "4000"), "event 4000 is not one of the handset's, 0 to ",
+                     "KRAL_DIAG_SetEventMaskBits")):
+                with self.subTest(words=words):
+                    error = self.ask(2, *words)["error"]
+                    self.assertIn(text, error["text"])
+                    self.assertEqual(error["function"], function)
 
     def test_handset_that_vanishes_is_lost(self):
         with self.handset("--fault", "lose,of=7C") as sim, self.tool_waiting_for_an_answer() as process:

@@ -10,9 +10,9 @@ namespace {
 
 // "id=name" of each row, or what is wrong.
 std::string Parsed(std::string_view text) {
-  std::string error;
-  const auto table = NameTable::Parse(text, error);
-  if (!table) return error;
+  NameTableFault fault;
+  const auto table = NameTable::Parse(text, fault);
+  if (!table) return fault.text;
   std::string rows;
   for (const auto& row : table->rows()) rows += std::to_string(row.id) + "=" + row.name + ";";
   return rows;
@@ -38,16 +38,18 @@ TEST(NameTable, ReadsWhatUsersWrite) {
   for (const auto& c : cases) EXPECT_EQ(Parsed(c.text), c.rows) << c.text;
   EXPECT_EQ(Parsed("1 " + std::string(255, 'x')).size(), 258u);
   EXPECT_EQ(Parsed("1 " + std::string(256, 'x')), "line 1: the name is too long");
-  std::string error;
-  EXPECT_EQ(NameTable::Load("/nonexistent", error), nullptr);
-  EXPECT_NE(error, "");
+  NameTableFault fault;
+  EXPECT_EQ(NameTable::Load("/nonexistent", fault), nullptr);
+  EXPECT_NE(fault.text, "");
+  EXPECT_EQ(fault.line, 0u);
+  EXPECT_TRUE(fault.system_error);
 }
 
 TEST(NameTables, ListWithoutRowsAllowsEverything) {
   NameTables tables;
   EXPECT_TRUE(tables.Allows(NameTableKind::kAllowedLogs, 5));
-  std::string error;
-  tables.Set(NameTableKind::kAllowedLogs, NameTable::Parse("4", error));
+  NameTableFault fault;
+  tables.Set(NameTableKind::kAllowedLogs, NameTable::Parse("4", fault));
   EXPECT_FALSE(tables.Allows(NameTableKind::kAllowedLogs, 5));
   EXPECT_TRUE(tables.Allows(NameTableKind::kAllowedLogs, 4));
   EXPECT_TRUE(tables.Allows(NameTableKind::kAllowedEvents, 5)) << "another table";

@@ -1,49 +1,34 @@
-// Drives the boot transfer of the library, and finds in its log why a transfer failed.
+// Drives the boot transfer of the library, and says what to do about one that failed.
 #include "tools/kral/boot_target.h"
 
 #include <fmt/format.h>
 
-#include <algorithm>
-#include <array>
-
 #include "platform/clock.h"
-#include "tools/kral/error_lines.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/result_lines.h"
 
 namespace kral::tool {
 namespace {
 
 constexpr std::uint32_t kLookAroundMs = 100;
-constexpr std::string_view kGone = "the device has gone";
-constexpr std::string_view kStatus = "Kivrat: image transfer status ";
 
-struct Reason {
-  std::string_view line;  // part of the library's line
-  ExitCode code;
-  std::string_view text;  // what happened on the port
-  std::string_view hint;
-};
-
-// The first that is in the log explains the failure.
-constexpr std::array<Reason, 9> kReasons{{
-    {kGone, ExitCode::kLost, "the handset went away", "check the cable, power the handset off and on and begin again"},
-    {"is not a HELLO_REQ", ExitCode::kLink, "something other than a boot loader answers",
-     "check the port: the handset may be running its software, from which --enter leads into the boot loader"},
-    {"cannot be opened", ExitCode::kBadFile, "the file of the flash programmer cannot be read",
-     "check its name and permissions, power the handset off and on and begin again"},
-    {"Kivrat: the file has no more", ExitCode::kBadFile,
-     "the flash programmer ends before the boot loader has all of it",
-     "check that the file is whole and meant for this handset; power the handset off and on and begin again"},
-    {"Failed to send", ExitCode::kLink, "a packet could not be written", "check the cable and begin again"},
-    {"Failed to write", ExitCode::kLink, "a packet could not be written", "check the cable and begin again"},
-    // In front of the lines that follow it in the log.
-    {"Kivrat: a ", ExitCode::kLink, "the boot loader sent a packet that makes no sense",
-     "power the handset off and on and begin again; --log FILE shows the packets"},
-    {"Failed to re", ExitCode::kNoAnswer, "no boot loader answers in time",
-     "power the handset off and on: its hello comes once, and is lost when another program reads it"},
-    {"Recieved ", ExitCode::kLink, "the boot loader answered with something else",
-     "power the handset off and on and begin again; --log FILE shows the packets"},
-}};
+// What to do where a boot loader is concerned.
+std::string HintOf(std::uint32_t code) {
+  switch (code) {
+    case KRAL_ERROR_NO_ANSWER:
+      return "power the handset off and on: its hello comes once, and is lost when another program reads it";
+    case KRAL_ERROR_LINK:
+      return "power the handset off and on and begin again; one that runs its software is led into its boot loader by "
+             "--enter";
+    case KRAL_ERROR_LOST:
+      return "check the cable, power the handset off and on and begin again";
+    case KRAL_ERROR_BAD_FILE:
+      return "check that the file is whole and meant for this handset; power the handset off and on and begin again";
+    default:
+      return {};
+  }
+}
 
 }  // namespace
 
@@ -72,9 +57,10 @@ void KRAL_CALL BootTarget::OnProgress(KRAL_HANDLE, std::uint32_t done, std::uint
 BootIdentity BootTarget::Connect(bool ask_identity) {
   BootIdentity identity;
   AwaitPort([&] {
-    std::uint32_t chip = 0;
+    constexpr std::uint32_t kNone = 0;  // no chip has it
+    std::uint32_t chip = kNone;
     if (KRAL_Kivrat_Connect(session_.handle(), &identity.version, ask_identity ? &chip : nullptr) == 0) return false;
-    if (FindErrorLine("BXC ID read from PBL")) identity.chip = chip;
+    if (chip != kNone) identity.chip = chip;
     return true;
   });
   return identity;
@@ -89,12 +75,12 @@ void BootTarget::Load(const std::string& programmer) {
   progress_ = nullptr;
   if (!loaded) throw Explain();
   // The protocol goes on whatever the target says; a person wants to know.
-  const auto status = FindErrorLine(kStatus);
-  if (status && !status->ends_with(" 0")) {
-    throw ToolError(ExitCode::kRefused,
-                    fmt::format("the boot loader on {} refused {}: status {}", DescribePort(session_.port()),
-                                programmer, status->substr(kStatus.size())),
-                    "check that the file is a flash programmer for this handset");
+  const auto status = ResultLine(kTransferStatus);
+  if (status && *status != "0") {
+    throw ToolError(
+        ExitCode::kRefused,
+        fmt::format("the boot loader on {} refused {}: status {}", DescribePort(session_.port()), programmer, *status),
+        "check that the file is a flash programmer for this handset");
   }
 }
 
@@ -120,11 +106,10 @@ void BootTarget::FlashAll(const std::string& programmer, const std::vector<Flash
       throw ToolError(
           ExitCode::kNoAnswer,
           fmt::format("{} was transferred but does not answer on {}", programmer, DescribePort(session_.port())),
-          "check that the programmer is meant for this handset");
+          "check that the programmer is meant for this handset", LastError(session_.handle()));
     }
-    if (failed < images.size()) throw ExplainWrite(session_.port(), images[failed].file, result);
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} is missing, empty or unreadable", programmer),
-                    "check its name and permissions");
+    if (failed < images.size()) throw ExplainWrite(session_, images[failed].file, result);
+    throw Explain();
   });
 }
 
@@ -144,22 +129,16 @@ void BootTarget::AwaitPort(const std::function<bool()>& attempt) {
   }
 }
 
+// Also one that has gone and may come back.
 bool BootTarget::IsPortMissing() const {
-  if (FindErrorLine(kGone)) return true;
-  std::int32_t state = KRAL_PORT_CLOSED;
-  KRAL_GetPortState(session_.handle(), &state);
-  return FindErrorLine("Failed KivratInit()") && state != KRAL_PORT_BUSY && state != KRAL_PORT_NOT_PERMITTED;
+  const auto record = LastError(session_.handle());
+  return record && (record->code == KRAL_ERROR_NO_PORT || record->code == KRAL_ERROR_LOST);
 }
 
 ToolError BootTarget::Explain() const {
+  const auto record = LastError(session_.handle());
   if (Interrupted()) return InterruptedError();
-  if (const auto trouble = session_.PortTrouble()) return *trouble;
-  for (const auto& reason : kReasons) {
-    if (!FindErrorLine(reason.line)) continue;
-    return {reason.code, fmt::format("{} on {}", reason.text, DescribePort(session_.port())), std::string(reason.hint)};
-  }
-  return {ExitCode::kLink, fmt::format("the boot transfer on {} failed", DescribePort(session_.port())),
-          "--log FILE shows the packets"};
+  return ExplainRecord(record, "the boot transfer", session_.port(), record ? HintOf(record->code) : std::string());
 }
 
 }  // namespace kral::tool

@@ -4,9 +4,12 @@
 
 #include <array>
 #include <cstddef>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <utility>
+
+#include "kral/error.h"
 
 namespace kral::tool {
 
@@ -57,18 +60,35 @@ constexpr const char* NameOf(ExitCode code) {
   return "internal";
 }
 
-// What ends a verb early: what happened and where (text), and what to try next (hint).
+// The library's codes are the tool's.
+static_assert(static_cast<int>(ExitCode::kInternal) == KRAL_ERROR_INTERNAL);
+static_assert(static_cast<int>(ExitCode::kUsage) == KRAL_ERROR_ARGUMENT);
+static_assert(static_cast<int>(ExitCode::kNoPort) == KRAL_ERROR_NO_PORT);
+static_assert(static_cast<int>(ExitCode::kPortInUse) == KRAL_ERROR_PORT_IN_USE);
+static_assert(static_cast<int>(ExitCode::kNoAnswer) == KRAL_ERROR_NO_ANSWER);
+static_assert(static_cast<int>(ExitCode::kLink) == KRAL_ERROR_LINK);
+static_assert(static_cast<int>(ExitCode::kRefused) == KRAL_ERROR_REFUSED);
+static_assert(static_cast<int>(ExitCode::kMismatch) == KRAL_ERROR_MISMATCH);
+static_assert(static_cast<int>(ExitCode::kLost) == KRAL_ERROR_LOST);
+static_assert(static_cast<int>(ExitCode::kBadFile) == KRAL_ERROR_BAD_FILE);
+static_assert(static_cast<int>(ExitCode::kSafetyStop) == KRAL_ERROR_SAFETY_STOP);
+static_assert(static_cast<int>(ExitCode::kInterrupted) == KRAL_ERROR_ABORTED);
+
+// What ends a verb early: what happened and where (text), and what to try next (hint). With it goes the record that the
+// library left, where a call of the library failed.
 class ToolError : public std::runtime_error {
  public:
-  ToolError(ExitCode code, const std::string& text, std::string hint)
-      : std::runtime_error(text), code_(code), hint_(std::move(hint)) {}
+  ToolError(ExitCode code, const std::string& text, std::string hint, std::optional<KRAL_ERROR> record = {})
+      : std::runtime_error(text), code_(code), hint_(std::move(hint)), record_(record) {}
 
   ExitCode code() const { return code_; }
   const std::string& hint() const { return hint_; }
+  const std::optional<KRAL_ERROR>& record() const { return record_; }
 
  private:
   ExitCode code_;
   std::string hint_;
+  std::optional<KRAL_ERROR> record_;
 };
 
 }  // namespace kral::tool

@@ -6,9 +6,8 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
-#include <ranges>
 
-#include "tools/kral/error_lines.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
 
 namespace kral::tool {
@@ -18,14 +17,40 @@ constexpr std::chrono::milliseconds kLookAround{50};
 constexpr std::uint32_t kAllTries = 5;
 constexpr std::uint32_t kRetryDelayMs = 500;
 
-// Since the handset last did as it was asked: what timed out before was made good.
-bool TimedOutLast() {
-  const auto lines = ErrorLines();
-  for (const auto& line : lines | std::views::reverse) {
-    if (line.find("Request timed out") != std::string::npos) return true;
-    if (line.starts_with("HELLO command succeeded") || line.starts_with("Enqueued")) return false;
+constexpr const char* kLooksInto = "kral flash verify-image FILE tells what is in it";
+
+// What to do about an image that was not written; nothing where code and status of the record say enough.
+std::string HintOfWrite(std::uint32_t result, std::uint32_t code) {
+  if (code == KRAL_ERROR_NO_PORT || code == KRAL_ERROR_PORT_IN_USE) return {};
+  constexpr const char* kTakesLong = "flash that is being erased takes long: --time-out MS waits longer";
+  const bool silent = code == KRAL_ERROR_NO_ANSWER;
+  const bool refused = code == KRAL_ERROR_REFUSED;
+  switch (result) {
+    case KRAL_STREAM_FILE_NOT_OPENED:
+    case KRAL_STREAM_FILE_NOT_DECODED:
+    case KRAL_STREAM_BAD_IMAGE:
+    case KRAL_STREAM_DATA_LOST:
+    case KRAL_STREAM_FILE_TOO_LARGE:
+    case KRAL_STREAM_PAST_END:
+      return kLooksInto;
+    case KRAL_STREAM_FILE_NOT_READ:
+      return "the flash holds part of the image: write it again when the file is complete";
+    case KRAL_STREAM_OPEN_FAILED:
+      return silent    ? kTakesLong
+             : refused ? "check the image type (--type) and that the header has at most 512 bytes"
+                       : "";
+    case KRAL_STREAM_WRITE_FAILED:
+      return "the flash holds part of the image: check cable and power and write it again; a programmer that never "
+             "answers long blocks needs --block-size 8186";
+    case KRAL_STREAM_NOT_COMPLETED:
+      return "write the image again";
+    case KRAL_STREAM_CLOSE_FAILED:
+      return silent    ? kTakesLong
+             : refused ? "check that the image is meant for this handset and the header belongs to it"
+                       : "";
+    default:
+      return {};
   }
-  return false;
 }
 
 }  // namespace
@@ -108,19 +133,11 @@ void FlashTarget::Load(const FlashImage& programmer, std::uint32_t maximum_packe
       KRAL_KOVA_LoadFlashProgrammer(session_.handle(), programmer.file.c_str(), maximum_packet, &result) != 0;
   progress_ = nullptr;
   if (loaded) return;
-  switch (result) {
-    case KRAL_DOWNLOAD_ABORTED:
-      throw InterruptedError();
-    case KRAL_KOVA_FILE_NOT_OPENED:
-    case KRAL_KOVA_FILE_NOT_DECODED:
-    case KRAL_KOVA_DATA_LOST:
-      throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read as a flash programmer", programmer.file),
-                      "kral flash verify-image FILE tells what is in it");
-    case KRAL_KOVA_GO_FAILED:
-      throw session_.Explain("the start of the flash programmer");
-    default:
-      throw session_.Explain("loading the flash programmer");
-  }
+  const auto record = LastError(session_.handle());
+  if (result == KRAL_DOWNLOAD_ABORTED) throw InterruptedError();
+  if (record && record->code == KRAL_ERROR_BAD_FILE) throw ExplainRecord(*record, {}, session_.port(), kLooksInto);
+  throw session_.Explain(result == KRAL_KOVA_GO_FAILED ? "the start of the flash programmer"
+                                                       : "loading the flash programmer");
 }
 
 void FlashTarget::SetSecurityMode(std::uint8_t mode) {
@@ -130,24 +147,18 @@ void FlashTarget::SetSecurityMode(std::uint8_t mode) {
 
 void FlashTarget::SendPartitionTable(const std::string& file, bool override_table) {
   session_.Begin();
-  constexpr std::uint8_t kNothing = 0;
-  std::uint8_t status = kNothing;
+  std::uint8_t status = 0;
   if (KRAL_STREAM_PARTITION_TABLE(session_.handle(), file.c_str(), override_table ? 1 : 0, &status) != 0) return;
-  if (FindErrorLine("partition : failed to open file") || FindErrorLine("partition : file exceeds")) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no partition table", file),
-                    "the file must be readable and have at most 512 bytes");
+  const auto record = LastError(session_.handle());
+  if (record && record->code == KRAL_ERROR_BAD_FILE) {
+    throw ExplainRecord(*record, {}, session_.port(), "the file must be readable and have at most 512 bytes");
   }
-  if (status == kNothing) throw session_.Explain("the partition table");
-  static constexpr std::array<std::pair<const char*, const char*>, 3> kRefusals{{
-      {"differs from the one in flash", "--override replaces the table, and with it what the partitions hold"},
-      {"has a bad format", "check that the file is a table for this handset"},
-      {"could not replace the one in flash", "the flash could not be erased"},
-  }};
-  const bool known = status <= kRefusals.size();
-  throw ToolError(ExitCode::kRefused,
-                  fmt::format("the handset refused the partition table {}: it {}", file,
-                              known ? kRefusals[status - 1u].first : fmt::format("gave status {}", status)),
-                  known ? kRefusals[status - 1u].second : "see the documentation of the flash programmer");
+  if (status == 0) throw session_.Explain("the partition table");
+  static constexpr std::array kHints{"--override replaces the table, and with it what the partitions hold",
+                                     "check that the file is a table for this handset",
+                                     "the flash could not be erased"};
+  throw ExplainRecord(record, fmt::format("the partition table {}", file), session_.port(),
+                      status <= kHints.size() ? kHints[status - 1u] : "see the documentation of the flash programmer");
 }
 
 void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, const ProgrammerLimits& limits,
@@ -164,52 +175,14 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
                                                   options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE, block_size,
                                                   limits.window, &result) != 0;
   progress_ = nullptr;
-  if (!written) throw ExplainWrite(session_.port(), image.file, result);
+  if (!written) throw ExplainWrite(session_, image.file, result);
 }
 
-ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_t result) {
-  const auto where = DescribePort(port);
-  const bool timed_out = TimedOutLast();
-  switch (result) {
-    case KRAL_DOWNLOAD_ABORTED:
-      return InterruptedError();
-    case KRAL_STREAM_FILE_NOT_OPENED:
-    case KRAL_STREAM_FILE_NOT_DECODED:
-    case KRAL_STREAM_BAD_IMAGE:
-    case KRAL_STREAM_DATA_LOST:
-    case KRAL_STREAM_FILE_TOO_LARGE:
-    case KRAL_STREAM_PAST_END:
-      return {ExitCode::kBadFile, fmt::format("{} or its header cannot be used as an image", file),
-              "kral flash verify-image FILE tells what is in it"};
-    case KRAL_STREAM_FILE_NOT_READ:
-      return {ExitCode::kBadFile, fmt::format("{} became shorter while it was written", file),
-              "the flash holds part of the image: write it again when the file is complete"};
-    case KRAL_STREAM_OPEN_FAILED:
-      if (timed_out) break;
-      return {ExitCode::kRefused, fmt::format("the handset on {} refused to open {}", where, file),
-              "check the image type (--type) and that the header has at most 512 bytes"};
-    case KRAL_STREAM_WRITE_FAILED:
-      if (FindErrorLine("write error")) {
-        return {ExitCode::kLink, fmt::format("{} was answered with something else on {}", file, where),
-                "the flash holds part of the image: write it again; --log FILE shows the traffic"};
-      }
-      return {ExitCode::kLost, fmt::format("the handset on {} fell silent while {} was written", where, file),
-              "the flash holds part of the image: check cable and power and write it again; a programmer that never "
-              "answers long blocks needs --block-size 8186"};
-    case KRAL_STREAM_NOT_COMPLETED:
-      return {ExitCode::kLost, fmt::format("the end of {} was not acknowledged on {}", file, where),
-              "write the image again"};
-    case KRAL_STREAM_CLOSE_FAILED:
-      if (timed_out) break;
-      return {ExitCode::kRefused, fmt::format("the handset on {} did not accept {} when it was closed", where, file),
-              "check that the image is meant for this handset and the header belongs to it"};
-    default:
-      return {ExitCode::kInternal, fmt::format("writing {} on {} failed", file, where), "--log FILE shows why"};
-  }
-  return {ExitCode::kNoAnswer,
-          fmt::format("no answer in time to {} of {} on {}",
-                      result == KRAL_STREAM_OPEN_FAILED ? "the opening" : "the closing", file, where),
-          "flash that is being erased takes long: --time-out MS waits longer"};
+ToolError ExplainWrite(const Session& session, const std::string& file, std::uint32_t result) {
+  const auto record = LastError(session.handle());
+  if (result == KRAL_DOWNLOAD_ABORTED) return InterruptedError();
+  return ExplainRecord(record, fmt::format("writing {}", file), session.port(),
+                       HintOfWrite(result, record ? record->code : KRAL_ERROR_INTERNAL));
 }
 
 }  // namespace kral::tool

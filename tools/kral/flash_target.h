@@ -46,8 +46,8 @@ struct WriteOptions {
   std::uint32_t block_size = 0;  // at most this; 0: as the handset says
 };
 
-// Why an image could not be written; `result` as KRAL_STREAM_WriteImageFile gave it.
-ToolError ExplainWrite(std::uint16_t port, const std::string& file, std::uint32_t result);
+// Why an image could not be written, right behind the call; `result` as KRAL_STREAM_WriteImageFile gave it.
+ToolError ExplainWrite(const Session& session, const std::string& file, std::uint32_t result);
 
 class FlashTarget {
  public:

@@ -324,7 +324,8 @@ void Copier::Report() const {
   if (failed_ > 0) {
     context_.found.update(Members());
     const auto more = failed_ > 1 ? fmt::format(", and {} more", failed_ - 1) : std::string();
-    throw ToolError(first_failure_->code(), first_failure_->what() + more, first_failure_->hint());
+    throw ToolError(first_failure_->code(), first_failure_->what() + more, first_failure_->hint(),
+                    first_failure_->record());
   }
   auto members = Members();
   if (options_.verify) members["verified"] = true;

@@ -1,14 +1,12 @@
-// Calls the library and turns its results, error numbers and log lines into errors that name the path.
+// Calls the library and turns its results and error numbers into errors that name the path.
 #include "tools/kral/fs_remote.h"
 
 #include <fmt/format.h>
 
 #include <algorithm>
-#include <array>
-#include <charconv>
 #include <utility>
 
-#include "tools/kral/error_lines.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/fs_names.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/output.h"
@@ -22,42 +20,6 @@ constexpr std::size_t kMostEntries = 200'000;  // of all directories that a verb
 
 // The callbacks carry the handle and nothing else.
 RemoteFiles* current = nullptr;
-
-// What the library writes about a failed transfer, and what that means. A number may follow.
-struct Reason {
-  std::string_view line;
-  ExitCode code;
-  bool numbered;
-  std::string_view text;
-  std::string_view hint;
-};
-constexpr std::string_view kCheckPath = "kral fs stat and kral fs ls show what is there";
-constexpr std::array<Reason, 11> kReasons{{
-    {" error code ", ExitCode::kRefused, true, "", kCheckPath},
-    {"StatFSAvailSpace() returned ", ExitCode::kRefused, true, "", "kral fs df asks for the room by itself"},
-    {"Available size on local disk is insufficient.", ExitCode::kRefused, false, "no room left on the handset",
-     "kral fs df shows the room; kral fs rm makes some"},
-    {"received ERRNO ", ExitCode::kRefused, true, "", kCheckPath},
-    {"is not supported by target", ExitCode::kRefused, false, "the handset does not know the request",
-     "other firmware may"},
-    {"not in sync after", ExitCode::kNoAnswer, false, "not done in time", "--wait MS waits longer"},
-    {"too long", ExitCode::kUsage, false, "the path is too long for a request",
-     "a request has 256 bytes at most: shorten the names"},
-    {"fopen() failed to open PC file", ExitCode::kBadFile, false, "the local file cannot be written",
-     "check folder and permissions"},
-    {"Failed to write to the local file", ExitCode::kBadFile, false, "the local file cannot be written",
-     "check the disk"},
-    {"EFS Read ended at", ExitCode::kLink, false, "the handset gave fewer bytes than it had told",
-     "the file may be in use: try again"},
-    {"EFS Read needs more than", ExitCode::kLink, false, "the handset gave more bytes than it had told",
-     "the file may be in use: try again"},
-}};
-
-std::uint32_t NumberAfter(std::string_view line, std::size_t at) {
-  std::uint32_t number = 0;
-  std::from_chars(line.data() + at, line.data() + line.size(), number);
-  return number;
-}
 
 RemoteEntry::Kind KindOfEntry(const KRAL_EFS_ENTRY& entry) {
   if (entry.type == KRAL_EFS_ENTRY_FILE) return RemoteEntry::Kind::kFile;
@@ -120,41 +82,30 @@ std::string RemoteFiles::Where(std::string_view path) const {
   return fmt::format("{} on {}", Printable(path), DescribePort(session_.port()));
 }
 
-ToolError RemoteFiles::Refusal(std::string_view what, std::uint32_t error_number) const {
-  return {ExitCode::kRefused,
-          fmt::format("the handset refused {} on {}: {}", what, DescribePort(session_.port()), ErrorText(error_number)),
-          std::string(kCheckPath)};
-}
-
-ToolError RemoteFiles::Explain(std::string_view what) const {
-  if (Interrupted()) return InterruptedError();
-  // Not the results: they carry paths, which may read like any of the reasons.
-  const auto lines = ErrorLines(KRAL_LOG_ERR);
-  // The last word counts: a try that was refused may have been followed by one that got no answer.
-  for (auto line = lines.rbegin(); line != lines.rend(); ++line) {
-    if (line->find("Request timed out") != std::string::npos) break;
-    if (line->find("Error. Send data failed.") != std::string::npos) break;
-    for (const auto& reason : kReasons) {
-      const auto at = line->find(reason.line);
-      if (at == std::string::npos) continue;
-      if (reason.numbered) return Refusal(what, NumberAfter(*line, at + reason.line.size()));
-      return {reason.code, fmt::format("{} failed on {}: {}", what, DescribePort(session_.port()), reason.text),
-              std::string(reason.hint)};
-    }
-  }
-  return session_.Explain(what);
+// A call whose answer is an error number has not failed, and leaves no record: the number is told as one is.
+ToolError RemoteFiles::Refusal(std::string_view what, std::string_view path, std::uint32_t error_number) const {
+  KRAL_ERROR record{};
+  record.code = KRAL_ERROR_REFUSED;
+  record.status_kind = KRAL_ERROR_STATUS_EFS;
+  record.status = error_number;
+  const std::string text = error_number == kNoSuchFile && !path.empty()
+                               ? fmt::format("no such file {}", Printable(path))
+                               : fmt::format("the handset refused {}: {}", what, ErrorText(error_number));
+  text.copy(record.text, sizeof record.text - 1);
+  return ExplainRecord(record, what, session_.port());
 }
 
 template <class Request>
 void RemoteFiles::Transfer(std::string_view what, Request&& request) {
   session_.Begin();
-  if (request() == 0) throw Explain(what);
+  if (request() == 0) throw session_.Explain(what);
 }
 
-void RemoteFiles::Ask(std::string_view what, const std::function<std::uint8_t(std::uint32_t*)>& request) {
+void RemoteFiles::Ask(std::string_view what, std::string_view path,
+                      const std::function<std::uint8_t(std::uint32_t*)>& request) {
   std::uint32_t error = 0;
   Transfer(what, [&] { return request(&error); });
-  if (error != 0) throw Refusal(what, error);
+  if (error != 0) throw Refusal(what, path, error);
 }
 
 std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
@@ -166,13 +117,13 @@ std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
                                &status.accessed, &status.modified, &status.changed);
   });
   if (error == kNoSuchFile) return std::nullopt;
-  if (error != 0) throw Refusal(what, error);
+  if (error != 0) throw Refusal(what, path, error);
   return status;
 }
 
 RemoteStatus RemoteFiles::Status(const std::string& path) {
   if (const auto status = Find(path)) return *status;
-  throw Refusal(fmt::format("the status of {}", Printable(path)), kNoSuchFile);
+  throw Refusal(fmt::format("the status of {}", Printable(path)), path, kNoSuchFile);
 }
 
 std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
@@ -181,7 +132,7 @@ std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
   const auto what = fmt::format("the listing of {}", Printable(path));
   session_.Begin();
   if (KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr) == 0) {
-    if (Interrupted() || entry_count_ < kMostEntries) throw Explain(what);
+    if (Interrupted() || entry_count_ < kMostEntries) throw session_.Explain(what);
     throw ToolError(
         ExitCode::kLink,
         fmt::format("{} on {} does not end: {} entries so far", what, DescribePort(session_.port()), entry_count_),
@@ -197,10 +148,10 @@ void RemoteFiles::MakeDirectory(const std::string& path) {
   std::uint32_t error = 0;
   session_.Begin();
   if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) == 0) {
-    throw error != 0 ? Refusal(what, error) : Explain(what);
+    throw error != 0 ? Refusal(what, {}, error) : session_.Explain(what);
   }
   // The handset says the same of a file in the way.
-  if (error == kExists && !Status(path).is_directory()) throw Refusal(what, kExists);
+  if (error == kExists && !Status(path).is_directory()) throw Refusal(what, path, kExists);
 }
 
 void RemoteFiles::MakeParents(const std::string& path) {

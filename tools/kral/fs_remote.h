@@ -62,8 +62,10 @@ class RemoteFiles {
   RemoteStatus Status(const std::string& path);
   std::vector<RemoteEntry> List(const std::string& path);  // by name, without "." and ".."
 
-  // A request whose answer is an error number; `what` names it, such as "the removal of /a".
-  void Ask(std::string_view what, const std::function<std::uint8_t(std::uint32_t* error_number)>& request);
+  // A request whose answer is an error number; `what` names it, such as "the removal of /a". `path` is what is missing
+  // where there is no such file.
+  void Ask(std::string_view what, std::string_view path,
+           const std::function<std::uint8_t(std::uint32_t* error_number)>& request);
   void MakeDirectory(const std::string& path);
   void MakeParents(const std::string& path);  // and the directory itself
 
@@ -72,16 +74,13 @@ class RemoteFiles {
   void Write(const std::string& path, std::span<const std::uint8_t> bytes);
   void WriteItem(const std::string& path, std::span<const std::uint8_t> bytes);
 
-  // Why the transfer or longer operation that has just failed did so.
-  ToolError Explain(std::string_view what) const;
-
  private:
   static void KRAL_CALL OnChunk(std::uintptr_t source, std::uintptr_t destination, std::uint32_t operation,
                                 std::uint32_t reserved, std::uint32_t done, std::uint32_t total, KRAL_HANDLE handle);
   static void KRAL_CALL OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle);
   template <class Request>
   void Transfer(std::string_view what, Request&& request);
-  ToolError Refusal(std::string_view what, std::uint32_t error_number) const;
+  ToolError Refusal(std::string_view what, std::string_view path, std::uint32_t error_number) const;
 
   Session session_;
   Watch watch_;

@@ -162,7 +162,7 @@ void Stat(Context& context, RemoteFiles& files, const FsOptions& options) {
 void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   KRAL_EFS_STATFS status{};
-  files.Ask(fmt::format("the room of {}", Printable(path)), [&](std::uint32_t* error) {
+  files.Ask(fmt::format("the room of {}", Printable(path)), path, [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_STATFS(files.session().handle(), path.c_str(), error, &status);
   });
   const auto bytes = [&status](std::uint32_t blocks) { return std::uint64_t{blocks} * status.block_size; };
@@ -199,7 +199,7 @@ void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
 
 void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, PathCall call) {
   ForEachPath(context, files, options, [&](const std::string& path) {
-    files.Ask(fmt::format("the removal of {}", Printable(path)),
+    files.Ask(fmt::format("the removal of {}", Printable(path)), path,
               [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
   });
 }
@@ -226,7 +226,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto from = EfsPath(options.paths[0]);
   auto to = EfsPath(options.paths[1]);
   if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
-  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), [&](std::uint32_t* error) {
+  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), from, [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
   });
   context.out.Result({{"port", files.session().port()}, {"from", from}, {"to", to}}, "");
@@ -235,7 +235,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
 void Link(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto target = EfsPath(options.paths[0]);
   const auto link = EfsPath(options.paths[1]);
-  files.Ask(fmt::format("the link {}", Printable(link)), [&](std::uint32_t* error) {
+  files.Ask(fmt::format("the link {}", Printable(link)), {}, [&](std::uint32_t* error) {
     return KRAL_EfsCreateLink(files.session().handle(), target.c_str(), link.c_str(), error);
   });
   context.out.Result({{"port", files.session().port()}, {"target", target}, {"link", link}}, "");
@@ -245,7 +245,9 @@ void Sync(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   files.session().Begin();
   if (KRAL_EFS2_SyncWithWait(files.session().handle(), path.c_str(), options.wait_ms) == 0) {
-    throw files.Explain(fmt::format("the sync of {}", Printable(path)));
+    const ToolError error = files.session().Explain(fmt::format("the sync of {}", Printable(path)));
+    if (error.code() != ExitCode::kNoAnswer) throw error;
+    throw ToolError(error.code(), error.what(), "--wait MS waits longer", error.record());
   }
   context.out.Result({{"port", files.session().port()}, {"path", path}}, "");
 }

@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/playback.h"
 #include "tools/kral/progress.h"
@@ -165,8 +166,8 @@ void Capture(Context& context, LogOptions& options) {
   const auto codes = ParseIds(options.codes);
   Session session(context.session);
   if (KRAL_StartCapture(session.handle(), options.file.c_str()) == 0) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written", options.file),
-                    "check folder, permissions and room on the disk");
+    throw ExplainRecord(LastError(session.handle()), "the capture", session.port(),
+                        "check folder, permissions and room on the disk");
   }
   SwitchCodes(session, codes, true);
   KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);

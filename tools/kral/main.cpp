@@ -6,9 +6,9 @@
 #include <array>
 #include <string_view>
 
-#include "tools/kral/error_lines.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/result_lines.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -42,7 +42,8 @@ void AllowOptionsAnywhere(CLI::App& app) {
 
 // The verb has done its work all the same.
 void TellLogFileTrouble(const Context& context) {
-  if (const auto trouble = LogFileTrouble()) context.out.Note(*trouble);
+  if (const auto trouble = ResultLine(kLogFileTrouble))
+    context.out.Note(fmt::format("{}{}", kLogFileTrouble, *trouble));
 }
 
 int End(const Context& context, const ToolError& error) {

@@ -47,7 +47,12 @@ std::uint8_t ReadOperatingState(const Session& session, std::uint32_t& state) {
                     static_cast<std::uint32_t>(time_out)) == 0) {
     return 0;
   }
-  if (size < kStateOffset + 4) return 0;
+  if (size < kStateOffset + 4) {
+    throw ToolError(ExitCode::kLink,
+                    fmt::format("the reply to the operating-mode query on {} has {} bytes: too few for a mode",
+                                DescribePort(session.port()), size),
+                    "other firmware may tell it; kral raw 4B 0F 00 00 shows the reply");
+  }
   state = 0;
   for (std::size_t i = 0; i < 4; ++i) state |= std::uint32_t{reply[kStateOffset + i]} << (8 * i);
   return 1;

@@ -4,11 +4,13 @@
 #include <CLI/CLI.hpp>
 #include <array>
 #include <memory>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "tools/kral/abort_on_interrupt.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/nv_items.h"
 #include "tools/kral/progress.h"
@@ -76,7 +78,7 @@ class JobRun {
     std::uint32_t status = KRAL_PKV_STATUS_LOST;
     {
       const AbortOnInterrupt watch(session.handle());
-      job(session.handle(), file.c_str(), &status);
+      if (job(session.handle(), file.c_str(), &status) == 0) record_ = LastError(session.handle());
     }
     KRAL_ConfigureEfs2CallBacks(session.handle(), nullptr, nullptr);
     KRAL_PKV_ConfigureCallBack(session.handle(), nullptr);
@@ -85,6 +87,7 @@ class JobRun {
   }
 
   const KRAL_PKV_COUNTS& counts() const { return counts_; }
+  const std::optional<KRAL_ERROR>& record() const { return record_; }  // of a run that failed
   const Json& items() const { return items_; }
   const std::string& text() const { return text_; }
 
@@ -162,28 +165,30 @@ class JobRun {
   Progress progress_;
   std::uint64_t listed_ = 0;
   KRAL_PKV_COUNTS counts_{};
+  std::optional<KRAL_ERROR> record_;
   Json items_ = Json::array();
   std::string text_;
 };
 
-ToolError BadFile(const std::string& file, std::uint32_t status) {
+ToolError BadFile(const std::string& file, std::uint32_t status, const std::optional<KRAL_ERROR>& record) {
+  constexpr const char* kHint = "check the file and the disk that it is on, then run the command again";
+  if (record && record->code == KRAL_ERROR_BAD_FILE) return {ExitCode::kBadFile, record->text, kHint, record};
   const char* const fault = status == KRAL_PKV_STATUS_NO_STORAGE ? "is no PKV file"
                             : status == KRAL_PKV_STATUS_BAD_ITEM ? "holds a damaged item"
                                                                  : "cannot be used";
-  return {ExitCode::kBadFile, fmt::format("{} {}{}", file, fault, CauseOf(file)),
-          "check the file and the disk that it is on, then run the command again"};
+  return {ExitCode::kBadFile, fmt::format("{} {}", file, fault), kHint, record};
 }
 
 // The end of a job that did not come out as wanted.
 ToolError Explain(const Session& session, const char* work, const std::string& file, std::uint32_t status,
-                  const KRAL_PKV_COUNTS& counts) {
+                  const KRAL_PKV_COUNTS& counts, const std::optional<KRAL_ERROR>& record) {
   const std::string where = fmt::format("the {} on {}", work, DescribePort(session.port()));
   switch (status) {
     case KRAL_PKV_STATUS_STOPPED:
       return InterruptedError();
     case KRAL_PKV_STATUS_LOST:
       return {ExitCode::kLost, fmt::format("the handset stopped answering during {}", where),
-              "check the cable, then run the command again"};
+              "check the cable, then run the command again", record};
     case KRAL_PKV_STATUS_NOTHING_READ:
       if (counts.refused > 0) {
         return {
@@ -211,9 +216,9 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
       return {ExitCode::kMismatch, fmt::format("{} and the handset on {} differ", file, DescribePort(session.port())),
               "the result names the items; kral nv restore writes them"};
     case KRAL_PKV_STATUS_UNEXPECTED:
-      return {ExitCode::kInternal, fmt::format("{} failed within the library", where), "--log FILE tells more"};
+      return {ExitCode::kInternal, fmt::format("{} failed within the library", where), "--log FILE tells more", record};
     default:
-      return BadFile(file, status);
+      return BadFile(file, status, record);
   }
 }
 
@@ -233,6 +238,7 @@ void RunJob(Context& context, const BackupOptions& options, const char* work, Jo
   Json members{{"port", session.port()}, {"file", options.file}};
   std::string text;
   KRAL_PKV_COUNTS counts{};
+  std::optional<KRAL_ERROR> record;
   {
     JobRun run(context, work, words, keeps_all);
     status = run.Run(session, job, options.file);
@@ -240,13 +246,14 @@ void RunJob(Context& context, const BackupOptions& options, const char* work, Jo
     members["items"] = run.items();
     text = run.text() + run.Summary() + "\n";
     counts = run.counts();
+    record = run.record();
   }
   if (status == KRAL_PKV_STATUS_DONE || (options.dry_run && status == KRAL_PKV_STATUS_DIFFERENT)) {
     return context.out.Result(members, text);
   }
   if (counts.total > 0 && !context.out.json()) context.out.Note(text);
   context.found = members;
-  throw Explain(session, work, options.file, status, counts);
+  throw Explain(session, work, options.file, status, counts, record);
 }
 
 void Backup(Context& context, const BackupOptions& options) {

@@ -9,7 +9,7 @@
 #include <string_view>
 
 #include "platform/xml_document.h"
-#include "tools/kral/error_lines.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/hex_bytes.h"
 #include "tools/kral/output.h"
 
@@ -201,11 +201,13 @@ NvItem NvItems::Find(const std::string& which) const {
 
 void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t allowed) const {
   if (code == 0 || code == allowed) return;
+  const auto record = LastError(session_.handle());
   if (code == KRAL_NV_ERROR_NO_CONNECTION) throw session_.Explain(what);
+  constexpr const char* kHint = "--log FILE tells every item; docs/nv.md describes the files";
+  if (record && record->code != KRAL_ERROR_INTERNAL) throw ExplainRecord(*record, what, session_.port(), kHint);
   std::array<char, 128> text{};
   KRAL_NV_GetErrorText(0, code, text.data(), static_cast<std::uint32_t>(text.size()));
-  throw ToolError(ExitOf(code), fmt::format("{}: {}{}", what, text.data(), CauseOf(what)),
-                  "--log FILE tells every item; docs/nv.md describes the files");
+  throw ToolError(ExitOf(code), fmt::format("{}: {}", what, text.data()), kHint, record);
 }
 
 NvReading NvItems::Read(const NvItem& item) {
@@ -218,9 +220,9 @@ NvReading NvItems::ReadFile(const NvItem& item) {
   const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByEfsFilename(session_.handle(), item.path.c_str());
   Check(code, item.path, KRAL_NV_ERROR_CANNOT_READ_FILE_ITEM);
   NvReading reading;
-  // A file that is not there is refused without a line.
   if (code != 0) {
-    reading.kind = FindErrorLine("was refused with status") ? NvReading::Kind::kRefused : NvReading::Kind::kNoValue;
+    const bool is_missing = IsNoSuchFile(LastError(session_.handle()));
+    reading.kind = is_missing ? NvReading::Kind::kNoValue : NvReading::Kind::kRefused;
   } else {
     reading.elements = Elements(item);
   }

@@ -6,9 +6,7 @@
 #include <CLI/CLI.hpp>
 #include <charconv>
 
-#include "tools/kral/error_lines.h"
 #include "tools/kral/exit_codes.h"
-#include "tools/kral/output.h"
 
 namespace kral::tool {
 
@@ -34,15 +32,6 @@ std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text) {
   }
   if (parsed.ec == std::errc() && parsed.ptr == end && first <= last) return {first, last};
   throw ToolError(ExitCode::kUsage, fmt::format("{} is no range of NV ids", text), "give --items as in 0-9999");
-}
-
-std::string CauseOf(const std::string& file) {
-  const auto lines = ErrorLines(KRAL_LOG_ERR);
-  if (lines.empty()) return "";
-  const std::string name = file + ": ";
-  std::string cause = lines.back();
-  while (cause.starts_with(name)) cause.erase(0, name.size());
-  return " - " + Printable(cause);
 }
 
 }  // namespace kral::tool

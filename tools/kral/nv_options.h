@@ -26,10 +26,6 @@ void AddDictionaryOption(CLI::App& verb, NvOptions& options);   // --types alone
 // "7" or "0-9999", first and last; ToolError for anything else.
 std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text);
 
-// Why the running request could not use a file: " - " and the last error line, without the names in front that the
-// sentence has told; empty when there is no such line.
-std::string CauseOf(const std::string& file);
-
 }  // namespace kral::tool
 
 #endif

@@ -8,10 +8,10 @@
 #include <memory>
 #include <string_view>
 
-#include "tools/kral/error_lines.h"
 #include "tools/kral/nv_item_output.h"
 #include "tools/kral/nv_items.h"
 #include "tools/kral/progress.h"
+#include "tools/kral/result_lines.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -168,9 +168,8 @@ struct DiffCounts {
   std::array<std::uint32_t, 4> values{};  // different, only in the first, only in the second, equal
 
   bool Read() {
-    constexpr std::string_view kMark = "KRAL_NV_PKV_Diff: ";
-    const std::string line = FindErrorLine(kMark).value_or("");
-    std::size_t at = std::min(line.find(kMark), line.size());
+    const std::string line = ResultLine(kDiffCounts).value_or("");
+    std::size_t at = 0;
     for (std::uint32_t& value : values) {
       at = line.find_first_of("0123456789", at);
       if (at == std::string::npos) return false;
@@ -187,10 +186,9 @@ void Compare(Context& context, const Arguments& arguments) {
   session.Begin();
   const std::uint32_t code =
       KRAL_NV_PKV_Diff(session.handle(), arguments.first.c_str(), arguments.second.c_str(), arguments.page.c_str());
-  const bool is_second = FindErrorLine(arguments.second + ": ").has_value();
-  items.Check(code, code == KRAL_NV_ERROR_CANNOT_OPEN_REPORT ? arguments.page
-                    : is_second                              ? arguments.second
-                                                             : arguments.first);
+  items.Check(code, code == KRAL_NV_ERROR_CANNOT_OPEN_REPORT
+                        ? arguments.page
+                        : fmt::format("{} and {}", arguments.first, arguments.second));
   DiffCounts counts;
   if (!counts.Read()) {
     throw ToolError(ExitCode::kInternal, "the library tells no counts", "--log FILE tells more");

@@ -4,6 +4,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <array>
 #include <cstdio>
 #include <iterator>
 
@@ -14,6 +15,21 @@ constexpr std::size_t kDumpWidth = 16;
 
 bool IsPrintable(char character) {
   return character >= ' ' && character <= '~';
+}
+
+constexpr std::array<const char*, 8> kStatusKinds{"none", "refusal", "reply",   "efs",
+                                                  "nv",   "loader",  "command", "result"};
+static_assert(kStatusKinds.size() == KRAL_ERROR_STATUS_RESULT + 1);
+
+// What the record of the library says beyond code and text.
+void AddRecord(Json& error, const KRAL_ERROR& record) {
+  if (record.function[0] != '\0') error["function"] = record.function;
+  if (record.status_kind != KRAL_ERROR_STATUS_NONE && record.status_kind < kStatusKinds.size()) {
+    error["status"] = {{"kind", kStatusKinds[record.status_kind]}, {"value", record.status}};
+  }
+  if ((record.present & KRAL_ERROR_HAS_OFFSET) != 0) error["offset"] = record.offset;
+  if ((record.present & KRAL_ERROR_HAS_LINE) != 0) error["line"] = record.line;
+  if (record.system_error != 0) error["system_error"] = record.system_error;
 }
 
 void WriteData(std::string_view text) {
@@ -62,6 +78,7 @@ void Output::Failure(const ToolError& error, const Json& members) const {
                      {"name", NameOf(error.code())},
                      {"text", error.what()},
                      {"hint", error.hint()}};
+  if (error.record()) AddRecord(object["error"], *error.record());
   WriteObject(false, object);
 }
 

@@ -10,6 +10,7 @@
 #include <optional>
 #include <utility>
 
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
 
 namespace kral::tool {
@@ -95,7 +96,7 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
               const std::function<void(const PlayedPacket&)>& sink) {
   Playback playback(handle, file, pace);
   if (!playback.started()) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read", file), "check the name and the permissions");
+    throw ExplainRecord(LastError(handle), "the playback", kNullPort, "check the name and the permissions");
   }
   for (;;) {
     // Looked at before the packets: what a playback that has ended left here is taken still.

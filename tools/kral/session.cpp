@@ -1,4 +1,4 @@
-// Finds the port, connects, and turns a failed request into an error that says what happened and what to try next.
+// Finds the port, connects, and tells a port and a handset in trouble from a request that failed.
 #include "tools/kral/session.h"
 
 #include <fmt/format.h>
@@ -11,10 +11,10 @@
 
 #include "platform/file_util.h"
 #include "platform/port_list.h"
-#include "tools/kral/error_lines.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/interrupt.h"
-#include "tools/kral/output.h"
+#include "tools/kral/result_lines.h"
 
 namespace kral::tool {
 namespace {
@@ -73,25 +73,27 @@ std::optional<std::int32_t> TroubleOf(KRAL_HANDLE handle) {
   return state;
 }
 
-ToolError ExplainPort(std::uint16_t port, std::int32_t state, bool was_connected) {
+ToolError PortError(std::uint16_t port, std::int32_t state, bool was_connected,
+                    const std::optional<KRAL_ERROR>& record) {
   const auto name = DescribePort(port);
   switch (state) {
     case KRAL_PORT_BUSY:
       return {ExitCode::kPortInUse, fmt::format("{} is in use by another program", name),
-              "close the program that holds the port, then run the command again"};
+              "close the program that holds the port, then run the command again", record};
     case KRAL_PORT_NOT_PERMITTED:
       return {ExitCode::kPortInUse, fmt::format("{} may not be opened by this user", name),
-              "on Linux, join the group of the device (often dialout) and log in again"};
+              "on Linux, join the group of the device (often dialout) and log in again", record};
     case KRAL_PORT_NOT_FOUND:
       if (was_connected) break;
-      return {ExitCode::kNoPort, fmt::format("there is no port {}", name), "kral ports lists the ports there are"};
+      return {ExitCode::kNoPort, fmt::format("there is no port {}", name), "kral ports lists the ports there are",
+              record};
     default:
       if (was_connected) break;
       return {ExitCode::kNoPort, fmt::format("{} cannot be opened as a serial port", name),
-              "kral ports lists the ports there are; --log FILE tells what the system said"};
+              "kral ports lists the ports there are; --log FILE tells what the system said", record};
   }
   return {ExitCode::kLost, fmt::format("the handset on {} went away", name),
-          "check the cable; a handset that restarts comes back on its port after a while"};
+          "check the cable; a handset that restarts comes back on its port after a while", record};
 }
 
 }  // namespace
@@ -138,7 +140,7 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
   handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
   if (handle_ == 0) {
     throw ToolError(ExitCode::kInternal, fmt::format("no connection to {} could be made", DescribePort(port_)),
-                    "close other programs that use the library, then run the command again");
+                    "close other programs that use the library, then run the command again", LastError(0));
   }
   try {
     StartLog(options);
@@ -160,10 +162,10 @@ Session::~Session() {
 }
 
 void Session::StartLog(const SessionOptions& options) const {
-  CollectErrorLines(handle_);
+  CollectResultLines(handle_);
   const bool to_file = !options.log_file.empty();
-  // What failures are explained from is always on.
-  if (options.log_flags || !to_file) KRAL_SetLogFlags(handle_, options.log_flags.value_or(0) | kExplainingLines);
+  // Errors and results are always in it.
+  if (options.log_flags || !to_file) KRAL_SetLogFlags(handle_, options.log_flags.value_or(0) | kResultLines);
   if (to_file) KRAL_StartLogging(handle_, options.log_file.c_str());
 }
 
@@ -172,62 +174,47 @@ void Session::CheckAnswers(Expected expected) {
   answers_ = KRAL_IsPhoneConnected(handle_) != 0;
   if (answers_) return;
   ThrowIfInterrupted();
-  if (const auto trouble = TroubleOf(handle_)) throw ExplainPort(port_, *trouble, false);
+  const auto record = LastError(handle_);
+  if (const auto trouble = TroubleOf(handle_)) throw PortError(port_, *trouble, false, record);
   if (expected == Expected::kMayBeInDownload) return;
   throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
-                  "longer, --log FILE shows what came");
-}
-
-std::optional<ToolError> Session::PortTrouble() const {
-  const auto state = TroubleOf(handle_);
-  return state ? std::optional(ExplainPort(port_, *state, false)) : std::nullopt;
+                  "longer, --log FILE shows what came",
+                  record);
 }
 
 void Session::Begin() {
   ThrowIfInterrupted();
-  ForgetErrorLines();
+}
+
+std::optional<ToolError> Session::Silence() const {
+  // That the device is gone is told only until the asking has closed its port.
+  const auto before = TroubleOf(handle_);
+  if (KRAL_IsPhoneConnected(handle_) != 0) return std::nullopt;
+  const auto after = TroubleOf(handle_);
+  if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, LastError(handle_));
+  return ToolError(ExitCode::kNoAnswer, fmt::format("the handset on {} answers nothing any more", DescribePort(port_)),
+                   "check cable and power", LastError(handle_));
+}
+
+// The library tells a port that was never there from one that came and went by the same code.
+std::optional<ToolError> Session::ExplainPort(const KRAL_ERROR& record) const {
+  if (record.code != KRAL_ERROR_NO_PORT && record.code != KRAL_ERROR_PORT_IN_USE) return std::nullopt;
+  const auto trouble = TroubleOf(handle_);
+  return trouble ? std::optional(PortError(port_, *trouble, answers_, record)) : std::nullopt;
 }
 
 ToolError Session::Explain(std::string_view what) const {
+  const auto record = LastError(handle_);
   if (Interrupted()) return InterruptedError();
-  const auto where = fmt::format("{} on {}", what, DescribePort(port_));
-
-  if (const auto refusal = FindErrorLine("ERROR:\tDIAG_BAD_")) {
-    return {ExitCode::kRefused, fmt::format("the handset refused {}: {}", where, refusal->substr(7)),
-            "the command may need another mode (kral mode), an unlock, or other firmware"};
-  }
-  if (FindErrorLine("Received different response command byte")) {
-    return {ExitCode::kLink, fmt::format("{} was answered with something else", where),
-            "check that no other program talks to the handset; --log FILE shows the traffic"};
-  }
-  // The connection may have ended for a time-out, or because there is no handset any more: asking tells.
-  // That the device is gone is told only until the asking has closed its port.
-  const auto before = TroubleOf(handle_);
-  const bool answers = KRAL_IsPhoneConnected(handle_) != 0;
-  const auto after = TroubleOf(handle_);
-  const auto trouble = after ? after : before;
-  if (!answers && trouble) return ExplainPort(port_, *trouble, true);
-  if (FindErrorLine("mode switching status polling has timeout")) {
-    return {ExitCode::kNoAnswer, fmt::format("the handset took {} but does not report the new mode", where),
-            "it may still be switching: ask with kral mode get"};
-  }
-  if (FindErrorLine("Request timed out")) {
-    return {ExitCode::kNoAnswer, fmt::format("no answer in time to {}", where),
-            answers ? "the handset still answers other requests; --time-out MS waits longer"
-                    : "the handset answers nothing any more: check cable and power"};
-  }
-  if (FindErrorLine("Error. Send data failed.")) {
-    return {ExitCode::kLink, fmt::format("{} could not be written", where), "check the cable and try again"};
-  }
-  const auto lines = ErrorLines();
-  return {ExitCode::kLink,
-          fmt::format("{} failed{}{}", where, lines.empty() ? "" : ": ", lines.empty() ? "" : Printable(lines.back())),
-          "--log FILE shows the traffic"};
-}
-
-void Session::Fail(std::string_view what) const {
-  throw Explain(what);
+  if (!record) return ExplainRecord(record, what, port_);
+  if (const auto error = ExplainPort(*record)) return *error;
+  if (record->code != KRAL_ERROR_NO_ANSWER || !answers_) return ExplainRecord(*record, what, port_);
+  const auto silence = Silence();
+  if (silence && silence->code() == ExitCode::kLost) return *silence;
+  return ExplainRecord(*record, what, port_,
+                       silence ? "the handset answers nothing any more: check cable and power"
+                               : "the handset still answers other requests; --time-out MS waits longer");
 }
 
 }  // namespace kral::tool

@@ -46,23 +46,23 @@ class Session {
   std::uint16_t port() const { return port_; }
   bool answers_diagnostics() const { return answers_; }  // did, when the session began
 
-  // What stands in the way of every request, if the port does.
-  std::optional<ToolError> PortTrouble() const;
-
-  // To be called before a request, so that Explain speaks of that request only; also the place where Ctrl-C takes
-  // effect.
+  // The place where Ctrl-C takes effect; to be called before a request.
   void Begin();
-  // Why the request that has just failed did so, in an error that names the port and `what`.
+  // Why the call that has just failed did so, in an error that names the port, and `what` where the library does not
+  // say what was wrong. A silent handset is asked whether it still answers.
   ToolError Explain(std::string_view what) const;
+  // Looks whether the handset still answers. Nothing when it does.
+  std::optional<ToolError> Silence() const;
   // Begin, the request, and the error if it gives 0.
   template <class Request>
   void Run(std::string_view what, Request&& request) {
     Begin();
-    if (request() == 0) Fail(what);
+    if (request() == 0) throw Explain(what);
   }
 
  private:
-  [[noreturn]] void Fail(std::string_view what) const;
+  // Of a port that stands in the way of every request.
+  std::optional<ToolError> ExplainPort(const KRAL_ERROR& record) const;
   void StartLog(const SessionOptions& options) const;
   void CheckAnswers(Expected expected);
 

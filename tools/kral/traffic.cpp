@@ -9,6 +9,7 @@
 #include <charconv>
 #include <set>
 
+#include "tools/kral/call_failure.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/session.h"
 
@@ -147,9 +148,10 @@ double Limit::seconds() const {
   return (SystemClock().TickMs() - begin_) / 1000.0;
 }
 
-void CheckPort(Session& session, const char* what) {
+void CheckPort(const Session& session) {
   std::int32_t state = KRAL_PORT_OPEN;
-  if (KRAL_GetPortState(session.handle(), &state) != 0 && state != KRAL_PORT_OPEN) throw session.Explain(what);
+  if (KRAL_GetPortState(session.handle(), &state) == 0 || state == KRAL_PORT_OPEN) return;
+  if (const auto error = session.Silence()) throw *error;
 }
 
 void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& count, const PacketSink& sink,
@@ -161,15 +163,15 @@ void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& c
     if (!packet.empty()) sink(packet);
     if (SystemClock().TickMs() - looked < kLookMs) continue;
     looked = SystemClock().TickMs();
-    CheckPort(session, "the collection of packets");
+    CheckPort(session);
     look();
   }
 }
 
 void LoadTable(KRAL_HANDLE handle, std::uint32_t table, const std::string& file) {
   if (file.empty() || KRAL_LoadNameTable(handle, table, file.c_str()) != 0) return;
-  throw ToolError(ExitCode::kBadFile, fmt::format("the table {} cannot be read or has a mistake", file),
-                  "one id and its name a line, each id once; --log FILE names the line");
+  throw ExplainRecord(LastError(handle), fmt::format("the table {}", file), 0,
+                      "one id and its name a line, each id once");
 }
 
 }  // namespace kral::tool

@@ -73,7 +73,7 @@ class Limit {
 using PacketSink = std::function<void(std::span<const std::uint8_t> packet)>;
 void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& count, const PacketSink& sink,
                     const std::function<void()>& look);
-void CheckPort(Session& session, const char* what);
+void CheckPort(const Session& session);  // ToolError when the handset went away
 
 void LoadTable(KRAL_HANDLE handle, std::uint32_t table, const std::string& file);
 
