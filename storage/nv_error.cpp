@@ -67,4 +67,8 @@ Failure ToolFailure(NvError error) {
   return Failure(ClassOf(error), "NV tool: %s", TextOf(code)).Status(KRAL_ERROR_STATUS_RESULT, code);
 }
 
+Failure ToolFailure(NvError error, const std::string& what) {
+  return Failure(ClassOf(error), "%s", what.c_str()).Status(KRAL_ERROR_STATUS_RESULT, static_cast<uint32_t>(error));
+}
+
 }  // namespace kral::nv

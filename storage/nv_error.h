@@ -41,6 +41,8 @@ const char* TextOf(uint32_t code);
 
 // The failure of which only the code is known.
 Failure ToolFailure(NvError error);
+// The same where more is known: `what` names it.
+Failure ToolFailure(NvError error, const std::string& what);
 
 }  // namespace kral::nv
 

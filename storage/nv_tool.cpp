@@ -27,6 +27,7 @@ NvError NVTool_Manager::LoadDefinitions(Diag_FTM& phone, const std::string& file
   const NvError error = LoadDefinitionFile(file, kind, definitions_, read, problem);
   if (error != NvError::kNone) {
     phone.log().WriteLine(kLogErr, "%s", problem.c_str());
+    Fail(ToolFailure(error, problem));
     return error;
   }
   for (NvTypePtr& type : read.types) definitions_.PutType(std::move(type));
@@ -88,6 +89,7 @@ NvError NVTool_Manager::SetBytes(Diag_FTM& phone, NvItem& item, uint16_t element
   if (!item.type->Holds(value)) {
     phone.log().WriteLine(kLogErr, "%s: %d bytes are no value of its type", item.Title().c_str(),
                           static_cast<int>(value.size()));
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: %zu bytes are no value of its type", item.Title().c_str(), value.size()));
     return NvError::kCannotSetValue;
   }
   item.values[SlotOf(item, element)].assign(value.begin(), value.end());
@@ -100,6 +102,7 @@ NvError NVTool_Manager::SetText(Diag_FTM& phone, NvItem& item, uint16_t element,
   auto value = item.type->FromText(text, problem);
   if (!value) {
     phone.log().WriteLine(kLogErr, "%s: %s", item.Title().c_str(), problem.c_str());
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: %s", item.Title().c_str(), problem.c_str()));
     return NvError::kCannotSetValue;
   }
   item.values[SlotOf(item, element)] = std::move(*value);
@@ -146,6 +149,7 @@ NvError NVTool_Manager::LoadFilter(Diag_FTM& phone, const std::string& file, NvF
     MarkAll(phone);
   } else {
     phone.log().WriteLine(kLogErr, "%s", problem.c_str());
+    Fail(ToolFailure(error, problem));
   }
   return error;
 }

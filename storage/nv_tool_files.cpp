@@ -33,11 +33,19 @@ NvError ErrorOf(const PkvOutcome& outcome) {
   return NvError::kCannotOpenPkv;
 }
 
+NvError Judged(Diag_FTM& phone, const PkvOutcome& outcome) {
+  const NvError error = ErrorOf(outcome);
+  if (error == NvError::kNone) return error;
+  phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());  // begins with the path
+  Fail(ToolFailure(error, outcome.text));
+  return error;
+}
+
 NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
   const PkvOutcome outcome = ReadPkv(file, set);
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());  // begins with the path
+  const NvError error = Judged(phone, outcome);
   pkv::LogUnread(phone, file, set);
-  return ErrorOf(outcome);
+  return error;
 }
 
 // A path of a file as a title.
@@ -61,6 +69,8 @@ NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, s
   if (!value) {
     phone.log().WriteLine(kLogErr, "%s: %d bytes are no value of its type", item.Title().c_str(),
                           static_cast<int>(stored.size()));
+    Fail(Failure(KRAL_ERROR_BAD_FILE, "%s: %zu bytes are no value of the type in its definition", item.Title().c_str(),
+                 stored.size()));
     return NvError::kCannotGetValue;
   }
   item.values[slot] = std::move(*value);
@@ -106,6 +116,8 @@ NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
     NvError error = NvError::kBadPkvItem;
     if (item == nullptr) {
       phone.log().WriteLine(kLogErr, "NV ID %d with index %d has no place", entry.id, entry.index);
+      Fail(Failure(KRAL_ERROR_BAD_FILE, "NV item %d of the file has index %d, which has no place", entry.id,
+                   entry.index));
     } else {
       const size_t size = item->is_array() ? kDataSize - 1 : kDataSize;
       error = !item->will_read
@@ -179,8 +191,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   if (has_handset) pkv::ReadIdentity(phone, set.properties);
   pkv::NoteArrays(arrays, set.properties);
   const PkvOutcome outcome = WritePkv(file, set, &phone.log());
-  if (!outcome.done()) phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
-  return ErrorOf(outcome);
+  return Judged(phone, outcome);
 }
 
 // --- Source files ----------------------------------------------------------------------------------------------------
@@ -190,6 +201,7 @@ NvError NVTool_Manager::LoadFromSource(Diag_FTM& phone, const std::string& file)
   std::string problem;
   if (const NvError error = LoadSource(file, source, problem); error != NvError::kNone) {
     phone.log().WriteLine(kLogErr, "%s", problem.c_str());
+    Fail(ToolFailure(error, problem));
     return error;
   }
   std::map<uint16_t, uint16_t> highest;
@@ -209,8 +221,9 @@ NvError NVTool_Manager::LoadFromSource(Diag_FTM& phone, const std::string& file)
 
 NvError NVTool_Manager::TakeSource(Diag_FTM& phone, const NvSourceItem& entry, uint16_t highest_index) {
   const auto reject = [&](const std::string& problem) {
-    phone.log().WriteLine(kLogErr, "%s: %s", (entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path).c_str(),
-                          problem.c_str());
+    const std::string text = (entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path) + ": " + problem;
+    phone.log().WriteLine(kLogErr, "%s", text.c_str());
+    Fail(ToolFailure(NvError::kBadSourceItem, text));
     return NvError::kBadSourceItem;
   };
   std::optional<NvBytes> bytes;
@@ -271,7 +284,9 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
     walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, NvError::kNone);
   }
   const NvError error = SaveSource(file, source);
-  if (error != NvError::kNone) phone.log().WriteLine(kLogErr, "%s cannot be written", file.c_str());
+  if (error == NvError::kNone) return error;
+  phone.log().WriteLine(kLogErr, "%s cannot be written", file.c_str());
+  Fail(FileFailure(file, "cannot be written"));
   return error;
 }
 

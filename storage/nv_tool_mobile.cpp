@@ -2,6 +2,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "commands/nv_item.h"
+#include "storage/efs_format.h"
 #include "storage/nv_tool.h"
 #include "storage/nv_value.h"
 
@@ -12,6 +14,16 @@ size_t CountElements(const std::vector<NvItem*>& items) {
   size_t count = 0;
   for (const NvItem* item : items) count += size_t{item->max_index} + 1;
   return count;
+}
+
+// With the status of an item; the handset has no such status for files.
+Failure Refused(const NvItem& item, uint16_t status) {
+  if (!item.is_file()) return Refusal(*item.id, status);
+  if (status == kNeverWritten) {
+    return Failure(KRAL_ERROR_REFUSED, "no such file %s", item.path.c_str())
+        .Status(KRAL_ERROR_STATUS_EFS, efs::kMissing);
+  }
+  return Failure(KRAL_ERROR_REFUSED, "the handset refused %s", item.path.c_str());
 }
 
 }  // namespace
@@ -64,6 +76,7 @@ NvError NVTool_Manager::ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& i
   item.values.erase(slot);
   if (status == kNeverWritten) return NvError::kNoValue;
   phone.log().WriteLine(kLogErr, "%s was refused with status %d", item.Title().c_str(), status);
+  Fail(Refused(item, status));
   return item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
 }
 
@@ -83,6 +96,7 @@ NvError NVTool_Manager::ReadWhole(Diag_FTM& phone, NvItem& item, uint16_t& statu
   }
   if (failure != NvError::kNone || has_value) return failure;
   status = kNeverWritten;
+  Fail(Refused(item, status));
   return item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
 }
 
@@ -93,6 +107,7 @@ NvError NVTool_Manager::ReadItem(Diag_FTM& phone, uint16_t id, uint16_t& status)
   const NvError error = ReadWhole(phone, generic, status);
   if (error == NvError::kNone) Define(phone, std::move(generic));
   if (error == NvError::kNone || error == NvError::kNoConnection) return error;
+  const KeepFailure keep;
   if (ReadItem(phone, pkv::RfNvPath(id)) != NvError::kNone) return error;
   status = 0;
   return NvError::kNone;
@@ -114,11 +129,14 @@ NvError NVTool_Manager::WriteElement(Diag_FTM& phone, NvMobile& mobile, const Nv
   const auto stored = ToStored(item, value);
   if (!stored) {
     phone.log().WriteLine(kLogErr, "%s: its value has no room on the handset", item.Title().c_str());
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: its value has no room on the handset", item.Title().c_str()));
     return failure;
   }
   if (!mobile.CanName(item)) {
     phone.log().WriteLine(kLogErr, "%s: elements of arrays can be written for subscription 0 only",
                           item.Title().c_str());
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: elements of arrays can be written for subscription 0 only",
+                 item.Title().c_str()));
     return failure;
   }
   const NvAnswer answer = mobile.Write(item, slot.element, *stored);
@@ -126,6 +144,7 @@ NvError NVTool_Manager::WriteElement(Diag_FTM& phone, NvMobile& mobile, const Nv
   status = answer.status;
   if (answer.done()) return NvError::kNone;
   phone.log().WriteLine(kLogErr, "%s was refused with status %d", item.Title().c_str(), status);
+  Fail(Refused(item, status));
   return failure;
 }
 

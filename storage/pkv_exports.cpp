@@ -39,7 +39,7 @@ Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& coun
       return Failure(KRAL_ERROR_REFUSED, "the handset gave nothing for %s: %u of %u items and files were refused", file,
                      counts.refused, counts.total);
     case KRAL_PKV_STATUS_NOT_WRITTEN:
-      return Failure(KRAL_ERROR_REFUSED,
+      return Failure(counts.refused != 0 ? KRAL_ERROR_REFUSED : KRAL_ERROR_MISMATCH,
                      "of %s the handset refused %u of %u items and files, and %u read back otherwise", file,
                      counts.refused, counts.total, counts.different + counts.not_read_back);
     case KRAL_PKV_STATUS_DIFFERENT:

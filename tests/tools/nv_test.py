@@ -106,7 +106,7 @@ class Backups(ToolTest):
                 self.nv(2, "backup", "--items", items)
             self.nv(2, "backup", "--subscriptions", "0")
             self.assertIn("no item", self.nv(7, "backup", "--items", "5")["error"]["text"])
-            self.assertRegex(self.nv(10, "verify")["error"]["text"], r"phone\.pkv cannot be used - \w+")
+            self.assertRegex(self.nv(10, "verify")["error"]["text"], r"phone\.pkv: \w+")
         with self.handset("--fault", "refuse=20,of=26"):
             self.assertIn("refused 4", self.nv(7, "backup", "--items", "0-3")["error"]["text"])
 

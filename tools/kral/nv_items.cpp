@@ -204,7 +204,12 @@ void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t a
   const auto record = LastError(session_.handle());
   if (code == KRAL_NV_ERROR_NO_CONNECTION) throw session_.Explain(what);
   constexpr const char* kHint = "--log FILE tells every item; docs/nv.md describes the files";
-  if (record && record->code != KRAL_ERROR_INTERNAL) throw ExplainRecord(*record, what, session_.port(), kHint);
+  if (record && record->code != KRAL_ERROR_INTERNAL) {
+    const ToolError error = ExplainRecord(*record, what, session_.port(), kHint);
+    const bool names_it = std::string_view(error.what()).find(what) != std::string_view::npos;
+    if (names_it) throw error;
+    throw ToolError(error.code(), fmt::format("{}: {}", what, error.what()), kHint, record);
+  }
   std::array<char, 128> text{};
   KRAL_NV_GetErrorText(0, code, text.data(), static_cast<std::uint32_t>(text.size()));
   throw ToolError(ExitOf(code), fmt::format("{}: {}", what, text.data()), kHint, record);
@@ -301,8 +306,12 @@ void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::st
     });
   }
   if (status == KRAL_NV_STATUS_DONE) return;
+  KRAL_ERROR record{};
+  record.code = KRAL_ERROR_REFUSED;
+  record.status_kind = KRAL_ERROR_STATUS_NV;
+  record.status = status;
   throw ToolError(ExitCode::kRefused, fmt::format("the handset refused {}: status {}", what, DescribeNvStatus(status)),
-                  "the item may be read-only or the handset may need an unlock");
+                  "the item may be read-only or the handset may need an unlock", record);
 }
 
 std::optional<std::string> NvItems::Value(const NvItem& item, std::uint16_t array_index) const {
