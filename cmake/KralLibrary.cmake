@@ -35,7 +35,8 @@ if(WIN32)
 else()
   set_target_properties(kral PROPERTIES VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR})
   # Visibility already hides our own symbols; the script also hides what templates of other libraries leave behind.
-  target_link_options(kral PRIVATE -Wl,--no-undefined
+  # A host that unloads it may have connections open, whose threads run its code: it stays until the process ends.
+  target_link_options(kral PRIVATE -Wl,--no-undefined -Wl,-z,nodelete
     -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/kral.map)
   set_target_properties(kral PROPERTIES LINK_DEPENDS ${PROJECT_SOURCE_DIR}/cmake/kral.map)
 endif()

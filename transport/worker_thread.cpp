@@ -2,6 +2,7 @@
 // owner's affair.
 #include "transport/worker_thread.h"
 
+#include <chrono>
 #include <exception>
 #include <mutex>
 #include <utility>
@@ -14,6 +15,8 @@ namespace kral {
 namespace {
 
 using Progress = WorkerThread::Progress;
+
+constexpr std::chrono::milliseconds kLeaveTime{1000};
 
 struct ParkingLot {
   std::mutex mutex;
@@ -44,7 +47,7 @@ size_t ReapParkedThreads() {
     ParkingLot& lot = Lot();
     const std::lock_guard lock(lot.mutex);
     for (std::shared_ptr<Progress>* at = &lot.first; *at;) {
-      if ((*at)->owner_released) {
+      if ((*at)->owner_released && HasEndedWithin((*at)->parked, {})) {
         std::shared_ptr<Progress> taken = std::exchange(*at, (*at)->next_parked);
         taken->next_parked = std::exchange(ended, taken);
       } else {
@@ -58,10 +61,14 @@ size_t ReapParkedThreads() {
 }
 
 WorkerThread::~WorkerThread() {
-  if (!thread_.joinable()) return;
+  if (thread_.joinable()) Park();
+}
+
+void WorkerThread::Park() {
   ParkingLot& lot = Lot();
   const std::lock_guard lock(lot.mutex);
   progress_->parked = std::move(thread_);
+  progress_->parked_module = std::move(module_);
   progress_->next_parked = std::exchange(lot.first, progress_);
 }
 
@@ -71,6 +78,7 @@ bool WorkerThread::Start(std::function<void()> body, std::shared_ptr<void> owner
   Join();
   try {
     progress_ = std::make_shared<Progress>();
+    module_ = ModuleReference::Take();
     auto run = [body = std::move(body), owner = std::move(owner), progress = progress_]() mutable {
       const AtExit ended([&] {
         progress->body_ended.store(true, std::memory_order_release);
@@ -81,13 +89,17 @@ bool WorkerThread::Start(std::function<void()> body, std::shared_ptr<void> owner
     };
     CallWithSignalsBlocked([&] { thread_ = Maker() ? Maker()(std::move(run)) : std::thread(std::move(run)); });
   } catch (const std::exception&) {
+    module_ = {};
     return false;
   }
   return true;
 }
 
 void WorkerThread::Join() {
-  if (thread_.joinable() && thread_.get_id() != std::this_thread::get_id()) thread_.join();
+  if (!thread_.joinable() || thread_.get_id() == std::this_thread::get_id()) return;
+  if (!HasEndedWithin(thread_, kLeaveTime)) return Park();
+  thread_.join();
+  module_ = {};
 }
 
 }  // namespace kral

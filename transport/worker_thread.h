@@ -8,6 +8,8 @@
 #include <memory>
 #include <thread>
 
+#include "platform/loaded_module.h"
+
 namespace kral {
 
 class WorkerThread {
@@ -23,7 +25,8 @@ class WorkerThread {
   // thread or memory.
   bool Start(std::function<void()> body, std::shared_ptr<void> owner);
   bool running() const { return thread_.joinable() && !progress_->body_ended.load(std::memory_order_acquire); }
-  // For a body that has announced its end: waits for the moment it takes to leave.
+  // For a body that has announced its end: waits for the moment it takes to leave. One that cannot leave now, as its
+  // host is loading or unloading a library, is parked.
   void Join();
 
   struct Progress {
@@ -31,10 +34,14 @@ class WorkerThread {
     std::atomic<bool> owner_released{false};  // the thread touches nothing of the library any more
     // Once it is parked. Parking takes no memory: it must not fail.
     std::thread parked;
+    ModuleReference parked_module;
     std::shared_ptr<Progress> next_parked;
   };
 
  private:
+  void Park();
+
+  ModuleReference module_;  // of the thread
   std::thread thread_;
   std::shared_ptr<Progress> progress_;
 };

@@ -19,6 +19,16 @@
  * - Any thread may call with any handle, connect and disconnect; requests of one handle are carried out one after the
  *   other. Text-log, queue, time-out and abort calls never wait for a running request. Callbacks come on the library's
  *   own threads and must not call functions that send requests.
+ * - Names are UTF-8 on every system: those of files on the PC and those on the handset, which go over the wire as they
+ *   are. On Windows a PC name that is no UTF-8 is taken to be in the ANSI code page. Paths may be longer than 260
+ *   characters there.
+ * - A program disconnects before it unloads the library. Otherwise the connections stay open: the library stays in
+ *   memory, goes on receiving, and calls the callbacks, whose code must stay too. Loaded again it is the same, with the
+ *   same handles. (On Linux it stays in memory in any case, until the process ends. On Windows each load and free leaves
+ *   two handles of the thread library that is linked in.)
+ * - KRAL_DisconnectServer is not called from a DllMain, nor are connects: no thread starts or ends meanwhile. Such a
+ *   disconnect waits for each thread of the connection (1,000 ms), leaves it to end by itself, and the library stays in
+ *   memory.
  * - No C++ exception leaves a function. One that leaves a callback ends there: the operation goes on, or is stopped
  *   where the callback's result would have decided. On Linux a host may end a thread inside a callback (pthread_exit),
  *   as interpreters do that are going down. The library's threads run none of the host's signal handlers.
