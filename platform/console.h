@@ -3,6 +3,8 @@
 #define KRAL_PLATFORM_CONSOLE_H
 
 #include <atomic>
+#include <string>
+#include <vector>
 
 namespace kral {
 
@@ -10,6 +12,21 @@ enum class StandardStream { kInput, kOutput, kError };
 
 bool IsTerminal(StandardStream stream);
 int TerminalWidth(StandardStream stream);  // columns; 80 when it is no terminal
+
+// What the program was started with, behind its own name, in UTF-8.
+std::vector<std::string> ProgramArguments(int count, char** values);
+
+// A terminal that shows UTF-8, for as long as this lives.
+class Utf8Terminal {
+ public:
+  Utf8Terminal();
+  ~Utf8Terminal();
+  Utf8Terminal(const Utf8Terminal&) = delete;
+  Utf8Terminal& operator=(const Utf8Terminal&) = delete;
+
+ private:
+  unsigned former_ = 0;
+};
 
 // Bytes written to the standard output come out as they are, line ends included.
 void UseBinaryOutput();

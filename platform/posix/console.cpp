@@ -5,6 +5,8 @@
 #include <sys/ioctl.h>
 #include <unistd.h>
 
+#include <algorithm>
+
 namespace kral {
 namespace {
 
@@ -44,6 +46,14 @@ int TerminalWidth(StandardStream stream) {
   if (::ioctl(Descriptor(stream), TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kDefaultWidth;
   return size.ws_col;
 }
+
+std::vector<std::string> ProgramArguments(int count, char** values) {
+  return {values + std::min(count, 1), values + count};
+}
+
+// The terminal's encoding is its owner's choice.
+Utf8Terminal::Utf8Terminal() = default;
+Utf8Terminal::~Utf8Terminal() = default;
 
 void UseBinaryOutput() {}  // they always do
 

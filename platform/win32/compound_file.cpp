@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "platform/win32/com_object.h"
+#include "platform/win32/wide_text.h"
 
 namespace kral {
 namespace {
@@ -22,18 +23,9 @@ std::string Reason(const char* what, HRESULT result) {
   return text;
 }
 
-std::wstring ToWide(const std::string& utf8) {
-  const int size = ::MultiByteToWideChar(CP_UTF8, 0, utf8.c_str(), -1, nullptr, 0);
-  if (size <= 1) return {};
-  std::wstring wide(static_cast<size_t>(size), L'\0');
-  ::MultiByteToWideChar(CP_UTF8, 0, utf8.c_str(), -1, wide.data(), size);
-  wide.pop_back();
-  return wide;
-}
-
 HRESULT WriteStream(IStorage* target, const CompoundStream& stream) {
   IStream* created = nullptr;
-  HRESULT result = target->CreateStream(ToWide(stream.name).c_str(), kWriteMode, 0, 0, &created);
+  HRESULT result = target->CreateStream(WideText(stream.name).c_str(), kWriteMode, 0, 0, &created);
   if (FAILED(result)) return result;
   const Owned<IStream> output(created);
   ULONG written = 0;
@@ -48,7 +40,7 @@ HRESULT WriteChildren(IStorage* target, const CompoundStorage& storage) {
   }
   for (const CompoundStorage& child : storage.storages) {
     IStorage* created = nullptr;
-    HRESULT result = target->CreateStorage(ToWide(child.name).c_str(), kWriteMode, 0, 0, &created);
+    HRESULT result = target->CreateStorage(WideText(child.name).c_str(), kWriteMode, 0, 0, &created);
     if (FAILED(result)) return result;
     const Owned<IStorage> opened(created);
     if (result = WriteChildren(opened.get(), child); FAILED(result)) return result;

@@ -6,6 +6,12 @@
 #include <unistd.h>
 #include <windows.h>
 
+#include "platform/win32/wide_text.h"
+
+// Of the C runtime, declared in no header: what the start of a program with wide arguments calls.
+extern "C" __declspec(dllimport) int __cdecl __wgetmainargs(int* count, wchar_t*** values, wchar_t*** environment,
+                                                            int expand_wildcards, int* new_mode);
+
 namespace kral {
 namespace {
 
@@ -48,6 +54,26 @@ int TerminalWidth(StandardStream stream) {
   CONSOLE_SCREEN_BUFFER_INFO info{};
   if (!::GetConsoleScreenBufferInfo(Handle(stream), &info)) return kDefaultWidth;
   return info.srWindow.Right - info.srWindow.Left + 1;
+}
+
+// Not those that are given: they have been through the ANSI code page, which knows few characters.
+std::vector<std::string> ProgramArguments(int, char**) {
+  int count = 0;
+  wchar_t** values = nullptr;
+  wchar_t** environment = nullptr;
+  int new_mode = 0;
+  ::__wgetmainargs(&count, &values, &environment, 0, &new_mode);
+  std::vector<std::string> arguments;
+  for (int i = 1; i < count; ++i) arguments.push_back(Utf8Text(values[i]));
+  return arguments;
+}
+
+Utf8Terminal::Utf8Terminal() : former_(::GetConsoleOutputCP()) {
+  ::SetConsoleOutputCP(CP_UTF8);
+}
+
+Utf8Terminal::~Utf8Terminal() {
+  if (former_ != 0) ::SetConsoleOutputCP(former_);
 }
 
 void UseBinaryOutput() {

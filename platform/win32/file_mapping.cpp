@@ -6,6 +6,8 @@
 #include <cstring>
 #include <limits>
 
+#include "platform/win32/wide_text.h"
+
 namespace kral {
 namespace {
 
@@ -19,8 +21,8 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   Close();
   too_large_ = false;
   const DWORD access = writable ? GENERIC_READ | GENERIC_WRITE : GENERIC_READ;
-  const HANDLE file =
-      ::CreateFileA(path.c_str(), access, FILE_SHARE_READ, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
+  const HANDLE file = ::CreateFileW(WidePath(path).c_str(), access, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
+                                    FILE_ATTRIBUTE_NORMAL, nullptr);
   last_error_ = file == INVALID_HANDLE_VALUE ? ::GetLastError() : 0;
   if (file == INVALID_HANDLE_VALUE) return nullptr;
   file_ = reinterpret_cast<intptr_t>(file);
@@ -31,7 +33,7 @@ uint8_t* CMapFileToMemory::Open(const std::string& path, bool writable) {
   if (too_large_) last_error_ = ERROR_FILE_TOO_LARGE;
   if (last_error_ == 0) {
     mapping_ =
-        ::CreateFileMappingA(file, nullptr, (writable ? PAGE_READWRITE : PAGE_READONLY) | SEC_COMMIT, 0, 0, nullptr);
+        ::CreateFileMappingW(file, nullptr, (writable ? PAGE_READWRITE : PAGE_READONLY) | SEC_COMMIT, 0, 0, nullptr);
     last_error_ = mapping_ == nullptr ? ::GetLastError() : 0;
   }
   if (last_error_ == 0) {

@@ -1,4 +1,4 @@
-// Whole files on Windows. Names are in the system's ANSI code page, as callers pass them.
+// Whole files on Windows.
 #include "platform/file_util.h"
 
 #include <fcntl.h>
@@ -6,13 +6,13 @@
 #include <windows.h>
 
 #include <algorithm>
-#include <array>
-#include <cstring>
+#include <string>
 #include <string_view>
 #include <utility>
 #include <vector>
 
 #include "platform/win32/last_error.h"
+#include "platform/win32/wide_text.h"
 #include "platform/win32/win_handle.h"
 
 namespace kral {
@@ -20,6 +20,7 @@ namespace {
 
 constexpr int kNameAttempts = 64;
 constexpr size_t kLargestPiece = 1u << 24;
+constexpr size_t kLongestPath = 1u << 15;
 constexpr DWORD kShareAll = FILE_SHARE_READ | FILE_SHARE_WRITE;
 
 bool IsOrdinary(HANDLE file) {
@@ -38,8 +39,8 @@ struct Opening {
 
 // Devices have names as files have: CON, NUL, COM7, on many systems NUL.txt too.
 std::error_code OpenIf(bool (*is_wanted)(HANDLE file), const std::string& path, const Opening& how, WinHandle& file) {
-  WinHandle opened(
-      ::CreateFileA(path.c_str(), how.access, how.sharing, nullptr, how.creation, FILE_ATTRIBUTE_NORMAL, nullptr));
+  WinHandle opened(::CreateFileW(WidePath(path).c_str(), how.access, how.sharing, nullptr, how.creation,
+                                 FILE_ATTRIBUTE_NORMAL, nullptr));
   if (!opened.valid()) return LastError();
   if (!is_wanted(opened.get())) return std::make_error_code(std::errc::invalid_argument);
   file = std::move(opened);
@@ -66,21 +67,19 @@ std::FILE* OpenEmptied(bool (*is_wanted)(HANDLE file), const std::string& path, 
 }
 
 // The name behind "\\.\"; empty for files. Nothing is opened.
-std::string DeviceName(const std::string& path) {
-  constexpr std::string_view kDevices = "\\\\.\\";
-  std::array<char, MAX_PATH> full{};
-  const DWORD length = ::GetFullPathNameA(path.c_str(), static_cast<DWORD>(full.size()), full.data(), nullptr);
-  if (length >= full.size() || !std::string_view(full.data(), length).starts_with(kDevices)) return {};
-  return full.data() + kDevices.size();
+std::wstring DeviceName(const std::string& path) {
+  constexpr std::wstring_view kDevices = L"\\\\.\\";
+  const std::wstring full = FullPath(WideText(path));
+  return full.starts_with(kDevices) ? full.substr(kDevices.size()) : std::wstring();
 }
 
 // What a link leads to.
-std::error_code Resolve(const std::string& path, std::string& target) {
-  const WinHandle file(::CreateFileA(path.c_str(), 0, kShareAll | FILE_SHARE_DELETE, nullptr, OPEN_EXISTING,
+std::error_code Resolve(const std::wstring& path, std::wstring& target) {
+  const WinHandle file(::CreateFileW(path.c_str(), 0, kShareAll | FILE_SHARE_DELETE, nullptr, OPEN_EXISTING,
                                      FILE_ATTRIBUTE_NORMAL, nullptr));
-  std::array<char, 4 * MAX_PATH> full{};
+  std::vector<wchar_t> full(kLongestPath);
   const auto room = static_cast<DWORD>(full.size());
-  const DWORD length = file.valid() ? ::GetFinalPathNameByHandleA(file.get(), full.data(), room, 0) : 0;
+  const DWORD length = file.valid() ? ::GetFinalPathNameByHandleW(file.get(), full.data(), room, 0) : 0;
   if (length == 0) return LastError();
   if (length >= room) return std::make_error_code(std::errc::filename_too_long);
   target.assign(full.data(), length);
@@ -88,24 +87,24 @@ std::error_code Resolve(const std::string& path, std::string& target) {
 }
 
 // Where a new file takes the place of what a path leads to.
-std::error_code FindTarget(const std::string& path, std::string& target) {
+std::error_code FindTarget(const std::string& path, std::wstring& target) {
   // A temporary file beside nothing could be made, but never moved there.
   if (path.empty()) return std::make_error_code(std::errc::no_such_file_or_directory);
   if (!DeviceName(path).empty()) return std::make_error_code(std::errc::invalid_argument);
-  target = path;
-  const DWORD attributes = ::GetFileAttributesA(path.c_str());
+  target = WidePath(path);
+  const DWORD attributes = ::GetFileAttributesW(target.c_str());
   if (attributes == INVALID_FILE_ATTRIBUTES) return {};
   if ((attributes & FILE_ATTRIBUTE_DIRECTORY) != 0) return std::make_error_code(std::errc::is_a_directory);
-  return (attributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0 ? Resolve(path, target) : std::error_code();
+  return (attributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0 ? Resolve(std::wstring(target), target) : std::error_code();
 }
 
 // The access list of a file that is replaced. A file system without any has none to keep.
-void KeepAccess(const std::string& from, const std::string& to) {
+void KeepAccess(const std::wstring& from, const std::wstring& to) {
   DWORD size = 0;
-  ::GetFileSecurityA(from.c_str(), DACL_SECURITY_INFORMATION, nullptr, 0, &size);
+  ::GetFileSecurityW(from.c_str(), DACL_SECURITY_INFORMATION, nullptr, 0, &size);
   std::vector<uint8_t> list(size);
-  if (size != 0 && ::GetFileSecurityA(from.c_str(), DACL_SECURITY_INFORMATION, list.data(), size, &size)) {
-    ::SetFileSecurityA(to.c_str(), DACL_SECURITY_INFORMATION, list.data());
+  if (size != 0 && ::GetFileSecurityW(from.c_str(), DACL_SECURITY_INFORMATION, list.data(), size, &size)) {
+    ::SetFileSecurityW(to.c_str(), DACL_SECURITY_INFORMATION, list.data());
   }
 }
 
@@ -127,7 +126,7 @@ bool CloseStream(std::FILE* stream) {
 
 std::FILE* OpenToWriteText(const std::string& path) {
   // Only one may have a COM port open, and a handset may be behind it.
-  if (::_strnicmp(DeviceName(path).c_str(), "COM", 3) == 0) return nullptr;
+  if (::_wcsnicmp(DeviceName(path).c_str(), L"COM", 3) == 0) return nullptr;
   return OpenEmptied(TakesLines, path, kShareAll, _O_TEXT, "w");
 }
 
@@ -179,8 +178,8 @@ uint64_t FileReader::size() const {
 
 struct AtomicFile::State {
   WinHandle file;
-  std::string path;
-  std::string temporary;
+  std::wstring path;
+  std::wstring temporary;
   std::error_code failed;
 };
 
@@ -189,7 +188,7 @@ AtomicFile::AtomicFile() : state_(std::make_unique<State>()) {}
 AtomicFile::~AtomicFile() {
   if (!state_->file.valid()) return;
   state_->file = WinHandle();
-  ::DeleteFileA(state_->temporary.c_str());
+  ::DeleteFileW(state_->temporary.c_str());
 }
 
 std::error_code AtomicFile::Open(const std::string& path) {
@@ -199,9 +198,9 @@ std::error_code AtomicFile::Open(const std::string& path) {
   if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
     state.temporary =
-        state.path + "." + std::to_string(::GetCurrentProcessId()) + "." + std::to_string(attempt) + ".tmp";
+        state.path + L"." + std::to_wstring(::GetCurrentProcessId()) + L"." + std::to_wstring(attempt) + L".tmp";
     state.file = WinHandle(
-        ::CreateFileA(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
+        ::CreateFileW(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (state.file.valid()) {
       KeepAccess(state.path, state.temporary);
       return {};
@@ -233,11 +232,11 @@ std::error_code AtomicFile::Commit() {
   if (state.failed) return state.failed;
   if (!::FlushFileBuffers(state.file.get())) return state.failed = LastError();
   state.file = WinHandle();  // an open file cannot be moved
-  if (::MoveFileExA(state.temporary.c_str(), state.path.c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH)) {
+  if (::MoveFileExW(state.temporary.c_str(), state.path.c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH)) {
     return {};
   }
   state.failed = LastError();
-  ::DeleteFileA(state.temporary.c_str());
+  ::DeleteFileW(state.temporary.c_str());
   return state.failed;
 }
 

@@ -1,4 +1,4 @@
-// Folders on Windows. Names are in the system's ANSI code page, as callers pass them.
+// Folders on Windows.
 #include "platform/folder.h"
 
 #include <windows.h>
@@ -7,6 +7,7 @@
 #include <memory>
 
 #include "platform/win32/last_error.h"
+#include "platform/win32/wide_text.h"
 
 namespace kral {
 namespace {
@@ -25,24 +26,24 @@ LocalFile FileOf(DWORD attributes, DWORD size_high, DWORD size_low) {
 
 LocalFile LookAt(const std::string& path) {
   WIN32_FILE_ATTRIBUTE_DATA data{};
-  if (!::GetFileAttributesExA(path.c_str(), GetFileExInfoStandard, &data)) return {};
+  if (!::GetFileAttributesExW(WidePath(path).c_str(), GetFileExInfoStandard, &data)) return {};
   return FileOf(data.dwFileAttributes, data.nFileSizeHigh, data.nFileSizeLow);
 }
 
 std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& entries) {
-  WIN32_FIND_DATAA data{};
-  const HANDLE search = ::FindFirstFileA(JoinPath(path, "*").c_str(), &data);
+  WIN32_FIND_DATAW data{};
+  const HANDLE search = ::FindFirstFileW(WidePath(JoinPath(path, "*")).c_str(), &data);
   if (search == INVALID_HANDLE_VALUE) return LastError();
   const std::unique_ptr<void, CloseSearch> owned(search);
   std::vector<FolderEntry> found;
   do {
-    const std::string name = data.cFileName;
+    const std::string name = Utf8Text(data.cFileName);
     if (name == "." || name == "..") continue;
     LocalFile file = FileOf(data.dwFileAttributes, data.nFileSizeHigh, data.nFileSizeLow);
     const bool is_link = (data.dwFileAttributes & FILE_ATTRIBUTE_REPARSE_POINT) != 0;
     if (is_link && file.kind != LocalKind::kFile) file = {LocalKind::kOther};
     found.push_back({name, file});
-  } while (::FindNextFileA(search, &data));
+  } while (::FindNextFileW(search, &data));
   if (::GetLastError() != ERROR_NO_MORE_FILES) return LastError();
   std::sort(found.begin(), found.end(), [](const auto& left, const auto& right) { return left.name < right.name; });
   entries = std::move(found);
@@ -50,7 +51,7 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
 }
 
 std::error_code MakeFolder(const std::string& path) {
-  if (::CreateDirectoryA(path.c_str(), nullptr)) return {};
+  if (::CreateDirectoryW(WidePath(path).c_str(), nullptr)) return {};
   const auto error = LastError();
   return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
 }

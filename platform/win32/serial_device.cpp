@@ -11,6 +11,7 @@
 #include "platform/port_list.h"
 #include "platform/win32/line_settings.h"
 #include "platform/win32/pending_read.h"
+#include "platform/win32/wide_text.h"
 #include "platform/win32/win_handle.h"
 
 namespace kral {
@@ -25,11 +26,11 @@ constexpr DWORD kPurgeBoth = PURGE_TXABORT | PURGE_RXABORT | PURGE_TXCLEAR | PUR
 static_assert(kPurgeInput == 8 && kPurgeBoth == 15);
 
 std::string SystemText(DWORD code) {
-  std::array<char, 512> text{};
+  std::array<wchar_t, 512> text{};
   const DWORD flags = FORMAT_MESSAGE_FROM_SYSTEM | FORMAT_MESSAGE_IGNORE_INSERTS | FORMAT_MESSAGE_MAX_WIDTH_MASK;
-  DWORD length = ::FormatMessageA(flags, nullptr, code, 0, text.data(), static_cast<DWORD>(text.size()), nullptr);
-  while (length > 0 && text[length - 1] == ' ') --length;
-  return {text.data(), length};
+  DWORD length = ::FormatMessageW(flags, nullptr, code, 0, text.data(), static_cast<DWORD>(text.size()), nullptr);
+  while (length > 0 && text[length - 1] == L' ') --length;
+  return Utf8Text({text.data(), length});
 }
 
 DeviceResult Failure(DeviceError error, DWORD code) {

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "platform/win32/com_object.h"
+#include "platform/win32/wide_text.h"
 
 namespace kral {
 namespace {
@@ -37,12 +38,7 @@ class ComOnThisThread {
 };
 
 std::string ToUtf8(BSTR text) {
-  const int length = static_cast<int>(::SysStringLen(text));
-  if (length == 0) return {};
-  const int size = ::WideCharToMultiByte(CP_UTF8, 0, text, length, nullptr, 0, nullptr, nullptr);
-  std::string utf8(static_cast<size_t>(size), '\0');
-  ::WideCharToMultiByte(CP_UTF8, 0, text, length, utf8.data(), size, nullptr, nullptr);
-  return utf8;
+  return Utf8Text({text, ::SysStringLen(text)});
 }
 
 // Calls a getter of the object that hands out a string.

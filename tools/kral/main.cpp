@@ -4,8 +4,11 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
-#include <string_view>
+#include <string>
+#include <utility>
+#include <vector>
 
+#include "platform/console.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/result_lines.h"
@@ -55,12 +58,10 @@ int End(const Context& context, const ToolError& error) {
   return static_cast<int>(error.code());
 }
 
-int Run(int argc, char** argv) {
+int Run(std::vector<std::string> arguments) {
   Context context;
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.
-  if (std::any_of(argv + 1, argv + argc, [](std::string_view word) { return word == "--json"; })) {
-    context.out.UseJson();
-  }
+  if (std::find(arguments.begin(), arguments.end(), "--json") != arguments.end()) context.out.UseJson();
   CLI::App app("Talks to mobile handsets in production and test.", "kral");
   app.require_subcommand(1);
   app.set_version_flag("--version", VersionText);
@@ -82,7 +83,8 @@ int Run(int argc, char** argv) {
   AllowOptionsAnywhere(app);
 
   try {
-    app.parse(argc, argv);
+    std::reverse(arguments.begin(), arguments.end());  // as the parser wants them
+    app.parse(std::move(arguments));
     context.run();
     TellLogFileTrouble(context);
     return static_cast<int>(ExitCode::kDone);
@@ -101,6 +103,7 @@ int Run(int argc, char** argv) {
 }  // namespace kral::tool
 
 int main(int argc, char** argv) {
+  const kral::Utf8Terminal terminal;
   kral::tool::CatchInterrupts();
-  return kral::tool::Run(argc, argv);
+  return kral::tool::Run(kral::ProgramArguments(argc, argv));
 }

@@ -4,10 +4,12 @@
 
 #include <algorithm>
 #include <array>
+#include <filesystem>
 #include <string>
 #include <vector>
 
 #include "platform/file_util.h"
+#include "platform/folder.h"
 #include "platform/message_pump.h"
 #include "platform/named_mutex.h"
 #include "platform/port_list.h"
@@ -113,6 +115,16 @@ TEST(DeviceNames, AreNoFilesAndTheNullDeviceTakesLines) {
   ASSERT_NE(file, nullptr);
   EXPECT_GE(std::fputs("text\n", file), 0);
   EXPECT_EQ(std::fclose(file), 0);
+}
+
+TEST(FileNames, BytesThatAreNoUtf8AreOfTheAnsiCodePage) {
+  const test::TempFolder folder;
+  const std::string name = "gr\xFCn";
+  std::array<wchar_t, 8> wide{};
+  ASSERT_EQ(::MultiByteToWideChar(CP_ACP, 0, name.c_str(), -1, wide.data(), static_cast<int>(wide.size())), 5);
+  EXPECT_FALSE(ReplaceWholeFile(JoinPath(folder.Path(""), name), std::vector<uint8_t>{'1'}));
+  EXPECT_NE(::GetFileAttributesW((std::filesystem::path(folder.Path("")) / wide.data()).c_str()),
+            INVALID_FILE_ATTRIBUTES);
 }
 
 TEST(PseudoTerminalTest, ThereIsNoneAndTheReasonIsTold) {
