@@ -131,9 +131,16 @@ void ForgetAbort(Diag_FTM& phone) {
   phone.efs().gave_up = false;
 }
 
-u32 CleanUpTimeOut(Diag_FTM& phone, u32 time_out_ms) {
+Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms) {
+  if (!phone.efs().gave_up) return ExchangePacket(phone, packet, time_out_ms);
   constexpr u32 kMomentMs = 50;
-  return phone.efs().gave_up ? std::min(time_out_ms, kMomentMs) : time_out_ms;
+  const auto request = packet.request();
+  const auto is_own = [&](std::span<const u8> reply) { return IsOwnReply(request, reply, {}); };
+  // Without a loopback in front: unanswered, it would keep the request from being sent.
+  const Reply reply =
+      phone.SendSync(request, packet.response_area(), request[0], std::min(time_out_ms, kMomentMs), 0, is_own);
+  packet.set_response_length(static_cast<u16>(reply.bytes().size()));
+  return reply;
 }
 
 int CleanUpTries(Diag_FTM& phone) {

@@ -39,7 +39,7 @@ Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, c
 // Every transfer and listing begins with it.
 void ForgetAbort(Diag_FTM& phone);
 // What cleans up behind an aborted one. A handset that was silent when the abort came is told, but hardly waited for.
-u32 CleanUpTimeOut(Diag_FTM& phone, u32 time_out_ms);
+Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms);
 int CleanUpTries(Diag_FTM& phone);
 
 // Whether the transfer or listing is to end; logged and noted when it is.

@@ -96,11 +96,10 @@ bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 t
   packet.Append16(close.header.command);
   packet.Append32(value);
   bool unanswered = false;
-  time_out_ms = CleanUpTimeOut(phone, time_out_ms);
   const int tries = CleanUpTries(phone);
   for (int attempt = 0; attempt < tries; ++attempt) {
     u32 error = 0;
-    const Reply reply = Checked(ExchangePacket(phone, packet, time_out_ms), [&] {
+    const Reply reply = Checked(ExchangeToCleanUp(phone, packet, time_out_ms), [&] {
       return packet.ResponseAt32(kErrorBehindHeader, error) ||
              Fail(Failure(KRAL_ERROR_LINK, "the reply to the closing of a handle is too short"));
     });

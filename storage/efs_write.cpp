@@ -42,7 +42,7 @@ bool Remove(Diag_FTM& phone, const char* efs_file) {
   for (int attempt = 0; attempt < tries; ++attempt) {
     u32 error = 0;
     Compose(phone, kUnlink, PathField(efs_file));
-    if (!ExchangeOnce(phone, CleanUpTimeOut(phone, DefaultTimeOut(phone))) || !ReadFromEnd(phone, {&error})) {
+    if (!ExchangeToCleanUp(phone, phone.packet(), DefaultTimeOut(phone)) || !ReadFromEnd(phone, {&error})) {
       unanswered = true;
       continue;
     }

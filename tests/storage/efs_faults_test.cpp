@@ -281,13 +281,18 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       {"list", "4B 13 0C", [&] { return KRAL_EfsDirectory(handle(), "/d", KRAL_EFS_FILTER_ALL, nullptr, nullptr); }},
   };
   // One that answers nothing any more is not waited for when it comes to cleaning up, either.
-  enum Manner { kSlow, kSilent, kDead };
-  for (const Manner manner : {kSlow, kSilent, kDead}) {
+  // One whose answers come too late for that is told all the same.
+  enum Manner { kSlow, kSilent, kLate, kDead };
+  for (const Manner manner : {kSlow, kSilent, kLate, kDead}) {
     for (const Operation& operation : operations) {
-      constexpr std::array<const char*, 3> kNames = {", slow answers", ", no answer", ", never an answer"};
+      constexpr std::array<const char*, 4> kNames = {", slow answers", ", no answer", ", late answers",
+                                                     ", never an answer"};
       SCOPED_TRACE(testing::Message() << operation.name << kNames[manner]);
       ShortenTimeOuts(3000);
-      handset().faults().Add(manner == kSlow ? handset::Delay(5) : handset::Ignore(),
+      KRAL_SetResynchronise(handle(), manner == kLate ? 1 : 0);
+      handset().faults().Add(manner == kSlow   ? handset::Delay(5)
+                             : manner == kLate ? handset::Lag(400)
+                                               : handset::Ignore(),
                              handset::When::Always().Of(operation.command));
       std::chrono::steady_clock::time_point aborted;
       handset().ClearTrace();
@@ -305,7 +310,11 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       EXPECT_LT(std::chrono::steady_clock::now() - aborted, std::chrono::milliseconds(1000));
       EXPECT_LT(handset().requests().size(), manner == kSlow ? 120u : 9u);
       EXPECT_TRUE(LogText().find(" aborted") != std::string::npos) << LogText();
-      EXPECT_TRUE(manner == kDead || !handset().efs().Exists("/put"));
+      const auto is_kept = [&] { return handset().efs().Exists("/put"); };
+      for (int i = 0; i < 2000 && manner == kLate && is_kept(); ++i) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+      }
+      EXPECT_TRUE(manner == kDead || !is_kept());
       EXPECT_EQ(folder_.Content("target"), "before");
       handset().faults().Clear();
       ClearLog();

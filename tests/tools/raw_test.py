@@ -55,7 +55,7 @@ class Failures(ToolTest):
                 self.assertIn("COM7", error["text"])
                 self.assertIn(hint, error["hint"])
                 self.assertEqual(error.get("status"), status)
-                self.assertEqual(error.get("function"), "KRAL_SendSync" if "raw" in words else None)
+                self.assertEqual(error["function"], "KRAL_SendSync" if "raw" in words else "KRAL_IsPhoneConnected")
                 self.assertIn(reply, answer.get("reply", "")[:2])
 
     def test_what_the_library_refuses_is_a_mistake_and_names_number_and_range(self):

@@ -14,7 +14,7 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint32_t kAnyStatus = UINT32_MAX;
+constexpr std::uint32_t kAnyStatus = UINT32_MAX;  // or kind of one
 constexpr std::uint32_t kNoSuchFile = 2;
 constexpr std::uint32_t kNoRoom = 28;
 constexpr const char* kOtherMode = "the command may need another mode (kral mode), an unlock, or other firmware";
@@ -26,7 +26,7 @@ struct Hint {
   const char* text;
 };
 
-// The first that fits: a kind or status of 0 here fits the records without one.
+// The first that fits.
 constexpr std::array kHints{
     Hint{KRAL_ERROR_INTERNAL, kAnyStatus, kAnyStatus, "--log FILE tells more"},
     Hint{KRAL_ERROR_ARGUMENT, kAnyStatus, kAnyStatus, "--help behind the verb tells what it takes"},
