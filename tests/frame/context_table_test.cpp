@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <memory>
+#include <new>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -11,6 +12,7 @@
 #include "frame/resource_manager.h"
 #include "kral/connection.h"
 #include "kral/text_log.h"
+#include "tests/support/failing_allocation.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/scripted_server.h"
 
@@ -178,6 +180,27 @@ TEST_F(Families, FailedMakerLeavesTheSlotEmpty) {
   const auto throws = [](Diag_FTM&, KRAL_HANDLE) -> std::shared_ptr<FamilyObject> { throw std::runtime_error("no"); };
   EXPECT_EQ(table::GetFamilyObject(handle, FamilySlot::kKivrat, throws), nullptr);
   EXPECT_NE(table::GetFamilyObject(handle, FamilySlot::kKivrat, Maker("kivrat")), nullptr);
+}
+
+// A backup would leave out what is defined in one that it does not see.
+TEST_F(Families, ALackOfMemoryDoesNotMakeThemLookMissing) {
+  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
+  ASSERT_NE(table::GetFamilyObject(handle, FamilySlot::kGps, Maker("gps")), nullptr);
+  size_t refused = 0;
+  for (bool short_of_memory = true; short_of_memory;) {
+    bool found = false;
+    bool threw = false;
+    const test::FailingAllocation failing(refused + 1);
+    try {
+      found = table::GetFamilyObject(handle, FamilySlot::kGps, {}) != nullptr;
+    } catch (const std::bad_alloc&) {
+      threw = true;
+    }
+    short_of_memory = failing.has_failed();
+    if (short_of_memory) ++refused;
+    EXPECT_TRUE(found || threw) << "allocation " << refused;
+  }
+  EXPECT_GT(refused, 0u);
 }
 
 TEST_F(Families, ServerModeSlotsStayEmptyInDirectMode) {

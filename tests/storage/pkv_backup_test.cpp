@@ -10,7 +10,6 @@
 #include "kral/pkv.h"
 #include "storage/pkv_set.h"
 #include "tests/support/efs_fixture.h"
-#include "tests/support/failing_allocation.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
 
@@ -616,39 +615,6 @@ TEST_F(PkvBackup, APlainFileIsAskedForItsSizeOnce) {
     ASSERT_EQ(Run(job), 0u) << ErrorText();
     EXPECT_EQ(RequestsOf(request), 1u);
   }
-}
-
-TEST_F(PkvBackup, ALackOfMemoryLeavesNothingOut) {
-  const std::string definition =
-      "<NvDefinition version='1.0'><NvItem id='5' maxIndex='1'><DataType><Member typeid='word8'/></DataType></NvItem>"
-      "</NvDefinition>";
-  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(handle(), folder_.Add("array.xml", definition).c_str()), 0u);
-  ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 1), 1);
-  ASSERT_EQ(KRAL_PKV_ConfigureCallBack(handle(), nullptr), 1);
-  handset().nv().MakeArray(5, 2);
-  for (uint8_t index = 0; index < 2; ++index) handset().nv().SetElement(5, index, Bytes{7});
-  handset().efs().AddItemFile(kRfFile, RandomBytes(300));
-  ShortenTimeOuts(20);
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
-  const PkvSet whole = Read();
-  size_t done = 0;
-  size_t failed = 0;
-  for (bool short_of_memory = true; short_of_memory;) {
-    const std::string path = folder_.Path("phone.pkv");
-    uint32_t status = 0;
-    {
-      const test::FailingAllocation failing(done + failed + 1);
-      KRAL_BackupNVFromMobileToPKV(handle(), path.c_str(), &status);
-      short_of_memory = failing.has_failed();
-    }
-    handset().efs().OnReset();  // it may never have been told to close what it had opened
-    status == 0 ? ++done : ++failed;
-    if (status != 0) continue;
-    const PkvSet set = Read();
-    EXPECT_EQ(set.items, whole.items) << "allocation " << done + failed;
-    EXPECT_EQ(set.files, whole.files) << "allocation " << done + failed;
-  }
-  EXPECT_GT(failed, 50u);
 }
 
 // Only what is not there has no files.
