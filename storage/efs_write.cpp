@@ -162,7 +162,7 @@ bool WriteMemory(Diag_FTM& phone, std::span<const u8> bytes, const char* efs_fil
   ForgetAbort(phone);
   Source source{.size = static_cast<u32>(bytes.size()), .progress = progress};
   source.read = [bytes](u32 offset, std::span<u8> chunk) {
-    std::copy_n(bytes.begin() + offset, chunk.size(), chunk.begin());
+    std::copy_n(bytes.subspan(offset).begin(), chunk.size(), chunk.begin());
     return true;
   };
   return Write(phone, source, efs_file);
