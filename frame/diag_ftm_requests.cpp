@@ -7,6 +7,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/orbt_server.h"
 #include "frame/request_failure.h"
+#include "platform/forced_unwind.h"
 
 namespace kral {
 namespace {
@@ -98,6 +99,7 @@ Reply Diag_FTM::SendThroughServer(std::span<const uint8_t> request, std::span<ui
   try {
     if (!server_->SendRequest(request, time_out_ms, reply) || reply.empty()) return ReplyKind::kNone;
   } catch (...) {
+    PassForcedUnwind();
     log().WriteLine(kLogErr, "ORBT server exception caught while sending a request in Diag_FTM::SendSync().");
     return ReplyKind::kWriteFailed;
   }

@@ -40,7 +40,7 @@ ExportCall& ExportCall::Answering() noexcept {
   return *this;
 }
 
-ExportCall& ExportCall::Logged(const char* format, ...) noexcept {
+ExportCall& ExportCall::Logged(const char* format, ...) {
   has_line_ = false;
   if (!phone_ || !phone_->log().logging_started() || !phone_->log().Wants(kLogHighLevelStart)) return *this;
   std::array<char, kFormattedCapacity> text;
@@ -61,7 +61,7 @@ Failure UnknownHandle(KRAL_HANDLE handle) {
   return Failure(KRAL_ERROR_ARGUMENT, "the handle 0x%X is not one of a connection", static_cast<unsigned>(handle));
 }
 
-bool ExportCall::Begin() noexcept {
+bool ExportCall::Begin() {
   if (!phone_) {
     uint16_t port = 0;
     Fail(Kral_ResourceManager::PortOf(handle_, port)
@@ -74,7 +74,7 @@ bool ExportCall::Begin() noexcept {
   return IsPermitted();
 }
 
-void ExportCall::WriteName() noexcept {
+void ExportCall::WriteName() {
   if (phone_ && has_line_) phone_->log().WriteLine(kLogHighLevelStart, "%s", name_);
 }
 

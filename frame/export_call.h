@@ -35,7 +35,7 @@ class ExportCall {
   // The line shows another name than the function's own.
   ExportCall& Named(const char* name) noexcept;
   // The line goes on behind the name; written only while logging is started.
-  [[gnu::format(gnu_printf, 2, 3)]] ExportCall& Logged(const char* format, ...) noexcept;
+  [[gnu::format(gnu_printf, 2, 3)]] ExportCall& Logged(const char* format, ...);
   // No line: what follows writes its own, or none.
   ExportCall& Unlogged() noexcept;
 
@@ -106,8 +106,8 @@ class ExportCall {
     }
   }
 
-  void WriteName() noexcept;
-  bool Begin() noexcept;        // the line; false, with the failure recorded, when nothing is to be done
+  void WriteName();
+  bool Begin();                 // the line; false, with the failure recorded, when nothing is to be done
   bool IsPermitted() noexcept;  // by what was required
   void Failed() noexcept;       // records what was noted
   void Threw() noexcept;

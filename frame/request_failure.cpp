@@ -81,6 +81,7 @@ Failure PortFailure(Diag_FTM& phone) {
   if (phone.port_borrowed()) return Failure(KRAL_ERROR_ARGUMENT, "COM%d is held by a boot transfer", port);
   const CSerialPort& line = phone.transport().port();
   if (line.user_defined()) return Failure(KRAL_ERROR_NO_PORT, "the caller's transport is not connected");
+  if (line.gone()) return Failure(KRAL_ERROR_LOST, "the device of COM%d went away", port);
   const DeviceResult& result = line.open_result();
   const auto system = static_cast<uint32_t>(result.system_code);
   switch (result.error) {
