@@ -48,7 +48,7 @@ ExportCall& ExportCall::Logged(const char* format, ...) {
   va_start(arguments, format);
   const int formatted = std::vsnprintf(text.data(), text.size(), format, arguments);
   va_end(arguments);
-  if (formatted >= 0) phone_->log().WriteLine(kLogHighLevelStart, "%s%s", name_, text.data());
+  if (formatted >= 0) WriteEntry(text.data());
   return *this;
 }
 
@@ -75,7 +75,16 @@ bool ExportCall::Begin() {
 }
 
 void ExportCall::WriteName() {
-  if (phone_ && has_line_) phone_->log().WriteLine(kLogHighLevelStart, "%s", name_);
+  if (phone_ && has_line_) WriteEntry("");
+}
+
+// The caller's thread may end in the callback of its text log.
+void ExportCall::WriteEntry(const char* rest) {
+  try {
+    phone_->log().WriteLine(kLogHighLevelStart, "%s%s", name_, rest);
+  } catch (...) {
+    PassForcedUnwind();
+  }
 }
 
 bool ExportCall::IsPermitted() noexcept {
