@@ -308,7 +308,8 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       other.join();
       // Told to be 250 ms; a machine may be busy. One time-out is 3,000.
       EXPECT_LT(std::chrono::steady_clock::now() - aborted, std::chrono::milliseconds(1000));
-      EXPECT_LT(handset().requests().size(), manner == kSlow ? 120u : 14u);
+      // What the one before could not be told to close comes on top.
+      EXPECT_LT(handset().requests().size(), manner == kSlow ? 120u : 16u);
       EXPECT_TRUE(LogText().find(" aborted") != std::string::npos) << LogText();
       const auto is_kept = [&] { return handset().efs().Exists("/put"); };
       for (int i = 0; i < 2000 && manner == kLate && is_kept(); ++i) {
