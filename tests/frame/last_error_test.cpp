@@ -149,7 +149,7 @@ TEST_F(LastError, NamesWhatWasWrong) {
        KRAL_ERROR_BAD_FILE,
        KRAL_ERROR_STATUS_RESULT,
        KRAL_NV_ERROR_CANNOT_LOAD_DEFINITION,
-       "DEF"},
+       "no-such.xml"},
       {"a command with a payload", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
        [&] { return KRAL_FTM_GET_SYNTH_STATE(h, nullptr, 0, data_.data(), &size); }, "KRAL_FTM_GET_SYNTH_STATE",
        KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 19, "75/11/1"},
