@@ -29,7 +29,7 @@ class Info(ToolTest):
             done = self.expect(0, "-p", "7", "info", "--json")
         answer = json.loads(done.out)
         self.assertIsNone(answer["build"])
-        self.assertIn("bad command", done.err)
+        self.assertIn("refused command 124 with 19", done.err)
         self.assertTrue(answer["esn"])
 
     def test_log_holds_every_step(self):

@@ -169,9 +169,25 @@ void Session::StartLog(const SessionOptions& options) const {
   if (to_file) KRAL_StartLogging(handle_, options.log_file.c_str());
 }
 
+bool Session::AnswersInTheEnd() {
+  constexpr std::array<std::int32_t, 2> kLonger = {300, 1000};
+  const std::int32_t before = KRAL_GetTimeOut(handle_, kTimeOutLiveness);
+  bool answers = false;
+  for (const std::int32_t longer : kLonger) {
+    if (answers || TroubleOf(handle_) || Interrupted()) break;
+    KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, std::max(before, longer));
+    answers = KRAL_IsPhoneConnected(handle_) != 0;
+  }
+  KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, before);
+  return answers;
+}
+
 void Session::CheckAnswers(Expected expected) {
   if (expected == Expected::kInBootLoader) return;
   answers_ = KRAL_IsPhoneConnected(handle_) != 0;
+  // A busy machine may keep a healthy handset's answer for longer than one check waits. With the port in order, ask
+  // again, for longer each time; a loader is asked once, for it takes no questions.
+  if (!answers_ && expected != Expected::kMayBeInDownload) answers_ = AnswersInTheEnd();
   if (answers_) return;
   ThrowIfInterrupted();
   const auto record = LastError(handle_);

@@ -65,6 +65,7 @@ class Session {
   std::optional<ToolError> ExplainPort(const KRAL_ERROR& record) const;
   void StartLog(const SessionOptions& options) const;
   void CheckAnswers(Expected expected);
+  bool AnswersInTheEnd();
 
   std::uint16_t port_;
   KRAL_HANDLE handle_;
