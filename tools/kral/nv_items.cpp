@@ -206,7 +206,8 @@ void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t a
   constexpr const char* kHint = "--log FILE tells every item; docs/nv.md describes the files";
   if (record && record->code != KRAL_ERROR_INTERNAL) {
     const ToolError error = ExplainRecord(*record, what, session_.port(), kHint);
-    const bool names_it = std::string_view(error.what()).find(what) != std::string_view::npos;
+    const bool names_it =
+        record->code == KRAL_ERROR_BAD_FILE || std::string_view(error.what()).find(what) != std::string_view::npos;
     if (names_it) throw error;
     throw ToolError(error.code(), fmt::format("{}: {}", what, error.what()), kHint, record);
   }
