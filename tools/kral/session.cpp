@@ -149,6 +149,8 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
       KRAL_ConfigureTimeOut(handle_, kTimeOutCommand, milliseconds);
       KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, milliseconds);
     }
+    // What the handset answers late shall not be taken for the answer to something else.
+    KRAL_SetResynchronise(handle_, 1);
     CheckAnswers(expected);
   } catch (...) {
     KRAL_DisconnectServer(handle_);
