@@ -52,6 +52,19 @@ void* operator new(std::size_t size) {
   return kral::test::Allocate(size);
 }
 
+// The sanitizer has its own of these, whose memory the ones below may not free.
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+  try {
+    return kral::test::Allocate(size);
+  } catch (...) {
+    return nullptr;
+  }
+}
+
+void operator delete(void* memory, const std::nothrow_t&) noexcept {
+  std::free(memory);
+}
+
 void operator delete(void* memory) noexcept {
   std::free(memory);
 }
