@@ -1,6 +1,6 @@
 #include "platform/forced_unwind.h"
 
-#include <cxxabi.h>
+#include <exception>
 
 namespace kral {
 namespace {
@@ -10,13 +10,11 @@ thread_local bool is_ending = false;
 }  // namespace
 
 void PassForcedUnwind() {
-  try {
-    throw;
-  } catch (abi::__forced_unwind&) {
-    is_ending = true;
-    throw;
-  } catch (...) {
-  }
+  // The unwind that ends a thread is no C++ exception, so there is none to point at; a handler for its type would be
+  // given a reference to nothing.
+  if (std::current_exception() != nullptr) return;
+  is_ending = true;
+  throw;
 }
 
 bool IsThreadEnding() {
