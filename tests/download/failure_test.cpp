@@ -10,11 +10,11 @@
 
 #include "kral/error.h"
 #include "kral/kral.h"
+#include "tests/support/boot_wire.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
-#include "tests/support/test_wire.h"
 
 namespace kral {
 namespace {
@@ -121,13 +121,6 @@ class DownloadFailures : public test::DownloadTest {
  protected:
   static constexpr uint8_t kOther = 13;  // the code of no reply here
 
-  void SetUp() override {
-    DownloadTest::SetUp();
-    settings().handshake_limit_ms = 50;
-    AcknowledgeWithin(5);
-    KRAL_ConfigureTimeOut(handle(), 0, 100);
-  }
-
   // The fault strikes the first reply from now on, or the first with that code.
   std::function<uint8_t()> Struck(handset::Fault fault, const When& when, std::function<uint8_t()> call) {
     return [=, this] {
@@ -135,6 +128,19 @@ class DownloadFailures : public test::DownloadTest {
       handset().faults().Add(fault, when);
       const uint8_t result = call();
       handset().faults().Clear();
+      return result;
+    };
+  }
+  // Replies are lost, and silence is not awaited for long. Everything else may take its time on a busy machine.
+  std::function<uint8_t()> Silent(const When& when, std::function<uint8_t()> call) {
+    return [=, this] {
+      settings().handshake_limit_ms = 50;
+      AcknowledgeWithin(30);
+      KRAL_ConfigureTimeOut(handle(), 0, 250);
+      const uint8_t result = Struck(handset::Lose(), when, call)();
+      settings().handshake_limit_ms = UINT32_MAX;
+      AcknowledgeWithin(UINT32_MAX);
+      KRAL_ConfigureTimeOut(handle(), 0, 2000);
       return result;
     };
   }
@@ -196,13 +202,11 @@ TEST_F(DownloadFailures, OfTheLoaderAreTold) {
           {kLoad,
            Struck(handset::WrongCode(kOther), When::Nth(2), Load(good)),
            {KRAL_ERROR_LINK, "command 5", KRAL_ERROR_STATUS_REPLY, kOther}},
-          {kLoad, Struck(handset::Lose(), When::Nth(1), Load(good)), {KRAL_ERROR_NO_ANSWER, "command 15"}},
+          {kLoad, Silent(When::Nth(1), Load(good)), {KRAL_ERROR_NO_ANSWER, "command 15"}},
           {"KRAL_KOVA_NOP",
-           Struck(handset::Lose(), When::Nth(1), [this] { return KRAL_KOVA_NOP(handle()); }),
+           Silent(When::Nth(1), [this] { return KRAL_KOVA_NOP(handle()); }),
            {KRAL_ERROR_NO_ANSWER, "command 6"}},
-          {"KRAL_KOVA_SW_VERSION",
-           Struck(handset::Lose(), When::Nth(1), version),
-           {KRAL_ERROR_NO_ANSWER, "command 12"}},
+          {"KRAL_KOVA_SW_VERSION", Silent(When::Nth(1), version), {KRAL_ERROR_NO_ANSWER, "command 12"}},
       });
 }
 
@@ -237,7 +241,7 @@ TEST_F(DownloadFailures, OfTheFlashProgrammerAreTold) {
           {kFile, Write(image, 0, 0, 1000, long_header.c_str()), {KRAL_ERROR_ARGUMENT, "513 bytes"}},
           {kFile, Write(folder_.Add("dropped.hex", test::kDroppedHex)), {KRAL_ERROR_BAD_FILE, "line 1", 0, 0, 1}},
           {kFile, Write(folder_.Add("two.hex", test::kTwoRegionsHex)), {KRAL_ERROR_BAD_FILE, "second region"}},
-          {kFile, Struck(handset::Lose(), When::Nth(1), Write(image)), {KRAL_ERROR_NO_ANSWER, "command 27"}},
+          {kFile, Silent(When::Nth(1), Write(image)), {KRAL_ERROR_NO_ANSWER, "command 27"}},
           {kFile,
            Struck(handset::WrongCode(kOther), When::Nth(1), Write(image)),
            {KRAL_ERROR_LINK, "command 27", KRAL_ERROR_STATUS_REPLY, kOther}},
@@ -245,14 +249,14 @@ TEST_F(DownloadFailures, OfTheFlashProgrammerAreTold) {
            Struck(handset::WrongCode(kOther), When::Nth(1).Of("08"), Write(image)),
            {KRAL_ERROR_LINK, "instead of an acknowledgement", KRAL_ERROR_STATUS_REPLY, kOther, {}, 0}},
           {kFile,
-           Struck(handset::Lose(), When::From(2).Of("08"), Write(image)),
+           Silent(When::From(2).Of("08"), Write(image)),
            {KRAL_ERROR_LOST, "1000 of 3000 bytes", 0, 0, {}, 1000}},
-          {kFile, Struck(handset::Lose(), When::Nth(1).Of("16"), Write(image)), {KRAL_ERROR_NO_ANSWER, "command 21"}},
+          {kFile, Silent(When::Nth(1).Of("16"), Write(image)), {KRAL_ERROR_NO_ANSWER, "command 21"}},
           {kFile, Aborted(Write(image)), {KRAL_ERROR_ABORTED, "aborted"}},
           {kMem, WriteBytes(nullptr, 5, 0), {KRAL_ERROR_ARGUMENT, "no bytes"}},
           {kMem, WriteBytes(bytes.data(), 300, 0xFFFFFF00), {KRAL_ERROR_ARGUMENT, "past address 0xFFFFFFFF"}},
           {"KRAL_STREAM_SECURITY_MODE",
-           Struck(handset::Lose(), When::Nth(1), [this] { return KRAL_STREAM_SECURITY_MODE(handle(), 1); }),
+           Silent(When::Nth(1), [this] { return KRAL_STREAM_SECURITY_MODE(handle(), 1); }),
            {KRAL_ERROR_NO_ANSWER, "command 23"}},
           {kTable,
            [this] { return KRAL_STREAM_PARTITION_TABLE(handle(), nullptr, 0, nullptr); },
@@ -263,27 +267,14 @@ TEST_F(DownloadFailures, OfTheFlashProgrammerAreTold) {
            table(folder_.Add("table2", "\x01NAME2")),
            {KRAL_ERROR_REFUSED, "differs", KRAL_ERROR_STATUS_LOADER, KRAL_STREAM_PARTITION_USE_OVERRIDE}},
           {kHello, hello(2), {KRAL_ERROR_ARGUMENT, "variant 2"}},
-          {kHello, Struck(handset::Lose(), When::Always(), hello(1)), {KRAL_ERROR_NO_ANSWER, "command 1"}},
+          {kHello, Silent(When::Always(), hello(1)), {KRAL_ERROR_NO_ANSWER, "command 1"}},
       });
   handset().programmer().Set({.open_status = 3});
   ExpectFailures(handle(), {{kFile, Write(image), {KRAL_ERROR_REFUSED, "type 5", KRAL_ERROR_STATUS_LOADER, 3}}});
 }
 
-class BootFailures : public testing::Test {
+class BootFailures : public test::BootWireTest {
  protected:
-  void SetUp() override {
-    const UserTransport user = wire_.AsUserTransport();
-    handle_ =
-        KRAL_ConnectServer_UserDefinedTransport(1, user.handle, user.context, user.send, user.receive, user.flush);
-    phone_ = Kral_ResourceManager::GetPhone(handle_);
-    phone_->kivrat().read_time_out_ms = 20;
-    phone_->kivrat().settle_ms = 0;
-  }
-  void TearDown() override {
-    phone_.reset();
-    KRAL_DisconnectServer(handle_);
-  }
-
   static Bytes Packet(std::vector<uint32_t> fields) {
     handset::ByteWriter packet;
     for (const uint32_t field : fields) packet.U32(field);
@@ -291,18 +282,9 @@ class BootFailures : public testing::Test {
   }
   static Bytes Hello() { return Packet({1, 48, 2, 1, 1024, 0, 0, 0, 0, 0, 0, 0}); }
 
-  // The target says the first, and one more for each write of the host.
   std::function<uint8_t()> Said(std::vector<Bytes> says, std::function<uint8_t()> call) {
     return [=, this] {
-      EXPECT_TRUE(phone_->BorrowPort());
-      auto rest = std::make_shared<std::deque<Bytes>>(says.begin(), says.end());
-      const auto say_next = [rest](const Bytes&) {
-        Bytes next;
-        if (!rest->empty()) next.swap(rest->front()), rest->pop_front();
-        return next;
-      };
-      wire_.ToHost(say_next({}));
-      wire_.OnWrite(say_next);
+      Say(says);
       return call();
     };
   }
@@ -324,9 +306,6 @@ class BootFailures : public testing::Test {
     };
   }
 
-  test::TestWire wire_;
-  KRAL_HANDLE handle_ = 0;
-  std::shared_ptr<Diag_FTM> phone_;
   test::TempFolder folder_;
   const std::string file_ = folder_.Add("programmer", "abcdef");
 };

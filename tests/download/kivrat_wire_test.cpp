@@ -3,12 +3,10 @@
 
 #include <gtest/gtest.h>
 
-#include "frame/resource_manager.h"
 #include "handset/bytes.h"
-#include "kral/connection.h"
+#include "tests/support/boot_wire.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/temp_folder.h"
-#include "tests/support/test_wire.h"
 
 namespace kral {
 namespace {
@@ -46,39 +44,23 @@ std::string ReadRequest(uint32_t offset, uint32_t length) {
   return HexText(handset::ByteWriter().U32(3).U32(20).U32(13).U32(offset).U32(length).Take());
 }
 
-class KivratWire : public testing::Test {
+class KivratWire : public test::BootWireTest {
  protected:
   void SetUp() override {
-    const UserTransport user = wire_.AsUserTransport();
-    handle_ =
-        KRAL_ConnectServer_UserDefinedTransport(1, user.handle, user.context, user.send, user.receive, user.flush);
-    phone_ = Kral_ResourceManager::GetPhone(handle_);
-    phone_->kivrat().read_time_out_ms = 20;
-    phone_->kivrat().settle_ms = 0;
+    BootWireTest::SetUp();
     log_ = std::make_unique<test::PhoneLog>(handle_, KRAL_LOG_ERR | KRAL_LOG_RET);
   }
   void TearDown() override {
     log_.reset();
-    phone_.reset();
-    KRAL_DisconnectServer(handle_);
+    BootWireTest::TearDown();
   }
 
-  // The target says the first text, and each of the others for one write of the host. Empty: nothing.
   void Target(const Texts& says, bool byte_by_byte = false) {
-    ASSERT_TRUE(phone_->BorrowPort());
     log_->Take();
     written_before_ = wire_.Written().size();
-    says_.assign(says.begin(), says.end());
-    say_next_ = [this, byte_by_byte](const Bytes&) {
-      if (says_.empty()) return Bytes();
-      const Bytes bytes = FromHex(says_.front());
-      says_.pop_front();
-      if (!byte_by_byte) return bytes;
-      for (const uint8_t byte : bytes) wire_.ToHost({byte});
-      return Bytes();
-    };
-    wire_.ToHost(say_next_({}));
-    wire_.OnWrite(say_next_);
+    std::vector<Bytes> bytes;
+    for (const std::string& text : says) bytes.push_back(FromHex(text));
+    Say(std::move(bytes), byte_by_byte);
   }
 
   Texts Written() const {
@@ -98,12 +80,7 @@ class KivratWire : public testing::Test {
   }
   bool HasError(const std::string& text) { return log_->Has("16 " + text); }
 
-  test::TestWire wire_;
-  KRAL_HANDLE handle_ = 0;
-  std::shared_ptr<Diag_FTM> phone_;
   std::unique_ptr<test::PhoneLog> log_;
-  std::deque<std::string> says_;
-  test::TestWire::Responder say_next_;
   size_t written_before_ = 0;
   test::TempFolder folder_;
 };
@@ -173,7 +150,7 @@ TEST_F(KivratWire, IdentityDataThatComeLateAreNotTakenForTheHello) {
     return false;
   };
   wire_.OnWrite([&](const Bytes& written) {
-    if (HexText(written) != kSwitch) return say_next_(written);
+    if (HexText(written) != kSwitch) return SayNext();
     Bytes bytes = std::exchange(late, {});
     const Bytes hello = FromHex(kHello);
     bytes.insert(bytes.end(), hello.begin(), hello.end());
