@@ -86,7 +86,8 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::
       break;
     }
     is_own(reply.bytes());
-    const uint32_t elapsed = std::min(clock_.TickMs() - start, time_out_ms);
+    const uint32_t elapsed = clock_.TickMs() - start;
+    if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
     reply = transport().AwaitNext(room, loopback[0], time_out_ms - elapsed, is_own);
   }
   if (reply) answer_owed_ = false;

@@ -89,9 +89,6 @@ class ExportCall {
   // Unless it holds, nothing is done but the line: the failure is an argument's, "there is no response buffer".
   ExportCall& Require(bool holds, const char* otherwise) noexcept;
 
-  // Null for an unknown handle.
-  const std::shared_ptr<Diag_FTM>& phone() const { return phone_; }
-
  private:
   template <class Value, class Operation>
   Value Judged(Value failed, Value passed, Operation&& operation) {

@@ -40,14 +40,17 @@ bool IsOwnReply(std::span<const u8> request, std::span<const u8> reply, const Re
 // While a request is under way. What is sent after an abort, to clean up, is not ended by it.
 class AbortScope {
  public:
-  explicit AbortScope(Diag_FTM& phone) : phone_(phone) {
-    phone.transport().SetAbort(phone.efs().abort ? nullptr : &phone.efs().abort);
-  }
-  ~AbortScope() { phone_.transport().SetAbort(nullptr); }
+  explicit AbortScope(Diag_FTM& phone) : phone_(phone) { Set(phone.efs().abort ? nullptr : &phone.efs().abort); }
+  ~AbortScope() { Set(nullptr); }
   AbortScope(const AbortScope&) = delete;
   AbortScope& operator=(const AbortScope&) = delete;
 
  private:
+  // Through a phone server there is no transport of ours.
+  void Set(const std::atomic<bool>* abort) {
+    if (!phone_.server_mode()) phone_.transport().SetAbort(abort);
+  }
+
   Diag_FTM& phone_;
 };
 
@@ -96,7 +99,8 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
   // A reply with another first byte ends a request of the engine; here it may be late as well, and ours behind it.
   while (reply.kind() == ReplyKind::kOther && reply.refusal() == 0) {
     own_or_noted(reply.bytes());
-    const u32 elapsed = std::min(phone.clock().TickMs() - start, time_out_ms);
+    const u32 elapsed = phone.clock().TickMs() - start;
+    if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own_or_noted);
   }
   if (reply.kind() == ReplyKind::kAborted) phone.efs().gave_up = true;

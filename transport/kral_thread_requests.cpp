@@ -88,7 +88,8 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
                                       const ReplyTest& is_own) {
   const uint32_t start = clock_.TickMs();
   const uint64_t garbled_before = splitter_.deframer().bad_fcs();
-  for (uint32_t waited = 0;; waited = std::min(clock_.TickMs() - start, time_out_ms)) {
+  for (uint32_t waited = 0;; waited = clock_.TickMs() - start) {
+    if (waited > 0 && waited >= time_out_ms) return WhyNoReply(garbled_before);  // nothing but earlier replies
     const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
     if (!record || record->empty()) return WhyNoReply(garbled_before);
     const auto bytes = CopyRecord(*record, room);
