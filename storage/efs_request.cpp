@@ -2,6 +2,7 @@
 #include "storage/efs_request.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "frame/base/text_argument.h"
 #include "storage/efs_strays.h"
@@ -53,6 +54,16 @@ class AbortScope {
 
   Diag_FTM& phone_;
 };
+
+void CloseStrays(Diag_FTM& phone, const EfsRequest<u32>& close, EfsOpenHandles& handles) {
+  for (const u32 value : std::exchange(handles.strays, {})) {
+    phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
+    const KeepFailure keep;
+    const bool closed = CloseHandle(phone, close, value, DefaultTimeOut(phone));
+    // After an abort a silent handset is not waited for: it is told with the next operation.
+    if (!closed && phone.efs().gave_up) handles.strays.push_back(value);
+  }
+}
 
 }  // namespace
 
@@ -181,6 +192,37 @@ bool IsDone(u32 error, const char* path) {
 
 bool Contradicts(Diag_FTM& phone) {
   return Fail(BadReply(phone, "contradicts itself or the request"));
+}
+
+void CloseStrays(Diag_FTM& phone) {
+  CloseStrays(phone, kClose, phone.efs().files);
+  CloseStrays(phone, kCloseDirectory, phone.efs().directories);
+}
+
+bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms) {
+  CDiagPacket& packet = phone.packet(kSidePacket);
+  packet.Reset();
+  packet.Append8(kSubsystemDispatch);
+  packet.Append8(close.header.subsystem);
+  packet.Append16(close.header.command);
+  packet.Append32(value);
+  bool unanswered = false;
+  const int tries = CleanUpTries(phone);
+  for (int attempt = 0; attempt < tries; ++attempt) {
+    u32 error = 0;
+    const Reply reply = Checked(ExchangeToCleanUp(phone, packet, time_out_ms), [&] {
+      return packet.ResponseAt32(kErrorBehindHeader, error) ||
+             Fail(Failure(KRAL_ERROR_LINK, "the reply to the closing of a handle is too short"));
+    });
+    if (!reply) {
+      unanswered = true;
+      continue;
+    }
+    // A handset that does not know the handle any more has closed it on a try whose answer was lost.
+    if (IsDone(error, "what is to be closed") || (unanswered && error == kBadDescriptor)) return true;
+  }
+  phone.log().WriteLine(kLogErr, "EFS2 handle %u could not be closed", value);
+  return false;
 }
 
 }  // namespace kral::efs

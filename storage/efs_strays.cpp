@@ -1,12 +1,10 @@
-// Closes handles of the handset, and finds those of which nobody knows.
+// Looks at replies that nobody waited for. Closing what they name is the sender's.
 #include "storage/efs_strays.h"
 
 #include <algorithm>
 #include <chrono>
-#include <utility>
 
-#include "frame/base/failure.h"
-#include "storage/efs_request.h"
+#include "frame/base/little_endian.h"
 
 namespace kral::efs {
 namespace {
@@ -19,12 +17,11 @@ constexpr int kMostLateReplies = 64;  // a handset that never stops talking is n
 
 struct Kind {
   u16 open;
-  const EfsRequest<u32>& close;
   EfsOpenHandles EfsSettings::*handles;
 };
 constexpr Kind kKinds[] = {
-    {kOpen.header.command, kClose, &EfsSettings::files},
-    {kOpenDirectory.header.command, kCloseDirectory, &EfsSettings::directories},
+    {kOpen.header.command, &EfsSettings::files},
+    {kOpenDirectory.header.command, &EfsSettings::directories},
 };
 
 bool IsAwaited(const EfsSettings& settings) {
@@ -72,45 +69,6 @@ bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count)
   }
   if (handles.unanswered <= left) return true;
   phone.log().WriteLine(kLogErr, "EFS2 answer to an opening request is lost: the handset may keep a handle open");
-  return false;
-}
-
-void CloseStrays(Diag_FTM& phone) {
-  for (const Kind& kind : kKinds) {
-    auto& strays = (phone.efs().*kind.handles).strays;
-    for (const u32 value : std::exchange(strays, {})) {
-      phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
-      const KeepFailure keep;
-      const bool closed = CloseHandle(phone, kind.close, value, DefaultTimeOut(phone));
-      // After an abort a silent handset is not waited for: it is told with the next operation.
-      if (!closed && phone.efs().gave_up) strays.push_back(value);
-    }
-  }
-}
-
-bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms) {
-  CDiagPacket& packet = phone.packet(kSidePacket);
-  packet.Reset();
-  packet.Append8(kSubsystemDispatch);
-  packet.Append8(close.header.subsystem);
-  packet.Append16(close.header.command);
-  packet.Append32(value);
-  bool unanswered = false;
-  const int tries = CleanUpTries(phone);
-  for (int attempt = 0; attempt < tries; ++attempt) {
-    u32 error = 0;
-    const Reply reply = Checked(ExchangeToCleanUp(phone, packet, time_out_ms), [&] {
-      return packet.ResponseAt32(kErrorBehindHeader, error) ||
-             Fail(Failure(KRAL_ERROR_LINK, "the reply to the closing of a handle is too short"));
-    });
-    if (!reply) {
-      unanswered = true;
-      continue;
-    }
-    // A handset that does not know the handle any more has closed it on a try whose answer was lost.
-    if (IsDone(error, "what is to be closed") || (unanswered && error == kBadDescriptor)) return true;
-  }
-  phone.log().WriteLine(kLogErr, "EFS2 handle %u could not be closed", value);
   return false;
 }
 

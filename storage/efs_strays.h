@@ -21,11 +21,6 @@ void NoteLateReplies(Diag_FTM& phone);
 // Waits a moment for the answers to so many opening requests that were given up. False (logged) when not all came.
 bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count);
 
-// Closes what was noted. The request and the reply in the phone's default packet buffer stay.
-void CloseStrays(Diag_FTM& phone);
-// Tried until the handset confirms it; a failure is logged. The default packet buffer stays, too.
-bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms);
-
 }  // namespace kral::efs
 
 #endif

@@ -10,7 +10,8 @@
 #include "storage/nv_report.h"
 #include "storage/nv_tool.h"
 #include "storage/nv_value.h"
-#include "storage/pkv_jobs.h"
+#include "storage/phone_identity.h"
+#include "storage/pkv_array_note.h"
 #include "transport/kral_thread_interface.h"
 
 namespace kral::nv {
@@ -44,7 +45,7 @@ NvError Judged(Diag_FTM& phone, const PkvOutcome& outcome) {
 NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
   const PkvOutcome outcome = ReadPkv(file, set);
   const NvError error = Judged(phone, outcome);
-  pkv::LogUnread(phone, file, set);
+  LogUnread(phone.log(), file, set);
   return error;
 }
 
@@ -188,7 +189,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   if (walk.failed()) return NvError::kCannotSetValue;
   // Values need no handset, and the null port is none; one that is there signs them.
   const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
-  if (has_handset) pkv::ReadIdentity(phone, set.properties);
+  if (has_handset) items::AppendIdentity(phone, set.properties);
   pkv::NoteArrays(arrays, set.properties);
   const PkvOutcome outcome = WritePkv(file, set, &phone.log());
   return Judged(phone, outcome);

@@ -7,7 +7,9 @@
 #include "commands/nv_item.h"
 #include "frame/base/failure.h"
 #include "platform/file_util.h"
+#include "storage/phone_identity.h"
 #include "storage/phone_items.h"
+#include "storage/pkv_array_note.h"
 #include "storage/pkv_jobs.h"
 
 namespace kral::pkv {
@@ -16,37 +18,6 @@ namespace {
 using Answer = PhoneItems::Answer;
 
 constexpr size_t kMostFileBytes = kCompoundFileLimit / 2;  // of all files; the items take less than the rest
-
-// A text of the handset as the value of a property: it must not end its line.
-std::string PropertyText(const char* text) {
-  std::string value = text;
-  std::replace_if(
-      value.begin(), value.end(), [](char c) { return static_cast<unsigned char>(c) < ' '; }, ' ');
-  value.erase(value.find_last_not_of(' ') + 1);
-  return value;
-}
-
-}  // namespace
-
-void ReadIdentity(Diag_FTM& phone, PkvProperties& properties) {
-  uint32_t serial = 0;
-  if (diag::ReadSerialNumber(phone, &serial)) {
-    std::array<char, 16> text{};
-    std::snprintf(text.data(), text.size(), "%08X", static_cast<unsigned>(serial));
-    properties.values.emplace_back("ESN", text.data());
-  }
-  std::array<std::array<char, CDiagPacket::kCapacity>, 2> texts{};
-  uint32_t hardware = 0;
-  uint32_t model = 0;
-  if (diag::ReadExtendedBuildId(phone, &hardware, &model, texts[0].data(), texts[1].data())) {
-    properties.values.emplace_back("HardwareVersion", std::to_string(hardware));
-    properties.values.emplace_back("MobileModel", std::to_string(model));
-    properties.values.emplace_back("SoftwareRevision", PropertyText(texts[0].data()));
-    properties.values.emplace_back("Model", PropertyText(texts[1].data()));
-  }
-}
-
-namespace {
 
 struct Wanted {
   uint16_t id;
@@ -162,7 +133,7 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
              .Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_CANNOT_OPEN));
     return KRAL_PKV_STATUS_CANNOT_OPEN;
   }
-  ReadIdentity(phone, set.properties);
+  items::AppendIdentity(phone, set.properties);
   const uint32_t status = BackupJob(phone).Run(set);
   if (status != KRAL_PKV_STATUS_DONE && status != KRAL_PKV_STATUS_INCOMPLETE) {
     phone.log().WriteLine(kLogErr, "KRAL_BackupNVFromMobileToPKV() - nothing written, status %u", status);

@@ -1,19 +1,14 @@
 // The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
-#include "frame/base/guarded_call.h"
 #include "storage/pkv_jobs.h"
 
-#include <algorithm>
-#include <charconv>
-#include <string_view>
-
 #include "frame/base/failure.h"
+#include "frame/base/guarded_call.h"
 #include "kral/efs.h"
 #include "storage/nv_tool.h"
+#include "storage/pkv_array_note.h"
 
 namespace kral::pkv {
 namespace {
-
-constexpr const char* kArraysProperty = "Arrays";
 
 uint32_t* CounterOf(KRAL_PKV_COUNTS& counts, uint32_t result) {
   switch (result) {
@@ -101,15 +96,6 @@ uint32_t StatusOf(PkvResult result) {
   return KRAL_PKV_STATUS_CANNOT_OPEN;
 }
 
-void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set) {
-  constexpr size_t kMostLines = 20;
-  for (size_t i = 0; i < std::min(set.unread.size(), kMostLines); ++i) {
-    phone.log().WriteLine(kLogErr, "%s: %s; passed over", path.c_str(), set.unread[i].c_str());
-  }
-  if (set.unread.empty()) return;
-  phone.log().WriteLine(kLogErr, "%s: %u parts passed over", path.c_str(), static_cast<unsigned>(set.unread.size()));
-}
-
 void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome) {
   phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
   Fail(Failure(KRAL_ERROR_BAD_FILE, "%s", outcome.text.c_str())
@@ -120,7 +106,7 @@ uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
   phone.pkv().counts = {};
   const PkvOutcome outcome = ReadPkv(path, set);
   if (!outcome.done()) NoteFile(phone, outcome);
-  LogUnread(phone, path, set);
+  LogUnread(phone.log(), path, set);
   if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
   phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
   Fail(FileFailure(path, "holds no item and no file").Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_BAD_ITEM));
@@ -135,28 +121,6 @@ std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
     if (item.id && !item.is_file()) items.emplace(*item.id, item.max_index);
   });
   return items;
-}
-
-void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties) {
-  std::string list;
-  for (const uint16_t id : ids) list += (list.empty() ? "" : ",") + std::to_string(id);
-  properties.values.emplace_back(kArraysProperty, list);
-}
-
-std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties) {
-  const auto& values = properties.values;
-  const auto note =
-      std::find_if(values.begin(), values.end(), [](const auto& v) { return v.first == kArraysProperty; });
-  if (note == values.end()) return std::nullopt;
-  std::set<uint16_t> ids;
-  for (std::string_view rest = note->second; !rest.empty();) {
-    const std::string_view digits = rest.substr(0, rest.find(','));
-    rest.remove_prefix(std::min(digits.size() + 1, rest.size()));
-    uint16_t id = 0;
-    const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), id);
-    if (error == std::errc() && end == digits.data() + digits.size()) ids.insert(id);
-  }
-  return ids;
 }
 
 bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present) {

@@ -21,9 +21,6 @@ uint32_t Verify(Diag_FTM& phone, const std::string& path);   // pkv_verify.cpp
 
 bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions);
 
-// Appends who the handset is, as far as it tells (pkv_backup.cpp).
-void ReadIdentity(Diag_FTM& phone, PkvProperties& properties);
-
 // What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
 class JobReport {
  public:
@@ -50,9 +47,6 @@ class JobReport {
   bool stopped_ = false;
 };
 
-// Tells the log what a file holds beside what was read.
-void LogUnread(Diag_FTM& phone, const std::string& path, const PkvSet& set);
-
 // What is wrong with a file is logged, and noted as the failure.
 void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome);
 // Reads the file of a restore or a comparison.
@@ -61,12 +55,6 @@ uint32_t StatusOf(PkvResult result);
 
 // The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
 std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
-
-// Notes which ids are arrays, as "3101,3102": an element 0 alone looks like a plain item.
-void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties);
-
-// The ids of that note; nothing where there is none.
-std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties);
 
 // Whether the handset holds what the file keeps: content, kind and permissions. A file that is too large for an item
 // file has come back as a plain one. A mode of 0 is unknown.

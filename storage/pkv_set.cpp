@@ -150,6 +150,15 @@ PkvOutcome ReadPkv(const std::string& path, PkvSet& set) {
   return {};
 }
 
+void LogUnread(DataLogFileHandler& log, const std::string& path, const PkvSet& set) {
+  constexpr size_t kMostLines = 20;
+  for (size_t i = 0; i < std::min(set.unread.size(), kMostLines); ++i) {
+    log.WriteLine(kLogErr, "%s: %s; passed over", path.c_str(), set.unread[i].c_str());
+  }
+  if (set.unread.empty()) return;
+  log.WriteLine(kLogErr, "%s: %u parts passed over", path.c_str(), static_cast<unsigned>(set.unread.size()));
+}
+
 PkvWriter ChosenPkvWriter() {
   return IsSwitchSet(kUsePkvFile) ? PkvWriter::kVarnPkvFile : PkvWriter::kStorageClasses;
 }

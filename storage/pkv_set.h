@@ -43,6 +43,9 @@ struct PkvOutcome {
 // before.
 PkvOutcome ReadPkv(const std::string& path, PkvSet& set);
 
+// Says what a file holds beside what was read.
+void LogUnread(DataLogFileHandler& log, const std::string& path, const PkvSet& set);
+
 enum class PkvWriter { kStorageClasses, kVarnPkvFile };
 
 // As the station is set up: VARN_PkvFile where the registry key SOFTWARE\Kral\VARN\UsePkvFile (Windows) or the
