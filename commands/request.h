@@ -21,6 +21,7 @@
 #include <utility>
 
 #include "frame/base/diag_packet.h"
+#include "frame/base/wire_codes.h"
 #include "frame/diag_ftm.h"
 
 namespace kral {
@@ -132,8 +133,6 @@ struct DiagHeader {
   }
   Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed + 1U); }
 };
-
-inline constexpr u8 kSubsystemDispatch = 75;
 
 // The subsystem-dispatch form: 75, the subsystem, its 16-bit command.
 struct SubsystemHeader {

@@ -40,7 +40,7 @@ Diag_FTM::Diag_FTM(uint16_t port, Clock& clock, DeviceOpener opener)
   dispatching_.reset(&parts_->dispatcher);
   // Without a thread for it no port is opened (OpenDirect), and the next opening tries again.
   parts_->dispatcher.RegisterListener(&parts_->sorter, nullptr, parts_);
-  parts_->transport->Attach(&parts_->dispatcher, &parts_->sorter);
+  parts_->transport->Attach(&parts_->dispatcher, &parts_->responses, &parts_->sorter);
   ApplyDefaults();
 }
 

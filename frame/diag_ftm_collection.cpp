@@ -7,9 +7,13 @@
 namespace kral {
 
 TrafficCounters Diag_FTM::counters() {
-  if (server_mode()) return sorter().counters();
-  TrafficCounters counters = transport().counters();
-  counters.packets_received += player().played_in_all();
+  TrafficCounters counters = sorter().counters();
+  if (server_mode()) return counters;
+  const TrafficCounters line = transport().counters();
+  counters.bytes_received = line.bytes_received;
+  counters.packets_received = line.packets_received + player().played_in_all();
+  counters.bad_fcs = line.bad_fcs;
+  counters.oversized += line.oversized;
   counters.waiting = dispatcher().backlog();
   counters.most_waiting = dispatcher().greatest_backlog();
   return counters;

@@ -12,11 +12,10 @@ namespace kral {
 namespace {
 
 constexpr uint8_t kVersionRequest = 0;
-constexpr uint8_t kLoopbackRequest = 123;
 constexpr uint8_t kLoopbackBytes = 10;
 
 // The diagnostic service of an application processor: subsystem dispatch, subsystem, 16-bit command, two zeros.
-constexpr std::array<uint8_t, 4> kDiagServicePing = {75, 50, 3, 0};
+constexpr std::array<uint8_t, 4> kDiagServicePing = {kSubsystemDispatch, 50, 3, 0};
 
 // Whether the transport counts as alive without an answer.
 constexpr uint32_t kStateAliveWithoutAnswer = 4;
@@ -173,9 +172,9 @@ bool Diag_FTM::IsDiagServiceAlive() {
 bool Diag_FTM::IsLoopbackAnswered() {
   CDiagPacket& loopback = packet();
   loopback.Reset();
-  loopback.Append8(kLoopbackRequest);
+  loopback.Append8(kLoopback);
   for (uint8_t value = 0; value < kLoopbackBytes; ++value) loopback.Append8(value);
-  log().WriteLine(kLogRet, "KRAL_IsPhoneConnected() -- pinging phone with loopback command, 0x%X", kLoopbackRequest);
+  log().WriteLine(kLogRet, "KRAL_IsPhoneConnected() -- pinging phone with loopback command, 0x%X", kLoopback);
   if (!Send(loopback, TimeOut(kTimeOutLiveness))) {
     return !server_mode() && transport().QueryState(kStateAliveWithoutAnswer) == 1 && transport().connected();
   }

@@ -12,7 +12,7 @@
 namespace kral {
 namespace {
 
-constexpr std::array<uint8_t, 1> kLoopbackRequest{123};
+constexpr std::array<uint8_t, 1> kLoopbackRequest{kLoopback};
 
 // Of a request whose reply was another one the own reply may still be on its way, too.
 bool MayComeLater(const Reply& reply) {

@@ -29,8 +29,6 @@ const Refusal* FindRefusal(uint8_t code) {
   return found == std::end(kRefusals) ? nullptr : found;
 }
 
-constexpr uint8_t kSubsystemDispatch = 75;
-
 // "command 38"; "command 75/19/3" under the subsystem dispatch.
 std::array<char, 24> CommandName(std::span<const uint8_t> request) {
   std::array<char, 24> name{};

@@ -8,7 +8,6 @@
 namespace kral {
 namespace {
 
-constexpr size_t kFcsBytes = 2;
 constexpr size_t kReportHeader = 3;
 constexpr size_t kReportLength = 1;
 
@@ -21,8 +20,8 @@ constexpr uint16_t kTruncatedTimeStamp = 0x8000;
 }  // namespace
 
 EventReportReader::EventReportReader(std::span<const uint8_t> packet) {
-  if (packet.size() < kReportHeader + kFcsBytes || packet[0] != kEventReportCode) return;
-  const auto events = packet.subspan(kReportHeader, packet.size() - kReportHeader - kFcsBytes);
+  if (packet.size() < kReportHeader + kFcsSize || packet[0] != kEventReportCode) return;
+  const auto events = packet.subspan(kReportHeader, packet.size() - kReportHeader - kFcsSize);
   const size_t told = LoadLe<uint16_t>(packet, kReportLength).value_or(0);
   rest_ = events.first(std::min(events.size(), told));
 }

@@ -8,11 +8,11 @@
 #include <optional>
 #include <span>
 
+#include "frame/base/wire_codes.h"
 #include "transport/event_record.h"
 
 namespace kral {
 
-inline constexpr uint8_t kEventReportCode = 96;
 inline constexpr size_t kSmallestEvent = 4;  // header and truncated time stamp
 
 struct Event {

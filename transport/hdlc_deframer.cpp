@@ -6,6 +6,7 @@
 
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
+#include "frame/base/wire_codes.h"
 #include "transport/byte_block.h"
 #include "transport/fcs16.h"
 #include "transport/hdlc_frame.h"
@@ -14,8 +15,8 @@ namespace kral {
 namespace {
 
 // First bytes of packets that the handset sends unasked, and what becomes of them: required as they are.
-constexpr std::array<uint8_t, 4> kUncheckedCodes = {16, 31, 96, 121};  // log, 31, event, extended message
-constexpr uint8_t kIgnoredCode = 146;
+constexpr std::array<uint8_t, 4> kUncheckedCodes = {kLogCode, kUnasked31, kEventReportCode, kExtendedMessageCode};
+constexpr uint8_t kIgnoredCode = kUnasked146;
 
 bool IsUnchecked(uint8_t code) {
   return std::find(kUncheckedCodes.begin(), kUncheckedCodes.end(), code) != kUncheckedCodes.end();

@@ -7,12 +7,13 @@
 #include <cstdint>
 #include <span>
 
+#include "frame/base/wire_codes.h"
+
 namespace kral {
 
 inline constexpr uint8_t kFrameFlag = 0x7E;
 inline constexpr uint8_t kFrameEscape = 0x7D;
 inline constexpr uint8_t kEscapeBit = 0x20;  // toggled in the byte behind an escape byte
-inline constexpr size_t kFcsSize = 2;
 
 inline constexpr size_t kMaximumPayload = 16381;
 // No escape pair begins at or behind this offset of the stuffed body; plain bytes may.

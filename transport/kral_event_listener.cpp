@@ -16,10 +16,6 @@
 namespace kral {
 namespace {
 
-// First bytes of what a handset sends unasked.
-constexpr uint8_t kLogCode = 16;
-constexpr uint8_t kAsynchronousCodes[] = {kLogCode, 31, kEventReportCode, 121, 146};
-
 static_assert(sizeof(KRAL_EVENT) == EventRecord::kSize);
 
 constexpr size_t kSmallestPacket = 2;
@@ -32,10 +28,6 @@ void Increment(std::atomic<uint64_t>& counter) {
 }
 
 }  // namespace
-
-bool IsAsynchronousCode(uint8_t code) {
-  return std::find(std::begin(kAsynchronousCodes), std::end(kAsynchronousCodes), code) != std::end(kAsynchronousCodes);
-}
 
 CKralEventListener::CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous,
                                        BoundedQueue<EventRecord>& events)
@@ -70,14 +62,12 @@ void CKralEventListener::TakePacket(Packet packet) {
   }
 }
 
-void CKralEventListener::EndWaits() {
-  responses_.Close();
+void CKralEventListener::OnPortGone() {
   asynchronous_.Interrupt();
   events_.Interrupt();
 }
 
-void CKralEventListener::AllowWaits() {
-  responses_.Reopen();
+void CKralEventListener::OnPortOpened() {
   asynchronous_.ForgetInterrupt();
   events_.ForgetInterrupt();
 }

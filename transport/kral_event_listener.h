@@ -14,6 +14,7 @@
 #include "transport/bounded_queue.h"
 #include "transport/event_record.h"
 #include "transport/kral_events.h"
+#include "transport/port_watcher.h"
 #include "transport/traffic_counters.h"
 
 namespace kral {
@@ -21,9 +22,6 @@ namespace kral {
 class CaptureWriter;
 class DataLogFileHandler;
 class NameTables;
-
-// Whether a packet that begins so is sent unasked: logs, messages, event reports and two further kinds.
-bool IsAsynchronousCode(uint8_t code);
 
 // Called with (length, bytes, caller's value) for every packet, before it is sorted.
 using RawPacketCallback = void (*)(uint32_t length, const uint8_t* bytes, uintptr_t value);
@@ -50,7 +48,7 @@ class LogHandler {
 };
 
 // Packets come on the dispatcher thread, or on a phone server's threads; everything else from any thread.
-class CKralEventListener : public PacketListener {
+class CKralEventListener : public PacketListener, public PortWatcher {
  public:
   CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous, BoundedQueue<EventRecord>& events);
 
@@ -66,9 +64,9 @@ class CKralEventListener : public PacketListener {
   // Before the first packet; both outlive the sorter. The texts of events, and where collected packets go as well.
   void SetNames(const NameTables* names) { names_ = names; }
   void SetCapture(CaptureWriter* capture) { capture_ = capture; }
-  // Nothing comes any more, until AllowWaits: waits for a response end at once, and so does one wait for the others.
-  void EndWaits();
-  void AllowWaits();
+  // One wait for what nobody asked for ends at once: nothing comes any more.
+  void OnPortGone() override;
+  void OnPortOpened() override;
   // While collection is off, asynchronous packets are dropped.
   void SetCollection(bool on) { collecting_ = on; }
   bool collecting() const { return collecting_; }

@@ -5,8 +5,8 @@
 #include <utility>
 
 #include "frame/base/text_log.h"
+#include "frame/base/wire_codes.h"
 #include "platform/forced_unwind.h"
-#include "transport/kral_event_listener.h"
 #include "transport/kral_events.h"
 
 namespace kral {
@@ -37,9 +37,10 @@ CKralThreadInterface::~CKralThreadInterface() {
   StopThread();
 }
 
-void CKralThreadInterface::Attach(CKralEvents* dispatcher, CKralEventListener* sorter) {
+void CKralThreadInterface::Attach(CKralEvents* dispatcher, PacketQueue* responses, PortWatcher* watcher) {
   feed_.dispatcher = dispatcher;
-  sorter_ = sorter;
+  responses_ = responses;
+  watcher_ = watcher;
 }
 
 void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> packet) {
@@ -148,15 +149,18 @@ bool CKralThreadInterface::Close() {
 
 // Whoever waits for a device that is gone waits in vain, but for what came before.
 void CKralThreadInterface::EndWaits() {
-  if (sorter_ == nullptr || waits_ended_.exchange(true)) return;
+  if (responses_ == nullptr || waits_ended_.exchange(true)) return;
   if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kLastPacketsMs);
-  sorter_->EndWaits();
+  responses_->Close();
+  watcher_->OnPortGone();
 }
 
 void CKralThreadInterface::BeginTraffic() {
   splitter_.DropPartialPacket();  // its rest will not come through another opening
   waits_ended_ = false;
-  if (sorter_ != nullptr) sorter_->AllowWaits();
+  if (responses_ == nullptr) return;
+  responses_->Reopen();
+  watcher_->OnPortOpened();
 }
 
 bool CKralThreadInterface::PauseThread() {
@@ -230,11 +234,10 @@ void CKralThreadInterface::WakeReceiver() {
 
 TrafficCounters CKralThreadInterface::counters() const {
   TrafficCounters counters;
-  if (sorter_ != nullptr) counters = sorter_->counters();
   counters.bytes_received = loop_.bytes_received();
   counters.packets_received = feed_.packets.load(std::memory_order_relaxed);
   counters.bad_fcs = splitter_.deframer().bad_fcs();
-  counters.oversized += splitter_.deframer().oversized();
+  counters.oversized = splitter_.deframer().oversized();
   return counters;
 }
 

@@ -13,6 +13,7 @@
 #include "platform/clock.h"
 #include "transport/chunk_splitter.h"
 #include "transport/hdlc_framer.h"
+#include "transport/port_watcher.h"
 #include "transport/receive_loop.h"
 #include "transport/reply.h"
 #include "transport/serial_port.h"
@@ -23,7 +24,6 @@
 namespace kral {
 
 class CKralEvents;
-class CKralEventListener;
 class DataLogFileHandler;
 
 inline constexpr uint32_t kNullPort = 65534;
@@ -37,13 +37,14 @@ class CKralThreadInterface {
   CKralThreadInterface(const CKralThreadInterface&) = delete;
   CKralThreadInterface& operator=(const CKralThreadInterface&) = delete;
 
-  // Before the first Open. Both are kept by the owner that is given to Open.
-  void Attach(CKralEvents* dispatcher, CKralEventListener* sorter);
+  // Before the first Open: where packets go, and the queue into which replies come of them. All are kept by the owner
+  // that is given to Open.
+  void Attach(CKralEvents* dispatcher, PacketQueue* responses, PortWatcher* watcher);
   void SetLogger(DataLogFileHandler* log);
 
   // --- Connection (kral_thread_interface.cpp) -----------------------------------------------------------------------
   // Opens the port (or binds the caller's functions) and starts or resumes the receive thread. `owner` is what the
-  // thread keeps alive: the object that holds this transport, its dispatcher, sorter and log. Fails as well while a
+  // thread keeps alive: the object that holds this transport, its dispatcher, queues and log. Fails as well while a
   // thread that did not stop in time is still busy, in a caller's function or a callback.
   bool Open(uint32_t port_number, const UserTransport& user, std::shared_ptr<void> owner);
   // A caller's transport stays connected: only StopThread ends that.
@@ -91,6 +92,7 @@ class CKralThreadInterface {
   uint32_t QueryState(uint32_t code) const;
   std::span<const uint8_t> timed_out_request() const { return timed_out_request_; }
 
+  // As far as they are known here: of the port and of its packets.
   TrafficCounters counters() const;
 
   CProtAHDLC& framer() { return framer_; }
@@ -132,10 +134,11 @@ class CKralThreadInterface {
 
   Clock& clock_;
   DataLogFileHandler* log_ = nullptr;
-  CKralEventListener* sorter_ = nullptr;
+  PacketQueue* responses_ = nullptr;
+  PortWatcher* watcher_ = nullptr;
   std::atomic<bool> connected_{false};
   std::atomic<bool> null_port_{false};
-  std::atomic<bool> waits_ended_{false};  // since the port was opened
+  std::atomic<bool> waits_ended_{false};      // since the port was opened
   const std::atomic<bool>* abort_ = nullptr;  // of whoever holds the request lock
   bool user_defined_ = false;
   bool paused_ = false;

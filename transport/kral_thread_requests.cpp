@@ -6,7 +6,6 @@
 
 #include "frame/base/hex_dump.h"
 #include "frame/base/text_log.h"
-#include "transport/kral_event_listener.h"
 #include "transport/kral_events.h"
 #include "transport/kral_thread_interface.h"
 
@@ -42,7 +41,7 @@ std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> roo
 
 Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
                                      uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
-  if (sorter_ == nullptr) return ReplyKind::kNotSent;
+  if (responses_ == nullptr) return ReplyKind::kNotSent;
   LogRequest("SEND (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
@@ -81,7 +80,7 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
 void CKralThreadInterface::ForgetReplies() {
   loop_.WaitForChunk(kSettleMs);
   if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
-  sorter_->responses().Clear();
+  responses_->Clear();
 }
 
 Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
@@ -108,8 +107,8 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
 
 std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
   constexpr std::chrono::milliseconds kMoment{80};
-  auto record = sorter_->responses().PopWithin(time_out, abort_);
-  if (!record && abort_ != nullptr && *abort_) record = sorter_->responses().PopWithin(std::min(time_out, kMoment));
+  auto record = responses_->PopWithin(time_out, abort_);
+  if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMoment));
   return record;
 }
 
@@ -131,7 +130,7 @@ void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
 }
 
 Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
-  if (sorter_ == nullptr) return ReplyKind::kNotSent;
+  if (responses_ == nullptr) return ReplyKind::kNotSent;
   LogRequest("SEND RAW (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
@@ -157,8 +156,8 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
   const uint32_t start = clock_.TickMs();
   const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (;;) {
-    const bool ended = sorter_->responses().closed();
-    if (const auto record = sorter_->responses().Pop()) {
+    const bool ended = responses_->closed();
+    if (const auto record = responses_->Pop()) {
       const size_t count = std::min(record->size(), room.size());
       std::copy_n(record->begin(), count, room.begin());
       if (log_) {

@@ -6,6 +6,8 @@
 #include <functional>
 #include <span>
 
+#include "frame/base/wire_codes.h"
+
 namespace kral {
 
 enum class ReplyKind : uint8_t {
@@ -20,17 +22,6 @@ enum class ReplyKind : uint8_t {
   kNullPort,     // not sent: there is no handset behind the null port
   kNotSent,      // held back by the library itself
 };
-
-// The error responses of the diagnostic protocol.
-namespace refusal {
-inline constexpr uint8_t kCommand = 19;
-inline constexpr uint8_t kParameter = 20;
-inline constexpr uint8_t kLength = 21;
-inline constexpr uint8_t kMode = 24;
-}  // namespace refusal
-constexpr bool IsRefusal(uint8_t code) {
-  return code == refusal::kCommand || code == refusal::kParameter || code == refusal::kLength || code == refusal::kMode;
-}
 
 // Lies in the memory that was given for it, without FCS bytes.
 class Reply {

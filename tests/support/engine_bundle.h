@@ -23,7 +23,7 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
     bundle->sorter.SetLogger(bundle->log.log());
     bundle->transport.SetLogger(bundle->log.log());
     bundle->dispatcher.RegisterListener(&bundle->sorter, nullptr, bundle);
-    bundle->transport.Attach(&bundle->dispatcher, &bundle->sorter);
+    bundle->transport.Attach(&bundle->dispatcher, &bundle->responses, &bundle->sorter);
     return bundle;
   }
 
