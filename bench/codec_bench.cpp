@@ -13,9 +13,9 @@
 #include <vector>
 
 #include "bench/support/plain_hdlc.h"
-#include "transport/fcs16.h"
-#include "transport/hdlc_deframer.h"
-#include "transport/hdlc_frame.h"
+#include "transport/line/fcs16.h"
+#include "transport/line/hdlc_deframer.h"
+#include "transport/line/hdlc_frame.h"
 
 namespace {
 

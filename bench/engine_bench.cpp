@@ -14,7 +14,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "handset/caller_transport.h"
-#include "handset/frame_codec.h"
+#include "handset/line/frame_codec.h"
 #include "handset/pty_cable.h"
 #include "handset/virtual_handset.h"
 #include "kral/connection.h"

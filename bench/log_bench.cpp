@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "frame/resource_manager.h"
-#include "handset/frame_codec.h"
+#include "handset/line/frame_codec.h"
 #include "kral/connection.h"
 #include "kral/log.h"
 #include "kral/transport.h"

@@ -7,7 +7,7 @@
 #include <fstream>
 #include <string>
 
-#include "storage/nv_definition_xml.h"
+#include "storage/nv/nv_definition_xml.h"
 
 namespace {
 

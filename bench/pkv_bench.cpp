@@ -12,7 +12,7 @@
 #include "kral/nv.h"
 #include "kral/pkv.h"
 #include "kral/transport.h"
-#include "storage/pkv_set.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace {

@@ -17,7 +17,7 @@
 #include <thread>
 #include <vector>
 
-#include "handset/frame_codec.h"
+#include "handset/line/frame_codec.h"
 #include "kral/connection.h"
 #include "kral/download.h"
 #include "kral/transport.h"

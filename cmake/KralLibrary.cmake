@@ -1,6 +1,4 @@
 # The library itself: libkral.so.6 on Linux, kral.dll on Windows, from the objects of every layer.
-set(KRAL_LAYERS platform frame_base transport frame commands storage download rfcal)
-
 add_library(kral SHARED)
 add_library(kral::kral ALIAS kral)
 kral_link_layers(kral ${KRAL_LAYERS})

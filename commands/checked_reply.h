@@ -2,7 +2,7 @@
 #ifndef KRAL_COMMANDS_CHECKED_REPLY_H
 #define KRAL_COMMANDS_CHECKED_REPLY_H
 
-#include "transport/reply.h"
+#include "transport/engine/reply.h"
 
 namespace kral {
 

@@ -20,8 +20,8 @@
 #include <type_traits>
 #include <utility>
 
-#include "frame/base/diag_packet.h"
-#include "frame/base/wire_codes.h"
+#include "base/diag_packet.h"
+#include "base/wire_codes.h"
 #include "frame/diag_ftm.h"
 
 namespace kral {

@@ -4,14 +4,14 @@
 #include <exception>
 #include <optional>
 
-#include "download/download_connection.h"
-#include "download/download_failure.h"
-#include "download/image_file.h"
-#include "download/image_set_up.h"
-#include "download/kova.h"
-#include "download/stream_format.h"
-#include "download/stream_hello.h"
-#include "download/write_image.h"
+#include "download/images/image_file.h"
+#include "download/kova/kova.h"
+#include "download/link/download_connection.h"
+#include "download/link/download_failure.h"
+#include "download/stream/image_set_up.h"
+#include "download/stream/stream_format.h"
+#include "download/stream/stream_hello.h"
+#include "download/stream/write_image.h"
 
 namespace kral::download {
 namespace {

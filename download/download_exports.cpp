@@ -2,10 +2,10 @@
 #include <algorithm>
 #include <exception>
 
+#include "base/text_argument.h"
 #include "download/download_client.h"
-#include "download/download_failure.h"
-#include "download/image_file.h"
-#include "frame/base/text_argument.h"
+#include "download/images/image_file.h"
+#include "download/link/download_failure.h"
 #include "frame/export_call.h"
 
 namespace download = kral::download;

@@ -4,11 +4,11 @@
 #include <algorithm>
 #include <exception>
 
+#include "download/boot/kivrat.h"
 #include "download/download_client.h"
-#include "download/download_connection.h"
-#include "download/download_failure.h"
-#include "download/image_file.h"
-#include "download/kivrat.h"
+#include "download/images/image_file.h"
+#include "download/link/download_connection.h"
+#include "download/link/download_failure.h"
 #include "platform/file_util.h"
 
 namespace kral::download {

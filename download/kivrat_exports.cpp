@@ -5,11 +5,11 @@
 #include <exception>
 #include <span>
 
-#include "download/download_connection.h"
+#include "base/failure.h"
+#include "base/text_argument.h"
+#include "download/boot/kivrat.h"
 #include "download/flash_all.h"
-#include "download/kivrat.h"
-#include "frame/base/failure.h"
-#include "frame/base/text_argument.h"
+#include "download/link/download_connection.h"
 #include "frame/export_call.h"
 #include "frame/orbt_server.h"
 

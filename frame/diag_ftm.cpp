@@ -6,7 +6,7 @@
 #include <string>
 #include <utility>
 
-#include "frame/base/failure.h"
+#include "base/failure.h"
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
 #include "platform/file_util.h"

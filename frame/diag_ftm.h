@@ -11,14 +11,14 @@
 #include <mutex>
 #include <span>
 
-#include "frame/base/diag_packet.h"
-#include "frame/base/text_log.h"
-#include "frame/base/time_outs.h"
+#include "base/diag_packet.h"
+#include "base/text_log.h"
+#include "base/time_outs.h"
 #include "frame/phone_settings.h"
 #include "platform/clock.h"
-#include "transport/capture_player.h"
-#include "transport/kral_event_listener.h"
-#include "transport/kral_thread_interface.h"
+#include "transport/collection/capture_player.h"
+#include "transport/collection/kral_event_listener.h"
+#include "transport/engine/kral_thread_interface.h"
 
 namespace kral {
 

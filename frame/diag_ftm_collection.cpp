@@ -1,5 +1,5 @@
 // What a phone object keeps of the traffic that nobody asked for: counters, the capture file, playback.
-#include "frame/base/failure.h"
+#include "base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/diag_ftm_parts.h"
 #include "platform/file_util.h"

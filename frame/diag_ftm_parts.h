@@ -6,10 +6,10 @@
 #include <optional>
 
 #include "frame/diag_ftm.h"
-#include "transport/capture_player.h"
-#include "transport/capture_writer.h"
-#include "transport/kral_events.h"
-#include "transport/name_table.h"
+#include "transport/collection/capture_player.h"
+#include "transport/collection/capture_writer.h"
+#include "transport/collection/name_table.h"
+#include "transport/engine/kral_events.h"
 
 namespace kral {
 

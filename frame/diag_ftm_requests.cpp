@@ -3,7 +3,7 @@
 #include <array>
 #include <vector>
 
-#include "frame/base/little_endian.h"
+#include "base/little_endian.h"
 #include "frame/diag_ftm.h"
 #include "frame/orbt_server.h"
 #include "frame/request_failure.h"

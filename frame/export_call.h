@@ -15,7 +15,7 @@
 #include <mutex>
 #include <utility>
 
-#include "frame/base/failure.h"
+#include "base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/types.h"

@@ -1,12 +1,12 @@
 // Keeps the records of failed calls and exports them. What a record says is decided where the failure happens
-// (frame/base/failure.h); when one is noted, in frame/export_call.cpp.
+// (base/failure.h); when one is noted, in frame/export_call.cpp.
 #include "frame/last_error.h"
 
 #include <algorithm>
 #include <atomic>
 #include <string_view>
 
-#include "frame/base/failure.h"
+#include "base/failure.h"
 #include "frame/library_state.h"
 
 namespace kral {

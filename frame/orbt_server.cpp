@@ -3,7 +3,7 @@
 
 #include <utility>
 
-#include "frame/base/time_outs.h"
+#include "base/time_outs.h"
 #include "frame/library_state.h"
 
 namespace kral {

@@ -17,7 +17,7 @@
 #include <vector>
 
 #include "frame/efs_server.h"
-#include "transport/packet_listener.h"
+#include "transport/line/packet_listener.h"
 
 namespace kral {
 

@@ -5,8 +5,8 @@
 #include <cstdint>
 #include <span>
 
-#include "frame/base/failure.h"
-#include "transport/reply.h"
+#include "base/failure.h"
+#include "transport/engine/reply.h"
 
 namespace kral {
 

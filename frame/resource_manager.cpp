@@ -7,7 +7,7 @@
 #include <string>
 #include <utility>
 
-#include "frame/base/failure.h"
+#include "base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/library_state.h"
 

@@ -12,7 +12,7 @@
 
 #include "kral/types.h"
 #include "platform/named_mutex.h"
-#include "transport/kral_thread_interface.h"
+#include "transport/engine/kral_thread_interface.h"
 
 namespace kral {
 

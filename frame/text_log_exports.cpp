@@ -3,7 +3,7 @@
 #include <span>
 #include <string>
 
-#include "frame/base/hex_dump.h"
+#include "base/hex_dump.h"
 #include "frame/export_call.h"
 #include "frame/version.h"
 #include "kral/text_log.h"

@@ -1,5 +1,5 @@
 // Exports of the time-outs: those of the phone object, and the one that the software download object keeps.
-#include "frame/base/time_outs.h"
+#include "base/time_outs.h"
 #include "frame/export_call.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"

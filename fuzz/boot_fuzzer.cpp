@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "download/kivrat.h"
+#include "download/boot/kivrat.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/temp_folder.h"
 

@@ -5,10 +5,10 @@
 #include <cstdint>
 #include <cstdlib>
 
-#include "frame/base/little_endian.h"
-#include "transport/capture_format.h"
-#include "transport/capture_reader.h"
-#include "transport/kral_event_listener.h"
+#include "base/little_endian.h"
+#include "transport/collection/capture_format.h"
+#include "transport/collection/capture_reader.h"
+#include "transport/collection/kral_event_listener.h"
 
 namespace {
 

@@ -8,9 +8,9 @@
 #include <iterator>
 #include <span>
 
-#include "frame/base/text_log.h"
+#include "base/text_log.h"
 #include "tests/support/plain_codec.h"
-#include "transport/hdlc_deframer.h"
+#include "transport/line/hdlc_deframer.h"
 
 namespace {
 

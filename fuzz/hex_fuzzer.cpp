@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "download/hex_phone_image_decoder.h"
-#include "download/phone_image_dpaged.h"
+#include "download/images/hex_phone_image_decoder.h"
+#include "download/images/phone_image_dpaged.h"
 
 namespace {
 

@@ -6,10 +6,10 @@
 #include <vector>
 
 #include "platform/xml_document.h"
-#include "storage/nv_definition_xml.h"
-#include "storage/nv_filter.h"
-#include "storage/nv_source.h"
-#include "storage/nv_value.h"
+#include "storage/nv/nv_definition_xml.h"
+#include "storage/nv/nv_filter.h"
+#include "storage/nv/nv_source.h"
+#include "storage/nv/nv_value.h"
 
 namespace {
 

@@ -8,8 +8,8 @@
 #include <random>
 #include <string>
 
-#include "storage/pkv_set.h"
-#include "storage/varn_pkv_file.h"
+#include "storage/pkv/pkv_set.h"
+#include "storage/pkv/varn_pkv_file.h"
 
 namespace {
 

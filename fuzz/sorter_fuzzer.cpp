@@ -8,10 +8,10 @@
 #include <cstdint>
 #include <cstdlib>
 
-#include "frame/base/little_endian.h"
-#include "frame/base/text_log.h"
-#include "transport/chunk_splitter.h"
-#include "transport/kral_event_listener.h"
+#include "base/little_endian.h"
+#include "base/text_log.h"
+#include "transport/collection/kral_event_listener.h"
+#include "transport/line/chunk_splitter.h"
 
 namespace {
 

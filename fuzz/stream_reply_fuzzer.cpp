@@ -5,9 +5,9 @@
 #include <cstdlib>
 #include <span>
 
-#include "download/image_write_rsp.h"
-#include "download/reply_receiver.h"
-#include "download/stream_hello.h"
+#include "download/stream/image_write_rsp.h"
+#include "download/stream/reply_receiver.h"
+#include "download/stream/stream_hello.h"
 #include "frame/diag_ftm.h"
 
 namespace {

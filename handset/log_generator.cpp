@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <string_view>
 
-#include "handset/log_service.h"
+#include "handset/services/log_service.h"
 #include "handset/virtual_handset.h"
 
 namespace kral::handset {

@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-#include "handset/bytes.h"
+#include "handset/line/bytes.h"
 #include "platform/clock.h"
 
 namespace kral::handset {

@@ -5,9 +5,9 @@
 #include <algorithm>
 #include <chrono>
 
-#include "handset/rf_nv.h"
-#include "handset/software_image.h"
-#include "handset/wire_modes.h"
+#include "handset/line/wire_modes.h"
+#include "handset/loaders/software_image.h"
+#include "handset/services/rf_nv.h"
 
 namespace kral::handset {
 

@@ -1,8 +1,8 @@
 // The exported band functions. They check the channel lists; the rules are CBandHelper's.
 #include "kral/band.h"
 
-#include "rfcal/band_channels.h"
-#include "rfcal/band_helper.h"
+#include "rfcal/bands/band_channels.h"
+#include "rfcal/bands/band_helper.h"
 
 namespace kral {
 namespace {

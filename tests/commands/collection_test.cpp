@@ -16,7 +16,7 @@
 #include "tests/support/engine_bundle.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/temp_folder.h"
-#include "transport/capture_writer.h"
+#include "transport/collection/capture_writer.h"
 
 namespace kral {
 namespace {

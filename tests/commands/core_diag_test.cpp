@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "commands/core_diag_format.h"
+#include "commands/core/core_diag_format.h"
 #include "kral/kral.h"
 #include "tests/support/handset_connection.h"
 

@@ -1,5 +1,5 @@
 // The sequencer's seam, driven by a double: queue mode, full queue, batch mode, sequencer commands.
-#include "commands/ftm_sequencer.h"
+#include "commands/ftm/ftm_sequencer.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 // A reply that comes after its time-out must not be taken for the next request's, where anything can tell.
-#include "handset/faults.h"
+#include "handset/line/faults.h"
 #include "kral/diag.h"
 #include "kral/error.h"
 #include "kral/ftm.h"

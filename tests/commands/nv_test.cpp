@@ -9,8 +9,8 @@
 #include <string>
 #include <vector>
 
-#include "commands/nv_item.h"
-#include "commands/rf_nv.h"
+#include "commands/ftm/rf_nv.h"
+#include "commands/nv/nv_item.h"
 #include "frame/resource_manager.h"
 #include "kral/ftm.h"
 #include "tests/support/handset_connection.h"

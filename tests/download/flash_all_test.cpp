@@ -5,7 +5,7 @@
 #include <array>
 
 #include "frame/diag_ftm.h"
-#include "handset/software_image.h"
+#include "handset/loaders/software_image.h"
 #include "kral/kral.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/hex_files.h"

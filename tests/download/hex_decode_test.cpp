@@ -4,8 +4,8 @@
 #include <cstdio>
 #include <string>
 
-#include "download/hex_phone_image_decoder.h"
-#include "download/phone_image_dpaged.h"
+#include "download/images/hex_phone_image_decoder.h"
+#include "download/images/phone_image_dpaged.h"
 #include "tests/support/hex_files.h"
 
 namespace kral {

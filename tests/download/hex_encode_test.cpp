@@ -5,10 +5,10 @@
 #include <utility>
 #include <vector>
 
-#include "download/hex_phone_image_decoder.h"
-#include "download/phone_image_binary.h"
-#include "download/phone_image_dpaged.h"
-#include "download/phone_image_raw.h"
+#include "download/images/hex_phone_image_decoder.h"
+#include "download/images/phone_image_binary.h"
+#include "download/images/phone_image_dpaged.h"
+#include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

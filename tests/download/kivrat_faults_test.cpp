@@ -4,9 +4,9 @@
 
 #include <array>
 
-#include "download/kivrat.h"
-#include "handset/boot_loader.h"
+#include "download/boot/kivrat.h"
 #include "handset/caller_transport.h"
+#include "handset/loaders/boot_loader.h"
 #include "handset/virtual_handset.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/temp_folder.h"

@@ -1,9 +1,9 @@
 // The boot transfer byte by byte: what goes over the port, what the log says, and what is made of every wrong answer.
-#include "download/kivrat.h"
+#include "download/boot/kivrat.h"
 
 #include <gtest/gtest.h>
 
-#include "handset/bytes.h"
+#include "handset/line/bytes.h"
 #include "tests/support/boot_wire.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/temp_folder.h"

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "download/kova.h"
+#include "download/kova/kova.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"

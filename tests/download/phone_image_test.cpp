@@ -7,9 +7,9 @@
 #include <typeinfo>
 #include <vector>
 
-#include "download/phone_image_binary.h"
-#include "download/phone_image_dpaged.h"
-#include "download/phone_image_raw.h"
+#include "download/images/phone_image_binary.h"
+#include "download/images/phone_image_dpaged.h"
+#include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

@@ -7,8 +7,8 @@
 #include <thread>
 #include <vector>
 
-#include "download/stream_hello.h"
-#include "handset/bytes.h"
+#include "download/stream/stream_hello.h"
+#include "handset/line/bytes.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"

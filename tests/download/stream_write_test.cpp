@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-#include "download/image_write_cmd.h"
+#include "download/stream/image_write_cmd.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"

@@ -9,6 +9,7 @@
 #include <thread>
 #include <vector>
 
+#include "base/thread_maker.h"
 #include "frame/connect.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
@@ -19,7 +20,6 @@
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
-#include "transport/thread_maker.h"
 
 namespace kral {
 namespace {

@@ -2,7 +2,7 @@
 #include <thread>
 
 #include "frame/resource_manager.h"
-#include "handset/faults.h"
+#include "handset/line/faults.h"
 #include "kral/kral.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/temp_folder.h"

@@ -1,5 +1,5 @@
 // What the boot loader thinks of a host that errs; its packets and its life are tested with the library's side of them.
-#include "handset/boot_loader.h"
+#include "handset/loaders/boot_loader.h"
 
 #include <gtest/gtest.h>
 

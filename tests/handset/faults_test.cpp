@@ -1,6 +1,6 @@
 // Which requests a fault strikes, and the faults that are more than one reply's; the others show in what the library
 // makes of them.
-#include "handset/faults.h"
+#include "handset/line/faults.h"
 
 #include <gtest/gtest.h>
 

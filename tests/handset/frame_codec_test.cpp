@@ -1,5 +1,5 @@
 // The handset's codec against what RFC 1662 fixes, not against the library's codec.
-#include "handset/frame_codec.h"
+#include "handset/line/frame_codec.h"
 
 #include <gtest/gtest.h>
 

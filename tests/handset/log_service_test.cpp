@@ -1,5 +1,5 @@
 // The handset's side of logs and events: what it refuses, and that it sends what is on and nothing else.
-#include "handset/log_service.h"
+#include "handset/services/log_service.h"
 
 #include <gtest/gtest.h>
 

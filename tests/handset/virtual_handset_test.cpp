@@ -5,7 +5,7 @@
 
 #include <thread>
 
-#include "handset/wire_modes.h"
+#include "handset/line/wire_modes.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_host.h"
 

@@ -8,8 +8,8 @@
 #include <string>
 
 #include "kral/band.h"
-#include "rfcal/band_channels.h"
-#include "rfcal/band_helper.h"
+#include "rfcal/bands/band_channels.h"
+#include "rfcal/bands/band_helper.h"
 #include "tests/rfcal/band_edges.h"
 
 namespace kral {

@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "storage/nv_compression.h"
-#include "storage/nv_data_type.h"
-#include "storage/nv_value.h"
+#include "storage/nv/nv_compression.h"
+#include "storage/nv/nv_data_type.h"
+#include "storage/nv/nv_value.h"
 #include "tests/support/nv_fixture.h"
 
 namespace kral {

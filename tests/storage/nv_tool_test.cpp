@@ -8,9 +8,9 @@
 #include <vector>
 
 #include "kral/pkv.h"
-#include "storage/nv_compression.h"
-#include "storage/nv_filter.h"
-#include "storage/pkv_set.h"
+#include "storage/nv/nv_compression.h"
+#include "storage/nv/nv_filter.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/nv_fixture.h"
 
 namespace kral {

@@ -8,7 +8,7 @@
 #include "kral/nv.h"
 #include "kral/nv_tool.h"
 #include "kral/pkv.h"
-#include "storage/pkv_set.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"

@@ -7,10 +7,10 @@
 #include <tuple>
 
 #include "kral/pkv.h"
-#include "storage/nv_storage.h"
-#include "storage/pkv_jobs.h"
-#include "storage/pkv_set.h"
-#include "storage/varn_pkv_file.h"
+#include "storage/backup/pkv_jobs.h"
+#include "storage/pkv/nv_storage.h"
+#include "storage/pkv/pkv_set.h"
+#include "storage/pkv/varn_pkv_file.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

@@ -10,9 +10,9 @@
 #include <utility>
 
 #include "tests/support/log_lines.h"
-#include "transport/kral_event_listener.h"
-#include "transport/kral_events.h"
-#include "transport/kral_thread_interface.h"
+#include "transport/collection/kral_event_listener.h"
+#include "transport/engine/kral_events.h"
+#include "transport/engine/kral_thread_interface.h"
 
 namespace kral::test {
 

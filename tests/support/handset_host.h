@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "handset/frame_codec.h"
+#include "handset/line/frame_codec.h"
 #include "handset/virtual_handset.h"
 
 namespace kral::test {

@@ -9,8 +9,8 @@
 #include <utility>
 #include <vector>
 
-#include "frame/base/text_log.h"
-#include "frame/base/text_log_format.h"
+#include "base/text_log.h"
+#include "base/text_log_format.h"
 
 namespace kral::test {
 

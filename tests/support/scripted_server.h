@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "frame/orbt_server.h"
-#include "handset/bytes.h"
+#include "handset/line/bytes.h"
 #include "kral/connection.h"
 
 namespace kral::test {

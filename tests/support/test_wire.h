@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "tests/support/plain_codec.h"
-#include "transport/serial_port.h"
+#include "transport/line/serial_port.h"
 
 namespace kral::test {
 

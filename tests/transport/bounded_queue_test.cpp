@@ -1,5 +1,5 @@
 // The bounded queue: order, the dropping of the oldest, what readers see when, and waiting.
-#include "transport/bounded_queue.h"
+#include "transport/engine/bounded_queue.h"
 
 #include <gtest/gtest.h>
 

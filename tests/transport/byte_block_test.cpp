@@ -1,5 +1,5 @@
 // The blocks of bytes that are searched at once, one by one.
-#include "transport/byte_block.h"
+#include "transport/line/byte_block.h"
 
 #include <gtest/gtest.h>
 

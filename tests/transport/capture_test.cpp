@@ -8,13 +8,13 @@
 #include <mutex>
 #include <thread>
 
-#include "frame/base/little_endian.h"
+#include "base/little_endian.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/temp_folder.h"
-#include "transport/capture_format.h"
-#include "transport/capture_player.h"
-#include "transport/capture_reader.h"
-#include "transport/capture_writer.h"
+#include "transport/collection/capture_format.h"
+#include "transport/collection/capture_player.h"
+#include "transport/collection/capture_reader.h"
+#include "transport/collection/capture_writer.h"
 
 namespace kral {
 namespace {

@@ -1,5 +1,5 @@
 // The packet modes: how the chunks of a port become packets.
-#include "transport/chunk_splitter.h"
+#include "transport/line/chunk_splitter.h"
 
 #include <gtest/gtest.h>
 

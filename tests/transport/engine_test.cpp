@@ -6,7 +6,7 @@
 #include <array>
 #include <string>
 
-#include "frame/base/hex_dump.h"
+#include "base/hex_dump.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/test_wire.h"
 

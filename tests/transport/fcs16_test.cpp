@@ -1,5 +1,5 @@
 // The frame check against published values and against a shift register fed bit by bit.
-#include "transport/fcs16.h"
+#include "transport/line/fcs16.h"
 
 #include <gtest/gtest.h>
 

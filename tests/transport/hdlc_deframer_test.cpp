@@ -1,5 +1,5 @@
 // What becomes of a stream: which frames are delivered, which are dropped, and what is said of them.
-#include "transport/hdlc_deframer.h"
+#include "transport/line/hdlc_deframer.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 // Frames as they are built: byte stuffing, the FCS, and what is too long to be sent.
-#include "transport/hdlc_frame.h"
+#include "transport/line/hdlc_frame.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 // The framer over a scripted port: writes, raw reads, and the switch from data to diagnostic mode.
-#include "transport/hdlc_framer.h"
+#include "transport/line/hdlc_framer.h"
 
 #include <gtest/gtest.h>
 
@@ -12,7 +12,7 @@
 #include "tests/support/fake_clock.h"
 #include "tests/support/log_lines.h"
 #include "tests/support/plain_codec.h"
-#include "transport/serial_port.h"
+#include "transport/line/serial_port.h"
 
 namespace kral {
 namespace {

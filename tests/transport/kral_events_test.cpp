@@ -1,5 +1,5 @@
 // The dispatcher: who is called with what, in which order, and how its thread begins and ends.
-#include "transport/kral_events.h"
+#include "transport/engine/kral_events.h"
 
 #include <gtest/gtest.h>
 

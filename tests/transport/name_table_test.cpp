@@ -1,5 +1,5 @@
 // Tables of numbers and names, as users write them.
-#include "transport/name_table.h"
+#include "transport/collection/name_table.h"
 
 #include <gtest/gtest.h>
 

@@ -5,8 +5,8 @@
 #include <string>
 
 #include "tests/support/engine_bundle.h"
-#include "tests/support/fake_clock.h"
 #include "tests/support/failing_allocation.h"
+#include "tests/support/fake_clock.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {

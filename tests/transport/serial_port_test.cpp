@@ -1,5 +1,5 @@
 // The port over a device that records what is asked of it, and over a caller's functions that misbehave.
-#include "transport/serial_port.h"
+#include "transport/line/serial_port.h"
 
 #include <gtest/gtest.h>
 

@@ -3,10 +3,10 @@
 
 #include <string>
 
-#include "frame/base/hex_dump.h"
+#include "base/hex_dump.h"
 #include "tests/support/log_lines.h"
-#include "transport/event_report.h"
-#include "transport/kral_event_listener.h"
+#include "transport/collection/event_report.h"
+#include "transport/collection/kral_event_listener.h"
 
 namespace kral {
 namespace {

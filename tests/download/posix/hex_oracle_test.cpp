@@ -7,8 +7,8 @@
 #include <random>
 #include <string>
 
-#include "download/hex_phone_image_decoder.h"
-#include "download/phone_image_dpaged.h"
+#include "download/images/hex_phone_image_decoder.h"
+#include "download/images/phone_image_dpaged.h"
 #include "kral/download.h"
 #include "tests/support/temp_folder.h"
 

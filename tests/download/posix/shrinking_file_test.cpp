@@ -4,7 +4,7 @@
 #include <filesystem>
 #include <string>
 
-#include "download/phone_image_binary.h"
+#include "download/images/phone_image_binary.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/temp_folder.h"
 

@@ -7,7 +7,7 @@
 #include <csignal>
 #include <string>
 
-#include "frame/base/text_log.h"
+#include "base/text_log.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

@@ -8,12 +8,12 @@
 #include <array>
 #include <filesystem>
 
-#include "frame/base/text_log.h"
+#include "base/text_log.h"
 #include "platform/posix/file_descriptor.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"
-#include "transport/capture_reader.h"
-#include "transport/capture_writer.h"
+#include "transport/collection/capture_reader.h"
+#include "transport/collection/capture_writer.h"
 
 namespace kral {
 namespace {

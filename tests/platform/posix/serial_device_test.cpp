@@ -17,7 +17,7 @@
 #include "platform/environment.h"
 #include "platform/pseudo_terminal.h"
 #include "tests/support/temp_folder.h"
-#include "transport/serial_port.h"
+#include "transport/line/serial_port.h"
 
 namespace kral {
 namespace {

@@ -13,7 +13,7 @@
 #include "platform/environment.h"
 #include "platform/named_mutex.h"
 #include "platform/process.h"
-#include "storage/pkv_set.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

@@ -15,7 +15,7 @@
 #include "platform/port_list.h"
 #include "platform/process.h"
 #include "platform/pseudo_terminal.h"
-#include "storage/pkv_set.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

@@ -6,7 +6,7 @@
 #include <map>
 #include <string>
 
-#include "storage/pkv_set.h"
+#include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace kral {

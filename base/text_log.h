@@ -1,0 +1,86 @@
+// The text log of one handset: one line per message, to a file and to the caller's callback.
+#ifndef KRAL_BASE_TEXT_LOG_H
+#define KRAL_BASE_TEXT_LOG_H
+
+#include <atomic>
+#include <cstdint>
+#include <cstdio>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/log_flags.h"
+#include "platform/clock.h"
+
+namespace kral {
+
+// Called with (record size, record address, callback handle); see <kral/text_log.h> for the record.
+using TextLogCallback = void (*)(uint32_t size, const void* record, uint32_t handle);
+
+class DataLogFileHandler {
+ public:
+  explicit DataLogFileHandler(Clock& clock = SystemClock());
+  ~DataLogFileHandler();
+  DataLogFileHandler(const DataLogFileHandler&) = delete;
+  DataLogFileHandler& operator=(const DataLogFileHandler&) = delete;
+
+  // True when a line with this flag would go anywhere: callers test it before building costly texts.
+  bool Wants(uint32_t flag) const { return (active_mask_.load(std::memory_order_relaxed) & flag) != 0; }
+
+  // The library's path into the log. Callable from any thread; the callback runs outside the internal lock, and what it
+  // causes to be written on its thread goes to the file only. Control characters of the arguments are escaped.
+  [[gnu::format(gnu_printf, 3, 4)]] void WriteLine(uint32_t flag, const char* format, ...);
+  // A line of the caller's, as it is.
+  void WriteText(uint32_t flag, const char* text);
+
+  void Start(const char* file_name);  // adopts the stored mask; the file opens with the next line, truncated
+  void Stop();                        // closes the file; the callback keeps receiving lines
+  void SetFlags(uint32_t mask);       // stores and activates the mask
+  void SetCallback(TextLogCallback callback, uint32_t handle);
+
+  bool started_result() const { return started_result_; }    // what KRAL_IsLoggingStarted reports
+  bool logging_started() const { return logging_started_; }  // set by the first Start, never cleared
+
+  // Stamps lines with the milliseconds since the last stop instead of the clock.
+  void SetRelativeTimeStamps(bool on) { relative_time_stamps_ = on; }
+
+  // Named debug switches beside the mask; an unknown one is off.
+  void RegisterCategory(std::string_view name, bool on);
+  bool IsCategoryOn(std::string_view name) const;
+
+ private:
+  struct FileCloser {
+    void operator()(std::FILE* file) const { std::fclose(file); }
+  };
+  struct Category {
+    std::string name;
+    bool on;
+  };
+
+  void Deliver(uint32_t flag, const char* text, size_t length);
+  std::string WriteToFile(uint32_t flag, const char* text);  // lock held
+  std::string WriteStamped(uint32_t flag, const char* text);
+  void CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text);
+
+  Clock& clock_;
+  std::atomic<uint32_t> active_mask_{0};  // nothing goes anywhere until SetFlags or Start
+  std::atomic<bool> logging_started_{false};
+  std::atomic<bool> started_result_{false};
+  std::atomic<bool> relative_time_stamps_{false};
+  std::atomic<uint32_t> start_tick_;
+
+  mutable std::mutex mutex_;  // guards what follows
+  std::string file_name_;     // empty when stopped
+  bool loss_told_ = false;    // of this file
+  std::unique_ptr<std::FILE, FileCloser> file_;
+  uint32_t stored_mask_ = kDefaultLogMask;
+  TextLogCallback callback_ = nullptr;
+  uint32_t callback_handle_ = 0;
+  std::vector<Category> categories_;
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,32 @@
+// The boot transfer: a handset in its primary boot loader says hello, tells its chip identity when it is asked, and
+// fetches the file of a flash programmer piece by piece. The target leads; the host answers.
+#ifndef KRAL_DOWNLOAD_BOOT_KIVRAT_H
+#define KRAL_DOWNLOAD_BOOT_KIVRAT_H
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <string>
+
+#include "frame/diag_ftm.h"
+
+namespace kral::kivrat {
+
+// Told after every piece: bytes served, bytes of the file. False gives the transfer up.
+using Progress = std::function<bool(uint64_t done, uint64_t total)>;
+// Asked now and then while nothing comes: true gives the exchange up.
+using Stop = std::function<bool()>;
+
+// The hello exchange, in front of which the chip identity is read when there is room for one. Borrows the port of the
+// phone object and keeps it on success, because the target asks for its image at once. A target without an identity
+// ends the exchange with success, an empty identity, and itself still in command mode.
+bool Connect(Diag_FTM& phone, uint32_t& version, std::optional<uint32_t>* identity, const Stop& stop = {});
+
+// Serves the file to a target that Connect has left waiting. The port is given back, except when the file cannot be
+// opened: then nothing has happened yet.
+bool DownloadFlashProgrammer(Diag_FTM& phone, const std::string& file_name, const Progress& progress = {},
+                             const Stop& stop = {});
+
+}  // namespace kral::kivrat
+
+#endif

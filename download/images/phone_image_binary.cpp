@@ -1,0 +1,81 @@
+// Hands out the view of a mapped file within its bounds.
+#include "download/images/phone_image_binary.h"
+
+#include <limits>
+
+namespace kral {
+namespace {
+
+void CheckRegion(uint32_t region) {
+  if (region != 0) throw PhoneImageException::ReadFailure(region, 0);
+}
+
+}  // namespace
+
+bool PhoneImageBinary::Open(const std::string& path) {
+  base_ = size_ = start_ = 0;
+  const bool mapped = file_.Open(path, false) != nullptr;
+  too_large_ = file_.too_large() || file_.Size() > std::numeric_limits<uint32_t>::max();
+  if (too_large_) file_.Close();
+  if (!mapped || too_large_) return false;
+  size_ = GetTotalSize();
+  return true;
+}
+
+void PhoneImageBinary::Clear() {
+  throw PhoneImageException::WriteFailure(0, GetTotalSize());
+}
+
+uint32_t PhoneImageBinary::GetBaseAddress(uint32_t region) {
+  CheckRegion(region);
+  return 0;  // the base that was set is kept but not reported
+}
+
+uint32_t PhoneImageBinary::GetTotalSize() {
+  return static_cast<uint32_t>(file_.Size());
+}
+
+uint32_t PhoneImageBinary::GetSize(uint32_t region) {
+  CheckRegion(region);
+  return size_;
+}
+
+uint32_t PhoneImageBinary::GetLastAddress(uint32_t region) {
+  CheckRegion(region);
+  return GetTotalSize() - 1;  // of the file, whatever size was set
+}
+
+uint32_t PhoneImageBinary::GetStartAddress() {
+  return start_;
+}
+
+uint8_t* PhoneImageBinary::GetPointer(uint32_t offset) {
+  if (offset >= GetTotalSize()) throw PhoneImageException::ReadFailure(offset, 1);
+  return file_.view() + offset;
+}
+
+void PhoneImageBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) {
+  CheckRegion(region);
+  const bool inside = uint64_t{address} + count <= GetTotalSize();
+  if (!inside || !file_.Copy(address, buffer, count)) throw PhoneImageException::ReadFailure(address, count);
+}
+
+void PhoneImageBinary::SetBaseAddress(uint32_t value, uint32_t region) {
+  CheckRegion(region);
+  base_ = value;
+}
+
+void PhoneImageBinary::SetSize(uint32_t value, uint32_t region) {
+  CheckRegion(region);
+  size_ = value;
+}
+
+void PhoneImageBinary::SetStartAddress(uint32_t value) {
+  start_ = value;
+}
+
+void PhoneImageBinary::Write(uint32_t address, const void*, uint32_t count, uint32_t) {
+  throw PhoneImageException::WriteFailure(address, count);
+}
+
+}  // namespace kral

@@ -1,0 +1,47 @@
+// A binary file as an image: mapped read-only, never copied into memory as a whole.
+#ifndef KRAL_DOWNLOAD_IMAGES_PHONE_IMAGE_BINARY_H
+#define KRAL_DOWNLOAD_IMAGES_PHONE_IMAGE_BINARY_H
+
+#include <cstdint>
+#include <string>
+
+#include "download/images/phone_image.h"
+#include "platform/file_mapping.h"
+
+namespace kral {
+
+// Region 0 only: any other throws "Read Failure". The image begins at address 0.
+class PhoneImageBinary final : public PhoneImage {
+ public:
+  using PhoneImage::PhoneImage;
+
+  // False when the file cannot be mapped (missing, empty, unreadable), and for one that is too large: more bytes than
+  // 32 bits can count, or than there is address space for.
+  bool Open(const std::string& path);
+  bool too_large() const { return too_large_; }
+  uint32_t last_error() const { return file_.last_error(); }  // of the system
+
+  void Clear() override;  // throws "Write Failure", as Write does
+  uint32_t GetBaseAddress(uint32_t region) override;
+  uint32_t GetTotalSize() override;
+  uint32_t GetSize(uint32_t region) override;
+  uint32_t GetLastAddress(uint32_t region) override;
+  uint32_t GetStartAddress() override;
+  uint8_t* GetPointer(uint32_t offset) override;  // read-only memory
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
+  void SetBaseAddress(uint32_t value, uint32_t region) override;
+  void SetSize(uint32_t value, uint32_t region) override;
+  void SetStartAddress(uint32_t value) override;
+  void Write(uint32_t address, const void* data, uint32_t count, uint32_t region) override;
+
+ private:
+  CMapFileToMemory file_;
+  uint32_t base_ = 0;
+  uint32_t size_ = 0;
+  uint32_t start_ = 0;
+  bool too_large_ = false;
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,78 @@
+// Loads a flash programmer from an Intel HEX file and starts it.
+#include <algorithm>
+#include <vector>
+
+#include "download/images/image_file.h"
+#include "download/images/phone_image_dpaged.h"
+#include "download/kova/kova.h"
+#include "download/kova/kova_format.h"
+#include "download/link/download_failure.h"
+#include "kral/download.h"
+
+namespace kral::kova {
+namespace {
+
+constexpr uint32_t kMaximumKib = 500;
+
+// From the start address on, not from the base: the programmer's entry point is its lowest address. Required.
+bool SendImage(DownloadConnection& connection, PhoneImage& image, uint32_t chunk_size) {
+  const uint32_t start = image.GetStartAddress();
+  const uint32_t size = image.GetSize(0);
+  std::vector<uint8_t> chunk(chunk_size);
+  for (uint32_t sent = 0; sent < size && !connection.aborted();) {
+    connection.Report(sent, size);
+    const uint32_t count = std::min(chunk_size, size - sent);
+    if (count == 0) return Fail(Failure(KRAL_ERROR_ARGUMENT, "packets of that size carry no data"));
+    try {
+      image.Read(start + sent, chunk.data(), count, 0);
+    } catch (const PhoneImageException&) {
+      return Fail(Failure(KRAL_ERROR_BAD_FILE, "the flash programmer has nothing at its start address 0x%08X", start));
+    }
+    if (!Write32(connection, start + sent, std::span(chunk).first(count))) return false;
+    sent += count;
+  }
+  if (!connection.aborted()) connection.Report(size, size);
+  return true;
+}
+
+}  // namespace
+
+uint32_t ChunkSize(uint32_t maximum_packet) {
+  return maximum_packet < kAmplePacket ? maximum_packet / 2 : kMostWriteData;
+}
+
+uint32_t LoadFlashProgrammer(DownloadConnection& connection, const std::string& file, uint32_t maximum_packet) {
+  auto& log = connection.log();
+  HexPhoneImageDecoder decoder(true, true, true);
+  PhoneImageDPaged image(kMaximumKib, &decoder);
+  TextFile text;
+  if (!text.OpenForReading(file)) {
+    Fail(download::NotOpened(file));
+    return KRAL_KOVA_FILE_NOT_OPENED;
+  }
+  if (!decoder.Decode(image, text)) {
+    Fail(NotDecoded(file, decoder.fault()));
+    return KRAL_KOVA_FILE_NOT_DECODED;
+  }
+  if (decoder.loss().bytes != 0) {
+    Fail(DataLost(file, decoder.loss()));
+    LogLoss(log, file, decoder.loss());
+    return KRAL_KOVA_DATA_LOST;
+  }
+
+  const bool sent = SendImage(connection, image, ChunkSize(maximum_packet));
+  if (connection.aborted()) return download::Aborted();
+  if (!sent) {
+    log.WriteLine(kLogErr, "image load failed");
+    return KRAL_KOVA_WRITE_FAILED;
+  }
+  log.WriteLine(kLogRet, "Flash programmer %s loaded, sending GO", file.c_str());
+  if (!Go(connection, image.GetStartAddress())) {
+    log.WriteLine(kLogErr, "GO failed");
+    return KRAL_KOVA_GO_FAILED;
+  }
+  log.WriteLine(kLogRet, "GO succeeded");
+  return KRAL_KOVA_LOADED;
+}
+
+}  // namespace kral::kova

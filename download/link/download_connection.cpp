@@ -1,0 +1,84 @@
+// Exchanges and writes of the download protocols over the phone object's transport.
+#include "download/link/download_connection.h"
+
+#include "base/guarded_call.h"
+
+#include <chrono>
+
+#include "base/failure.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kFcsBytes = 2;
+constexpr uint32_t kLookAroundMs = 50;
+
+// The leading flag is on for the length of an exchange, and off behind it whatever it was before: required.
+class LeadingFlag {
+ public:
+  explicit LeadingFlag(CProtAHDLC& framer) : framer_(framer) { framer_.SetStartFlag(1); }
+  ~LeadingFlag() { framer_.SetStartFlag(0); }
+  LeadingFlag(const LeadingFlag&) = delete;
+  LeadingFlag& operator=(const LeadingFlag&) = delete;
+
+ private:
+  CProtAHDLC& framer_;
+};
+
+}  // namespace
+
+DownloadConnection::Status DownloadConnection::ServerHasNoFramer() {
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "a phone server downloads by itself"));
+  return kNotSent;
+}
+
+DownloadConnection::Status DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
+                                                        uint32_t time_out_ms, std::vector<uint8_t>& reply) {
+  reply.clear();
+  if (phone_.server_mode()) return ServerHasNoFramer();
+  const LeadingFlag flag(phone_.transport().framer());
+  reply.resize(kMaximumPacket);
+  const Reply told = phone_.SendSync(request, reply, expected_code, time_out_ms);
+  reply.resize(told.bytes().size());
+  if (told) return kDone;
+  return told.came() ? kOtherReply : kNoReply;
+}
+
+bool DownloadConnection::AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& reply) {
+  const auto record = responses().PopWithin(std::chrono::milliseconds(time_out_ms));
+  if (!record) return false;
+  const size_t length = record->size() - std::min(record->size(), kFcsBytes);
+  reply.assign(record->begin(), record->begin() + static_cast<std::ptrdiff_t>(length));
+  return true;
+}
+
+DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
+  if (phone_.server_mode()) return ServerHasNoFramer();
+  return phone_.SendASync(request, time_out_ms, true) ? kDone : kNotSent;
+}
+
+void DownloadConnection::BeginWork() {
+  if (!phone_.download().keep_abort) phone_.download().abort = false;
+  reported_ = false;
+}
+
+bool DownloadConnection::Pause(uint32_t milliseconds) {
+  while (milliseconds > 0 && !aborted()) {
+    const uint32_t piece = std::min(milliseconds, kLookAroundMs);
+    clock().SleepMs(piece);
+    milliseconds -= piece;
+  }
+  return !aborted();
+}
+
+void DownloadConnection::Report(uint32_t done, uint32_t total) {
+  if (reported_ && done == last_report_) return;
+  reported_ = true;
+  last_report_ = done;
+  const auto callback = phone_.download().progress_callback.load();
+  if (callback == nullptr) return;
+  const uintptr_t value = phone_.download().callback_value;
+  CallGuarded([&] { callback(phone_.handle(), done, total, value); });
+}
+
+}  // namespace kral

@@ -1,0 +1,115 @@
+// The loop that keeps the window full. What is outstanding and what comes next is the agent's to tell.
+#include "download/stream/block_writer.h"
+
+#include <algorithm>
+
+#include "base/failure.h"
+
+namespace kral {
+namespace {
+
+// Then nobody is there any more.
+constexpr uint32_t kMostTimeOutsInARow = 10;
+// How often a wait looks for an abort.
+constexpr uint32_t kSliceMs = 20;
+constexpr uint32_t kProgressLineEvery = 0x80000;  // addresses
+
+Failure NotAcknowledged(const std::optional<DownloadAgent::OtherReply>& reply, uint32_t acknowledged) {
+  if (!reply) {
+    return Failure(KRAL_ERROR_LOST, "the handset went away when it had acknowledged %u bytes", acknowledged)
+        .Offset(acknowledged);
+  }
+  return Failure(KRAL_ERROR_LINK, "a write was answered with %zu bytes of code %d instead of an acknowledgement",
+                 reply->size, reply->code)
+      .Status(KRAL_ERROR_STATUS_REPLY, reply->code)
+      .Offset(acknowledged);
+}
+
+}  // namespace
+
+BlockWriter::BlockWriter(DownloadConnection& connection, DownloadAgent& agent, PhoneImage& image,
+                         CImageWriteCmd& command, uint32_t block_size, uint32_t time_out_ms)
+    : connection_(connection),
+      agent_(agent),
+      image_(image),
+      command_(command),
+      time_out_ms_(time_out_ms),
+      buffer_(std::min(block_size, CImageWriteCmdFramed::kMostFramedData)) {}
+
+bool BlockWriter::Run(uint32_t total) {
+  while (!agent_.done()) {
+    std::optional<CDownloadBlock> block;
+    switch (AwaitTurn(total)) {
+      case Turn::kGiveUp:
+        return false;
+      case Turn::kNothing:
+        continue;
+      case Turn::kSendAgain:
+        block = agent_.Newest();
+        break;
+      case Turn::kTake:
+        block = Take();
+        break;
+    }
+    if (!block) {
+      // The last acknowledgement may have come between the wait and the look.
+      if (agent_.done() || !agent_.head()) continue;
+      return false;
+    }
+    if (!Send(*block)) return false;
+  }
+  connection_.Report(agent_.bytes_acknowledged(), total);
+  return true;
+}
+
+BlockWriter::Turn BlockWriter::AwaitTurn(uint32_t total) {
+  CWaitableTimer timer;
+  timer.Arm(time_out_ms_);
+  for (;;) {
+    const auto wait = agent_.AwaitTurn(std::min(kSliceMs, time_out_ms_));
+    const uint32_t acknowledged = agent_.bytes_acknowledged();
+    if (acknowledged != acknowledged_) time_outs_in_a_row_ = 0;
+    acknowledged_ = acknowledged;
+    connection_.Report(acknowledged, total);
+    if (connection_.aborted()) return Turn::kGiveUp;
+    if (wait == DownloadAgent::Wait::kFailed) {
+      Fail(NotAcknowledged(agent_.other_reply(), acknowledged));
+      return Turn::kGiveUp;
+    }
+    if (wait == DownloadAgent::Wait::kReady) return Turn::kTake;
+    if (agent_.done()) return Turn::kNothing;
+    if (!timer.expired()) continue;
+    if (++time_outs_in_a_row_ < kMostTimeOutsInARow) return Turn::kSendAgain;
+    Fail(Failure(KRAL_ERROR_LOST, "the handset acknowledges nothing any more: %u of %u bytes are in flash",
+                 acknowledged, total)
+             .Offset(acknowledged));
+    return Turn::kGiveUp;
+  }
+}
+
+// What was skipped goes out again before anything new.
+std::optional<CDownloadBlock> BlockWriter::Take() {
+  const auto block = agent_.TakeResend();
+  return block ? block : Carve();
+}
+
+std::optional<CDownloadBlock> BlockWriter::Carve() {
+  const auto head = agent_.head();
+  if (!head) return std::nullopt;
+  const auto size = std::min(head->size, static_cast<uint32_t>(buffer_.size()));
+  image_.Read(head->address, buffer_.data(), size, head->device);
+  return agent_.Carve(CImageWriteCmdFramed::FittingSize(head->address, std::span(buffer_).first(size)));
+}
+
+bool BlockWriter::Send(const CDownloadBlock& block) {
+  image_.Read(block.address, buffer_.data(), block.size, block.device);
+  if (!command_.Send(block.address, std::span(buffer_).first(block.size))) return false;
+  agent_.CountSent();
+  if (block.address % kProgressLineEvery == 0) {
+    connection_.log().WriteLine(kLogRet, "Streaming address 0x%08X, acknowledged 0x%X\n", block.address,
+                                agent_.bytes_acknowledged());
+  }
+  return true;
+}
+
+}  // namespace kral

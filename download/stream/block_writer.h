@@ -1,0 +1,45 @@
+// The writer's side of the pipeline: takes blocks from the agent, reads them from the image, sends them.
+#ifndef KRAL_DOWNLOAD_STREAM_BLOCK_WRITER_H
+#define KRAL_DOWNLOAD_STREAM_BLOCK_WRITER_H
+
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "download/images/phone_image.h"
+#include "download/link/download_connection.h"
+#include "download/stream/download_agent.h"
+#include "download/stream/image_write_cmd.h"
+
+namespace kral {
+
+class BlockWriter {
+ public:
+  // Everything is borrowed for the length of one image.
+  BlockWriter(DownloadConnection& connection, DownloadAgent& agent, PhoneImage& image, CImageWriteCmd& command,
+              uint32_t block_size, uint32_t time_out_ms);
+
+  // Until the agent has nothing left, `total` bytes. False when the pipeline broke.
+  bool Run(uint32_t total);
+
+ private:
+  enum class Turn { kTake, kSendAgain, kNothing, kGiveUp };
+
+  Turn AwaitTurn(uint32_t total);
+  std::optional<CDownloadBlock> Take();
+  std::optional<CDownloadBlock> Carve();
+  bool Send(const CDownloadBlock& block);
+
+  DownloadConnection& connection_;
+  DownloadAgent& agent_;
+  PhoneImage& image_;
+  CImageWriteCmd& command_;
+  const uint32_t time_out_ms_;
+  std::vector<uint8_t> buffer_;  // one block
+  uint32_t time_outs_in_a_row_ = 0;
+  uint32_t acknowledged_ = 0;
+};
+
+}  // namespace kral
+
+#endif

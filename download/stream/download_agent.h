@@ -1,0 +1,83 @@
+// Which blocks of an image are still to be sent, on their way, or to be sent again. Two threads share it: the writer
+// takes blocks, the response thread acknowledges them. Sending and parsing are theirs.
+#ifndef KRAL_DOWNLOAD_STREAM_DOWNLOAD_AGENT_H
+#define KRAL_DOWNLOAD_STREAM_DOWNLOAD_AGENT_H
+
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <mutex>
+#include <optional>
+
+#include "base/waitable_timer.h"
+#include "download/stream/download_block.h"
+
+namespace kral {
+
+class DownloadAgent {
+ public:
+  // --- The writer -------------------------------------------------------------------------------------------------
+  void Start(uint32_t window);  // empties everything
+  void Enqueue(const CDownloadBlock& piece);
+  void Stop();  // empties all queues
+  // Nothing pending, outstanding or to be sent again. A block on its way from one queue to another is never missed.
+  bool done() const;
+
+  enum class Wait { kReady, kTimeOut, kFailed };
+  // Until a block may be taken; gives up every `slice_ms` with kTimeOut, so that the caller can look around. The timer
+  // tells whether the time is up.
+  Wait AwaitTurn(uint32_t slice_ms);
+
+  // The next block, now outstanding: one that is to be sent again, or else none.
+  std::optional<CDownloadBlock> TakeResend();
+  // What is left of the piece being carved; nothing when all is carved.
+  std::optional<CDownloadBlock> head() const;
+  // The next `size` bytes of the head, now outstanding.
+  std::optional<CDownloadBlock> Carve(uint32_t size);
+  // The outstanding block that was queued last.
+  std::optional<CDownloadBlock> Newest() const;
+
+  // --- The response thread ----------------------------------------------------------------------------------------
+  struct Acknowledged {
+    uint32_t size = 0;
+    bool final = false;
+  };
+  // Nothing, and nothing changed, for an address that is not outstanding.
+  std::optional<Acknowledged> Acknowledge(uint32_t address);
+  // What came instead of an acknowledgement.
+  struct OtherReply {
+    size_t size = 0;
+    uint8_t code = 0;
+  };
+  // The error event; nothing for a line from which no reply will come.
+  void Fail(const std::optional<OtherReply>& reply);
+  std::optional<OtherReply> other_reply() const;  // of the last one; for the writer
+
+  // --- Both -------------------------------------------------------------------------------------------------------
+  void CountSent();
+  uint32_t blocks_sent() const;
+  uint32_t bytes_acknowledged() const;
+  uint32_t blocks_acknowledged() const;
+
+ private:
+  bool HasTurn() const;
+  std::optional<CDownloadBlock> MakeOutstanding(DownloadBlockPtr block);
+
+  mutable std::mutex mutex_;  // the critical section of every queue below
+  std::condition_variable changed_;
+  CDownloadBlockFreeQueue free_;
+  CDownloadBlockQueue pending_;
+  CDownloadBlockQueue resend_;
+  CSemaphoreQueue outstanding_;
+  CFinalBlock final_block_;
+  bool acknowledgement_arrived_ = false;  // reset by the wait that it ends
+  bool failed_ = false;
+  std::optional<OtherReply> other_reply_;
+  uint32_t blocks_sent_ = 0;
+  uint32_t blocks_acknowledged_ = 0;
+  uint32_t bytes_acknowledged_ = 0;
+};
+
+}  // namespace kral
+
+#endif

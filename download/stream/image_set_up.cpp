@@ -1,0 +1,79 @@
+// The security mode and partition table packets.
+#include "download/stream/image_set_up.h"
+
+#include <algorithm>
+#include <vector>
+
+#include "base/failure.h"
+#include "download/stream/stream_format.h"
+#include "platform/file_util.h"
+
+namespace kral {
+namespace {
+
+using namespace stream;
+
+constexpr uint8_t kUseOverride = 1;
+constexpr uint8_t kBadFormat = 2;
+constexpr uint8_t kEraseFailed = 3;
+
+void LogRefusal(DataLogFileHandler& log, uint8_t status) {
+  switch (status) {
+    case kUseOverride:
+      return log.WriteLine(kLogErr, "partition : error use override");
+    case kBadFormat:
+      return log.WriteLine(kLogErr, "partition : error bad format");
+    case kEraseFailed:
+      return log.WriteLine(kLogErr, "partition : error erase fail");
+    default:
+      return log.WriteLine(kLogErr, "partition : invalid status %u", static_cast<unsigned>(status));
+  }
+}
+
+Failure Refusal(uint8_t status) {
+  const char* const reason = status == kUseOverride   ? "it differs from the one in flash and may not replace it"
+                             : status == kBadFormat   ? "it has a bad format"
+                             : status == kEraseFailed ? "the one in flash cannot be erased"
+                                                      : "for a reason of its own";
+  return Failure(KRAL_ERROR_REFUSED, "the handset refused the partition table with %d: %s", status, reason)
+      .Status(KRAL_ERROR_STATUS_LOADER, status);
+}
+
+}  // namespace
+
+bool CImageSecMode::Send(uint8_t mode) {
+  const std::vector<uint8_t> request = {kSecurityMode, mode};
+  std::vector<uint8_t> reply;
+  return connection_.Exchange(request, kSecurityModeReply, time_out_ms_, reply) == DownloadConnection::kDone;
+}
+
+bool CImagePartition::Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status) {
+  auto& log = connection_.log();
+  std::vector<uint8_t> table;
+  if (const auto error = ReadWholeFile(table_file, kPartitionTableSize, table)) {
+    if (error == std::errc::file_too_large) {
+      Fail(FileFailure(table_file, "has more than the 512 bytes of a partition table"));
+      log.WriteLine(kLogErr, "partition : file exceeds 512 bytes");
+    } else {
+      Fail(FileFailure(table_file, "cannot be opened").System(error));
+      log.WriteLine(kLogErr, "partition : failed to open file %s", table_file.c_str());
+    }
+    return false;
+  }
+  std::vector<uint8_t> request(2 + kPartitionTableSize);
+  request[0] = kPartitionTable;
+  request[1] = override_table ? 1 : 0;
+  std::copy(table.begin(), table.end(), request.begin() + 2);
+  std::vector<uint8_t> reply;
+  const auto sent = connection_.Exchange(request, kPartitionTableReply, time_out_ms_, reply);
+  if (sent != DownloadConnection::kDone) return false;
+  if (reply.size() != kStatusReplySize) {
+    return Fail(Failure(KRAL_ERROR_LINK, "the answer to the partition table has %zu bytes", reply.size()));
+  }
+  status = reply[kStatusAt];
+  if (*status == kStatusDone) return true;
+  LogRefusal(log, *status);
+  return Fail(Refusal(*status));
+}
+
+}  // namespace kral

@@ -1,0 +1,38 @@
+// What is sent between the hello and the images: security mode and partition table.
+#ifndef KRAL_DOWNLOAD_STREAM_IMAGE_SET_UP_H
+#define KRAL_DOWNLOAD_STREAM_IMAGE_SET_UP_H
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "download/link/download_connection.h"
+
+namespace kral {
+
+class CImageSecMode {
+ public:
+  CImageSecMode(DownloadConnection& connection, uint32_t time_out_ms)
+      : connection_(connection), time_out_ms_(time_out_ms) {}
+  bool Send(uint8_t mode);
+
+ private:
+  DownloadConnection& connection_;
+  const uint32_t time_out_ms_;
+};
+
+class CImagePartition {
+ public:
+  CImagePartition(DownloadConnection& connection, uint32_t time_out_ms)
+      : connection_(connection), time_out_ms_(time_out_ms) {}
+  // `status` is set when the handset answered.
+  bool Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status);
+
+ private:
+  DownloadConnection& connection_;
+  const uint32_t time_out_ms_;
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,65 @@
+// Stream writes, and how much data one of them can carry through the framing.
+#include "download/stream/image_write_cmd.h"
+
+#include <algorithm>
+#include <array>
+
+#include "base/failure.h"
+#include "base/little_endian.h"
+#include "download/stream/stream_format.h"
+#include "transport/line/hdlc_frame.h"
+
+namespace kral {
+namespace {
+
+static_assert(CImageWriteCmdFramed::kMostFramedData + stream::kWriteHeaderSize == kMaximumPayload);
+
+// A frame takes a payload for sure when its stuffed form has so many bytes: both bytes of the FCS may be escaped
+// behind it, and no escape pair may begin at or behind kEscapePairLimit.
+constexpr size_t kMostStuffed = kEscapePairLimit - 3;
+static_assert(kMostStuffed >= kMaximumPayload);
+
+constexpr bool IsEscaped(uint8_t byte) {
+  return byte == kFrameFlag || byte == kFrameEscape;
+}
+
+std::array<uint8_t, stream::kWriteHeaderSize> Header(uint32_t address) {
+  std::array<uint8_t, stream::kWriteHeaderSize> header{stream::kWrite};
+  StoreLe<uint32_t>(header, stream::kAddressAt, address);
+  return header;
+}
+
+size_t CountEscaped(std::span<const uint8_t> bytes) {
+  return static_cast<size_t>(std::count_if(bytes.begin(), bytes.end(), IsEscaped));
+}
+
+}  // namespace
+
+bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data) {
+  if (data.size() > stream::kMostWriteData) {
+    connection_.log().WriteLine(kLogErr, "write command too long\n");
+    return Fail(Failure(KRAL_ERROR_INTERNAL, "a write command of %zu bytes is too long", data.size()));
+  }
+  packet_.resize(stream::kWriteBufferSize);
+  const auto header = Header(address);
+  const auto body = std::copy(header.begin(), header.end(), packet_.begin());
+  std::copy(data.begin(), data.end(), body);
+  const auto status = connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_);
+  if (status == DownloadConnection::kDone) return true;
+  connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", static_cast<unsigned>(status));
+  return false;
+}
+
+uint32_t CImageWriteCmdFramed::FittingSize(uint32_t address, std::span<const uint8_t> data) {
+  const auto header = Header(address);
+  const size_t room = kMostStuffed - header.size() - CountEscaped(header);
+  size_t size = std::min<size_t>(data.size(), kMostFramedData);
+  size_t stuffed = size + CountEscaped(data.first(size));
+  while (stuffed > room) {
+    --size;
+    stuffed -= IsEscaped(data[size]) ? 2u : 1u;
+  }
+  return static_cast<uint32_t>(size);
+}
+
+}  // namespace kral

@@ -1,0 +1,40 @@
+// Builds and sends one stream write.
+#ifndef KRAL_DOWNLOAD_STREAM_IMAGE_WRITE_CMD_H
+#define KRAL_DOWNLOAD_STREAM_IMAGE_WRITE_CMD_H
+
+#include <cstdint>
+#include <span>
+#include <vector>
+
+#include "download/link/download_connection.h"
+
+namespace kral {
+
+class CImageWriteCmd {
+ public:
+  virtual ~CImageWriteCmd() = default;
+  virtual bool Send(uint32_t address, std::span<const uint8_t> data) = 0;
+};
+
+class CImageWriteCmdFramed final : public CImageWriteCmd {
+ public:
+  // The most data of one write that can go out in one frame; less when some of it has to be escaped.
+  static constexpr uint32_t kMostFramedData = 16376;
+
+  CImageWriteCmdFramed(DownloadConnection& connection, uint32_t time_out_ms)
+      : connection_(connection), time_out_ms_(time_out_ms) {}
+
+  bool Send(uint32_t address, std::span<const uint8_t> data) override;
+
+  // How much of the data, from its beginning, one frame takes.
+  static uint32_t FittingSize(uint32_t address, std::span<const uint8_t> data);
+
+ private:
+  DownloadConnection& connection_;
+  const uint32_t time_out_ms_;
+  std::vector<uint8_t> packet_;
+};
+
+}  // namespace kral
+
+#endif

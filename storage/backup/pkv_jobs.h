@@ -1,0 +1,84 @@
+// Backups to PKV files, restores from them, comparisons with them. Each gives KRAL_PKV_STATUS_...
+#ifndef KRAL_STORAGE_BACKUP_PKV_JOBS_H
+#define KRAL_STORAGE_BACKUP_PKV_JOBS_H
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <set>
+#include <string>
+
+#include "frame/diag_ftm.h"
+#include "storage/efs/efs_client.h"
+#include "storage/nv/nv_definitions.h"
+#include "storage/pkv/pkv_set.h"
+
+namespace kral::pkv {
+
+uint32_t Backup(Diag_FTM& phone, const std::string& path);   // pkv_backup.cpp
+uint32_t Restore(Diag_FTM& phone, const std::string& path);  // pkv_restore.cpp
+uint32_t Verify(Diag_FTM& phone, const std::string& path);   // pkv_verify.cpp
+
+bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions);
+
+// What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
+class JobReport {
+ public:
+  // `passed_over` of the file are counted as skipped; the callback does not get them.
+  JobReport(Diag_FTM& phone, size_t total, size_t passed_over);
+  ~JobReport();  // what was not reported was not reached
+  JobReport(const JobReport&) = delete;
+  JobReport& operator=(const JobReport&) = delete;
+
+  // Each item and file is reported once. After the caller has stopped the job, by the callback or by an abort, they are
+  // counted only.
+  void Add(const PkvNvItem& item, uint32_t result, uint32_t status);
+  void Add(const PkvEfsFile& file, uint32_t result, uint32_t status);
+  bool stopped() const { return stopped_ || aborts_.aborted(); }
+  const KRAL_PKV_COUNTS& counts() const;
+
+ private:
+  void Add(KRAL_PKV_ITEM& record, const char* path);
+
+  Diag_FTM& phone_;
+  const efs::AbortWatch aborts_;
+  const uint32_t passed_over_;
+  uint32_t reported_ = 0;
+  bool stopped_ = false;
+};
+
+// What is wrong with a file is logged, and noted as the failure.
+void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome);
+// Reads the file of a restore or a comparison.
+uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
+uint32_t StatusOf(PkvResult result);
+
+// The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
+std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
+
+// Whether the handset holds what the file keeps: content, kind and permissions. A file that is too large for an item
+// file has come back as a plain one. A mode of 0 is unknown.
+bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present);
+
+// Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
+// those that the file notes. Where it has no such note, those that are defined so.
+class ArrayItems {
+ public:
+  ArrayItems(Diag_FTM& phone, const PkvSet& set);
+  bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
+  // No request names both a subscription and an element.
+  bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && IsElement(item); }
+  // An index that no request can name: it would become another element's. Or an item that is defined as an array, but
+  // kept in a file that notes arrays and not this one: read without knowing which element.
+  bool HasNoPlace(const PkvNvItem& item) const {
+    return item.index > nv::kHighestElement || unclear_.contains(item.id);
+  }
+
+ private:
+  std::set<uint16_t> ids_;
+  std::set<uint16_t> unclear_;
+};
+
+}  // namespace kral::pkv
+
+#endif

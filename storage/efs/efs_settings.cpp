@@ -1,0 +1,47 @@
+// The EFS settings of a phone object. They are read by a transfer as it goes, so none of this waits for one.
+#include "storage/efs/efs_client.h"
+
+#include "base/guarded_call.h"
+#include "storage/efs/efs_transfer.h"
+
+namespace kral::efs {
+
+bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size) {
+  // Not tested here: a size that cannot work fails the transfer that uses it.
+  phone.efs().read_packet_size = read_size;
+  phone.efs().write_packet_size = write_size;
+  return true;
+}
+
+bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
+                  KRAL_EFS_DIRECTORY_CALLBACK directory) {
+  phone.efs().callback_context = context;
+  phone.efs().transfer_callback = transfer;
+  phone.efs().directory_callback = directory;
+  return true;
+}
+
+Progress CallersProgress(Diag_FTM& phone, const void* source, const void* destination) {
+  return [&settings = phone.efs(), from = reinterpret_cast<uintptr_t>(source),
+          to = reinterpret_cast<uintptr_t>(destination)](u32 operation, u32 done, u32 total) {
+    if (const auto callback = settings.transfer_callback.load()) {
+      const KRAL_HANDLE context = settings.callback_context;
+      CallGuarded([&] { callback(from, to, operation, 0, done, total, context); });
+    }
+  };
+}
+
+void TellCaller(Diag_FTM& phone, const KRAL_EFS_ENTRY& entry) {
+  if (const auto callback = phone.efs().directory_callback.load()) {
+    CallGuarded([&] { callback(&entry, phone.efs().callback_context); });
+  }
+}
+
+bool Abort(Diag_FTM& phone) {
+  ++phone.efs().aborts;
+  phone.efs().abort = true;
+  phone.responses().EndWaits();
+  return true;
+}
+
+}  // namespace kral::efs

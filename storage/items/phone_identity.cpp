@@ -1,0 +1,43 @@
+// Asks the handset who it is.
+#include "storage/items/phone_identity.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <string>
+
+#include "commands/core/core_diag.h"
+
+namespace kral::items {
+namespace {
+
+// A text of the handset as the value of a property: it must not end its line.
+std::string PropertyText(const char* text) {
+  std::string value = text;
+  std::replace_if(
+      value.begin(), value.end(), [](char c) { return static_cast<unsigned char>(c) < ' '; }, ' ');
+  value.erase(value.find_last_not_of(' ') + 1);
+  return value;
+}
+
+}  // namespace
+
+void AppendIdentity(Diag_FTM& phone, PkvProperties& properties) {
+  uint32_t serial = 0;
+  if (diag::ReadSerialNumber(phone, &serial)) {
+    std::array<char, 16> text{};
+    std::snprintf(text.data(), text.size(), "%08X", static_cast<unsigned>(serial));
+    properties.values.emplace_back("ESN", text.data());
+  }
+  std::array<std::array<char, CDiagPacket::kCapacity>, 2> texts{};
+  uint32_t hardware = 0;
+  uint32_t model = 0;
+  if (diag::ReadExtendedBuildId(phone, &hardware, &model, texts[0].data(), texts[1].data())) {
+    properties.values.emplace_back("HardwareVersion", std::to_string(hardware));
+    properties.values.emplace_back("MobileModel", std::to_string(model));
+    properties.values.emplace_back("SoftwareRevision", PropertyText(texts[0].data()));
+    properties.values.emplace_back("Model", PropertyText(texts[1].data()));
+  }
+}
+
+}  // namespace kral::items

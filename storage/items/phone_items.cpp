@@ -1,0 +1,87 @@
+// NV items of the handset, one by one and in batches. Their files are in phone_item_files.cpp.
+#include "storage/items/phone_items.h"
+
+#include <algorithm>
+#include <deque>
+
+#include "commands/checked_reply.h"
+#include "commands/nv/nv_batch.h"
+#include "commands/nv/nv_format.h"
+#include "frame/request_failure.h"
+
+namespace kral {
+namespace {
+
+constexpr int kTries = 3;
+
+constexpr size_t kElementSize = nv::kDataSize - 1;  // a write has the index in front
+
+std::vector<uint8_t> WireData(const PkvNvItem& item, bool element) {
+  if (!element) return {item.data.begin(), item.data.end()};
+  std::vector<uint8_t> data{static_cast<uint8_t>(item.index)};
+  data.insert(data.end(), item.data.begin(), item.data.begin() + kElementSize);
+  return data;
+}
+
+}  // namespace
+
+PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
+  for (int i = 0; i < kTries; ++i) {
+    const Reply reply = ask();
+    refusal_ = reply.refusal();
+    if (reply) return Answer::kAnswered;
+    if (refusal_ != 0 || aborts_.aborted()) return Answer::kRefused;
+  }
+  return Unanswered();
+}
+
+// One request that gets no answer, or is too long to be sent, does not end the work with a handset that is there.
+PhoneItems::Answer PhoneItems::Unanswered() {
+  return phone_.IsPhoneConnected() ? Answer::kRefused : Answer::kLost;
+}
+
+PhoneItems::Answer PhoneItems::Read(PkvNvItem& item, bool element) {
+  return Try([&] {
+    item.data = {};
+    item.status = 0;
+    if (item.subscription != 0) {
+      return nv::ReadExtended(phone_, item.id, item.subscription, item.data, item.status);
+    }
+    if (!element) return nv::Read(phone_, item.id, item.data, item.status);
+    return nv::ReadElement(phone_, item.id, static_cast<uint8_t>(item.index), std::span(item.data).first(kElementSize),
+                           item.status);
+  });
+}
+
+PhoneItems::Answer PhoneItems::Write(const PkvNvItem& item, bool element, uint16_t& status) {
+  const std::vector<uint8_t> data = WireData(item, element);
+  return Try([&] {
+    status = 0;
+    if (item.subscription != 0) return nv::WriteExtended(phone_, item.id, item.subscription, data, status);
+    return nv::Write(phone_, item.id, data, status);
+  });
+}
+
+PhoneItems::Answer PhoneItems::WriteBatch(std::span<const PkvNvItem> items,
+                                          const std::function<bool(const PkvNvItem&)>& is_element,
+                                          std::vector<uint16_t>& statuses) {
+  return Try([&] {
+    statuses.clear();
+    std::deque<NvQueueItem> list;
+    for (const PkvNvItem& item : items) list.push_back({item.id, WireData(item, is_element(item))});
+    bool ours = true;
+    nv::BatchOutcome outcome;
+    const Reply reply = nv::WriteBatch(phone_, list, {}, outcome, [&](uint16_t id, uint8_t status) {
+      ours = ours && statuses.size() < items.size() && items[statuses.size()].id == id;
+      statuses.push_back(status);
+    });
+    return Checked(reply, [&] { return ours || Fail(BadReply(phone_, "has the results of other items")); });
+  });
+}
+
+bool PhoneItems::MayBeReadOnly(uint16_t id) const {
+  const auto& list = phone_.nv_batch().read_only;
+  return std::find(list.begin(), list.end(), id) != list.end();
+}
+
+}  // namespace kral

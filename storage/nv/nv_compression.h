@@ -1,0 +1,21 @@
+// Item data that a handset keeps as a zlib stream.
+#ifndef KRAL_STORAGE_NV_NV_COMPRESSION_H
+#define KRAL_STORAGE_NV_NV_COMPRESSION_H
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <vector>
+
+namespace kral::nv {
+
+std::vector<uint8_t> Compress(std::span<const uint8_t> bytes);
+
+// What the stream at the beginning holds; what stands behind its end is padding. Nothing when the stream is damaged,
+// unfinished, or holds more than `limit` bytes.
+std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> stream, size_t limit);
+
+}  // namespace kral::nv
+
+#endif

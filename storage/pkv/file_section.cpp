@@ -1,0 +1,131 @@
+// Entry records and contents of backed-up files. A content must be as long as its entry tells.
+#include "storage/pkv/file_section.h"
+
+#include <algorithm>
+#include <map>
+#include <optional>
+
+#include "base/little_endian.h"
+
+namespace kral {
+namespace {
+
+std::vector<uint8_t> EntryRecord(const PkvEfsFile& file) {
+  std::vector<uint8_t> record(pkv::kEntryPath + file.path.size());
+  StoreLe<uint32_t>(record, 0, file.mode);
+  StoreLe<uint32_t>(record, pkv::kEntrySize, static_cast<uint32_t>(file.bytes.size()));
+  std::copy(file.path.begin(), file.path.end(), record.begin() + pkv::kEntryPath);
+  return record;
+}
+
+// A path with a zero in it would reach the handset as another one.
+bool ParseEntry(const std::vector<uint8_t>& record, const CompoundStream* data, PkvEfsFile& file) {
+  if (record.size() <= pkv::kEntryPath || data == nullptr) return false;
+  if (LoadLe<uint32_t>(record, pkv::kEntrySize) != data->bytes.size()) return false;
+  file.mode = *LoadLe<uint32_t>(record, 0);
+  file.path.assign(record.begin() + pkv::kEntryPath, record.end());
+  file.bytes = data->bytes;
+  return file.path.find('\0') == std::string::npos;
+}
+
+std::map<uint32_t, const CompoundStream*> NumberedStreams(const CompoundStorage& storage) {
+  std::map<uint32_t, const CompoundStream*> streams;
+  for (const CompoundStream& stream : storage.streams) {
+    if (const auto number = pkv::EntryOfName(stream.name)) streams.emplace(*number, &stream);
+  }
+  return streams;
+}
+
+}  // namespace
+
+EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_view name, pkv::Access access)
+    : storage_(configuration.FindStorage(name)), access_(access) {
+  if (storage_ == nullptr && access == pkv::Access::kReadWrite) storage_ = &configuration.OpenOrAddStorage(name);
+  if (storage_ == nullptr) return;
+  directory_ = storage_->FindStorage(pkv::kEfsDirectory);
+  data_ = storage_->FindStorage(pkv::kEfsData);
+  if (access == pkv::Access::kRead) return;
+  directory_ = &storage_->OpenOrAddStorage(pkv::kEfsDirectory);
+  data_ = &storage_->OpenOrAddStorage(pkv::kEfsData);
+  for (const auto& [number, entry] : NumberedStreams(*directory_)) {
+    if (entry->bytes.size() <= pkv::kEntryPath) continue;
+    const std::string path(entry->bytes.begin() + pkv::kEntryPath, entry->bytes.end());
+    numbers_.emplace(pkv::PathKey(path), number);
+  }
+  for (const CompoundStorage* part : {directory_, data_}) {
+    for (const auto& [number, stream] : NumberedStreams(*part)) used_.insert(number);
+  }
+}
+
+bool EfsEntryStorage::Write(const PkvEfsFile& file) {
+  if (access_ == pkv::Access::kRead) return false;
+  const auto [known, added] = numbers_.emplace(pkv::PathKey(file.path), next_number_);
+  if (added) {
+    while (!used_.insert(next_number_).second) ++next_number_;
+    known->second = next_number_;
+  }
+  const std::string name = pkv::EntryName(known->second);
+  if (added) {
+    directory_->streams.push_back({name, {}});  // no search: the number is new
+    data_->streams.push_back({name, {}});
+  }
+  CompoundStream& entry = added ? directory_->streams.back() : directory_->OpenOrAddStream(name);
+  CompoundStream& content = added ? data_->streams.back() : data_->OpenOrAddStream(name);
+  entry.bytes = EntryRecord(file);
+  content.bytes = file.bytes;
+  return true;
+}
+
+void EfsEntryStorage::Remove(std::string_view path) {
+  const auto known = numbers_.find(pkv::PathKey(path));
+  if (known == numbers_.end()) return;
+  const std::string name = pkv::EntryName(known->second);
+  const auto is_of_path = [&name](const CompoundStream& stream) { return stream.name == name; };
+  directory_->streams.remove_if(is_of_path);
+  data_->streams.remove_if(is_of_path);
+  numbers_.erase(known);
+}
+
+bool EfsEntryStorage::Read(std::vector<PkvEfsFile>& files, std::string& problem) const {
+  if (directory_ == nullptr) return true;
+  const auto contents = data_ != nullptr ? NumberedStreams(*data_) : std::map<uint32_t, const CompoundStream*>();
+  for (const auto& [number, entry] : NumberedStreams(*directory_)) {
+    const auto content = contents.find(number);
+    PkvEfsFile file;
+    if (!ParseEntry(entry->bytes, content != contents.end() ? content->second : nullptr, file)) {
+      problem = storage_->name + "/" + std::string(pkv::kEfsDirectory) + "/" + entry->name + " is damaged";
+      return false;
+    }
+    files.push_back(std::move(file));
+  }
+  return true;
+}
+
+CEFSItemBackup::CEFSItemBackup(CompoundStorage& configuration, pkv::Access access) : CEFSBackup(configuration, access) {
+  if (storage_ == nullptr) return;
+  items_ = access == pkv::Access::kReadWrite ? &storage_->OpenOrAddStorage(pkv::kBackupItems)
+                                             : storage_->FindStorage(pkv::kBackupItems);
+}
+
+void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>& files) {
+  const auto is_item = [](const PkvEfsFile& file) { return file.is_item_file(); };
+  const auto open = [&](auto& storage, std::string_view name, bool needed) {
+    // A place without files is not made.
+    if (needed || configuration.FindStorage(name) != nullptr) storage.emplace(configuration, pkv::Access::kReadWrite);
+  };
+  std::optional<CItemFileStgAccess> item_files;
+  std::optional<CEFSBackup> others;
+  open(item_files, pkv::kItemFiles, std::any_of(files.begin(), files.end(), is_item));
+  open(others, pkv::kEfsBackup, !std::all_of(files.begin(), files.end(), is_item));
+  for (const PkvEfsFile& file : files) {
+    if (is_item(file)) {
+      if (others) others->Remove(file.path);
+      item_files->Write(file);
+    } else {
+      if (item_files) item_files->Remove(file.path);
+      others->Write(file);
+    }
+  }
+}
+
+}  // namespace kral

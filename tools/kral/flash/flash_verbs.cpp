@@ -1,0 +1,252 @@
+// kral flash: what has the line of a handset in download, flash programmers, images.
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "tools/kral/flash/flash_images.h"
+#include "tools/kral/flash/flash_target.h"
+#include "tools/kral/verbs.h"
+
+namespace kral::tool {
+namespace {
+
+// What one frame takes; the plan of a dry run reckons with it where nothing else is said.
+constexpr std::uint32_t kLargestBlock = 16376;
+constexpr std::uint32_t kDefaultPacket = 8178;
+constexpr std::uint32_t kLargestChunk = 4089;
+constexpr std::size_t kLargestOpening = 512;  // of headers and of partition tables
+
+void PrintState(Context& context, std::uint16_t port, const char* state, const Json& more, const std::string& text) {
+  Json members{{"port", port}, {"state", state}};
+  members.update(more);
+  context.out.Result(members, text);
+}
+
+void ShowInfo(Context& context) {
+  FlashTarget target(context);
+  const auto port = target.session().port();
+  if (target.session().answers_diagnostics()) {
+    return PrintState(context, port, "diagnostic", Json::object(),
+                      "diagnostic mode: kral flash load FILE enters the loader\n");
+  }
+  // A loader refuses a hello at once, while a programmer is silent to a loader's request.
+  if (const auto limits = target.TryHello(1)) {
+    return PrintState(
+        context, port, "programmer", {{"block_size", limits->block_size}, {"window", limits->window}},
+        fmt::format("flash programmer: blocks of {} bytes, window of {}\n", limits->block_size, limits->window));
+  }
+  if (const auto version = target.LoaderVersion()) {
+    return PrintState(context, port, "loader", {{"version", *version}},
+                      fmt::format("loader, software version 0x{:02X}\n", *version));
+  }
+  throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port)),
+                  "neither a handset in diagnostic mode, nor a loader, nor a flash programmer has the line");
+}
+
+struct LoadArguments {
+  std::string file;
+  std::uint32_t packet = kDefaultPacket;
+  bool dry_run = false;
+};
+
+void LoadProgrammer(Context& context, const LoadArguments& arguments) {
+  const auto programmer = ReadProgrammer(arguments.file);
+  if (arguments.dry_run) {
+    const auto chunk = std::min(arguments.packet / 2, kLargestChunk);
+    context.out.Result(
+        {{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
+        DescribeImage(programmer) +
+            fmt::format("  {} writes of at most {} bytes\n", CountBlocks(programmer, chunk), chunk));
+    return;
+  }
+  FlashTarget target(context);
+  target.EnterLoader();
+  target.Load(programmer, arguments.packet);
+  const auto limits = target.TryHello(5);
+  if (!limits) {
+    throw ToolError(ExitCode::kNoAnswer, fmt::format("{} was started but does not answer", arguments.file),
+                    "check that the programmer is meant for this handset");
+  }
+  context.out.Result({{"port", target.session().port()},
+                      {"bytes", programmer.info.size[0]},
+                      {"block_size", limits->block_size},
+                      {"window", limits->window}},
+                     fmt::format("{} is running: blocks of {} bytes, window of {}\n", arguments.file,
+                                 limits->block_size, limits->window));
+}
+
+struct WriteArguments {
+  std::vector<std::string> images;
+  std::string format = "auto";
+  WriteOptions options;
+  std::optional<std::uint8_t> security_mode;
+  std::string partition_table;
+  bool override_table = false;
+  bool dry_run = false;
+};
+
+void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uint32_t block_size) {
+  Json rows = Json::array();
+  std::string text;
+  std::uint64_t blocks = 0;
+  for (const auto& image : images) {
+    const auto count = CountBlocks(image, block_size);
+    auto row = ImageObject(image);
+    row["blocks"] = count;
+    rows.push_back(std::move(row));
+    text += DescribeImage(image) + fmt::format("  {} blocks of at most {} bytes\n", count, block_size);
+    blocks += count;
+  }
+  const auto bytes = TotalBytes(images);
+  text += fmt::format("in all {} bytes in {} blocks; nothing was written\n", bytes, blocks);
+  context.out.Result(
+      {{"dry_run", true}, {"images", rows}, {"bytes", bytes}, {"blocks", blocks}, {"block_size", block_size}}, text);
+}
+
+// Every file is looked at before the first byte goes out.
+void WriteImages(Context& context, WriteArguments arguments) {
+  auto& options = arguments.options;
+  options.format = ParseImageFormat(arguments.format);
+  std::vector<FlashImage> images;
+  for (const auto& argument : arguments.images) images.push_back(ReadFlashImage(argument, options.format));
+  if (!options.header.empty()) CheckFile(options.header, kLargestOpening);
+  if (!arguments.partition_table.empty()) CheckFile(arguments.partition_table, kLargestOpening);
+  if (arguments.dry_run)
+    return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
+
+  FlashTarget target(context);
+  const auto limits = target.Hello();
+  if (arguments.security_mode) target.SetSecurityMode(*arguments.security_mode);
+  if (!arguments.partition_table.empty())
+    target.SendPartitionTable(arguments.partition_table, arguments.override_table);
+  const auto total = TotalBytes(images);
+  std::uint64_t done = 0;
+  Json written = Json::array();
+  {
+    Progress progress(context.out, "write", total);
+    for (const auto& image : images) {
+      target.Write(image, options, limits, done, progress);
+      done += image.info.size[0];
+      written.push_back(ImageObject(image));
+      context.found["written"] = written;
+    }
+  }
+  context.out.Result({{"port", target.session().port()}, {"written", written}, {"bytes", done}},
+                     fmt::format("{} bytes in {} images written and acknowledged\n", done, images.size()));
+}
+
+void VerifyImages(Context& context, const std::vector<std::string>& files, const std::string& format) {
+  Json rows = Json::array();
+  std::string text;
+  for (const auto& file : files) {
+    const auto image = ReadFlashImage(file, ParseImageFormat(format));
+    rows.push_back(ImageObject(image));
+    context.found["images"] = rows;
+    text += DescribeImage(image);
+  }
+  context.out.Result({{"images", rows}}, text);
+}
+
+struct HexArguments {
+  std::string input;
+  std::string output;
+  std::optional<std::uint32_t> base;
+};
+
+void Convert(Context& context, const HexArguments& arguments) {
+  const auto image = ReadFlashImage(arguments.input, KRAL_IMAGE_FORMAT_BY_CONTENT);
+  const bool to_binary = image.info.format == KRAL_IMAGE_FORMAT_HEX;
+  if (to_binary && arguments.base) {
+    throw ToolError(ExitCode::kUsage, "a HEX file tells its base itself", "--base is for binary files");
+  }
+  std::uint32_t base = arguments.base.value_or(0);
+  std::uint32_t result = 0;
+  if (KRAL_HEX_Convert(image.file.c_str(), arguments.output.c_str(),
+                       to_binary ? KRAL_HEX_TO_BINARY : KRAL_HEX_FROM_BINARY, &base, &result) == 0) {
+    if (result == KRAL_STREAM_BAD_ARGUMENT) {
+      throw ToolError(ExitCode::kUsage, fmt::format("the base 0x{:X} is no multiple of 0x10000", base),
+                      "give a base such as --base 0x20000");
+    }
+    if (result == KRAL_STREAM_PAST_END) {
+      throw ToolError(ExitCode::kUsage,
+                      fmt::format("{} bytes from 0x{:X} on go past address 0xFFFFFFFF", image.info.size[0], base),
+                      "give a lower base");
+    }
+    if (result != KRAL_HEX_NOT_WRITTEN) {
+      throw ToolError(ExitCode::kBadFile, fmt::format("{} changed while it was read", arguments.input),
+                      "wait until it is complete");
+    }
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written", arguments.output),
+                    "check folder, permissions and room on the disk");
+  }
+  context.out.Result({{"output", arguments.output}, {"base", base}, {"bytes", image.info.size[0]}},
+                     fmt::format("{}: {} bytes from 0x{:08X}\n", arguments.output, image.info.size[0], base));
+}
+
+void AddFormat(CLI::App& verb, std::string& format) {
+  verb.add_option("--format", format, "Format of the images: auto goes by a colon as the first character")
+      ->check(CLI::IsMember({"auto", "hex", "bin"}))
+      ->capture_default_str();
+}
+
+void AddLoadVerb(CLI::App& flash, Context& context) {
+  const auto arguments = std::make_shared<LoadArguments>();
+  auto* load = flash.add_subcommand("load", "Enter the loader, load a flash programmer and start it");
+  load->add_option("programmer", arguments->file, "Intel HEX file of the flash programmer")->required();
+  load->add_option("--packet", arguments->packet, "Largest packet of the loader, bytes; half of it is data")
+      ->check(CLI::Range(2u, 65535u))
+      ->capture_default_str();
+  load->add_flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
+  load->callback(
+      [&context, arguments] { context.run = [&context, arguments] { LoadProgrammer(context, *arguments); }; });
+}
+
+void AddWriteVerb(CLI::App& flash, Context& context) {
+  const auto arguments = std::make_shared<WriteArguments>();
+  auto* write = flash.add_subcommand("write", "Write images through the flash programmer");
+  write->add_option("images", arguments->images, "Image files, each as FILE or TYPE:FILE")->required();
+  AddFormat(*write, arguments->format);
+  write->add_option("--type", arguments->options.type, "Image type of files that do not name their own");
+  write->add_option("--header", arguments->options.header, "File of at most 512 bytes that opens each image");
+  write->add_flag("--nor", arguments->options.nor, "Neither open nor close: for programmers that take one image");
+  write->add_option("--block-size", arguments->options.block_size, "Bytes per write at most; default: the handset's")
+      ->check(CLI::Range(1u, kLargestBlock));
+  write->add_option("--security", arguments->security_mode, "Set this security mode first");
+  write->add_option("--partition", arguments->partition_table, "Send this partition table first");
+  write->add_flag("--override", arguments->override_table, "Let the partition table replace a different one");
+  write->add_flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
+  write->callback([&context, arguments] { context.run = [&context, arguments] { WriteImages(context, *arguments); }; });
+}
+
+}  // namespace
+
+void AddFlashVerbs(CLI::App& app, Context& context) {
+  auto* flash = app.add_subcommand("flash", "Software download: flash programmers and images");
+  flash->require_subcommand(1);
+  flash->add_subcommand("info", "Tell what has the line: diagnostics, loader or flash programmer")
+      ->callback([&context] { context.run = [&context] { ShowInfo(context); }; });
+  AddLoadVerb(*flash, context);
+  AddWriteVerb(*flash, context);
+
+  const auto files = std::make_shared<std::vector<std::string>>();
+  const auto format = std::make_shared<std::string>("auto");
+  auto* verify = flash->add_subcommand("verify-image", "Check image files and tell what is in them; needs no handset");
+  verify->add_option("images", *files, "Image files")->required();
+  AddFormat(*verify, *format);
+  verify->callback([&context, files, format] {
+    context.run = [&context, files, format] { VerifyImages(context, *files, *format); };
+  });
+
+  const auto arguments = std::make_shared<HexArguments>();
+  auto* hex = flash->add_subcommand("hex", "Convert Intel HEX to binary, or a binary to Intel HEX; needs no handset");
+  hex->add_option("input", arguments->input, "File to read: the other format is written")->required();
+  hex->add_option("output", arguments->output, "File to write")->required();
+  hex->add_option("--base", arguments->base, "First address of a binary; a multiple of 0x10000");
+  hex->callback([&context, arguments] { context.run = [&context, arguments] { Convert(context, *arguments); }; });
+}
+
+}  // namespace kral::tool

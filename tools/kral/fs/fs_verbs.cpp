@@ -1,0 +1,359 @@
+// kral fs: the handset's files. Looking and changing names is done here; copying is fs_copy's.
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <functional>
+#include <memory>
+#include <utility>
+
+#include "platform/console.h"
+#include "platform/folder.h"
+#include "tools/kral/fs/fs_copy.h"
+#include "tools/kral/fs/fs_names.h"
+#include "tools/kral/fs/fs_remote.h"
+#include "tools/kral/verbs.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint32_t kLargestCat = 64u << 20;
+constexpr std::uint32_t kDefaultSyncMs = 10000;
+constexpr std::uint32_t kLongestSyncMs = 3600 * 1000;
+constexpr std::uint16_t kSmallestPacket = 21;
+constexpr std::uint16_t kLargestPacket = 4091;
+
+struct FsOptions {
+  std::vector<std::string> paths;
+  CopyOptions copy;
+  bool unverified = false;
+  bool parents = false;
+  std::uint32_t wait_ms = kDefaultSyncMs;
+  std::uint16_t packet_size = 0;  // 0: the library's own
+};
+
+std::string First(const FsOptions& options) {
+  return EfsPath(options.paths.empty() ? "/" : options.paths.front());
+}
+
+const char* NameOf(RemoteEntry::Kind kind) {
+  switch (kind) {
+    case RemoteEntry::Kind::kFile:
+      return "file";
+    case RemoteEntry::Kind::kDirectory:
+      return "directory";
+    case RemoteEntry::Kind::kLink:
+      return "link";
+    default:
+      return "other";
+  }
+}
+
+const char* KindName(const RemoteStatus& status) {
+  return status.is_item() ? "item" : NameOf(status.kind());
+}
+
+Json Describe(const RemoteEntry& entry) {
+  const bool is_item = (entry.mode & KRAL_EFS_MODE_KIND) == KRAL_EFS_MODE_ITEM_FILE;
+  return {{"name", entry.name},
+          {"type", is_item ? "item" : NameOf(entry.kind)},
+          {"mode", fmt::format("{:o}", entry.mode)},
+          {"size", entry.size},
+          {"modified", entry.modified}};
+}
+
+std::string ListLine(const RemoteEntry& entry) {
+  const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
+  return fmt::format("{}  {:>10}  {}  {}{}\n", ModeText(entry.mode), entry.size, TimeText(entry.modified),
+                     Printable(entry.name), is_directory ? "/" : "");
+}
+
+// --- Looking --------------------------------------------------------------------------------------------------------
+
+void List(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  std::vector<RemoteEntry> entries;
+  if (const auto status = files.Status(path); status.is_directory()) {
+    entries = files.List(path);
+  } else {
+    entries.push_back({status.kind(), std::string(LastEfsName(path)), status.mode, status.size, status.modified});
+  }
+  Json rows = Json::array();
+  std::string text;
+  for (const auto& entry : entries) {
+    rows.push_back(Describe(entry));
+    text += ListLine(entry);
+  }
+  context.out.Result({{"port", files.session().port()}, {"path", path}, {"entries", rows}}, text);
+}
+
+// Draws what is in a directory below its own line; links are shown and not followed, nor are names that would lead
+// elsewhere. A directory that cannot be listed is marked.
+Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent, std::string& text) {
+  Json rows = Json::array();
+  const auto entries = files.List(path);
+  for (std::size_t i = 0; i < entries.size(); ++i) {
+    const auto& entry = entries[i];
+    const bool last = i + 1 == entries.size();
+    const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
+    text += fmt::format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", Printable(entry.name), is_directory ? "/" : "");
+    rows.push_back(Describe(entry));
+    if (!is_directory || entry.name.find('/') != std::string::npos) continue;
+    const auto inner = indent + (last ? "    " : "|   ");
+    try {
+      rows.back()["entries"] = Draw(files, JoinEfs(path, entry.name), inner, text);
+    } catch (const ToolError& error) {
+      if (!ConcernsOneFile(error)) throw;
+      rows.back()["error"] = error.what();
+      text += fmt::format("{}`-- [{}]\n", inner, error.what());
+    }
+  }
+  return rows;
+}
+
+void Tree(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  auto text = Printable(path) + "\n";
+  const auto rows = Draw(files, path, "", text);
+  context.out.Result({{"port", files.session().port()}, {"path", path}, {"entries", rows}}, text);
+}
+
+void Cat(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  const auto status = files.Status(path);
+  if (status.is_directory()) {
+    throw ToolError(ExitCode::kUsage, fmt::format("{} is a directory", files.Where(path)), "kral fs ls lists it");
+  }
+  if (status.size > kLargestCat) {
+    throw ToolError(ExitCode::kUsage, fmt::format("{} has {}", files.Where(path), SizeText(status.size)),
+                    "kral fs get fetches files of any size");
+  }
+  const auto bytes = files.ReadAll(path, status.size);
+  const Json members{{"port", files.session().port()}, {"path", path}, {"size", bytes.size()}};
+  if (context.out.json()) {
+    auto with_data = members;
+    with_data["data"] = HexText(bytes);
+    context.out.Result(with_data, "");
+    return;
+  }
+  UseBinaryOutput();
+  context.out.Result(members, {reinterpret_cast<const char*>(bytes.data()), bytes.size()});
+}
+
+void Stat(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  const auto status = files.Status(path);
+  const Json members{{"port", files.session().port()},
+                     {"path", path},
+                     {"type", KindName(status)},
+                     {"mode", fmt::format("{:o}", status.mode)},
+                     {"size", status.size},
+                     {"links", status.links},
+                     {"accessed", status.accessed},
+                     {"modified", status.modified},
+                     {"changed", status.changed}};
+  context.out.Result(members, fmt::format("{}\n  type      {}\n  mode      {} ({:o})\n  size      {}\n  links     {}\n"
+                                          "  accessed  {}\n  modified  {}\n  changed   {}\n",
+                                          Printable(path), KindName(status), ModeText(status.mode), status.mode,
+                                          status.size, status.links, TimeText(status.accessed),
+                                          TimeText(status.modified), TimeText(status.changed)));
+}
+
+void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  KRAL_EFS_STATFS status{};
+  files.Ask(fmt::format("the room of {}", Printable(path)), path, [&](std::uint32_t* error) {
+    return KRAL_EFS2_DIAG_STATFS(files.session().handle(), path.c_str(), error, &status);
+  });
+  const auto bytes = [&status](std::uint32_t blocks) { return std::uint64_t{blocks} * status.block_size; };
+  const auto used = bytes(status.total_blocks - std::min(status.free_blocks, status.total_blocks));
+  const Json members{{"port", files.session().port()},
+                     {"path", path},
+                     {"total", bytes(status.total_blocks)},
+                     {"used", used},
+                     {"available", bytes(status.available_blocks)},
+                     {"block_size", status.block_size},
+                     {"files", status.file_count},
+                     {"most_files", status.max_file_count}};
+  context.out.Result(
+      members,
+      fmt::format("{} in all, {} used, {} available; {} of at most {} files\n", SizeText(bytes(status.total_blocks)),
+                  SizeText(used), SizeText(bytes(status.available_blocks)), status.file_count, status.max_file_count));
+}
+
+// --- Changing -------------------------------------------------------------------------------------------------------
+
+using PathCall = std::uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* path, std::uint32_t* error_number);
+
+// One request for each path; those done before a failure are told.
+void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
+                 const std::function<void(const std::string& path)>& change) {
+  context.found = {{"port", files.session().port()}, {"done", Json::array()}};
+  for (const auto& argument : options.paths) {
+    const auto path = EfsPath(argument);
+    change(path);
+    context.found["done"].push_back(path);
+  }
+  context.out.Result(context.found, "");
+}
+
+void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, PathCall call) {
+  ForEachPath(context, files, options, [&](const std::string& path) {
+    files.Ask(fmt::format("the removal of {}", Printable(path)), path,
+              [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
+  });
+}
+
+void RemoveFiles(Context& context, RemoteFiles& files, const FsOptions& options) {
+  RemoveAll(context, files, options, KRAL_EfsDelete);
+}
+
+void RemoveDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
+  RemoveAll(context, files, options, KRAL_EfsRmDir);
+}
+
+void MakeDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
+  ForEachPath(context, files, options, [&](const std::string& path) {
+    if (options.parents) {
+      files.MakeParents(path);
+    } else {
+      files.MakeDirectory(path);
+    }
+  });
+}
+
+void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto from = EfsPath(options.paths[0]);
+  auto to = EfsPath(options.paths[1]);
+  if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
+  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), from, [&](std::uint32_t* error) {
+    return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
+  });
+  context.out.Result({{"port", files.session().port()}, {"from", from}, {"to", to}}, "");
+}
+
+void Link(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto target = EfsPath(options.paths[0]);
+  const auto link = EfsPath(options.paths[1]);
+  files.Ask(fmt::format("the link {}", Printable(link)), {}, [&](std::uint32_t* error) {
+    return KRAL_EfsCreateLink(files.session().handle(), target.c_str(), link.c_str(), error);
+  });
+  context.out.Result({{"port", files.session().port()}, {"target", target}, {"link", link}}, "");
+}
+
+void Sync(Context& context, RemoteFiles& files, const FsOptions& options) {
+  const auto path = First(options);
+  files.session().Begin();
+  if (KRAL_EFS2_SyncWithWait(files.session().handle(), path.c_str(), options.wait_ms) == 0) {
+    const ToolError error = files.session().Explain(fmt::format("the sync of {}", Printable(path)));
+    if (error.code() != ExitCode::kNoAnswer) throw error;
+    throw ToolError(error.code(), error.what(), "--wait MS waits longer", error.record());
+  }
+  context.out.Result({{"port", files.session().port()}, {"path", path}}, "");
+}
+
+// --- Copying --------------------------------------------------------------------------------------------------------
+
+// The colon tells the sides apart, so that a mistaken order is noticed before anything is overwritten.
+void CheckSides(const std::string& handset_side, const std::string& local_side) {
+  if (IsEfsArgument(handset_side) && !IsEfsArgument(local_side) && !local_side.empty()) return;
+  throw ToolError(ExitCode::kUsage, fmt::format("of {} and {}, one is no path of its side", handset_side, local_side),
+                  "mark the handset's side with a colon: kral fs get :/nv/item item, kral fs put item :/nv/item");
+}
+
+std::string LocalTarget(const FsOptions& options) {
+  return options.paths.size() > 1 ? options.paths[1] : ".";
+}
+
+void CheckGet(const FsOptions& options) {
+  CheckSides(options.paths[0], LocalTarget(options));
+}
+
+void Get(Context& context, RemoteFiles& files, const FsOptions& options) {
+  Copier(context, files, options.copy, "get").Get(EfsPath(options.paths[0]), LocalTarget(options));
+}
+
+void CheckPut(const FsOptions& options) {
+  CheckSides(options.paths[1], options.paths[0]);
+  if (LookAt(options.paths[0]).kind == LocalKind::kMissing) {
+    throw ToolError(ExitCode::kBadFile, fmt::format("there is no {}", options.paths[0]), "check the name");
+  }
+}
+
+void Put(Context& context, RemoteFiles& files, const FsOptions& options) {
+  auto copy = options.copy;
+  copy.verify = !options.unverified;
+  Copier(context, files, copy, "put").Put(options.paths[0], EfsPath(options.paths[1]));
+}
+
+// --- The command line -----------------------------------------------------------------------------------------------
+
+constexpr int kMany = 1000;
+
+struct Verb {
+  const char* name;
+  const char* help;
+  const char* paths;
+  int least;
+  int most;
+  void (*act)(Context& context, RemoteFiles& files, const FsOptions& options);
+  void (*check)(const FsOptions& options) = [](const FsOptions&) {};  // before anything is opened
+};
+
+constexpr Verb kVerbs[] = {
+    {"cat", "Print a file", "path", 1, 1, Cat},
+    {"df", "Print how much room there is", "path", 0, 1, Room},
+    {"get", "Copy from the handset: get :PATH [LOCAL]", "paths", 1, 2, Get, CheckGet},
+    {"ln", "Make a symbolic link: ln TARGET LINK", "paths", 2, 2, Link},
+    {"ls", "List a directory", "path", 0, 1, List},
+    {"mkdir", "Make directories", "paths", 1, kMany, MakeDirectories},
+    {"mv", "Rename or move: mv OLD NEW", "paths", 2, 2, Move},
+    {"put", "Copy to the handset, and compare: put LOCAL :PATH", "paths", 2, 2, Put, CheckPut},
+    {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles},
+    {"rmdir", "Remove empty directories", "paths", 1, kMany, RemoveDirectories},
+    {"stat", "Print what there is to know about a path", "path", 1, 1, Stat},
+    {"sync", "Have everything written to the flash", "path", 0, 1, Sync},
+    {"tree", "List a directory and everything below", "path", 0, 1, Tree},
+};
+
+void Run(Context& context, const FsOptions& options, const Verb& verb) {
+  verb.check(options);
+  RemoteFiles files(context.session);
+  if (options.packet_size != 0) {
+    KRAL_SetEfsReadAndWritePacketSize(files.session().handle(), options.packet_size, options.packet_size);
+  }
+  verb.act(context, files, options);
+}
+
+void AddFlags(const CLI::App& fs, FsOptions& options) {
+  for (const char* name : {"get", "put"}) {
+    auto* verb = fs.get_subcommand(name);
+    verb->add_flag("-r,--recursive", options.copy.recursive, "Copy directories with all that is in them");
+    verb->add_flag("--force", options.copy.force, "Copy files that are equal already, too");
+  }
+  fs.get_subcommand("put")->add_flag("--item", options.copy.item, "Put item files; those there stay items anyway");
+  fs.get_subcommand("put")->add_flag("--no-verify", options.unverified, "Do not read back and compare");
+  fs.get_subcommand("mkdir")->add_flag("--parents", options.parents, "Make the directories above, too");
+  fs.get_subcommand("sync")
+      ->add_option("--wait", options.wait_ms, "Milliseconds until it is given up")
+      ->check(CLI::Range(1u, kLongestSyncMs));
+}
+
+}  // namespace
+
+void AddFsVerbs(CLI::App& app, Context& context) {
+  const auto options = std::make_shared<FsOptions>();
+  auto* fs = app.add_subcommand("fs", "Files on the handset; a ':' in front of a path marks the handset's side");
+  fs->require_subcommand(1);
+  fs->add_option("--packet-size", options->packet_size, "Bytes of a packet in transfers; larger ones are faster")
+      ->check(CLI::Range(kSmallestPacket, kLargestPacket));
+  for (const auto& verb : kVerbs) {
+    auto* subcommand = fs->add_subcommand(verb.name, verb.help);
+    subcommand->add_option(verb.paths, options->paths)->expected(verb.least, verb.most)->required(verb.least > 0);
+    subcommand->callback(
+        [&context, options, &verb] { context.run = [&context, options, &verb] { Run(context, *options, verb); }; });
+  }
+  AddFlags(*fs, *options);
+}
+
+}  // namespace kral::tool

@@ -1,0 +1,321 @@
+// kral log: which logs a handset sends, and what becomes of them.
+#include <fmt/format.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <array>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "tools/kral/call_failure.h"
+#include "tools/kral/interrupt.h"
+#include "tools/kral/progress.h"
+#include "tools/kral/traffic/playback.h"
+#include "tools/kral/traffic/traffic.h"
+#include "tools/kral/verbs.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint32_t kItemsPerEquipmentId = 4096;
+constexpr std::size_t kMaskRoom = 4096;
+
+struct LogOptions {
+  std::vector<std::string> codes;
+  std::vector<std::string> categories;
+  bool all = false;
+  std::string names;
+  std::string file;
+  bool as_recorded = false;
+  Limit limit;
+};
+
+using Ranges = std::array<std::uint32_t, KRAL_EQUIPMENT_IDS>;
+using Codes = std::vector<std::uint16_t>;
+
+Ranges ReadRanges(Session& session) {
+  Ranges ranges{};
+  session.Run("the request for the log ranges",
+              [&] { return KRAL_DIAG_GetLogRanges(session.handle(), ranges.data()); });
+  return ranges;
+}
+
+// Items from 4,096 on have no code of their own: theirs would be the next equipment id's.
+struct ItemsOn {
+  Codes codes;
+  std::uint32_t beyond = 0;
+};
+
+ItemsOn FindItemsOn(Session& session, std::uint8_t equipment_id) {
+  std::vector<std::uint8_t> mask(kMaskRoom);
+  auto size = static_cast<std::uint16_t>(mask.size());
+  std::uint32_t bits = 0;
+  session.Run(fmt::format("the request for the log mask of equipment id {}", equipment_id),
+              [&] { return KRAL_DIAG_GetLogMask(session.handle(), equipment_id, &bits, &size, mask.data()); });
+  ItemsOn on;
+  for (std::uint32_t item = 0; item < std::min<std::uint32_t>(bits, size * 8U); ++item) {
+    if ((mask[item / 8] >> item % 8 & 1) == 0) continue;
+    if (item < kItemsPerEquipmentId) {
+      on.codes.push_back(static_cast<std::uint16_t>(equipment_id * kItemsPerEquipmentId + item));
+    } else {
+      ++on.beyond;
+    }
+  }
+  return on;
+}
+
+std::string NameOf(KRAL_HANDLE handle, std::uint16_t code) {
+  std::array<char, 256> name{};
+  return KRAL_GetLogCodeText(handle, code, name.size(), name.data()) != 0 ? Printable(name.data()) : std::string();
+}
+
+void List(const Context& context, const LogOptions& options) {
+  Session session(context.session);
+  LoadTable(session.handle(), KRAL_TABLE_LOG_NAMES, options.names);
+  const auto ranges = ReadRanges(session);
+  Json rows = Json::array();
+  std::string text;
+  for (std::uint8_t id = 0; id < ranges.size(); ++id) {
+    if (ranges[id] == 0) continue;
+    Json codes = Json::array();
+    std::string lines;
+    const auto on = FindItemsOn(session, id);
+    for (const auto code : on.codes) {
+      const auto name = NameOf(session.handle(), code);
+      codes.push_back({{"code", code}, {"name", name}});
+      lines += fmt::format("  0x{:04X}  {}\n", code, name);
+    }
+    if (on.beyond != 0) lines += fmt::format("  and {} without a code\n", on.beyond);
+    text += fmt::format("equipment id {}: {} items, {} on\n{}", id, ranges[id], codes.size() + on.beyond, lines);
+    rows.push_back(
+        {{"equipment_id", id}, {"items", ranges[id]}, {"on", std::move(codes)}, {"on_without_code", on.beyond}});
+  }
+  context.out.Result({{"port", session.port()}, {"equipment_ids", std::move(rows)}}, text);
+}
+
+void SwitchCodes(Session& session, const Codes& codes, bool on) {
+  for (auto first = codes.begin(); first != codes.end();) {
+    const auto equipment_id = static_cast<std::uint8_t>(*first / kItemsPerEquipmentId);
+    const auto last = std::find_if(first, codes.end(),
+                                   [=](std::uint16_t code) { return code / kItemsPerEquipmentId != equipment_id; });
+    const auto count = static_cast<std::uint16_t>(last - first);
+    const auto change = on ? KRAL_DIAG_AddExtendedLogCodes : KRAL_DIAG_ClearExtendedLogCodes;
+    session.Run(fmt::format("switching {} log codes of equipment id {}", on ? "on" : "off", equipment_id),
+                [&] { return change(session.handle(), equipment_id, &*first, count); });
+    first = last;
+  }
+}
+
+void SwitchAll(Session& session, bool on) {
+  const auto ranges = ReadRanges(session);
+  for (std::uint8_t id = 0; id < ranges.size(); ++id) {
+    if (ranges[id] == 0) continue;
+    if (!on) {
+      session.Run(fmt::format("switching off equipment id {}", id),
+                  [&] { return KRAL_DIAG_ClearAllLogCodes(session.handle(), id); });
+      continue;
+    }
+    Codes codes;
+    for (std::uint32_t item = 0; item < std::min(ranges[id], kItemsPerEquipmentId); ++item) {
+      codes.push_back(static_cast<std::uint16_t>(id * kItemsPerEquipmentId + item));
+    }
+    SwitchCodes(session, codes, true);
+  }
+}
+
+void Switch(const Context& context, const LogOptions& options, bool on) {
+  const auto codes = ParseIds(options.codes);
+  const auto categories = ParseIds(options.categories);
+  if (codes.empty() && categories.empty() && !options.all) {
+    throw ToolError(ExitCode::kUsage, "nothing to switch", "give log codes, --category or --all");
+  }
+  Session session(context.session);
+  if (options.all) SwitchAll(session, on);
+  SwitchCodes(session, codes, on);
+  for (const auto category : categories) {
+    session.Run(fmt::format("switching message category {}", category),
+                [&] { return KRAL_ExtendedTextMessage_SetCategoryEnable(session.handle(), category, on ? 1 : 0); });
+  }
+  const auto state = on ? "on" : "off";
+  const auto what = options.all ? std::string("all logs")
+                                : fmt::format("{} log codes, {} message categories", codes.size(), categories.size());
+  context.out.Result(
+      {{"port", session.port()}, {"state", state}, {"all", options.all}, {"codes", codes}, {"categories", categories}},
+      fmt::format("{} {}\n", what, state));
+}
+
+KRAL_TRAFFIC_COUNTERS CountersOf(KRAL_HANDLE handle) {
+  KRAL_TRAFFIC_COUNTERS counters{};
+  KRAL_GetTrafficCounters(handle, &counters);
+  return counters;
+}
+
+// However slow the disk is, until Ctrl-C; one that has ended the capture does not end this.
+KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
+  const bool interrupted_before = Interrupted();
+  for (;;) {
+    KRAL_StopCapture(handle);
+    const auto counters = CountersOf(handle);
+    if (counters.capture_pending == 0 || (Interrupted() && !interrupted_before)) return counters;
+  }
+}
+
+void Capture(Context& context, LogOptions& options) {
+  const auto codes = ParseIds(options.codes);
+  Session session(context.session);
+  if (KRAL_StartCapture(session.handle(), options.file.c_str()) == 0) {
+    throw ExplainRecord(LastError(session.handle()), "the capture", session.port(),
+                        "check folder, permissions and room on the disk");
+  }
+  SwitchCodes(session, codes, true);
+  KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
+  options.limit.Begin();
+  std::uint64_t packets = 0;
+  {
+    Progress progress(context.out, "capture", options.limit.count(), Progress::Unit::kItems);
+    CollectPackets(
+        session, options.limit, packets, [&](std::span<const std::uint8_t>) { ++packets; },
+        [&] { progress.Update(packets); });
+  }
+  const auto counters = FinishCapture(session.handle());
+  const Json members{{"port", session.port()},
+                     {"file", options.file},
+                     {"packets", counters.captured},
+                     {"lost", counters.capture_lost},
+                     {"pending", counters.capture_pending},
+                     {"seconds", options.limit.seconds()}};
+  if (const auto missing = counters.capture_lost + counters.capture_pending; missing != 0) {
+    if (context.out.json()) context.found = members;
+    throw ToolError(ExitCode::kBadFile, fmt::format("{} of the packets are not in {}", missing, options.file),
+                    "check the room on the disk and its speed; what is in the file can be played");
+  }
+  context.out.Result(members, fmt::format("{} packets in {}\n", counters.captured, options.file));
+}
+
+void NoteCut(const Context& context, const std::string& file) {
+  context.out.Note(fmt::format("{} is cut or damaged behind its last whole packet", file));
+}
+
+void Play(const Context& context, const LogOptions& options) {
+  const OfflineHandle handle;
+  std::uint64_t packets = 0;
+  const bool whole =
+      PlayFile(handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
+               [&](const PlayedPacket& packet) {
+                 ++packets;
+                 const auto what = DescribePacket(packet.bytes);
+                 context.out.Stream({{"event", "packet"},
+                                     {"microseconds", packet.microseconds},
+                                     {"what", what},
+                                     {"bytes", HexText(packet.bytes)}},
+                                    fmt::format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what,
+                                                packet.bytes.size(), HexDump(packet.bytes)));
+               });
+  if (!whole) NoteCut(context, options.file);
+  context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
+}
+
+Json JsonOf(const KRAL_TRAFFIC_COUNTERS& c) {
+  return {{"bytes_received", c.bytes_received},
+          {"packets_received", c.packets_received},
+          {"collected", c.collected},
+          {"events", c.events},
+          {"dropped_logs", c.dropped_logs},
+          {"dropped_events", c.dropped_events},
+          {"dropped_answers", c.dropped_answers},
+          {"dropped_off", c.dropped_off},
+          {"bad_fcs", c.bad_fcs},
+          {"oversized", c.oversized},
+          {"waiting", c.waiting},
+          {"most_waiting", c.most_waiting}};
+}
+
+void FileStatistics(const Context& context, const LogOptions& options) {
+  options.limit.Reject("a capture file");
+  const OfflineHandle handle;
+  LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
+  TrafficTable table;
+  const bool whole = PlayFile(handle.get(), options.file, Pace::kAtOnce,
+                              [&](const PlayedPacket& packet) { table.Add(packet.bytes); });
+  if (!whole) NoteCut(context, options.file);
+  context.out.Result({{"file", options.file}, {"cut", !whole}, {"rows", table.Rows(handle.get(), 0)}},
+                     table.Text(handle.get(), 0));
+}
+
+void Statistics(const Context& context, LogOptions& options) {
+  if (!options.file.empty()) return FileStatistics(context, options);
+  Session session(context.session);
+  LoadTable(session.handle(), KRAL_TABLE_LOG_NAMES, options.names);
+  TrafficTable table;
+  KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
+  options.limit.Begin();
+  std::uint64_t packets = 0;
+  {
+    Progress progress(context.out, "stats", options.limit.count(), Progress::Unit::kItems);
+    CollectPackets(
+        session, options.limit, packets,
+        [&](std::span<const std::uint8_t> packet) {
+          table.Add(packet);
+          ++packets;
+        },
+        [&] { progress.Update(packets); });
+  }
+  const double seconds = options.limit.seconds();
+  const auto counters = CountersOf(session.handle());
+  context.out.Result({{"port", session.port()},
+                      {"seconds", seconds},
+                      {"counters", JsonOf(counters)},
+                      {"rows", table.Rows(session.handle(), seconds)}},
+                     table.Text(session.handle(), seconds) +
+                         fmt::format("{} received, {} collected, {} dropped, {} oversized\n", counters.packets_received,
+                                     counters.collected, counters.dropped_logs, counters.oversized));
+}
+
+void AddCodes(CLI::App& verb, const std::shared_ptr<LogOptions>& options, const char* name) {
+  verb.add_option(name, options->codes, "Log codes, such as 0x1001 or 0x1000-0x100F");
+}
+
+}  // namespace
+
+void AddLogVerbs(CLI::App& app, Context& context) {
+  const auto options = std::make_shared<LogOptions>();
+  auto* log = app.add_subcommand("log", "Logs and messages that a handset sends by itself");
+  log->require_subcommand(1);
+  const auto run = [&context, options](CLI::App* verb, auto action) {
+    verb->callback(
+        [&context, options, action] { context.run = [&context, options, action] { action(context, *options); }; });
+  };
+
+  auto* list = log->add_subcommand("list", "Print which log codes are on");
+  list->add_option("--names", options->names, "Table of log names");
+  run(list, List);
+
+  for (const bool on : {true, false}) {
+    auto* verb = log->add_subcommand(on ? "on" : "off", on ? "Switch logs on" : "Switch logs off");
+    AddCodes(*verb, options, "codes");
+    verb->add_option("--category", options->categories, "Message categories, as well");
+    verb->add_flag("--all", options->all, "Every log code that the handset has");
+    run(verb, [on](const Context& c, LogOptions& o) { Switch(c, o, on); });
+  }
+
+  auto* capture = log->add_subcommand("capture", "Write what comes to a file, until Ctrl-C");
+  capture->add_option("file", options->file, "The capture file; it is emptied first")->required();
+  AddCodes(*capture, options, "--on");
+  options->limit.AddTo(*capture, "packets");
+  run(capture, Capture);
+
+  auto* play = log->add_subcommand("play", "Print the packets of a capture file; needs no handset");
+  play->add_option("file", options->file, "The capture file")->required();
+  play->add_flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
+  run(play, Play);
+
+  auto* stats = log->add_subcommand("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
+  stats->add_option("file", options->file, "A capture file; default: the handset");
+  stats->add_option("--names", options->names, "Table of log names");
+  options->limit.AddTo(*stats, "packets");
+  run(stats, Statistics);
+}
+
+}  // namespace kral::tool

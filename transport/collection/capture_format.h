@@ -1,0 +1,31 @@
+// The capture file: packets one behind the other, each with the time it came. Multi-byte fields are little-endian.
+#ifndef KRAL_TRANSPORT_COLLECTION_CAPTURE_FORMAT_H
+#define KRAL_TRANSPORT_COLLECTION_CAPTURE_FORMAT_H
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+namespace kral {
+
+namespace capture_head {
+// The last character ends a listing of the file on a terminal.
+inline constexpr std::array<uint8_t, 8> kMagic = {'K', 'R', 'A', 'L', 'C', 'A', 'P', 0x1A};
+inline constexpr size_t kVersion = 8;    // u16
+inline constexpr size_t kHeadSize = 10;  // u16: where the first record begins; later versions may have longer heads
+inline constexpr size_t kSize = 16;      // the rest is zero
+inline constexpr uint16_t kThisVersion = 1;
+}  // namespace capture_head
+
+// A record: this head, then the packet as it was de-framed, FCS bytes included.
+namespace capture_record {
+inline constexpr size_t kMicroseconds = 0;       // u64, since 1970 UTC
+inline constexpr size_t kLength = 8;             // u16
+inline constexpr size_t kLengthComplement = 10;  // u16: tells a record from what a crash left behind the last one
+inline constexpr size_t kSize = 12;
+inline constexpr size_t kShortestPacket = 2;
+}  // namespace capture_record
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,52 @@
+// Reads a capture file record by record. What a crash or a full disk has cut is told from a file that ends well.
+#ifndef KRAL_TRANSPORT_COLLECTION_CAPTURE_READER_H
+#define KRAL_TRANSPORT_COLLECTION_CAPTURE_READER_H
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <span>
+#include <string>
+#include <vector>
+
+namespace kral {
+
+// Fills the buffer as far as there are bytes, and gives their number; fewer than asked for is the end, and nothing is a
+// file that cannot be read on.
+using CaptureSource = std::function<std::optional<size_t>(std::span<uint8_t> buffer)>;
+
+// An empty function when the file cannot be opened, and while a capture writes it.
+CaptureSource OpenCaptureSource(const std::string& path);
+
+struct CaptureRecord {
+  uint64_t microseconds = 0;  // since 1970 UTC
+  std::vector<uint8_t> packet;
+};
+
+class CaptureReader {
+ public:
+  enum class Outcome : uint8_t {
+    kRecord,
+    kEnd,      // behind the last whole record
+    kCut,      // in the midst of a record, at bytes that are none or cannot be read: everything before is whole
+    kForeign,  // not a capture file, or one of a later version
+  };
+
+  explicit CaptureReader(CaptureSource source) : source_(std::move(source)) {}
+
+  // Once it has given anything but kRecord it goes on giving that.
+  Outcome Next(CaptureRecord& record);
+
+ private:
+  Outcome ReadHead();
+  Outcome ReadRecord(CaptureRecord& record);
+
+  CaptureSource source_;
+  bool begun_ = false;
+  Outcome last_ = Outcome::kRecord;
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,124 @@
+// The packet sorter: command responses into the response queue, asynchronous packets into theirs.
+#ifndef KRAL_TRANSPORT_COLLECTION_KRAL_EVENT_LISTENER_H
+#define KRAL_TRANSPORT_COLLECTION_KRAL_EVENT_LISTENER_H
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "kral/log.h"
+#include "transport/collection/event_record.h"
+#include "transport/engine/bounded_queue.h"
+#include "transport/engine/kral_events.h"
+#include "transport/engine/port_watcher.h"
+#include "transport/engine/traffic_counters.h"
+
+namespace kral {
+
+class CaptureWriter;
+class DataLogFileHandler;
+class NameTables;
+
+// Called with (length, bytes, caller's value) for every packet, before it is sorted.
+using RawPacketCallback = void (*)(uint32_t length, const uint8_t* bytes, uintptr_t value);
+
+// What takes collected traffic as it is queued. Each is called with the value, on the thread that brings the packet.
+struct CollectionCallbacks {
+  KRAL_RAW_PACKET_CALLBACK packet = nullptr;
+  KRAL_EVENT_CALLBACK event = nullptr;
+  uintptr_t value = 0;
+};
+
+// An internal handler that may claim an event report (first byte 96) as the answer to a command.
+class EventHandler {
+ public:
+  virtual ~EventHandler() = default;
+  virtual bool Claims(std::span<const uint8_t> event_report) = 0;
+};
+
+// Offered every log packet (first byte 16) before it is queued.
+class LogHandler {
+ public:
+  virtual ~LogHandler() = default;
+  virtual void OnLog(std::span<const uint8_t> log_packet) = 0;
+};
+
+// Packets come on the dispatcher thread, or on a phone server's threads; everything else from any thread.
+class CKralEventListener : public PacketListener, public PortWatcher {
+ public:
+  CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous, BoundedQueue<EventRecord>& events);
+
+  void OnPacket(std::span<const uint8_t> packet) override;
+  void TakePacket(Packet packet) override;
+  void OnBatchEnd() override;
+
+  PacketQueue& responses() { return responses_; }
+  PacketQueue& asynchronous() { return asynchronous_; }
+  BoundedQueue<EventRecord>& events() { return events_; }
+
+  void SetLogger(DataLogFileHandler* log) { log_ = log; }
+  // Before the first packet; both outlive the sorter. The texts of events, and where collected packets go as well.
+  void SetNames(const NameTables* names) { names_ = names; }
+  void SetCapture(CaptureWriter* capture) { capture_ = capture; }
+  // One wait for what nobody asked for ends at once: nothing comes any more.
+  void OnPortGone() override;
+  void OnPortOpened() override;
+  // While collection is off, asynchronous packets are dropped.
+  void SetCollection(bool on) { collecting_ = on; }
+  bool collecting() const { return collecting_; }
+  // A call that is under way when the callback is changed still ends on the former one.
+  void SetRawPacketCallback(RawPacketCallback callback, uintptr_t value);
+  void SetCollectionCallbacks(const CollectionCallbacks& callbacks);
+  // A handler is not called any more once it is removed.
+  void AddEventHandler(EventHandler* handler);
+  void RemoveEventHandler(EventHandler* handler);
+  void AddLogHandler(LogHandler* handler);
+  void RemoveLogHandler(LogHandler* handler);
+
+  uint64_t dropped_not_collecting() const { return dropped_not_collecting_.load(std::memory_order_relaxed); }
+  uint64_t dropped_by_size() const { return dropped_by_size_.load(std::memory_order_relaxed); }
+  TrafficCounters counters() const;  // as far as the sorter knows them
+
+ private:
+  bool IsWatched() const;
+  void CallRawPacketCallback(std::span<const uint8_t> packet);
+  bool IsClaimed(std::span<const uint8_t> event_report);
+  void OfferLog(std::span<const uint8_t> log_packet);
+  void QueueResponse(Packet packet, const char* format);
+  void QueueAsynchronous(Packet packet);
+  void QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks);
+  CollectionCallbacks collection_callbacks();
+  void NoteCallbacks();  // callbacks locked
+  std::string EventText(uint16_t id) const;
+  void LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet);
+
+  PacketQueue& responses_;
+  PacketQueue& asynchronous_;
+  BoundedQueue<EventRecord>& events_;
+
+  std::atomic<DataLogFileHandler*> log_{nullptr};
+  std::atomic<bool> collecting_{false};
+  const NameTables* names_ = nullptr;
+  CaptureWriter* capture_ = nullptr;
+  std::atomic<uint64_t> dropped_not_collecting_{0};
+  std::atomic<uint64_t> dropped_by_size_{0};
+
+  std::atomic<bool> has_callbacks_{false};
+  std::mutex callback_mutex_;
+  RawPacketCallback callback_ = nullptr;
+  uintptr_t callback_value_ = 0;
+  CollectionCallbacks collection_callbacks_;
+
+  // Held while handlers are called; recursive, because one may remove itself.
+  std::recursive_mutex handlers_mutex_;
+  std::vector<EventHandler*> event_handlers_;
+  std::vector<LogHandler*> log_handlers_;
+};
+
+}  // namespace kral
+
+#endif

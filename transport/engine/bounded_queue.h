@@ -1,0 +1,175 @@
+// First-in-first-out queue of fixed capacity that drops its oldest record when full, in constant time.
+// Records are kept at their own length: capacity counts records, memory follows content.
+#ifndef KRAL_TRANSPORT_ENGINE_BOUNDED_QUEUE_H
+#define KRAL_TRANSPORT_ENGINE_BOUNDED_QUEUE_H
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <mutex>
+#include <optional>
+#include <type_traits>
+#include <utility>
+#include <vector>
+
+#include "transport/line/packet_listener.h"
+
+namespace kral {
+
+inline constexpr size_t kQueueCapacity = 4096;
+// A packet record whose length reads so is the fill of memory never written, not a packet: taken out, and absent.
+inline constexpr size_t kUnwrittenLength = 0xCDCD;
+
+template <class Record>
+class BoundedQueue {
+ public:
+  explicit BoundedQueue(size_t capacity = kQueueCapacity) : capacity_(capacity) {}
+
+  void Push(Record record) {
+    Stage(std::move(record));
+    WakeReaders();
+  }
+
+  // Lays a record ready for Publish, which must follow soon: until then readers see nothing of it, and no counter has
+  // it. In a flood, meeting a reader at the lock for every record, and waking it, would cost more than all the rest.
+  void Stage(Record record) {
+    constexpr size_t kManyRecords = 512;
+    bool many = false;
+    {
+      const std::lock_guard staging(staging_mutex_);
+      staged_.push_back(std::move(record));
+      many = staged_.size() >= kManyRecords;
+    }
+    if (many) WakeReaders();
+  }
+  void Publish() {
+    const std::lock_guard staging(staging_mutex_);
+    if (staged_.empty()) return;
+    {
+      const std::lock_guard lock(mutex_);
+      for (Record& record : staged_) Append(std::move(record));
+    }
+    staged_.clear();
+  }
+  // Publishes, and tells those who wait.
+  void WakeReaders() {
+    Publish();
+    not_empty_.notify_all();
+  }
+
+  std::optional<Record> Pop() {
+    const std::lock_guard lock(mutex_);
+    return TakeFront();
+  }
+
+  // The oldest record, or nothing after the time-out, or once `abort` is set. 0 does not wait. Any record that is there
+  // counts, also one that came before the call: no signal can be left over from a queue since cleared.
+  std::optional<Record> PopWithin(std::chrono::milliseconds time_out, const std::atomic<bool>* abort = nullptr) {
+    std::unique_lock lock(mutex_);
+    const uint64_t known = told_interrupts_;
+    not_empty_.wait_for(lock, time_out, [this, known, abort] {
+      return closed_ || interrupts_ != known || !records_.empty() || (abort != nullptr && abort->load());
+    });
+    if (records_.empty()) told_interrupts_ = interrupts_;
+    return TakeFront();
+  }
+  // After an abort has been set.
+  void EndWaits() {
+    const std::lock_guard lock(mutex_);
+    not_empty_.notify_all();
+  }
+
+  // Nobody waits in this queue until it is opened again; what is in it can be taken.
+  void Close() {
+    const std::lock_guard lock(mutex_);
+    closed_ = true;
+    not_empty_.notify_all();
+  }
+  void Reopen() {
+    const std::lock_guard lock(mutex_);
+    closed_ = false;
+  }
+  bool closed() const {
+    const std::lock_guard lock(mutex_);
+    return closed_;
+  }
+
+  // What fills the queue is gone. Ends the waits under way, and the next one that finds nothing: its reader may have
+  // been busy with a record. Those behind it wait as ever, or a reader that tries again and again would never rest.
+  void Interrupt() {
+    const std::lock_guard lock(mutex_);
+    ++interrupts_;
+    not_empty_.notify_all();
+  }
+  // It is back: an interruption that nobody has been told of is none any more.
+  void ForgetInterrupt() {
+    const std::lock_guard lock(mutex_);
+    told_interrupts_ = interrupts_;
+  }
+
+  void Clear() {
+    std::deque<Record> doomed;
+    Publish();
+    const std::lock_guard lock(mutex_);
+    doomed.swap(records_);
+  }
+
+  size_t size() const {
+    const std::lock_guard lock(mutex_);
+    return records_.size();
+  }
+
+  uint64_t pushed() const {
+    const std::lock_guard lock(mutex_);
+    return pushed_;
+  }
+  uint64_t dropped() const {
+    const std::lock_guard lock(mutex_);
+    return dropped_;
+  }
+
+ private:
+  void Append(Record record) {  // locked
+    ++pushed_;
+    try {
+      records_.push_back(std::move(record));
+    } catch (...) {
+      ++dropped_;  // out of memory
+      return;
+    }
+    if (records_.size() <= capacity_) return;
+    records_.pop_front();
+    ++dropped_;
+  }
+
+  std::optional<Record> TakeFront() {
+    if (records_.empty()) return std::nullopt;
+    std::optional<Record> front(std::move(records_.front()));
+    records_.pop_front();
+    if constexpr (std::is_same_v<Record, Packet>) {
+      if (front->size() == kUnwrittenLength) return std::nullopt;
+    }
+    return front;
+  }
+
+  const size_t capacity_;
+  std::mutex staging_mutex_;  // locked before the other
+  std::vector<Record> staged_;
+  mutable std::mutex mutex_;  // of what follows
+  std::condition_variable not_empty_;
+  std::deque<Record> records_;
+  uint64_t pushed_ = 0;
+  uint64_t dropped_ = 0;
+  bool closed_ = false;
+  uint64_t interrupts_ = 0;
+  uint64_t told_interrupts_ = 0;
+};
+
+using PacketQueue = BoundedQueue<Packet>;
+
+}  // namespace kral
+
+#endif

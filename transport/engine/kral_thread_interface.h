@@ -1,0 +1,160 @@
+// The command and response engine of one connection: framer, port, receive thread, and the send-and-wait operation.
+#ifndef KRAL_TRANSPORT_ENGINE_KRAL_THREAD_INTERFACE_H
+#define KRAL_TRANSPORT_ENGINE_KRAL_THREAD_INTERFACE_H
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <vector>
+
+#include "base/worker_thread.h"
+#include "platform/clock.h"
+#include "transport/engine/bounded_queue.h"
+#include "transport/engine/port_watcher.h"
+#include "transport/engine/receive_loop.h"
+#include "transport/engine/reply.h"
+#include "transport/engine/thread_control.h"
+#include "transport/engine/traffic_counters.h"
+#include "transport/line/chunk_splitter.h"
+#include "transport/line/hdlc_framer.h"
+#include "transport/line/serial_port.h"
+
+namespace kral {
+
+class CKralEvents;
+class DataLogFileHandler;
+
+inline constexpr uint32_t kNullPort = 65534;
+
+// Opening, closing and the requests come from one thread at a time (the phone object's request lock); connected(),
+// counters() and the receive settings from any.
+class CKralThreadInterface {
+ public:
+  explicit CKralThreadInterface(Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
+  ~CKralThreadInterface();
+  CKralThreadInterface(const CKralThreadInterface&) = delete;
+  CKralThreadInterface& operator=(const CKralThreadInterface&) = delete;
+
+  // Before the first Open: where packets go, and the queue into which replies come of them. All are kept by the owner
+  // that is given to Open.
+  void Attach(CKralEvents* dispatcher, PacketQueue* responses, PortWatcher* watcher);
+  void SetLogger(DataLogFileHandler* log);
+
+  // --- Connection (kral_thread_interface.cpp) -----------------------------------------------------------------------
+  // Opens the port (or binds the caller's functions) and starts or resumes the receive thread. `owner` is what the
+  // thread keeps alive: the object that holds this transport, its dispatcher, queues and log. Fails as well while a
+  // thread that did not stop in time is still busy, in a caller's function or a callback.
+  bool Open(uint32_t port_number, const UserTransport& user, std::shared_ptr<void> owner);
+  // A caller's transport stays connected: only StopThread ends that.
+  bool Close();
+  // Waits at most 1,000 ms for the thread to end, after at most as much for the pause that goes with the closing.
+  // False when it did not; it then ends by itself as soon as it can, and keeps its owner alive until then.
+  bool StopThread();
+  bool PauseThread();
+  void ResumeThread();
+  // A port whose device is gone counts as closed: the next request opens it again.
+  bool connected() const { return connected_ && !port_.gone(); }
+  bool null_port() const { return null_port_; }
+
+  void SetOpenFlags(bool send_loopback, bool keep_buffers);
+  void SetThreadReadTimeOut(uint32_t milliseconds);
+  void SetReceiveMode(ReceiveMode mode);
+  void SetSleepDivisor(uint32_t divisor);
+
+  // --- Requests (kral_thread_requests.cpp) --------------------------------------------------------------------------
+  // `room` takes what is received, FCS bytes included where they fit; the reply's bytes are those in front of them. A
+  // reply with another first byte ends the request and is given out all the same. One with the expected first byte that
+  // fails `is_own` answers an earlier request: it is passed over, and the right one awaited for the rest of the
+  // time-out. A time-out closes the port.
+  Reply SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
+                 uint32_t delay_ms, const ReplyTest& is_own = {});
+  // Awaits another reply to the request that was sent last; a time-out leaves the port open.
+  Reply AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms, const ReplyTest& is_own = {});
+  // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
+  // handset that is only slow may answer for a moment still. The port stays open.
+  void SetAbort(const std::atomic<bool>* abort) { abort_ = abort; }
+  // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
+  Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
+  // Awaits no reply: expected means written.
+  Reply SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag);
+
+  // Empties the response queue of what was read before this call; every synchronous request begins with it.
+  void ForgetReplies();
+
+  bool SetPacketMode(uint32_t mode);
+  // Whether that change is the handset's as well as ours.
+  bool NeedsPhoneFor(uint32_t mode) const;
+  PacketMode packet_mode() const { return splitter_.mode(); }
+  bool FlushRxBuffer();
+  // The liveness check asks with code 4 whether the connection counts as alive without an answer: it does not, 0.
+  uint32_t QueryState(uint32_t code) const;
+  std::span<const uint8_t> timed_out_request() const { return timed_out_request_; }
+
+  // As far as they are known here: of the port and of its packets.
+  TrafficCounters counters() const;
+
+  CProtAHDLC& framer() { return framer_; }
+  CSerialPort& port() { return port_; }
+
+ private:
+  // Takes the splitter's packets on the receive thread. The asynchronous ones of a chunk are handed on together: for
+  // each of a flood the dispatcher would be met at its lock and woken.
+  class DispatcherFeed final : public PacketListener {
+   public:
+    void OnPacket(std::span<const uint8_t> packet) override;
+    void OnBatchEnd() override;
+    CKralEvents* dispatcher = nullptr;
+    std::atomic<uint64_t> packets{0};
+
+   private:
+    std::vector<Packet> gathered_;
+  };
+
+  bool OpenPort(uint32_t port_number, const UserTransport& user);
+  bool BindUserTransport(const UserTransport& user);
+  bool QuietThread();
+  bool RunThread(std::shared_ptr<void> owner);
+  void WakeReceiver();
+  void BeginTraffic();  // nothing reads
+  void EndWaits();
+
+  bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
+  std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);
+  Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
+  ReplyKind WhyNotWritten() const;
+  ReplyKind WhyNoReply(uint64_t garbled_before) const;
+  void TimedOut(std::span<const uint8_t> request);
+  bool AskForUnframedMode();
+  bool ReturnToFramedMode();
+
+  void LogRequest(const char* format, std::span<const uint8_t> request);
+  void LogWritten(uint32_t time_out_ms, uint32_t start);
+
+  Clock& clock_;
+  DataLogFileHandler* log_ = nullptr;
+  PacketQueue* responses_ = nullptr;
+  PortWatcher* watcher_ = nullptr;
+  std::atomic<bool> connected_{false};
+  std::atomic<bool> null_port_{false};
+  std::atomic<bool> waits_ended_{false};      // since the port was opened
+  const std::atomic<bool>* abort_ = nullptr;  // of whoever holds the request lock
+  bool user_defined_ = false;
+  bool paused_ = false;
+  std::vector<uint8_t> timed_out_request_;
+
+  CSerialPort port_;
+  CProtAHDLC framer_;
+  UserTransport bound_;  // what the port is bound to while it is a caller's
+  DispatcherFeed feed_;
+  ChunkSplitter splitter_{feed_};
+  ThreadControl control_;
+  ReceiveLoop loop_{clock_, framer_, port_, control_, splitter_};
+  WorkerThread worker_;  // last: nothing above may be gone while it is parked
+};
+
+}  // namespace kral
+
+#endif

@@ -1,0 +1,258 @@
+// Requests over a connection: sent, and answered or timed out; and the changes of packet mode, which begin with a
+// request. The connection itself is kral_thread_interface.cpp's.
+#include <algorithm>
+#include <array>
+#include <chrono>
+
+#include "base/hex_dump.h"
+#include "base/text_log.h"
+#include "transport/engine/kral_events.h"
+#include "transport/engine/kral_thread_interface.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kFcsBytes = 2;  // at the end of every record of the response queue
+
+// A bound for what takes microseconds, unless a listener or a log callback holds the threads up.
+constexpr uint32_t kSettleMs = 20;
+
+constexpr uint8_t kUnframedModeRequest = 68;
+constexpr uint32_t kUnframedModeMs = 80;
+constexpr uint8_t kTry115200 = 0x04;
+
+bool IsUnframed(PacketMode mode) {
+  return mode == PacketMode::kUnframed1 || mode == PacketMode::kUnframed2;
+}
+
+bool BeginsWithAt(std::span<const uint8_t> request) {
+  return request.size() >= 2 && request[0] == 'A' && request[1] == 'T';
+}
+
+// What of a record the room takes, less the FCS bytes at the record's end.
+std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> room) {
+  const size_t count = std::min(record.size(), room.size());
+  std::copy_n(record.begin(), count, room.begin());
+  const size_t length = record.size() > kFcsBytes ? record.size() - kFcsBytes : 0;
+  return room.first(std::min(length, count));
+}
+
+}  // namespace
+
+Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
+                                     uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
+  if (responses_ == nullptr) return ReplyKind::kNotSent;
+  LogRequest("SEND (%d bytes):%s", request);
+  ForgetReplies();
+  const uint32_t start = clock_.TickMs();
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return ReplyKind::kNullPort;
+  }
+
+  Reply reply;
+  if (Transmit(request, time_out_ms)) {
+    LogWritten(time_out_ms, start);
+    if (delay_ms != 0) clock_.SleepMs(delay_ms);
+    const uint32_t read_start = clock_.TickMs();
+    reply = AwaitNext(room, expected_code, time_out_ms, is_own);
+    const bool has_time = reply.came() && (reply || clock_.TickMs() - read_start <= time_out_ms);
+    if (reply.kind() == ReplyKind::kGone) {
+      if (log_) log_->WriteLine(kLogErr, "Request not answered: the device has gone");
+      Close();
+    } else if (!has_time && reply.kind() != ReplyKind::kAborted) {
+      TimedOut(request);
+    }
+    if (log_ && reply) {
+      log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
+    } else if (log_) {
+      log_->WriteLine(kLogErr, "Error. Send Sync Read failed.");
+    }
+  } else {
+    reply = WhyNotWritten();
+  }
+  if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", reply ? 1 : 0);
+  return reply;
+}
+
+// Only replies to the request that follows shall count. What has been read already answers an earlier one: it is let
+// through to the queue before that is cleared, or a reply that came twice would fail the next request.
+void CKralThreadInterface::ForgetReplies() {
+  loop_.WaitForChunk(kSettleMs);
+  if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
+  responses_->Clear();
+}
+
+Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
+                                      const ReplyTest& is_own) {
+  const uint32_t start = clock_.TickMs();
+  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
+  for (uint32_t waited = 0;; waited = clock_.TickMs() - start) {
+    if (waited > 0 && waited >= time_out_ms) return WhyNoReply(garbled_before);  // nothing but earlier replies
+    const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
+    if (!record || record->empty()) return WhyNoReply(garbled_before);
+    const auto bytes = CopyRecord(*record, room);
+    if (record->front() != expected_code) {
+      // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
+      if (log_) {
+        log_->WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
+                        record->front(), expected_code);
+      }
+      return {ReplyKind::kOther, record->front(), bytes};
+    }
+    if (!is_own || is_own(bytes)) return {ReplyKind::kExpected, expected_code, bytes};
+    if (log_) log_->WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
+  }
+}
+
+std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
+  constexpr std::chrono::milliseconds kMoment{80};
+  auto record = responses_->PopWithin(time_out, abort_);
+  if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMoment));
+  return record;
+}
+
+ReplyKind CKralThreadInterface::WhyNotWritten() const {
+  return port_.gone() ? ReplyKind::kGone : ReplyKind::kWriteFailed;
+}
+
+ReplyKind CKralThreadInterface::WhyNoReply(uint64_t garbled_before) const {
+  if (port_.gone()) return ReplyKind::kGone;
+  if (abort_ != nullptr && *abort_) return ReplyKind::kAborted;
+  return splitter_.deframer().bad_fcs() != garbled_before ? ReplyKind::kGarbled : ReplyKind::kNone;
+}
+
+// A handset that does not answer is given up: the next request finds the port closed and opens it afresh.
+void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
+  timed_out_request_.assign(request.begin(), request.end());
+  if (log_) log_->WriteLine(kLogErr, "Request timed out");
+  Close();
+}
+
+Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
+  if (responses_ == nullptr) return ReplyKind::kNotSent;
+  LogRequest("SEND RAW (%d bytes):%s", request);
+  ForgetReplies();
+  const uint32_t start = clock_.TickMs();
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return ReplyKind::kNullPort;
+  }
+
+  if (IsUnframed(packet_mode()) && BeginsWithAt(request)) splitter_.SetAtReplyMode(true);
+  Reply reply;
+  if (Transmit(request, time_out_ms)) {
+    LogWritten(time_out_ms, start);
+    reply = PollRecord(room, time_out_ms);
+    if (log_ && !reply) log_->WriteLine(kLogErr, "Error. Read failed.");
+  } else {
+    reply = WhyNotWritten();
+  }
+  splitter_.SetAtReplyMode(false);
+  return reply;
+}
+
+Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_out_ms) {
+  const uint32_t start = clock_.TickMs();
+  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
+  for (;;) {
+    const bool ended = responses_->closed();
+    if (const auto record = responses_->Pop()) {
+      const size_t count = std::min(record->size(), room.size());
+      std::copy_n(record->begin(), count, room.begin());
+      if (log_) {
+        log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
+      }
+      return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
+    }
+    if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply(garbled_before);
+    clock_.SleepMs(1);
+  }
+}
+
+Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
+  LogRequest("SEND_ASYNC (%d bytes):%s", request);
+  if (null_port_) {
+    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    return ReplyKind::kNullPort;
+  }
+  const uint32_t start = clock_.TickMs();
+  const auto size = static_cast<uint32_t>(request.size());
+  if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) {
+    if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+    return WhyNotWritten();
+  }
+  LogWritten(time_out_ms, start);
+  return ReplyKind::kExpected;
+}
+
+bool CKralThreadInterface::Transmit(std::span<const uint8_t> request, uint32_t time_out_ms) {
+  if (framer_.Send(request.data(), static_cast<uint32_t>(request.size()), time_out_ms, 0) == 1) return true;
+  if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+  Close();
+  return false;
+}
+
+bool CKralThreadInterface::SetPacketMode(uint32_t mode) {
+  if (mode > static_cast<uint32_t>(PacketMode::kLengthPrefixed)) {
+    if (log_) log_->WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
+    return false;
+  }
+  if (NeedsPhoneFor(mode) && !(mode == 0 ? ReturnToFramedMode() : AskForUnframedMode())) return false;
+  framer_.SetRawDataFlag(mode);
+  splitter_.SetMode(static_cast<PacketMode>(mode));
+  if (log_) log_->WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
+  return true;
+}
+
+// Only between the framed and the first unframed mode.
+bool CKralThreadInterface::NeedsPhoneFor(uint32_t mode) const {
+  const auto from = packet_mode();
+  const auto to = static_cast<PacketMode>(mode);
+  return (from == PacketMode::kFramed && to == PacketMode::kUnframed1) ||
+         (from == PacketMode::kUnframed1 && to == PacketMode::kFramed);
+}
+
+bool CKralThreadInterface::AskForUnframedMode() {
+  std::array<uint8_t, kMaximumPacket> room;
+  const uint8_t request = kUnframedModeRequest;
+  const Reply reply = SendSync({&request, 1}, room, request, kUnframedModeMs, 0);
+  return reply && reply.bytes().size() >= 2 && reply.bytes()[1] == 1;
+}
+
+// The framer reads the handset's answer itself, so the receive thread must not.
+bool CKralThreadInterface::ReturnToFramedMode() {
+  const bool was_paused = paused_;
+  if (!PauseThread()) {
+    ResumeThread();
+    return false;
+  }
+  const bool switched = framer_.Data2DM(kTry115200) == 1;
+  if (!was_paused) ResumeThread();
+  return switched;
+}
+
+bool CKralThreadInterface::FlushRxBuffer() {
+  if (!connected()) return false;
+  // The purge's own result tells nothing: a caller's transport reports 0 for every flush it made.
+  if (!null_port_) port_.FlushPCBuffer();
+  splitter_.DropPartialPacket();
+  return true;
+}
+
+uint32_t CKralThreadInterface::QueryState(uint32_t) const {
+  return 0;
+}
+
+void CKralThreadInterface::LogRequest(const char* format, std::span<const uint8_t> request) {
+  if (log_ == nullptr || !log_->Wants(kLogIo)) return;
+  log_->WriteLine(kLogIo, format, static_cast<int>(request.size()), HexDump(request).c_str());
+}
+
+void CKralThreadInterface::LogWritten(uint32_t time_out_ms, uint32_t start) {
+  if (log_ == nullptr) return;
+  log_->WriteLine(kLogRet, "OK\t Timeout=%d", static_cast<int>(time_out_ms));
+  log_->WriteLine(kLogRet, "WRITE STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
+}
+
+}  // namespace kral

@@ -1,0 +1,120 @@
+// The receive thread's loop, in both receive modes. Starting, pausing and stopping it is the connection's affair.
+#include "transport/engine/receive_loop.h"
+
+#include <chrono>
+
+#include "base/at_exit.h"
+#include "base/hex_dump.h"
+#include "base/text_log.h"
+#include "platform/forced_unwind.h"
+#include "transport/engine/thread_control.h"
+#include "transport/line/chunk_splitter.h"
+#include "transport/line/hdlc_framer.h"
+#include "transport/line/serial_port.h"
+
+namespace kral {
+namespace {
+
+// How long a wait goes without looking around. Everything that matters ends it at once.
+constexpr uint32_t kIdleWaitMs = 1000;
+
+}  // namespace
+
+void ReceiveLoop::Run() {
+  // Also when its host ends the thread inside a function of its own.
+  const AtExit left([this] { control_.AcknowledgeStop(); });
+  acknowledged_pause_ = 0;
+  sleep_counter_ = 0;
+  while (!control_.stop_requested()) {
+    const uint32_t changes_seen = control_.changes();
+    const bool wake_on_data = mode_ == ReceiveMode::kWakeOnData;
+    if (!wake_on_data) SleepByRule();
+    if (IsPaused()) {
+      if (wake_on_data) control_.WaitForChange(changes_seen, kIdleWaitMs);
+      continue;
+    }
+    if (!wake_on_data) {
+      ReadChunk();
+    } else if (WaitForBytes(changes_seen) && !ReadChunk()) {
+      // Nothing came from where something was promised, or from a caller's function, which cannot be waited on.
+      clock_.SleepMs(1);
+    }
+    if (port_.CloseIfGone() && on_gone_) on_gone_();
+  }
+  if (DataLogFileHandler* const log = log_) {
+    log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
+  }
+}
+
+// The counter moves only when the thread sleeps: with a divisor of 1 every turn sleeps, with a larger one only the
+// first. Kept exactly.
+void ReceiveLoop::SleepByRule() {
+  if (sleep_counter_ % sleep_divisor_ != 0) return;
+  clock_.SleepMs(1);
+  ++sleep_counter_;
+}
+
+bool ReceiveLoop::IsPaused() {
+  const uint32_t wanted = control_.pause_wanted();
+  if (wanted == 0) return false;
+  if (wanted != acknowledged_pause_) {
+    acknowledged_pause_ = wanted;
+    DataLogFileHandler* const log = log_;
+    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause Detected, Pause ACK event set attempt");
+    control_.AcknowledgePause();
+    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause ACK event set complete");
+  }
+  return true;
+}
+
+// True when the port is to be read.
+bool ReceiveLoop::WaitForBytes(uint32_t changes_seen) {
+  if (port_.IsOpen() == 0 || port_.gone()) {
+    control_.WaitForChange(changes_seen, kIdleWaitMs);
+    return false;
+  }
+  return !port_.CanWait() || port_.WaitReadable(kIdleWaitMs);
+}
+
+bool ReceiveLoop::ReadChunk() {
+  uint32_t count = static_cast<uint32_t>(buffer_.size());
+  if (framer_.ReceiveRaw(buffer_.data(), count, read_time_out_ms_) == 0 || count == 0) return false;
+  // A caller's function may come back long after the stop: nobody waits for these bytes any more.
+  if (control_.stop_requested()) return true;
+  bytes_received_.fetch_add(count, std::memory_order_relaxed);
+  SetSplitting(true);
+  try {
+    Split(count);
+  } catch (...) {
+    PassForcedUnwind();
+    // Out of memory: the chunk is lost, and the thread must not be.
+    splitter_.DropPartialPacket();
+  }
+  SetSplitting(false);
+  return true;
+}
+
+void ReceiveLoop::SetSplitting(bool splitting) {
+  const std::lock_guard lock(chunk_mutex_);
+  splitting_ = splitting;
+  if (splitting) return;
+  ++chunks_;
+  chunk_done_.notify_all();
+}
+
+bool ReceiveLoop::WaitForChunk(uint32_t time_out_ms) {
+  std::unique_lock lock(chunk_mutex_);
+  return chunk_done_.wait_for(lock, std::chrono::milliseconds(time_out_ms),
+                              [this, chunk = chunks_] { return !splitting_ || chunks_ != chunk; });
+}
+
+void ReceiveLoop::Split(uint32_t count) {
+  const std::span<const uint8_t> chunk(buffer_.data(), count);
+  DataLogFileHandler* const log = log_;
+  if (log != nullptr && log->Wants(kLogIo)) {
+    log->WriteLine(kLogIo, "THREAD READ (%d bytes): %s ", static_cast<int>(count), HexDump(chunk).c_str());
+  }
+  splitter_.Feed(chunk);
+}
+
+}  // namespace kral

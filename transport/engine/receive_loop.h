@@ -1,0 +1,82 @@
+// The body of a connection's receive thread: reads the port and feeds the splitter until it is told to stop.
+#ifndef KRAL_TRANSPORT_ENGINE_RECEIVE_LOOP_H
+#define KRAL_TRANSPORT_ENGINE_RECEIVE_LOOP_H
+
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+#include <functional>
+#include <mutex>
+#include <utility>
+#include <vector>
+
+#include "platform/clock.h"
+
+namespace kral {
+
+class CProtAHDLC;
+class CSerialPort;
+class ChunkSplitter;
+class DataLogFileHandler;
+class ThreadControl;
+
+enum class ReceiveMode : uint8_t {
+  kAsWritten = 0,   // the sleep rule of the receive loop
+  kWakeOnData = 1,  // waits in the port and sleeps nowhere
+};
+
+// The settings and the counter may be used on any thread.
+class ReceiveLoop {
+ public:
+  ReceiveLoop(Clock& clock, CProtAHDLC& framer, CSerialPort& port, ThreadControl& control, ChunkSplitter& splitter)
+      : clock_(clock), framer_(framer), port_(port), control_(control), splitter_(splitter) {}
+
+  void SetLogger(DataLogFileHandler* log) { log_ = log; }
+  // Before Run. Called on the receive thread when it has found the device gone and closed the port.
+  void SetGoneHandler(std::function<void()> handler) { on_gone_ = std::move(handler); }
+  void SetMode(ReceiveMode mode) { mode_ = mode; }
+  void SetReadTimeOut(uint32_t milliseconds) { read_time_out_ms_ = milliseconds; }
+  void SetSleepDivisor(uint32_t divisor) { sleep_divisor_ = divisor == 0 ? 1 : divisor; }
+
+  void Run();
+
+  // Waits until the chunk that is being made packets of is through; false when that takes longer.
+  bool WaitForChunk(uint32_t time_out_ms);
+
+  uint64_t bytes_received() const { return bytes_received_.load(std::memory_order_relaxed); }
+
+ private:
+  void SleepByRule();
+  bool IsPaused();
+  bool WaitForBytes(uint32_t changes_seen);
+  bool ReadChunk();
+  void Split(uint32_t count);
+  void SetSplitting(bool splitting);
+
+  Clock& clock_;
+  CProtAHDLC& framer_;
+  CSerialPort& port_;
+  ThreadControl& control_;
+  ChunkSplitter& splitter_;
+  std::function<void()> on_gone_;
+  std::atomic<DataLogFileHandler*> log_{nullptr};
+  std::atomic<ReceiveMode> mode_{ReceiveMode::kAsWritten};
+  std::atomic<uint32_t> read_time_out_ms_{500};
+  std::atomic<uint32_t> sleep_divisor_{1};
+  std::atomic<uint64_t> bytes_received_{0};
+
+  std::mutex chunk_mutex_;
+  std::condition_variable chunk_done_;
+  bool splitting_ = false;
+  uint64_t chunks_ = 0;
+
+  // The thread's own. Memory that is refused once it runs has nobody to be told to.
+  static constexpr size_t kReadSize = 40960;
+  std::vector<uint8_t> buffer_ = std::vector<uint8_t>(kReadSize);
+  uint32_t sleep_counter_ = 0;
+  uint32_t acknowledged_pause_ = 0;
+};
+
+}  // namespace kral
+
+#endif

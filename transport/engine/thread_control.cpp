@@ -1,0 +1,44 @@
+// Requests to a receive thread. When they are made, and how long an answer is awaited, is the connection's affair.
+#include "transport/engine/thread_control.h"
+
+#include <chrono>
+
+namespace kral {
+
+void ThreadControl::Reset() {
+  stop_requested_ = false;
+  pause_wanted_ = 0;
+  stop_event_.Reset();
+  pause_event_.Reset();
+}
+
+void ThreadControl::RequestPause() {
+  pause_event_.Reset();
+  if (++last_pause_ == 0) ++last_pause_;
+  pause_wanted_ = last_pause_;
+  Notify();
+}
+
+void ThreadControl::ClearPause() {
+  pause_wanted_ = 0;
+  Notify();
+}
+
+void ThreadControl::RequestStop() {
+  stop_event_.Reset();
+  stop_requested_ = true;
+  Notify();
+}
+
+void ThreadControl::Notify() {
+  const std::lock_guard lock(mutex_);
+  ++changes_;
+  changed_.notify_all();
+}
+
+void ThreadControl::WaitForChange(uint32_t seen, uint32_t milliseconds) {
+  std::unique_lock lock(mutex_);
+  changed_.wait_for(lock, std::chrono::milliseconds(milliseconds), [this, seen] { return changes_ != seen; });
+}
+
+}  // namespace kral

@@ -1,0 +1,83 @@
+// A block of neighbouring bytes, loaded, stored and searched at once: 16 where SSE2 is part of the machine, else 8.
+#ifndef KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
+#define KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+#ifdef __SSE2__
+#include <emmintrin.h>
+#endif
+
+namespace kral {
+
+// std::has_single_bit counts all bits, with a call where the machine cannot.
+constexpr bool HasSingleBit(uint32_t mask) {
+  return mask != 0 && (mask & (mask - 1)) == 0;
+}
+
+// Eight bytes in a machine word.
+class WordBlock {
+ public:
+  static constexpr size_t kSize = 8;
+
+  static WordBlock Load(const uint8_t* bytes) {
+    WordBlock block;
+    std::memcpy(&block.word_, bytes, kSize);
+    return block;
+  }
+  void Store(uint8_t* bytes) const { std::memcpy(bytes, &word_, kSize); }
+
+  // One bit per byte, bit 0 for the first, set where the byte has this value.
+  uint32_t Find(uint8_t value) const {
+    static_assert(std::endian::native == std::endian::little, "the first byte is the lowest");
+    constexpr uint64_t kOnes = 0x0101010101010101;
+    constexpr uint64_t kLowBits = 0x7F * kOnes;
+    const uint64_t difference = word_ ^ (value * kOnes);
+    // The top bit of every byte that is not zero; adding to seven bits carries into no neighbour.
+    const uint64_t unequal = ((difference & kLowBits) + kLowBits) | difference;
+    const uint64_t equal = (~unequal & ~kLowBits) >> 7;
+    // Byte k has its bit at 8k; the factor's term 2^(56 - 7k) brings it to bit 56 + k, and no two terms meet there.
+    return static_cast<uint32_t>((equal * 0x0102040810204080) >> 56);
+  }
+
+ private:
+  uint64_t word_ = 0;
+};
+
+#ifdef __SSE2__
+
+// Sixteen bytes in an SSE2 register.
+class Sse2Block {
+ public:
+  static constexpr size_t kSize = 16;
+
+  static Sse2Block Load(const uint8_t* bytes) {
+    Sse2Block block;
+    std::memcpy(&block.bytes_, bytes, kSize);
+    return block;
+  }
+  void Store(uint8_t* bytes) const { std::memcpy(bytes, &bytes_, kSize); }
+
+  uint32_t Find(uint8_t value) const {
+    const __m128i equal = _mm_cmpeq_epi8(bytes_, _mm_set1_epi8(static_cast<char>(value)));
+    return static_cast<uint32_t>(_mm_movemask_epi8(equal));
+  }
+
+ private:
+  __m128i bytes_ = {};
+};
+
+using ByteBlock = Sse2Block;
+
+#else
+
+using ByteBlock = WordBlock;
+
+#endif
+
+}  // namespace kral
+
+#endif

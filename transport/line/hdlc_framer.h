@@ -1,0 +1,40 @@
+// The sending side of async-HDLC framing, and the switch of an AT-command port into diagnostic mode.
+#ifndef KRAL_TRANSPORT_LINE_HDLC_FRAMER_H
+#define KRAL_TRANSPORT_LINE_HDLC_FRAMER_H
+
+#include <cstdint>
+
+#include "platform/clock.h"
+
+namespace kral {
+
+class CSerialPort;
+class DataLogFileHandler;
+
+class CProtAHDLC {
+ public:
+  explicit CProtAHDLC(Clock& clock = SystemClock()) : clock_(clock) {}
+  virtual ~CProtAHDLC() = default;
+
+  virtual uint32_t Data2DM(uint8_t baud_rate_mask);  // bit 0: 19200 baud, bit 2: 115200 baud
+  virtual uint32_t FlushPhoneBuffer();               // writes one flag byte
+  virtual uint8_t SetStartFlag(uint8_t on);          // gives the previous setting
+  virtual uint32_t SetRawDataFlag(uint32_t value);
+  virtual uint32_t Send(const uint8_t* payload, uint32_t size, uint32_t time_out_ms, uint8_t force_leading_flag);
+  virtual uint32_t ReceiveRaw(uint8_t* buffer, uint32_t& count, uint32_t time_out_ms);
+
+  uint32_t SetPort(CSerialPort* port);
+  void SetLogger(DataLogFileHandler* log);  // also handed on to the port
+  CSerialPort* port() const { return port_; }
+
+ private:
+  Clock& clock_;
+  CSerialPort* port_ = nullptr;
+  DataLogFileHandler* log_ = nullptr;
+  uint32_t raw_data_flag_ = 0;
+  uint8_t start_flag_ = 0;
+};
+
+}  // namespace kral
+
+#endif
