@@ -22,7 +22,7 @@ constexpr uint32_t kBase = 0x10000;
 constexpr uint32_t kImageSize = 10 * 1024 * 1024 / 44 * 16 + 4096;
 constexpr uint32_t kMaximumKib = 64 * 1024;
 
-void FillImage(PhoneImage& image) {
+void FillImage(images::PhoneImage& image) {
   std::mt19937 random(7);
   std::vector<uint8_t> bytes(kImageSize);
   for (uint8_t& byte : bytes) byte = static_cast<uint8_t>(random());
@@ -34,10 +34,10 @@ void FillImage(PhoneImage& image) {
 class HexFile {
  public:
   HexFile() : path_((std::filesystem::temp_directory_path() / "kral-bench.hex").string()) {
-    PhoneImageDPaged image(kMaximumKib, nullptr);
+    images::PhoneImageDPaged image(kMaximumKib, nullptr);
     FillImage(image);
-    HexPhoneImageDecoder encoder(false, false, true);
-    TextFile file;
+    images::HexPhoneImageDecoder encoder(false, false, true);
+    images::TextFile file;
     if (!file.OpenForWriting(path_) || !encoder.Encode(image, file) || !file.Close()) std::abort();
     size_ = std::filesystem::file_size(path_);
   }
@@ -58,9 +58,9 @@ class HexFile {
 };
 
 void Decode() {
-  HexPhoneImageDecoder decoder;
-  PhoneImageDPaged image(kMaximumKib, &decoder);
-  TextFile file;
+  images::HexPhoneImageDecoder decoder;
+  images::PhoneImageDPaged image(kMaximumKib, &decoder);
+  images::TextFile file;
   if (!file.OpenForReading(HexFile::Instance().path()) || !decoder.Decode(image, file) ||
       image.GetSize(0) != kImageSize) {
     std::abort();
@@ -79,12 +79,12 @@ void HexDecode(benchmark::State& state) {
 BENCHMARK(HexDecode)->Unit(benchmark::kMillisecond)->UseRealTime();
 
 void HexEncode(benchmark::State& state) {
-  PhoneImageDPaged image(kMaximumKib, nullptr);
+  images::PhoneImageDPaged image(kMaximumKib, nullptr);
   FillImage(image);
-  HexPhoneImageDecoder encoder(false, false, true);
+  images::HexPhoneImageDecoder encoder(false, false, true);
   int64_t bytes = 0;
   for (auto _ : state) {
-    TextMemory text;
+    images::TextMemory text;
     if (!encoder.Encode(image, text)) std::abort();
     bytes += static_cast<int64_t>(text.text().size());
   }

@@ -121,23 +121,23 @@ BENCHMARK(RestoreOf3000)->ArgName("mode")->Arg(0)->Arg(1)->UseManualTime()->Unit
 
 // --- Files ----------------------------------------------------------------------------------------------------------
 
-PkvSet SetOf(int64_t count) {
-  PkvSet set;
+pkv::PkvSet SetOf(int64_t count) {
+  pkv::PkvSet set;
   for (int64_t i = 0; i < count; ++i) {
-    PkvNvItem item{.id = static_cast<uint16_t>(i)};
+    pkv::PkvNvItem item{.id = static_cast<uint16_t>(i)};
     item.data.fill(static_cast<uint8_t>(i));
     set.items.push_back(item);
   }
   return set;
 }
 
-void LoadFile(benchmark::State& state, PkvWriter writer) {
+void LoadFile(benchmark::State& state, pkv::PkvWriter writer) {
   const test::TempFolder folder;
   const std::string path = folder.Path("items.pkv");
-  if (!WritePkv(path, SetOf(state.range(0)), nullptr, writer).done()) state.SkipWithError("not written");
+  if (!pkv::WritePkv(path, SetOf(state.range(0)), nullptr, writer).done()) state.SkipWithError("not written");
   for (auto _ : state) {
-    PkvSet set;
-    if (!ReadPkv(path, set).done() || static_cast<int64_t>(set.items.size()) != state.range(0))
+    pkv::PkvSet set;
+    if (!pkv::ReadPkv(path, set).done() || static_cast<int64_t>(set.items.size()) != state.range(0))
       state.SkipWithError("not read");
   }
   state.SetItemsProcessed(state.iterations() * state.range(0));
@@ -145,28 +145,34 @@ void LoadFile(benchmark::State& state, PkvWriter writer) {
 }
 
 void LoadArray(benchmark::State& state) {
-  LoadFile(state, PkvWriter::kStorageClasses);
+  LoadFile(state, pkv::PkvWriter::kStorageClasses);
 }
 void LoadNumberedItems(benchmark::State& state) {
-  LoadFile(state, PkvWriter::kVarnPkvFile);
+  LoadFile(state, pkv::PkvWriter::kVarnPkvFile);
 }
 BENCHMARK(LoadArray)->Arg(5000)->Arg(10000)->Arg(20000)->Arg(60000)->Unit(benchmark::kMillisecond)->Complexity();
-BENCHMARK(LoadNumberedItems)->Arg(5000)->Arg(10000)->Arg(20000)->Arg(60000)->Unit(benchmark::kMillisecond)->Complexity();
+BENCHMARK(LoadNumberedItems)
+    ->Arg(5000)
+    ->Arg(10000)
+    ->Arg(20000)
+    ->Arg(60000)
+    ->Unit(benchmark::kMillisecond)
+    ->Complexity();
 
-void WriteFile(benchmark::State& state, PkvWriter writer) {
+void WriteFile(benchmark::State& state, pkv::PkvWriter writer) {
   const test::TempFolder folder;
-  const PkvSet set = SetOf(state.range(0));
+  const pkv::PkvSet set = SetOf(state.range(0));
   for (auto _ : state) {
-    if (!WritePkv(folder.Path("items.pkv"), set, nullptr, writer).done()) state.SkipWithError("not written");
+    if (!pkv::WritePkv(folder.Path("items.pkv"), set, nullptr, writer).done()) state.SkipWithError("not written");
   }
   state.SetItemsProcessed(state.iterations() * state.range(0));
 }
 
 void WriteArray(benchmark::State& state) {
-  WriteFile(state, PkvWriter::kStorageClasses);
+  WriteFile(state, pkv::PkvWriter::kStorageClasses);
 }
 void WriteNumberedItems(benchmark::State& state) {
-  WriteFile(state, PkvWriter::kVarnPkvFile);
+  WriteFile(state, pkv::PkvWriter::kVarnPkvFile);
 }
 BENCHMARK(WriteArray)->Arg(20000)->Unit(benchmark::kMillisecond);
 BENCHMARK(WriteNumberedItems)->Arg(20000)->Unit(benchmark::kMillisecond);

@@ -21,48 +21,48 @@ bool Give(uint32_t value, uint32_t* result) {
   return value == KRAL_STREAM_WRITTEN;
 }
 
-uint32_t ResultOf(WriteOutcome outcome) {
+uint32_t ResultOf(stream::WriteOutcome outcome) {
   switch (outcome) {
-    case WriteOutcome::kDone:
+    case stream::WriteOutcome::kDone:
       return KRAL_STREAM_WRITTEN;
-    case WriteOutcome::kNotOpened:
+    case stream::WriteOutcome::kNotOpened:
       return KRAL_STREAM_OPEN_FAILED;
-    case WriteOutcome::kNoThread:
-    case WriteOutcome::kThreadNotStarted:
+    case stream::WriteOutcome::kNoThread:
+    case stream::WriteOutcome::kThreadNotStarted:
       return KRAL_STREAM_NO_THREAD;
-    case WriteOutcome::kNotWritten:
+    case stream::WriteOutcome::kNotWritten:
       return KRAL_STREAM_WRITE_FAILED;
-    case WriteOutcome::kNotCompleted:
+    case stream::WriteOutcome::kNotCompleted:
       return KRAL_STREAM_NOT_COMPLETED;
-    case WriteOutcome::kThreadNotStopped:
+    case stream::WriteOutcome::kThreadNotStopped:
       return KRAL_STREAM_THREAD_STUCK;
-    case WriteOutcome::kNotClosed:
+    case stream::WriteOutcome::kNotClosed:
       return KRAL_STREAM_CLOSE_FAILED;
-    case WriteOutcome::kAborted:
+    case stream::WriteOutcome::kAborted:
       return KRAL_DOWNLOAD_ABORTED;
   }
   return KRAL_STREAM_WRITE_FAILED;
 }
 
-uint32_t WriteImage(DownloadConnection& connection, PhoneImage& image, PhoneImage* header,
+uint32_t WriteImage(DownloadConnection& connection, images::PhoneImage& image, images::PhoneImage* header,
                     const WriteArguments& arguments) {
   // Before anything is erased for it.
   if (arguments.block_size == 0) return BadArgument(KRAL_STREAM_BAD_ARGUMENT, "blocks of 0 bytes cannot be written");
-  const WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
+  const stream::WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
   try {
     switch (arguments.method) {
       case KRAL_STREAM_MULTI_IMAGE:
-        return ResultOf(CWriteImageFramed(connection).Write(image, arguments.image_type, header, requested));
+        return ResultOf(stream::CWriteImageFramed(connection).Write(image, arguments.image_type, header, requested));
       case KRAL_STREAM_NOR:
-        return ResultOf(CWriteNORImageFramed(connection).Write(image, arguments.image_type, header, requested));
+        return ResultOf(stream::CWriteNORImageFramed(connection).Write(image, arguments.image_type, header, requested));
       default:
         Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no method %d of writing an image", arguments.method));
         return KRAL_STREAM_BAD_ARGUMENT;
     }
-  } catch (const PhoneImageException& exception) {
+  } catch (const images::PhoneImageException& exception) {
     connection.log().WriteLine(kLogErr, "%s at 0x%08X, size 0x%X", exception.what(), exception.address(),
                                exception.count());
-    const bool reading = exception.kind() == PhoneImageException::Kind::kRead;
+    const bool reading = exception.kind() == images::PhoneImageException::Kind::kRead;
     Fail(Failure(reading ? KRAL_ERROR_BAD_FILE : KRAL_ERROR_INTERNAL,
                  "%u bytes at 0x%08X of the image could not be read: its file became shorter meanwhile",
                  exception.count(), exception.address())
@@ -162,7 +162,7 @@ bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16
 bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
   if (IsRefused(phone, "KRAL_STREAM_SECURITY_MODE")) return false;
   DownloadConnection connection(phone);
-  return CImageSecMode(connection, connection.time_out_ms()).Send(mode);
+  return stream::CImageSecMode(connection, connection.time_out_ms()).Send(mode);
 }
 
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
@@ -170,7 +170,8 @@ bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, u
   DownloadConnection connection(phone);
   if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, kNoFile));
   std::optional<uint8_t> answer;
-  const bool accepted = CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
+  const bool accepted =
+      stream::CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
   if (answer && status != nullptr) *status = *answer;
   return accepted;
 }
@@ -182,10 +183,10 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   connection.BeginWork();
   if (file == nullptr) return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, kNoFile), result);
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
-    ImageFile image;
-    ImageFile header;
+    images::ImageFile image;
+    images::ImageFile header;
     uint32_t opened = image.Open(file, format);
-    if (opened == KRAL_STREAM_DATA_LOST) LogLoss(connection.log(), file, image.loss());
+    if (opened == KRAL_STREAM_DATA_LOST) images::LogLoss(connection.log(), file, image.loss());
     if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
       opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
     if (opened != KRAL_STREAM_WRITTEN) return opened;
@@ -203,19 +204,19 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
     return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there are no bytes of the image or its header"), result);
   }
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
-    if (PassesTheEnd(address, image.size)) {
+    if (images::PassesTheEnd(address, image.size)) {
       Fail(Failure(KRAL_ERROR_ARGUMENT, "%u bytes from 0x%08X on go past address 0xFFFFFFFF", image.size, address));
       return KRAL_STREAM_PAST_END;
     }
-    const auto whole = MakeMemoryImage({image.data, image.size}, address);
+    const auto whole = images::MakeMemoryImage({image.data, image.size}, address);
     if (whole == nullptr) return KRAL_STREAM_WRITE_FAILED;
     if (header.size > stream::kLongestHeader) {
-      Fail(HeaderTooLong(header.size));
+      Fail(stream::HeaderTooLong(header.size));
       connection.log().WriteLine(kLogErr, "multi-image open failed\n");
       return KRAL_STREAM_OPEN_FAILED;
     }
-    std::unique_ptr<PhoneImage> opening;
-    if (header.data != nullptr) opening = MakeMemoryImage({header.data, header.size}, 0);
+    std::unique_ptr<images::PhoneImage> opening;
+    if (header.data != nullptr) opening = images::MakeMemoryImage({header.data, header.size}, 0);
     if (header.data != nullptr && opening == nullptr) return KRAL_STREAM_WRITE_FAILED;
     return WriteImage(connection, *whole, opening.get(), arguments);
   });

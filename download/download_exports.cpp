@@ -109,7 +109,7 @@ uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t format, KR
     if (image_file == nullptr || info == nullptr) {
       return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no image file, or no room for what is in it");
     }
-    return kral::GetImageInfo(image_file, format, *info);
+    return kral::images::GetImageInfo(image_file, format, *info);
   });
 }
 
@@ -118,8 +118,8 @@ uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* line, uint64
     if (hex_file == nullptr || line == nullptr) {
       return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no HEX file, or no room for the line");
     }
-    kral::HexLoss loss;
-    const uint32_t value = kral::FindHexLoss(hex_file, loss);
+    kral::images::HexLoss loss;
+    const uint32_t value = kral::images::FindHexLoss(hex_file, loss);
     if (value != KRAL_STREAM_WRITTEN) return value;
     *line = static_cast<uint32_t>(std::min<uint64_t>(loss.line, UINT32_MAX));
     if (bytes != nullptr) *bytes = loss.bytes;
@@ -134,8 +134,8 @@ uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32
     if (input == nullptr || output == nullptr || direction > KRAL_HEX_FROM_BINARY) {
       return download::BadArgument(KRAL_STREAM_BAD_ARGUMENT, "there is no file to read or write, or no such direction");
     }
-    const uint32_t value = direction == KRAL_HEX_FROM_BINARY ? kral::BinaryToHex(input, output, base)
-                                                             : kral::HexToBinary(input, output, base);
+    const uint32_t value = direction == KRAL_HEX_FROM_BINARY ? kral::images::BinaryToHex(input, output, base)
+                                                             : kral::images::HexToBinary(input, output, base);
     if (value == KRAL_STREAM_WRITTEN && base_address != nullptr) *base_address = base;
     return value;
   });

@@ -72,9 +72,9 @@ uint32_t CheckProgrammer(const char* file, uint64_t& size) {
 uint32_t CheckImage(DataLogFileHandler& log, const char* file, uint64_t& size) {
   KRAL_IMAGE_INFO info{};
   try {
-    HexLoss loss;
-    const uint32_t result = GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info, &loss);
-    if (result == KRAL_STREAM_DATA_LOST) LogLoss(log, file, loss);
+    images::HexLoss loss;
+    const uint32_t result = images::GetImageInfo(file, KRAL_IMAGE_FORMAT_BY_CONTENT, info, &loss);
+    if (result == KRAL_STREAM_DATA_LOST) images::LogLoss(log, file, loss);
     if (result != KRAL_STREAM_WRITTEN) return result;
   } catch (const std::exception&) {  // no memory or address space for it
     Fail(Failure(KRAL_ERROR_INTERNAL, "there is no memory for a look at %.200s", file));

@@ -29,7 +29,7 @@ bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms,
 }
 
 bool Connect(Diag_FTM& phone, uint32_t* version, uint32_t* chip_identity) {
-  kral::DownloadConnection connection(phone);
+  kral::download::DownloadConnection connection(phone);
   connection.BeginWork();
   uint32_t told_version = 0;
   std::optional<uint32_t> identity;

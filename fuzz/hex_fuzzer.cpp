@@ -19,7 +19,7 @@ void Check(bool condition) {
   if (!condition) std::abort();
 }
 
-std::vector<uint8_t> BytesOf(PhoneImage& image) {
+std::vector<uint8_t> BytesOf(images::PhoneImage& image) {
   std::vector<uint8_t> bytes(image.GetSize(0));
   image.Read(image.GetBaseAddress(0), bytes.data(), image.GetSize(0), 0);
   return bytes;
@@ -27,7 +27,7 @@ std::vector<uint8_t> BytesOf(PhoneImage& image) {
 
 // From a base of 64 KiB, within what segment records reach, and on one side of the second region's base: the writer's
 // record for that base would send the rest of the image there.
-bool IsExpressible(PhoneImage& image, bool linear) {
+bool IsExpressible(images::PhoneImage& image, bool linear) {
   const uint32_t base = image.GetBaseAddress(0);
   const uint32_t size = image.GetSize(0);
   if (size == 0 || image.GetSize(1) != 0 || base % 0x10000 != 0) return false;
@@ -38,16 +38,16 @@ bool IsExpressible(PhoneImage& image, bool linear) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  TextMemory file(std::string(data, data + size));
-  HexPhoneImageDecoder decoder;
-  PhoneImageDPaged image(kMaximumKib, &decoder);
+  images::TextMemory file(std::string(data, data + size));
+  images::HexPhoneImageDecoder decoder;
+  images::PhoneImageDPaged image(kMaximumKib, &decoder);
   if (!decoder.Decode(image, file)) return 0;
   Check(image.GetSize(0) <= image.GetTotalSize());
 
-  TextMemory encoded;
+  images::TextMemory encoded;
   if (!decoder.Encode(image, encoded) || !IsExpressible(image, decoder.linear_addressing())) return 0;
-  HexPhoneImageDecoder again;
-  PhoneImageDPaged copy(kMaximumKib, &again);
+  images::HexPhoneImageDecoder again;
+  images::PhoneImageDPaged copy(kMaximumKib, &again);
   Check(again.Decode(copy, encoded));
   // The size of the copy may differ: that of the first write counts from nowhere. Its bytes may not.
   copy.SetSize(image.GetSize(0), 0);

@@ -35,14 +35,14 @@ struct Removed {
 };
 
 void Walk(const std::string& path) {
-  VARN_PkvFile file;
+  pkv::VARN_PkvFile file;
   try {
     file.open(path);
     for (auto item = file.begin(); item != file.end(); item++) {
-      const VARN_PkvFile::NvItem copy = *item;  // reads every byte of it
+      const pkv::VARN_PkvFile::NvItem copy = *item;  // reads every byte of it
       Check(copy == *item);
     }
-  } catch (const VARN_PkvFile::Exception&) {
+  } catch (const pkv::VARN_PkvFile::Exception&) {
   }
 }
 
@@ -53,16 +53,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   std::ofstream(input.path, std::ios::binary)
       .write(reinterpret_cast<const char*>(data), static_cast<std::streamsize>(size));
   Walk(input.path);
-  PkvSet set;
-  const PkvOutcome outcome = ReadPkv(input.path, set);
+  pkv::PkvSet set;
+  const pkv::PkvOutcome outcome = pkv::ReadPkv(input.path, set);
   Check(outcome.done() == outcome.text.empty());
   if (!outcome.done()) return 0;
-  for (const PkvWriter writer : {PkvWriter::kStorageClasses, PkvWriter::kVarnPkvFile}) {
-    if (set.items.empty() && writer == PkvWriter::kVarnPkvFile) continue;  // which refuses sets without items
+  for (const pkv::PkvWriter writer : {pkv::PkvWriter::kStorageClasses, pkv::PkvWriter::kVarnPkvFile}) {
+    if (set.items.empty() && writer == pkv::PkvWriter::kVarnPkvFile) continue;  // which refuses sets without items
     const Removed copy{FileName("-copy.pkv")};
-    const PkvOutcome written = WritePkv(copy.path, set, nullptr, writer);
-    PkvSet again;
-    Check(written.done() && ReadPkv(copy.path, again).done());
+    const pkv::PkvOutcome written = pkv::WritePkv(copy.path, set, nullptr, writer);
+    pkv::PkvSet again;
+    Check(written.done() && pkv::ReadPkv(copy.path, again).done());
     Check(again.items == set.items);
     Check(again.files == set.files);
   }

@@ -23,14 +23,14 @@ void Check(bool condition) {
 }
 
 // What the response thread does with a frame, without the thread.
-class Replies final : public CImageWriteRspFramed {
+class Replies final : public stream::CImageWriteRspFramed {
  public:
-  using CImageWriteRspFramed::CImageWriteRspFramed;
+  using stream::CImageWriteRspFramed::CImageWriteRspFramed;
   void OnFrame(std::span<const uint8_t> frame) { receiver_.OnFrame(frame); }
 
  private:
   AutoResetEvent finished_;
-  CReplyRcvrCont receiver_{*this, agent_, finished_, log_};
+  stream::CReplyRcvrCont receiver_{*this, agent_, finished_, log_};
 };
 
 }  // namespace
@@ -40,13 +40,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (const auto hello = stream::ParseHelloReply(bytes)) Check(size >= 48);
 
   static Diag_FTM phone(1);
-  DownloadConnection connection(phone);
+  download::DownloadConnection connection(phone);
   Replies replies(connection);
-  DownloadAgent& agent = replies.agent();
+  stream::DownloadAgent& agent = replies.agent();
   agent.Start(kWindow);
   agent.Enqueue({0, kImage, 0});
   for (size_t at = 0; at < size;) {
-    while (agent.AwaitTurn(0) == DownloadAgent::Wait::kReady) {
+    while (agent.AwaitTurn(0) == stream::DownloadAgent::Wait::kReady) {
       if (!agent.TakeResend() && !agent.Carve(std::min(kBlock, agent.head() ? agent.head()->size : 0))) break;
     }
     const size_t wanted = data[at++] % 12;

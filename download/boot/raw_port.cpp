@@ -6,7 +6,7 @@
 #include "base/hex_dump.h"
 #include "frame/request_failure.h"
 
-namespace kral {
+namespace kral::kivrat {
 namespace {
 
 // What a driver's queue holds: each such piece has the time that any write has, so that a slow line can take a packet
@@ -116,4 +116,4 @@ void RawPort::LogTraffic(const char* direction, std::span<const uint8_t> bytes) 
                 bytes.size() > kLongestDump ? "..." : "");
 }
 
-}  // namespace kral
+}  // namespace kral::kivrat

@@ -10,7 +10,7 @@
 #include "base/failure.h"
 #include "frame/diag_ftm.h"
 
-namespace kral {
+namespace kral::kivrat {
 
 // For the length of one operation, under the phone object's request lock. The port itself is the phone object's and
 // is open for as long as it is borrowed, that is also between two operations; it is given back by the destructor
@@ -58,6 +58,6 @@ class RawPort {
   std::function<bool()> stop_;
 };
 
-}  // namespace kral
+}  // namespace kral::kivrat
 
 #endif

@@ -7,7 +7,7 @@
 
 #include "download/images/phone_image.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr int kErased = 0xFF;
@@ -83,4 +83,4 @@ void CDemandPagedMemory::CommitStretch(uint32_t start) {
   committed_ += length;
 }
 
-}  // namespace kral
+}  // namespace kral::images

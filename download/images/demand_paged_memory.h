@@ -8,7 +8,7 @@
 
 #include "platform/virtual_memory.h"
 
-namespace kral {
+namespace kral::images {
 
 // The callers check offset + count against reserved().
 class CDemandPagedMemory {
@@ -43,6 +43,6 @@ class CDemandPagedMemory {
   bool fill_ = false;  // new pages are set to 0xFF
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

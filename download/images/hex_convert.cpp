@@ -7,7 +7,7 @@
 #include "download/images/text_source.h"
 #include "platform/file_util.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr uint32_t kPiece = 64 * 1024;
@@ -126,4 +126,4 @@ uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32
   return KRAL_STREAM_FILE_NOT_READ;
 }
 
-}  // namespace kral
+}  // namespace kral::images

@@ -7,7 +7,7 @@
 #include "download/images/hex_format.h"
 #include "download/images/hex_phone_image_decoder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 using LineText = std::string_view;
@@ -178,4 +178,4 @@ void HexPhoneImageDecoder::LoseBeyond(PhoneImage& image) {
   }
 }
 
-}  // namespace kral
+}  // namespace kral::images

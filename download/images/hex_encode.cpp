@@ -6,7 +6,7 @@
 #include "download/images/hex_format.h"
 #include "download/images/hex_phone_image_decoder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr uint32_t kChunk = 16;
@@ -139,4 +139,4 @@ void HexPhoneImageDecoder::EncodeRegion(PhoneImage& image, uint32_t region, HexW
   }
 }
 
-}  // namespace kral
+}  // namespace kral::images

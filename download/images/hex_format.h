@@ -8,7 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 
-namespace kral::hex {
+namespace kral::images::hex {
 
 // Longer lines are cut, and then fail their checksum.
 inline constexpr size_t kMostCharacters = 258;
@@ -36,6 +36,6 @@ inline constexpr auto kDigitValues = [] {
   return values;
 }();
 
-}  // namespace kral::hex
+}  // namespace kral::images::hex
 
 #endif

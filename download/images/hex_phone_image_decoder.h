@@ -9,7 +9,7 @@
 
 #include "download/images/phone_image_decoder.h"
 
-namespace kral {
+namespace kral::images {
 
 class HexWriter;
 
@@ -76,6 +76,6 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
   std::vector<Beyond> beyond_;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

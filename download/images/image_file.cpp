@@ -10,7 +10,7 @@
 #include "download/images/text_source.h"
 #include "download/link/download_failure.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 // Address space only, which a 32-bit process has to spare; what is not written takes no memory.
@@ -158,4 +158,4 @@ uint32_t FindHexLoss(const std::string& path, HexLoss& loss) {
   return result == KRAL_STREAM_DATA_LOST || result == KRAL_STREAM_PAST_END ? KRAL_STREAM_WRITTEN : result;
 }
 
-}  // namespace kral
+}  // namespace kral::images

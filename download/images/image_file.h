@@ -13,7 +13,7 @@
 #include "download/images/phone_image.h"
 #include "kral/download.h"
 
-namespace kral {
+namespace kral::images {
 
 // An image with the decoder that it needs. What does not give 0 here has noted its failure.
 class ImageFile {
@@ -56,6 +56,6 @@ uint32_t FindHexLoss(const std::string& path, HexLoss& loss);
 uint32_t HexToBinary(const std::string& input, const std::string& output, uint32_t& base);
 uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32_t base);
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-namespace kral {
+namespace kral::images {
 
 class PhoneImageDecoder;
 
@@ -86,6 +86,6 @@ class PhoneImage {
   std::vector<std::unique_ptr<uint8_t[]>> blocks_;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

@@ -3,7 +3,7 @@
 
 #include <limits>
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 void CheckRegion(uint32_t region) {
@@ -78,4 +78,4 @@ void PhoneImageBinary::Write(uint32_t address, const void*, uint32_t count, uint
   throw PhoneImageException::WriteFailure(address, count);
 }
 
-}  // namespace kral
+}  // namespace kral::images

@@ -8,7 +8,7 @@
 #include "download/images/phone_image.h"
 #include "platform/file_mapping.h"
 
-namespace kral {
+namespace kral::images {
 
 // Region 0 only: any other throws "Read Failure". The image begins at address 0.
 class PhoneImageBinary final : public PhoneImage {
@@ -42,6 +42,6 @@ class PhoneImageBinary final : public PhoneImage {
   bool too_large_ = false;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

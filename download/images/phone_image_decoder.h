@@ -5,7 +5,7 @@
 #include "download/images/phone_image.h"
 #include "download/images/text_source.h"
 
-namespace kral {
+namespace kral::images {
 
 class PhoneImageDecoder {
  public:
@@ -17,6 +17,6 @@ class PhoneImageDecoder {
   virtual bool Encode(PhoneImage& image, TextSink& file) = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

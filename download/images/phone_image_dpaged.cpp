@@ -1,7 +1,7 @@
 // Regions and bounds of the sparse image; the bytes are CDemandPagedMemory's.
 #include "download/images/phone_image_dpaged.h"
 
-namespace kral {
+namespace kral::images {
 
 PhoneImageDPaged::PhoneImageDPaged(uint32_t maximum_kib, PhoneImageDecoder* decoder) : PhoneImage(decoder) {
   memory_.Reserve(uint64_t{maximum_kib} * 1024);
@@ -82,4 +82,4 @@ bool PhoneImageDPaged::Fits(uint32_t offset, uint32_t count) const {
   return uint64_t{offset} + count <= memory_.reserved();
 }
 
-}  // namespace kral
+}  // namespace kral::images

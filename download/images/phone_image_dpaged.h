@@ -8,7 +8,7 @@
 #include "download/images/demand_paged_memory.h"
 #include "download/images/phone_image.h"
 
-namespace kral {
+namespace kral::images {
 
 // The bytes of region 1 are stored directly behind those of region 0. Every operation throws "Read Failure" for a
 // region above 1.
@@ -47,6 +47,6 @@ class PhoneImageDPaged final : public PhoneImage {
   uint32_t start_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

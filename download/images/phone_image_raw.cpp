@@ -4,7 +4,7 @@
 #include <cstring>
 #include <limits>
 
-namespace kral {
+namespace kral::images {
 
 bool PhoneImageRaw::SetData(const void* data, uint32_t length) {
   if (data == nullptr || length == std::numeric_limits<uint32_t>::max()) return false;
@@ -30,4 +30,4 @@ void PhoneImageRawBuffer::Read(uint32_t address, void* buffer, uint32_t count, u
   if (count != 0) std::memcpy(buffer, buffer_ + address, count);
 }
 
-}  // namespace kral
+}  // namespace kral::images

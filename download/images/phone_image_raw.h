@@ -6,7 +6,7 @@
 
 #include "download/images/phone_image.h"
 
-namespace kral {
+namespace kral::images {
 
 // What both raw kinds share. They begin at address 0, ignore what is set or written, and count the terminating zero
 // as part of their length.
@@ -48,6 +48,6 @@ class PhoneImageRawBuffer final : public PhoneImageRaw {
   void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

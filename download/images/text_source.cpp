@@ -6,7 +6,7 @@
 
 #include "platform/file_util.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr size_t kBufferSize = 0x10000;
@@ -104,4 +104,4 @@ bool LineReader::Fill() {
   return count != 0;
 }
 
-}  // namespace kral
+}  // namespace kral::images

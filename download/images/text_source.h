@@ -11,7 +11,7 @@
 #include <string_view>
 #include <utility>
 
-namespace kral {
+namespace kral::images {
 
 class TextSource {
  public:
@@ -86,6 +86,6 @@ class LineReader {
   size_t end_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::images
 
 #endif

@@ -15,14 +15,14 @@ void AppendBe(std::vector<uint8_t>& packet, uint32_t value, int bytes) {
   for (int shift = 8 * (bytes - 1); shift >= 0; shift -= 8) packet.push_back(static_cast<uint8_t>(value >> shift));
 }
 
-bool Acknowledged(DownloadConnection& connection, const std::vector<uint8_t>& request, uint32_t time_out_ms) {
+bool Acknowledged(download::DownloadConnection& connection, const std::vector<uint8_t>& request, uint32_t time_out_ms) {
   std::vector<uint8_t> reply;
-  return connection.Exchange(request, kAcknowledge, time_out_ms, reply) == DownloadConnection::kDone;
+  return connection.Exchange(request, kAcknowledge, time_out_ms, reply) == download::DownloadConnection::kDone;
 }
 
 }  // namespace
 
-bool Write32(DownloadConnection& connection, uint32_t address, std::span<const uint8_t> data) {
+bool Write32(download::DownloadConnection& connection, uint32_t address, std::span<const uint8_t> data) {
   if (data.size() > kMostWriteData) return false;
   std::vector<uint8_t> request = {kWrite32};
   AppendBe(request, address, 4);
@@ -31,28 +31,28 @@ bool Write32(DownloadConnection& connection, uint32_t address, std::span<const u
   return Acknowledged(connection, request, connection.time_out_ms());
 }
 
-bool Go(DownloadConnection& connection, uint32_t address) {
+bool Go(download::DownloadConnection& connection, uint32_t address) {
   std::vector<uint8_t> request = {kGo};
   AppendBe(request, address, 4);
   return Acknowledged(connection, request, kGoMs);
 }
 
-bool Nop(DownloadConnection& connection) {
+bool Nop(download::DownloadConnection& connection) {
   connection.log().WriteLine(kLogRet, "Sending Download NOP command");
   return Acknowledged(connection, {kNop}, connection.time_out_ms());
 }
 
-bool Reset(DownloadConnection& connection) {
+bool Reset(download::DownloadConnection& connection) {
   connection.log().WriteLine(kLogRet, "Sending the Reset command based on the KOVA Download Protocol");
   return Acknowledged(connection, {kReset}, connection.time_out_ms());
 }
 
-bool SoftwareVersion(DownloadConnection& connection, uint8_t& version) {
+bool SoftwareVersion(download::DownloadConnection& connection, uint8_t& version) {
   connection.log().WriteLine(kLogRet, "Sending the request for Software Version");
   const uint8_t request = kSoftwareVersion;
   std::vector<uint8_t> reply;
   const auto status = connection.Exchange({&request, 1}, kSoftwareVersionReply, connection.time_out_ms(), reply);
-  if (status != DownloadConnection::kDone) return false;
+  if (status != download::DownloadConnection::kDone) return false;
   if (reply.size() < 2)
     return Fail(Failure(KRAL_ERROR_LINK, "the loader's answer holds no version").Command({&request, 1}));
   version = reply[1];

@@ -11,17 +11,18 @@
 namespace kral::kova {
 
 // One request each. At most kMostWriteData bytes.
-bool Write32(DownloadConnection& connection, uint32_t address, std::span<const uint8_t> data);
-bool Go(DownloadConnection& connection, uint32_t address);
-bool Nop(DownloadConnection& connection);
-bool Reset(DownloadConnection& connection);
-bool SoftwareVersion(DownloadConnection& connection, uint8_t& version);
+bool Write32(download::DownloadConnection& connection, uint32_t address, std::span<const uint8_t> data);
+bool Go(download::DownloadConnection& connection, uint32_t address);
+bool Nop(download::DownloadConnection& connection);
+bool Reset(download::DownloadConnection& connection);
+bool SoftwareVersion(download::DownloadConnection& connection, uint8_t& version);
 
 // The bytes that a write carries when the caller's packets have so many.
 uint32_t ChunkSize(uint32_t maximum_packet);
 
 // Gives KRAL_KOVA_... or KRAL_DOWNLOAD_ABORTED.
-uint32_t LoadFlashProgrammer(DownloadConnection& connection, const std::string& file, uint32_t maximum_packet);
+uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const std::string& file,
+                             uint32_t maximum_packet);
 
 }  // namespace kral::kova
 

@@ -15,7 +15,7 @@ namespace {
 constexpr uint32_t kMaximumKib = 500;
 
 // From the start address on, not from the base: the programmer's entry point is its lowest address. Required.
-bool SendImage(DownloadConnection& connection, PhoneImage& image, uint32_t chunk_size) {
+bool SendImage(download::DownloadConnection& connection, images::PhoneImage& image, uint32_t chunk_size) {
   const uint32_t start = image.GetStartAddress();
   const uint32_t size = image.GetSize(0);
   std::vector<uint8_t> chunk(chunk_size);
@@ -25,7 +25,7 @@ bool SendImage(DownloadConnection& connection, PhoneImage& image, uint32_t chunk
     if (count == 0) return Fail(Failure(KRAL_ERROR_ARGUMENT, "packets of that size carry no data"));
     try {
       image.Read(start + sent, chunk.data(), count, 0);
-    } catch (const PhoneImageException&) {
+    } catch (const images::PhoneImageException&) {
       return Fail(Failure(KRAL_ERROR_BAD_FILE, "the flash programmer has nothing at its start address 0x%08X", start));
     }
     if (!Write32(connection, start + sent, std::span(chunk).first(count))) return false;
@@ -41,22 +41,23 @@ uint32_t ChunkSize(uint32_t maximum_packet) {
   return maximum_packet < kAmplePacket ? maximum_packet / 2 : kMostWriteData;
 }
 
-uint32_t LoadFlashProgrammer(DownloadConnection& connection, const std::string& file, uint32_t maximum_packet) {
+uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const std::string& file,
+                             uint32_t maximum_packet) {
   auto& log = connection.log();
-  HexPhoneImageDecoder decoder(true, true, true);
-  PhoneImageDPaged image(kMaximumKib, &decoder);
-  TextFile text;
+  images::HexPhoneImageDecoder decoder(true, true, true);
+  images::PhoneImageDPaged image(kMaximumKib, &decoder);
+  images::TextFile text;
   if (!text.OpenForReading(file)) {
     Fail(download::NotOpened(file));
     return KRAL_KOVA_FILE_NOT_OPENED;
   }
   if (!decoder.Decode(image, text)) {
-    Fail(NotDecoded(file, decoder.fault()));
+    Fail(images::NotDecoded(file, decoder.fault()));
     return KRAL_KOVA_FILE_NOT_DECODED;
   }
   if (decoder.loss().bytes != 0) {
-    Fail(DataLost(file, decoder.loss()));
-    LogLoss(log, file, decoder.loss());
+    Fail(images::DataLost(file, decoder.loss()));
+    images::LogLoss(log, file, decoder.loss());
     return KRAL_KOVA_DATA_LOST;
   }
 

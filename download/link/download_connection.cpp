@@ -7,7 +7,7 @@
 
 #include "base/failure.h"
 
-namespace kral {
+namespace kral::download {
 namespace {
 
 constexpr size_t kFcsBytes = 2;
@@ -81,4 +81,4 @@ void DownloadConnection::Report(uint32_t done, uint32_t total) {
   CallGuarded([&] { callback(phone_.handle(), done, total, value); });
 }
 
-}  // namespace kral
+}  // namespace kral::download

@@ -11,7 +11,7 @@
 
 #include "frame/diag_ftm.h"
 
-namespace kral {
+namespace kral::download {
 
 // For the length of one operation, under the phone object's request lock.
 class DownloadConnection {
@@ -56,6 +56,6 @@ class DownloadConnection {
   uint32_t last_report_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::download
 
 #endif

@@ -5,7 +5,7 @@
 
 #include "base/failure.h"
 
-namespace kral {
+namespace kral::stream {
 namespace {
 
 // Then nobody is there any more.
@@ -27,7 +27,7 @@ Failure NotAcknowledged(const std::optional<DownloadAgent::OtherReply>& reply, u
 
 }  // namespace
 
-BlockWriter::BlockWriter(DownloadConnection& connection, DownloadAgent& agent, PhoneImage& image,
+BlockWriter::BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent, images::PhoneImage& image,
                          CImageWriteCmd& command, uint32_t block_size, uint32_t time_out_ms)
     : connection_(connection),
       agent_(agent),
@@ -112,4 +112,4 @@ bool BlockWriter::Send(const CDownloadBlock& block) {
   return true;
 }
 
-}  // namespace kral
+}  // namespace kral::stream

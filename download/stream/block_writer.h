@@ -11,13 +11,13 @@
 #include "download/stream/download_agent.h"
 #include "download/stream/image_write_cmd.h"
 
-namespace kral {
+namespace kral::stream {
 
 class BlockWriter {
  public:
   // Everything is borrowed for the length of one image.
-  BlockWriter(DownloadConnection& connection, DownloadAgent& agent, PhoneImage& image, CImageWriteCmd& command,
-              uint32_t block_size, uint32_t time_out_ms);
+  BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent, images::PhoneImage& image,
+              CImageWriteCmd& command, uint32_t block_size, uint32_t time_out_ms);
 
   // Until the agent has nothing left, `total` bytes. False when the pipeline broke.
   bool Run(uint32_t total);
@@ -30,9 +30,9 @@ class BlockWriter {
   std::optional<CDownloadBlock> Carve();
   bool Send(const CDownloadBlock& block);
 
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   DownloadAgent& agent_;
-  PhoneImage& image_;
+  images::PhoneImage& image_;
   CImageWriteCmd& command_;
   const uint32_t time_out_ms_;
   std::vector<uint8_t> buffer_;  // one block
@@ -40,6 +40,6 @@ class BlockWriter {
   uint32_t acknowledged_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -4,7 +4,7 @@
 #include <chrono>
 #include <utility>
 
-namespace kral {
+namespace kral::stream {
 
 void DownloadAgent::Start(uint32_t window) {
   Stop();
@@ -144,4 +144,4 @@ uint32_t DownloadAgent::blocks_acknowledged() const {
   return blocks_acknowledged_;
 }
 
-}  // namespace kral
+}  // namespace kral::stream

@@ -12,7 +12,7 @@
 #include "base/waitable_timer.h"
 #include "download/stream/download_block.h"
 
-namespace kral {
+namespace kral::stream {
 
 class DownloadAgent {
  public:
@@ -78,6 +78,6 @@ class DownloadAgent {
   uint32_t bytes_acknowledged_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

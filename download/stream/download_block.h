@@ -7,7 +7,7 @@
 #include <memory>
 #include <utility>
 
-namespace kral {
+namespace kral::stream {
 
 struct CDownloadBlock {
   uint32_t address = 0;
@@ -88,6 +88,6 @@ class CFinalBlock {
   uint32_t address_ = 0;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

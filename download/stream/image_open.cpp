@@ -6,9 +6,7 @@
 #include "base/waitable_timer.h"
 #include "download/stream/stream_format.h"
 
-namespace kral {
-
-using namespace stream;
+namespace kral::stream {
 
 namespace {
 
@@ -28,17 +26,17 @@ WriteLimits CImageOpen::Limited(const WriteLimits& requested) {
 }
 
 // A block that was sent again may be acknowledged once more, long after: that answers neither opening nor closing.
-DownloadConnection::Status CImageOpen::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
-                                                std::vector<uint8_t>& reply) {
+download::DownloadConnection::Status CImageOpen::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
+                                                          std::vector<uint8_t>& reply) {
   auto status = connection_.Exchange(request, expected_code, time_out_ms_, reply);
   CWaitableTimer timer;  // a storm of them must not hold the call up for ever
   timer.Arm(time_out_ms_);
-  while (status == DownloadConnection::kOtherReply && IsAcknowledgement(reply) && !timer.expired()) {
+  while (status == download::DownloadConnection::kOtherReply && IsAcknowledgement(reply) && !timer.expired()) {
     if (!connection_.AwaitReply(time_out_ms_, reply)) {
       reply.clear();
-      return DownloadConnection::kNoReply;
+      return download::DownloadConnection::kNoReply;
     }
-    if (!reply.empty() && reply[0] == expected_code) return DownloadConnection::kDone;
+    if (!reply.empty() && reply[0] == expected_code) return download::DownloadConnection::kDone;
   }
   return status;
 }
@@ -48,7 +46,7 @@ bool CImageOpen::Close() {
   const uint8_t request = kClose;
   const auto status = Exchange({&request, 1}, kCloseReply, reply);
   auto& log = connection_.log();
-  if (status != DownloadConnection::kDone) {
+  if (status != download::DownloadConnection::kDone) {
     if (!reply.empty()) {
       log.WriteLine(kLogErr, "error - MI close failed: status %u rsp %02X\n", static_cast<unsigned>(status), reply[0]);
     } else {
@@ -69,7 +67,8 @@ bool CImageOpen::Close() {
   return true;
 }
 
-bool CImageOpenFramed::OpenMulti(uint8_t type, PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) {
+bool CImageOpenFramed::OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested,
+                                 WriteLimits& limits) {
   std::vector<uint8_t> request = {kOpen, type};
   if (header != nullptr) {
     const uint32_t size = header->GetSize(0);
@@ -79,7 +78,7 @@ bool CImageOpenFramed::OpenMulti(uint8_t type, PhoneImage* header, const WriteLi
   }
   std::vector<uint8_t> reply;
   const auto status = Exchange(request, kOpenReply, reply);
-  if (status != DownloadConnection::kDone) return false;
+  if (status != download::DownloadConnection::kDone) return false;
   if (reply.size() != kStatusReplySize) {
     return Fail(Failure(KRAL_ERROR_LINK, "the answer to the opening of the image has %zu bytes", reply.size()));
   }
@@ -92,9 +91,9 @@ bool CImageOpenFramed::OpenMulti(uint8_t type, PhoneImage* header, const WriteLi
   return true;
 }
 
-bool CImageOpenNOR::OpenMulti(uint8_t, PhoneImage*, const WriteLimits& requested, WriteLimits& limits) {
+bool CImageOpenNOR::OpenMulti(uint8_t, images::PhoneImage*, const WriteLimits& requested, WriteLimits& limits) {
   limits = Limited(requested);
   return true;
 }
 
-}  // namespace kral
+}  // namespace kral::stream

@@ -10,7 +10,7 @@
 #include "download/images/phone_image.h"
 #include "download/link/download_connection.h"
 
-namespace kral {
+namespace kral::stream {
 
 Failure HeaderTooLong(uint32_t size);
 
@@ -21,7 +21,7 @@ struct WriteLimits {
 
 class CImageOpen {
  public:
-  CImageOpen(DownloadConnection& connection, uint32_t time_out_ms)
+  CImageOpen(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
   virtual ~CImageOpen() = default;
 
@@ -30,32 +30,32 @@ class CImageOpen {
   virtual bool Prepare() { return false; }
 
   // `header` may be null. The limits are those asked for, as far as they can be had.
-  virtual bool OpenMulti(uint8_t, PhoneImage*, const WriteLimits&, WriteLimits&) { return false; }
+  virtual bool OpenMulti(uint8_t, images::PhoneImage*, const WriteLimits&, WriteLimits&) { return false; }
   virtual bool Close();
 
  protected:
   static WriteLimits Limited(const WriteLimits& requested);
-  DownloadConnection::Status Exchange(std::span<const uint8_t> request, uint8_t expected_code,
-                                      std::vector<uint8_t>& reply);
+  download::DownloadConnection::Status Exchange(std::span<const uint8_t> request, uint8_t expected_code,
+                                                std::vector<uint8_t>& reply);
 
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
 };
 
 class CImageOpenFramed final : public CImageOpen {
  public:
   using CImageOpen::CImageOpen;
-  bool OpenMulti(uint8_t type, PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
+  bool OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
 };
 
 // For a programmer that takes one image and wants neither an opening nor a closing packet.
 class CImageOpenNOR final : public CImageOpen {
  public:
   using CImageOpen::CImageOpen;
-  bool OpenMulti(uint8_t type, PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
+  bool OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
   bool Close() override { return true; }
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -8,10 +8,8 @@
 #include "download/stream/stream_format.h"
 #include "platform/file_util.h"
 
-namespace kral {
+namespace kral::stream {
 namespace {
-
-using namespace stream;
 
 constexpr uint8_t kUseOverride = 1;
 constexpr uint8_t kBadFormat = 2;
@@ -44,7 +42,7 @@ Failure Refusal(uint8_t status) {
 bool CImageSecMode::Send(uint8_t mode) {
   const std::vector<uint8_t> request = {kSecurityMode, mode};
   std::vector<uint8_t> reply;
-  return connection_.Exchange(request, kSecurityModeReply, time_out_ms_, reply) == DownloadConnection::kDone;
+  return connection_.Exchange(request, kSecurityModeReply, time_out_ms_, reply) == download::DownloadConnection::kDone;
 }
 
 bool CImagePartition::Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status) {
@@ -66,7 +64,7 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   std::copy(table.begin(), table.end(), request.begin() + 2);
   std::vector<uint8_t> reply;
   const auto sent = connection_.Exchange(request, kPartitionTableReply, time_out_ms_, reply);
-  if (sent != DownloadConnection::kDone) return false;
+  if (sent != download::DownloadConnection::kDone) return false;
   if (reply.size() != kStatusReplySize) {
     return Fail(Failure(KRAL_ERROR_LINK, "the answer to the partition table has %zu bytes", reply.size()));
   }
@@ -76,4 +74,4 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   return Fail(Refusal(*status));
 }
 
-}  // namespace kral
+}  // namespace kral::stream

@@ -8,31 +8,31 @@
 
 #include "download/link/download_connection.h"
 
-namespace kral {
+namespace kral::stream {
 
 class CImageSecMode {
  public:
-  CImageSecMode(DownloadConnection& connection, uint32_t time_out_ms)
+  CImageSecMode(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
   bool Send(uint8_t mode);
 
  private:
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
 };
 
 class CImagePartition {
  public:
-  CImagePartition(DownloadConnection& connection, uint32_t time_out_ms)
+  CImagePartition(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
   // `status` is set when the handset answered.
   bool Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status);
 
  private:
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -9,10 +9,10 @@
 #include "download/stream/stream_format.h"
 #include "transport/line/hdlc_frame.h"
 
-namespace kral {
+namespace kral::stream {
 namespace {
 
-static_assert(CImageWriteCmdFramed::kMostFramedData + stream::kWriteHeaderSize == kMaximumPayload);
+static_assert(CImageWriteCmdFramed::kMostFramedData + kWriteHeaderSize == kMaximumPayload);
 
 // A frame takes a payload for sure when its stuffed form has so many bytes: both bytes of the FCS may be escaped
 // behind it, and no escape pair may begin at or behind kEscapePairLimit.
@@ -23,9 +23,9 @@ constexpr bool IsEscaped(uint8_t byte) {
   return byte == kFrameFlag || byte == kFrameEscape;
 }
 
-std::array<uint8_t, stream::kWriteHeaderSize> Header(uint32_t address) {
-  std::array<uint8_t, stream::kWriteHeaderSize> header{stream::kWrite};
-  StoreLe<uint32_t>(header, stream::kAddressAt, address);
+std::array<uint8_t, kWriteHeaderSize> Header(uint32_t address) {
+  std::array<uint8_t, kWriteHeaderSize> header{kWrite};
+  StoreLe<uint32_t>(header, kAddressAt, address);
   return header;
 }
 
@@ -36,16 +36,16 @@ size_t CountEscaped(std::span<const uint8_t> bytes) {
 }  // namespace
 
 bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data) {
-  if (data.size() > stream::kMostWriteData) {
+  if (data.size() > kMostWriteData) {
     connection_.log().WriteLine(kLogErr, "write command too long\n");
     return Fail(Failure(KRAL_ERROR_INTERNAL, "a write command of %zu bytes is too long", data.size()));
   }
-  packet_.resize(stream::kWriteBufferSize);
+  packet_.resize(kWriteBufferSize);
   const auto header = Header(address);
   const auto body = std::copy(header.begin(), header.end(), packet_.begin());
   std::copy(data.begin(), data.end(), body);
   const auto status = connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_);
-  if (status == DownloadConnection::kDone) return true;
+  if (status == download::DownloadConnection::kDone) return true;
   connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", static_cast<unsigned>(status));
   return false;
 }
@@ -62,4 +62,4 @@ uint32_t CImageWriteCmdFramed::FittingSize(uint32_t address, std::span<const uin
   return static_cast<uint32_t>(size);
 }
 
-}  // namespace kral
+}  // namespace kral::stream

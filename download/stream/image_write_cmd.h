@@ -8,7 +8,7 @@
 
 #include "download/link/download_connection.h"
 
-namespace kral {
+namespace kral::stream {
 
 class CImageWriteCmd {
  public:
@@ -21,7 +21,7 @@ class CImageWriteCmdFramed final : public CImageWriteCmd {
   // The most data of one write that can go out in one frame; less when some of it has to be escaped.
   static constexpr uint32_t kMostFramedData = 16376;
 
-  CImageWriteCmdFramed(DownloadConnection& connection, uint32_t time_out_ms)
+  CImageWriteCmdFramed(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
 
   bool Send(uint32_t address, std::span<const uint8_t> data) override;
@@ -30,11 +30,11 @@ class CImageWriteCmdFramed final : public CImageWriteCmd {
   static uint32_t FittingSize(uint32_t address, std::span<const uint8_t> data);
 
  private:
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
   std::vector<uint8_t> packet_;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -8,7 +8,7 @@
 #include "download/stream/stream_format.h"
 #include "platform/forced_unwind.h"
 
-namespace kral {
+namespace kral::stream {
 namespace {
 
 constexpr std::chrono::milliseconds kHeadStart{100};
@@ -17,7 +17,7 @@ constexpr uint32_t kStopMs = 1000;
 
 }  // namespace
 
-CImageWriteRsp::CImageWriteRsp(DownloadConnection& connection)
+CImageWriteRsp::CImageWriteRsp(download::DownloadConnection& connection)
     : log_(connection.log()),
       connection_(connection),
       parts_(connection.KeepParts()),
@@ -59,19 +59,19 @@ void CImageWriteRsp::Run() {
 }
 
 WriteReply CImageWriteRspFramed::ParseReply(std::span<const uint8_t> payload) {
-  if (payload.size() != stream::kWriteReplySize) {
+  if (payload.size() != kWriteReplySize) {
     log_.WriteLine(kLogErr, "WriteResponse bad length %u\n", static_cast<unsigned>(payload.size()));
     return WriteReply::kBadLength;
   }
-  if (payload[0] != stream::kWriteReply) {
+  if (payload[0] != kWriteReply) {
     log_.WriteLine(kLogErr, "WriteResponse bad command %u\n", static_cast<unsigned>(payload[0]));
     return WriteReply::kBadCode;
   }
-  const uint32_t address = *LoadLe<uint32_t>(payload, stream::kAddressAt);
+  const uint32_t address = *LoadLe<uint32_t>(payload, kAddressAt);
   const auto block = agent_.Acknowledge(address);
   if (!block) return WriteReply::kAcknowledged;
   log_.WriteLine(kLogRet, "Reply address 0x%08X size 0x%X\n", address, block->size);
   return block->final ? WriteReply::kComplete : WriteReply::kAcknowledged;
 }
 
-}  // namespace kral
+}  // namespace kral::stream

@@ -13,13 +13,13 @@
 #include "download/stream/download_agent.h"
 #include "download/stream/reply_receiver.h"
 
-namespace kral {
+namespace kral::stream {
 
 // Held by a shared pointer: a thread that does not end in time keeps it, the agent in it and the queues of the
 // connection.
 class CImageWriteRsp : public std::enable_shared_from_this<CImageWriteRsp>, protected WriteReplyParser {
  public:
-  explicit CImageWriteRsp(DownloadConnection& connection);
+  explicit CImageWriteRsp(download::DownloadConnection& connection);
   ~CImageWriteRsp() override = default;
   CImageWriteRsp(const CImageWriteRsp&) = delete;
   CImageWriteRsp& operator=(const CImageWriteRsp&) = delete;
@@ -38,8 +38,8 @@ class CImageWriteRsp : public std::enable_shared_from_this<CImageWriteRsp>, prot
  private:
   void Run();
 
-  DownloadConnection& connection_;     // for the caller's thread; the thread of this object must not use it
-  const std::shared_ptr<void> parts_;  // of the phone object: log and queue
+  download::DownloadConnection& connection_;  // for the caller's thread; the thread of this object must not use it
+  const std::shared_ptr<void> parts_;         // of the phone object: log and queue
   PacketQueue& responses_;
   AutoResetEvent stop_;
   AutoResetEvent finished_;
@@ -56,6 +56,6 @@ class CImageWriteRspFramed : public CImageWriteRsp {
   WriteReply ParseReply(std::span<const uint8_t> payload) override;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

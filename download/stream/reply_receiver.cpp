@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-namespace kral {
+namespace kral::stream {
 namespace {
 
 constexpr size_t kFcsBytes = 2;
@@ -46,4 +46,4 @@ void CReplyRcvrCont::OnFrame(std::span<const uint8_t> frame) {
   }
 }
 
-}  // namespace kral
+}  // namespace kral::stream

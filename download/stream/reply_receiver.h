@@ -10,7 +10,7 @@
 #include "base/text_log.h"
 #include "download/stream/download_agent.h"
 
-namespace kral {
+namespace kral::stream {
 
 enum class WriteReply : uint32_t {
   kAcknowledged = 0,
@@ -63,6 +63,6 @@ class CReplyRcvrCont final : public CReplyRcvr {
   bool done_ = false;
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -29,13 +29,14 @@ std::array<uint8_t, kRequestSize> HelloRequest() {
   return request;
 }
 
-std::optional<HelloReply> ExchangeHello(DownloadConnection& connection, uint32_t variant, uint32_t time_out_ms) {
+std::optional<HelloReply> ExchangeHello(download::DownloadConnection& connection, uint32_t variant,
+                                        uint32_t time_out_ms) {
   if (variant != kHelloVariant) {
     Fail(Failure(KRAL_ERROR_ARGUMENT, "no hello exchange of variant %u is known", variant));
     return std::nullopt;
   }
   std::vector<uint8_t> reply;
-  if (connection.Exchange(HelloRequest(), kHelloReply, time_out_ms, reply) != DownloadConnection::kDone) {
+  if (connection.Exchange(HelloRequest(), kHelloReply, time_out_ms, reply) != download::DownloadConnection::kDone) {
     return std::nullopt;
   }
   const auto answer = ParseHelloReply(std::span(reply).first(std::min(reply.size(), kReplyRoom)));
@@ -56,7 +57,8 @@ std::optional<HelloReply> ParseHelloReply(std::span<const uint8_t> reply) {
   return HelloReply{*block_size, *window};
 }
 
-std::optional<HelloReply> Hello(DownloadConnection& connection, const DownloadSettings& settings, uint32_t variant) {
+std::optional<HelloReply> Hello(download::DownloadConnection& connection, const DownloadSettings& settings,
+                                uint32_t variant) {
   auto& log = connection.log();
   const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);
   for (int i = 1; i <= kNops && !connection.aborted(); ++i) {

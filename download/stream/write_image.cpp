@@ -4,7 +4,7 @@
 #include "download/link/download_failure.h"
 #include "download/stream/block_writer.h"
 
-namespace kral {
+namespace kral::stream {
 namespace {
 
 // Stops the thread on every way out.
@@ -41,16 +41,17 @@ class StartedAgent {
 
 }  // namespace
 
-CWriteImage::CWriteImage(DownloadConnection& connection, std::unique_ptr<CImageOpen> opener)
+CWriteImage::CWriteImage(download::DownloadConnection& connection, std::unique_ptr<CImageOpen> opener)
     : connection_(connection), time_out_ms_(connection.time_out_ms()), opener_(std::move(opener)) {}
 
-CWriteImageFramed::CWriteImageFramed(DownloadConnection& connection)
+CWriteImageFramed::CWriteImageFramed(download::DownloadConnection& connection)
     : CWriteImage(connection, std::make_unique<CImageOpenFramed>(connection, connection.time_out_ms())) {}
 
-CWriteNORImageFramed::CWriteNORImageFramed(DownloadConnection& connection)
+CWriteNORImageFramed::CWriteNORImageFramed(download::DownloadConnection& connection)
     : CWriteImage(connection, std::make_unique<CImageOpenNOR>(connection, connection.time_out_ms())) {}
 
-WriteOutcome CWriteImage::Write(PhoneImage& image, uint8_t type, PhoneImage* header, const WriteLimits& requested) {
+WriteOutcome CWriteImage::Write(images::PhoneImage& image, uint8_t type, images::PhoneImage* header,
+                                const WriteLimits& requested) {
   const uint32_t size = image.GetSize(0);
   WriteLimits limits;
   if (connection_.aborted()) return Failed(WriteOutcome::kAborted, "aborted before the image was opened\n");
@@ -66,7 +67,7 @@ WriteOutcome CWriteImage::Write(PhoneImage& image, uint8_t type, PhoneImage* hea
   return opener_->Close() ? WriteOutcome::kDone : WriteOutcome::kNotClosed;
 }
 
-WriteOutcome CWriteImage::Stream(PhoneImage& image, uint32_t size, const WriteLimits& limits) {
+WriteOutcome CWriteImage::Stream(images::PhoneImage& image, uint32_t size, const WriteLimits& limits) {
   const auto replies = std::make_shared<CImageWriteRspFramed>(connection_);
   DownloadAgent& agent = replies->agent();
   const StartedAgent started(agent, limits.window);
@@ -96,7 +97,7 @@ WriteOutcome CWriteImage::Stream(PhoneImage& image, uint32_t size, const WriteLi
   return Failed(WriteOutcome::kThreadNotStopped, "failed to stop the write response thread\n");
 }
 
-bool CWriteImage::WriteLoop(PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies) {
+bool CWriteImage::WriteLoop(images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies) {
   connection_.log().WriteLine(kLogRet, "Streaming start max write %u, window size %u\n", limits.block_size,
                               limits.window);
   CImageWriteCmdFramed command(connection_, time_out_ms_);
@@ -124,4 +125,4 @@ WriteOutcome CWriteImage::Failed(WriteOutcome outcome, const char* text) {
   return outcome;
 }
 
-}  // namespace kral
+}  // namespace kral::stream

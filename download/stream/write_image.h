@@ -11,7 +11,7 @@
 #include "download/stream/image_write_cmd.h"
 #include "download/stream/image_write_rsp.h"
 
-namespace kral {
+namespace kral::stream {
 
 enum class WriteOutcome : uint32_t {
   kDone,
@@ -30,31 +30,31 @@ class CWriteImage {
   virtual ~CWriteImage() = default;
 
   // Region 0 of the image. `header` may be null. Throws what the images throw.
-  WriteOutcome Write(PhoneImage& image, uint8_t type, PhoneImage* header, const WriteLimits& requested);
+  WriteOutcome Write(images::PhoneImage& image, uint8_t type, images::PhoneImage* header, const WriteLimits& requested);
 
  protected:
-  CWriteImage(DownloadConnection& connection, std::unique_ptr<CImageOpen> opener);
+  CWriteImage(download::DownloadConnection& connection, std::unique_ptr<CImageOpen> opener);
 
  private:
-  WriteOutcome Stream(PhoneImage& image, uint32_t size, const WriteLimits& limits);
-  bool WriteLoop(PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies);
+  WriteOutcome Stream(images::PhoneImage& image, uint32_t size, const WriteLimits& limits);
+  bool WriteLoop(images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies);
   WriteOutcome Failed(WriteOutcome outcome, const char* text);
 
-  DownloadConnection& connection_;
+  download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
   const std::unique_ptr<CImageOpen> opener_;
 };
 
 class CWriteImageFramed final : public CWriteImage {
  public:
-  explicit CWriteImageFramed(DownloadConnection& connection);
+  explicit CWriteImageFramed(download::DownloadConnection& connection);
 };
 
 class CWriteNORImageFramed final : public CWriteImage {
  public:
-  explicit CWriteNORImageFramed(DownloadConnection& connection);
+  explicit CWriteNORImageFramed(download::DownloadConnection& connection);
 };
 
-}  // namespace kral
+}  // namespace kral::stream
 
 #endif

@@ -12,10 +12,10 @@
 #include "storage/items/phone_items.h"
 #include "storage/pkv/pkv_array_note.h"
 
-namespace kral::pkv {
+namespace kral::backup {
 namespace {
 
-using Answer = PhoneItems::Answer;
+using Answer = items::PhoneItems::Answer;
 
 constexpr size_t kMostFileBytes = kCompoundFileLimit / 2;  // of all files; the items take less than the rest
 
@@ -48,9 +48,9 @@ class BackupJob {
  public:
   explicit BackupJob(Diag_FTM& phone) : phone_(phone), aborts_(phone), items_(phone) {}
 
-  uint32_t Run(PkvSet& set) {
-    std::vector<PhoneItems::FoundFile> files;
-    std::vector<PhoneItems::UnlistedFolder> unlisted;
+  uint32_t Run(pkv::PkvSet& set) {
+    std::vector<items::PhoneItems::FoundFile> files;
+    std::vector<items::PhoneItems::UnlistedFolder> unlisted;
     const Answer found = items_.FindFiles(files, unlisted);
     if (aborts_.aborted()) return KRAL_PKV_STATUS_STOPPED;
     if (found == Answer::kLost) return KRAL_PKV_STATUS_LOST;
@@ -60,17 +60,17 @@ class BackupJob {
       if (!ReadItem(item, set, report)) return End(report);
     }
     for (const auto& [path, status] : unlisted) {
-      report.Add(PkvEfsFile{.path = path, .mode = 0, .bytes = {}}, KRAL_PKV_REFUSED, status);
+      report.Add(pkv::PkvEfsFile{.path = path, .mode = 0, .bytes = {}}, KRAL_PKV_REFUSED, status);
       if (report.stopped()) return End(report);
     }
-    for (const PhoneItems::FoundFile& file : files) {
+    for (const items::PhoneItems::FoundFile& file : files) {
       if (!ReadFile(file, set, report)) return End(report);
     }
     std::set<uint16_t> arrays;
     for (const Wanted& item : items) {
       if (item.element) arrays.insert(item.id);
     }
-    NoteArrays(arrays, set.properties);
+    pkv::NoteArrays(arrays, set.properties);
     if (set.items.empty() && set.files.empty()) return KRAL_PKV_STATUS_NOTHING_READ;
     return report.counts().refused > 0 ? KRAL_PKV_STATUS_INCOMPLETE : KRAL_PKV_STATUS_DONE;
   }
@@ -81,12 +81,12 @@ class BackupJob {
   }
 
   // False when the job is over.
-  bool ReadItem(const Wanted& wanted, PkvSet& set, JobReport& report) {
-    PkvNvItem item{.id = wanted.id, .index = wanted.index, .subscription = wanted.subscription};
+  bool ReadItem(const Wanted& wanted, pkv::PkvSet& set, JobReport& report) {
+    pkv::PkvNvItem item{.id = wanted.id, .index = wanted.index, .subscription = wanted.subscription};
     const Answer answer = items_.Read(item, wanted.element);
     if (answer == Answer::kLost) return false;
     if (answer == Answer::kRefused) {
-      report.Add(item, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+      report.Add(item, KRAL_PKV_REFUSED, items::PhoneItems::kRefusedStatus);
     } else if (item.status != nv::kDone) {
       const bool has_none = item.status == nv::kNeverWritten || item.status == nv::kNoSuchItem;
       report.Add(item, has_none ? KRAL_PKV_SKIPPED : KRAL_PKV_REFUSED, item.status);
@@ -97,8 +97,8 @@ class BackupJob {
     return !report.stopped();
   }
 
-  bool ReadFile(const PhoneItems::FoundFile& found, PkvSet& set, JobReport& report) {
-    PkvEfsFile file{.path = found.path, .mode = found.mode, .bytes = {}};
+  bool ReadFile(const items::PhoneItems::FoundFile& found, pkv::PkvSet& set, JobReport& report) {
+    pkv::PkvEfsFile file{.path = found.path, .mode = found.mode, .bytes = {}};
     uint32_t status = 0;
     // An item file comes whole with one request; a plain one may have grown since it was listed.
     const Answer answer =
@@ -106,7 +106,7 @@ class BackupJob {
     if (answer == Answer::kLost || report.stopped()) return false;
     // Less than the handset lists would be a backup that looks whole. The same for more than a file of ours holds.
     if (status == 0 && (file.bytes.size() < found.size || file.bytes.size() > bytes_left_)) {
-      status = PhoneItems::kRefusedStatus;
+      status = items::PhoneItems::kRefusedStatus;
     }
     if (status == 0) bytes_left_ -= file.bytes.size();
     report.Add(file, status == 0 ? KRAL_PKV_DONE : KRAL_PKV_REFUSED, status);
@@ -116,14 +116,14 @@ class BackupJob {
 
   Diag_FTM& phone_;
   const efs::AbortWatch aborts_;
-  PhoneItems items_;
+  items::PhoneItems items_;
   size_t bytes_left_ = kMostFileBytes;
 };
 
 }  // namespace
 
 uint32_t Backup(Diag_FTM& phone, const std::string& path) {
-  PkvSet set;
+  pkv::PkvSet set;
   phone.pkv().counts = {};
   // Before the many requests that would otherwise be in vain.
   if (const std::error_code error = AtomicFile().Open(path)) {
@@ -139,9 +139,9 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
     phone.log().WriteLine(kLogErr, "KRAL_BackupNVFromMobileToPKV() - nothing written, status %u", status);
     return status;
   }
-  const PkvOutcome outcome = WritePkv(path, set, &phone.log());
+  const pkv::PkvOutcome outcome = pkv::WritePkv(path, set, &phone.log());
   if (!outcome.done()) NoteFile(phone, outcome);
   return outcome.done() ? status : StatusOf(outcome.result);
 }
 
-}  // namespace kral::pkv
+}  // namespace kral::backup

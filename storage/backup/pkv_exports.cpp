@@ -6,7 +6,7 @@
 #include "kral/pkv.h"
 #include "storage/backup/pkv_jobs.h"
 
-namespace pkv = kral::pkv;
+namespace backup = kral::backup;
 using kral::Diag_FTM;
 using kral::ExportCall;
 using kral::Fail;
@@ -106,7 +106,7 @@ uint8_t KRAL_CALL KRAL_PKV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_PKV_CALLBA
 
 uint8_t KRAL_CALL KRAL_PKV_ConfigureBackup(KRAL_HANDLE handle, uint16_t first_item, uint16_t last_item,
                                            uint16_t subscriptions) {
-  return ExportCall(handle, __func__).Run(pkv::ConfigureBackup, first_item, last_item, subscriptions);
+  return ExportCall(handle, __func__).Run(backup::ConfigureBackup, first_item, last_item, subscriptions);
 }
 
 uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNTS* counts) {
@@ -115,15 +115,15 @@ uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNTS* counts
 
 uint8_t KRAL_CALL KRAL_BackupNVFromMobileToPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
   // The line deliberately does not show the function's own name.
-  return ExportCall(handle, __func__).Named("KRAL_NV_BackupNVFromMobile").Run(Run, pkv::Backup, file, status);
+  return ExportCall(handle, __func__).Named("KRAL_NV_BackupNVFromMobile").Run(Run, backup::Backup, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_RestoreNVFromPKV(KRAL_HANDLE handle, const char* file, uint32_t* status) {
-  return ExportCall(handle, __func__).Run(Run, pkv::Restore, file, status);
+  return ExportCall(handle, __func__).Run(Run, backup::Restore, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_PKV_Verify(KRAL_HANDLE handle, const char* file, uint32_t* status) {
-  return ExportCall(handle, __func__).Run(Run, pkv::Verify, file, status);
+  return ExportCall(handle, __func__).Run(Run, backup::Verify, file, status);
 }
 
 uint8_t KRAL_CALL KRAL_UploadPkvFile(KRAL_HANDLE handle, const char* file, uint32_t options) {

@@ -7,7 +7,7 @@
 #include "storage/nv/nv_tool.h"
 #include "storage/pkv/pkv_array_note.h"
 
-namespace kral::pkv {
+namespace kral::backup {
 namespace {
 
 uint32_t* CounterOf(KRAL_PKV_COUNTS& counts, uint32_t result) {
@@ -56,12 +56,12 @@ const KRAL_PKV_COUNTS& JobReport::counts() const {
   return phone_.pkv().counts;
 }
 
-void JobReport::Add(const PkvNvItem& item, uint32_t result, uint32_t status) {
+void JobReport::Add(const pkv::PkvNvItem& item, uint32_t result, uint32_t status) {
   KRAL_PKV_ITEM record{item.id, item.index, item.subscription, 0, status, result};
   Add(record, nullptr);
 }
 
-void JobReport::Add(const PkvEfsFile& file, uint32_t result, uint32_t status) {
+void JobReport::Add(const pkv::PkvEfsFile& file, uint32_t result, uint32_t status) {
   KRAL_PKV_ITEM record{0, 0, 0, 0, status, result};
   Add(record, file.path.c_str());
 }
@@ -79,34 +79,34 @@ void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
   stopped_ = go_on == 0;
 }
 
-uint32_t StatusOf(PkvResult result) {
+uint32_t StatusOf(pkv::PkvResult result) {
   switch (result) {
-    case PkvResult::kDone:
+    case pkv::PkvResult::kDone:
       return KRAL_PKV_STATUS_DONE;
-    case PkvResult::kNoStorage:
+    case pkv::PkvResult::kNoStorage:
       return KRAL_PKV_STATUS_NO_STORAGE;
-    case PkvResult::kDamagedItem:
+    case pkv::PkvResult::kDamagedItem:
       return KRAL_PKV_STATUS_BAD_ITEM;
-    case PkvResult::kNoItem:
+    case pkv::PkvResult::kNoItem:
       return KRAL_PKV_STATUS_NOTHING_READ;
-    case PkvResult::kCannotOpen:
-    case PkvResult::kCannotWrite:
+    case pkv::PkvResult::kCannotOpen:
+    case pkv::PkvResult::kCannotWrite:
       break;
   }
   return KRAL_PKV_STATUS_CANNOT_OPEN;
 }
 
-void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome) {
+void NoteFile(Diag_FTM& phone, const pkv::PkvOutcome& outcome) {
   phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
   Fail(Failure(KRAL_ERROR_BAD_FILE, "%s", outcome.text.c_str())
            .Status(KRAL_ERROR_STATUS_RESULT, StatusOf(outcome.result)));
 }
 
-uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set) {
+uint32_t ReadSet(Diag_FTM& phone, const std::string& path, pkv::PkvSet& set) {
   phone.pkv().counts = {};
-  const PkvOutcome outcome = ReadPkv(path, set);
+  const pkv::PkvOutcome outcome = pkv::ReadPkv(path, set);
   if (!outcome.done()) NoteFile(phone, outcome);
-  LogUnread(phone.log(), path, set);
+  pkv::LogUnread(phone.log(), path, set);
   if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
   phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
   Fail(FileFailure(path, "holds no item and no file").Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_BAD_ITEM));
@@ -123,17 +123,17 @@ std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone) {
   return items;
 }
 
-bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present) {
+bool IsSameFile(const pkv::PkvEfsFile& kept, const pkv::PkvEfsFile& present) {
   if (kept.bytes != present.bytes) return false;
   if (kept.mode == 0) return true;
   const bool same_kind = kept.is_item_file() == present.is_item_file() || kept.bytes.size() > KRAL_EFS_ITEM_SIZE;
   return same_kind && kept.permissions() == present.permissions();
 }
 
-ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {
-  const auto noted = NotedArrays(set.properties);
+ArrayItems::ArrayItems(Diag_FTM& phone, const pkv::PkvSet& set) {
+  const auto noted = pkv::NotedArrays(set.properties);
   if (noted) ids_ = *noted;
-  for (const PkvNvItem& item : set.items) {
+  for (const pkv::PkvNvItem& item : set.items) {
     if (item.index != 0) ids_.insert(item.id);
   }
   for (const auto& [id, highest_element] : DefinedItems(phone)) {
@@ -141,4 +141,4 @@ ArrayItems::ArrayItems(Diag_FTM& phone, const PkvSet& set) {
   }
 }
 
-}  // namespace kral::pkv
+}  // namespace kral::backup

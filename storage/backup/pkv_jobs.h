@@ -13,7 +13,7 @@
 #include "storage/nv/nv_definitions.h"
 #include "storage/pkv/pkv_set.h"
 
-namespace kral::pkv {
+namespace kral::backup {
 
 uint32_t Backup(Diag_FTM& phone, const std::string& path);   // pkv_backup.cpp
 uint32_t Restore(Diag_FTM& phone, const std::string& path);  // pkv_restore.cpp
@@ -32,8 +32,8 @@ class JobReport {
 
   // Each item and file is reported once. After the caller has stopped the job, by the callback or by an abort, they are
   // counted only.
-  void Add(const PkvNvItem& item, uint32_t result, uint32_t status);
-  void Add(const PkvEfsFile& file, uint32_t result, uint32_t status);
+  void Add(const pkv::PkvNvItem& item, uint32_t result, uint32_t status);
+  void Add(const pkv::PkvEfsFile& file, uint32_t result, uint32_t status);
   bool stopped() const { return stopped_ || aborts_.aborted(); }
   const KRAL_PKV_COUNTS& counts() const;
 
@@ -48,29 +48,29 @@ class JobReport {
 };
 
 // What is wrong with a file is logged, and noted as the failure.
-void NoteFile(Diag_FTM& phone, const PkvOutcome& outcome);
+void NoteFile(Diag_FTM& phone, const pkv::PkvOutcome& outcome);
 // Reads the file of a restore or a comparison.
-uint32_t ReadSet(Diag_FTM& phone, const std::string& path, PkvSet& set);
-uint32_t StatusOf(PkvResult result);
+uint32_t ReadSet(Diag_FTM& phone, const std::string& path, pkv::PkvSet& set);
+uint32_t StatusOf(pkv::PkvResult result);
 
 // The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.
 std::map<uint16_t, uint16_t> DefinedItems(Diag_FTM& phone);
 
 // Whether the handset holds what the file keeps: content, kind and permissions. A file that is too large for an item
 // file has come back as a plain one. A mode of 0 is unknown.
-bool IsSameFile(const PkvEfsFile& kept, const PkvEfsFile& present);
+bool IsSameFile(const pkv::PkvEfsFile& kept, const pkv::PkvEfsFile& present);
 
 // Which items are elements of arrays: those with an index word other than 0, all others of the same id in the set, and
 // those that the file notes. Where it has no such note, those that are defined so.
 class ArrayItems {
  public:
-  ArrayItems(Diag_FTM& phone, const PkvSet& set);
-  bool IsElement(const PkvNvItem& item) const { return ids_.contains(item.id); }
+  ArrayItems(Diag_FTM& phone, const pkv::PkvSet& set);
+  bool IsElement(const pkv::PkvNvItem& item) const { return ids_.contains(item.id); }
   // No request names both a subscription and an element.
-  bool IsInexpressible(const PkvNvItem& item) const { return item.subscription != 0 && IsElement(item); }
+  bool IsInexpressible(const pkv::PkvNvItem& item) const { return item.subscription != 0 && IsElement(item); }
   // An index that no request can name: it would become another element's. Or an item that is defined as an array, but
   // kept in a file that notes arrays and not this one: read without knowing which element.
-  bool HasNoPlace(const PkvNvItem& item) const {
+  bool HasNoPlace(const pkv::PkvNvItem& item) const {
     return item.index > nv::kHighestElement || unclear_.contains(item.id);
   }
 
@@ -79,6 +79,6 @@ class ArrayItems {
   std::set<uint16_t> unclear_;
 };
 
-}  // namespace kral::pkv
+}  // namespace kral::backup
 
 #endif

@@ -6,23 +6,23 @@
 #include "storage/backup/pkv_jobs.h"
 #include "storage/items/phone_items.h"
 
-namespace kral::pkv {
+namespace kral::backup {
 namespace {
 
-using Answer = PhoneItems::Answer;
+using Answer = items::PhoneItems::Answer;
 
 class RestoreJob {
  public:
-  RestoreJob(Diag_FTM& phone, const PkvSet& set)
+  RestoreJob(Diag_FTM& phone, const pkv::PkvSet& set)
       : items_(phone),
         set_(set),
         arrays_(phone, set),
         report_(phone, set.items.size() + set.files.size(), set.unread.size()) {}
 
   uint32_t Run() {
-    std::span<const PkvNvItem> rest(set_.items);  // subscription 0 comes first
+    std::span<const pkv::PkvNvItem> rest(set_.items);  // subscription 0 comes first
     while (!rest.empty() && !report_.stopped()) rest = rest.subspan(RestorePacket(rest));
-    for (const PkvEfsFile& file : set_.files) {
+    for (const pkv::PkvEfsFile& file : set_.files) {
       if (!report_.stopped()) RestoreFile(file);
     }
     const KRAL_PKV_COUNTS& counts = report_.counts();
@@ -33,14 +33,14 @@ class RestoreJob {
 
  private:
   // As many items as go together; gives how many these were.
-  size_t RestorePacket(std::span<const PkvNvItem> rest) {
-    const PkvNvItem& first = rest.front();
+  size_t RestorePacket(std::span<const pkv::PkvNvItem> rest) {
+    const pkv::PkvNvItem& first = rest.front();
     if (arrays_.HasNoPlace(first)) {
-      report_.Add(first, KRAL_PKV_REFUSED, PhoneItems::kRefusedStatus);
+      report_.Add(first, KRAL_PKV_REFUSED, items::PhoneItems::kRefusedStatus);
       return 1;
     }
     size_t count = 0;
-    while (count < std::min(rest.size(), PhoneItems::kMostInBatch) && rest[count].subscription == 0 &&
+    while (count < std::min(rest.size(), items::PhoneItems::kMostInBatch) && rest[count].subscription == 0 &&
            !arrays_.HasNoPlace(rest[count])) {
       ++count;
     }
@@ -63,8 +63,8 @@ class RestoreJob {
   }
 
   // In batches, each of which ends with its first refused item.
-  void WritePacket(std::span<const PkvNvItem> packet, std::vector<uint16_t>& statuses) {
-    const auto is_element = [this](const PkvNvItem& item) { return arrays_.IsElement(item); };
+  void WritePacket(std::span<const pkv::PkvNvItem> packet, std::vector<uint16_t>& statuses) {
+    const auto is_element = [this](const pkv::PkvNvItem& item) { return arrays_.IsElement(item); };
     while (statuses.size() < packet.size() && batches_work_ && !lost_) {
       std::vector<uint16_t> more;
       const Answer answer = items_.WriteBatch(packet.subspan(statuses.size()), is_element, more);
@@ -75,20 +75,20 @@ class RestoreJob {
   }
 
   // What the handset does not take in batches.
-  void WriteSingly(std::span<const PkvNvItem> packet, std::vector<uint16_t>& statuses) {
+  void WriteSingly(std::span<const pkv::PkvNvItem> packet, std::vector<uint16_t>& statuses) {
     while (statuses.size() < packet.size() && !lost_) {
-      const PkvNvItem& item = packet[statuses.size()];
+      const pkv::PkvNvItem& item = packet[statuses.size()];
       uint16_t status = 0;
       const Answer answer = items_.Write(item, arrays_.IsElement(item), status);
       lost_ = answer == Answer::kLost;
       if (lost_) return;
-      statuses.push_back(answer == Answer::kRefused ? uint16_t{PhoneItems::kRefusedStatus} : status);
+      statuses.push_back(answer == Answer::kRefused ? uint16_t{items::PhoneItems::kRefusedStatus} : status);
     }
   }
 
-  void Judge(const PkvNvItem& item, uint16_t status) {
+  void Judge(const pkv::PkvNvItem& item, uint16_t status) {
     if (status != nv::kDone && status != nv::kReadOnly) return report_.Add(item, KRAL_PKV_REFUSED, status);
-    PkvNvItem present = item;
+    pkv::PkvNvItem present = item;
     const Answer answer = lost_ ? Answer::kLost : items_.Read(present, arrays_.IsElement(item));
     lost_ = answer == Answer::kLost;
     const bool read = answer == Answer::kAnswered && present.status == nv::kDone;
@@ -101,12 +101,12 @@ class RestoreJob {
   }
 
   // A file that cannot be written may be there already, read-only as it was when it was backed up.
-  void RestoreFile(const PkvEfsFile& file) {
+  void RestoreFile(const pkv::PkvEfsFile& file) {
     uint32_t refusal = 0;
     const Answer written = lost_ ? Answer::kLost : items_.WriteFile(file, refusal);
     lost_ = written == Answer::kLost;
     if (lost_) return report_.Add(file, KRAL_PKV_NOT_REACHED, 0);
-    PkvEfsFile present{.path = file.path, .mode = 0, .bytes = {}};
+    pkv::PkvEfsFile present{.path = file.path, .mode = 0, .bytes = {}};
     uint32_t status = 0;
     const Answer read = ReadBack(file, present, status);
     lost_ = read == Answer::kLost;
@@ -118,7 +118,7 @@ class RestoreJob {
   }
 
   // Content first: the permissions may be such that it cannot be read afterwards.
-  Answer ReadBack(const PkvEfsFile& file, PkvEfsFile& present, uint32_t& status) {
+  Answer ReadBack(const pkv::PkvEfsFile& file, pkv::PkvEfsFile& present, uint32_t& status) {
     const Answer answer = items_.ReadPresent(present, status);
     if (answer != Answer::kAnswered || status != 0 || present.bytes != file.bytes) return answer;
     if (file.mode == 0 || present.permissions() == file.permissions()) return answer;
@@ -127,8 +127,8 @@ class RestoreJob {
     return items_.Status(file.path.c_str(), present.mode, size, status);
   }
 
-  PhoneItems items_;
-  const PkvSet& set_;
+  items::PhoneItems items_;
+  const pkv::PkvSet& set_;
   const ArrayItems arrays_;
   JobReport report_;
   bool batches_work_ = true;
@@ -138,9 +138,9 @@ class RestoreJob {
 }  // namespace
 
 uint32_t Restore(Diag_FTM& phone, const std::string& path) {
-  PkvSet set;
+  pkv::PkvSet set;
   if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
   return RestoreJob(phone, set).Run();
 }
 
-}  // namespace kral::pkv
+}  // namespace kral::backup

@@ -6,7 +6,7 @@
 #include "frame/orbt_server.h"
 #include "platform/forced_unwind.h"
 
-namespace kral {
+namespace kral::efs {
 
 bool EFS::Connect(DataLogFileHandler& log, uint16_t port) {
   const ServerFactory factory = CurrentServerFactory();
@@ -91,7 +91,6 @@ bool EFS::CreateCEFS(DataLogFileHandler& log, uint16_t port, EfsImageJob job, co
   return false;
 }
 
-namespace efs {
 namespace {
 
 template <class Job>
@@ -117,5 +116,4 @@ bool RunImageJob(Diag_FTM& phone, EfsImageJob job, const char* image_file) {
   return OnServer(phone, [&](EFS& efs) { return efs.CreateCEFS(phone.log(), phone.port(), job, Text(image_file)); });
 }
 
-}  // namespace efs
-}  // namespace kral
+}  // namespace kral::efs

@@ -15,6 +15,8 @@ namespace kral {
 class DataLogFileHandler;
 class Diag_FTM;
 
+namespace efs {
+
 class EFS final : public FamilyObject {
  public:
   bool EfsRmDir(DataLogFileHandler& log, uint16_t port, const std::string& folder);
@@ -33,8 +35,6 @@ class EFS final : public FamilyObject {
   std::unique_ptr<EfsServerPhone> phone_;
   std::unique_ptr<EfsModule> module_;
 };
-
-namespace efs {
 
 // Null arguments are empty names. 0 in direct mode, where there is no server.
 bool RemoveTree(Diag_FTM& phone, const char* folder);

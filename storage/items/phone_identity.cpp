@@ -22,7 +22,7 @@ std::string PropertyText(const char* text) {
 
 }  // namespace
 
-void AppendIdentity(Diag_FTM& phone, PkvProperties& properties) {
+void AppendIdentity(Diag_FTM& phone, pkv::PkvProperties& properties) {
   uint32_t serial = 0;
   if (diag::ReadSerialNumber(phone, &serial)) {
     std::array<char, 16> text{};

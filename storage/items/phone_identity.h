@@ -8,7 +8,7 @@
 namespace kral::items {
 
 // As far as the handset tells.
-void AppendIdentity(Diag_FTM& phone, PkvProperties& properties);
+void AppendIdentity(Diag_FTM& phone, pkv::PkvProperties& properties);
 
 }  // namespace kral::items
 

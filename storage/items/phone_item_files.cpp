@@ -9,7 +9,7 @@
 #include "storage/efs/efs_transfer.h"
 #include "storage/items/phone_items.h"
 
-namespace kral {
+namespace kral::items {
 namespace {
 
 // As they stand: some are without a slash in front.
@@ -109,7 +109,7 @@ PhoneItems::Answer PhoneItems::FindFiles(std::vector<FoundFile>& files) {
   return answer == Answer::kAnswered && !unlisted.empty() ? Answer::kRefused : answer;
 }
 
-PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::ReadItemFile(pkv::PkvEfsFile& file, uint32_t& status) {
   const Answer answer = Try([&] {
     status = efs::kDone;
     return efs::GetItem(phone_, efs::Tries::kOne, file.path.c_str(), KRAL_EFS_ITEM_SIZE, file.bytes, status);
@@ -124,7 +124,7 @@ PhoneItems::Answer PhoneItems::ReadItemFile(PkvEfsFile& file, uint32_t& status) 
              : sized;
 }
 
-PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t size, uint32_t& status) {
+PhoneItems::Answer PhoneItems::ReadPlainFile(pkv::PkvEfsFile& file, uint32_t size, uint32_t& status) {
   status = efs::kDone;
   if (size > kLargestFile) return Answer::kRefused;
   file.bytes.resize(size);
@@ -138,7 +138,7 @@ PhoneItems::Answer PhoneItems::ReadPlainFile(PkvEfsFile& file, uint32_t size, ui
   return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
 }
 
-PhoneItems::Answer PhoneItems::ReadTold(PkvEfsFile& file, uint32_t size, uint32_t& status) {
+PhoneItems::Answer PhoneItems::ReadTold(pkv::PkvEfsFile& file, uint32_t size, uint32_t& status) {
   file.bytes.clear();
   const bool item = file.is_item_file() && size <= KRAL_EFS_ITEM_SIZE;
   const Answer answer = item ? ReadItemFile(file, status) : ReadPlainFile(file, size, status);
@@ -146,7 +146,7 @@ PhoneItems::Answer PhoneItems::ReadTold(PkvEfsFile& file, uint32_t size, uint32_
   return answer;
 }
 
-PhoneItems::Answer PhoneItems::ReadPresent(PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::ReadPresent(pkv::PkvEfsFile& file, uint32_t& status) {
   uint32_t size = 0;
   const Answer told = Status(file.path.c_str(), file.mode, size, status);
   return told == Answer::kAnswered && status == efs::kDone ? ReadTold(file, size, status) : told;
@@ -163,14 +163,14 @@ void PhoneItems::MakeFolders(const std::string& path) {
   }
 }
 
-PhoneItems::Answer PhoneItems::WriteItemFile(const PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::WriteItemFile(const pkv::PkvEfsFile& file, uint32_t& status) {
   return Try([&] {
     status = efs::kDone;
     return efs::PutItem(phone_, file.path.c_str(), file.bytes, status);
   });
 }
 
-PhoneItems::Answer PhoneItems::WritePlainFile(const PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::WritePlainFile(const pkv::PkvEfsFile& file, uint32_t& status) {
   status = efs::kDone;
   if (efs::WriteMemory(phone_, file.bytes, file.path.c_str(), {})) return Answer::kAnswered;
   uint32_t mode = 0;
@@ -178,7 +178,7 @@ PhoneItems::Answer PhoneItems::WritePlainFile(const PkvEfsFile& file, uint32_t& 
   return Status(file.path.c_str(), mode, present, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
 }
 
-PhoneItems::Answer PhoneItems::WriteFile(const PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::WriteFile(const pkv::PkvEfsFile& file, uint32_t& status) {
   MakeFolders(file.path);
   const bool item = file.is_item_file() && file.bytes.size() <= KRAL_EFS_ITEM_SIZE;
   const Answer answer = item ? WriteItemFile(file, status) : WritePlainFile(file, status);
@@ -186,7 +186,7 @@ PhoneItems::Answer PhoneItems::WriteFile(const PkvEfsFile& file, uint32_t& statu
   return answer;
 }
 
-PhoneItems::Answer PhoneItems::SetPermissions(const PkvEfsFile& file, uint32_t& status) {
+PhoneItems::Answer PhoneItems::SetPermissions(const pkv::PkvEfsFile& file, uint32_t& status) {
   const auto permissions = static_cast<uint16_t>(file.permissions());
   const Answer answer = Try([&] {
     status = efs::kDone;
@@ -198,4 +198,4 @@ PhoneItems::Answer PhoneItems::SetPermissions(const PkvEfsFile& file, uint32_t& 
   return answer;
 }
 
-}  // namespace kral
+}  // namespace kral::items

@@ -9,14 +9,14 @@
 #include "commands/nv/nv_format.h"
 #include "frame/request_failure.h"
 
-namespace kral {
+namespace kral::items {
 namespace {
 
 constexpr int kTries = 3;
 
 constexpr size_t kElementSize = nv::kDataSize - 1;  // a write has the index in front
 
-std::vector<uint8_t> WireData(const PkvNvItem& item, bool element) {
+std::vector<uint8_t> WireData(const pkv::PkvNvItem& item, bool element) {
   if (!element) return {item.data.begin(), item.data.end()};
   std::vector<uint8_t> data{static_cast<uint8_t>(item.index)};
   data.insert(data.end(), item.data.begin(), item.data.begin() + kElementSize);
@@ -40,7 +40,7 @@ PhoneItems::Answer PhoneItems::Unanswered() {
   return phone_.IsPhoneConnected() ? Answer::kRefused : Answer::kLost;
 }
 
-PhoneItems::Answer PhoneItems::Read(PkvNvItem& item, bool element) {
+PhoneItems::Answer PhoneItems::Read(pkv::PkvNvItem& item, bool element) {
   return Try([&] {
     item.data = {};
     item.status = 0;
@@ -53,7 +53,7 @@ PhoneItems::Answer PhoneItems::Read(PkvNvItem& item, bool element) {
   });
 }
 
-PhoneItems::Answer PhoneItems::Write(const PkvNvItem& item, bool element, uint16_t& status) {
+PhoneItems::Answer PhoneItems::Write(const pkv::PkvNvItem& item, bool element, uint16_t& status) {
   const std::vector<uint8_t> data = WireData(item, element);
   return Try([&] {
     status = 0;
@@ -62,13 +62,13 @@ PhoneItems::Answer PhoneItems::Write(const PkvNvItem& item, bool element, uint16
   });
 }
 
-PhoneItems::Answer PhoneItems::WriteBatch(std::span<const PkvNvItem> items,
-                                          const std::function<bool(const PkvNvItem&)>& is_element,
+PhoneItems::Answer PhoneItems::WriteBatch(std::span<const pkv::PkvNvItem> items,
+                                          const std::function<bool(const pkv::PkvNvItem&)>& is_element,
                                           std::vector<uint16_t>& statuses) {
   return Try([&] {
     statuses.clear();
     std::deque<NvQueueItem> list;
-    for (const PkvNvItem& item : items) list.push_back({item.id, WireData(item, is_element(item))});
+    for (const pkv::PkvNvItem& item : items) list.push_back({item.id, WireData(item, is_element(item))});
     bool ours = true;
     nv::BatchOutcome outcome;
     const Reply reply = nv::WriteBatch(phone_, list, {}, outcome, [&](uint16_t id, uint8_t status) {
@@ -84,4 +84,4 @@ bool PhoneItems::MayBeReadOnly(uint16_t id) const {
   return std::find(list.begin(), list.end(), id) != list.end();
 }
 
-}  // namespace kral
+}  // namespace kral::items

@@ -15,7 +15,7 @@
 #include "storage/pkv/file_section.h"
 #include "storage/pkv/pkv_format.h"
 
-namespace kral {
+namespace kral::items {
 
 class PhoneItems {
  public:
@@ -33,10 +33,10 @@ class PhoneItems {
   PhoneItems& operator=(const PhoneItems&) = delete;
 
   // --- NV items; an `element` is the one of an array item that the index word names ---------------------------------
-  Answer Read(PkvNvItem& item, bool element);                           // data and status
-  Answer Write(const PkvNvItem& item, bool element, uint16_t& status);  // one by one
+  Answer Read(pkv::PkvNvItem& item, bool element);                           // data and status
+  Answer Write(const pkv::PkvNvItem& item, bool element, uint16_t& status);  // one by one
   // At most kMostInBatch of subscription 0, in one packet. Gives the statuses up to the first that is not 0.
-  Answer WriteBatch(std::span<const PkvNvItem> items, const std::function<bool(const PkvNvItem&)>& is_element,
+  Answer WriteBatch(std::span<const pkv::PkvNvItem> items, const std::function<bool(const pkv::PkvNvItem&)>& is_element,
                     std::vector<uint16_t>& statuses);
   // Whether the caller does not count the item's being read-only as a failure.
   bool MayBeReadOnly(uint16_t id) const;
@@ -60,11 +60,11 @@ class PhoneItems {
   Answer Status(const char* path, uint32_t& mode, uint32_t& size, uint32_t& status);
   // By path, and by the mode and size that the handset told. An item file that is larger than an item request takes is
   // read as a plain one, which not every handset lets happen.
-  Answer ReadTold(PkvEfsFile& file, uint32_t size, uint32_t& status);
+  Answer ReadTold(pkv::PkvEfsFile& file, uint32_t size, uint32_t& status);
   // By path; the mode is what the handset tells now.
-  Answer ReadPresent(PkvEfsFile& file, uint32_t& status);
-  Answer WriteFile(const PkvEfsFile& file, uint32_t& status);  // with its folders; permissions are the handset's
-  Answer SetPermissions(const PkvEfsFile& file, uint32_t& status);
+  Answer ReadPresent(pkv::PkvEfsFile& file, uint32_t& status);
+  Answer WriteFile(const pkv::PkvEfsFile& file, uint32_t& status);  // with its folders; permissions are the handset's
+  Answer SetPermissions(const pkv::PkvEfsFile& file, uint32_t& status);
 
  private:
   Answer Try(const std::function<Reply()>& ask);
@@ -72,10 +72,10 @@ class PhoneItems {
   Answer Walk(const std::string& path, int depth, std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
   bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
-  Answer ReadItemFile(PkvEfsFile& file, uint32_t& status);
-  Answer ReadPlainFile(PkvEfsFile& file, uint32_t size, uint32_t& status);
-  Answer WriteItemFile(const PkvEfsFile& file, uint32_t& status);
-  Answer WritePlainFile(const PkvEfsFile& file, uint32_t& status);
+  Answer ReadItemFile(pkv::PkvEfsFile& file, uint32_t& status);
+  Answer ReadPlainFile(pkv::PkvEfsFile& file, uint32_t size, uint32_t& status);
+  Answer WriteItemFile(const pkv::PkvEfsFile& file, uint32_t& status);
+  Answer WritePlainFile(const pkv::PkvEfsFile& file, uint32_t& status);
   void MakeFolders(const std::string& path);
 
   Diag_FTM& phone_;
@@ -86,6 +86,6 @@ class PhoneItems {
   std::set<std::string, std::less<>> folders_;  // that were made, or were there
 };
 
-}  // namespace kral
+}  // namespace kral::items
 
 #endif

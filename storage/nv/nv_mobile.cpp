@@ -12,7 +12,7 @@ namespace kral::nv {
 namespace {
 
 using Kind = NvAnswer::Kind;
-using Answer = PhoneItems::Answer;
+using Answer = items::PhoneItems::Answer;
 
 }  // namespace
 
@@ -36,8 +36,8 @@ bool NvMobile::CanName(const NvItem& item) const {
   return item.is_file() || !item.is_array() || subscription_ == 0;
 }
 
-PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
-  PkvNvItem numbered;
+pkv::PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
+  pkv::PkvNvItem numbered;
   numbered.id = *item.id;
   numbered.index = element;
   numbered.subscription = subscription_;
@@ -55,7 +55,7 @@ NvAnswer NvMobile::Read(NvItem& item, uint16_t element, NvBytes& stored) {
     }
     return ReadFile(item, stored);
   }
-  PkvNvItem numbered = Numbered(item, element);
+  pkv::PkvNvItem numbered = Numbered(item, element);
   const Answer answer = items_.Read(numbered, item.is_array());
   const size_t size = item.is_array() ? kDataSize - 1 : kDataSize;
   stored.assign(numbered.data.begin(), numbered.data.begin() + static_cast<std::ptrdiff_t>(size));
@@ -75,7 +75,7 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
     }
     return WriteFile(item, stored);
   }
-  PkvNvItem numbered = Numbered(item, element);
+  pkv::PkvNvItem numbered = Numbered(item, element);
   std::copy_n(stored.begin(), std::min(stored.size(), numbered.data.size()), numbered.data.begin());
   const Answer answer = items_.Write(numbered, item.is_array(), status);
   if (answer == Answer::kAnswered) {
@@ -96,7 +96,7 @@ NvAnswer NvMobile::ReadFile(NvItem& item, NvBytes& stored) {
     return {Kind::kRefused};
   }
   item.mode = mode;
-  PkvEfsFile file{item.path, mode, {}};
+  pkv::PkvEfsFile file{item.path, mode, {}};
   const Answer answer = items_.ReadTold(file, size, error);
   if (answer != Answer::kAnswered) return Judged(answer, 0);
   stored = std::move(file.bytes);
@@ -104,7 +104,7 @@ NvAnswer NvMobile::ReadFile(NvItem& item, NvBytes& stored) {
 }
 
 NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored) {
-  PkvEfsFile file{item.path, 0, {stored.begin(), stored.end()}};
+  pkv::PkvEfsFile file{item.path, 0, {stored.begin(), stored.end()}};
   uint32_t size = 0;
   uint32_t error = 0;
   const Answer told = items_.Status(item.path.c_str(), file.mode, size, error);
@@ -123,7 +123,7 @@ NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored
   return {error == 0 ? Kind::kOk : Kind::kRefused};
 }
 
-bool NvMobile::ListItemFiles(std::vector<PhoneItems::FoundFile>& files) {
+bool NvMobile::ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files) {
   return items_.FindFiles(files) == Answer::kAnswered;
 }
 

@@ -37,17 +37,17 @@ class NvMobile {
   NvAnswer Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored);
 
   // The files in the folders in which handsets keep item files. False when they could not all be listed.
-  bool ListItemFiles(std::vector<PhoneItems::FoundFile>& files);
+  bool ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files);
 
  private:
   NvAnswer ReadFile(NvItem& item, NvBytes& stored);
   NvAnswer WriteFile(const NvItem& item, std::span<const uint8_t> stored);
-  NvAnswer Judged(PhoneItems::Answer answer, uint16_t status);
-  PkvNvItem Numbered(const NvItem& item, uint16_t element) const;
+  NvAnswer Judged(items::PhoneItems::Answer answer, uint16_t status);
+  pkv::PkvNvItem Numbered(const NvItem& item, uint16_t element) const;
 
   Diag_FTM& phone_;
   const uint16_t subscription_;
-  PhoneItems items_;
+  items::PhoneItems items_;
   bool has_rf_dispatcher_ = true;  // until it refuses
 };
 

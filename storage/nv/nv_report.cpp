@@ -45,11 +45,11 @@ struct Pair {
 };
 using Pairs = std::map<Key, Pair>;
 
-void Collect(const PkvSet& set, std::optional<NvBytes> Pair::*side, Pairs& pairs) {
-  for (const PkvNvItem& item : set.items) {
+void Collect(const pkv::PkvSet& set, std::optional<NvBytes> Pair::*side, Pairs& pairs) {
+  for (const pkv::PkvNvItem& item : set.items) {
     pairs[{"", item.id, item.subscription, item.index}].*side = NvBytes(item.data.begin(), item.data.end());
   }
-  for (const PkvEfsFile& file : set.files) {
+  for (const pkv::PkvEfsFile& file : set.files) {
     pairs[{pkv::PathKey(file.path), 0, uint16_t{0}, uint16_t{0}}].*side = file.bytes;
   }
 }
@@ -135,8 +135,8 @@ std::string Summary(const std::string& first_name, const std::string& second_nam
 
 }  // namespace
 
-std::string ComparisonPage(const std::string& first_name, const PkvSet& first, const std::string& second_name,
-                           const PkvSet& second, NvDefinitions& definitions, NvComparison& comparison) {
+std::string ComparisonPage(const std::string& first_name, const pkv::PkvSet& first, const std::string& second_name,
+                           const pkv::PkvSet& second, NvDefinitions& definitions, NvComparison& comparison) {
   Pairs pairs;
   Collect(first, &Pair::first, pairs);
   Collect(second, &Pair::second, pairs);

@@ -19,8 +19,8 @@ struct NvComparison {
 
 // A page of HTML that needs nothing else: the counts, the differing items member by member, then the equal ones. Values
 // are decoded by their definitions; of items without one the bytes are shown.
-std::string ComparisonPage(const std::string& first_name, const PkvSet& first, const std::string& second_name,
-                           const PkvSet& second, NvDefinitions& definitions, NvComparison& comparison);
+std::string ComparisonPage(const std::string& first_name, const pkv::PkvSet& first, const std::string& second_name,
+                           const pkv::PkvSet& second, NvDefinitions& definitions, NvComparison& comparison);
 
 // Current values, a line each: title, name, subscription, index, numbers; separated by tabs.
 std::string QdfText(NvDefinitions& definitions);

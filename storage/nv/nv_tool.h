@@ -89,12 +89,12 @@ class NVTool_Manager final : public FamilyObject {
                        uint16_t& status) const;
 
   struct PkvArrays;
-  NvItem* ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, const PkvArrays& arrays);
+  NvItem* ItemOfPkv(Diag_FTM& phone, const pkv::PkvNvItem& entry, const PkvArrays& arrays);
   NvError TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored);
-  NvError TakeFile(Diag_FTM& phone, const PkvEfsFile& entry);
+  NvError TakeFile(Diag_FTM& phone, const pkv::PkvEfsFile& entry);
   // The highest index of the id in the source file makes an item that nobody defined an array.
   NvError TakeSource(Diag_FTM& phone, const NvSourceItem& entry, uint16_t highest_index);
-  bool AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value, PkvSet& set) const;
+  bool AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value, pkv::PkvSet& set) const;
 
   const KRAL_HANDLE handle_;
   KRAL_NV_CALLBACK callback_ = nullptr;

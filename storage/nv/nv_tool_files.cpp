@@ -17,24 +17,24 @@
 namespace kral::nv {
 namespace {
 
-NvError ErrorOf(const PkvOutcome& outcome) {
+NvError ErrorOf(const pkv::PkvOutcome& outcome) {
   switch (outcome.result) {
-    case PkvResult::kDone:
+    case pkv::PkvResult::kDone:
       return NvError::kNone;
-    case PkvResult::kNoStorage:
+    case pkv::PkvResult::kNoStorage:
       return NvError::kNoPkvStorage;
-    case PkvResult::kDamagedItem:
+    case pkv::PkvResult::kDamagedItem:
       return NvError::kBadPkvItem;
-    case PkvResult::kNoItem:
+    case pkv::PkvResult::kNoItem:
       return NvError::kNoValue;
-    case PkvResult::kCannotOpen:
-    case PkvResult::kCannotWrite:
+    case pkv::PkvResult::kCannotOpen:
+    case pkv::PkvResult::kCannotWrite:
       break;
   }
   return NvError::kCannotOpenPkv;
 }
 
-NvError Judged(Diag_FTM& phone, const PkvOutcome& outcome) {
+NvError Judged(Diag_FTM& phone, const pkv::PkvOutcome& outcome) {
   const NvError error = ErrorOf(outcome);
   if (error == NvError::kNone) return error;
   phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());  // begins with the path
@@ -42,10 +42,10 @@ NvError Judged(Diag_FTM& phone, const PkvOutcome& outcome) {
   return error;
 }
 
-NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, PkvSet& set) {
-  const PkvOutcome outcome = ReadPkv(file, set);
+NvError ReadPkvFile(Diag_FTM& phone, const std::string& file, pkv::PkvSet& set) {
+  const pkv::PkvOutcome outcome = pkv::ReadPkv(file, set);
   const NvError error = Judged(phone, outcome);
-  LogUnread(phone.log(), file, set);
+  pkv::LogUnread(phone.log(), file, set);
   return error;
 }
 
@@ -80,8 +80,8 @@ NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, s
 
 // What a PKV file tells of its items beside their values.
 struct NVTool_Manager::PkvArrays {
-  explicit PkvArrays(const PkvSet& set) : noted(pkv::NotedArrays(set.properties)) {
-    for (const PkvNvItem& entry : set.items) {
+  explicit PkvArrays(const pkv::PkvSet& set) : noted(pkv::NotedArrays(set.properties)) {
+    for (const pkv::PkvNvItem& entry : set.items) {
       auto& index = highest[entry.id];
       index = std::max(index, entry.index);
     }
@@ -97,7 +97,7 @@ struct NVTool_Manager::PkvArrays {
 
 // Null when the index word names no element, and when file and definition do not agree on what is an array: the first
 // byte of the value is then part of it, or is not.
-NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, const PkvArrays& arrays) {
+NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const pkv::PkvNvItem& entry, const PkvArrays& arrays) {
   NvItem* item = definitions_.FindNumbered(entry.id);
   const uint16_t highest_index = arrays.highest.at(entry.id);
   if (item == nullptr && highest_index <= kHighestElement) {
@@ -108,11 +108,11 @@ NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const PkvNvItem& entry, const
 }
 
 NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
-  PkvSet set;
+  pkv::PkvSet set;
   if (const NvError error = ReadPkvFile(phone, file, set); error != NvError::kNone) return error;
   const PkvArrays arrays(set);
   Walk walk(*this, KRAL_NV_OPERATION_READ_PKV, set.items.size() + set.files.size());
-  for (const PkvNvItem& entry : set.items) {
+  for (const pkv::PkvNvItem& entry : set.items) {
     NvItem* item = ItemOfPkv(phone, entry, arrays);
     NvError error = NvError::kBadPkvItem;
     if (item == nullptr) {
@@ -127,13 +127,13 @@ NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
     }
     walk.Report("NV ID " + std::to_string(entry.id), error);
   }
-  for (const PkvEfsFile& entry : set.files) {
+  for (const pkv::PkvEfsFile& entry : set.files) {
     walk.Report(Printable(entry.path), TakeFile(phone, entry));
   }
   return walk.failed() ? NvError::kBadPkvItem : NvError::kNone;
 }
 
-NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const PkvEfsFile& entry) {
+NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const pkv::PkvEfsFile& entry) {
   NvItem* item = definitions_.Find(entry.path);
   if (item == nullptr) {
     if (entry.bytes.size() > kLongestValue || !IsUsualPath(entry.path)) {
@@ -150,7 +150,7 @@ NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const PkvEfsFile& entry) {
 }
 
 bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slot, const NvBytes& value,
-                                 PkvSet& set) const {
+                                 pkv::PkvSet& set) const {
   auto stored = ToStored(item, value);
   if (!stored) {
     phone.log().WriteLine(kLogErr, "%s: its value has no room in a data field", item.Title().c_str());
@@ -161,7 +161,7 @@ bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slo
     set.files.push_back({item.path, mode, std::move(*stored)});
     return true;
   }
-  PkvNvItem entry;
+  pkv::PkvNvItem entry;
   entry.id = *item.id;
   entry.index = slot.element;
   entry.subscription = slot.subscription;
@@ -176,7 +176,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   for (const NvItem* item : items) total += item->values.size();
   if (total == 0) return NvError::kNoValue;
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_PKV, total);
-  PkvSet set;
+  pkv::PkvSet set;
   std::set<uint16_t> arrays;
   for (const NvItem* item : items) {
     if (item->is_array() && item->id) arrays.insert(*item->id);
@@ -191,7 +191,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   const bool has_handset = phone.port() != kNullPort && phone.connected() && phone.IsPhoneConnected();
   if (has_handset) items::AppendIdentity(phone, set.properties);
   pkv::NoteArrays(arrays, set.properties);
-  const PkvOutcome outcome = WritePkv(file, set, &phone.log());
+  const pkv::PkvOutcome outcome = pkv::WritePkv(file, set, &phone.log());
   return Judged(phone, outcome);
 }
 
@@ -295,8 +295,8 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
 
 NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, const std::string& second,
                                    const std::string& page) {
-  PkvSet first_set;
-  PkvSet second_set;
+  pkv::PkvSet first_set;
+  pkv::PkvSet second_set;
   if (const NvError error = ReadPkvFile(phone, first, first_set); error != NvError::kNone) return error;
   if (const NvError error = ReadPkvFile(phone, second, second_set); error != NvError::kNone) return error;
   NvComparison comparison;

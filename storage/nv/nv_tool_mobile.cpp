@@ -47,7 +47,7 @@ NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
 
 // False when there may be more files than those that were found.
 bool NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
-  std::vector<PhoneItems::FoundFile> files;
+  std::vector<items::PhoneItems::FoundFile> files;
   const bool listed = mobile.ListItemFiles(files);
   if (!listed) phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
   for (const auto& [path, mode, size] : files) {

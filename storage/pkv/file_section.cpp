@@ -7,23 +7,23 @@
 
 #include "base/little_endian.h"
 
-namespace kral {
+namespace kral::pkv {
 namespace {
 
 std::vector<uint8_t> EntryRecord(const PkvEfsFile& file) {
-  std::vector<uint8_t> record(pkv::kEntryPath + file.path.size());
+  std::vector<uint8_t> record(kEntryPath + file.path.size());
   StoreLe<uint32_t>(record, 0, file.mode);
-  StoreLe<uint32_t>(record, pkv::kEntrySize, static_cast<uint32_t>(file.bytes.size()));
-  std::copy(file.path.begin(), file.path.end(), record.begin() + pkv::kEntryPath);
+  StoreLe<uint32_t>(record, kEntrySize, static_cast<uint32_t>(file.bytes.size()));
+  std::copy(file.path.begin(), file.path.end(), record.begin() + kEntryPath);
   return record;
 }
 
 // A path with a zero in it would reach the handset as another one.
 bool ParseEntry(const std::vector<uint8_t>& record, const CompoundStream* data, PkvEfsFile& file) {
-  if (record.size() <= pkv::kEntryPath || data == nullptr) return false;
-  if (LoadLe<uint32_t>(record, pkv::kEntrySize) != data->bytes.size()) return false;
+  if (record.size() <= kEntryPath || data == nullptr) return false;
+  if (LoadLe<uint32_t>(record, kEntrySize) != data->bytes.size()) return false;
   file.mode = *LoadLe<uint32_t>(record, 0);
-  file.path.assign(record.begin() + pkv::kEntryPath, record.end());
+  file.path.assign(record.begin() + kEntryPath, record.end());
   file.bytes = data->bytes;
   return file.path.find('\0') == std::string::npos;
 }
@@ -31,26 +31,26 @@ bool ParseEntry(const std::vector<uint8_t>& record, const CompoundStream* data, 
 std::map<uint32_t, const CompoundStream*> NumberedStreams(const CompoundStorage& storage) {
   std::map<uint32_t, const CompoundStream*> streams;
   for (const CompoundStream& stream : storage.streams) {
-    if (const auto number = pkv::EntryOfName(stream.name)) streams.emplace(*number, &stream);
+    if (const auto number = EntryOfName(stream.name)) streams.emplace(*number, &stream);
   }
   return streams;
 }
 
 }  // namespace
 
-EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_view name, pkv::Access access)
+EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_view name, Access access)
     : storage_(configuration.FindStorage(name)), access_(access) {
-  if (storage_ == nullptr && access == pkv::Access::kReadWrite) storage_ = &configuration.OpenOrAddStorage(name);
+  if (storage_ == nullptr && access == Access::kReadWrite) storage_ = &configuration.OpenOrAddStorage(name);
   if (storage_ == nullptr) return;
-  directory_ = storage_->FindStorage(pkv::kEfsDirectory);
-  data_ = storage_->FindStorage(pkv::kEfsData);
-  if (access == pkv::Access::kRead) return;
-  directory_ = &storage_->OpenOrAddStorage(pkv::kEfsDirectory);
-  data_ = &storage_->OpenOrAddStorage(pkv::kEfsData);
+  directory_ = storage_->FindStorage(kEfsDirectory);
+  data_ = storage_->FindStorage(kEfsData);
+  if (access == Access::kRead) return;
+  directory_ = &storage_->OpenOrAddStorage(kEfsDirectory);
+  data_ = &storage_->OpenOrAddStorage(kEfsData);
   for (const auto& [number, entry] : NumberedStreams(*directory_)) {
-    if (entry->bytes.size() <= pkv::kEntryPath) continue;
-    const std::string path(entry->bytes.begin() + pkv::kEntryPath, entry->bytes.end());
-    numbers_.emplace(pkv::PathKey(path), number);
+    if (entry->bytes.size() <= kEntryPath) continue;
+    const std::string path(entry->bytes.begin() + kEntryPath, entry->bytes.end());
+    numbers_.emplace(PathKey(path), number);
   }
   for (const CompoundStorage* part : {directory_, data_}) {
     for (const auto& [number, stream] : NumberedStreams(*part)) used_.insert(number);
@@ -58,13 +58,13 @@ EfsEntryStorage::EfsEntryStorage(CompoundStorage& configuration, std::string_vie
 }
 
 bool EfsEntryStorage::Write(const PkvEfsFile& file) {
-  if (access_ == pkv::Access::kRead) return false;
-  const auto [known, added] = numbers_.emplace(pkv::PathKey(file.path), next_number_);
+  if (access_ == Access::kRead) return false;
+  const auto [known, added] = numbers_.emplace(PathKey(file.path), next_number_);
   if (added) {
     while (!used_.insert(next_number_).second) ++next_number_;
     known->second = next_number_;
   }
-  const std::string name = pkv::EntryName(known->second);
+  const std::string name = EntryName(known->second);
   if (added) {
     directory_->streams.push_back({name, {}});  // no search: the number is new
     data_->streams.push_back({name, {}});
@@ -77,9 +77,9 @@ bool EfsEntryStorage::Write(const PkvEfsFile& file) {
 }
 
 void EfsEntryStorage::Remove(std::string_view path) {
-  const auto known = numbers_.find(pkv::PathKey(path));
+  const auto known = numbers_.find(PathKey(path));
   if (known == numbers_.end()) return;
-  const std::string name = pkv::EntryName(known->second);
+  const std::string name = EntryName(known->second);
   const auto is_of_path = [&name](const CompoundStream& stream) { return stream.name == name; };
   directory_->streams.remove_if(is_of_path);
   data_->streams.remove_if(is_of_path);
@@ -93,7 +93,7 @@ bool EfsEntryStorage::Read(std::vector<PkvEfsFile>& files, std::string& problem)
     const auto content = contents.find(number);
     PkvEfsFile file;
     if (!ParseEntry(entry->bytes, content != contents.end() ? content->second : nullptr, file)) {
-      problem = storage_->name + "/" + std::string(pkv::kEfsDirectory) + "/" + entry->name + " is damaged";
+      problem = storage_->name + "/" + std::string(kEfsDirectory) + "/" + entry->name + " is damaged";
       return false;
     }
     files.push_back(std::move(file));
@@ -101,22 +101,22 @@ bool EfsEntryStorage::Read(std::vector<PkvEfsFile>& files, std::string& problem)
   return true;
 }
 
-CEFSItemBackup::CEFSItemBackup(CompoundStorage& configuration, pkv::Access access) : CEFSBackup(configuration, access) {
+CEFSItemBackup::CEFSItemBackup(CompoundStorage& configuration, Access access) : CEFSBackup(configuration, access) {
   if (storage_ == nullptr) return;
-  items_ = access == pkv::Access::kReadWrite ? &storage_->OpenOrAddStorage(pkv::kBackupItems)
-                                             : storage_->FindStorage(pkv::kBackupItems);
+  items_ =
+      access == Access::kReadWrite ? &storage_->OpenOrAddStorage(kBackupItems) : storage_->FindStorage(kBackupItems);
 }
 
 void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>& files) {
   const auto is_item = [](const PkvEfsFile& file) { return file.is_item_file(); };
   const auto open = [&](auto& storage, std::string_view name, bool needed) {
     // A place without files is not made.
-    if (needed || configuration.FindStorage(name) != nullptr) storage.emplace(configuration, pkv::Access::kReadWrite);
+    if (needed || configuration.FindStorage(name) != nullptr) storage.emplace(configuration, Access::kReadWrite);
   };
   std::optional<CItemFileStgAccess> item_files;
   std::optional<CEFSBackup> others;
-  open(item_files, pkv::kItemFiles, std::any_of(files.begin(), files.end(), is_item));
-  open(others, pkv::kEfsBackup, !std::all_of(files.begin(), files.end(), is_item));
+  open(item_files, kItemFiles, std::any_of(files.begin(), files.end(), is_item));
+  open(others, kEfsBackup, !std::all_of(files.begin(), files.end(), is_item));
   for (const PkvEfsFile& file : files) {
     if (is_item(file)) {
       if (others) others->Remove(file.path);
@@ -128,4 +128,4 @@ void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>
   }
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

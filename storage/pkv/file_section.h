@@ -13,7 +13,7 @@
 #include "storage/pkv/nv_storage.h"
 #include "storage/pkv/pkv_format.h"
 
-namespace kral {
+namespace kral::pkv {
 
 // One file of the handset with its full path and its mode (0xE000 in the high bits: an item file).
 struct PkvEfsFile {
@@ -37,11 +37,11 @@ class EfsEntryStorage {
   bool Read(std::vector<PkvEfsFile>& files, std::string& problem) const;
 
  protected:
-  EfsEntryStorage(CompoundStorage& configuration, std::string_view name, pkv::Access access);
+  EfsEntryStorage(CompoundStorage& configuration, std::string_view name, Access access);
   CompoundStorage* storage_;  // null: there is none and nothing may be created
 
  private:
-  const pkv::Access access_;
+  const Access access_;
   CompoundStorage* directory_ = nullptr;
   CompoundStorage* data_ = nullptr;
   std::map<std::string, uint32_t> numbers_;  // by pkv::PathKey
@@ -52,21 +52,20 @@ class EfsEntryStorage {
 // The item files.
 class CItemFileStgAccess final : public EfsEntryStorage {
  public:
-  CItemFileStgAccess(CompoundStorage& configuration, pkv::Access access)
-      : EfsEntryStorage(configuration, pkv::kItemFiles, access) {}
+  CItemFileStgAccess(CompoundStorage& configuration, Access access)
+      : EfsEntryStorage(configuration, kItemFiles, access) {}
 };
 
 // All other files.
 class CEFSBackup : public EfsEntryStorage {
  public:
-  CEFSBackup(CompoundStorage& configuration, pkv::Access access)
-      : EfsEntryStorage(configuration, pkv::kEfsBackup, access) {}
+  CEFSBackup(CompoundStorage& configuration, Access access) : EfsEntryStorage(configuration, kEfsBackup, access) {}
 };
 
 // An EFS backup with NV items of its own.
 class CEFSItemBackup final : public CEFSBackup {
  public:
-  CEFSItemBackup(CompoundStorage& configuration, pkv::Access access);
+  CEFSItemBackup(CompoundStorage& configuration, Access access);
 
   // Null when there are none and nothing may be created.
   CompoundStorage* items() { return items_; }
@@ -78,6 +77,6 @@ class CEFSItemBackup final : public CEFSBackup {
 // Both kinds at once: item files to one place, all others to the other. One that was in the other place leaves it.
 void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>& files);
 
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

@@ -3,23 +3,21 @@
 
 #include <algorithm>
 
-namespace kral {
+namespace kral::pkv {
 
-using pkv::kArrayRecordSize;
-
-void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, pkv::Access access) {
+void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, Access access) {
   Close();
   open_ = true;
   access_ = access;
   subscription_ = subscription;
-  const std::string name = pkv::NameOfSubscription(pkv::kItemArray, subscription);
-  stream_ = access == pkv::Access::kReadWrite ? &storage.OpenOrAddStream(name) : storage.FindStream(name);
+  const std::string name = NameOfSubscription(kItemArray, subscription);
+  stream_ = access == Access::kReadWrite ? &storage.OpenOrAddStream(name) : storage.FindStream(name);
   if (stream_ == nullptr) return;
   const std::span<const uint8_t> bytes(stream_->bytes);
   PkvNvItem item;
   uint16_t flags = 0;
-  for (size_t position = 0; pkv::ParseArrayRecord(bytes.subspan(position), item, flags); position += kArrayRecordSize) {
-    if ((flags & pkv::kRecordInUse) != 0) {
+  for (size_t position = 0; ParseArrayRecord(bytes.subspan(position), item, flags); position += kArrayRecordSize) {
+    if ((flags & kRecordInUse) != 0) {
       records_[item.id][position] = item.index;
     } else {
       free_slots_.insert(position);
@@ -30,7 +28,7 @@ void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, pkv::A
 PkvNvItem CNVItemStream::ItemAt(size_t position) const {
   PkvNvItem item;
   uint16_t flags = 0;
-  pkv::ParseArrayRecord(std::span<const uint8_t>(stream_->bytes).subspan(position), item, flags);
+  ParseArrayRecord(std::span<const uint8_t>(stream_->bytes).subspan(position), item, flags);
   item.subscription = subscription_;
   return item;
 }
@@ -72,7 +70,7 @@ size_t CNVItemStream::ClaimPosition(uint16_t id) {
 
 size_t CNVItemStream::Write(const PkvNvItem& item) {
   if (!writable()) return 0;
-  const auto record = pkv::ArrayRecord(item);
+  const auto record = ArrayRecord(item);
   const size_t position = ClaimPosition(item.id);  // first: it may move the bytes
   std::copy(record.begin(), record.end(), stream_->bytes.begin() + static_cast<ptrdiff_t>(position));
   records_[item.id][position] = item.index;
@@ -85,7 +83,7 @@ bool CNVItemStream::Delete(uint16_t id, std::optional<uint16_t> index) {
   const size_t count = std::erase_if(found->second, [&](const auto& record) {
     if (index && record.second != *index) return false;
     const auto begin = stream_->bytes.begin() + static_cast<ptrdiff_t>(record.first);
-    std::fill(begin + pkv::kArrayFlags, begin + kArrayRecordSize, uint8_t{0});
+    std::fill(begin + kArrayFlags, begin + kArrayRecordSize, uint8_t{0});
     free_slots_.insert(record.first);
     return true;
   });
@@ -93,4 +91,4 @@ bool CNVItemStream::Delete(uint16_t id, std::optional<uint16_t> index) {
   return count > 0;
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

@@ -10,13 +10,13 @@
 #include "platform/compound_file.h"
 #include "storage/pkv/pkv_format.h"
 
-namespace kral {
+namespace kral::pkv {
 
 // Refers to the storage's stream, which must outlive it.
 class CNVItemStream {
  public:
   // Without a stream of the subscription there are no items; only read-write access creates it.
-  void Open(CompoundStorage& storage, uint16_t subscription, pkv::Access access);
+  void Open(CompoundStorage& storage, uint16_t subscription, Access access);
   void Close() { *this = CNVItemStream(); }
   bool is_open() const { return open_; }
 
@@ -34,18 +34,18 @@ class CNVItemStream {
   bool Delete(uint16_t id, std::optional<uint16_t> index = std::nullopt);
 
  private:
-  bool writable() const { return stream_ != nullptr && access_ == pkv::Access::kReadWrite; }
+  bool writable() const { return stream_ != nullptr && access_ == Access::kReadWrite; }
   size_t ClaimPosition(uint16_t id);
   PkvNvItem ItemAt(size_t position) const;
 
   CompoundStream* stream_ = nullptr;
-  pkv::Access access_ = pkv::Access::kRead;
+  Access access_ = Access::kRead;
   uint16_t subscription_ = 0;
   bool open_ = false;
   std::map<uint16_t, std::map<size_t, uint16_t>> records_;  // by id: where they are, and their index words
   std::set<size_t> free_slots_;                             // the lowest is used first
 };
 
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

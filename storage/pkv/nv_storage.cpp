@@ -5,16 +5,16 @@
 
 #include "base/little_endian.h"
 
-namespace kral {
+namespace kral::pkv {
 
-CNVStorage::CNVStorage(CompoundStorage& storage, uint16_t subscription, pkv::Access access)
+CNVStorage::CNVStorage(CompoundStorage& storage, uint16_t subscription, Access access)
     : storage_(storage),
       subscription_(subscription),
       access_(access),
-      numbered_(storage.FindStorage(pkv::NameOfSubscription(pkv::kNumberedItems, subscription))) {
+      numbered_(storage.FindStorage(NameOfSubscription(kNumberedItems, subscription))) {
   if (numbered_ == nullptr) return;
   for (CompoundStorage& child : numbered_->storages) {
-    const auto id = pkv::NumberOfName(child.name);
+    const auto id = NumberOfName(child.name);
     if (id && *id <= UINT16_MAX) storages_.emplace(static_cast<uint16_t>(*id), &child);
   }
 }
@@ -22,22 +22,22 @@ CNVStorage::CNVStorage(CompoundStorage& storage, uint16_t subscription, pkv::Acc
 CompoundStorage* CNVStorage::NumberedStorage(uint16_t id) {
   const auto known = storages_.find(id);
   if (known != storages_.end()) return known->second;
-  if (access_ == pkv::Access::kRead) return nullptr;
+  if (access_ == Access::kRead) return nullptr;
   if (numbered_ == nullptr) {
-    numbered_ = &storage_.OpenOrAddStorage(pkv::NameOfSubscription(pkv::kNumberedItems, subscription_));
+    numbered_ = &storage_.OpenOrAddStorage(NameOfSubscription(kNumberedItems, subscription_));
   }
   CompoundStorage& added = numbered_->storages.emplace_back();
-  added.name = pkv::NumberedName(id);
+  added.name = NumberedName(id);
   storages_.emplace(id, &added);
   return &added;
 }
 
 size_t CNVStorage::Write(const PkvNvItem& item) {
-  if (array_.is_open()) return array_.Write(item) > 0 ? pkv::kNumberedRecordSize : 0;
+  if (array_.is_open()) return array_.Write(item) > 0 ? kNumberedRecordSize : 0;
   CompoundStorage* const storage = NumberedStorage(item.id);
-  if (storage == nullptr || access_ == pkv::Access::kRead) return 0;
-  const auto record = pkv::NumberedRecord(item);
-  storage->OpenOrAddStream(pkv::NumberedName(item.index)).bytes.assign(record.begin(), record.end());
+  if (storage == nullptr || access_ == Access::kRead) return 0;
+  const auto record = NumberedRecord(item);
+  storage->OpenOrAddStream(NumberedName(item.index)).bytes.assign(record.begin(), record.end());
   return record.size();
 }
 
@@ -45,12 +45,12 @@ bool CNVStorage::ReadNumbered(std::vector<PkvNvItem>& items, std::string& proble
   for (const auto& [id, storage] : storages_) {
     for (const CompoundStream& stream : storage->streams) {
       PkvNvItem item;
-      if (!pkv::ParseNumberedRecord(stream.bytes, item)) {
+      if (!ParseNumberedRecord(stream.bytes, item)) {
         problem = storage->name + "/" + stream.name + " has only " + std::to_string(stream.bytes.size()) + " of " +
-                  std::to_string(pkv::kNumberedRecordSize) + " bytes";
+                  std::to_string(kNumberedRecordSize) + " bytes";
         return false;
       }
-      if (item.id != id || LoadLe<uint16_t>(stream.bytes, pkv::kNumberedLength) != pkv::kNumberedRecordSize) {
+      if (item.id != id || LoadLe<uint16_t>(stream.bytes, kNumberedLength) != kNumberedRecordSize) {
         problem = storage->name + "/" + stream.name + " is damaged";
         return false;
       }
@@ -64,12 +64,12 @@ bool CNVStorage::ReadNumbered(std::vector<PkvNvItem>& items, std::string& proble
 std::vector<uint16_t> CNVStorage::Subscriptions(const CompoundStorage& storage) {
   std::set<uint16_t> found;
   for (const CompoundStream& stream : storage.streams) {
-    if (const auto number = pkv::SubscriptionOfName(stream.name, pkv::kItemArray)) found.insert(*number);
+    if (const auto number = SubscriptionOfName(stream.name, kItemArray)) found.insert(*number);
   }
   for (const CompoundStorage& child : storage.storages) {
-    if (const auto number = pkv::SubscriptionOfName(child.name, pkv::kNumberedItems)) found.insert(*number);
+    if (const auto number = SubscriptionOfName(child.name, kNumberedItems)) found.insert(*number);
   }
   return {found.begin(), found.end()};
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

@@ -8,12 +8,12 @@
 
 #include "storage/pkv/item_array.h"
 
-namespace kral {
+namespace kral::pkv {
 
 // Refers to the storage, which must outlive it.
 class CNVStorage {
  public:
-  CNVStorage(CompoundStorage& storage, uint16_t subscription, pkv::Access access);
+  CNVStorage(CompoundStorage& storage, uint16_t subscription, Access access);
 
   void OpenItemArray() { array_.Open(storage_, subscription_, access_); }
   void CloseItemArray() { array_.Close(); }
@@ -33,12 +33,12 @@ class CNVStorage {
 
   CompoundStorage& storage_;
   const uint16_t subscription_;
-  const pkv::Access access_;
+  const Access access_;
   CNVItemStream array_;
   CompoundStorage* numbered_ = nullptr;            // null: not there yet
   std::map<uint16_t, CompoundStorage*> storages_;  // of numbered items, remembered per id
 };
 
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

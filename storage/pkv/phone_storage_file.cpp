@@ -11,7 +11,7 @@
 #include "storage/pkv/nv_storage.h"
 #include "storage/pkv/pkv_format.h"
 
-namespace kral {
+namespace kral::pkv {
 
 std::string PkvVersionText() {
   std::array<char, 48> text{};
@@ -28,12 +28,12 @@ std::string CPhoneStorageFile::Save(const std::string& path) const {
 }
 
 CompoundStorage* CPhoneStorageFile::FindConfiguration() {
-  if (CompoundStorage* const found = root_.FindStorage(pkv::kConfiguration)) return found;
+  if (CompoundStorage* const found = root_.FindStorage(kConfiguration)) return found;
   return CNVStorage::Subscriptions(root_).empty() ? nullptr : &root_;
 }
 
 CompoundStorage& CPhoneStorageFile::configuration() {
-  return root_.OpenOrAddStorage(pkv::kConfiguration);
+  return root_.OpenOrAddStorage(kConfiguration);
 }
 
 std::vector<uint8_t> CPhoneStorageFile::PropertyBytes(const PkvProperties& properties) {
@@ -44,16 +44,15 @@ std::vector<uint8_t> CPhoneStorageFile::PropertyBytes(const PkvProperties& prope
 
 std::vector<uint8_t> CPhoneStorageFile::VersionBytes() {
   std::vector<uint8_t> bytes(8);
-  StoreLe<uint32_t>(bytes, 0, pkv::kLayoutMajor);
-  StoreLe<uint32_t>(bytes, 4, pkv::kLayoutMinor);
+  StoreLe<uint32_t>(bytes, 0, kLayoutMajor);
+  StoreLe<uint32_t>(bytes, 4, kLayoutMinor);
   return bytes;
 }
 
 PkvProperties CPhoneStorageFile::properties() {
   PkvProperties properties;
   const CompoundStorage* const configuration = FindConfiguration();
-  const CompoundStream* const stream =
-      configuration != nullptr ? configuration->FindStream(pkv::kPropertyInfo) : nullptr;
+  const CompoundStream* const stream = configuration != nullptr ? configuration->FindStream(kPropertyInfo) : nullptr;
   if (stream == nullptr) return properties;
   std::string_view rest(reinterpret_cast<const char*>(stream->bytes.data()), stream->bytes.size());
   bool first = true;
@@ -73,13 +72,13 @@ PkvProperties CPhoneStorageFile::properties() {
 
 CompoundStream* CPhoneStorageFile::FeatureMask() {
   CompoundStorage* const configuration = FindConfiguration();
-  return configuration != nullptr ? configuration->FindStream(pkv::kFeatureMask) : nullptr;
+  return configuration != nullptr ? configuration->FindStream(kFeatureMask) : nullptr;
 }
 
 CompoundStream* CPhoneStorageFile::RoamingList(uint32_t number) {
   CompoundStorage* const configuration = FindConfiguration();
-  const std::string name = std::string(pkv::kRoamingListPrefix) + std::to_string(number);
+  const std::string name = std::string(kRoamingListPrefix) + std::to_string(number);
   return configuration != nullptr ? configuration->FindStream(name) : nullptr;
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

@@ -9,7 +9,7 @@
 
 #include "platform/compound_file.h"
 
-namespace kral {
+namespace kral::pkv {
 
 // Of the handset a file was made from.
 struct PkvProperties {
@@ -46,6 +46,6 @@ class CPhoneStorageFile {
 // "VARN 6.0.29"
 std::string PkvVersionText();
 
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

@@ -23,8 +23,7 @@
 #include <string>
 #include <string_view>
 
-namespace kral {
-namespace pkv {
+namespace kral::pkv {
 
 // --- Names ----------------------------------------------------------------------------------------------------------
 
@@ -97,20 +96,16 @@ enum class Access : uint32_t {
   kReadWrite = 0x12,  // exclusive share + read and write; creates (0x1000 added) what is missing
 };
 
-}  // namespace pkv
-
 // One NV item as files and handsets keep it.
 struct PkvNvItem {
   uint16_t id = 0;
   uint16_t index = 0;  // index word: 0 for a plain item
   uint16_t subscription = 0;
   uint16_t status = 0;  // of the handset; not kept in files
-  std::array<uint8_t, pkv::kItemDataSize> data{};
+  std::array<uint8_t, kItemDataSize> data{};
 
   bool operator==(const PkvNvItem&) const = default;
 };
-
-namespace pkv {
 
 std::array<uint8_t, kArrayRecordSize> ArrayRecord(const PkvNvItem& item);
 std::array<uint8_t, kNumberedRecordSize> NumberedRecord(const PkvNvItem& item);
@@ -118,7 +113,6 @@ std::array<uint8_t, kNumberedRecordSize> NumberedRecord(const PkvNvItem& item);
 bool ParseArrayRecord(std::span<const uint8_t> bytes, PkvNvItem& item, uint16_t& flags);
 bool ParseNumberedRecord(std::span<const uint8_t> bytes, PkvNvItem& item);
 
-}  // namespace pkv
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

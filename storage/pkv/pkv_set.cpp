@@ -13,7 +13,7 @@
 #include "storage/pkv/pkv_unread.h"
 #include "storage/pkv/varn_pkv_file.h"
 
-namespace kral {
+namespace kral::pkv {
 namespace {
 
 constexpr StationSwitch kUsePkvFile{.registry_key = "SOFTWARE\\Kral\\VARN\\UsePkvFile",
@@ -38,7 +38,7 @@ void Normalize(std::vector<PkvEfsFile>& files, std::vector<std::string>& dropped
   std::map<std::string, size_t> kept;
   size_t count = 0;
   for (size_t i = 0; i < files.size(); ++i) {
-    const auto [known, added] = kept.emplace(pkv::PathKey(files[i].path), count);
+    const auto [known, added] = kept.emplace(PathKey(files[i].path), count);
     if (added) {
       if (count != i) files[count] = std::move(files[i]);
       ++count;
@@ -59,13 +59,13 @@ void Normalize(PkvSet& set) {
 
 // A record in use that tells another length is out of step: its value would be part of another one's.
 bool AreRecordsWhole(const CompoundStorage& storage, uint16_t subscription) {
-  const CompoundStream* const stream = storage.FindStream(pkv::NameOfSubscription(pkv::kItemArray, subscription));
+  const CompoundStream* const stream = storage.FindStream(NameOfSubscription(kItemArray, subscription));
   if (stream == nullptr) return true;
   const std::span<const uint8_t> bytes(stream->bytes);
   PkvNvItem item;
   uint16_t flags = 0;
-  for (size_t at = 0; pkv::ParseArrayRecord(bytes.subspan(at), item, flags); at += pkv::kArrayRecordSize) {
-    if ((flags & pkv::kRecordInUse) != 0 && LoadLe<uint16_t>(bytes, at) != pkv::kArrayRecordSize) return false;
+  for (size_t at = 0; ParseArrayRecord(bytes.subspan(at), item, flags); at += kArrayRecordSize) {
+    if ((flags & kRecordInUse) != 0 && LoadLe<uint16_t>(bytes, at) != kArrayRecordSize) return false;
   }
   return true;
 }
@@ -73,10 +73,10 @@ bool AreRecordsWhole(const CompoundStorage& storage, uint16_t subscription) {
 bool AppendItems(CompoundStorage& storage, std::vector<PkvNvItem>& items, std::string& problem) {
   for (const uint16_t subscription : CNVStorage::Subscriptions(storage)) {
     if (!AreRecordsWhole(storage, subscription)) {
-      problem = pkv::NameOfSubscription(pkv::kItemArray, subscription) + " is damaged";
+      problem = NameOfSubscription(kItemArray, subscription) + " is damaged";
       return false;
     }
-    CNVStorage source(storage, subscription, pkv::Access::kRead);
+    CNVStorage source(storage, subscription, Access::kRead);
     source.OpenItemArray();
     const std::vector<PkvNvItem> array = source.item_array().Items();
     items.insert(items.end(), array.begin(), array.end());
@@ -87,14 +87,13 @@ bool AppendItems(CompoundStorage& storage, std::vector<PkvNvItem>& items, std::s
 
 bool ReadConfiguration(CompoundStorage& configuration, PkvSet& set, std::string& problem) {
   if (!AppendItems(configuration, set.items, problem)) return false;
-  CEFSItemBackup backup(configuration, pkv::Access::kRead);
+  CEFSItemBackup backup(configuration, Access::kRead);
   // Behind the configuration's own items, which come first where both have one.
   if (backup.items() != nullptr && !AppendItems(*backup.items(), set.items, problem)) return false;
-  if (!CItemFileStgAccess(configuration, pkv::Access::kRead).Read(set.files, problem) ||
-      !backup.Read(set.files, problem)) {
+  if (!CItemFileStgAccess(configuration, Access::kRead).Read(set.files, problem) || !backup.Read(set.files, problem)) {
     return false;
   }
-  set.unread = pkv::UnreadParts(configuration);
+  set.unread = UnreadParts(configuration);
   Normalize(set);
   return true;
 }
@@ -108,13 +107,13 @@ void WriteWithStorageClasses(const std::string& path, const PkvSet& set) {
   for (const PkvNvItem& item : set.items) {
     auto& storages = item.index == 0 ? arrays : numbered;
     const auto [place, added] =
-        storages.try_emplace(item.subscription, configuration, item.subscription, pkv::Access::kReadWrite);
+        storages.try_emplace(item.subscription, configuration, item.subscription, Access::kReadWrite);
     if (added && item.index == 0) place->second.OpenItemArray();
     place->second.Write(item);
   }
   WriteEfsFiles(configuration, set.files);
-  configuration.OpenOrAddStream(pkv::kPropertyInfo).bytes = CPhoneStorageFile::PropertyBytes(set.properties);
-  file.root().OpenOrAddStream(pkv::kFileVersion).bytes = CPhoneStorageFile::VersionBytes();
+  configuration.OpenOrAddStream(kPropertyInfo).bytes = CPhoneStorageFile::PropertyBytes(set.properties);
+  file.root().OpenOrAddStream(kFileVersion).bytes = CPhoneStorageFile::VersionBytes();
   if (const std::string problem = file.Save(path); !problem.empty()) throw VARN_PkvFile::Exception(problem);
 }
 
@@ -183,4 +182,4 @@ PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandl
   return {};
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

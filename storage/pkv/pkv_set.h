@@ -14,6 +14,8 @@ namespace kral {
 
 class DataLogFileHandler;
 
+namespace pkv {
+
 struct PkvSet {
   std::vector<PkvNvItem> items;
   std::vector<PkvEfsFile> files;
@@ -57,6 +59,7 @@ PkvWriter ChosenPkvWriter();
 PkvOutcome WritePkv(const std::string& path, const PkvSet& set, DataLogFileHandler* log = nullptr,
                     PkvWriter writer = ChosenPkvWriter());
 
+}  // namespace pkv
 }  // namespace kral
 
 #endif

@@ -9,7 +9,7 @@
 #include "base/little_endian.h"
 #include "storage/pkv/nv_storage.h"
 
-namespace kral {
+namespace kral::pkv {
 namespace {
 
 struct ItemPlace {
@@ -21,22 +21,21 @@ struct ItemPlace {
 
 // In the order of subscriptions: the array in the order of its records, then the numbered items by id.
 void AppendArray(CompoundStorage& configuration, uint16_t subscription, std::vector<ItemPlace>& places) {
-  const CompoundStream* const stream = configuration.FindStream(pkv::NameOfSubscription(pkv::kItemArray, subscription));
+  const CompoundStream* const stream = configuration.FindStream(NameOfSubscription(kItemArray, subscription));
   if (stream == nullptr) return;
   const std::span<const uint8_t> bytes(stream->bytes);
   PkvNvItem item;
   uint16_t flags = 0;
-  for (size_t at = 0; pkv::ParseArrayRecord(bytes.subspan(at), item, flags); at += pkv::kArrayRecordSize) {
-    if ((flags & pkv::kRecordInUse) != 0) places.push_back({item.id, bytes.subspan(at), false, subscription});
+  for (size_t at = 0; ParseArrayRecord(bytes.subspan(at), item, flags); at += kArrayRecordSize) {
+    if ((flags & kRecordInUse) != 0) places.push_back({item.id, bytes.subspan(at), false, subscription});
   }
 }
 
 void AppendNumbered(CompoundStorage& configuration, uint16_t subscription, std::vector<ItemPlace>& places) {
-  const CompoundStorage* const numbered =
-      configuration.FindStorage(pkv::NameOfSubscription(pkv::kNumberedItems, subscription));
+  const CompoundStorage* const numbered = configuration.FindStorage(NameOfSubscription(kNumberedItems, subscription));
   if (numbered == nullptr) return;
   for (const CompoundStorage& storage : numbered->storages) {
-    const auto id = pkv::NumberOfName(storage.name);
+    const auto id = NumberOfName(storage.name);
     if (!id) continue;
     for (const CompoundStream& stream : storage.streams) places.push_back({*id, stream.bytes, true, subscription});
   }
@@ -45,9 +44,9 @@ void AppendNumbered(CompoundStorage& configuration, uint16_t subscription, std::
 // Where the items of one subscription go: each becomes a numbered item, and leaves the array it may have been in.
 struct Target {
   Target(CompoundStorage& configuration, uint16_t subscription)
-      : numbered(configuration, subscription, pkv::Access::kReadWrite) {
-    if (configuration.FindStream(pkv::NameOfSubscription(pkv::kItemArray, subscription)) != nullptr)
-      array.Open(configuration, subscription, pkv::Access::kReadWrite);
+      : numbered(configuration, subscription, Access::kReadWrite) {
+    if (configuration.FindStream(NameOfSubscription(kItemArray, subscription)) != nullptr)
+      array.Open(configuration, subscription, Access::kReadWrite);
   }
   void Write(const PkvNvItem& item) {
     array.Delete(item.id, item.index);
@@ -103,16 +102,16 @@ class VARN_PkvFile::IteratorImpl {
     const ItemPlace& place = content_->places[position_];
     NvItem item;
     uint16_t flags = 0;
-    const bool read = place.numbered ? pkv::ParseNumberedRecord(place.record, item)
-                                     : pkv::ParseArrayRecord(place.record, item, flags);
+    const bool read =
+        place.numbered ? ParseNumberedRecord(place.record, item) : ParseArrayRecord(place.record, item, flags);
     if (!read) {
       throw Exception("VARN_PkvFile::IteratorImpl::increamentImpl() - Tried to read NV Item: " +
                       std::to_string(place.id) + ". Was only able to read " + std::to_string(place.record.size()) +
-                      " out of " + std::to_string(pkv::kNumberedRecordSize));
+                      " out of " + std::to_string(kNumberedRecordSize));
     }
     // Another id or length word: the record is another one's, or out of step.
-    const auto length = LoadLe<uint16_t>(place.record, place.numbered ? pkv::kNumberedLength : 0);
-    if (item.id != place.id || length != (place.numbered ? pkv::kNumberedRecordSize : pkv::kArrayRecordSize)) {
+    const auto length = LoadLe<uint16_t>(place.record, place.numbered ? kNumberedLength : 0);
+    if (item.id != place.id || length != (place.numbered ? kNumberedRecordSize : kArrayRecordSize)) {
       throw Exception("VARN_PkvFile::IteratorImpl::increamentImpl() - NV Item: " + std::to_string(place.id) +
                       " is damaged");
     }
@@ -250,13 +249,13 @@ void VARN_PkvFile::writeToDiskImpl(CPhoneStorageFile& file) const {
   Room room(size_limit_);
   std::map<uint16_t, Target> targets;
   for (const NvItem& item : items_) {
-    const size_t granted = room.Claim(pkv::kNumberedRecordSize);
-    if (granted != pkv::kNumberedRecordSize)
-      raise("NV Item: '" + std::to_string(item.id) + "' but", granted, std::to_string(pkv::kNumberedRecordSize));
+    const size_t granted = room.Claim(kNumberedRecordSize);
+    if (granted != kNumberedRecordSize)
+      raise("NV Item: '" + std::to_string(item.id) + "' but", granted, std::to_string(kNumberedRecordSize));
     targets.try_emplace(item.subscription, configuration, item.subscription).first->second.Write(item);
   }
   for (const PkvEfsFile& entry : files_) {
-    const size_t size = pkv::kEntryPath + entry.path.size() + entry.bytes.size();
+    const size_t size = kEntryPath + entry.path.size() + entry.bytes.size();
     const size_t granted = room.Claim(size);
     if (granted != size) raise("EFS File: '" + entry.path + "' but", granted, std::to_string(size));
   }
@@ -267,9 +266,8 @@ void VARN_PkvFile::writeToDiskImpl(CPhoneStorageFile& file) const {
     if (granted != bytes.size()) raise(what, granted, std::to_string(bytes.size()));
     storage.OpenOrAddStream(name).bytes = std::move(bytes);
   };
-  write(configuration, pkv::kPropertyInfo, CPhoneStorageFile::PropertyBytes(properties_),
-        "the Mobile_Property_Info but");
-  write(file.root(), pkv::kFileVersion, CPhoneStorageFile::VersionBytes(), "the File_Version Stream but");
+  write(configuration, kPropertyInfo, CPhoneStorageFile::PropertyBytes(properties_), "the Mobile_Property_Info but");
+  write(file.root(), kFileVersion, CPhoneStorageFile::VersionBytes(), "the File_Version Stream but");
 }
 
-}  // namespace kral
+}  // namespace kral::pkv

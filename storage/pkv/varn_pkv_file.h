@@ -21,7 +21,7 @@
 #include "storage/pkv/file_section.h"
 #include "storage/pkv/phone_storage_file.h"
 
-namespace kral {
+namespace kral::pkv {
 
 class VARN_PkvFile {
  private:
@@ -102,6 +102,6 @@ class VARN_PkvFile {
   size_t size_limit_ = kCompoundFileLimit;
 };
 
-}  // namespace kral
+}  // namespace kral::pkv
 
 #endif

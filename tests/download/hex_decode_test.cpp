@@ -8,7 +8,7 @@
 #include "download/images/phone_image_dpaged.h"
 #include "tests/support/hex_files.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr uint32_t kNoAddress = 0xFFFFFFFF;
@@ -251,4 +251,4 @@ TEST(HexDecoder, LinesAcrossReadsAreKeptWhole) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::images

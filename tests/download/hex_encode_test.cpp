@@ -11,7 +11,7 @@
 #include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 struct Flags {
@@ -113,4 +113,4 @@ TEST(HexEncoder, ImageAndFileFailuresGiveFalse) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::images

@@ -12,7 +12,7 @@
 #include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 using Kind = PhoneImageException::Kind;
@@ -201,4 +201,4 @@ TEST(FlatImages, ShowTheirBytesAndDifferInWhatTheyRefuse) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::images

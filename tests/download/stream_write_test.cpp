@@ -71,7 +71,7 @@ TEST_F(StreamWrite, ImagesEndWhereTheAddressesEnd) {
 
 TEST(StreamWriteSize, IsBoundByTheFrame) {
   const auto fitting = [](const std::vector<uint8_t>& bytes, uint32_t address = 0) {
-    return CImageWriteCmdFramed::FittingSize(address, bytes);
+    return stream::CImageWriteCmdFramed::FittingSize(address, bytes);
   };
   EXPECT_EQ(fitting(std::vector<uint8_t>(20000, 0)), 16376u);
   EXPECT_EQ(fitting(std::vector<uint8_t>(16375, 0)), 16375u);

@@ -77,12 +77,12 @@ TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
   EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_WRITE_F NV Id:453 Status:0"));
 
   const std::string pkv = Pkv();
-  PkvSet signed_set;
-  ASSERT_TRUE(ReadPkv(pkv, signed_set).done());
+  pkv::PkvSet signed_set;
+  ASSERT_TRUE(pkv::ReadPkv(pkv, signed_set).done());
   ASSERT_EQ(signed_set.properties.values.size(), 6u);
   EXPECT_EQ(signed_set.properties.values.back(), std::pair(std::string("Arrays"), std::string("3100,3101")));
   EXPECT_EQ(signed_set.properties.values[0].first, "ESN");
-  EXPECT_EQ(signed_set.properties.version, PkvVersionText());
+  EXPECT_EQ(signed_set.properties.version, pkv::PkvVersionText());
   const std::string source = Source();
   const auto expect_values = [&](const char* from) {
     SCOPED_TRACE(from);
@@ -153,11 +153,11 @@ TEST_F(NvTool, AFileIsOneItemHoweverItsPathIsSpelled) {
   EXPECT_EQ(HexText(*handset().efs().File(kPath)), "03 04");
   EXPECT_EQ(nv::RfIdOfPath("nv/item_files/rfnv/00020001"), 20001);
 
-  PkvSet set;
+  pkv::PkvSet set;
   set.files = {{"nv/x", 0xE1B6, FromHex("01")}, {"nv/y", 0xE1B6, FromHex("02")}};
-  ASSERT_TRUE(WritePkv(Path("first.pkv"), set).done());
-  for (PkvEfsFile& file : set.files) file.path = "/" + file.path;
-  ASSERT_TRUE(WritePkv(Path("second.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(Path("first.pkv"), set).done());
+  for (pkv::PkvEfsFile& file : set.files) file.path = "/" + file.path;
+  ASSERT_TRUE(pkv::WritePkv(Path("second.pkv"), set).done());
   ASSERT_EQ(KRAL_NV_PKV_Diff(handle(), Path("first.pkv").c_str(), Path("second.pkv").c_str(), Path("page").c_str()),
             0u);
   EXPECT_NE(
@@ -181,10 +181,11 @@ TEST_F(NvTool, FilesKeepTheKindAndModeThatWereSeen) {
   add();
   ASSERT_EQ(KRAL_NV_LoadNVsFromMobile(handle()), 0u) << ErrorText();
   const auto pkv = Pkv();
-  PkvSet set;
-  ASSERT_TRUE(ReadPkv(pkv, set).done());
+  pkv::PkvSet set;
+  ASSERT_TRUE(pkv::ReadPkv(pkv, set).done());
   ASSERT_EQ(set.files.size(), 2u);
-  for (const PkvEfsFile& file : set.files) EXPECT_EQ(file.mode, file.bytes[0] == 1 ? 0x8180u : 0xE1A4u) << file.path;
+  for (const pkv::PkvEfsFile& file : set.files)
+    EXPECT_EQ(file.mode, file.bytes[0] == 1 ? 0x8180u : 0xE1A4u) << file.path;
   expect_modes_after_writing("handset");
   KRAL_NV_ClearNVDefinition(handle());
   ASSERT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 0u) << ErrorText();
@@ -288,10 +289,10 @@ TEST_F(NvTool, ArraysHaveGapsAndNoOtherSubscription) {
 
 TEST_F(NvTool, APkvFileTellsWhatIsAnArray) {
   handset().nv().MakeArray(5, 3);
-  PkvSet set;
+  pkv::PkvSet set;
   set.items.push_back({.id = 5, .data = {2, 7}});  // as a plain item: element 2
   set.properties.values = {{"Arrays", "5"}};
-  ASSERT_TRUE(WritePkv(Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(Path("phone.pkv"), set).done());
   ASSERT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), Path("phone.pkv").c_str()), 0u) << ErrorText();
   EXPECT_EQ(KRAL_NV_WriteNVsToMobile(handle()), 0u);
   EXPECT_EQ(handset().nv().Element(5, 0)->front(), 2);
@@ -481,14 +482,14 @@ TEST_F(NvTool, PkvItemsWithoutDefinitionAreGenericAndBadOnesAreTold) {
 }
 
 TEST_F(NvTool, PkvFilesWithPathsThatFitNowhereAreLeftOut) {
-  PkvSet set;
+  pkv::PkvSet set;
   const std::string longest(200, 'p');
   for (const std::string& path : {std::string("/nv/b\nt"), std::string("/nv/\xC3\xA4"), longest + "p"}) {
     set.files.push_back({path, 0xE1B6, FromHex("01")});
   }
   set.files.push_back({longest, 0xE1B6, FromHex("02")});
   const std::string pkv = Path("paths.pkv");
-  ASSERT_TRUE(WritePkv(pkv, set).done());
+  ASSERT_TRUE(pkv::WritePkv(pkv, set).done());
   EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
   uint32_t files = 0;
   KRAL_NV_GetNumOfNVEfsDefinition(handle(), &files);

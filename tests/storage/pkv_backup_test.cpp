@@ -69,9 +69,9 @@ class PkvBackup : public test::EfsTest {
     EXPECT_EQ(result, status == 0 ? 1 : 0);
     return status;
   }
-  PkvSet Read(const char* name = "phone.pkv") {
-    PkvSet set;
-    const PkvOutcome outcome = ReadPkv(folder_.Path(name), set);
+  pkv::PkvSet Read(const char* name = "phone.pkv") {
+    pkv::PkvSet set;
+    const pkv::PkvOutcome outcome = pkv::ReadPkv(folder_.Path(name), set);
     EXPECT_TRUE(outcome.done()) << outcome.text;
     return set;
   }
@@ -127,7 +127,7 @@ TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
   EXPECT_EQ(g_results["3"], Result(KRAL_PKV_DONE, 0));
   EXPECT_EQ(g_results["4"], Result(KRAL_PKV_SKIPPED, 5));
   EXPECT_TRUE(HasLine(KRAL_LOG_C_HIGH_LEVEL_START, "KRAL_NV_BackupNVFromMobile"));
-  const PkvSet first = Read();
+  const pkv::PkvSet first = Read();
   EXPECT_EQ(first.items.size(), 22u);
   EXPECT_EQ(first.properties.version, "VARN 6.0.29");
   EXPECT_EQ(first.properties.values[0].first, "ESN");
@@ -146,15 +146,15 @@ TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
   EXPECT_EQ(handset().efs().Mode(kRfFile).value_or(0) & 0xF000u, 0xE000u);
   EXPECT_EQ(Run(KRAL_PKV_Verify), 0u);
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "again.pkv"), 0u);
-  const PkvSet again = Read("again.pkv");
+  const pkv::PkvSet again = Read("again.pkv");
   EXPECT_EQ(again.items, first.items);
   EXPECT_EQ(again.files, first.files);
 }
 
 TEST_F(PkvBackup, ItemsAreRestoredInPacketsOfNineAndReadBack) {
-  PkvSet set;
+  pkv::PkvSet set;
   for (uint16_t id = 1; id <= 20; ++id) set.items.push_back({.id = id, .data = {static_cast<uint8_t>(id)}});
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   handset().ClearTrace();
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
   std::vector<size_t> sizes;
@@ -198,12 +198,12 @@ TEST_F(PkvBackup, AHandsetWithoutBatchesTakesItemsOneByOne) {
 
 TEST_F(PkvBackup, ElementsGoToTheElementsOfArrays) {
   handset().nv().MakeArray(5, 3);
-  PkvSet set;
+  pkv::PkvSet set;
   for (uint16_t index = 0; index < 4; ++index)
     set.items.push_back({.id = 5, .index = index, .data = {uint8_t(index + 1)}});
   set.items.push_back({.id = 5, .index = 0x101, .data = {0xEE}});
   set.items.push_back({.id = 5, .index = 1, .subscription = 1, .data = {9}});
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
   EXPECT_EQ(g_results["5"], Result(KRAL_PKV_DONE, 0));
   EXPECT_EQ(g_results["5[2]"], Result(KRAL_PKV_DONE, 0));
@@ -241,10 +241,10 @@ TEST_F(PkvBackup, DefinitionsNameElementsAndItemsBeyondTheRange) {
 // Whatever is defined when it is restored.
 TEST_F(PkvBackup, WhatIsAnArrayIsInTheFile) {
   handset().nv().MakeArray(5, 3);
-  PkvSet set;
+  pkv::PkvSet set;
   set.items.push_back({.id = 5, .data = {2, 7}});  // as a plain item: element 2
   set.properties.values = {{"Arrays", "x,5,70000,,"}};
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
   const Bytes element = handset().nv().Element(5, 0).value_or(Bytes{0, 0});
   EXPECT_EQ(Bytes(element.begin(), element.begin() + 2), (Bytes{2, 7}));
@@ -298,7 +298,7 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   for (uint16_t id = 1; id < 12; ++id) handset().nv().Set(id, RandomBytes(128, id));
   handset().efs().AddItemFile(kRfFile, RandomBytes(300));
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
-  const PkvSet good = Read("good.pkv");
+  const pkv::PkvSet good = Read("good.pkv");
   ShortenTimeOuts(20);
   for (const auto& row : kRows) {
     for (uint64_t packet : {2, 8, 14}) {
@@ -366,9 +366,9 @@ TEST_F(PkvBackup, AnUnpluggedCableLeavesTheOldFileAndTellsWhatWasReached) {
 }
 
 TEST_F(PkvBackup, ValuesThatAreNotKeptAreFound) {
-  PkvSet set;
+  pkv::PkvSet set;
   for (uint16_t id = 1; id <= 3; ++id) set.items.push_back({.id = id, .data = {1}});
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   handset().On(38, handset::Length::AtLeast(3), [](handset::ByteView request, handset::Wire& wire) {
     handset::ByteWriter reply;  // item 1 as written, item 2 otherwise, item 3 cannot be read
     reply.Raw(request.first(3)).U8(request[1] == 2 ? 0xFF : 1).Raw(Bytes(127)).U16(request[1] == 3 ? 4 : 0);
@@ -489,7 +489,7 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
   uint32_t status = 0;
   EXPECT_EQ(KRAL_BackupNVFromMobileToPKV(handle(), "", &status), 0);
   EXPECT_EQ(status, KRAL_PKV_STATUS_CANNOT_OPEN);
-  ASSERT_TRUE(WritePkv(folder_.Path("empty.pkv"), {}).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("empty.pkv"), {}).done());
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV, "empty.pkv"), KRAL_PKV_STATUS_BAD_ITEM);
   EXPECT_TRUE(handset().requests().empty());
   handset().nv().SetStatus(0, NvStatus::kInactive);
@@ -538,13 +538,13 @@ TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE) << ErrorText();
   EXPECT_EQ(g_results[large], Result(KRAL_PKV_REFUSED, 0xFFFF));
   EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
-  PkvSet set = Read();
+  pkv::PkvSet set = Read();
   ASSERT_EQ(set.files.size(), 1u);
   EXPECT_EQ(set.files[0].bytes, RandomBytes(1024));
   set.files.push_back({large, 0xE1FF, RandomBytes(1024)});  // as if it were whole
   set.files.push_back({far, 0x81FF, {1}});
   set.files.push_back({"/nv/items/last", 0xE1FF, {1}});
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
   EXPECT_EQ(g_results[large].first, KRAL_PKV_REFUSED);
   EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
@@ -554,9 +554,9 @@ TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
 
 TEST_F(PkvBackup, PermissionsComeBackAndARefusalOfThemIsTold) {
   const std::string with_none = "/nv/items/none";
-  PkvSet set;
+  pkv::PkvSet set;
   set.files = {{kRfFile, 0xE124, {1, 2}}, {with_none, 0x8000, {3}}};
-  ASSERT_TRUE(WritePkv(folder_.Path("phone.pkv"), set).done());
+  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
   Run(KRAL_RestoreNVFromPKV);
   EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DONE, 0));
   EXPECT_EQ(handset().efs().Mode(kRfFile), 0xE124u);

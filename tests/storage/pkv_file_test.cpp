@@ -13,10 +13,8 @@
 #include "storage/pkv/varn_pkv_file.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::pkv {
 namespace {
-
-using pkv::Access;
 
 PkvNvItem Item(uint16_t id, uint8_t fill, uint16_t index = 0, uint16_t subscription = 0) {
   PkvNvItem item{.id = id, .index = index, .subscription = subscription, .status = 0, .data = {}};
@@ -121,14 +119,13 @@ TEST(PkvNames, OnlyTheirOwnFormIsTaken) {
                {"NV_ITEM_ARRAY_SIM_", std::nullopt},
                {"NV_ITEM_ARRAY2", std::nullopt},
                {"NV_ITEM", std::nullopt}};
-  for (const auto& row : kRows)
-    EXPECT_EQ(pkv::SubscriptionOfName(row.text, pkv::kItemArray), row.subscription) << row.text;
-  EXPECT_EQ(pkv::NumberOfName("00012345"), 12345u);
-  EXPECT_EQ(pkv::EntryOfName("FFFFFFFF"), UINT32_MAX);
-  EXPECT_EQ(pkv::EntryName(0xBEEF), "0000BEEF");
-  EXPECT_EQ(pkv::RfNvPath(20203), "/nv/item_files/rfnv/00020203");
-  for (const char* text : {"1234567", "123456789", "0000000A", "-0000001", ""}) EXPECT_FALSE(pkv::NumberOfName(text));
-  for (const char* text : {"ffffffff", "0000000G"}) EXPECT_FALSE(pkv::EntryOfName(text));
+  for (const auto& row : kRows) EXPECT_EQ(SubscriptionOfName(row.text, kItemArray), row.subscription) << row.text;
+  EXPECT_EQ(NumberOfName("00012345"), 12345u);
+  EXPECT_EQ(EntryOfName("FFFFFFFF"), UINT32_MAX);
+  EXPECT_EQ(EntryName(0xBEEF), "0000BEEF");
+  EXPECT_EQ(RfNvPath(20203), "/nv/item_files/rfnv/00020203");
+  for (const char* text : {"1234567", "123456789", "0000000A", "-0000001", ""}) EXPECT_FALSE(NumberOfName(text));
+  for (const char* text : {"ffffffff", "0000000G"}) EXPECT_FALSE(EntryOfName(text));
 }
 
 // --- Sets, through both writers -------------------------------------------------------------------------------------
@@ -226,7 +223,7 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
       if (with_content) files.OpenOrAddStorage("EFS_Data").OpenOrAddStream("00000000");
     });
   };
-  auto longer = pkv::ArrayRecord(Item(2, 1));
+  auto longer = ArrayRecord(Item(2, 1));
   longer[0] = 0x87;
   const struct {
     const char* what;
@@ -240,7 +237,7 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
        [&] { tree([](auto& root) { root.OpenOrAddStorage("Default_Phone_Configuration"); }); }, PkvResult::kDone},
       {"a bare configuration", [&] { array(std::vector<uint8_t>(136)); }, PkvResult::kDone},
       {"a short numbered item", [&] { numbered({1}); }, PkvResult::kDamagedItem},
-      {"a record of another id than its storage", [&] { numbered(bytes_of(pkv::NumberedRecord(Item(2, 1)))); },
+      {"a record of another id than its storage", [&] { numbered(bytes_of(NumberedRecord(Item(2, 1)))); },
        PkvResult::kDamagedItem},
       {"an array record of another length", [&] { array(bytes_of(longer)); }, PkvResult::kDamagedItem},
       {"a file without content",
@@ -271,7 +268,7 @@ TEST_F(PkvFiles, RecordsOfOneIdWithDifferentIndexesAreItemsOfTheirOwn) {
   CompoundStorage root;
   std::vector<uint8_t>& records = root.OpenOrAddStream("NV_ITEM_ARRAY").bytes;
   for (const PkvNvItem& item : {Item(5, 1), Item(5, 2, 1), Item(5, 9, 2), Item(6, 4), Item(5, 3, 2)}) {
-    const auto record = pkv::ArrayRecord(item);
+    const auto record = ArrayRecord(item);
     records.insert(records.end(), record.begin(), record.end());
   }
   ASSERT_EQ(SaveCompoundFile(Path(), root), "");
@@ -333,7 +330,8 @@ TEST_F(PkvFiles, AFileThatCannotBeWrittenStaysAsItWas) {
     EXPECT_FALSE(outcome.text.empty());
   }
   folder_.Add("phone.pkv", "precious");
-  EXPECT_EQ(pkv::StatusOf(WritePkv(Path(), {}, nullptr, PkvWriter::kVarnPkvFile).result), KRAL_PKV_STATUS_NOTHING_READ);
+  EXPECT_EQ(backup::StatusOf(WritePkv(Path(), {}, nullptr, PkvWriter::kVarnPkvFile).result),
+            KRAL_PKV_STATUS_NOTHING_READ);
   EXPECT_EQ(folder_.Content("phone.pkv"), "precious");
 }
 
@@ -462,4 +460,4 @@ TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::pkv

@@ -12,7 +12,7 @@
 #include "kral/download.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 struct Layout {
@@ -145,4 +145,4 @@ TEST_F(HexOracle, StartAddressesAgree) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::images

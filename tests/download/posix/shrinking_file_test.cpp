@@ -8,7 +8,7 @@
 #include "tests/support/download_fixture.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::images {
 namespace {
 
 constexpr size_t kSize = 100000;
@@ -53,4 +53,4 @@ TEST_F(ShrinkingImage, EndsTheWriting) {
 }
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::images

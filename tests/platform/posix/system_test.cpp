@@ -59,11 +59,11 @@ TEST(TerminateProcessTest, EndsTheProcessOfThatNameAndNoOther) {
 }
 
 TEST(StationSwitchTest, AnEnvironmentVariableChoosesTheWriterOfBackups) {
-  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
+  EXPECT_EQ(pkv::ChosenPkvWriter(), pkv::PkvWriter::kStorageClasses);
   SetEnvironmentValue("KRAL_USE_PKV_FILE", "");
-  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kVarnPkvFile);
+  EXPECT_EQ(pkv::ChosenPkvWriter(), pkv::PkvWriter::kVarnPkvFile);
   SetEnvironmentValue("KRAL_USE_PKV_FILE", std::nullopt);
-  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
+  EXPECT_EQ(pkv::ChosenPkvWriter(), pkv::PkvWriter::kStorageClasses);
 }
 
 }  // namespace

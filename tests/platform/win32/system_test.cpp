@@ -135,13 +135,13 @@ TEST(PseudoTerminalTest, ThereIsNoneAndTheReasonIsTold) {
 
 TEST(StationSwitchTest, ARegistryKeyChoosesTheWriterOfBackups) {
   constexpr const char* kKey = "SOFTWARE\\Kral\\VARN\\UsePkvFile";
-  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kStorageClasses);
+  EXPECT_EQ(pkv::ChosenPkvWriter(), pkv::PkvWriter::kStorageClasses);
   HKEY key = nullptr;
   ASSERT_EQ(::RegCreateKeyExA(HKEY_LOCAL_MACHINE, kKey, 0, nullptr, REG_OPTION_VOLATILE, KEY_ALL_ACCESS, nullptr, &key,
                               nullptr),
             ERROR_SUCCESS);
   ::RegCloseKey(key);
-  EXPECT_EQ(ChosenPkvWriter(), PkvWriter::kVarnPkvFile);
+  EXPECT_EQ(pkv::ChosenPkvWriter(), pkv::PkvWriter::kVarnPkvFile);
   EXPECT_EQ(::RegDeleteKeyA(HKEY_LOCAL_MACHINE, kKey), ERROR_SUCCESS);
 }
 

@@ -9,7 +9,7 @@
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
-namespace kral {
+namespace kral::pkv {
 namespace {
 
 // Prints "path hex" for every stream.
@@ -109,4 +109,4 @@ TEST(CompoundFileOracle, OlefileReadsALargeOne) {
 INSTANTIATE_TEST_SUITE_P(BothWriters, PkvOracle, testing::Values(PkvWriter::kStorageClasses, PkvWriter::kVarnPkvFile));
 
 }  // namespace
-}  // namespace kral
+}  // namespace kral::pkv
