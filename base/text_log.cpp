@@ -11,6 +11,7 @@
 
 #include "base/at_exit.h"
 #include "base/guarded_call.h"
+#include "base/hex_dump.h"
 #include "base/little_endian.h"
 #include "base/text_log_format.h"
 #include "platform/file_util.h"
@@ -97,6 +98,10 @@ void DataLogFileHandler::WriteLine(uint32_t flag, const char* format, ...) {
   size_t length = indentation + std::min(static_cast<size_t>(formatted), room - 1);
   if (HoldsControl(WithoutEnd({line.data(), length}))) length = Escape(line, length);
   Deliver(flag, line.data(), length);
+}
+
+void DataLogFileHandler::WriteBytes(uint32_t flag, const char* format, std::span<const uint8_t> bytes) {
+  if (Wants(flag)) WriteLine(flag, format, static_cast<int>(bytes.size()), HexDump(bytes).c_str());
 }
 
 void DataLogFileHandler::WriteText(uint32_t flag, const char* text) {
@@ -223,6 +228,11 @@ bool DataLogFileHandler::IsCategoryOn(std::string_view name) const {
   const auto found = std::find_if(categories_.begin(), categories_.end(),
                                   [name](const Category& category) { return category.name == name; });
   return found != categories_.end() && found->on;
+}
+
+DataLogFileHandler& NullLog() {
+  static DataLogFileHandler log;
+  return log;
 }
 
 }  // namespace kral

@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <memory>
 #include <mutex>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -32,6 +33,8 @@ class DataLogFileHandler {
   // The library's path into the log. Callable from any thread; the callback runs outside the internal lock, and what it
   // causes to be written on its thread goes to the file only. Control characters of the arguments are escaped.
   [[gnu::format(gnu_printf, 3, 4)]] void WriteLine(uint32_t flag, const char* format, ...);
+  // The same with a format of one %d and one %s: for the number of bytes and their hex dump.
+  void WriteBytes(uint32_t flag, const char* format, std::span<const uint8_t> bytes);
   // A line of the caller's, as it is.
   void WriteText(uint32_t flag, const char* text);
 
@@ -80,6 +83,9 @@ class DataLogFileHandler {
   uint32_t callback_handle_ = 0;
   std::vector<Category> categories_;
 };
+
+// Takes nothing: for whoever has no log.
+DataLogFileHandler& NullLog();
 
 }  // namespace kral
 

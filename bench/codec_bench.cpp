@@ -12,6 +12,7 @@
 #include <random>
 #include <vector>
 
+#include "base/text_log.h"
 #include "bench/support/plain_hdlc.h"
 #include "transport/line/fcs16.h"
 #include "transport/line/hdlc_deframer.h"
@@ -157,7 +158,7 @@ struct Counter : kral::PacketListener {
 void Deframing(benchmark::State& state, const Bytes& stream, size_t payload_bytes, size_t expected) {
   Counter ours;
   Counter plain;
-  kral::HdlcDeframer deframer(ours);
+  kral::HdlcDeframer deframer(ours, kral::NullLog());
   kral::bench::PlainDeframer plain_deframer(
       [](void* context, const uint8_t* packet, size_t size) {
         static_cast<Counter*>(context)->OnPacket({packet, size});

@@ -15,10 +15,8 @@ namespace kral {
 
 struct Diag_FTM::Parts {
   explicit Parts(Clock& clock) : log(clock) {
-    sorter.SetLogger(&log);
     sorter.SetNames(&names);
     sorter.SetCapture(&capture);
-    capture.SetLogger(&log);
   }
 
   DataLogFileHandler log;
@@ -26,8 +24,8 @@ struct Diag_FTM::Parts {
   PacketQueue asynchronous;
   BoundedQueue<EventRecord> events;
   NameTables names;
-  CaptureWriter capture;
-  CKralEventListener sorter{responses, asynchronous, events};
+  CaptureWriter capture{log};
+  CKralEventListener sorter{responses, asynchronous, events, log};
   CKralEvents dispatcher;
   CapturePlayer player;
   std::optional<CKralThreadInterface> transport;  // direct mode

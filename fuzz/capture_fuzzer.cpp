@@ -6,6 +6,7 @@
 #include <cstdlib>
 
 #include "base/little_endian.h"
+#include "base/text_log.h"
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_reader.h"
 #include "transport/collection/kral_event_listener.h"
@@ -32,7 +33,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   PacketQueue responses;
   PacketQueue asynchronous;
   BoundedQueue<EventRecord> events;
-  CKralEventListener sorter(responses, asynchronous, events);
+  CKralEventListener sorter(responses, asynchronous, events, NullLog());
   sorter.SetCollection(true);
 
   CaptureRecord record;

@@ -37,9 +37,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
 
   Collector sink;
   kral::DataLogFileHandler log;
-  log.SetFlags(0xFFFFFFFF);
-  kral::HdlcDeframer deframer(sink);
-  if (data[0] >= 0x80) deframer.SetLogger(&log);
+  log.SetFlags(data[0] >= 0x80 ? 0xFFFFFFFF : 0);
+  kral::HdlcDeframer deframer(sink, log);
   kral::test::PlainDeframer plain;
 
   for (size_t at = 0; at < stream.size(); at += chunk_size) {

@@ -75,12 +75,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   PacketQueue responses;
   PacketQueue asynchronous;
   BoundedQueue<EventRecord> events;
-  CKralEventListener sorter(responses, asynchronous, events);
-  sorter.SetLogger(&log);
+  CKralEventListener sorter(responses, asynchronous, events, log);
   sorter.SetCollection((options & 0x08) != 0);
   Counter counter(sorter);
-  ChunkSplitter splitter(counter);
-  splitter.SetLogger(&log);
+  ChunkSplitter splitter(counter, log);
   splitter.SetAtReplyMode((options & 0x04) != 0);
 
   uint8_t mode = options & 0x03;

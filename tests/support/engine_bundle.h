@@ -20,15 +20,13 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
   static std::shared_ptr<EngineBundle> Make(DeviceOpener opener = {}, Clock& clock = SystemClock(),
                                             uint32_t log_flags = 0xFFFFFFFF) {
     auto bundle = std::make_shared<EngineBundle>(std::move(opener), clock, log_flags);
-    bundle->sorter.SetLogger(bundle->log.log());
-    bundle->transport.SetLogger(bundle->log.log());
     bundle->dispatcher.RegisterListener(&bundle->sorter, nullptr, bundle);
     bundle->transport.Attach(&bundle->dispatcher, &bundle->responses, &bundle->sorter);
     return bundle;
   }
 
   EngineBundle(DeviceOpener opener, Clock& clock, uint32_t log_flags)
-      : log(log_flags), transport(clock, std::move(opener)) {}
+      : log(log_flags), transport(*log.log(), clock, std::move(opener)) {}
 
   bool OpenDevice() { return transport.Open(7, {}, shared_from_this()); }
   bool OpenUser(const UserTransport& user) { return transport.Open(7, user, shared_from_this()); }
@@ -41,7 +39,7 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
   PacketQueue responses;
   PacketQueue asynchronous;
   BoundedQueue<EventRecord> events;
-  CKralEventListener sorter{responses, asynchronous, events};
+  CKralEventListener sorter{responses, asynchronous, events, *log.log()};
   CKralEvents dispatcher;
   CKralThreadInterface transport;
 };

@@ -93,7 +93,7 @@ Reading ReadAll(const Packet& bytes) {
 
 Packet Capture(const std::vector<Packet>& packets) {
   Disk disk;
-  CaptureWriter writer;
+  CaptureWriter writer(NullLog());
   EXPECT_TRUE(writer.Start(disk.Opener(), nullptr));
   for (const Packet& packet : packets) writer.Append(packet);
   EXPECT_TRUE(writer.Stop());
@@ -171,8 +171,7 @@ TEST(CaptureFile, DamageEndsTheReadingAndForeignFilesAreRefused) {
 TEST(CaptureFile, FullDiskIsCountedAndLoggedOnce) {
   test::LogLines log;
   Disk disk(16 + 14 + 5);
-  CaptureWriter writer;
-  writer.SetLogger(log.log());
+  CaptureWriter writer(*log.log());
   ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
   writer.Append(kPackets[0]);
   ASSERT_TRUE(Eventually([&] { return writer.written() == 1; }));
@@ -200,8 +199,7 @@ TEST(CaptureFile, FullDiskIsCountedAndLoggedOnce) {
 TEST(CaptureFile, SlowDiskCostsPacketsAndHoldsNobodyUp) {
   test::LogLines log;
   Disk disk;
-  CaptureWriter writer(100);
-  writer.SetLogger(log.log());
+  CaptureWriter writer(*log.log(), 100);
   ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
   disk.Hold(true);
   writer.Append(kPackets[0]);
@@ -228,7 +226,7 @@ TEST(CaptureFile, SlowDiskCostsPacketsAndHoldsNobodyUp) {
 
 TEST(CaptureFile, RecordsInFrontOfTheOneThatTheDiskCutAreNoLoss) {
   Disk disk(16 + 3 * 14 + 5);
-  CaptureWriter writer;
+  CaptureWriter writer(NullLog());
   ASSERT_TRUE(writer.Start(disk.Opener(), nullptr));
   disk.Hold(true);
   writer.Append(kPackets[0]);
@@ -244,8 +242,8 @@ TEST(CaptureFile, RecordsInFrontOfTheOneThatTheDiskCutAreNoLoss) {
 TEST(CaptureFile, IsWrittenByOneAloneAndNeverUnderAPlayback) {
   const test::TempFolder folder;
   const std::string path = folder.Path("capture");
-  CaptureWriter first;
-  CaptureWriter second;
+  CaptureWriter first(NullLog());
+  CaptureWriter second(NullLog());
   const auto open = [&path] { return OpenCaptureFile(path); };
   ASSERT_TRUE(first.Start(open, nullptr));
   first.Append(kPackets[0]);

@@ -22,7 +22,6 @@ Bytes Text(std::string_view text) {
 
 class Splitter : public testing::Test, public PacketListener {
  protected:
-  Splitter() { splitter_.SetLogger(log_.log()); }
   void OnPacket(std::span<const uint8_t> packet) override { packets_.emplace_back(packet.begin(), packet.end()); }
 
   std::vector<Bytes> Feed(std::initializer_list<Bytes> chunks) {
@@ -40,7 +39,7 @@ class Splitter : public testing::Test, public PacketListener {
 
   LogLines log_;
   std::vector<Bytes> packets_;
-  ChunkSplitter splitter_{*this};
+  ChunkSplitter splitter_{*this, *log_.log()};
 };
 
 using Texts = std::vector<std::string>;

@@ -33,8 +33,6 @@ Bytes Joined(std::initializer_list<Bytes> parts) {
 
 class HdlcDeframerTest : public testing::Test {
  protected:
-  HdlcDeframerTest() { deframer_.SetLogger(lines_.log()); }
-
   // What a chunk delivers.
   Packets Feed(const Bytes& chunk) {
     deframer_.Feed(chunk);
@@ -43,7 +41,7 @@ class HdlcDeframerTest : public testing::Test {
 
   test::LogLines lines_;
   Collector sink_;
-  HdlcDeframer deframer_{sink_};
+  HdlcDeframer deframer_{sink_, *lines_.log()};
 };
 
 TEST_F(HdlcDeframerTest, IntactAnswerIsDeliveredWithItsFcsAndLogged) {
@@ -114,7 +112,7 @@ TEST_F(HdlcDeframerTest, DroppedPartialTakesAPendingEscapeWithIt) {
 
 // Streams of frames and of rubbish in chunks of any size, against the plain splitter after every chunk.
 TEST_F(HdlcDeframerTest, AgreesWithPlainCodeOnAnyStreamInAnyChunks) {
-  deframer_.SetLogger(nullptr);
+  lines_.log()->SetFlags(0);
   std::mt19937 random(50);
   test::PlainDeframer plain;
   uint64_t delivered = 0;

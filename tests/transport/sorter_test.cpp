@@ -23,14 +23,13 @@ void PrintTo(const Sorted& s, std::ostream* out) {
 
 class Sorter : public testing::Test {
  protected:
-  Sorter() { sorter_.SetLogger(log_.log()); }
   Sorted Counts() const { return {responses_.size(), asynchronous_.size(), events_.size()}; }
 
   LogLines log_;
   PacketQueue responses_;
   PacketQueue asynchronous_;
   BoundedQueue<EventRecord> events_;
-  CKralEventListener sorter_{responses_, asynchronous_, events_};
+  CKralEventListener sorter_{responses_, asynchronous_, events_, *log_.log()};
 };
 
 // One event: id 5, truncated time stamp, no payload.

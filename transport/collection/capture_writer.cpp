@@ -140,10 +140,7 @@ bool CaptureWriter::Stop(uint32_t time_out_ms) {
     changed_.notify_one();
   }
   if (!ended_.WaitFor(time_out_ms)) {
-    DataLogFileHandler* const log = log_;
-    if (log != nullptr) {
-      log->WriteLine(kLogErr, "Capture file: %u packets still wait for the disk", static_cast<unsigned>(pending()));
-    }
+    log_.WriteLine(kLogErr, "Capture file: %u packets still wait for the disk", static_cast<unsigned>(pending()));
     return false;
   }
   thread_.Join();
@@ -200,9 +197,7 @@ size_t CaptureWriter::WriteInSlices(std::span<const uint8_t> bytes) {
 
 void CaptureWriter::Lose(uint64_t packets, const char* reason) {
   lost_.fetch_add(packets, std::memory_order_relaxed);
-  DataLogFileHandler* const log = log_;
-  if (loss_told_.exchange(true) || log == nullptr) return;
-  log->WriteLine(kLogErr, "Capture file: packets are lost, %s", reason);
+  if (!loss_told_.exchange(true)) log_.WriteLine(kLogErr, "Capture file: packets are lost, %s", reason);
 }
 
 }  // namespace kral

@@ -41,12 +41,10 @@ class CaptureWriter {
   // What waits for the disk at most; packets beyond are lost, and counted.
   static constexpr size_t kDefaultRoom = size_t{16} << 20;
 
-  explicit CaptureWriter(size_t room = kDefaultRoom) : room_(room) {}
+  explicit CaptureWriter(DataLogFileHandler& log, size_t room = kDefaultRoom) : log_(log), room_(room) {}
   ~CaptureWriter();
   CaptureWriter(const CaptureWriter&) = delete;
   CaptureWriter& operator=(const CaptureWriter&) = delete;
-
-  void SetLogger(DataLogFileHandler* log) { log_ = log; }
 
   // False when nothing can be opened or the head not be written; and, with nothing opened, while another capture runs
   // or is ending: its file may be the same one. `owner` holds this object, and is kept alive by the thread until it
@@ -75,8 +73,8 @@ class CaptureWriter {
   void WriteBatch(const Batch& batch, bool& failed);
   void Lose(uint64_t packets, const char* reason);
 
+  DataLogFileHandler& log_;
   const size_t room_;
-  std::atomic<DataLogFileHandler*> log_{nullptr};
   std::atomic<CaptureState> state_{CaptureState::kNone};  // changed under control_mutex_
   std::atomic<uint64_t> pending_packets_{0};
   std::atomic<uint64_t> written_{0};

@@ -30,8 +30,8 @@ void Increment(std::atomic<uint64_t>& counter) {
 }  // namespace
 
 CKralEventListener::CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous,
-                                       BoundedQueue<EventRecord>& events)
-    : responses_(responses), asynchronous_(asynchronous), events_(events) {}
+                                       BoundedQueue<EventRecord>& events, DataLogFileHandler& log)
+    : responses_(responses), asynchronous_(asynchronous), events_(events), log_(log) {}
 
 void CKralEventListener::OnPacket(std::span<const uint8_t> packet) {
   TakePacket({packet.begin(), packet.end()});
@@ -73,12 +73,11 @@ void CKralEventListener::OnPortOpened() {
 }
 
 bool CKralEventListener::IsWatched() const {
-  const DataLogFileHandler* const log = log_;
-  return has_callbacks_ || (log != nullptr && log->Wants(kLogIo | kLogAsync));
+  return has_callbacks_ || log_.Wants(kLogIo | kLogAsync);
 }
 
 void CKralEventListener::QueueResponse(Packet packet, const char* format) {
-  LogPacket(kLogIo, format, packet);
+  log_.WriteBytes(kLogIo, format, packet);
   // Whoever has the answer finds what came before it.
   asynchronous_.Publish();
   events_.Publish();
@@ -86,7 +85,7 @@ void CKralEventListener::QueueResponse(Packet packet, const char* format) {
 }
 
 void CKralEventListener::QueueAsynchronous(Packet packet) {
-  LogPacket(kLogAsync, "ASYNC REC (%d bytes): %s", packet);
+  log_.WriteBytes(kLogAsync, "ASYNC REC (%d bytes): %s", packet);
   if (!collecting_) {
     Increment(dropped_not_collecting_);
     return;
@@ -101,13 +100,12 @@ void CKralEventListener::QueueAsynchronous(Packet packet) {
 }
 
 void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks) {
-  DataLogFileHandler* const log = log_;
-  const bool logging = log != nullptr && log->Wants(kLogAsync);
+  const bool logging = log_.Wants(kLogAsync);
   EventReportReader reader(event_report);
   while (const auto event = reader.Next()) {
     if (logging) {
-      log->WriteLine(kLogAsync, "Event ID: %d, %s", event->id, EventText(event->id).c_str());
-      log->WriteLine(kLogAsync, " Event payload data: %s", HexDump(event->payload).c_str());
+      log_.WriteLine(kLogAsync, "Event ID: %d, %s", event->id, EventText(event->id).c_str());
+      log_.WriteLine(kLogAsync, " Event payload data: %s", HexDump(event->payload).c_str());
     }
     if (callbacks.event != nullptr) {
       KRAL_EVENT record;
@@ -135,12 +133,6 @@ TrafficCounters CKralEventListener::counters() const {
   counters.dropped_not_collecting = dropped_not_collecting();
   counters.oversized = dropped_by_size();
   return counters;
-}
-
-void CKralEventListener::LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet) {
-  DataLogFileHandler* const log = log_;
-  if (log == nullptr || !log->Wants(flag)) return;
-  log->WriteLine(flag, format, static_cast<int>(packet.size()), HexDump(packet).c_str());
 }
 
 void CKralEventListener::SetRawPacketCallback(RawPacketCallback callback, uintptr_t value) {

@@ -50,7 +50,8 @@ class LogHandler {
 // Packets come on the dispatcher thread, or on a phone server's threads; everything else from any thread.
 class CKralEventListener : public PacketListener, public PortWatcher {
  public:
-  CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous, BoundedQueue<EventRecord>& events);
+  CKralEventListener(PacketQueue& responses, PacketQueue& asynchronous, BoundedQueue<EventRecord>& events,
+                     DataLogFileHandler& log);
 
   void OnPacket(std::span<const uint8_t> packet) override;
   void TakePacket(Packet packet) override;
@@ -60,7 +61,6 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   PacketQueue& asynchronous() { return asynchronous_; }
   BoundedQueue<EventRecord>& events() { return events_; }
 
-  void SetLogger(DataLogFileHandler* log) { log_ = log; }
   // Before the first packet; both outlive the sorter. The texts of events, and where collected packets go as well.
   void SetNames(const NameTables* names) { names_ = names; }
   void SetCapture(CaptureWriter* capture) { capture_ = capture; }
@@ -94,13 +94,12 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   CollectionCallbacks collection_callbacks();
   void NoteCallbacks();  // callbacks locked
   std::string EventText(uint16_t id) const;
-  void LogPacket(uint32_t flag, const char* format, std::span<const uint8_t> packet);
 
   PacketQueue& responses_;
   PacketQueue& asynchronous_;
   BoundedQueue<EventRecord>& events_;
+  DataLogFileHandler& log_;
 
-  std::atomic<DataLogFileHandler*> log_{nullptr};
   std::atomic<bool> collecting_{false};
   const NameTables* names_ = nullptr;
   CaptureWriter* capture_ = nullptr;

@@ -24,11 +24,12 @@ bool IsSame(const UserTransport& a, const UserTransport& b) {
 
 }  // namespace
 
-CKralThreadInterface::CKralThreadInterface(Clock& clock, DeviceOpener opener)
-    : clock_(clock), port_(clock, std::move(opener)), framer_(clock) {
+CKralThreadInterface::CKralThreadInterface(DataLogFileHandler& log, Clock& clock, DeviceOpener opener)
+    : log_(log), clock_(clock), port_(clock, std::move(opener)), framer_(clock) {
   framer_.SetPort(&port_);
+  framer_.SetLogger(&log);
   loop_.SetGoneHandler([this] {
-    if (log_) log_->WriteLine(kLogErr, "Error. The device has gone: its port is closed");
+    log_.WriteLine(kLogErr, "Error. The device has gone: its port is closed");
     EndWaits();
   });
 }
@@ -59,24 +60,10 @@ void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   gathered_.clear();
 }
 
-void CKralThreadInterface::SetLogger(DataLogFileHandler* log) {
-  if (log == log_) return;
-  const bool resume = worker_.running() && !paused_;
-  if (resume && !PauseThread()) {
-    ResumeThread();
-    return;  // the thread may be writing a line: it keeps its log
-  }
-  log_ = log;
-  framer_.SetLogger(log);
-  splitter_.SetLogger(log);
-  loop_.SetLogger(log);
-  if (resume) ResumeThread();
-}
-
 bool CKralThreadInterface::Open(uint32_t port_number, const UserTransport& user, std::shared_ptr<void> owner) {
-  if (log_) log_->WriteLine(kLogFn, "Port open request, first close port");
+  log_.WriteLine(kLogFn, "Port open request, first close port");
   Close();
-  if (log_) log_->WriteLine(kLogFn, "Port open request, proceed with open");
+  log_.WriteLine(kLogFn, "Port open request, proceed with open");
   const char* failure = "Port open failed";
   try {
     connected_ = OpenPort(port_number, user) && RunThread(std::move(owner));
@@ -86,7 +73,7 @@ bool CKralThreadInterface::Open(uint32_t port_number, const UserTransport& user,
     connected_ = false;
   }
   if (connected_) return true;
-  if (log_) log_->WriteLine(kLogErr, "%s", failure);
+  log_.WriteLine(kLogErr, "%s", failure);
   port_.Close();
   return false;
 }
@@ -128,16 +115,12 @@ bool CKralThreadInterface::RunThread(std::shared_ptr<void> owner) {
 }
 
 bool CKralThreadInterface::Close() {
-  if (log_) {
-    log_->WriteLine(kLogFn, "Port close request.  Connected = %d, User Defined Transport = %d", connected_ ? 1 : 0,
-                    user_defined_ ? 1 : 0);
-  }
+  log_.WriteLine(kLogFn, "Port close request.  Connected = %d, User Defined Transport = %d", connected_ ? 1 : 0,
+                 user_defined_ ? 1 : 0);
   if (!connected_ || user_defined_) {
-    if (log_) {
-      log_->WriteLine(kLogFn,
-                      "Port close was not issued because connected flag not set or user defined transport is being "
-                      "used");
-    }
+    log_.WriteLine(kLogFn,
+                   "Port close was not issued because connected flag not set or user defined transport is being "
+                   "used");
     return true;
   }
   connected_ = false;
@@ -165,20 +148,18 @@ void CKralThreadInterface::BeginTraffic() {
 
 bool CKralThreadInterface::PauseThread() {
   if (paused_) {
-    if (log_) log_->WriteLine(kLogFn, "CKralThreadInterface::PauseThread - thread is already paused");
+    log_.WriteLine(kLogFn, "CKralThreadInterface::PauseThread - thread is already paused");
     return true;
   }
   if (!worker_.running()) return true;  // nothing reads
   control_.RequestPause();
   port_.Wake();
   if (!control_.AwaitPause(kAcknowledgeMs)) {
-    if (log_) {
-      log_->WriteLine(kLogErr, "CKralThreadInterface::PauseThread - Thread Pause event ack failed due to timeout=%d ms",
-                      static_cast<int>(kAcknowledgeMs));
-    }
+    log_.WriteLine(kLogErr, "CKralThreadInterface::PauseThread - Thread Pause event ack failed due to timeout=%d ms",
+                   static_cast<int>(kAcknowledgeMs));
     return false;
   }
-  if (log_) log_->WriteLine(kLogFn, "CKralThreadInterface::PauseThread - Thread Pause event ack succeeded");
+  log_.WriteLine(kLogFn, "CKralThreadInterface::PauseThread - Thread Pause event ack succeeded");
   paused_ = true;
   return true;
 }
@@ -195,12 +176,12 @@ bool CKralThreadInterface::StopThread() {
   if (was_running) {
     control_.RequestStop();
     port_.Wake();
-    if (log_) log_->WriteLine(kLogFn, "CKralThreadInterface::StopThread - waiting for thread stop event");
+    log_.WriteLine(kLogFn, "CKralThreadInterface::StopThread - waiting for thread stop event");
     if (!control_.AwaitStop(kAcknowledgeMs)) {
-      if (log_) log_->WriteLine(kLogErr, "CKralThreadInterface::StopThread - thread stop event was not received");
+      log_.WriteLine(kLogErr, "CKralThreadInterface::StopThread - thread stop event was not received");
       return false;
     }
-    if (log_) log_->WriteLine(kLogFn, "CKralThreadInterface::StopThread - thread stop event was received");
+    log_.WriteLine(kLogFn, "CKralThreadInterface::StopThread - thread stop event was received");
   }
   worker_.Join();
   paused_ = false;

@@ -33,7 +33,8 @@ inline constexpr uint32_t kNullPort = 65534;
 // counters() and the receive settings from any.
 class CKralThreadInterface {
  public:
-  explicit CKralThreadInterface(Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
+  explicit CKralThreadInterface(DataLogFileHandler& log, Clock& clock = SystemClock(),
+                                DeviceOpener opener = OpenComPort);
   ~CKralThreadInterface();
   CKralThreadInterface(const CKralThreadInterface&) = delete;
   CKralThreadInterface& operator=(const CKralThreadInterface&) = delete;
@@ -41,7 +42,6 @@ class CKralThreadInterface {
   // Before the first Open: where packets go, and the queue into which replies come of them. All are kept by the owner
   // that is given to Open.
   void Attach(CKralEvents* dispatcher, PacketQueue* responses, PortWatcher* watcher);
-  void SetLogger(DataLogFileHandler* log);
 
   // --- Connection (kral_thread_interface.cpp) -----------------------------------------------------------------------
   // Opens the port (or binds the caller's functions) and starts or resumes the receive thread. `owner` is what the
@@ -130,11 +130,10 @@ class CKralThreadInterface {
   bool AskForUnframedMode();
   bool ReturnToFramedMode();
 
-  void LogRequest(const char* format, std::span<const uint8_t> request);
   void LogWritten(uint32_t time_out_ms, uint32_t start);
 
+  DataLogFileHandler& log_;
   Clock& clock_;
-  DataLogFileHandler* log_ = nullptr;
   PacketQueue* responses_ = nullptr;
   PortWatcher* watcher_ = nullptr;
   std::atomic<bool> connected_{false};
@@ -149,9 +148,9 @@ class CKralThreadInterface {
   CProtAHDLC framer_;
   UserTransport bound_;  // what the port is bound to while it is a caller's
   DispatcherFeed feed_;
-  ChunkSplitter splitter_{feed_};
+  ChunkSplitter splitter_{feed_, log_};
   ThreadControl control_;
-  ReceiveLoop loop_{clock_, framer_, port_, control_, splitter_};
+  ReceiveLoop loop_{clock_, log_, framer_, port_, control_, splitter_};
   WorkerThread worker_;  // last: nothing above may be gone while it is parked
 };
 

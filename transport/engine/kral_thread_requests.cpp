@@ -4,7 +4,6 @@
 #include <array>
 #include <chrono>
 
-#include "base/hex_dump.h"
 #include "base/text_log.h"
 #include "transport/engine/kral_events.h"
 #include "transport/engine/kral_thread_interface.h"
@@ -42,11 +41,11 @@ std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> roo
 Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
                                      uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
   if (responses_ == nullptr) return ReplyKind::kNotSent;
-  LogRequest("SEND (%d bytes):%s", request);
+  log_.WriteBytes(kLogIo, "SEND (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
-    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    log_.WriteLine(kLogErr, "Send Sync skipped for NULL port");
     return ReplyKind::kNullPort;
   }
 
@@ -58,20 +57,20 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
     reply = AwaitNext(room, expected_code, time_out_ms, is_own);
     const bool has_time = reply.came() && (reply || clock_.TickMs() - read_start <= time_out_ms);
     if (reply.kind() == ReplyKind::kGone) {
-      if (log_) log_->WriteLine(kLogErr, "Request not answered: the device has gone");
+      log_.WriteLine(kLogErr, "Request not answered: the device has gone");
       Close();
     } else if (!has_time && reply.kind() != ReplyKind::kAborted) {
       TimedOut(request);
     }
-    if (log_ && reply) {
-      log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
-    } else if (log_) {
-      log_->WriteLine(kLogErr, "Error. Send Sync Read failed.");
+    if (reply) {
+      log_.WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - read_start));
+    } else {
+      log_.WriteLine(kLogErr, "Error. Send Sync Read failed.");
     }
   } else {
     reply = WhyNotWritten();
   }
-  if (log_) log_->WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", reply ? 1 : 0);
+  log_.WriteLine(kLogRet, "CKralThreadInterface::SendSync = result = %d", reply ? 1 : 0);
   return reply;
 }
 
@@ -94,14 +93,12 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
     const auto bytes = CopyRecord(*record, room);
     if (record->front() != expected_code) {
       // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
-      if (log_) {
-        log_->WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
-                        record->front(), expected_code);
-      }
+      log_.WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
+                     record->front(), expected_code);
       return {ReplyKind::kOther, record->front(), bytes};
     }
     if (!is_own || is_own(bytes)) return {ReplyKind::kExpected, expected_code, bytes};
-    if (log_) log_->WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
+    log_.WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
   }
 }
 
@@ -125,17 +122,17 @@ ReplyKind CKralThreadInterface::WhyNoReply(uint64_t garbled_before) const {
 // A handset that does not answer is given up: the next request finds the port closed and opens it afresh.
 void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
   timed_out_request_.assign(request.begin(), request.end());
-  if (log_) log_->WriteLine(kLogErr, "Request timed out");
+  log_.WriteLine(kLogErr, "Request timed out");
   Close();
 }
 
 Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
   if (responses_ == nullptr) return ReplyKind::kNotSent;
-  LogRequest("SEND RAW (%d bytes):%s", request);
+  log_.WriteBytes(kLogIo, "SEND RAW (%d bytes):%s", request);
   ForgetReplies();
   const uint32_t start = clock_.TickMs();
   if (null_port_) {
-    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    log_.WriteLine(kLogErr, "Send Sync skipped for NULL port");
     return ReplyKind::kNullPort;
   }
 
@@ -144,7 +141,7 @@ Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<
   if (Transmit(request, time_out_ms)) {
     LogWritten(time_out_ms, start);
     reply = PollRecord(room, time_out_ms);
-    if (log_ && !reply) log_->WriteLine(kLogErr, "Error. Read failed.");
+    if (!reply) log_.WriteLine(kLogErr, "Error. Read failed.");
   } else {
     reply = WhyNotWritten();
   }
@@ -160,9 +157,7 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
     if (const auto record = responses_->Pop()) {
       const size_t count = std::min(record->size(), room.size());
       std::copy_n(record->begin(), count, room.begin());
-      if (log_) {
-        log_->WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
-      }
+      log_.WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
       return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
     }
     if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply(garbled_before);
@@ -171,15 +166,15 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
 }
 
 Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
-  LogRequest("SEND_ASYNC (%d bytes):%s", request);
+  log_.WriteBytes(kLogIo, "SEND_ASYNC (%d bytes):%s", request);
   if (null_port_) {
-    if (log_) log_->WriteLine(kLogErr, "Send Sync skipped for NULL port");
+    log_.WriteLine(kLogErr, "Send Sync skipped for NULL port");
     return ReplyKind::kNullPort;
   }
   const uint32_t start = clock_.TickMs();
   const auto size = static_cast<uint32_t>(request.size());
   if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) {
-    if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+    log_.WriteLine(kLogErr, "Error. Send data failed.");
     return WhyNotWritten();
   }
   LogWritten(time_out_ms, start);
@@ -188,20 +183,20 @@ Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t
 
 bool CKralThreadInterface::Transmit(std::span<const uint8_t> request, uint32_t time_out_ms) {
   if (framer_.Send(request.data(), static_cast<uint32_t>(request.size()), time_out_ms, 0) == 1) return true;
-  if (log_) log_->WriteLine(kLogErr, "Error. Send data failed.");
+  log_.WriteLine(kLogErr, "Error. Send data failed.");
   Close();
   return false;
 }
 
 bool CKralThreadInterface::SetPacketMode(uint32_t mode) {
   if (mode > static_cast<uint32_t>(PacketMode::kLengthPrefixed)) {
-    if (log_) log_->WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
+    log_.WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
     return false;
   }
   if (NeedsPhoneFor(mode) && !(mode == 0 ? ReturnToFramedMode() : AskForUnframedMode())) return false;
   framer_.SetRawDataFlag(mode);
   splitter_.SetMode(static_cast<PacketMode>(mode));
-  if (log_) log_->WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
+  log_.WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
   return true;
 }
 
@@ -244,15 +239,9 @@ uint32_t CKralThreadInterface::QueryState(uint32_t) const {
   return 0;
 }
 
-void CKralThreadInterface::LogRequest(const char* format, std::span<const uint8_t> request) {
-  if (log_ == nullptr || !log_->Wants(kLogIo)) return;
-  log_->WriteLine(kLogIo, format, static_cast<int>(request.size()), HexDump(request).c_str());
-}
-
 void CKralThreadInterface::LogWritten(uint32_t time_out_ms, uint32_t start) {
-  if (log_ == nullptr) return;
-  log_->WriteLine(kLogRet, "OK\t Timeout=%d", static_cast<int>(time_out_ms));
-  log_->WriteLine(kLogRet, "WRITE STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
+  log_.WriteLine(kLogRet, "OK\t Timeout=%d", static_cast<int>(time_out_ms));
+  log_.WriteLine(kLogRet, "WRITE STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
 }
 
 }  // namespace kral

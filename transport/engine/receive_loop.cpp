@@ -4,7 +4,6 @@
 #include <chrono>
 
 #include "base/at_exit.h"
-#include "base/hex_dump.h"
 #include "base/text_log.h"
 #include "platform/forced_unwind.h"
 #include "transport/engine/thread_control.h"
@@ -41,9 +40,7 @@ void ReceiveLoop::Run() {
     }
     if (port_.CloseIfGone() && on_gone_) on_gone_();
   }
-  if (DataLogFileHandler* const log = log_) {
-    log->WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
-  }
+  log_.WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
 }
 
 // The counter moves only when the thread sleeps: with a divisor of 1 every turn sleeps, with a larger one only the
@@ -59,10 +56,9 @@ bool ReceiveLoop::IsPaused() {
   if (wanted == 0) return false;
   if (wanted != acknowledged_pause_) {
     acknowledged_pause_ = wanted;
-    DataLogFileHandler* const log = log_;
-    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause Detected, Pause ACK event set attempt");
+    log_.WriteLine(kLogFn, "THREAD: Pause Detected, Pause ACK event set attempt");
     control_.AcknowledgePause();
-    if (log != nullptr) log->WriteLine(kLogFn, "THREAD: Pause ACK event set complete");
+    log_.WriteLine(kLogFn, "THREAD: Pause ACK event set complete");
   }
   return true;
 }
@@ -110,10 +106,7 @@ bool ReceiveLoop::WaitForChunk(uint32_t time_out_ms) {
 
 void ReceiveLoop::Split(uint32_t count) {
   const std::span<const uint8_t> chunk(buffer_.data(), count);
-  DataLogFileHandler* const log = log_;
-  if (log != nullptr && log->Wants(kLogIo)) {
-    log->WriteLine(kLogIo, "THREAD READ (%d bytes): %s ", static_cast<int>(count), HexDump(chunk).c_str());
-  }
+  log_.WriteBytes(kLogIo, "THREAD READ (%d bytes): %s ", chunk);
   splitter_.Feed(chunk);
 }
 

@@ -28,10 +28,10 @@ enum class ReceiveMode : uint8_t {
 // The settings and the counter may be used on any thread.
 class ReceiveLoop {
  public:
-  ReceiveLoop(Clock& clock, CProtAHDLC& framer, CSerialPort& port, ThreadControl& control, ChunkSplitter& splitter)
-      : clock_(clock), framer_(framer), port_(port), control_(control), splitter_(splitter) {}
+  ReceiveLoop(Clock& clock, DataLogFileHandler& log, CProtAHDLC& framer, CSerialPort& port, ThreadControl& control,
+              ChunkSplitter& splitter)
+      : clock_(clock), log_(log), framer_(framer), port_(port), control_(control), splitter_(splitter) {}
 
-  void SetLogger(DataLogFileHandler* log) { log_ = log; }
   // Before Run. Called on the receive thread when it has found the device gone and closed the port.
   void SetGoneHandler(std::function<void()> handler) { on_gone_ = std::move(handler); }
   void SetMode(ReceiveMode mode) { mode_ = mode; }
@@ -54,12 +54,12 @@ class ReceiveLoop {
   void SetSplitting(bool splitting);
 
   Clock& clock_;
+  DataLogFileHandler& log_;
   CProtAHDLC& framer_;
   CSerialPort& port_;
   ThreadControl& control_;
   ChunkSplitter& splitter_;
   std::function<void()> on_gone_;
-  std::atomic<DataLogFileHandler*> log_{nullptr};
   std::atomic<ReceiveMode> mode_{ReceiveMode::kAsWritten};
   std::atomic<uint32_t> read_time_out_ms_{500};
   std::atomic<uint32_t> sleep_divisor_{1};

@@ -4,7 +4,6 @@
 #include <string_view>
 #include <utility>
 
-#include "base/hex_dump.h"
 #include "base/text_log.h"
 
 namespace kral {
@@ -28,11 +27,6 @@ bool EndsReply(std::span<const uint8_t> chunk_so_far) {
 }
 
 }  // namespace
-
-void ChunkSplitter::SetLogger(DataLogFileHandler* log) {
-  log_ = log;
-  deframer_.SetLogger(log);
-}
 
 void ChunkSplitter::Feed(std::span<const uint8_t> chunk) {
   const PacketMode mode = mode_;
@@ -111,16 +105,12 @@ bool ChunkSplitter::HoldsWholePacket() const {
 }
 
 void ChunkSplitter::HandOnReceived() {
-  if (log_ != nullptr && log_->Wants(kLogIo)) {
-    log_->WriteLine(kLogIo, "RAW REC (%d bytes): %s", static_cast<int>(packet_.size()), HexDump(packet_).c_str());
-  }
+  log_.WriteBytes(kLogIo, "RAW REC (%d bytes): %s", packet_);
   HandOn();
 }
 
 void ChunkSplitter::HandOnOverrun() {
-  if (log_ != nullptr) {
-    log_->WriteLine(kLogErr, "ERROR THREAD READ---NON-HDLC data (%d bytes)", static_cast<int>(packet_.size()));
-  }
+  log_.WriteLine(kLogErr, "ERROR THREAD READ---NON-HDLC data (%d bytes)", static_cast<int>(packet_.size()));
   HandOn();
 }
 

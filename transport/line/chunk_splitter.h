@@ -19,9 +19,8 @@ enum class PacketMode : uint32_t { kFramed = 0, kUnframed1 = 1, kUnframed2 = 2, 
 // Fed by the receive thread; the settings may be made on any thread and count from the next chunk on.
 class ChunkSplitter {
  public:
-  explicit ChunkSplitter(PacketListener& sink) : sink_(sink), deframer_(sink) {}
+  ChunkSplitter(PacketListener& sink, DataLogFileHandler& log) : sink_(sink), log_(log), deframer_(sink, log) {}
 
-  void SetLogger(DataLogFileHandler* log);
   // A change of mode drops the partial packet. Entering the length-prefixed mode takes the packet limit from the
   // next header.
   void SetMode(PacketMode mode) { mode_ = mode; }
@@ -49,7 +48,7 @@ class ChunkSplitter {
   void HandOn();
 
   PacketListener& sink_;
-  DataLogFileHandler* log_ = nullptr;
+  DataLogFileHandler& log_;
   std::atomic<PacketMode> mode_{PacketMode::kFramed};
   std::atomic<bool> at_reply_mode_{false};
   std::atomic<bool> flush_pending_{false};

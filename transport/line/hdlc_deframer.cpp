@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <bit>
 
-#include "base/hex_dump.h"
 #include "base/text_log.h"
 #include "base/wire_codes.h"
 #include "transport/line/byte_block.h"
@@ -24,11 +23,6 @@ bool IsUnchecked(uint8_t code) {
 
 void Increment(std::atomic<uint64_t>& counter) {
   counter.fetch_add(1, std::memory_order_relaxed);
-}
-
-void LogPacket(DataLogFileHandler* log, uint32_t flag, const char* format, std::span<const uint8_t> packet) {
-  if (log == nullptr || !log->Wants(flag)) return;
-  log->WriteLine(flag, format, static_cast<int>(packet.size()), HexDump(packet).c_str());
 }
 
 // Where unstuffing is; whole in registers.
@@ -140,25 +134,21 @@ void HdlcDeframer::FinishPacket(std::span<const uint8_t> packet) {
 void HdlcDeframer::DeliverChecked(std::span<const uint8_t> packet) {
   if (packet.size() >= kMaximumLength) {
     Increment(oversized_);
-    if (log_ != nullptr) {
-      log_->WriteLine(kLogIo, "Maximum Packet Size reached, %d bytes, suspected invalid packet is skipped",
-                      static_cast<int>(kMaximumLength));
-    }
+    log_.WriteLine(kLogIo, "Maximum Packet Size reached, %d bytes, suspected invalid packet is skipped",
+                   static_cast<int>(kMaximumLength));
   } else if (ComputeFcs16(packet.data(), static_cast<uint16_t>(packet.size() * 8)) == FcsGoodValue) {
     sink_.OnPacket(packet);
-    LogPacket(log_, kLogIo, "SYNC REC (%d bytes): %s", packet);
+    log_.WriteBytes(kLogIo, "SYNC REC (%d bytes): %s", packet);
   } else {
     Increment(bad_fcs_);
-    LogPacket(log_, kLogErr, "ERROR SYNC REC (%d bytes): %s", packet);
+    log_.WriteBytes(kLogErr, "ERROR SYNC REC (%d bytes): %s", packet);
   }
 }
 
 void HdlcDeframer::DropOverrun() {
   Increment(oversized_);
-  if (log_ != nullptr) {
-    log_->WriteLine(kLogErr, "ERROR THREAD READ---NON-HDLC data (%d bytes), data is discarded",
-                    static_cast<int>(kMaximumLength));
-  }
+  log_.WriteLine(kLogErr, "ERROR THREAD READ---NON-HDLC data (%d bytes), data is discarded",
+                 static_cast<int>(kMaximumLength));
   length_ = 0;
   escape_pending_ = false;  // it belonged to the byte that is lost
 }
@@ -167,7 +157,7 @@ void HdlcDeframer::DropOverrun() {
 void HdlcDeframer::EraseZeroTail() {
   const auto is_zero = [](uint8_t byte) { return byte == 0; };
   if (length_ == 0 || !std::all_of(packet_.begin(), packet_.begin() + length_, is_zero)) return;
-  if (log_ != nullptr) log_->WriteLine(kLogIo, "Packet is being erased because it is all zeros");
+  log_.WriteLine(kLogIo, "Packet is being erased because it is all zeros");
   length_ = 0;
 }
 

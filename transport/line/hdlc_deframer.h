@@ -17,9 +17,8 @@ class DataLogFileHandler;
 // Fed by the receive thread only; the counters may be read from any thread.
 class HdlcDeframer {
  public:
-  explicit HdlcDeframer(PacketListener& sink) : sink_(sink) {}
+  HdlcDeframer(PacketListener& sink, DataLogFileHandler& log) : sink_(sink), log_(log) {}
 
-  void SetLogger(DataLogFileHandler* log) { log_ = log; }
   void Feed(std::span<const uint8_t> chunk);
   void DropPartial();  // forgets the unfinished packet
 
@@ -37,7 +36,7 @@ class HdlcDeframer {
   void EraseZeroTail();
 
   PacketListener& sink_;
-  DataLogFileHandler* log_ = nullptr;
+  DataLogFileHandler& log_;
   std::array<uint8_t, 4096> packet_{};
   size_t length_ = 0;
   bool escape_pending_ = false;

@@ -6,7 +6,6 @@
 #include <array>
 #include <string_view>
 
-#include "base/text_log.h"
 #include "transport/line/hdlc_frame.h"
 #include "transport/line/serial_port.h"
 
@@ -57,12 +56,12 @@ uint32_t CProtAHDLC::SetPort(CSerialPort* port) {
 }
 
 void CProtAHDLC::SetLogger(DataLogFileHandler* log) {
-  log_ = log;
+  log_ = log != nullptr ? log : &NullLog();
   if (port_ != nullptr) port_->SetLog(log);
 }
 
 uint32_t CProtAHDLC::FlushPhoneBuffer() {
-  if (log_ != nullptr) log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::FlushPhoneBuffer()");
+  log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::FlushPhoneBuffer()");
   if (port_ == nullptr) return 0;
   port_->Send(&kFrameFlag, 1);
   return 1;
@@ -81,10 +80,8 @@ uint32_t CProtAHDLC::SetRawDataFlag(uint32_t value) {
 
 uint32_t CProtAHDLC::Send(const uint8_t* payload, uint32_t size, uint32_t time_out_ms, uint8_t force_leading_flag) {
   if (port_ == nullptr) return 0;
-  if (log_ != nullptr) {
-    log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::Send(iSize=%d, iTimeout=%d)", static_cast<int>(size),
-                    static_cast<int>(time_out_ms));
-  }
+  log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::Send(iSize=%d, iTimeout=%d)", static_cast<int>(size),
+                  static_cast<int>(time_out_ms));
 
   FrameBuffer frame;  // left uninitialised: clearing 32 KiB would cost more than framing a request
   const uint8_t* bytes = payload;
@@ -95,14 +92,12 @@ uint32_t CProtAHDLC::Send(const uint8_t* payload, uint32_t size, uint32_t time_o
     bytes = frame.data();
   }
   if (length == 0 && size != 0) {
-    if (log_ != nullptr) log_->WriteLine(kLogInfAhdlc, "%s", kTooLong);
+    log_->WriteLine(kLogInfAhdlc, "%s", kTooLong);
     return 0;
   }
 
   const bool sent = port_->Send(bytes, length) == length;
-  if (log_ != nullptr) {
-    log_->WriteLine(kLogRetAhdlc, "CProtAHDLC::Send(_iALen=%d) ... %s", static_cast<int>(length), sent ? "OK" : "FAIL");
-  }
+  log_->WriteLine(kLogRetAhdlc, "CProtAHDLC::Send(_iALen=%d) ... %s", static_cast<int>(length), sent ? "OK" : "FAIL");
   return sent ? 1 : 0;
 }
 
@@ -112,18 +107,18 @@ uint32_t CProtAHDLC::ReceiveRaw(uint8_t* buffer, uint32_t& count, uint32_t time_
   const uint32_t start = clock_.TickMs();
   count = std::min(port_->Receive(buffer, count), count);
   if (count == 0) {
-    if (log_ != nullptr) log_->WriteLine(kLogInfAhdlc, "Device received 0 bytes");
+    log_->WriteLine(kLogInfAhdlc, "Device received 0 bytes");
     return 0;
   }
   const uint32_t elapsed = clock_.TickMs() - start;
-  if (time_out_ms != 0 && elapsed > time_out_ms && log_ != nullptr) {
+  if (time_out_ms != 0 && elapsed > time_out_ms) {
     log_->WriteLine(kLogInfAhdlc, "Timeout = %d ms", static_cast<int>(time_out_ms));
   }
   return 1;
 }
 
 uint32_t CProtAHDLC::Data2DM(uint8_t baud_rate_mask) {
-  if (log_ != nullptr) log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::Data2DM(baudrate_mask=%d)", int{baud_rate_mask});
+  log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::Data2DM(baudrate_mask=%d)", int{baud_rate_mask});
   if (port_ == nullptr) return 0;
 
   const bool restore_rate = raw_data_flag_ == 0;

@@ -4,12 +4,12 @@
 
 #include <cstdint>
 
+#include "base/text_log.h"
 #include "platform/clock.h"
 
 namespace kral {
 
 class CSerialPort;
-class DataLogFileHandler;
 
 class CProtAHDLC {
  public:
@@ -24,13 +24,13 @@ class CProtAHDLC {
   virtual uint32_t ReceiveRaw(uint8_t* buffer, uint32_t& count, uint32_t time_out_ms);
 
   uint32_t SetPort(CSerialPort* port);
-  void SetLogger(DataLogFileHandler* log);  // also handed on to the port
+  void SetLogger(DataLogFileHandler* log);  // also handed on to the port; null: none
   CSerialPort* port() const { return port_; }
 
  private:
   Clock& clock_;
   CSerialPort* port_ = nullptr;
-  DataLogFileHandler* log_ = nullptr;
+  DataLogFileHandler* log_ = &NullLog();
   uint32_t raw_data_flag_ = 0;
   uint8_t start_flag_ = 0;
 };

@@ -7,8 +7,6 @@
 #include <exception>
 #include <utility>
 
-#include "base/text_log.h"
-
 namespace kral {
 namespace {
 
@@ -58,10 +56,9 @@ CSerialPort::~CSerialPort() {
 }
 
 uint32_t CSerialPort::Open(int32_t number) {
-  DataLogFileHandler* log = log_;
   if (number < kFirstNumber || number > kLastNumber) {
     open_result_ = {DeviceError::kNoSuchPort, 0, "ports are numbered 1 to 255"};
-    if (log) log->WriteLine(kLogErr, "CSerialPort::Open(COM%d) refused: ports are numbered 1 to 255", number);
+    log_->WriteLine(kLogErr, "CSerialPort::Open(COM%d) refused: ports are numbered 1 to 255", number);
     return 0;
   }
   Close();
@@ -74,10 +71,8 @@ uint32_t CSerialPort::Open(int32_t number) {
       const std::lock_guard lock(mutex_);
       gone_ = gone_ && open_result_.error == DeviceError::kNoSuchPort;
     }
-    if (log) {
-      log->WriteLine(kLogErr, "CSerialPort::Open(COM%d) failed: %s (%u)", number, open_result_.text.c_str(),
-                     open_result_.system_code);
-    }
+    log_->WriteLine(kLogErr, "CSerialPort::Open(COM%d) failed: %s (%u)", number, open_result_.text.c_str(),
+                    open_result_.system_code);
     return 0;
   }
   Prepare(*device);
@@ -171,7 +166,7 @@ uint32_t CSerialPort::GetBaudRate(uint32_t& rate) const {
 }
 
 DataLogFileHandler* CSerialPort::SetLog(DataLogFileHandler* log) {
-  log_ = log;
+  log_ = log != nullptr ? log : &NullLog();
   return log;
 }
 

@@ -9,12 +9,11 @@
 #include <mutex>
 #include <optional>
 
+#include "base/text_log.h"
 #include "platform/clock.h"
 #include "platform/serial_device.h"
 
 namespace kral {
-
-class DataLogFileHandler;
 
 // Functions of a caller-supplied transport, called with (context, handle value, ...); non-zero means failure.
 using UserSendFunction = uint32_t (*)(uintptr_t context, uintptr_t handle, uint32_t count, const uint8_t* data,
@@ -64,7 +63,7 @@ class CSerialPort {
   virtual bool SetBaudRate(uint32_t rate);
   virtual uint32_t GetBaudRate(uint32_t& rate) const;
   virtual uint32_t FlushPCBuffer();
-  virtual DataLogFileHandler* SetLog(DataLogFileHandler* log);
+  virtual DataLogFileHandler* SetLog(DataLogFileHandler* log);  // before the first Open; null: none
   virtual uint32_t Send(const uint8_t* bytes, uint32_t count);  // bytes written
   virtual uint32_t Receive(uint8_t* buffer, uint32_t count);    // bytes read, at once
   virtual int32_t SetDTR(uint8_t state);                        // library error code
@@ -106,7 +105,7 @@ class CSerialPort {
 
   Clock& clock_;
   DeviceOpener opener_;
-  std::atomic<DataLogFileHandler*> log_{nullptr};
+  DataLogFileHandler* log_ = &NullLog();
   std::atomic<bool> open_{false};
   std::atomic<bool> user_defined_{false};
   std::atomic<int32_t> last_error_{kPortOk};

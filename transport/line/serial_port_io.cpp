@@ -3,7 +3,6 @@
 #include <algorithm>
 
 #include "base/guarded_call.h"
-#include "base/text_log.h"
 #include "platform/forced_unwind.h"
 #include "transport/line/serial_port.h"
 
@@ -11,10 +10,10 @@ namespace kral {
 namespace {
 
 // What a caller's function may say it moved: no more than it was given or had room for.
-uint32_t Believable(uint32_t told, uint32_t possible, const char* function, DataLogFileHandler* log) {
-  if (told > possible && log) {
-    log->WriteLine(kLogErr, "CSerialPort::%s: the caller's function tells of %u bytes where %u were possible", function,
-                   told, possible);
+uint32_t Believable(uint32_t told, uint32_t possible, const char* function, DataLogFileHandler& log) {
+  if (told > possible) {
+    log.WriteLine(kLogErr, "CSerialPort::%s: the caller's function tells of %u bytes where %u were possible", function,
+                  told, possible);
   }
   return std::min(told, possible);
 }
@@ -32,16 +31,15 @@ uint32_t CallTransport(Function function, Arguments... arguments) {
 }  // namespace
 
 uint32_t CSerialPort::Send(const uint8_t* bytes, uint32_t count) {
-  DataLogFileHandler* log = log_;
-  if (log) log->WriteLine(kLogFnDev, "CSerialPort::Send(nbyte=%d)", count);
+  log_->WriteLine(kLogFnDev, "CSerialPort::Send(nbyte=%d)", count);
   uint32_t sent = 0;
   try {
     const uint32_t result = user_defined_ ? SendToUser(bytes, count, sent) : SendToDevice(bytes, count, sent);
-    if (log) log->WriteLine(kLogRetDev, "CSerialPort::Send(bytes_sent=%d) ... OK", result);
+    log_->WriteLine(kLogRetDev, "CSerialPort::Send(bytes_sent=%d) ... OK", result);
     return result;
   } catch (...) {
     PassForcedUnwind();
-    if (log) log->WriteLine(kLogErr, "CSerialPort::Send(bytes_sent=%d)--exception occurred", sent);
+    log_->WriteLine(kLogErr, "CSerialPort::Send(bytes_sent=%d)--exception occurred", sent);
     return 0;
   }
 }
@@ -62,9 +60,7 @@ uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_
     if (clock_.TickMs() - start > time_out) {
       // A late write counts as failed even if everything was written: the reply could no longer be told from the
       // next request's.
-      if (DataLogFileHandler* log = log_) {
-        log->WriteLine(kLogInfDev, "CSerialPort::Send: %u of %u bytes after more than %u ms", sent, count, time_out);
-      }
+      log_->WriteLine(kLogInfDev, "CSerialPort::Send: %u of %u bytes after more than %u ms", sent, count, time_out);
       return 0;
     }
     if (sent == count || device->gone()) break;
@@ -78,24 +74,21 @@ uint32_t CSerialPort::SendToUser(const uint8_t* bytes, uint32_t count, uint32_t&
   if (user.send == nullptr) return 1;  // "one byte" without moving any
   uint32_t written = count;
   if (CallTransport(user.send, user.context, user.handle, count, bytes, &written) != 0) return 0;
-  sent = Believable(written, count, "Send", log_);
+  sent = Believable(written, count, "Send", *log_);
   return sent;
 }
 
 uint32_t CSerialPort::Receive(uint8_t* buffer, uint32_t count) {
-  DataLogFileHandler* log = log_;
   uint32_t received = 0;
   try {
     const uint32_t result =
         user_defined_ ? ReceiveFromUser(buffer, count, received) : ReceiveFromDevice(buffer, count, received);
-    if (received > 0 && log) log->WriteLine(kLogRetDev, "CSerialPort::Receive(wRec=%d) ... OK", received);
+    if (received > 0) log_->WriteLine(kLogRetDev, "CSerialPort::Receive(wRec=%d) ... OK", received);
     return result;
   } catch (...) {
     PassForcedUnwind();
-    if (log) {
-      log->WriteLine(kLogErr, "CSerialPort::Receive(wRec=%d, nByte=%d)--exception occurred", received, count);
-      log->WriteLine(kLogErr, "CSerialPort::Receive() returns=%d", 0);
-    }
+    log_->WriteLine(kLogErr, "CSerialPort::Receive(wRec=%d, nByte=%d)--exception occurred", received, count);
+    log_->WriteLine(kLogErr, "CSerialPort::Receive() returns=%d", 0);
     return 0;
   }
 }
@@ -118,12 +111,12 @@ uint32_t CSerialPort::ReceiveFromUser(uint8_t* buffer, uint32_t count, uint32_t&
   if (user.receive == nullptr) return 1;  // "one byte" without moving any
   uint32_t delivered = count;
   if (CallTransport(user.receive, user.context, user.handle, &delivered, buffer) != 0) return 0;
-  received = Believable(delivered, count, "Receive", log_);
+  received = Believable(delivered, count, "Receive", *log_);
   return received;
 }
 
 uint32_t CSerialPort::FlushPCBuffer() {
-  if (DataLogFileHandler* log = log_) log->WriteLine(kLogFnDev, "CSerialPort::FlushPCBuffer()");
+  log_->WriteLine(kLogFnDev, "CSerialPort::FlushPCBuffer()");
   if (!user_defined_) {
     const auto device = Device();
     if (device) device->PurgeInput();
@@ -135,7 +128,7 @@ uint32_t CSerialPort::FlushPCBuffer() {
     CallTransport(user.flush, user.context, user.handle);
   } catch (...) {
     PassForcedUnwind();
-    if (DataLogFileHandler* log = log_) log->WriteLine(kLogErr, "CSerialPort::FlushPCBuffer()--exception occurred");
+    log_->WriteLine(kLogErr, "CSerialPort::FlushPCBuffer()--exception occurred");
   }
   return 0;  // 0 after the caller's flush, 1 without one: the asymmetry is part of the interface
 }
