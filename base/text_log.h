@@ -46,10 +46,12 @@ class DataLogFileHandler {
   bool started_result() const { return started_result_; }    // what KRAL_IsLoggingStarted reports
   bool logging_started() const { return logging_started_; }  // set by the first Start, never cleared
 
-  // Stamps lines with the milliseconds since the last stop instead of the clock.
+  // Stamps lines with the milliseconds since the last stop instead of the clock. For: logs that are compared with one
+  // another. Kept; nothing switches it on.
   void SetRelativeTimeStamps(bool on) { relative_time_stamps_ = on; }
 
-  // Named debug switches beside the mask; an unknown one is off.
+  // Named debug switches beside the mask; an unknown one is off. For: the parts that they name. Kept; all are
+  // registered as off, and no part asks.
   void RegisterCategory(std::string_view name, bool on);
   bool IsCategoryOn(std::string_view name) const;
 

@@ -43,14 +43,28 @@ using DoubleWords = std::span<const u32>;
 template <class T>
 concept WireInteger = std::integral<T> && !std::same_as<T, bool>;
 
-// The value of one field. Integers convert only where every value of the source fits (u8 to u16, never back).
+template <class Source, class T>
+concept BraceConvertible = requires {
+  T{std::declval<Source>()};
+};
+
+// Integers convert only where every value of the source fits (u8 to u16, never back).
+template <class Source, class T>
+constexpr bool FitsField() {
+  if constexpr (WireInteger<T> && WireInteger<Source>) return BraceConvertible<Source, T>;
+  return !WireInteger<T> && std::convertible_to<const Source&, T>;
+}
+
+template <class Source, class T>
+concept FieldSource = FitsField<Source, T>();
+
+// The value of one field.
 template <class T>
 struct Field {
   T value;
 
-  template <class Source>
-  requires(WireInteger<T>&& WireInteger<Source>&& requires { T{std::declval<Source>()}; }) ||
-      (!WireInteger<T> && std::convertible_to<const Source&, T>)constexpr Field(const Source& source) : value(source) {}
+  template <FieldSource<T> Source>
+  constexpr Field(const Source& source) : value(source) {}
 };
 
 template <class T>
@@ -117,8 +131,7 @@ constexpr bool AreSorted(const Rows&... rows) {
   return std::is_sorted(keys.begin(), keys.end());
 }
 
-// --- The two plain headers
-// --------------------------------------------------------------------------------------------
+// --- The two plain headers ------------------------------------------------------------------------------------------
 
 // One byte, the command code. The reply repeats so many bytes of the request, and has something behind them: some
 // handsets answer with the code and a status alone.

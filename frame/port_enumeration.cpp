@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <string>
 
+#include "base/at_exit.h"
 #include "frame/diag_ftm.h"
 #include "frame/library_state.h"
 #include "frame/orbt_server.h"
@@ -59,26 +60,11 @@ bool CopyServerPorts(std::vector<std::string> (OrbtServer::*list)(), std::span<u
   return !names.empty();
 }
 
-// A context for as long as one question takes; releasing it closes the port.
-class PassingContext {
- public:
-  explicit PassingContext(uint16_t port) : handle_(Kral_ResourceManager::CreateContext(port)) {}
-  ~PassingContext() {
-    if (handle_ != 0) Kral_ResourceManager::ReleaseContext(handle_, false);
-  }
-  PassingContext(const PassingContext&) = delete;
-  PassingContext& operator=(const PassingContext&) = delete;
-
-  KRAL_HANDLE handle() const { return handle_; }
-
- private:
-  const KRAL_HANDLE handle_;
-};
-
-// Opens the port, asks, and closes it again.
+// Opens the port, asks, and closes it again. The context lasts as long as the question.
 bool AnswersOnPort(uint16_t port) {
-  const PassingContext context(port);
-  const auto phone = Kral_ResourceManager::GetPhone(context.handle());
+  const KRAL_HANDLE handle = Kral_ResourceManager::CreateContext(port);
+  const AtExit asked([handle] { Kral_ResourceManager::ReleaseContext(handle, false); });
+  const auto phone = Kral_ResourceManager::GetPhone(handle);
   if (!phone) return false;
   const std::lock_guard lock(phone->request_lock());
   if (!phone->OpenPort({})) return false;

@@ -27,7 +27,8 @@ class FamilyObject {
   virtual ~FamilyObject() = default;
 };
 
-// The slots of a row, in the order of destruction around the phone object (see resource_manager.cpp).
+// The slots of a row, in the order of destruction around the phone object (see resource_manager.cpp). For: families
+// that are not here yet. Kept, so that their order is settled before they come; kEfs and kNvManager are in use.
 enum class FamilySlot {
   kWlan,
   kGps,

@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/at_exit.h"
 #include "base/little_endian.h"
 #include "commands/checked_reply.h"
 #include "commands/nv/nv_format.h"
@@ -12,17 +13,6 @@
 
 namespace kral::nv {
 namespace {
-
-class BatchModeEnd {
- public:
-  explicit BatchModeEnd(Diag_FTM& phone) : phone_(phone) {}
-  ~BatchModeEnd() { SetBatchMode(phone_, false); }
-  BatchModeEnd(const BatchModeEnd&) = delete;
-  BatchModeEnd& operator=(const BatchModeEnd&) = delete;
-
- private:
-  Diag_FTM& phone_;
-};
 
 // Moves as many items as a packet takes from the queue into its payload.
 u16 FillPayload(Diag_FTM& phone, std::deque<NvQueueItem>& queue, std::vector<u8>& payload) {
@@ -130,7 +120,7 @@ Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const
 }
 
 bool FlushBatchQueue(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
-  const BatchModeEnd end(phone);
+  const AtExit end([&phone] { SetBatchMode(phone, false); });
   NvBatch& callers = phone.nv_batch();
   phone.log().WriteLine(kLogRet, "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Queue size = %d",
                         static_cast<int>(callers.queue.size()));

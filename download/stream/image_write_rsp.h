@@ -7,7 +7,7 @@
 #include <memory>
 #include <span>
 
-#include "base/auto_reset_event.h"
+#include "base/event.h"
 #include "base/worker_thread.h"
 #include "download/link/download_connection.h"
 #include "download/stream/download_agent.h"

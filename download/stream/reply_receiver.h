@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <span>
 
-#include "base/auto_reset_event.h"
+#include "base/event.h"
 #include "base/text_log.h"
 #include "download/stream/download_agent.h"
 

@@ -10,7 +10,7 @@
 #include <mutex>
 #include <thread>
 
-#include "base/manual_reset_event.h"
+#include "base/event.h"
 #include "base/worker_thread.h"
 #include "kral/log.h"
 #include "transport/collection/capture_reader.h"

@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "base/manual_reset_event.h"
+#include "base/event.h"
 #include "base/worker_thread.h"
 
 namespace kral {

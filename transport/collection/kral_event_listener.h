@@ -73,7 +73,8 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   // A call that is under way when the callback is changed still ends on the former one.
   void SetRawPacketCallback(RawPacketCallback callback, uintptr_t value);
   void SetCollectionCallbacks(const CollectionCallbacks& callbacks);
-  // A handler is not called any more once it is removed.
+  // For: a family that is answered by an event report, or follows logs. Kept; no family here adds a handler. One is not
+  // called any more once it is removed.
   void AddEventHandler(EventHandler* handler);
   void RemoveEventHandler(EventHandler* handler);
   void AddLogHandler(LogHandler* handler);

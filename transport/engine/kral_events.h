@@ -10,13 +10,14 @@
 #include <span>
 #include <vector>
 
-#include "base/manual_reset_event.h"
+#include "base/event.h"
 #include "base/worker_thread.h"
 #include "transport/engine/bounded_queue.h"
 #include "transport/line/packet_listener.h"
 
 namespace kral {
 
+// For: a listener that takes only some packets. Kept; none of the library's own has one.
 class PacketFilter {
  public:
   virtual ~PacketFilter() = default;
@@ -58,6 +59,7 @@ class CKralEvents {
   bool Stop(uint32_t time_out_ms = 1000);
 
  protected:
+  // For: a dispatcher whose listeners need something of their own on its thread. Kept; nothing overrides them.
   virtual bool OnThreadStart() { return true; }  // false ends the thread at once
   virtual void OnThreadEnd() {}
 

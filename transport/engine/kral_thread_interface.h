@@ -62,7 +62,7 @@ class CKralThreadInterface {
   void SetOpenFlags(bool send_loopback, bool keep_buffers);
   void SetThreadReadTimeOut(uint32_t milliseconds);
   void SetReceiveMode(ReceiveMode mode);
-  void SetSleepDivisor(uint32_t divisor);
+  void SetSleepDivisor(uint32_t divisor);  // for: trading processor time for latency. Kept; nothing sets it
 
   // --- Requests (kral_thread_requests.cpp) --------------------------------------------------------------------------
   // `room` takes what is received, FCS bytes included where they fit; the reply's bytes are those in front of them. A
@@ -91,6 +91,7 @@ class CKralThreadInterface {
   bool FlushRxBuffer();
   // The liveness check asks with code 4 whether the connection counts as alive without an answer: it does not, 0.
   uint32_t QueryState(uint32_t code) const;
+  // For: a look, in a debugger or a test, at the last request that was not answered. Kept.
   std::span<const uint8_t> timed_out_request() const { return timed_out_request_; }
 
   // As far as they are known here: of the port and of its packets.

@@ -7,7 +7,7 @@
 #include <cstdint>
 #include <mutex>
 
-#include "base/manual_reset_event.h"
+#include "base/event.h"
 
 namespace kral {
 

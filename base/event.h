@@ -1,0 +1,49 @@
+// Events between threads. Each belongs to one connection: two connections' events may share a label and are still never
+// taken for one another.
+#ifndef KRAL_BASE_EVENT_H
+#define KRAL_BASE_EVENT_H
+
+#include <chrono>
+#include <condition_variable>
+#include <cstdint>
+#include <mutex>
+
+namespace kral {
+
+template <bool kTakenByWait>
+class Event {
+ public:
+  explicit Event(const char* label = "") : label_(label) {}
+
+  // Notified under the lock: whoever waited may destroy the event as soon as the wait is over.
+  void Set() {
+    const std::lock_guard lock(mutex_);
+    set_ = true;
+    changed_.notify_all();
+  }
+
+  void Reset() {
+    const std::lock_guard lock(mutex_);
+    set_ = false;
+  }
+
+  bool WaitFor(uint32_t milliseconds) {
+    std::unique_lock lock(mutex_);
+    if (!changed_.wait_for(lock, std::chrono::milliseconds(milliseconds), [this] { return set_; })) return false;
+    if (kTakenByWait) set_ = false;
+    return true;
+  }
+
+ private:
+  [[maybe_unused]] const char* const label_;  // for whoever looks at it in a debugger
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  bool set_ = false;
+};
+
+using ManualResetEvent = Event<false>;  // stays set until it is reset
+using AutoResetEvent = Event<true>;     // one waiter takes it: the wait that it ends resets it
+
+}  // namespace kral
+
+#endif
