@@ -108,6 +108,16 @@ KeepFailure::~KeepFailure() {
   if (keeps_) --call_under_way->keepers_;
 }
 
+FailureMark::FailureMark() noexcept : noted_(IsFailureNoted()) {
+  if (noted_) record_ = call_under_way->record_;
+}
+
+void FailureMark::GoBack() const noexcept {
+  if (call_under_way == nullptr || call_under_way->keepers_ != 0) return;
+  call_under_way->noted_ = noted_;
+  if (noted_) call_under_way->record_ = record_;
+}
+
 CallFailure::CallFailure() noexcept : outer_(call_under_way) {
   call_under_way = this;
 }

@@ -7,6 +7,7 @@
 //   - say it once, at the place that knows most; whoever only passes a failure on adds nothing;
 //   - a failure that is overcome (a retry, another way) may have been said: a call that succeeds leaves no record;
 //   - clean-up behind a failure that may fail itself (closing a handle of the handset) runs under a KeepFailure;
+//   - of many steps that may fail, one that is got over, or matters less, is taken back to a FailureMark;
 //   - a thread of the library's own has no call under way: it carries what it found to the thread that has.
 #ifndef KRAL_BASE_FAILURE_H
 #define KRAL_BASE_FAILURE_H
@@ -59,6 +60,17 @@ class KeepFailure {
   bool keeps_;
 };
 
+// What was noted up to here by the call under way, for what follows to be taken back to.
+class FailureMark {
+ public:
+  FailureMark() noexcept;
+  void GoBack() const noexcept;  // on the same thread, before the call ends
+
+ private:
+  KRAL_ERROR record_;
+  bool noted_;
+};
+
 // One exported call on the thread that makes it. Calls nest: a callback may call into the library.
 class CallFailure {
  public:
@@ -74,6 +86,7 @@ class CallFailure {
  private:
   friend bool Fail(const Failure& failure) noexcept;
   friend class KeepFailure;
+  friend class FailureMark;
 
   CallFailure* const outer_;
   bool noted_ = false;

@@ -91,6 +91,7 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::
     reply = transport().AwaitNext(room, loopback[0], time_out_ms - elapsed, is_own);
   }
   if (reply) answer_owed_ = false;
+  const KeepFailure keep;  // the request whose answer is owed, rather than a loopback that nobody asked for
   return Noted(reply, loopback, time_out_ms);
 }
 

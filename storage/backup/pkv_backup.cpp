@@ -46,16 +46,17 @@ std::vector<Wanted> WantedItems(Diag_FTM& phone) {
 
 class BackupJob {
  public:
-  explicit BackupJob(Diag_FTM& phone) : phone_(phone), aborts_(phone), items_(phone) {}
+  BackupJob(Diag_FTM& phone, const efs::AbortWatch& aborts) : phone_(phone), aborts_(aborts), items_(phone) {}
 
   uint32_t Run(pkv::PkvSet& set) {
+    if (aborts_.aborted()) return KRAL_PKV_STATUS_STOPPED;
     std::vector<items::PhoneItems::FoundFile> files;
     std::vector<items::PhoneItems::UnlistedFolder> unlisted;
     const Answer found = items_.FindFiles(files, unlisted);
     if (aborts_.aborted()) return KRAL_PKV_STATUS_STOPPED;
     if (found == Answer::kLost) return KRAL_PKV_STATUS_LOST;
     const std::vector<Wanted> items = WantedItems(phone_);
-    JobReport report(phone_, items.size() + unlisted.size() + files.size(), 0);
+    JobReport report(phone_, aborts_, items.size() + unlisted.size() + files.size(), 0);
     for (const Wanted& item : items) {
       if (!ReadItem(item, set, report)) return End(report);
     }
@@ -115,7 +116,7 @@ class BackupJob {
   }
 
   Diag_FTM& phone_;
-  const efs::AbortWatch aborts_;
+  const efs::AbortWatch& aborts_;
   items::PhoneItems items_;
   size_t bytes_left_ = kMostFileBytes;
 };
@@ -123,6 +124,7 @@ class BackupJob {
 }  // namespace
 
 uint32_t Backup(Diag_FTM& phone, const std::string& path) {
+  const efs::AbortWatch aborts(phone);
   pkv::PkvSet set;
   phone.pkv().counts = {};
   // Before the many requests that would otherwise be in vain.
@@ -134,7 +136,7 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
     return KRAL_PKV_STATUS_CANNOT_OPEN;
   }
   items::AppendIdentity(phone, set.properties);
-  const uint32_t status = BackupJob(phone).Run(set);
+  const uint32_t status = BackupJob(phone, aborts).Run(set);
   if (status != KRAL_PKV_STATUS_DONE && status != KRAL_PKV_STATUS_INCOMPLETE) {
     phone.log().WriteLine(kLogErr, "KRAL_BackupNVFromMobileToPKV() - nothing written, status %u", status);
     return status;

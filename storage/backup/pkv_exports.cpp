@@ -28,8 +28,7 @@ class Running {
   bool& flag_;
 };
 
-// What a job as a whole came to. What was noted before may be something that it got over; only of files more is known
-// where they are opened.
+// What a job as a whole came to. What was noted before may be something that it got over.
 Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& counts) {
   switch (status) {
     case KRAL_PKV_STATUS_INCOMPLETE:
@@ -56,10 +55,12 @@ Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& coun
   }
 }
 
-// What fails at the file, whether or not the handset has answered.
-bool IsOfFile(uint32_t status, const KRAL_PKV_COUNTS& counts) {
+// Whether what was noted says more: of what fails at the file, whether or not the handset has answered, and of a
+// handset that was not reached at all.
+bool IsToldByWhatWasNoted(uint32_t status, const KRAL_PKV_COUNTS& counts) {
   return status == KRAL_PKV_STATUS_CANNOT_OPEN || status == KRAL_PKV_STATUS_NO_STORAGE ||
-         status == KRAL_PKV_STATUS_BAD_ITEM || (status == KRAL_PKV_STATUS_NOTHING_READ && counts.done > 0);
+         status == KRAL_PKV_STATUS_BAD_ITEM || (status == KRAL_PKV_STATUS_NOTHING_READ && counts.done > 0) ||
+         (status == KRAL_PKV_STATUS_LOST && counts.not_reached + counts.skipped == counts.total);
 }
 
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
@@ -72,7 +73,7 @@ bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   if (result == KRAL_PKV_STATUS_DONE) return true;
-  if (IsOfFile(result, phone.pkv().counts) && kral::IsFailureNoted()) return false;
+  if (kral::IsFailureNoted() && IsToldByWhatWasNoted(result, phone.pkv().counts)) return false;
   return Fail(Judgement(result, TextOrEmpty(file), phone.pkv().counts).Status(KRAL_ERROR_STATUS_RESULT, result));
 }
 

@@ -41,8 +41,8 @@ bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, u
   return true;
 }
 
-JobReport::JobReport(Diag_FTM& phone, size_t total, size_t passed_over)
-    : phone_(phone), aborts_(phone), passed_over_(static_cast<uint32_t>(passed_over)) {
+JobReport::JobReport(Diag_FTM& phone, const efs::AbortWatch& aborts, size_t total, size_t passed_over)
+    : phone_(phone), aborts_(aborts), passed_over_(static_cast<uint32_t>(passed_over)) {
   phone.pkv().counts = {};
   phone.pkv().counts.total = static_cast<uint32_t>(total + passed_over);
   phone.pkv().counts.skipped = passed_over_;

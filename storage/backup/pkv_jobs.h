@@ -24,8 +24,9 @@ bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, u
 // What the three share (pkv_job.cpp): what became of each item, for the counts and the caller's callback.
 class JobReport {
  public:
-  // `passed_over` of the file are counted as skipped; the callback does not get them.
-  JobReport(Diag_FTM& phone, size_t total, size_t passed_over);
+  // `passed_over` of the file are counted as skipped; the callback does not get them. The watch is the job's, which
+  // knows of aborts since it began.
+  JobReport(Diag_FTM& phone, const efs::AbortWatch& aborts, size_t total, size_t passed_over);
   ~JobReport();  // what was not reported was not reached
   JobReport(const JobReport&) = delete;
   JobReport& operator=(const JobReport&) = delete;
@@ -41,7 +42,7 @@ class JobReport {
   void Add(KRAL_PKV_ITEM& record, const char* path);
 
   Diag_FTM& phone_;
-  const efs::AbortWatch aborts_;
+  const efs::AbortWatch& aborts_;
   const uint32_t passed_over_;
   uint32_t reported_ = 0;
   bool stopped_ = false;

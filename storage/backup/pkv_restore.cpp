@@ -13,11 +13,11 @@ using Answer = items::PhoneItems::Answer;
 
 class RestoreJob {
  public:
-  RestoreJob(Diag_FTM& phone, const pkv::PkvSet& set)
+  RestoreJob(Diag_FTM& phone, const efs::AbortWatch& aborts, const pkv::PkvSet& set)
       : items_(phone),
         set_(set),
         arrays_(phone, set),
-        report_(phone, set.items.size() + set.files.size(), set.unread.size()) {}
+        report_(phone, aborts, set.items.size() + set.files.size(), set.unread.size()) {}
 
   uint32_t Run() {
     std::span<const pkv::PkvNvItem> rest(set_.items);  // subscription 0 comes first
@@ -138,9 +138,10 @@ class RestoreJob {
 }  // namespace
 
 uint32_t Restore(Diag_FTM& phone, const std::string& path) {
+  const efs::AbortWatch aborts(phone);
   pkv::PkvSet set;
   if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
-  return RestoreJob(phone, set).Run();
+  return RestoreJob(phone, aborts, set).Run();
 }
 
 }  // namespace kral::backup

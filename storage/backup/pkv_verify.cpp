@@ -9,11 +9,11 @@ using Answer = items::PhoneItems::Answer;
 
 class VerifyJob {
  public:
-  VerifyJob(Diag_FTM& phone, const pkv::PkvSet& set)
+  VerifyJob(Diag_FTM& phone, const efs::AbortWatch& aborts, const pkv::PkvSet& set)
       : items_(phone),
         set_(set),
         arrays_(phone, set),
-        report_(phone, set.items.size() + set.files.size(), set.unread.size()) {}
+        report_(phone, aborts, set.items.size() + set.files.size(), set.unread.size()) {}
 
   uint32_t Run() {
     for (const pkv::PkvNvItem& item : set_.items) {
@@ -71,9 +71,10 @@ class VerifyJob {
 }  // namespace
 
 uint32_t Verify(Diag_FTM& phone, const std::string& path) {
+  const efs::AbortWatch aborts(phone);
   pkv::PkvSet set;
   if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
-  return VerifyJob(phone, set).Run();
+  return VerifyJob(phone, aborts, set).Run();
 }
 
 }  // namespace kral::backup

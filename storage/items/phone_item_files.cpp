@@ -69,6 +69,9 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vec
     return Answer::kAnswered;
   }
   if (status != efs::kDone || depth > kDeepest || ++walked_ > kMostEntries) {
+    if (answer == Answer::kAnswered && efs::IsDone(status, path.c_str())) {
+      Fail(Failure(KRAL_ERROR_LINK, "%s lies too deep, or behind too many folders", path.c_str()));
+    }
     TellUnlisted(path, status != efs::kDone ? status : kRefusedStatus, unlisted);
     return Answer::kAnswered;
   }
@@ -81,6 +84,7 @@ PhoneItems::Answer PhoneItems::Walk(const std::string& path, int depth, std::vec
   }
   for (const KRAL_EFS_ENTRY& entry : entries) {
     if (files.size() >= kMostEntries) {
+      Fail(Failure(KRAL_ERROR_LINK, "there are too many files, in %s among others", path.c_str()));
       TellUnlisted(path, kRefusedStatus, unlisted);
       return Answer::kAnswered;
     }
@@ -126,13 +130,17 @@ PhoneItems::Answer PhoneItems::ReadItemFile(pkv::PkvEfsFile& file, uint32_t& sta
 
 PhoneItems::Answer PhoneItems::ReadPlainFile(pkv::PkvEfsFile& file, uint32_t size, uint32_t& status) {
   status = efs::kDone;
-  if (size > kLargestFile) return Answer::kRefused;
+  if (size > kLargestFile) {
+    Fail(Failure(KRAL_ERROR_LINK, "the file %s has %u bytes, more than are kept", file.path.c_str(), size));
+    return Answer::kRefused;
+  }
   file.bytes.resize(size);
   if (efs::ReadPlainFile(phone_, file.path.c_str(), file.bytes.data(), &size)) {
     file.bytes.resize(size);
     return Answer::kAnswered;
   }
   if (aborts_.aborted()) return Answer::kRefused;
+  const KeepFailure keep;
   uint32_t mode = 0;
   // Lost, or only not to be had: a handset that still answers tells.
   return Status(file.path.c_str(), mode, size, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;
@@ -173,6 +181,7 @@ PhoneItems::Answer PhoneItems::WriteItemFile(const pkv::PkvEfsFile& file, uint32
 PhoneItems::Answer PhoneItems::WritePlainFile(const pkv::PkvEfsFile& file, uint32_t& status) {
   status = efs::kDone;
   if (efs::WriteMemory(phone_, file.bytes, file.path.c_str(), {})) return Answer::kAnswered;
+  const KeepFailure keep;
   uint32_t mode = 0;
   uint32_t present = 0;
   return Status(file.path.c_str(), mode, present, status) == Answer::kLost ? Answer::kLost : Answer::kRefused;

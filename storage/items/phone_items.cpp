@@ -37,6 +37,7 @@ PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
 
 // One request that gets no answer, or is too long to be sent, does not end the work with a handset that is there.
 PhoneItems::Answer PhoneItems::Unanswered() {
+  const KeepFailure keep;  // the request that failed, rather than the check
   return phone_.IsPhoneConnected() ? Answer::kRefused : Answer::kLost;
 }
 

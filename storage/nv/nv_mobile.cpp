@@ -14,22 +14,27 @@ namespace {
 using Kind = NvAnswer::Kind;
 using Answer = items::PhoneItems::Answer;
 
+// Without a status; why is noted where the request failed.
+NvAnswer Unanswered(Answer answer) {
+  return {answer == Answer::kLost ? Kind::kNoAnswer : Kind::kRefused};
+}
+
+NvAnswer Judged(uint16_t id, uint16_t status) {
+  if (status == kDone) return {Kind::kOk};
+  Fail(Refusal(id, status));
+  return {Kind::kRefused, status};
+}
+
+// By the error number of the handset's file system.
+NvAnswer JudgedFile(const std::string& path, uint32_t error) {
+  if (efs::IsDone(error, path.c_str())) return {Kind::kOk};
+  return {Kind::kRefused, error == efs::kMissing ? kNeverWritten : kDone};
+}
+
 }  // namespace
 
 uint32_t ModeOfNewFile(size_t size) {
   return (size <= KRAL_EFS_ITEM_SIZE ? efs::kItemFile : efs::kPlainFile) | efs::kModeOfNewFiles;
-}
-
-NvAnswer NvMobile::Judged(Answer answer, uint16_t status) {
-  switch (answer) {
-    case Answer::kAnswered:
-      return {status == kDone ? Kind::kOk : Kind::kRefused, status};
-    case Answer::kRefused:
-      return {Kind::kRefused};
-    case Answer::kLost:
-      break;
-  }
-  return {phone_.IsPhoneConnected() ? Kind::kRefused : Kind::kNoAnswer};
 }
 
 bool NvMobile::CanName(const NvItem& item) const {
@@ -45,12 +50,16 @@ pkv::PkvNvItem NvMobile::Numbered(const NvItem& item, uint16_t element) const {
 }
 
 NvAnswer NvMobile::Read(NvItem& item, uint16_t element, NvBytes& stored) {
-  if (!CanName(item)) return {Kind::kRefused, kNeverWritten};
+  if (!CanName(item)) {
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: elements of arrays can be read for subscription 0 only",
+                 item.Title().c_str()));
+    return {Kind::kRefused, kNeverWritten};
+  }
   if (item.is_file()) {
     uint16_t status = kDone;
     // Outside factory test mode the same bytes are read from the item's file.
     if (item.id && has_rf_dispatcher_) {
-      if (ReadRf(phone_, *item.id, stored, status)) return Judged(Answer::kAnswered, status);
+      if (ReadRf(phone_, *item.id, stored, status)) return Judged(*item.id, status);
       has_rf_dispatcher_ = false;
     }
     return ReadFile(item, stored);
@@ -59,18 +68,23 @@ NvAnswer NvMobile::Read(NvItem& item, uint16_t element, NvBytes& stored) {
   const Answer answer = items_.Read(numbered, item.is_array());
   const size_t size = item.is_array() ? kDataSize - 1 : kDataSize;
   stored.assign(numbered.data.begin(), numbered.data.begin() + static_cast<std::ptrdiff_t>(size));
-  if (answer == Answer::kAnswered) {
-    phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, numbered.status);
-  }
-  return Judged(answer, numbered.status);
+  if (answer != Answer::kAnswered) return Unanswered(answer);
+  phone_.log().WriteLine(kLogRet, "DIAG_NV_READ_F NV Id:%d Status:%d", *item.id, numbered.status);
+  return Judged(*item.id, numbered.status);
 }
 
 NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored) {
-  if (!CanName(item)) return {Kind::kRefused};
+  if (!CanName(item)) {
+    phone_.log().WriteLine(kLogErr, "%s: elements of arrays can be written for subscription 0 only",
+                           item.Title().c_str());
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: elements of arrays can be written for subscription 0 only",
+                 item.Title().c_str()));
+    return {Kind::kRefused};
+  }
   uint16_t status = kDone;
   if (item.is_file()) {
     if (item.id && has_rf_dispatcher_ && stored.size() <= kRfDataSize) {
-      if (WriteRf(phone_, *item.id, stored, status)) return Judged(Answer::kAnswered, status);
+      if (WriteRf(phone_, *item.id, stored, status)) return Judged(*item.id, status);
       has_rf_dispatcher_ = false;
     }
     return WriteFile(item, stored);
@@ -78,10 +92,9 @@ NvAnswer NvMobile::Write(const NvItem& item, uint16_t element, std::span<const u
   pkv::PkvNvItem numbered = Numbered(item, element);
   std::copy_n(stored.begin(), std::min(stored.size(), numbered.data.size()), numbered.data.begin());
   const Answer answer = items_.Write(numbered, item.is_array(), status);
-  if (answer == Answer::kAnswered) {
-    phone_.log().WriteLine(kLogRet, "DIAG_NV_WRITE_F NV Id:%d Status:%d", *item.id, status);
-  }
-  return Judged(answer, status);
+  if (answer != Answer::kAnswered) return Unanswered(answer);
+  phone_.log().WriteLine(kLogRet, "DIAG_NV_WRITE_F NV Id:%d Status:%d", *item.id, status);
+  return Judged(*item.id, status);
 }
 
 NvAnswer NvMobile::ReadFile(NvItem& item, NvBytes& stored) {
@@ -89,18 +102,19 @@ NvAnswer NvMobile::ReadFile(NvItem& item, NvBytes& stored) {
   uint32_t size = 0;
   uint32_t error = 0;
   const Answer told = items_.Status(item.path.c_str(), mode, size, error);
-  if (told != Answer::kAnswered) return Judged(told, 0);
-  if (error != efs::kDone) return {Kind::kRefused, kNeverWritten};
+  if (told != Answer::kAnswered) return Unanswered(told);
+  if (error != efs::kDone) return JudgedFile(item.path, error);
   if (size > kLongestValue) {
     phone_.log().WriteLine(kLogErr, "%s has %u bytes, too many for an item", item.path.c_str(), size);
+    Fail(Failure(KRAL_ERROR_LINK, "the file %s has %u bytes, too many for an item", item.path.c_str(), size));
     return {Kind::kRefused};
   }
   item.mode = mode;
   pkv::PkvEfsFile file{item.path, mode, {}};
   const Answer answer = items_.ReadTold(file, size, error);
-  if (answer != Answer::kAnswered) return Judged(answer, 0);
+  if (answer != Answer::kAnswered) return Unanswered(answer);
   stored = std::move(file.bytes);
-  return {error == 0 ? Kind::kOk : Kind::kRefused};
+  return JudgedFile(item.path, error);
 }
 
 NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored) {
@@ -108,7 +122,7 @@ NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored
   uint32_t size = 0;
   uint32_t error = 0;
   const Answer told = items_.Status(item.path.c_str(), file.mode, size, error);
-  if (told != Answer::kAnswered) return Judged(told, 0);
+  if (told != Answer::kAnswered) return Unanswered(told);
   // A file that is there stays what it is; another one becomes what it was where it was seen.
   const bool is_there = error == efs::kDone;
   if (!is_there) file.mode = item.mode != 0 ? item.mode : ModeOfNewFile(stored.size());
@@ -119,12 +133,12 @@ NvAnswer NvMobile::WriteFile(const NvItem& item, std::span<const uint8_t> stored
   if (answer == Answer::kAnswered && error == efs::kDone && is_new && is_mode_known) {
     answer = items_.SetPermissions(file, error);
   }
-  if (answer != Answer::kAnswered) return Judged(answer, 0);
-  return {error == 0 ? Kind::kOk : Kind::kRefused};
+  if (answer != Answer::kAnswered) return Unanswered(answer);
+  return JudgedFile(item.path, error);
 }
 
-bool NvMobile::ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files) {
-  return items_.FindFiles(files) == Answer::kAnswered;
+Answer NvMobile::ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files) {
+  return items_.FindFiles(files);
 }
 
 }  // namespace kral::nv

@@ -13,6 +13,7 @@
 namespace kral::nv {
 
 // What became of an item. The status is the handset's NV status; of a file kNeverWritten when it is not there, else 0.
+// Unless it is done, why is noted.
 struct NvAnswer {
   enum class Kind { kOk, kRefused, kNoAnswer } kind;
   uint16_t status = 0;
@@ -28,21 +29,19 @@ class NvMobile {
  public:
   NvMobile(Diag_FTM& phone, uint16_t subscription) : phone_(phone), subscription_(subscription), items_(phone) {}
 
-  // No request names both an element and a subscription: of another than 0, arrays have no value and take none.
-  bool CanName(const NvItem& item) const;
-
   // Values as they are kept (storage/nv_value.h). What gets no answer in spite of several tries counts as refused as
   // long as the handset answers others.
   NvAnswer Read(NvItem& item, uint16_t element, NvBytes& stored);  // and the mode of a file
   NvAnswer Write(const NvItem& item, uint16_t element, std::span<const uint8_t> stored);
 
-  // The files in the folders in which handsets keep item files. False when they could not all be listed.
-  bool ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files);
+  // The files in the folders in which handsets keep item files. kRefused when they could not all be listed.
+  items::PhoneItems::Answer ListItemFiles(std::vector<items::PhoneItems::FoundFile>& files);
 
  private:
+  // No request names both an element and a subscription: of another than 0, arrays have no value and take none.
+  bool CanName(const NvItem& item) const;
   NvAnswer ReadFile(NvItem& item, NvBytes& stored);
   NvAnswer WriteFile(const NvItem& item, std::span<const uint8_t> stored);
-  NvAnswer Judged(items::PhoneItems::Answer answer, uint16_t status);
   pkv::PkvNvItem Numbered(const NvItem& item, uint16_t element) const;
 
   Diag_FTM& phone_;

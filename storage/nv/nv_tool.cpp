@@ -13,7 +13,12 @@ namespace kral::nv {
 void NVTool_Manager::Walk::Report(const std::string& title, NvError error) {
   ++done_;
   // An item that the handset has no value for is no failure of the set.
-  failed_ = failed_ || (error != NvError::kNone && error != NvError::kNoValue);
+  if (!failed_ && error != NvError::kNone && error != NvError::kNoValue) {
+    failed_ = true;
+    first_ = FailureMark();
+  } else if (error != NvError::kNoConnection) {  // which ends the set
+    first_.GoBack();
+  }
   if (tool_.callback_ == nullptr) return;
   CallGuarded(
       [&] { tool_.callback_(operation_, done_, total_, title.c_str(), static_cast<uint32_t>(error), tool_.handle_); });

@@ -82,7 +82,7 @@ class NVTool_Manager final : public FamilyObject {
   std::vector<NvItem*> Chosen(bool NvItem::*mark);
   NvError LoadFilter(Diag_FTM& phone, const std::string& file, NvFilter& filter);
 
-  bool DefineItemFiles(Diag_FTM& phone, NvMobile& mobile);
+  items::PhoneItems::Answer DefineItemFiles(Diag_FTM& phone, NvMobile& mobile);
   NvError ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& item, uint16_t element, uint16_t& status);
   NvError ReadWhole(Diag_FTM& phone, NvItem& item, uint16_t& status);
   NvError WriteElement(Diag_FTM& phone, NvMobile& mobile, const NvItem& item, NvSlot slot, const NvBytes& value,
@@ -107,7 +107,8 @@ class NVTool_Manager final : public FamilyObject {
   uint16_t subscription_ = 0;
 };
 
-// Reports each item of a set to the callback, and remembers whether one of them failed.
+// Reports each item of a set to the callback, and remembers whether one of them failed. The first that did is the one
+// whose failure stays noted, whatever the later ones get over.
 class NVTool_Manager::Walk {
  public:
   Walk(NVTool_Manager& tool, uint32_t operation, size_t total)
@@ -127,6 +128,7 @@ class NVTool_Manager::Walk {
   const uint32_t total_;
   uint32_t done_ = 0;
   bool failed_ = false;
+  FailureMark first_;
 };
 
 }  // namespace kral::nv

@@ -139,6 +139,8 @@ NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const pkv::PkvEfsFile& entry) 
     if (entry.bytes.size() > kLongestValue || !IsUsualPath(entry.path)) {
       phone.log().WriteLine(kLogErr, "A file of %u bytes is left out: it is too large or its name is unusual",
                             static_cast<unsigned>(entry.bytes.size()));
+      Fail(Failure(KRAL_ERROR_BAD_FILE, "the file %s of %zu bytes is too large, or its name is unusual",
+                   entry.path.c_str(), entry.bytes.size()));
       return NvError::kBadPkvItem;
     }
     item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
@@ -154,7 +156,7 @@ bool NVTool_Manager::AppendToPkv(Diag_FTM& phone, const NvItem& item, NvSlot slo
   auto stored = ToStored(item, value);
   if (!stored) {
     phone.log().WriteLine(kLogErr, "%s: its value has no room in a data field", item.Title().c_str());
-    return false;
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: its value has no room in a data field", item.Title().c_str()));
   }
   if (item.is_file()) {
     const uint32_t mode = item.mode != 0 ? item.mode : ModeOfNewFile(stored->size());

@@ -10,28 +10,22 @@
 namespace kral::nv {
 namespace {
 
+using Answer = items::PhoneItems::Answer;
+
 size_t CountElements(const std::vector<NvItem*>& items) {
   size_t count = 0;
   for (const NvItem* item : items) count += size_t{item->max_index} + 1;
   return count;
 }
 
-// With the status of an item; the handset has no such status for files.
-Failure Refused(const NvItem& item, uint16_t status) {
-  if (!item.is_file()) return Refusal(*item.id, status);
-  if (status == kNeverWritten) {
-    return Failure(KRAL_ERROR_REFUSED, "no such file %s", item.path.c_str())
-        .Status(KRAL_ERROR_STATUS_EFS, efs::kMissing);
-  }
-  return Failure(KRAL_ERROR_REFUSED, "the handset refused %s", item.path.c_str());
-}
-
 }  // namespace
 
 NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
   NvMobile mobile(phone, subscription_);
-  const bool listed = DefineItemFiles(phone, mobile);
-  if (!listed && !phone.IsPhoneConnected()) return NvError::kNoConnection;
+  const FailureMark begin;
+  const Answer listed = DefineItemFiles(phone, mobile);
+  if (listed == Answer::kLost) return NvError::kNoConnection;
+  if (listed == Answer::kAnswered) begin.GoBack();
   const std::vector<NvItem*> items = Chosen(&NvItem::will_read);
   Walk walk(*this, KRAL_NV_OPERATION_READ_MOBILE, CountElements(items));
   for (NvItem* item : items) {
@@ -42,14 +36,15 @@ NvError NVTool_Manager::LoadFromMobile(Diag_FTM& phone) {
       if (error == NvError::kNoConnection) return error;
     }
   }
-  return walk.failed() || !listed ? NvError::kCannotGetValue : NvError::kNone;
+  return walk.failed() || listed != Answer::kAnswered ? NvError::kCannotGetValue : NvError::kNone;
 }
 
-// False when there may be more files than those that were found.
-bool NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
+// kRefused when there may be more files than those that were found.
+Answer NVTool_Manager::DefineItemFiles(Diag_FTM& phone, NvMobile& mobile) {
   std::vector<items::PhoneItems::FoundFile> files;
-  const bool listed = mobile.ListItemFiles(files);
-  if (!listed) phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
+  const Answer listed = mobile.ListItemFiles(files);
+  if (listed == Answer::kLost) return listed;
+  if (listed == Answer::kRefused) phone.log().WriteLine(kLogErr, "Item files could not be listed to the end");
   for (const auto& [path, mode, size] : files) {
     if (NvItem* const known = definitions_.Find(path)) {
       known->mode = mode;
@@ -76,7 +71,6 @@ NvError NVTool_Manager::ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& i
   item.values.erase(slot);
   if (status == kNeverWritten) return NvError::kNoValue;
   phone.log().WriteLine(kLogErr, "%s was refused with status %d", item.Title().c_str(), status);
-  Fail(Refused(item, status));
   return item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
 }
 
@@ -84,19 +78,24 @@ NvError NVTool_Manager::ReadWhole(Diag_FTM& phone, NvItem& item, uint16_t& statu
   NvMobile mobile(phone, subscription_);
   NvError failure = NvError::kNone;
   bool has_value = false;
+  FailureMark told_so_far;
   for (uint32_t element = 0; element <= item.max_index; ++element) {
     uint16_t told = 0;
     const NvError error = ReadElement(phone, mobile, item, static_cast<uint16_t>(element), told);
     if (error == NvError::kNoConnection) return error;
     has_value = has_value || error == NvError::kNone;
-    // The first failure is what is told.
-    if (error == NvError::kNone || error == NvError::kNoValue || failure != NvError::kNone) continue;
+    // The first failure is what is told, and else that there is no value.
+    if (error == NvError::kNone || failure != NvError::kNone) {
+      told_so_far.GoBack();
+      continue;
+    }
+    told_so_far = FailureMark();
+    if (error == NvError::kNoValue) continue;
     failure = error;
     status = told;
   }
   if (failure != NvError::kNone || has_value) return failure;
   status = kNeverWritten;
-  Fail(Refused(item, status));
   return item.is_file() ? NvError::kCannotReadFileItem : NvError::kCannotGetValue;
 }
 
@@ -132,19 +131,11 @@ NvError NVTool_Manager::WriteElement(Diag_FTM& phone, NvMobile& mobile, const Nv
     Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: its value has no room on the handset", item.Title().c_str()));
     return failure;
   }
-  if (!mobile.CanName(item)) {
-    phone.log().WriteLine(kLogErr, "%s: elements of arrays can be written for subscription 0 only",
-                          item.Title().c_str());
-    Fail(Failure(KRAL_ERROR_ARGUMENT, "%s: elements of arrays can be written for subscription 0 only",
-                 item.Title().c_str()));
-    return failure;
-  }
   const NvAnswer answer = mobile.Write(item, slot.element, *stored);
   if (answer.kind == NvAnswer::Kind::kNoAnswer) return NvError::kNoConnection;
   status = answer.status;
   if (answer.done()) return NvError::kNone;
   phone.log().WriteLine(kLogErr, "%s was refused with status %d", item.Title().c_str(), status);
-  Fail(Refused(item, status));
   return failure;
 }
 

@@ -1,7 +1,8 @@
-// Every way in which a function of the handset's files or of backups fails leaves a record that is right.
+// Every way in which a function of the handset's files, items or backups fails leaves a record that is right.
 #include <gtest/gtest.h>
 
 #include "kral/error.h"
+#include "kral/nv_tool.h"
 #include "kral/pkv.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"
@@ -293,12 +294,74 @@ TEST_F(StorageFailure, OfBackupsIsWhatTheJobCameTo) {
              });
        },
        verify, "KRAL_PKV_Verify", 130, kResult, KRAL_PKV_STATUS_STOPPED, "not reached"},
-      {"silence",
+      {"silence from the start",
        [&] {
          KRAL_PKV_ConfigureCallBack(h, nullptr);
          handset().faults().Add(handset::Ignore(), When::Always());
        },
-       verify, "KRAL_PKV_Verify", 9, kResult, KRAL_PKV_STATUS_LOST, "stopped answering"},
+       verify, "KRAL_PKV_Verify", 5, 0, 0, "no answer to command 38"},
+      {"silence on the way", [&] { handset().faults().Add(handset::Ignore(), When::From(5)); }, verify,
+       "KRAL_PKV_Verify", 9, kResult, KRAL_PKV_STATUS_LOST, "stopped answering"},
+      {"nothing but damage", [&] { handset().faults().Add(handset::Corrupt(), When::Always()); }, backup,
+       "KRAL_BackupNVFromMobileToPKV", 6, 0, 0, "wrong check"},
+      {"aborted while the handset is asked who it is",
+       [&] { handset().On(124, {}, [h](handset::ByteView, handset::Wire&) { KRAL_AbortEFS_Operation(h); }); }, backup,
+       "KRAL_BackupNVFromMobileToPKV", 130, kResult, KRAL_PKV_STATUS_STOPPED, "stopped by the caller"},
+  };
+  for (const Row& row : kRows) Check(row);
+}
+
+TEST_F(StorageFailure, OfItemsIsWhatBecameOfTheRequest) {
+  const KRAL_HANDLE h = handle();
+  constexpr uint32_t kNv = KRAL_ERROR_STATUS_NV;
+  constexpr const char* kById = "KRAL_NV_ReadNVItemFromMobileByNVID";
+  constexpr const char* kByPath = "KRAL_NV_ReadNVItemFromMobileByEfsFilename";
+  KRAL_ConfigureTimeOut(h, 1, 40);
+  const std::string definitions =
+      folder_.Add("definitions.xml",
+                  "<NvDefinition><NvItem id='3'><DataType><Member name='a' typeid='word8'/></DataType></NvItem>"
+                  "<NvItem id='4' maxIndex='2'><DataType><Member name='a' typeid='word8'/></DataType></NvItem>"
+                  "<NvEfsItem fullpathname='/nv/item_files/rfnv/00020002'>"
+                  "<DataType><Member name='a' typeid='word8'/></DataType></NvEfsItem></NvDefinition>");
+  ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(h, definitions.c_str()), 0u);
+  handset().efs().AddItemFile("/nv/item_files/rfnv/00020002", Bytes{1});
+  handset().nv().Set(3, Bytes{1});
+  uint16_t status = 0;
+  const auto on = [&](handset::Fault fault, const char* prefix) {
+    return [this, fault, prefix] { handset().faults().Add(fault, When::Always().Of(prefix)); };
+  };
+  const auto read = [&](uint16_t id) {
+    return [h, id, &status] { return uint8_t{KRAL_NV_ReadNVItemFromMobileByNVID(h, id, &status) == 0}; };
+  };
+  const auto read_file = [&] { return uint8_t{KRAL_NV_ReadNVItemFromMobileByEfsFilename(h, "/nope") == 0}; };
+  const auto load = [&] { return uint8_t{KRAL_NV_LoadNVsFromMobile(h) == 0}; };
+
+  const Row kRows[] = {
+      {"silence", on(handset::Ignore(), "26"), read(3), kById, 5, 0, 0, "no answer to command 38"},
+      {"undefined", on(handset::Ignore(), "26"), read(1), kById, 5, 0, 0, "no answer to command 38"},
+      {"damage", on(handset::Corrupt(), "26"), read(3), kById, 6, 0, 0, "wrong check"},
+      {"another reply", on(handset::WrongCode(0x99), "26"), read(3), kById, 6, KRAL_ERROR_STATUS_REPLY, 153, "153"},
+      {"refused", on(handset::Refuse(20), "26"), read(3), kById, 7, KRAL_ERROR_STATUS_REFUSAL, 20, "command 38"},
+      {"all silent", on(handset::Ignore(), ""), read(3), kById, 5, 0, 0, "no answer to command 38"},
+      {"silence of files", on(handset::Ignore(), "4B 13"), read_file, kByPath, 5, 0, 0, "command 75/19/15"},
+      {"refused file", on(handset::Refuse(24), "4B 13"), read_file, kByPath, 7, KRAL_ERROR_STATUS_REFUSAL, 24, "75/19"},
+      {"missing file", {}, read_file, kByPath, 7, kEfs, 2, "no such file /nope"},
+      {"never written", {}, read(1), kById, 7, kNv, 5, "NV item 1: the handset gives status 5"},
+      // The dispatcher of RF NV items refuses outside factory test mode: that was got over.
+      {"set", [&] { handset().nv().SetStatus(3, handset::NvStatus::kFailed); }, load, "KRAL_NV_LoadNVsFromMobile", 7,
+       kNv, 4, "NV item 3"},
+      {"array",
+       [&] {
+         handset().On(38, {}, [](handset::ByteView request, handset::Wire& wire) {
+           Bytes reply(133);
+           std::copy_n(request.begin(), 4, reply.begin());
+           reply[131] = static_cast<uint8_t>(reply[3] + 1);
+           wire.Send(reply);
+         });
+       },
+       read(4), kById, 7, kNv, 1, "NV item 4"},
+      {"permission", Answer(15, "4B 13 0F 00 0D000000 00000000 00000000 00000000 00000000 00000000 00000000"),
+       read_file, kByPath, 7, kEfs, 13, "no permission for /nope"},
   };
   for (const Row& row : kRows) Check(row);
 }
