@@ -11,9 +11,9 @@
 namespace kral {
 
 template <bool kTakenByWait>
-class Event {
+class ThreadEvent {
  public:
-  explicit Event(const char* label = "") : label_(label) {}
+  explicit ThreadEvent(const char* label = "") : label_(label) {}
 
   // Notified under the lock: whoever waited may destroy the event as soon as the wait is over.
   void Set() {
@@ -41,8 +41,8 @@ class Event {
   bool set_ = false;
 };
 
-using ManualResetEvent = Event<false>;  // stays set until it is reset
-using AutoResetEvent = Event<true>;     // one waiter takes it: the wait that it ends resets it
+using ManualResetEvent = ThreadEvent<false>;  // stays set until it is reset
+using AutoResetEvent = ThreadEvent<true>;     // one waiter takes it: the wait that it ends resets it
 
 }  // namespace kral
 
