@@ -21,8 +21,7 @@ static int print_version(KRAL_HANDLE handle) {
   uint16_t firmware;
 
   if (!KRAL_DIAG_VERNO_F(handle, compile_date, compile_time, release_date, release_time, version_directory,
-                         &station_class, &revision, &model, &firmware, &slot_cycle, &vocoder_major,
-                         &vocoder_minor)) {
+                         &station_class, &revision, &model, &firmware, &slot_cycle, &vocoder_major, &vocoder_minor)) {
     fprintf(stderr, "the handset does not tell its version\n");
     return 1;
   }

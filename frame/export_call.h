@@ -105,9 +105,9 @@ class ExportCall {
 
   void WriteName();
   void WriteEntry(const char* rest);  // name and rest of the line
-  bool Begin();                 // the line; false, with the failure recorded, when nothing is to be done
-  bool IsPermitted() noexcept;  // by what was required
-  void Failed() noexcept;       // records what was noted
+  bool Begin();                       // the line; false, with the failure recorded, when nothing is to be done
+  bool IsPermitted() noexcept;        // by what was required
+  void Failed() noexcept;             // records what was noted
   void Threw() noexcept;
 
   const KRAL_HANDLE handle_;

@@ -40,8 +40,10 @@ machine_sources() {
       print type, $2, $3, $4 }'
 }
 
-# What every build needs, and what the 32-bit Windows home needs beside it.
+# What every build needs, and what the 32-bit Windows platform needs beside it.
 build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev python3
   libxml2-utils srecord libgsf-bin python3-olefile)
+# What the checks of the sources need.
+check_packages=(clang-format)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)

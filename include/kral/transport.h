@@ -141,10 +141,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCallBacks(KRAL_HANDLE handle, KRAL_RAW_
  *
  * A handset answers in order, and may answer late: after the time-out. Replies that repeat their request (NV items,
  * memory, factory test commands, subsystem requests) are compared with it, and a late one is passed over. Some repeat
- * nothing (switches, error log, build identity, KRAL_SendSync): there a late reply would be taken for the next request's.
- * With this on the library sends a loopback with a number of its own first, and passes over everything in front of its
- * echo. When the echo does not come within the time-out of the request, that counts as not answered and is not sent.
- * KRAL_SendRAW and the download functions are left as they are.
+ * nothing (switches, error log, build identity, KRAL_SendSync): there a late reply would be taken for the next
+ * request's. With this on the library sends a loopback with a number of its own first, and passes over everything in
+ * front of its echo. When the echo does not come within the time-out of the request, that counts as not answered and is
+ * not sent. KRAL_SendRAW and the download functions are left as they are.
  *
  * Off by default; always on in backups, restores, comparisons and the NV tool.
  *

@@ -1,5 +1,6 @@
 // What the library tells in its text log only: the counts of a comparison, the status that a boot loader gives of a
-// transfer, lines that the log's own file did not take. Why a call failed is told by KRAL_GetLastError (call_failure.h).
+// transfer, lines that the log's own file did not take. Why a call failed is told by KRAL_GetLastError
+// (call_failure.h).
 #ifndef KRAL_TOOLS_RESULT_LINES_H
 #define KRAL_TOOLS_RESULT_LINES_H
 

@@ -17,9 +17,9 @@ struct TrafficCounters {
   uint64_t dropped_responses = 0;
   uint64_t dropped_not_collecting = 0;  // asynchronous packets while collection was off
   uint64_t bad_fcs = 0;
-  uint64_t oversized = 0;       // in the de-framer, and packets of a size that the sorter does not take
-  uint64_t waiting = 0;         // handed to the dispatcher, and not yet through callbacks and queues
-  uint64_t most_waiting = 0;    // the greatest that was
+  uint64_t oversized = 0;     // in the de-framer, and packets of a size that the sorter does not take
+  uint64_t waiting = 0;       // handed to the dispatcher, and not yet through callbacks and queues
+  uint64_t most_waiting = 0;  // the greatest that was
 };
 
 }  // namespace kral

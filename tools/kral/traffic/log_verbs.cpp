@@ -201,18 +201,17 @@ void NoteCut(const Context& context, const std::string& file) {
 void Play(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   std::uint64_t packets = 0;
-  const bool whole =
-      PlayFile(handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
-               [&](const PlayedPacket& packet) {
-                 ++packets;
-                 const auto what = DescribePacket(packet.bytes);
-                 context.out.Stream({{"event", "packet"},
-                                     {"microseconds", packet.microseconds},
-                                     {"what", what},
-                                     {"bytes", HexText(packet.bytes)}},
-                                    fmt::format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what,
-                                                packet.bytes.size(), HexDump(packet.bytes)));
-               });
+  const bool whole = PlayFile(handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
+                              [&](const PlayedPacket& packet) {
+                                ++packets;
+                                const auto what = DescribePacket(packet.bytes);
+                                context.out.Stream({{"event", "packet"},
+                                                    {"microseconds", packet.microseconds},
+                                                    {"what", what},
+                                                    {"bytes", HexText(packet.bytes)}},
+                                                   fmt::format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds),
+                                                               what, packet.bytes.size(), HexDump(packet.bytes)));
+                              });
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
 }
@@ -237,8 +236,8 @@ void FileStatistics(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
-  const bool whole = PlayFile(handle.get(), options.file, Pace::kAtOnce,
-                              [&](const PlayedPacket& packet) { table.Add(packet.bytes); });
+  const bool whole =
+      PlayFile(handle.get(), options.file, Pace::kAtOnce, [&](const PlayedPacket& packet) { table.Add(packet.bytes); });
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"cut", !whole}, {"rows", table.Rows(handle.get(), 0)}},
                      table.Text(handle.get(), 0));
