@@ -54,4 +54,5 @@ foreach(row IN LISTS rows)
   endif()
 endforeach()
 # The public headers are reached as <kral/...>.
-target_include_directories(kral_include INTERFACE ${PROJECT_SOURCE_DIR}/include)
+target_include_directories(kral_include INTERFACE ${PROJECT_SOURCE_DIR}/include ${PROJECT_BINARY_DIR}/generated)
+configure_file(${PROJECT_SOURCE_DIR}/frame/version.h.in ${PROJECT_BINARY_DIR}/generated/frame/version.h @ONLY)

@@ -8,7 +8,6 @@
 
 #include "kral/kral.h"
 
-#define RF_MODE_WCDMA 9
 #define DETECTOR_TARGET 3000
 #define DETECTOR_TOLERANCE 2
 
@@ -66,7 +65,7 @@ static int calibrate(KRAL_HANDLE handle) {
     fprintf(stderr, "the handset does not enter factory test mode\n");
     return 0;
   }
-  if (!KRAL_FTM_SET_MODE(handle, RF_MODE_WCDMA) || !KRAL_FTM_SET_TX_ON(handle)) {
+  if (!KRAL_FTM_SET_MODE(handle, KRAL_FTM_RF_MODE_WCDMA) || !KRAL_FTM_SET_TX_ON(handle)) {
     fprintf(stderr, "the transmitter cannot be switched on\n");
     done = 0;
   }
@@ -84,7 +83,7 @@ int main(int argc, char **argv) {
     fprintf(stderr, "usage: calibration_loop PORT\n");
     return 2;
   }
-  KRAL_SetDefaultReceiveMode(1);
+  KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   handle = KRAL_ConnectServer((uint32_t)strtoul(argv[1], NULL, 10));
   if (!KRAL_IsPhoneConnected(handle)) {
     fprintf(stderr, "no handset answers on port %s\n", argv[1]);

@@ -12,11 +12,11 @@ static void print_field(const char *label, const char *text, int size) {
 }
 
 static int print_version(KRAL_HANDLE handle) {
-  char compile_date[11];
-  char compile_time[8];
-  char release_date[11];
-  char release_time[8];
-  char version_directory[8];
+  char compile_date[KRAL_VERNO_DATE_SIZE];
+  char compile_time[KRAL_VERNO_TIME_SIZE];
+  char release_date[KRAL_VERNO_DATE_SIZE];
+  char release_time[KRAL_VERNO_TIME_SIZE];
+  char version_directory[KRAL_VERNO_DIRECTORY_SIZE];
   uint8_t station_class, revision, model, slot_cycle, vocoder_major, vocoder_minor;
   uint16_t firmware;
 

@@ -78,6 +78,10 @@ void KRAL_CALL KRAL_GetLibraryVersion(char* text) {
   });
 }
 
+uint32_t KRAL_CALL KRAL_GetLibraryVersionNumber(void) {
+  return (kral::kVersionMajor << 16) + (kral::kVersionMinor << 8) + kral::kVersionPatch;
+}
+
 uint8_t KRAL_CALL KRAL_SetDefaultReceiveMode(uint8_t mode) {
   return Without(__func__, [mode] {
     if (!IsReceiveMode(mode)) return BadReceiveMode(mode);

@@ -8,14 +8,15 @@
 #include <optional>
 #include <vector>
 
+#include "kral/connection.h"
 #include "kral/download.h"
 #include "kral/efs.h"
 #include "kral/pkv.h"
 
 namespace kral {
 
-inline constexpr uint8_t kTargetModem = 0;        // the diagnostic service runs on the modem chip
-inline constexpr uint8_t kTargetApplication = 1;  // ... on an application processor
+inline constexpr uint8_t kTargetModem = KRAL_TARGET_MODEM;              // the diagnostic service runs on the modem chip
+inline constexpr uint8_t kTargetApplication = KRAL_TARGET_APPLICATION;  // ... on an application processor
 
 class FtmSequencer;
 

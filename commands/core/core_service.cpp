@@ -8,12 +8,13 @@
 #include "commands/core/core_diag_format.h"
 #include "frame/diag_ftm.h"
 #include "frame/request_failure.h"
+#include "kral/connection.h"
 
 namespace kral::diag {
 namespace {
 
 constexpr u8 kNvBackupSubsystem = 55;
-constexpr u32 kTimeOutNvBackup = 5;
+constexpr u32 kTimeOutNvBackup = KRAL_TIME_OUT_NV_BACKUP;
 
 void LogEntry(Diag_FTM& phone, const char* name) {
   phone.log().WriteLine(kLogFn, "%s()", name);

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <optional>
 
+#include "kral/ftm.h"
 #include "transport/engine/reply.h"
 
 namespace kral {
@@ -16,16 +17,16 @@ namespace ftm {
 
 inline constexpr uint8_t kSubsystem = 11;
 
-inline constexpr uint16_t kModeIdCdma1x = 0;
-inline constexpr uint16_t kModeIdWcdma = 1;
-inline constexpr uint16_t kModeIdGsm = 2;
-inline constexpr uint16_t kModeIdEvdo = 8;
-inline constexpr uint16_t kModeIdAgps = 10;
-inline constexpr uint16_t kModeIdPmic = 11;
-inline constexpr uint16_t kModeIdZeft = 19;
-inline constexpr uint16_t kModeIdLte = 29;
-inline constexpr uint16_t kModeIdSequencer = 37;
-inline constexpr uint16_t kModeIdTdscdma = 42;
+inline constexpr uint16_t kModeIdCdma1x = KRAL_FTM_MODE_ID_CDMA_1X;
+inline constexpr uint16_t kModeIdWcdma = KRAL_FTM_MODE_ID_WCDMA;
+inline constexpr uint16_t kModeIdGsm = KRAL_FTM_MODE_ID_GSM;
+inline constexpr uint16_t kModeIdEvdo = KRAL_FTM_MODE_ID_HDR_C;
+inline constexpr uint16_t kModeIdAgps = KRAL_FTM_MODE_ID_AGPS;
+inline constexpr uint16_t kModeIdPmic = KRAL_FTM_MODE_ID_PMIC;
+inline constexpr uint16_t kModeIdZeft = KRAL_FTM_MODE_ID_ZEFT_C;
+inline constexpr uint16_t kModeIdLte = KRAL_FTM_MODE_ID_LTE;
+inline constexpr uint16_t kModeIdSequencer = KRAL_FTM_MODE_ID_SEQUENCER;
+inline constexpr uint16_t kModeIdTdscdma = KRAL_FTM_MODE_ID_TDSCDMA;
 
 // The name of a mode id; null when it has none.
 const char* ModeIdName(uint32_t mode_id);

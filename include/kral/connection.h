@@ -4,7 +4,7 @@
  *
  * Beside the rules of kral.h:
  *
- * - A connect takes one of 50 contexts, one per port. A second connect to the same port gives the same handle and
+ * - A connect takes one of 50 contexts, one per port. A second connect to the same port returns the same handle and
  *   counts: the context and its connection live until every connect has been released.
  * - Any thread may connect and disconnect, several at the same time as well. A disconnect waits until a request that
  *   another thread is running on the handset has ended. KRAL_GetAvailablePhonesPortList and a connect to KRAL_PORT_ANY
@@ -28,26 +28,49 @@ extern "C" {
 
 /* --- Library-wide settings ---------------------------------------------------------------------------------------- */
 
+/** Library modes. */
+#define KRAL_LIBRARY_MODE_DIRECT 0 /* the library drives the port itself */
+#define KRAL_LIBRARY_MODE_SERVER 1 /* through the phone server */
+
 /**
  * Chooses how handsets are reached by the connections made afterwards.
  *
- * @param mode  1: through the phone server; any other value: directly, the library drives the port (the default)
+ * @param mode  KRAL_LIBRARY_MODE_SERVER; any other value is KRAL_LIBRARY_MODE_DIRECT (the default)
  */
 KRAL_API void KRAL_CALL KRAL_SetLibraryMode(uint8_t mode);
+
+/** Target types: where the diagnostic service of a handset runs. */
+#define KRAL_TARGET_MODEM 0       /* on the modem chip */
+#define KRAL_TARGET_APPLICATION 1 /* on an application processor */
 
 /**
  * Chooses where the diagnostic service runs on the handsets connected afterwards.
  *
- * @param type  0: on the modem chip (the default); 1: on an application processor; other values are ignored
+ * @param type  KRAL_TARGET_MODEM (the default) or KRAL_TARGET_APPLICATION; other values are ignored
  */
 KRAL_API void KRAL_CALL KRAL_SetTargetType(uint8_t type);
 
+/** Bytes that hold the text of KRAL_GetLibraryVersion. */
+#define KRAL_LIBRARY_VERSION_SIZE 32
+
 /**
- * Gives the version, such as "KRAL V6.0.29,VENTRIMS" (direct mode) or "KRAL V6.0.29,ORBT" (server mode).
+ * Returns the version, such as "KRAL V6.0.29,VENTRIMS" (direct mode) or "KRAL V6.0.29,ORBT" (server mode).
  *
- * @param[out] text  terminated; the buffer must hold it (32 bytes do), nothing is tested
+ * @param[out] text  terminated; the buffer must hold it (KRAL_LIBRARY_VERSION_SIZE bytes do), nothing is tested
  */
 KRAL_API void KRAL_CALL KRAL_GetLibraryVersion(char* text);
+
+/**
+ * Returns the version of the library in use as a number, to compare with KRAL_VERSION_NUMBER.
+ * An addition to the given interface.
+ *
+ * @return major * 65536 + minor * 256 + patch
+ */
+KRAL_API uint32_t KRAL_CALL KRAL_GetLibraryVersionNumber(void);
+
+/** Receive modes: how the receive thread of a connection waits for bytes. */
+#define KRAL_RECEIVE_MODE_POLL 0 /* sleeps 1 ms between reads, which costs each request about that much */
+#define KRAL_RECEIVE_MODE_WAKE 1 /* waits in the port and wakes with the first byte */
 
 /**
  * Chooses how the receive threads of the connections made afterwards wait for bytes.
@@ -126,7 +149,7 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServer(uint32_t port);
 KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithHandShake(uint32_t port);
 
 /**
- * As KRAL_ConnectServer, but gives 0 when the port cannot be opened. The context then stays taken (its handle is
+ * As KRAL_ConnectServer, but returns 0 when the port cannot be opened. The context then stays taken (its handle is
  * found with another connect to the port) until KRAL_DisconnectAllServers.
  */
 KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithVerify(uint32_t port);
@@ -169,11 +192,11 @@ typedef uint32_t(KRAL_CALL* KRAL_FLUSH_FUNCTION)(uintptr_t context, uintptr_t tr
 
 /**
  * Connects to a handset through three functions of the caller instead of a COM port. Sets direct mode, as
- * KRAL_SetLibraryMode(0) does. The functions must stay callable until the handle is released.
+ * KRAL_SetLibraryMode(KRAL_LIBRARY_MODE_DIRECT) does. The functions must stay callable until the handle is released.
  *
  * @param port       number of the context; KRAL_PORT_NULL is the null port even here
- * @param transport  the caller's handle of the transport, handed to each function
- * @param context    another value of the caller, handed to each function in front
+ * @param transport  the caller's handle of the transport, the second argument of each function
+ * @param context    another value of the caller, the first argument of each function
  * @param send  null: the COM port of that number is opened, as KRAL_ConnectServer does
  * @param receive, flush  both are needed beside a send function for the connection to open
  * @return the handle; 0 when all 50 contexts are taken
@@ -203,13 +226,13 @@ KRAL_API void KRAL_CALL KRAL_TerminateORBTServer(void);
  */
 KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
 
-/** States of a port, as KRAL_GetPortState gives them. */
+/** States of a port, as KRAL_GetPortState reports them. */
 #define KRAL_PORT_OPEN 0          /* open */
 #define KRAL_PORT_CLOSED 1        /* closed, and nothing stood in the way when it was last opened */
 #define KRAL_PORT_NOT_FOUND 2     /* could not be opened: there is no such port */
 #define KRAL_PORT_BUSY 3          /* could not be opened: another program holds it */
 #define KRAL_PORT_NOT_PERMITTED 4 /* could not be opened: not allowed to this user */
-#define KRAL_PORT_FAILED 5        /* could not be opened for another reason; the text log tells which */
+#define KRAL_PORT_FAILED 5        /* could not be opened for another reason; the text log says which */
 #define KRAL_PORT_GONE 6          /* vanished while it was open, and has not been there since */
 
 /**
@@ -226,6 +249,20 @@ KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state);
 
 /* --- Settings of a handset ---------------------------------------------------------------------------------------- */
+
+/** Time-outs that have a name. */
+#define KRAL_TIME_OUT_COMMAND 0         /* answers to commands: "time-out 0" in these headers */
+#define KRAL_TIME_OUT_LIVENESS 1        /* answers to the requests of KRAL_IsPhoneConnected */
+#define KRAL_TIME_OUT_SERVER_CONNECT 2  /* server mode: the server connects the port */
+#define KRAL_TIME_OUT_NV_BACKUP 5       /* KRAL_DIAG_NV_CNV_DIAG_BACKUP_F */
+#define KRAL_TIME_OUT_PORT_WRITE 7      /* direct mode: writing to the port */
+#define KRAL_TIME_OUT_PORT_READ 8       /* direct mode: reads of the receive thread */
+#define KRAL_TIME_OUT_AFTER_FTM 11      /* delay after a switch to FTM mode */
+#define KRAL_TIME_OUT_AFTER_ONLINE 12   /* delay after a switch to online mode */
+#define KRAL_TIME_OUT_AFTER_OFFLINE 13  /* delay after a switch to an offline mode */
+#define KRAL_TIME_OUT_GSM_RF_MODE 14    /* delay after a GSM RF mode is set */
+#define KRAL_TIME_OUT_MODE_READ_BACK 18 /* reading the mode back */
+#define KRAL_TIME_OUT_DOWNLOAD 20       /* server mode: software download */
 
 /**
  * Sets a time-out. Never waits for a running request.
@@ -248,7 +285,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state)
  * current directory set 1 and 2 for every handset connected afterwards.
  *
  * @param handle        from a connect function
- * @param id            0 to 20
+ * @param id            KRAL_TIME_OUT_..., or another of 0 to 20
  * @param milliseconds  the new value
  * @return 1 on success; 0 for another id, for 20 in direct mode, and for 7 and 8 in server mode (which store the
  *         value all the same)
@@ -256,7 +293,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state)
 KRAL_API uint8_t KRAL_CALL KRAL_ConfigureTimeOut(KRAL_HANDLE handle, uint32_t id, int32_t milliseconds);
 
 /**
- * Gives a time-out in milliseconds. Never waits for a running request.
+ * Returns a time-out in milliseconds. Never waits for a running request.
  *
  * @return the value; 0 for an unknown handle or id
  */
@@ -267,9 +304,8 @@ KRAL_API int32_t KRAL_CALL KRAL_GetTimeOut(KRAL_HANDLE handle, uint32_t id);
  * An addition to the given interface.
  *
  * @param handle  from a connect function
- * @param mode    0: sleeps 1 ms between reads, which costs each request about that much (the default);
- *                1: waits in the port and wakes with the first byte (with a caller's transport: sleeps 1 ms only when
- *                nothing came)
+ * @param mode    KRAL_RECEIVE_MODE_POLL (the default) or KRAL_RECEIVE_MODE_WAKE (with a caller's transport: sleeps
+ *                1 ms only when nothing came)
  * @return 1 on success; 0 for another mode and in server mode
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetReceiveMode(KRAL_HANDLE handle, uint8_t mode);

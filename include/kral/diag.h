@@ -6,9 +6,10 @@
  *
  * - Unless a function says otherwise it may wait for time-out 0 (4,000 ms), plus the opening of a closed port, and
  *   may be called from any thread.
- * - A handset that answers with another command code, or refuses (bad command, parameter, length or mode), gives 0
- *   with the reason in the text log.
- * - An output pointer may be null where the value is not wanted. A null input gives 0 without traffic.
+ * - A handset that answers with another command code, or refuses (bad command, parameter, length or mode): the
+ *   function returns 0, with the reason in the text log.
+ * - An output pointer may be null where the value is not wanted. With a null input the function returns 0 without
+ *   traffic.
  */
 #ifndef KRAL_DIAG_H
 #define KRAL_DIAG_H
@@ -19,6 +20,15 @@
 extern "C" {
 #endif
 
+/* --- Sizes of buffers --------------------------------------------------------------------------------------------- */
+
+#define KRAL_VERNO_DATE_SIZE 11      /* a date of KRAL_DIAG_VERNO_F, not terminated */
+#define KRAL_VERNO_TIME_SIZE 8       /* a time of it */
+#define KRAL_VERNO_DIRECTORY_SIZE 8  /* the version directory of it */
+#define KRAL_BUILD_ID_TEXT_SIZE 4096 /* a text of KRAL_DIAG_EXT_BUILD_ID_F */
+#define KRAL_SERVICE_CODE_SIZE 6     /* the digits of KRAL_DIAG_SPC_F */
+#define KRAL_LONGEST_DIAG_REPLY 6144 /* any answer, as KRAL_DIAG_ERR_READ_F copies it */
+
 /* --- Identity ----------------------------------------------------------------------------------------------------- */
 
 /**
@@ -27,11 +37,11 @@ extern "C" {
  * The five texts are runs of characters of exactly the size given; none is terminated.
  *
  * @param      handle                  from a connect function
- * @param[out] compile_date            11 bytes
- * @param[out] compile_time            8 bytes
- * @param[out] release_date            11 bytes
- * @param[out] release_time            8 bytes
- * @param[out] version_directory       8 bytes
+ * @param[out] compile_date            KRAL_VERNO_DATE_SIZE (11) bytes
+ * @param[out] compile_time            KRAL_VERNO_TIME_SIZE (8) bytes
+ * @param[out] release_date            KRAL_VERNO_DATE_SIZE bytes
+ * @param[out] release_time            KRAL_VERNO_TIME_SIZE bytes
+ * @param[out] version_directory       KRAL_VERNO_DIRECTORY_SIZE (8) bytes
  * @param[out] station_class_mark      1 byte
  * @param[out] air_interface_revision  1 byte
  * @param[out] mobile_model            1 byte
@@ -39,7 +49,7 @@ extern "C" {
  * @param[out] slot_cycle_index        1 byte
  * @param[out] vocoder_major           1 byte
  * @param[out] vocoder_minor           1 byte
- * @return 1 when the handset answered. An answer of fewer than 54 bytes also gives 1: the outputs then show the last
+ * @return 1 when the handset answered. 1 also for an answer of fewer than 54 bytes: the outputs then show the last
  *         full answer of this connection's handset object, or zeros when there was none.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char* compile_date, char* compile_time,
@@ -52,7 +62,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char* compile_d
  * Reads the extended build identity.
  *
  * The texts are copied with their terminators and their length is not checked against the buffers, which therefore
- * must hold the longest text that a handset can send: 4,096 bytes each.
+ * must hold the longest text that a handset can send: KRAL_BUILD_ID_TEXT_SIZE (4,096) bytes each.
  *
  * @param      handle             from a connect function
  * @param[out] hardware_version   version of the BXC hardware
@@ -64,11 +74,14 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char* compile_d
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t* hardware_version,
                                                     uint32_t* mobile_model, char* software_revision, char* model);
 
+/** What KRAL_DIAG_READ_ESN_F reads where there is no serial number. */
+#define KRAL_NO_SERIAL_NUMBER 0xDEADBEEFu
+
 /**
  * Reads the electronic serial number (NV item 0).
  *
- * With target type 1 (KRAL_SetTargetType) there is no such number: the call then gives 1 and 0xDEADBEEF without
- * traffic.
+ * With KRAL_TARGET_APPLICATION (KRAL_SetTargetType) there is no such number: the call then returns 1 and
+ * KRAL_NO_SERIAL_NUMBER without traffic.
  *
  * @param      handle  from a connect function
  * @param[out] serial  the serial number
@@ -77,6 +90,14 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_READ_ESN_F(KRAL_HANDLE handle, uint32_t* serial);
 
 /* --- Operating mode ----------------------------------------------------------------------------------------------- */
+
+/** Operating modes. */
+#define KRAL_MODE_OFFLINE_ANALOG 0
+#define KRAL_MODE_OFFLINE_DIGITAL 1
+#define KRAL_MODE_RESET 2
+#define KRAL_MODE_FACTORY_TEST 3
+#define KRAL_MODE_ONLINE 4
+#define KRAL_MODE_LOW_POWER 5
 
 /**
  * Switches the operating mode: 0 offline (analog), 1 offline (digital), 2 reset, 3 factory test, 4 online, 5 low
@@ -90,7 +111,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_READ_ESN_F(KRAL_HANDLE handle, uint32_t* se
  * The comparison uses `mode` as passed: bits above the low four make the read-back fail.
  *
  * @param handle  from a connect function
- * @param mode    as above
+ * @param mode    KRAL_MODE_...
  * @return 1 when the handset reports the new mode; where nothing is read back, 1 when it answered the request
  *
  * Wait: time-out 0 for the request, the sleep, time-out 18, and time-out 0 for a query that gets no answer.
@@ -179,7 +200,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char* code,
  *
  * @param         handle   from a connect function
  * @param[in,out] size     in: bytes of `records`; out: bytes written. A longer answer is cut at the room. An answer
- *                         has at most 6,144 bytes.
+ *                         has at most KRAL_LONGEST_DIAG_REPLY bytes.
  * @param[out]    records  the answer as it came, its command code (42) first
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_READ_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* records);
@@ -206,13 +227,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_CNV_DIAG_BACKUP_F(KRAL_HANDLE handle);
 
 /* --- GSM call control --------------------------------------------------------------------------------------------- */
 
-/** No request is defined: writes an error line into the text log and gives 0, without traffic. */
+/** No request is defined: writes an error line into the text log and returns 0, without traffic. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GSM_STATUS_F(KRAL_HANDLE handle);
 
-/** No request is defined: writes an error line into the text log and gives 0, without traffic. */
+/** No request is defined: writes an error line into the text log and returns 0, without traffic. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GSM_CALL_ORIG_F(KRAL_HANDLE handle);
 
-/** No request is defined: writes an error line into the text log and gives 0, without traffic. */
+/** No request is defined: writes an error line into the text log and returns 0, without traffic. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GSM_CALL_END_F(KRAL_HANDLE handle);
 
 #ifdef __cplusplus

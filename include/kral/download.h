@@ -11,11 +11,11 @@
  *
  * Beside the rules of kral.h:
  *
- * - Direct mode only. With a phone server every function that needs the handset gives 0.
- * - `result` arguments tell what happened in a number of this header. They are written whenever the handle is known,
- *   also when the function gives 0, and may be null.
- * - Unless told otherwise an exchange waits for time-out 0 (4,000 ms); flash that is erased as an image is opened may
- *   need more (KRAL_ConfigureTimeOut). A write must leave through the port within time-out 7.
+ * - Direct mode only. With a phone server every function that needs the handset returns 0.
+ * - `result` arguments report what happened in a number of this header. They are written whenever the handle is known,
+ *   also when the function returns 0, and may be null.
+ * - Unless a function says otherwise an exchange waits for time-out 0 (4,000 ms); flash that is erased as an image is
+ *   opened may need more (KRAL_ConfigureTimeOut). A write must leave through the port within time-out 7.
  * - The bytes of the image, header and table files are read while the call runs; they must not change meanwhile.
  * - The receive thread of a COM port keeps up best when it is woken by data (KRAL_SetReceiveMode).
  */
@@ -53,7 +53,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureDownloadCallBack(KRAL_HANDLE handle, KR
 
 /**
  * Ends the running download of a handset, from any thread or from the progress callback. The download stops before
- * its next packet and gives KRAL_DOWNLOAD_ABORTED; the image in flash is then incomplete. An abort while nothing runs
+ * its next packet and reports KRAL_DOWNLOAD_ABORTED; the image in flash is then incomplete. An abort while nothing runs
  * is forgotten.
  *
  * @return 0 for an unknown handle only. Never waits for a running request.
@@ -120,7 +120,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_HELLO(KRAL_HANDLE handle, uint32_t varian
                                              uint16_t* window);
 
 /**
- * Sets how often KRAL_STREAM_HELLO says hello and how long it pauses in between.
+ * Sets how often KRAL_STREAM_HELLO sends hello and how long it pauses in between.
  *
  * @param handle    of the handset
  * @param tries     hellos in all; 0 counts as 1
@@ -187,10 +187,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_PARTITION_TABLE(KRAL_HANDLE handle, const
  * @param      image_type  of the opening packet; the values are the handset's
  * @param      header_file path of the header that goes with the opening packet, at most 512 bytes; null for none
  * @param      method      KRAL_STREAM_MULTI_IMAGE or KRAL_STREAM_NOR
- * @param      block_size  as KRAL_STREAM_HELLO told; at most 16,376 bytes are written at a time, and fewer where bytes
- *                         have to be escaped. The frame check of blocks of 8,187 bytes and more covers a part of them
- *                         only; a programmer that checks them whole never answers those and needs 8,186 here.
- * @param      window      as KRAL_STREAM_HELLO told; one write fewer is kept on its way. 0 counts as 65,536.
+ * @param      block_size  as KRAL_STREAM_HELLO reported; at most 16,376 bytes are written at a time, and fewer where
+ * bytes have to be escaped. The frame check of blocks of 8,187 bytes and more covers a part of them only; a programmer
+ * that checks them whole never answers those and needs 8,186 here.
+ * @param      window      as KRAL_STREAM_HELLO reported; one write fewer is outstanding. 0 counts as 65,536.
  * @param[out] result      KRAL_STREAM_... or KRAL_DOWNLOAD_ABORTED
  * @return 1 when every byte was acknowledged and the image closed
  *
@@ -235,7 +235,7 @@ typedef struct KRAL_IMAGE_INFO {
 typedef char KRAL_IMAGE_INFO_SIZE_CHECK[sizeof(KRAL_IMAGE_INFO) == 28 ? 1 : -1];
 
 /**
- * Reads an image file from end to end and tells what is in it.
+ * Reads an image file from end to end and reports what is in it.
  *
  * @param      image_file path of the file
  * @param      format     KRAL_IMAGE_FORMAT_...
@@ -246,9 +246,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t f
                                               uint32_t* result);
 
 /**
- * Tells which data of an Intel HEX file have no place in its image. Such a file can be decoded, but what came out would
- * not be what it holds; every other function refuses it. Data are lost in front of the first extended address record
- * (type 02 or 04), and where the first record lies above the image's base and none behind it reaches as far.
+ * Reports which data of an Intel HEX file have no place in its image. Such a file can be decoded, but what came out
+ * would not be what it holds; every other function refuses it. Data are lost before the first extended address record
+ * (type 02 or 04), and where the first record lies above the image's base and none after it reaches as far.
  *
  * @param      hex_file path of the file
  * @param[out] line     number of the first line of which data are lost, from 1; 0 when nothing is
@@ -270,8 +270,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* lin
  * @param         input        path of the file to read
  * @param         output       path of the file to write
  * @param         direction    KRAL_HEX_TO_BINARY or KRAL_HEX_FROM_BINARY
- * @param[in,out] base_address of the first byte: told by the HEX file, or given for it, then a multiple of 65,536. May
- *                             be null, for 0.
+ * @param[in,out] base_address of the first byte: read from the HEX file, or passed for it, then a multiple of 65,536.
+ * May be null, for 0.
  * @param[out]    result       KRAL_STREAM_FILE_..., ..._DATA_LOST, ..._PAST_END, ..._BAD_IMAGE, ..._BAD_ARGUMENT,
  *                             KRAL_HEX_NOT_WRITTEN or 0; may be null
  */

@@ -7,21 +7,20 @@
  * - Paths of the handset are terminated texts with '/' between names. A request of more than 256 bytes is refused
  *   without sending, which leaves 243 characters for the path of a transfer and 249 or more for other paths (two paths
  *   share them). The path of an item request has up to 1,024 characters.
- * - An error number is what the handset answers: 0 done, 2 no such file, 6 exists already, 28 no room, and others. A
- *   function with an `error_number` gives 1 when the handset answered and leaves the judgement to its caller; the
- *   other outputs are written only when the number is 0. Any output may be null.
+ * - An error number (KRAL_EFS_ERROR_...) is what the handset answers: 0 done, 2 no such file, 6 exists already, 28 no
+ *   room, and others. A function with an `error_number` returns 1 when the handset answered and leaves the judgement to
+ *   its caller; the other outputs are written only when the number is 0. Any output may be null.
  * - Every packet of a transfer and of a listing is tried up to 5 times, the questions for room and status in front of
  *   it included. A try may wait for time-out 0 (4,000 ms) or, when a file is written or a directory listed, for
  *   2,000 ms; one that gets no answer closes the port, and the next one opens it again.
- * - The answer to an earlier request, come late, is passed over, and the right one waited for behind it, for the rest
- *   of the time-out.
+ * - A late answer to an earlier request is skipped, and the right one awaited for the rest of the time-out.
  * - A transfer that fails or is aborted leaves no partial file on either side, unless the handset cannot be reached any
  *   more or refuses the removal: then the text log has a line about it. What is read goes into a temporary file beside
  *   its target, which is replaced at the end.
  * - Where the path of a transfer to the handset is a symbolic link, it is the link that is removed, in place of an item
  *   file as well as after a failure: what it leads to keeps what was written.
  * - A handset whose answer to an opening request does not come keeps that descriptor open. It is closed as soon as the
- *   answer turns up, in front of whatever other answer; should it be lost, nothing tells the number, and the
+ *   answer turns up, in front of whatever other answer; should it be lost, the number stays unknown, and the
  *   descriptor stays open until the handset restarts. The text log has a line about it.
  */
 #ifndef KRAL_EFS_H
@@ -38,6 +37,12 @@ extern "C" {
 #define KRAL_EFS_OPERATION_WRITE 5u
 #define KRAL_EFS_OPERATION_GET_ITEM 39u
 
+/** Packet sizes of transfers by default, and their limits (KRAL_SetEfsReadAndWritePacketSize). */
+#define KRAL_EFS_DEFAULT_READ_SIZE 536u
+#define KRAL_EFS_DEFAULT_WRITE_SIZE 524u
+#define KRAL_EFS_LARGEST_READ_SIZE 4091u
+#define KRAL_EFS_LARGEST_WRITE_SIZE 6143u
+
 /** Bytes that an item file holds at most. */
 #define KRAL_EFS_ITEM_SIZE 1024u
 
@@ -52,7 +57,17 @@ extern "C" {
 #define KRAL_EFS_ENTRY_FILE 1u
 #define KRAL_EFS_ENTRY_LINK 2u
 
-/** Mode bits that tell the kind of a file, and the kind that marks an item file. */
+/** Error numbers of the handset's file system; there are others. */
+#define KRAL_EFS_ERROR_NONE 0u
+#define KRAL_EFS_ERROR_NO_SUCH_FILE 2u
+#define KRAL_EFS_ERROR_EXISTS 6u
+#define KRAL_EFS_ERROR_NO_ROOM 28u
+
+/** Data types of KRAL_EFS2_DIAG_EXTENDED_INFO. */
+#define KRAL_EFS_DATA_NUMBER 0u
+#define KRAL_EFS_DATA_TEXT 1u
+
+/** Mode bits that hold the kind of a file, and the kind that marks an item file. */
 #define KRAL_EFS_MODE_KIND 0xF000u
 #define KRAL_EFS_MODE_ITEM_FILE 0xE000u
 
@@ -60,7 +75,7 @@ extern "C" {
 
 /** One entry of a directory. Times are the handset's, in seconds. */
 typedef struct KRAL_EFS_ENTRY {
-  uint32_t type; /**< KRAL_EFS_ENTRY_..., and 0 for types that the handset alone knows */
+  uint32_t type; /**< KRAL_EFS_ENTRY_..., and 0 for types that only the handset knows */
   uint32_t mode;
   uint32_t size;
   uint32_t access_time;
@@ -72,7 +87,7 @@ typedef struct KRAL_EFS_ENTRY {
 /** Fails to compile where the record would be padded. */
 typedef char KRAL_EFS_ENTRY_SIZE_CHECK[sizeof(KRAL_EFS_ENTRY) == 536 ? 1 : -1];
 
-/** What a file system tells about itself; sizes in blocks unless said otherwise. */
+/** What a file system reports about itself; sizes in blocks unless said otherwise. */
 typedef struct KRAL_EFS_STATFS {
   uint32_t file_system_id;
   uint32_t type;
@@ -110,7 +125,7 @@ typedef char KRAL_EFS_DEVICE_INFO_SIZE_CHECK[sizeof(KRAL_EFS_DEVICE_INFO) == 92 
  * @param operation    KRAL_EFS_OPERATION_...
  * @param reserved     0
  * @param done         bytes so far
- * @param total        bytes in all, as the handset or the local file told before the transfer
+ * @param total        bytes in all, as the handset or the local file reported before the transfer
  * @param context      the handle
  */
 typedef void(KRAL_CALL* KRAL_EFS_TRANSFER_CALLBACK)(uintptr_t source, uintptr_t destination, uint32_t operation,
@@ -126,9 +141,9 @@ typedef void(KRAL_CALL* KRAL_EFS_DIRECTORY_CALLBACK)(const KRAL_EFS_ENTRY* entry
  * Sets the packet sizes of file transfers. Nothing is tested here: a size that leaves no room for data, or a packet
  * that is larger than the library can send, fails the transfer.
  *
- * @param read_size   bytes of one answer, of which 20 are not data; 536 at first, at most 4,091; a larger one
+ * @param read_size   bytes of one answer, of which 20 are not data; 536 by default, at most 4,091; a larger one
  *                    works only for files that do not fill such an answer
- * @param write_size  bytes of one request, of which 12 are not data; 524 at first, at most 6,143
+ * @param write_size  bytes of one request, of which 12 are not data; 524 by default, at most 6,143
  * @return 1
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetEfsReadAndWritePacketSize(KRAL_HANDLE handle, uint16_t read_size,
@@ -139,8 +154,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_
                                                        KRAL_EFS_DIRECTORY_CALLBACK directory);
 
 /**
- * Ends the transfer or listing that runs on another thread, before its next packet; it then gives 0. The answer to a
- * packet that is under way is waited for only a moment: with a silent handset the function is back within 250 ms, and a
+ * Ends the transfer or listing that runs on another thread, before its next packet; it then returns 0. The answer to
+ * the current packet is awaited only briefly: with a silent handset the function is back within 250 ms, and a
  * part of a file may stay there. Each of them forgets earlier calls when it starts. A backup, restore or comparison
  * (pkv.h) is stopped as its callback would stop it.
  */
@@ -163,9 +178,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsWriteMem(KRAL_HANDLE handle, const uint8_t* b
 
 /**
  * Copies a file of the handset to the PC, replacing what is there. Item files are fetched with one request. A file
- * that grows meanwhile is read to its end; more than 1 MiB beyond the size that the handset told is a failure.
+ * that grows meanwhile is read to its end; more than 1 MiB beyond the size that the handset reported is a failure.
  *
- * @return 1 when every byte that the handset told of was read and is in the local file
+ * @return 1 when every byte that the handset reported was read and is in the local file
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsRead(KRAL_HANDLE handle, const char* local_file, const char* efs_file);
 
@@ -222,7 +237,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsDirectory(KRAL_HANDLE handle, const char* fol
 /**
  * Makes a directory with mode 0777.
  *
- * @param[out] error_number  written whenever the handset answered, also when the function gives 0
+ * @param[out] error_number  written whenever the handset answered, also when the function returns 0
  * @return 1 when it is there: error numbers 0 and 6 (something of that name was there already)
  *
  * Wait: 2,000 ms.
@@ -245,7 +260,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsCreateLink(KRAL_HANDLE handle, const char* ta
  * Reads where a symbolic link leads.
  *
  * @param[out] target  terminated
- * @param      size    bytes of `target`; one too small for the text and its zero gives 0
+ * @param      size    bytes of `target`; 0 is returned when the text and its zero do not fit
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsReadLink(KRAL_HANDLE handle, const char* link, uint32_t* error_number, char* target,
                                             uint32_t size);
@@ -286,12 +301,12 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_DEV_INFO(KRAL_HANDLE handle, uint32_t*
                                                    KRAL_EFS_DEVICE_INFO* info);
 
 /**
- * Asks for one of the things that the handset can tell besides.
+ * Asks for one of the things that the handset can report besides.
  *
  * @param      query      the handset's number for it
- * @param[out] data_type  0: the answer is `number`; 1: it is `text`. Any other type gives 0
+ * @param[out] data_type  KRAL_EFS_DATA_NUMBER or KRAL_EFS_DATA_TEXT: where the answer is. Any other type returns 0
  * @param[out] text       terminated
- * @param      text_size  bytes of `text`; one too small for the answer and its zero gives 0
+ * @param      text_size  bytes of `text`; 0 is returned when the answer and its zero do not fit
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_EXTENDED_INFO(KRAL_HANDLE handle, uint32_t query, uint32_t* error_number,
                                                         uint32_t* data_type, uint32_t* number, char* text,
@@ -319,7 +334,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsRmTree(KRAL_HANDLE handle, const char* folder
 
 /**
  * The file-system images. Each has the phone server make or use an image, a file of the PC; the kind of job is what
- * the name says, and what it does is the server's affair.
+ * the name says, and what it does belongs to the server.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_BackupCEFS_Legacy(KRAL_HANDLE handle, const char* image_file);
 KRAL_API uint8_t KRAL_CALL KRAL_BackupCEFS_Alternate(KRAL_HANDLE handle, const char* image_file);

@@ -23,26 +23,74 @@ extern "C" {
 
 /* --- Settings of the handle --------------------------------------------------------------------------------------- */
 
+/** Mode ids: dispatchers of the handset for FTM commands. They are the names that the text log shows. */
+#define KRAL_FTM_MODE_ID_CDMA_1X 0
+#define KRAL_FTM_MODE_ID_WCDMA 1
+#define KRAL_FTM_MODE_ID_GSM 2
+#define KRAL_FTM_MODE_ID_CDMA_1X_RX1 3
+#define KRAL_FTM_MODE_ID_BLUETOOTH 4
+#define KRAL_FTM_MODE_ID_CDMA_1X_CALL 7
+#define KRAL_FTM_MODE_ID_HDR_C 8 /* EVDO */
+#define KRAL_FTM_MODE_ID_LOGGING 9
+#define KRAL_FTM_MODE_ID_AGPS 10
+#define KRAL_FTM_MODE_ID_PMIC 11
+#define KRAL_FTM_MODE_ID_GSM_BER 13
+#define KRAL_FTM_MODE_ID_AUDIO 14
+#define KRAL_FTM_MODE_ID_CAMERA 15
+#define KRAL_FTM_MODE_ID_WCDMA_BER 16
+#define KRAL_FTM_MODE_ID_GSM_EXTENDED_C 17
+#define KRAL_FTM_MODE_ID_CDMA_API_V2 18
+#define KRAL_FTM_MODE_ID_ZEFT_C 19 /* broadcast */
+#define KRAL_FTM_MODE_ID_RF_COMMON 20
+#define KRAL_FTM_MODE_ID_WCDMA_RX1 21
+#define KRAL_FTM_MODE_ID_WLAN 22
+#define KRAL_FTM_MODE_ID_LTE 29
+#define KRAL_FTM_MODE_ID_LTE_NS 30
+#define KRAL_FTM_MODE_ID_CDMA_1X_C2 32
+#define KRAL_FTM_MODE_ID_LTE_RX1 35
+#define KRAL_FTM_MODE_ID_RFNV 36      /* RF NV items */
+#define KRAL_FTM_MODE_ID_SEQUENCER 37 /* the handset's sequencer */
+#define KRAL_FTM_MODE_ID_SV 38
+#define KRAL_FTM_MODE_ID_RFM_C 39
+#define KRAL_FTM_MODE_ID_1X_C3_C 40
+#define KRAL_FTM_MODE_ID_RFCA_MAL_C 41
+#define KRAL_FTM_MODE_ID_TDSCDMA 42
+#define KRAL_FTM_MODE_ID_TDSCDMA_RX1 43
+#define KRAL_FTM_MODE_ID_TDSCDMA_BER 44
+#define KRAL_FTM_MODE_ID_LTE_C3 47
+#define KRAL_FTM_MODE_ID_LTE_C4 48
+#define KRAL_FTM_MODE_ID_GSM_C2 49
+#define KRAL_FTM_MODE_ID_GSM_EXTENDED_C2 50
+#define KRAL_FTM_MODE_ID_GSM_BER_C2 51
+#define KRAL_FTM_MODE_ID_PRODUCTION 0x8000
+#define KRAL_FTM_MODE_ID_LTM 0x8001
+
+/** Command codes that carry FTM. */
+#define KRAL_FTM_COMMAND_CODE_SUBSYSTEM 75
+#define KRAL_FTM_COMMAND_CODE_LEGACY 59
+
 /**
  * Chooses the dispatcher that receives FTM commands. Sends nothing.
  *
  * @param handle   from a connect function
- * @param mode_id  any 16-bit value; 1 (WCDMA) for a new handle. Known ids are logged with their names
+ * @param mode_id  KRAL_FTM_MODE_ID_... or any other 16-bit value; KRAL_FTM_MODE_ID_WCDMA for a new handle. Known ids
+ *                 are logged with their names
  * @return 1
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_MODE_ID(KRAL_HANDLE handle, uint16_t mode_id);
 
-/** Hands back the mode id in force. Sends nothing. */
+/** Returns the mode id in force. Sends nothing. */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t* mode_id);
 
 /**
- * Chooses the diagnostic command code that carries FTM: 75 (the default) or 59 (legacy handsets). Sends nothing.
+ * Chooses the diagnostic command code that carries FTM: KRAL_FTM_COMMAND_CODE_SUBSYSTEM (the default) or
+ * KRAL_FTM_COMMAND_CODE_LEGACY (legacy handsets). Sends nothing.
  *
  * @return 1; 0 for any other code, which changes nothing
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t code);
 
-/** Hands back the command code in force. Sends nothing. */
+/** Returns the command code in force. Sends nothing. */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t* code);
 
 /* --- Into and out of factory test mode ---------------------------------------------------------------------------- */
@@ -53,7 +101,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_
  *
  * @param      handle  from a connect function
  * @param[out] is_ftm  1 or 0
- * @return 1 when the handset told
+ * @return 1 when the handset answered
  */
 KRAL_API uint8_t KRAL_CALL KRAL_IsFTM_Mode(KRAL_HANDLE handle, uint8_t* is_ftm);
 
@@ -86,6 +134,18 @@ KRAL_API uint8_t KRAL_CALL KRAL_ChangeFTM_ModeRuntime(KRAL_HANDLE handle, uint8_
 /* --- Commands with arguments of their own ------------------------------------------------------------------------- */
 
 /**
+ * RF modes: the first one of each technology. The others of a technology, its bands, have no names: see the table of
+ * KRAL_FTM_SET_MODE.
+ */
+#define KRAL_FTM_RF_MODE_SLEEP 2
+#define KRAL_FTM_RF_MODE_CDMA 3
+#define KRAL_FTM_RF_MODE_WCDMA 9
+#define KRAL_FTM_RF_MODE_GSM 10
+#define KRAL_FTM_RF_MODE_BROADCAST 30
+#define KRAL_FTM_RF_MODE_LTE 34
+#define KRAL_FTM_RF_MODE_TDSCDMA 90
+
+/**
  * Sets the RF mode: technology and band (command 7).
  *
  * A mode id that does not belong to the RF mode's technology is replaced first:
@@ -100,7 +160,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ChangeFTM_ModeRuntime(KRAL_HANDLE handle, uint8_
  *     90, 91, 92                                  42, 43                                           42
  *
  * @param handle  from a connect function
- * @param mode    an RF mode of the table
+ * @param mode    an RF mode of the table, such as KRAL_FTM_RF_MODE_WCDMA
  * @return 1 when the handset answered; 0 without traffic for any other RF mode
  *
  * Wait: time-out 0; after RF modes 10, 11, 12 and 18 also time-out 14 (100 ms) for the transceiver to settle.
@@ -125,12 +185,17 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_TX_OFF(KRAL_HANDLE handle);
 /* --- Commands of every family: additions of this library ---------------------------------------------------------- */
 
 /**
- * Addition. Sends any FTM command to the dispatcher of the current mode id; arguments as ftm_commands.h tells.
+ * Addition. Sends any FTM command to the dispatcher of the current mode id; arguments as in ftm_commands.h.
  *
  * @param command  the command id
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t command, const uint8_t* payload,
                                                 uint16_t payload_size, uint8_t* response, uint16_t* response_size);
+
+/** Header forms of KRAL_FTM_SendCommandTo. */
+#define KRAL_FTM_HEADER_PLAIN 0   /* the payload follows the command id */
+#define KRAL_FTM_HEADER_LENGTHS 1 /* two data lengths come first: EVDO, AGPS */
+#define KRAL_FTM_HEADER_ZEROS 2   /* two zeros come first: PMIC */
 
 /**
  * Addition. The same to the dispatcher of a given mode id and with a given header, which leaves the current mode id
@@ -142,24 +207,27 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t com
  *                     1: request and response data lengths (16 bits each) come first. The request length is the one
  *                     that the EVDO (8) and AGPS (10) dispatchers expect of the command, else 0; the response length 0.
  *                     2: two 16-bit zeros come first; the payload is the PMIC command's argument byte.
- *                     Any other form gives 0 without traffic.
+ *                     Any other form returns 0 without traffic.
  *
- * `response` receives what stands behind the command id, the two length words of forms 1 and 2 included.
+ * `response` receives what follows the command id, the two length words of forms 1 and 2 included.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommandTo(KRAL_HANDLE handle, uint16_t mode_id, uint8_t header_form,
                                                   uint16_t command, const uint8_t* payload, uint16_t payload_size,
                                                   uint8_t* response, uint16_t* response_size);
 
+/** Room that holds the name of every command. */
+#define KRAL_FTM_COMMAND_NAME_SIZE 64
+
 /** Addition. The number of commands in the library's table of RF commands. */
 KRAL_API uint16_t KRAL_CALL KRAL_FTM_GetCommandCount(void);
 
 /**
- * Addition. One row of the table, which is sorted by command id. Some ids stand in two rows.
+ * Addition. One row of the table, which is sorted by command id. Some ids are in two rows.
  *
  * @param      index      0 to KRAL_FTM_GetCommandCount() - 1
  * @param[out] command    the command id
  * @param[out] name       the name without "KRAL_FTM_", NUL-terminated
- * @param      name_size  room of `name`; 64 bytes hold every name
+ * @param      name_size  room of `name`; KRAL_FTM_COMMAND_NAME_SIZE bytes hold every name
  * @return 1; 0 for an index out of range or a name that does not fit
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GetCommandInfo(uint16_t index, uint16_t* command, char* name, uint16_t name_size);

@@ -12,13 +12,13 @@
  *
  * Beside the rules of kral.h:
  *
- * - A boot loader says hello once, by itself. KRAL_ConnectServer would read that away: it opens the port for
+ * - A boot loader sends hello once, unprompted. KRAL_ConnectServer would consume it: it opens the port for
  *   diagnostics. Every other connect serves as well when the hello comes later, as from a handset that
  *   KRAL_DIAG_DLOAD_F has just sent into its boot loader.
- * - From KRAL_Kivrat_Connect on the port belongs to the boot transfer, and requests of the handle give 0. It is given
- *   back at the end of KRAL_Kivrat_DownloadFlashProgrammer, by every failure, by KRAL_Kivrat_End and by a connect; the
- *   next request opens it for diagnostics again. Only a flash programmer whose file cannot be opened leaves everything
- *   as it is: the target still waits, and can be given another file.
+ * - From KRAL_Kivrat_Connect on the port belongs to the boot transfer, and requests of the handle return 0. It is
+ *   returned at the end of KRAL_Kivrat_DownloadFlashProgrammer, by every failure, by KRAL_Kivrat_End and by a connect;
+ *   the next request opens it for diagnostics again. Only a flash programmer whose file cannot be opened leaves
+ *   everything as it is: the target still waits, and can be given another file.
  * - Nothing is repeated inside an exchange. After a failure the target waits for ever, or until it is powered off and
  *   on: a new attempt begins with its hello.
  * - Every packet of the target is awaited for 5,000 ms.
@@ -46,9 +46,9 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_Kivrat_ConnectServer(uint32_t port);
  *
  * @param handle             from a connect function
  * @param hello_retries      how often KRAL_Kivrat_Connect tries again when the port cannot be opened, goes away, or no
- *                           hello comes (0 at first); a handset that changes its device needs some
- * @param retry_delay_ms     pause between two tries (500 at first)
- * @param pre_done_delay_ms  pause before the target is told that all is done (0 at first)
+ *                           hello comes (0 by default); a handset that changes its device needs some
+ * @param retry_delay_ms     pause between two tries (500 by default)
+ * @param pre_done_delay_ms  pause before the target is told that all is done (0 by default)
  * @return 1, or 0 for an unknown handle
  */
 KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_Configure(KRAL_HANDLE handle, uint32_t hello_retries, uint32_t retry_delay_ms,
@@ -61,7 +61,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_Configure(KRAL_HANDLE handle, uint32_t he
  * @param      handle         of a handset in its boot loader
  * @param[out] version        version of the boot transfer that the target speaks; may be null
  * @param[out] chip_identity  null: not asked for. A target that has none leaves it untouched and itself in command
- *                            mode, from which it transfers no image: the call gives 1 all the same
+ *                            mode, from which it transfers no image: the call still returns 1
  * @return 1 when the hello was answered
  *
  * Wait: 5,000 ms for each packet and try. KRAL_AbortDownload ends it.
@@ -70,9 +70,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_Connect(KRAL_HANDLE handle, uint32_t* ver
 
 /**
  * Serves a flash programmer to the target that KRAL_Kivrat_Connect has left waiting. The file goes out from its front
- * to its end, in the pieces that the target asks for, whatever offsets it names. Requests for nothing get nothing; a
- * hundred of them in a row end the transfer. What the target says of the image (its status) is told in the text log
- * only.
+ * to its end, in the pieces that the target asks for, whatever offsets it names. Requests for 0 bytes get nothing; a
+ * hundred of them in a row end the transfer. The target's status of the image goes into the text log only.
  *
  * @param handle           of a connected target
  * @param programmer_file  path of the file, in the target's own format
@@ -124,7 +123,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_FlashAll(KRAL_HANDLE handle, const char* 
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t behavior);
 
-/** Gives the number that was set last, 0 at first. @return 1; 0 in direct mode */
+/** Returns the number that was set last, 0 by default. @return 1; 0 in direct mode */
 KRAL_API uint8_t KRAL_CALL KRAL_GetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t* behavior);
 
 #ifdef __cplusplus

@@ -4,12 +4,18 @@
  *
  * Rules that hold for every function unless its own text says otherwise:
  *
- * - The handle comes first. It is what a connect function returned; 0 is never valid. An unknown or released handle
- *   gives 0, causes no traffic and leaves the outputs untouched.
- *   A value that was released may come back from a later connect; programs forget it with the release.
+ * - The handle comes first. It is what a connect function returned; 0 is never valid. With an unknown or released
+ *   handle a function returns 0, causes no traffic and leaves the outputs untouched. A value that was released may come
+ *   back from a later connect; programs forget it with the release.
  * - Results are uint8_t: 1 for success, 0 for failure. KRAL_GetLastError (error.h) says why a call failed, and so does
  *   the text log of the handset (text_log.h). A status that the handset itself reports comes back through an output
- *   argument. KRAL_NV_ functions return an error code instead, 0 for success.
+ *   argument. Where 0 or 1 means something else:
+ *     - KRAL_NV_ functions (nv_tool.h) return an error code, 0 for success.
+ *     - A caller's send and receive functions (connection.h) return 0 for success; the result of the flush function is
+ *       ignored. The callbacks of the NV tool and of PKV work say what theirs means.
+ *     - KRAL_SetStartFlag returns the former value of the setting, not whether the call worked.
+ *     - A result that is an answer, as of KRAL_IsLoggingStarted or KRAL_IsPhoneConnected, is 1 for yes and 0 for no.
+ *     - Connect functions return the handle, 0 for failure; KRAL_GetTimeOut, counts and the band functions a value.
  * - Outputs are written on success only. The caller owns all buffers; sizes are in bytes. Narrow integers are passed
  *   and returned zero-extended.
  * - Values that carry a caller's pointer are uintptr_t. Multi-byte fields of handset records are little-endian.
@@ -27,8 +33,8 @@
  *   same handles. (On Linux it stays in memory in any case, until the process ends. On Windows each load and free
  *   leaves two handles of the thread library that is linked in.)
  * - KRAL_DisconnectServer is not called from a DllMain, nor are connects: no thread starts or ends meanwhile. Such a
- *   disconnect waits for each thread of the connection (1,000 ms), leaves it to end by itself, and the library stays in
- *   memory.
+ *   disconnect waits for each thread of the connection (1,000 ms), leaves it to end on its own, and the library stays
+ *   in memory.
  * - No C++ exception leaves a function. One that leaves a callback ends there: the operation goes on, or is stopped
  *   where the callback's result would have decided. On Linux a host may end a thread inside a callback (pthread_exit),
  *   as interpreters do that are going down. The library's threads run none of the host's signal handlers.
@@ -36,6 +42,14 @@
  */
 #ifndef KRAL_KRAL_H
 #define KRAL_KRAL_H
+
+/** The version of these headers. That of the library in use may differ: KRAL_GetLibraryVersionNumber. */
+#define KRAL_VERSION_MAJOR 6
+#define KRAL_VERSION_MINOR 0
+#define KRAL_VERSION_PATCH 29
+
+/** The version as one number: later versions have larger ones. */
+#define KRAL_VERSION_NUMBER (KRAL_VERSION_MAJOR * 65536u + KRAL_VERSION_MINOR * 256u + KRAL_VERSION_PATCH)
 
 #include "kral/types.h"
 

@@ -5,20 +5,20 @@
  * Beside the rules of kral.h:
  *
  * - Log packets (first byte 16), messages (31 and 121), event reports (96) and packets that begin with 146 (in the
- *   framed packet mode these are thrown away uncounted) are put into the log queue of the handset while collection is
+ *   framed packet mode these are discarded uncounted) are put into the log queue of the handset while collection is
  *   on; while it is off they are dropped, and counted. Every event of a report is also put into the event queue. Each
  *   queue holds 4,096 records and drops its oldest one when full.
  * - Answers to requests come the same way as collected packets, one after the other: a callback that takes long, and a
  *   text log that takes long to write them down, hold up everything that comes after, answers too. Requests then run
  *   into their time-outs, and what has been received meanwhile waits in memory without a bound. Callers that may take
  *   long read the queues instead.
- * - Collection is off at first. It is switched on by KRAL_DIAG_SetPhoneLoggingState, and by every call that switches
+ * - Collection is off by default. It is switched on by KRAL_DIAG_SetPhoneLoggingState, and by every call that switches
  *   logs or messages on or changes the event mask.
  * - The mask functions are requests and wait for time-out 0 (4,000 ms) once for each request they make: at most three
  *   for logs, two for events. They must not be called from a callback. All others never wait for a running request,
  *   and wait only where they say so.
- * - An equipment id (0 to 15) has the log codes from its number times 4,096 on, as many as the handset tells. Codes
- *   outside that range are refused, and so is the whole list they stand in.
+ * - An equipment id (0 to 15) has the log codes from its number times 4,096 on, as many as the handset reports. Codes
+ *   outside that range are refused, and so is the whole list that contains them.
  * - Functions and records marked as an addition are additions of this library.
  *
  * The files that the functions read and write are described in docs/logs.md.
@@ -35,6 +35,9 @@ extern "C" {
 
 /** Bytes of the longest packet, its two FCS bytes included. */
 #define KRAL_LONGEST_PACKET 4096u
+
+/** Bytes that hold every log mask, and the event mask. */
+#define KRAL_LONGEST_MASK 4096u
 
 /** Equipment ids of a handset. */
 #define KRAL_EQUIPMENT_IDS 16u
@@ -88,7 +91,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextPhoneLog(KRAL_HANDLE handle, uint16
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearPhoneLogQueue(KRAL_HANDLE handle);
 
 /**
- * Tells how many packets wait in the log queue.
+ * Reports how many packets wait in the log queue.
  *
  * @param      handle  from a connect function
  * @param[out] count   written for an empty queue as well
@@ -122,8 +125,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearEventQueue(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearCommandResponseQueue(KRAL_HANDLE handle);
 
 /**
- * Sees an event as it is put into the event queue; rules as for KRAL_RAW_PACKET_CALLBACK. How long the payload of an
- * event without a length is, the report tells, which the callback for packets has seen before. An addition.
+ * Sees an event as it is put into the event queue; rules as for KRAL_RAW_PACKET_CALLBACK. The report, which the
+ * callback for packets has seen before, shows how long the payload of an event without a length is. An addition.
  */
 typedef void(KRAL_CALL* KRAL_EVENT_CALLBACK)(const KRAL_EVENT* event, uintptr_t value);
 
@@ -133,7 +136,7 @@ typedef void(KRAL_CALL* KRAL_EVENT_CALLBACK)(const KRAL_EVENT* event, uintptr_t 
  * @param handle  from a connect function
  * @param packet  called for every packet that is put into the log queue; null: none
  * @param event   called for every event that is put into the event queue; null: none
- * @param value   handed to both. Calls to the former functions that are under way still end
+ * @param value   passed to both. Calls to the former functions that are under way still end
  * @return 1
  */
 KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCollectionCallBacks(KRAL_HANDLE handle, KRAL_RAW_PACKET_CALLBACK packet,
@@ -177,7 +180,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetTrafficCounters(KRAL_HANDLE handle, KRAL_TRAF
  * @param handle        from a connect function
  * @param equipment_id  0 to 15
  * @param log_code      of that equipment id
- * @param last_item     the number of items of the equipment id, as KRAL_DIAG_GetLogRanges tells it
+ * @param last_item     the number of items of the equipment id, as KRAL_DIAG_GetLogRanges reports it
  * @return 1 when the handset has the mask
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetExtendedLogCode(KRAL_HANDLE handle, uint8_t equipment_id, uint16_t log_code,
@@ -213,8 +216,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearExtendedLogCodes(KRAL_HANDLE handle, u
                                                            const uint16_t* log_codes, uint16_t count);
 
 /**
- * Switches every log code of an equipment id off. When the handset does not tell its ranges, it is sent a mask without
- * any items.
+ * Switches every log code of an equipment id off. When the handset does not report its ranges, it is sent a mask
+ * without any items.
  *
  * @param handle        from a connect function
  * @param equipment_id  0 to 15
@@ -240,7 +243,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogRanges(KRAL_HANDLE handle, uint32_t* 
  * @param[out]    bits          items of the equipment id
  * @param[in,out] size          in: bytes of room; out: bytes of the mask
  * @param[out]    mask          item i is bit (i mod 8) of byte (i / 8)
- * @return 1; 0 also when there is not enough room (4,096 bytes always are)
+ * @return 1; 0 also when there is not enough room (KRAL_LONGEST_MASK bytes always are)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogMask(KRAL_HANDLE handle, uint8_t equipment_id, uint32_t* bits,
                                                 uint16_t* size, uint8_t* mask);
@@ -285,13 +288,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEntireEventMaskState(KRAL_HANDLE handle,
  * @param[out]    bits    events that the handset has
  * @param[in,out] size    in: bytes of room; out: bytes of the mask
  * @param[out]    mask    event i is bit (i mod 8) of byte (i / 8)
- * @return 1; 0 also when there is not enough room (4,096 bytes always are)
+ * @return 1; 0 also when there is not enough room (KRAL_LONGEST_MASK bytes always are)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetEventMask(KRAL_HANDLE handle, uint16_t* bits, uint16_t* size, uint8_t* mask);
 
 /* --- Names and lists ---------------------------------------------------------------------------------------------- */
 
-/** The tables of a handle, all of them empty at first. */
+/** The tables of a handle, all of them empty by default. */
 #define KRAL_TABLE_EVENT_TEXTS 0u
 #define KRAL_TABLE_MESSAGE_CATEGORIES 1u
 #define KRAL_TABLE_LOG_NAMES 2u
@@ -361,7 +364,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDL
 
 /**
  * Writes everything that is collected from now on to a file, beside the queues. The disk never holds up the connection:
- * packets that it is too slow for are counted as lost, and so are those behind a write that fails. Switches nothing on.
+ * packets that it is too slow for are counted as lost, and so are those after a write that fails. Switches nothing on.
  *
  * @param handle     from a connect function
  * @param file_name  an ordinary file, emptied first
@@ -378,7 +381,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* fil
  * @return 1 when every packet that was collected is in the file; 0 when some were lost, when the rest has not been
  *         written in time, and when no capture runs
  *
- * Wait: until the rest is written, at most 1,200 ms; longer behind another thread's call that starts or ends a capture.
+ * Wait: until the rest is written, at most 1,200 ms; longer after another thread's call that starts or ends a capture.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 
@@ -399,8 +402,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 /**
  * Plays a capture file: its packets come as if the handset had sent them, on a thread of the library, through counters,
  * callbacks and queues. Switches collection on. The playback is done once its last packet has been through all of them.
- * When they came the first time, the callback for playbacks tells. A connection to port 65534, which has no port behind
- * it, is enough.
+ * The callback for playbacks receives the time at which they first came. A connection to KRAL_PORT_NULL is enough.
  *
  * @param handle     from a connect function
  * @param file_name  written by KRAL_StartCapture
@@ -443,7 +445,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KR
 KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);
 
 /**
- * Tells how far the last playback has got. Any output may be null.
+ * Reports how far the last playback has got. Any output may be null.
  *
  * @param      handle   from a connect function
  * @param[out] state    KRAL_PLAYBACK_...

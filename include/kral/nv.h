@@ -6,8 +6,8 @@
  * Beside the rules of kral.h:
  *
  * - An item has a 16-bit id and a data field of 128 bytes. The meaning of its bytes is the handset's.
- * - The NV status is what the handset says to a request: 0 done, 7 the item is read-only, others as the handset defines
- *   them. The functions with a `status` give 1 when the handset answered, whatever the status: look at it. It may be
+ * - The NV status is the handset's result of a request: 0 done, 7 the item is read-only, others as the handset defines
+ *   them. The functions with a `status` return 1 when the handset answered, whatever the status: look at it. It may be
  *   null when it is not wanted.
  * - Every request may wait for time-out 0 (4,000 ms).
  */
@@ -39,16 +39,16 @@ extern "C" {
  *
  * @param         handle  from a connect function
  * @param         item    the item's id
- * @param[in,out] data    sent with the request as it stands; receives the item. Untouched unless the status is 0
+ * @param[in,out] data    sent with the request unchanged; receives the item. Untouched unless the status is 0
  * @param         length  bytes of `data`, normally KRAL_NV_DATA_SIZE
- * @param[in,out] status  sent as it stands; the handset's answer
+ * @param[in,out] status  sent unchanged; the handset's answer
  * @return 1 when an answer came that is at least as long as the request
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_F(KRAL_HANDLE handle, uint16_t item, uint8_t* data, uint16_t length,
                                                uint16_t* status);
 
 /**
- * Writes an item, or in batch mode puts it behind the queue with status 0.
+ * Writes an item, or in batch mode appends it to the queue with status 0.
  *
  * @param      data    what the data field begins with; the rest of it becomes 0
  * @param      length  bytes of `data`; what is beyond 128 is not written
@@ -64,7 +64,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_EXT_F(KRAL_HANDLE handle, uint16_t 
 
 /**
  * Writes an item of one subscription, `context`; else as KRAL_DIAG_NV_WRITE_F, but that the status goes out with the
- * request as it stands, and that it is never queued.
+ * request unchanged, and that it is never queued.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t item, const uint8_t* data,
                                                     uint16_t context, uint16_t length, uint16_t* status);
@@ -74,7 +74,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t
  *
  * @param      index   of the element, from 0
  * @param[out] data    the element; `length` bytes, which the answer must hold
- * @param[out] status  the handset's answer, handed out with a refusal, too
+ * @param[out] status  the handset's answer, also written with a refusal
  * @return 1 when the status is 0
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index, uint8_t* data,
@@ -106,13 +106,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE 
 
 /**
  * Writes the queued items, some nine full ones in a packet, and leaves batch mode, whatever happens. The first item
- * that fails ends the flush behind its packet; items that are still queued are dropped.
+ * that fails ends the flush after its packet; items that are still queued are dropped.
  *
  * The outputs are written in every case, but for an unknown handle; each may be null.
  *
  * @param[out] last_error_item    id of the last item whose result was read: the failing one, if any; 65535 when none
  * was
- * @param[out] last_total_status  of the last packet, as the handset told
+ * @param[out] last_total_status  of the last packet, as the handset reported
  * @param[out] last_item_status   of that item; 0 when it is read-only and in the list
  * @return 1 when every packet was answered, with a result for each of its items, and no item failed
  *

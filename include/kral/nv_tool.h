@@ -5,12 +5,12 @@
  *
  * Beside the rules of kral.h:
  *
- * - Every function returns an error code, 0 for success (KRAL_NV_GetErrorText has the texts). An unknown handle gives
- *   16; 0xFFFFFFFF stands for a failure of the machine, such as a lack of memory.
+ * - Every function returns an error code, 0 for success (KRAL_NV_GetErrorText has the texts). With an unknown handle
+ *   it is 16; 0xFFFFFFFF is a failure of the machine, such as a lack of memory.
  * - Definitions, values, filters and the current subscription belong to the handle and live until its release.
  * - An item is a numbered NV item or a file of the handset, known by its full path; a missing first slash and doubled
- *   ones make no difference. Items that are kept as
- *   "/nv/item_files/rfnv/" and eight decimal digits are RF NV items: they are files and have an NV id too.
+ *   ones make no difference. Items that are kept as "/nv/item_files/rfnv/" and eight decimal digits are RF NV items:
+ *   they are files and have an NV id too.
  * - An index counts all definitions from 0, in the order in which they were loaded: first the numbered items
  *   (KRAL_NV_GetNumOfNVDefinition of them), then the files (KRAL_NV_GetNumOfNVEfsDefinition).
  * - An item has one value for each subscription and, when it is an array, for each array index (0 for all others).
@@ -19,9 +19,9 @@
  * - No request to the handset names both an array index and a subscription: the handset holds arrays of subscription 0
  *   only. In another one, array items have no value when they are read (status 5) and are refused when they are written
  *   (11); files take their values of every subscription.
- * - Texts are terminated. A function that returns one has a companion, ...StringLength, that tells the bytes it needs,
- *   the zero included; a buffer that is too small gives 12 and stays as it is.
- * - Functions that move a set go on behind an item that fails, and say in the text log which it was. The files that
+ * - Texts are terminated. A function that returns one has a companion, ...StringLength, that returns the bytes it
+ *   needs, the zero included; with a buffer that is too small the code is 12, and the buffer is untouched.
+ * - Functions that move a set continue after an item that fails, and name it in the text log. The files that
  *   they write are replaced in one step. What moves is limited by the filters, if any are loaded.
  * - A request to the handset may wait for time-out 0 (4,000 ms). One that gets no answer is tried 3 times and then
  *   counts as refused when the handset still answers others; when it does not, the function ends with 16.
@@ -72,7 +72,7 @@ extern "C" {
 
 /**
  * Called after each item of a set, on the thread that moves it. It must not call functions of this header on the same
- * handle, which give 0xFFFFFFFF until the set has been moved.
+ * handle, which return 0xFFFFFFFF until the set has been moved.
  *
  * @param operation  KRAL_NV_OPERATION_...
  * @param done       items so far
@@ -234,8 +234,9 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const c
 /* --- Single items, whatever the filters say -------------------------------------------------------------------------
  *
  * Of an array item all elements are read, and those that have a value are written; elements that were never written
- * (status 5) are a failure only when all of them are. 12 and 11: the handset refused a numbered item, with what
- * `status` tells (it may be null); 22 and 23: an RF NV item or a file could not be read or written; 16: no answer.
+ * (status 5) are a failure only when all of them are. 12 and 11: the handset refused a numbered item, with
+ * `status` as the reason (it may be null); 22 and 23: an RF NV item or a file could not be read or written; 16: no
+ * answer.
  */
 
 /** An item without a definition gets a generic one. */
@@ -281,8 +282,8 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GenerateQDF(KRAL_HANDLE handle, const char* 
 /* --- Subscriptions ------------------------------------------------------------------------------------------------ */
 
 /**
- * Tells whether the handset knows subscriptions (1): numbered items of another than 0 are then read and written with
- * the requests that name it. Without (0, as it is at first) the current subscription becomes 0.
+ * Sets whether the handset knows subscriptions (1): numbered items of another than 0 are then read and written with
+ * the requests that name it. Without (0, the default) the current subscription becomes 0.
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetTargetSupportMultiSIM(KRAL_HANDLE handle, uint8_t supported);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetCurrentSubscriptionIndex(KRAL_HANDLE handle, uint16_t* subscription);

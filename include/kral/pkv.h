@@ -4,17 +4,17 @@
  *
  * Beside the rules of kral.h:
  *
- * - A backup reads the NV items of a range of ids (KRAL_PKV_ConfigureBackup; 0 to 9,999 of one subscription at first),
- *   those that are defined for the handset's NV tool, array items of these element by element, and every file in the
- *   handset's item folders, /nv/items, nv/item_files/conf, nv/reg_files/conf, /nv/item_files/rfnv and
+ * - A backup reads the NV items of a range of ids (KRAL_PKV_ConfigureBackup; 0 to 9,999 of one subscription by
+ *   default), those that are defined for the handset's NV tool, array items of these element by element, and every file
+ *   in the handset's item folders, /nv/items, nv/item_files/conf, nv/reg_files/conf, /nv/item_files/rfnv and
  *   nv/item_store/rfnv, with what is below them. Items that the handset answers with a status other than 0 have no
  *   value and are left out. RF NV items are files, too.
  * - Every request is tried up to 3 times, each of them for time-out 0 (4,000 ms). A handset that cannot be reached any
  *   more ends the work: a backup then leaves the file as it was.
- * - `status` tells how the work ended: the code of the NV tool (KRAL_NV_GetErrorText), or one of those below. It is
+ * - `status` reports how the work ended: the code of the NV tool (KRAL_NV_GetErrorText), or one of those below. It is
  *   written in every case but for an unknown handle, and may be null.
  * - The work takes as long as its requests: plan for one round trip per item of a backup or comparison, and for 1.2 of
- *   a restore. The callback tells how far it is and can end it; other requests on the handle wait for its end.
+ *   a restore. The callback receives the progress and can end it; other requests on the handle wait for its end.
  * - A backup lists the item folders first. Until that is done the total is not known and the callback is not called;
  *   the directory callback (KRAL_ConfigureEfs2CallBacks) is, with every entry. KRAL_AbortEFS_Operation ends the work
  *   also then, and in the midst of a file.
@@ -80,7 +80,7 @@ typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
  * Called once for every item and file, with its final result, on the thread that called the function, until it stops
  * the work: what a restore had written together with the last one is then in the counts only. So are, as skipped, parts
  * of a PKV file that can be no item and no file (the text log names them). It must not call functions of the handle;
- * another backup, restore or comparison would give KRAL_PKV_STATUS_UNEXPECTED.
+ * another backup, restore or comparison would end with KRAL_PKV_STATUS_UNEXPECTED.
  *
  * @param item    lives for the call only
  * @param path    of a file; null for an NV item
@@ -112,7 +112,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNT
  * Reads the handset's items and files and writes them to a PKV file, which is replaced in one step at the end.
  *
  * Items that were never written (status 5), and those that the handset does not know (6), have no value. All others
- * that it does not give are refused: items with another status, files that it lists but does not give whole, and
+ * that it does not return are refused: items with another status, files that it lists but does not return whole, and
  * folders, by their paths, whose files it does not list. What was read is written even so, and the status is
  * KRAL_PKV_STATUS_INCOMPLETE.
  *

@@ -71,7 +71,7 @@ typedef void(KRAL_CALL* KRAL_TEXT_LOG_CALLBACK)(uint32_t size, const void* recor
  *
  * A terminal, the null device, and a pipe that somebody reads already are opened too. Each line then waits until it is
  * taken, and with it the thread that writes it. A file that does not take a line (a full disk, a pipe whose reader has
- * gone) costs that line; the callback is told once, by a line of its own in front.
+ * gone) costs that line; the callback receives one line about it, before that line.
  *
  * @param handle     from a connect function
  * @param file_name  terminated
@@ -86,7 +86,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_StartLogging(KRAL_HANDLE handle, const char* fil
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StopLogging(KRAL_HANDLE handle);
 
-/** Gives 1 between KRAL_StartLogging and KRAL_StopLogging, else 0. */
+/** Returns 1 between KRAL_StartLogging and KRAL_StopLogging, otherwise 0. */
 KRAL_API uint8_t KRAL_CALL KRAL_IsLoggingStarted(KRAL_HANDLE handle);
 
 /**

@@ -6,7 +6,7 @@
  *
  * - A request is framed by the library: flag bytes, escapes and FCS are not part of what is given here.
  * - A closed port is opened again by the three send functions and by a packet mode that the handset must agree to.
- *   KRAL_FlushRxBuffer, KRAL_SetDTR_State and KRAL_SetRTS_State give 0 while the port is closed; what only sets
+ *   KRAL_FlushRxBuffer, KRAL_SetDTR_State and KRAL_SetRTS_State return 0 while the port is closed; what only sets
  *   something works then as well.
  * - Time-out 7 bounds the writing of a whole request to a port; a caller's send function takes its own time.
  * - One request of a handle is on its way at a time: a call waits until one of another thread has ended.
@@ -20,13 +20,16 @@
 extern "C" {
 #endif
 
+/** Bytes of the longest request, without flags, escapes and FCS. */
+#define KRAL_LONGEST_REQUEST 16381
+
 /* --- Requests ----------------------------------------------------------------------------------------------------- */
 
 /**
  * Sends a request and awaits the reply that begins with the request's first byte.
  *
- * Replies that came before are thrown away. The first reply decides: one with another first byte (a refusal, for
- * example) fails the call at once, and is given out all the same, so that its reason can be read.
+ * Earlier replies are discarded. The first reply decides: one with another first byte (a refusal, for
+ * example) fails the call at once, and is still returned in `response`, so that its reason can be read.
  *
  * @param         handle         from a connect function
  * @param         request_size   1 to 16,381 bytes
@@ -48,7 +51,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SendSync(KRAL_HANDLE handle, uint16_t request_si
  * @param handle        from a connect function
  * @param request_size  1 to 16,381 bytes
  * @param request       command code first
- * @param time_out_ms   only told in the text log
+ * @param time_out_ms   only shown in the text log
  * @param start_flag    1: a flag byte goes before the frame, whatever KRAL_SetStartFlag says
  * @return 1 when the request was written; always 0 through a phone server
  *
@@ -89,15 +92,20 @@ KRAL_API uint8_t KRAL_CALL KRAL_SendRAW(KRAL_HANDLE handle, uint16_t request_siz
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetStartFlag(KRAL_HANDLE handle, uint8_t start_flag);
 
+/** Packet modes. */
+#define KRAL_PACKET_MODE_FRAMED 0     /* frames with flags, escapes and FCS */
+#define KRAL_PACKET_MODE_UNFRAMED 1   /* what is read at once is one packet */
+#define KRAL_PACKET_MODE_UNFRAMED_2 2 /* the same */
+#define KRAL_PACKET_MODE_LENGTH 3     /* each packet begins with its length, big-endian in bytes 1 and 2 */
+
 /**
- * Chooses how packets are told apart on the port.
+ * Chooses how the packets on the port are separated.
  *
  * Going from 0 to 1 asks the handset (command 68) and needs its consent; going from 1 to 0 brings its port back into
  * diagnostic mode with an AT command. Every other change is made at once and the handset is not asked.
  *
  * @param handle  from a connect function
- * @param mode    0: framed; 1 and 2: unframed, what is read at once is one packet; 3: each packet begins with its
- *                length, big-endian in bytes 1 and 2
+ * @param mode    KRAL_PACKET_MODE_...
  * @return 1 when the mode is set; always 0 through a phone server
  *
  * Wait: 80 ms from 0 to 1, about 500 ms from 1 to 0.
@@ -105,7 +113,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SetStartFlag(KRAL_HANDLE handle, uint8_t start_f
 KRAL_API uint8_t KRAL_CALL KRAL_SetPacketMode(KRAL_HANDLE handle, uint32_t mode);
 
 /**
- * Throws away the bytes that wait in the port, and the packet of which only a part has been read.
+ * Discards the bytes that wait in the port, and the packet of which only a part has been read.
  *
  * @return 1, or 0 while the port is closed
  */
@@ -178,7 +186,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SetDTR_State(KRAL_HANDLE handle, uint8_t state);
 KRAL_API uint8_t KRAL_CALL KRAL_SetRTS_State(KRAL_HANDLE handle, uint8_t state);
 
 /**
- * Limits how many bytes are given to the port's driver at a time (4,099 at first).
+ * Limits how many bytes are written to the port's driver at a time (4,099 by default).
  *
  * @param handle  from a connect function
  * @param bytes   at least 1

@@ -1,7 +1,7 @@
 /**
  * @file types.h
  * What every family header shares: calling convention, export mark, handle type.
- * The rules of the interface are told in kral.h.
+ * kral.h has the rules of the interface.
  */
 #ifndef KRAL_TYPES_H
 #define KRAL_TYPES_H

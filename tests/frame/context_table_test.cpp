@@ -1,17 +1,18 @@
 // The handle table: rows, handles, sharing, release and its order, and the objects that rows own.
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <memory>
 #include <new>
 #include <stdexcept>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
-#include "kral/connection.h"
-#include "kral/text_log.h"
+#include "kral/kral.h"
 #include "tests/support/failing_allocation.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/scripted_server.h"
@@ -128,15 +129,20 @@ TEST_F(ContextTable, FirstAliasOfALogicalPortWins) {
 }
 
 TEST_F(ContextTable, VersionNamesTheLibraryMode) {
-  char text[32];
-  KRAL_GetLibraryVersion(text);
-  EXPECT_STREQ(text, "KRAL V6.0.29,VENTRIMS");
-  KRAL_SetLibraryMode(1);
-  KRAL_GetLibraryVersion(text);
-  EXPECT_STREQ(text, "KRAL V6.0.29,ORBT");
-  KRAL_SetLibraryMode(2);
-  KRAL_GetLibraryVersion(text);
-  EXPECT_STREQ(text, "KRAL V6.0.29,VENTRIMS");
+  for (const auto& [mode, name] : {std::pair{KRAL_LIBRARY_MODE_DIRECT, "VENTRIMS"},
+                                   std::pair{KRAL_LIBRARY_MODE_SERVER, "ORBT"}, std::pair{2, "VENTRIMS"}}) {
+    KRAL_SetLibraryMode(static_cast<uint8_t>(mode));
+    char text[KRAL_LIBRARY_VERSION_SIZE];
+    KRAL_GetLibraryVersion(text);
+    unsigned major = 0;
+    unsigned minor = 0;
+    unsigned patch = 0;
+    char mode_name[KRAL_LIBRARY_VERSION_SIZE];
+    ASSERT_EQ(std::sscanf(text, "KRAL V%u.%u.%u,%31s", &major, &minor, &patch, mode_name), 4) << text;
+    EXPECT_STREQ(mode_name, name);
+    EXPECT_EQ(KRAL_GetLibraryVersionNumber(), (major << 16) + (minor << 8) + patch);
+    EXPECT_EQ(KRAL_GetLibraryVersionNumber(), KRAL_VERSION_NUMBER);
+  }
 }
 
 // --- Family objects -------------------------------------------------------------------------------------------------

@@ -11,6 +11,7 @@
 #include "tests/support/phone_log.h"
 #include "tests/support/temp_folder.h"
 #include "tests/support/text_lines.h"
+#include "tests/support/version_numbers.h"
 
 namespace kral {
 namespace {
@@ -39,11 +40,11 @@ TEST_F(TextLogExports, StartStopAndWhatStandsBetween) {
   EXPECT_EQ(KRAL_SetLogFlags(handle_, 0x212), 1);
   EXPECT_EQ(KRAL_StopLogging(handle_), 1);
   EXPECT_EQ(KRAL_IsLoggingStarted(handle_), 0);
-  EXPECT_EQ(Bodies("log.txt"),
-            (Lines{"LOG_FN,VARN DLL Version: KRAL V6.0.29,VENTRIMS", "LOG_C_HIGH_LEVEL_START,KRAL_IsLoggingStarted",
-                   "LOG_ERR,100%s", "LOG_C_HIGH_LEVEL_START,KRAL_SetLogFlags( uiLogFlags = 0x212 )",
-                   "LOG_FN,KRAL_SetLogFlags(uiLogFlags=0x0212)", "LOG_C_HIGH_LEVEL_START,KRAL_StopLogging",
-                   "LOG_FN,KRAL_StopLogging()"}));
+  EXPECT_EQ(Bodies("log.txt"), (Lines{"LOG_FN,VARN DLL Version: KRAL V" + test::VersionNumbers() + ",VENTRIMS",
+                                      "LOG_C_HIGH_LEVEL_START,KRAL_IsLoggingStarted", "LOG_ERR,100%s",
+                                      "LOG_C_HIGH_LEVEL_START,KRAL_SetLogFlags( uiLogFlags = 0x212 )",
+                                      "LOG_FN,KRAL_SetLogFlags(uiLogFlags=0x0212)",
+                                      "LOG_C_HIGH_LEVEL_START,KRAL_StopLogging", "LOG_FN,KRAL_StopLogging()"}));
 }
 
 TEST_F(TextLogExports, NullTextsGiveZero) {

@@ -12,6 +12,7 @@
 #include "tests/support/efs_fixture.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/version_numbers.h"
 
 namespace kral {
 namespace {
@@ -129,7 +130,7 @@ TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
   EXPECT_TRUE(HasLine(KRAL_LOG_C_HIGH_LEVEL_START, "KRAL_NV_BackupNVFromMobile"));
   const pkv::PkvSet first = Read();
   EXPECT_EQ(first.items.size(), 22u);
-  EXPECT_EQ(first.properties.version, "VARN 6.0.29");
+  EXPECT_EQ(first.properties.version, "VARN " + test::VersionNumbers());
   EXPECT_EQ(first.properties.values[0].first, "ESN");
 
   MakeBlank();

@@ -20,9 +20,6 @@ namespace kral::tool {
 namespace {
 
 constexpr std::uint16_t kMostPorts = 256;
-constexpr std::uint32_t kTimeOutCommand = 0;
-constexpr std::uint32_t kTimeOutLiveness = 1;
-constexpr std::uint8_t kWakeOnData = 1;
 
 std::string Describe(const std::vector<std::uint16_t>& ports) {
   std::string text;
@@ -134,7 +131,7 @@ std::vector<std::uint16_t> ListPortsWithHandset() {
 
 Session::Session(const SessionOptions& options, Expected expected) : port_(0), handle_(0) {
   if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
-  KRAL_SetDefaultReceiveMode(kWakeOnData);
+  KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
   ThrowIfInterrupted();
   handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
@@ -146,8 +143,8 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
     StartLog(options);
     if (options.time_out_ms) {
       const auto milliseconds = static_cast<std::int32_t>(*options.time_out_ms);
-      KRAL_ConfigureTimeOut(handle_, kTimeOutCommand, milliseconds);
-      KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, milliseconds);
+      KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_COMMAND, milliseconds);
+      KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_LIVENESS, milliseconds);
     }
     // What the handset answers late shall not be taken for the answer to something else.
     KRAL_SetResynchronise(handle_, 1);
@@ -173,14 +170,14 @@ void Session::StartLog(const SessionOptions& options) const {
 
 bool Session::AnswersInTheEnd() {
   constexpr std::array<std::int32_t, 2> kLonger = {300, 1000};
-  const std::int32_t before = KRAL_GetTimeOut(handle_, kTimeOutLiveness);
+  const std::int32_t before = KRAL_GetTimeOut(handle_, KRAL_TIME_OUT_LIVENESS);
   bool answers = false;
   for (const std::int32_t longer : kLonger) {
     if (answers || TroubleOf(handle_) || Interrupted()) break;
-    KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, std::max(before, longer));
+    KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_LIVENESS, std::max(before, longer));
     answers = KRAL_IsPhoneConnected(handle_) != 0;
   }
-  KRAL_ConfigureTimeOut(handle_, kTimeOutLiveness, before);
+  KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_LIVENESS, before);
   return answers;
 }
 

@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "kral/connection.h"
 #include "platform/clock.h"
 
 namespace kral {
@@ -21,8 +22,8 @@ class DataLogFileHandler;
 class ThreadControl;
 
 enum class ReceiveMode : uint8_t {
-  kAsWritten = 0,   // the sleep rule of the receive loop
-  kWakeOnData = 1,  // waits in the port and sleeps nowhere
+  kAsWritten = KRAL_RECEIVE_MODE_POLL,   // the sleep rule of the receive loop
+  kWakeOnData = KRAL_RECEIVE_MODE_WAKE,  // waits in the port and sleeps nowhere
 };
 
 // The settings and the counter may be used on any thread.

@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <span>
 
+#include "kral/transport.h"
 #include "transport/line/hdlc_deframer.h"
 #include "transport/line/packet_listener.h"
 
@@ -14,7 +15,12 @@ namespace kral {
 
 class DataLogFileHandler;
 
-enum class PacketMode : uint32_t { kFramed = 0, kUnframed1 = 1, kUnframed2 = 2, kLengthPrefixed = 3 };
+enum class PacketMode : uint32_t {
+  kFramed = KRAL_PACKET_MODE_FRAMED,
+  kUnframed1 = KRAL_PACKET_MODE_UNFRAMED,
+  kUnframed2 = KRAL_PACKET_MODE_UNFRAMED_2,
+  kLengthPrefixed = KRAL_PACKET_MODE_LENGTH,
+};
 
 // Fed by the receive thread; the settings may be made on any thread and count from the next chunk on.
 class ChunkSplitter {

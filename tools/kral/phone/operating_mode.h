@@ -14,10 +14,13 @@ namespace kral::tool {
 
 struct ModeRequest {
   std::string_view name;
-  std::uint16_t mode;  // as mode control takes it
+  std::uint16_t mode;
 };
-inline constexpr std::array<ModeRequest, 5> kModeRequests{
-    {{"ftm", 3}, {"online", 4}, {"offline", 1}, {"lpm", 5}, {"reset", 2}}};
+inline constexpr std::array<ModeRequest, 5> kModeRequests{{{"ftm", KRAL_MODE_FACTORY_TEST},
+                                                           {"online", KRAL_MODE_ONLINE},
+                                                           {"offline", KRAL_MODE_OFFLINE_DIGITAL},
+                                                           {"lpm", KRAL_MODE_LOW_POWER},
+                                                           {"reset", KRAL_MODE_RESET}}};
 
 // The state that the handset reports; fails with 0 when it does not say.
 std::uint8_t ReadOperatingState(const Session& session, std::uint32_t& state);

@@ -16,7 +16,6 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint16_t kNullPort = 65534;
 constexpr std::chrono::milliseconds kWait{50};
 
 // A playback whose packets are taken by the callback, which tells their times, and not out of the log queue: the
@@ -80,8 +79,8 @@ class Playback {
 }  // namespace
 
 OfflineHandle::OfflineHandle() : handle_(0) {
-  KRAL_SetDefaultReceiveMode(1);
-  handle_ = KRAL_ConnectServer(kNullPort);
+  KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
+  handle_ = KRAL_ConnectServer(KRAL_PORT_NULL);
   if (handle_ == 0) {
     throw ToolError(ExitCode::kInternal, "no handle for the playback could be made",
                     "close other programs that use the library, then run the command again");
@@ -96,7 +95,7 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
               const std::function<void(const PlayedPacket&)>& sink) {
   Playback playback(handle, file, pace);
   if (!playback.started()) {
-    throw ExplainRecord(LastError(handle), "the playback", kNullPort, "check the name and the permissions");
+    throw ExplainRecord(LastError(handle), "the playback", KRAL_PORT_NULL, "check the name and the permissions");
   }
   for (;;) {
     // Looked at before the packets: what a playback that has ended left here is taken still.
