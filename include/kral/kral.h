@@ -12,7 +12,7 @@
  *   argument. Where 0 or 1 means something else:
  *     - KRAL_NV_ functions (nv_tool.h) return an error code, 0 for success.
  *     - A caller's send and receive functions (connection.h) return 0 for success; the result of the flush function is
- *       ignored. The callbacks of the NV tool and of PKV work say what theirs means.
+ *       ignored. KRAL_PKV_CALLBACK returns 1 to go on and 0 to stop. All other callbacks return nothing.
  *     - KRAL_SetStartFlag returns the former value of the setting, not whether the call worked.
  *     - A result that is an answer, as of KRAL_IsLoggingStarted or KRAL_IsPhoneConnected, is 1 for yes and 0 for no.
  *     - Connect functions return the handle, 0 for failure; KRAL_GetTimeOut, counts and the band functions a value.
