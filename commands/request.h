@@ -115,12 +115,17 @@ Reply SendWithin(Diag_FTM& phone, u32 time_out_id, const Request<Header, Fields.
 
 // A reply that repeats the beginning of its request tells itself from one to an earlier request with the same first
 // byte, which comes after that was given up. One of fewer than `least` bytes repeats nothing, and is judged by whoever
-// asked.
-inline Reply SendEchoed(Diag_FTM& phone, u32 time_out_ms, std::size_t echoed, std::size_t least) {
+// asked. Replies to writes repeat their data as well, `with_data` bytes in all, but that is not asked of a handset as
+// long as no answer of its can be late.
+inline Reply SendEchoed(Diag_FTM& phone, u32 time_out_ms, std::size_t echoed, std::size_t least,
+                        std::size_t with_data = 0) {
   const auto request = phone.packet().request();
   const auto head = request.first(std::min(echoed, request.size()));
-  return phone.Send(phone.packet(), time_out_ms, 0, [head, least](std::span<const u8> reply) {
-    return reply.size() < least || std::equal(head.begin(), head.end(), reply.begin());
+  const auto all = request.first(phone.MayGetLateAnswer() ? std::min(with_data, request.size()) : 0);
+  return phone.Send(phone.packet(), time_out_ms, 0, [head, all, least](std::span<const u8> reply) {
+    if (reply.size() < least) return true;
+    const auto repeated = reply.size() < all.size() || all.size() < head.size() ? head : all;
+    return std::equal(repeated.begin(), repeated.end(), reply.begin());
   });
 }
 
@@ -138,13 +143,14 @@ constexpr bool AreSorted(const Rows&... rows) {
 struct DiagHeader {
   u8 code;
   u8 echoed = 1;
+  u16 with_data = 0;
 
   constexpr u32 key() const { return code; }
   void Begin(Diag_FTM& phone) const {
     phone.packet().Reset();
     phone.packet().Append8(code);
   }
-  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed + 1U); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed + 1U, with_data); }
 };
 
 // The subsystem-dispatch form: 75, the subsystem, its 16-bit command.
@@ -152,6 +158,7 @@ struct SubsystemHeader {
   u8 subsystem;
   u16 command;
   u8 echoed = 4;
+  u16 with_data = 0;
 
   constexpr u32 key() const { return u32{subsystem} << 16 | command; }
   void Begin(Diag_FTM& phone) const {
@@ -160,7 +167,7 @@ struct SubsystemHeader {
     phone.packet().Append8(subsystem);
     phone.packet().Append16(command);
   }
-  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed, with_data); }
 };
 
 template <class... Fields>

@@ -59,6 +59,7 @@ KRAL_HANDLE ConnectWithWait(uint16_t port, uint32_t wait_ms, Clock& clock) {
     clock.SleepMs(kAttemptIntervalMs);
     if (answers) return handle;
   } while (has_time());
+  const KeepFailure keep;
   if (handle != 0) Disconnect(handle);
   return 0;
 }

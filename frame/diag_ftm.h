@@ -85,6 +85,10 @@ class Diag_FTM {
   // Asks for it where it is due. `passed_over` sees the replies in front. Not the echo within the time-out: the request
   // that was to follow counts as not answered, and is better not sent.
   Reply Synchronise(uint32_t time_out_ms, const std::function<void(std::span<const uint8_t>)>& passed_over = {});
+  // After a request whose answer nobody awaits any more.
+  void OweAnswer();
+  // Whether such an answer may come instead of the next request's.
+  bool MayGetLateAnswer() const;
 
   // On for as long as it lives, whatever the caller has set. For whoever holds the request lock.
   class Resynchronising {
@@ -202,6 +206,7 @@ class Diag_FTM {
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
   bool answer_owed_ = false;          // by the handset, to a request that was given up
+  uint32_t owed_since_ = 0;
   uint32_t resynchronising_ = 0;
   uint32_t loopbacks_ = 0;  // numbers those that resynchronise
   bool retired_ = false;

@@ -34,16 +34,18 @@ bool Diag_FTM::StartCapture(const char* file_name) {
 // result does not tell it: the counters do, and the text log.
 bool Diag_FTM::StopCapture() {
   constexpr uint32_t kSettleMs = 200;
-  const bool running = capture().state() == CaptureState::kRunning;
-  if (running && !server_mode() && !dispatcher().WaitUntilDispatched(kSettleMs)) {
+  const CaptureState before = capture().state();
+  const bool running = before != CaptureState::kNone;
+  if (before == CaptureState::kRunning && !server_mode() && !dispatcher().WaitUntilDispatched(kSettleMs)) {
     log().WriteLine(kLogErr, "Capture file: it ends in front of %u packets that still wait for callbacks",
                     static_cast<unsigned>(dispatcher().backlog()));
   }
   if (capture().Stop()) return true;
-  return Fail(
-      capture().state() == CaptureState::kNone
-          ? Failure(KRAL_ERROR_BAD_FILE, "the capture file does not hold all packets, or no capture was running")
-          : Failure(KRAL_ERROR_NO_ANSWER, "packets of the capture still wait for the disk"));
+  if (capture().state() != CaptureState::kNone) {
+    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "packets of the capture still wait for the disk"));
+  }
+  return Fail(running ? Failure(KRAL_ERROR_BAD_FILE, "the capture file does not hold all packets")
+                      : Failure(KRAL_ERROR_ARGUMENT, "no capture is running"));
 }
 
 bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
@@ -63,6 +65,7 @@ void Diag_FTM::EndCollection() {
   player().Stop();
   asynchronous().Close();
   events().Close();
+  const KeepFailure keep;
   StopCapture();
 }
 

@@ -67,6 +67,7 @@ void Diag_FTM::OpenDirect(const OpenArguments& arguments) {
   if (!dispatcher().EnsureThread(parts_)) {
     log().WriteLine(kLogErr, "Error. No thread for the dispatcher of port %d.", port());
     connected_ = false;
+    Fail(Failure(KRAL_ERROR_INTERNAL, "there is no thread for the packets of port %d", port()));
     return;
   }
   transport().SetOpenFlags(arguments.handshake, arguments.second_flag);

@@ -41,7 +41,7 @@ Reply Diag_FTM::SendSync(std::span<const uint8_t> request, std::span<uint8_t> ro
   }
   const Reply reply = server_mode() ? SendThroughServer(request, room, expected_code, time_out_ms)
                                     : transport().SendSync(request, room, expected_code, time_out_ms, delay_ms, is_own);
-  answer_owed_ = answer_owed_ || MayComeLater(reply);
+  if (MayComeLater(reply)) OweAnswer();
   if (const char* const refusal = RefusalText(reply.refusal())) log().WriteLine(kLogErr, "ERROR:\t%s", refusal);
   return Noted(reply, request, time_out_ms);
 }
@@ -55,6 +55,7 @@ Reply Diag_FTM::AwaitNext(CDiagPacket& packet, uint32_t time_out_ms, const Reply
 
 Reply Diag_FTM::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
   const Reply reply = IsPortOpen() ? transport().SendRaw(request, room, time_out_ms) : ReplyKind::kPortClosed;
+  if (MayComeLater(reply)) OweAnswer();
   return Noted(reply, request, time_out_ms);
 }
 
@@ -90,9 +91,25 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
     reply = transport().AwaitNext(room, loopback[0], time_out_ms - elapsed, is_own);
   }
-  if (reply) answer_owed_ = false;
+  if (reply) {
+    answer_owed_ = false;
+    return ReplyKind::kExpected;
+  }
   const KeepFailure keep;  // the request whose answer is owed, rather than a loopback that nobody asked for
-  return Noted(reply, loopback, time_out_ms);
+  Noted(reply, loopback, time_out_ms);
+  // What went wrong is the loopback's. Of the request itself nothing has been sent, and nothing has come.
+  const bool is_the_lines = reply.kind() == ReplyKind::kGone || reply.kind() == ReplyKind::kAborted || reply.not_sent();
+  return is_the_lines ? reply.kind() : ReplyKind::kNotSent;
+}
+
+void Diag_FTM::OweAnswer() {
+  answer_owed_ = true;
+  owed_since_ = clock_.TickMs();
+}
+
+bool Diag_FTM::MayGetLateAnswer() const {
+  constexpr uint32_t kLatestMs = 10000;
+  return answer_owed_ && clock_.TickMs() - owed_since_ < kLatestMs;
 }
 
 Reply Diag_FTM::SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,

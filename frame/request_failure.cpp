@@ -83,6 +83,8 @@ Failure PortFailure(Diag_FTM& phone) {
   const DeviceResult& result = line.open_result();
   const auto system = static_cast<uint32_t>(result.system_code);
   switch (result.error) {
+    case DeviceError::kNone:
+      return Failure(KRAL_ERROR_ARGUMENT, "COM%d is closed", port);
     case DeviceError::kNoSuchPort:
       return Failure(KRAL_ERROR_NO_PORT, "there is no port COM%d", port).System(system);
     case DeviceError::kBusy:

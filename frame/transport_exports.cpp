@@ -51,7 +51,9 @@ bool SendSync(Diag_FTM& phone, Request request, uint16_t* response_size, uint8_t
 
 bool SendASync(Diag_FTM& phone, Request request, uint32_t time_out_ms, uint8_t start_flag) {
   if (IsRefused(phone, "KRAL_SendASync")) return false;
-  return static_cast<bool>(phone.SendASync(request, time_out_ms, start_flag != 0));
+  const Reply reply = phone.SendASync(request, time_out_ms, start_flag != 0);
+  if (reply) phone.OweAnswer();
+  return static_cast<bool>(reply);
 }
 
 bool SendRaw(Diag_FTM& phone, Request request, uint16_t* response_size, uint8_t* response, uint32_t time_out_ms) {
@@ -70,6 +72,16 @@ bool SetStartFlag(Diag_FTM& phone, uint8_t start_flag) {
 
 constexpr uint32_t kLastPacketMode = 3;
 
+Failure NotAgreed(Diag_FTM& phone, const Reply& reply, uint32_t mode) {
+  using Transport = kral::CKralThreadInterface;
+  if (mode == 0) return Failure(KRAL_ERROR_NO_ANSWER, "the handset did not agree to packet mode 0");
+  if (reply.code() == Transport::kUnframedModeRequest[0]) {
+    return Failure(KRAL_ERROR_REFUSED, "the handset did not agree to packet mode %u", mode)
+        .Command(Transport::kUnframedModeRequest);
+  }
+  return kral::RequestFailure(phone, reply, Transport::kUnframedModeRequest, Transport::kUnframedModeMs);
+}
+
 bool SetPacketMode(Diag_FTM& phone, uint32_t mode) {
   if (IsRefused(phone, "KRAL_SetPacketMode")) return false;
   auto& transport = phone.transport();
@@ -79,9 +91,8 @@ bool SetPacketMode(Diag_FTM& phone, uint32_t mode) {
     transport.SetPacketMode(mode);  // logs it
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the packet mode %u is not one of 0 to 3", mode));
   }
-  if (!transport.SetPacketMode(mode)) {
-    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the handset did not agree to packet mode %u", mode));
-  }
+  const Reply reply = transport.SetPacketMode(mode);
+  if (!reply) return Fail(NotAgreed(phone, reply, mode));
   phone.SetFramed(mode == 0);
   return true;
 }

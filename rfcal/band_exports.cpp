@@ -1,6 +1,7 @@
 // The exported band functions. They check the channel lists; the rules are CBandHelper's.
 #include "kral/band.h"
 
+#include "frame/export_call.h"
 #include "rfcal/bands/band_channels.h"
 #include "rfcal/bands/band_helper.h"
 
@@ -8,6 +9,7 @@ namespace kral {
 namespace {
 
 constexpr double kNotAChannel = 0.0;
+constexpr const char* kNoOutput = "an output is missing";
 
 const CChannelDefinition* ListOf(uint16_t band, uint8_t direction) {
   const BandChannels* row = FindBandChannels(band);
@@ -48,21 +50,33 @@ extern "C" uint32_t KRAL_CALL KRAL_Band_Helper_GetBandCount(void) {
 }
 
 extern "C" uint8_t KRAL_CALL KRAL_Band_Helper_GetBand(uint32_t index, uint16_t* band) {
-  if (band == nullptr || index >= AllBandChannels().size()) return 0;
-  *band = AllBandChannels()[index].band;
-  return 1;
+  return ExportCall(__func__).Require(band != nullptr, kNoOutput).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+    const auto all = AllBandChannels();
+    if (index >= all.size())
+      return Fail(Failure(KRAL_ERROR_ARGUMENT, "there are %zu bands, none at index %u", all.size(), index));
+    *band = all[index].band;
+    return 1;
+  });
 }
 
 extern "C" uint8_t KRAL_CALL KRAL_Band_Helper_GetBandName(uint16_t band, char* name, uint32_t size) {
-  if (name == nullptr) return 0;
-  return BandName(band, {name, size}) ? 1 : 0;
+  return ExportCall(__func__).Require(name != nullptr, kNoOutput).Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+    return BandName(band, {name, size}) ||
+           Fail(Failure(KRAL_ERROR_ARGUMENT, "no band %u, or no room for its name in %u bytes", band, size));
+  });
 }
 
 extern "C" uint8_t KRAL_CALL KRAL_Band_Helper_GetBandRange(uint16_t band, uint8_t direction, uint32_t index,
                                                            int32_t* first, int32_t* last) {
-  const CChannelDefinition* list = ListOf(band, direction);
-  if (list == nullptr || index >= list->ranges().size() || first == nullptr || last == nullptr) return 0;
-  *first = list->ranges()[index].first;
-  *last = list->ranges()[index].last;
-  return 1;
+  return ExportCall(__func__)
+      .Require(first != nullptr && last != nullptr, kNoOutput)
+      .Alone(uint8_t{0}, uint8_t{1}, [&]() -> uint8_t {
+        const CChannelDefinition* list = ListOf(band, direction);
+        if (list == nullptr || index >= list->ranges().size()) {
+          return Fail(Failure(KRAL_ERROR_ARGUMENT, "band %u has no range %u in direction %u", band, index, direction));
+        }
+        *first = list->ranges()[index].first;
+        *last = list->ranges()[index].last;
+        return 1;
+      });
 }

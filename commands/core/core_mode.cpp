@@ -47,11 +47,10 @@ bool HasReached(uint16_t mode, uint32_t state) {
   }
 }
 
-Failure NotReached(uint16_t mode, const std::optional<uint32_t>& told, uint32_t total) {
-  if (!told) return Failure(KRAL_ERROR_NO_ANSWER, "the handset does not tell its mode within %u ms", total);
+Failure NotReached(uint16_t mode, uint32_t told, uint32_t total) {
   return Failure(KRAL_ERROR_NO_ANSWER, "the handset is not in mode %d after %u ms, but tells state %u", mode, total,
-                 *told)
-      .Status(KRAL_ERROR_STATUS_COMMAND, *told);
+                 told)
+      .Status(KRAL_ERROR_STATUS_COMMAND, told);
 }
 
 // `mode` as the caller passed it: bits above the low four are sent nowhere, but they make the read-back time out.
@@ -64,11 +63,13 @@ bool PollMode(Diag_FTM& phone, uint16_t mode, uint32_t total) {
     if (answered) told = state;
     const bool reached = answered && HasReached(mode, state);
     const uint32_t used = phone.clock().TickMs() - start;
-    if (reached || used >= total) {
+    const bool is_gone = !phone.server_mode() && phone.transport().port().gone();
+    if (reached || is_gone || used >= total) {
       phone.log().WriteLine(
           kLogRet, "DIAG_CONTROL_F -- mode switching status polling has %s (time used = %d, total timeout = %d) ms.",
           reached ? "succeeded" : "timeout", static_cast<int>(used), static_cast<int>(total));
-      return reached || Fail(NotReached(mode, told, total));
+      if (!reached && told && !is_gone) Fail(NotReached(mode, *told, total));  // else the last request has said why
+      return reached;
     }
     phone.clock().SleepMs(kPollIntervalMs);
   }
@@ -107,7 +108,11 @@ bool ControlMode(Diag_FTM& phone, uint16_t mode) {
   const uint16_t sent_mode = mode & 15;
   phone.log().WriteLine(kLogFn, "KRAL_DIAG_CONTROL_F(eMode=%d)", sent_mode);
   // Not the last word: a handset may switch without answering, so the read-back decides where there is one.
-  const bool sent = static_cast<bool>(Send(phone, kModeControl, sent_mode));
+  const Reply reply = Send(phone, kModeControl, sent_mode);
+  const bool sent = static_cast<bool>(reply);
+  // A silent handset may have switched: then the read-back says what came of it. Any other failure is the reason.
+  std::optional<KeepFailure> reason;
+  if (!sent && reply.kind() != ReplyKind::kNone) reason.emplace();
 
   switch (sent_mode) {
     case kModeFactoryTest:

@@ -142,6 +142,7 @@ bool ChangeBootMode(Diag_FTM& phone, uint8_t ftm, uint8_t reset) {
     phone.log().WriteLine(kLogErr, "KRAL_ChangeFTM_BootMode() - Failed to write NV FTM mode");
     return Fail(nv::Refusal(kBootFlagItem, status));
   }
+  const KeepFailure keep;
   if (reset != 0) diag::ControlMode(phone, diag::kModeReset);  // a handset that resets need not answer
   return written;
 }

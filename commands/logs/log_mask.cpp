@@ -19,10 +19,12 @@ Reply Configure(Diag_FTM& phone, const Row& row, uint32_t first_word, size_t dat
   return Send(phone, row, fields...);
 }
 
-// A reply has a status in front of its data or has none; only its length tells which. A refusal is noted.
+// A reply has a status in front of its data or has none; only its length tells which. A refusal may come without the
+// data. It is noted.
 bool IsDone(std::span<const uint8_t> response, size_t data_size) {
   constexpr size_t kStatusAt = log_config_reply::kHeader;
-  if (response.size() != kStatusAt + log_config_reply::kStatus + data_size) return true;
+  constexpr size_t kStatusAlone = kStatusAt + log_config_reply::kStatus;
+  if (response.size() != kStatusAlone && response.size() != kStatusAlone + data_size) return true;
   const uint32_t status = *LoadLe<uint32_t>(response, kStatusAt);
   return status == 0 || Fail(Failure(KRAL_ERROR_REFUSED, "the handset refused the log configuration: status %u", status)
                                  .Status(KRAL_ERROR_STATUS_COMMAND, status));

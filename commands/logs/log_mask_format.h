@@ -4,6 +4,7 @@
 
 #include <cstddef>
 
+#include "base/little_endian.h"
 #include "commands/request.h"
 
 namespace kral::diag {
@@ -18,9 +19,19 @@ struct LogConfigHeader {
     phone.packet().Append32(115);
     phone.packet().Append32(operation);
   }
-  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, kEchoed, kEchoed); }
+  // A reply of more than a status repeats the equipment id as well, with or without a status in front of it.
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const {
+    const auto request = phone.packet().request();
+    return phone.Send(phone.packet(), time_out_ms, 0, [request](std::span<const u8> reply) {
+      if (reply.size() < kHead) return true;
+      if (!std::equal(reply.begin(), reply.begin() + kHead, request.begin())) return false;
+      const auto equipment_id = LoadLe<u32>(request, kHead);
+      return !equipment_id || reply.size() < kHead + 3 * sizeof(u32) || LoadLe<u32>(reply, kHead) == equipment_id ||
+             LoadLe<u32>(reply, kHead + sizeof(u32)) == equipment_id;
+    });
+  }
 
-  static constexpr std::size_t kEchoed = 8;
+  static constexpr std::ptrdiff_t kHead = 8;
 };
 
 template <class... Fields>

@@ -73,12 +73,31 @@ bool TakeResults(Diag_FTM& phone, u16 sent, std::span<const u16> read_only, Batc
   return Fail(BadReply(phone, "has results for another number of items"));
 }
 
+// Item by item as far as both go: a reply with other items is one to an earlier batch. One of other items in number
+// answers this batch, badly.
+bool AnswersBatch(std::span<const u8> reply, std::span<const u8> request) {
+  const size_t echoed = kWriteBatch.header.echoed;
+  if (reply.size() < echoed) return true;
+  if (!std::equal(reply.begin(), reply.begin() + static_cast<std::ptrdiff_t>(echoed), request.begin())) return false;
+  auto sent = request.subspan(batch::kPayload);
+  auto results = reply.subspan(std::min(reply.size(), batch::kResults));
+  while (results.size() >= batch::kItemHeader && sent.size() >= batch::kItemHeader) {
+    if (LoadLe<u16>(results, batch::kResultItem) != LoadLe<u16>(sent, batch::kResultItem)) return false;
+    results = results.subspan(std::min<size_t>(results.size(), batch::kItemHeader + results[0]));
+    sent = sent.subspan(std::min<size_t>(sent.size(), batch::kItemHeader + sent[0]));
+  }
+  return true;
+}
+
 Reply SendPacket(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const u16> read_only, BatchOutcome& outcome,
                  const BatchObserver& observer) {
   std::vector<u8> payload;
   payload.reserve(batch::kPayloadLimit);
   const u16 count = FillPayload(phone, list, payload);
-  const Reply reply = Send(phone, kWriteBatch, count, static_cast<u16>(payload.size()), u16{0}, Bytes(payload));
+  Compose(phone, kWriteBatch, count, static_cast<u16>(payload.size()), u16{0}, Bytes(payload));
+  const Reply reply =
+      phone.Send(phone.packet(), phone.TimeOut(kTimeOutDefaultCommand), 0,
+                 [&](std::span<const u8> bytes) { return AnswersBatch(bytes, phone.packet().request()); });
   if (!reply) {
     phone.log().WriteLine(kLogErr,
                           "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Error occurred during send sync operation.");

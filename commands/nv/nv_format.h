@@ -18,18 +18,21 @@ inline constexpr u8 kExtendedData = 8;
 // deliberately, no status behind them.
 inline constexpr DiagRequest<u16, Bytes, u16> kReadItem{38, kItemData};
 inline constexpr DiagRequest<u16, u8> kReadElement{38, kElementData};  // item, array index
-inline constexpr DiagRequest<u16, Block<kDataSize>> kWriteItem{39, kItemData};
+inline constexpr DiagRequest<u16, Block<kDataSize>> kWriteItem{39, kItemData, kItemData + kDataSize};
 
 // The same for one subscription (the context).
 inline constexpr SubsystemRequest<u16, u16, u16, Bytes> kWriteBatch{kSubsystem, 0};  // items, payload size, zero
 inline constexpr SubsystemRequest<u16, u16, Bytes, u16> kReadExtended{kSubsystem, 1, kExtendedData};
-inline constexpr SubsystemRequest<u16, u16, Block<kDataSize>, u16> kWriteExtended{kSubsystem, 2, kExtendedData};
+inline constexpr SubsystemRequest<u16, u16, Block<kDataSize>, u16> kWriteExtended{kSubsystem, 2, kExtendedData,
+                                                                                  kExtendedData + kDataSize};
 static_assert(AreSorted(kWriteBatch, kReadExtended, kWriteExtended));
 
 namespace batch {
 // A packet is full when its payload would reach this.
 inline constexpr size_t kPayloadLimit = 1320;
 inline constexpr size_t kItemHeader = 4;  // length u8, item u16, zero u8; in the reply the status u8 is the last
+
+inline constexpr size_t kPayload = 10;
 
 // The reply.
 inline constexpr size_t kResultCount = 4;

@@ -3,6 +3,7 @@
 #include <array>
 #include <limits>
 #include <span>
+#include <string_view>
 
 #include "download/images/hex_format.h"
 #include "download/images/hex_phone_image_decoder.h"
@@ -11,6 +12,7 @@ namespace kral::images {
 namespace {
 
 using LineText = std::string_view;
+using std::string_view_literals::operator""sv;
 
 constexpr uint32_t kUnknown = std::numeric_limits<uint32_t>::max();
 
@@ -55,6 +57,14 @@ std::span<const uint8_t> CheckedBytes(const LineReader::Line& line, size_t data_
   }
   if (sum != 0) return {};
   return std::span(bytes).first(count);
+}
+
+// A record that a missing line end has hung on to this one is not read.
+uint64_t BytesBehindChecksum(LineText text) {
+  const size_t end = 1 + 2 * (ValueAt<uint16_t>(text, hex::kLengthAt, 2) + hex::kFrameBytes);
+  if (end >= text.size()) return 0;
+  const auto rest = text.substr(end);
+  return rest.find_first_not_of(" \t\r\n\v\f\0"sv) == rest.npos ? 0 : (rest.size() + 1) / 2;
 }
 
 bool IsChecked(const LineReader::Line& line, size_t data_length) {
@@ -118,6 +128,7 @@ bool HexPhoneImageDecoder::LoadRecord(PhoneImage& image, const LineReader::Line&
   const LineText text = line.text;
   if (TypeAt(text, hex::kFirstTypeAt) != '0') return false;
   const char type = TypeAt(text, hex::kSecondTypeAt);
+  Lose(BytesBehindChecksum(text), line.number);
   cursor.at_end = type == '1';  // records behind the end-of-file record still count
   switch (type) {
     case '0':

@@ -110,7 +110,13 @@ bool CloseStream(std::FILE* stream) {
 
 std::FILE* OpenToWriteText(const std::string& path) {
   FileDescriptor file;
-  if (OpenIf(TakesLines, path, O_WRONLY | O_CREAT | O_TRUNC, file)) return nullptr;
+  struct stat status {};
+  if (OpenIf(TakesLines, path, O_WRONLY | O_CREAT, file) || ::fstat(file.get(), &status) != 0) return nullptr;
+  if (S_ISREG(status.st_mode)) {
+    // What is being captured or played is not emptied. Several text logs may share a file: none of them holds it.
+    if (IsHeldByAnother(file.get(), LOCK_EX) || ::ftruncate(file.get(), 0) != 0) return nullptr;
+    ::flock(file.get(), LOCK_UN);
+  }
   return MakeStream(std::move(file), "wb");
 }
 

@@ -38,20 +38,24 @@ bool IsOwnReply(std::span<const u8> request, std::span<const u8> reply, const Re
          (!is_own || is_own(reply));
 }
 
-// While a request is under way. What is sent after an abort, to clean up, is not ended by it.
-class AbortScope {
+// What the engine does for an EFS2 request while it is under way: it heeds the abort (but for what is sent after one,
+// to clean up) and shows the late replies that it drops.
+class RequestScope {
  public:
-  explicit AbortScope(Diag_FTM& phone) : phone_(phone) { Set(phone.efs().abort ? nullptr : &phone.efs().abort); }
-  ~AbortScope() { Set(nullptr); }
-  AbortScope(const AbortScope&) = delete;
-  AbortScope& operator=(const AbortScope&) = delete;
+  explicit RequestScope(Diag_FTM& phone) : phone_(phone) {
+    if (phone.server_mode()) return;  // there is no transport of ours
+    phone.transport().SetAbort(phone.efs().abort ? nullptr : &phone.efs().abort);
+    phone.transport().SetForgotten([&phone](std::span<const u8> late) { NoteLateReply(phone, late); });
+  }
+  ~RequestScope() {
+    if (phone_.server_mode()) return;
+    phone_.transport().SetAbort(nullptr);
+    phone_.transport().SetForgotten({});
+  }
+  RequestScope(const RequestScope&) = delete;
+  RequestScope& operator=(const RequestScope&) = delete;
 
  private:
-  // Through a phone server there is no transport of ours.
-  void Set(const std::atomic<bool>* abort) {
-    if (!phone_.server_mode()) phone_.transport().SetAbort(abort);
-  }
-
   Diag_FTM& phone_;
 };
 
@@ -91,8 +95,7 @@ bool IsWithinLimit(Diag_FTM& phone) {
 }
 
 Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own) {
-  NoteLateReplies(phone);
-  const AbortScope scope(phone);
+  const RequestScope scope(phone);
   const Reply synchronised =
       phone.Synchronise(time_out_ms, [&](std::span<const u8> late) { NoteLateReply(phone, late); });
   if (!synchronised) {
@@ -112,7 +115,10 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     own_or_noted(reply.bytes());
     const u32 elapsed = phone.clock().TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
+    const Reply other(reply.kind(), reply.code(), {});
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own_or_noted);
+    // Where nothing more comes, that was the answer.
+    if (reply.kind() == ReplyKind::kNone) Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
   }
   if (reply.kind() == ReplyKind::kAborted) phone.efs().gave_up = true;
   return reply;

@@ -12,7 +12,6 @@ namespace {
 // How long the answers to tries that were given up are waited for once the line is free: the handset answers in order,
 // so they come at once or never.
 constexpr std::chrono::milliseconds kLateAnswer{80};
-constexpr uint32_t kSettleMs = 20;    // a bound for what takes microseconds on a machine that is not busy
 constexpr int kMostLateReplies = 64;  // a handset that never stops talking is not listened to for ever
 
 struct Kind {
@@ -23,10 +22,6 @@ constexpr Kind kKinds[] = {
     {kOpen.header.command, &EfsSettings::files},
     {kOpenDirectory.header.command, &EfsSettings::directories},
 };
-
-bool IsAwaited(const EfsSettings& settings) {
-  return settings.files.unanswered + settings.directories.unanswered > 0;
-}
 
 }  // namespace
 
@@ -46,16 +41,6 @@ void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply) {
     if (opened->error == kDone && handles.in_use == opened->value) return;  // an answer that came twice
     --handles.unanswered;
     if (opened->error == kDone) handles.strays.push_back(opened->value);
-  }
-}
-
-void NoteLateReplies(Diag_FTM& phone) {
-  // What has been read and is on its way to the queue would be thrown away as well.
-  if (IsAwaited(phone.efs()) && !phone.server_mode()) phone.dispatcher().WaitUntilDispatched(kSettleMs);
-  while (IsAwaited(phone.efs())) {
-    const auto record = phone.responses().Pop();
-    if (!record) return;
-    NoteLateReply(phone, *record);
   }
 }
 

@@ -16,8 +16,6 @@ std::optional<Opened> ReadOpened(std::span<const u8> reply);
 
 // Looks at a reply that was not waited for.
 void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply);
-// Looks at the replies that have come since the last request, which the next one would throw away.
-void NoteLateReplies(Diag_FTM& phone);
 // Waits a moment for the answers to so many opening requests that were given up. False (logged) when not all came.
 bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count);
 

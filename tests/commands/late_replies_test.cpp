@@ -50,6 +50,26 @@ TEST_F(LateReplies, ThatRepeatTheirRequestArePassedOver) {
                         handset().faults().Add(handset::Refuse(handset::Refusal::kBadParameter), When::Always());
                         EXPECT_EQ(KRAL_DIAG_NV_WRITE_F(handle(), 103, seven.data(), 2, &status), 0);
                       });
+  // The same item with another value, and batches of other items.
+  const auto refuse = [&] { handset().faults().Add(handset::Refuse(handset::Refusal::kBadParameter), When::Always()); };
+  AskBehindALateReply([&] { return KRAL_DIAG_NV_WRITE_F(handle(), 104, seven.data(), 2, &status); },
+                      [&] {
+                        refuse();
+                        EXPECT_EQ(KRAL_DIAG_NV_WRITE_F(handle(), 104, eight.data(), 2, &status), 0);
+                      });
+  const auto write_batch = [&](uint16_t item) {
+    uint8_t last = 0;
+    KRAL_DIAG_NV_WRITE_SetBatchMode(handle(), 1);
+    KRAL_DIAG_NV_WRITE_F(handle(), item, seven.data(), 2, &status);
+    const uint8_t written = KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle(), nullptr, nullptr, &last);
+    KRAL_DIAG_NV_WRITE_SetBatchMode(handle(), 0);
+    return written;
+  };
+  AskBehindALateReply([&] { return write_batch(105); },
+                      [&] {
+                        refuse();
+                        EXPECT_EQ(write_batch(106), 0);
+                      });
   AskBehindALateReply([&] { return KRAL_DIAG_MEMORY_PEEK_F(handle(), 0x1000, 2, data.data()); },
                       [&] {
                         EXPECT_EQ(KRAL_DIAG_MEMORY_PEEK_F(handle(), 0x2000, 2, data.data()), 1);
@@ -78,6 +98,17 @@ TEST_F(LateReplies, ThatRepeatNothingNeedTheLoopback) {
     EXPECT_EQ(read(), 1);
     EXPECT_EQ(switches, 0x2222);
   });
+  // A request that the loopback keeps back leaves the caller's size alone.
+  handset().faults().Clear();
+  handset().faults().Add(handset::Lose(), When::Nth(1));
+  handset().faults().Add(handset::WrongCode(77), When::From(2));
+  KRAL_ConfigureTimeOut(handle(), 0, kShortMs);
+  EXPECT_EQ(read(), 0);
+  const uint8_t version = 0;
+  std::array<uint8_t, 4> room{};
+  uint16_t size = room.size();
+  EXPECT_EQ(KRAL_SendSync(handle(), 1, &version, &size, room.data(), kShortMs), 0);
+  EXPECT_EQ(size, room.size());
   // A silent handset costs one time-out, not one for the loopback and one for the request.
   handset().faults().Clear();
   handset().faults().Add(handset::Ignore(), When::Always());

@@ -62,6 +62,7 @@ TEST(ImageFailures, NameFileAndLine) {
   const auto endless = folder.Add("endless.hex", ":020000040002F8\n:0100000055AA\n");
   const auto far = folder.Add(
       "far.hex", ":020000040002F8\n:0100000055AA\n" + test::HexRecord("02000004F000") + test::HexRecord("0100000055"));
+  const auto glued = folder.Add("glued.hex", ":020000040002F8\n:0100000055AA:0100010055A9\n:00000001FF\n");
   const auto two = folder.Add("two.hex", test::kTwoRegionsHex);
   const auto binary = folder.Add("image.bin", std::string(0x10001, 'x'));
   const auto empty = folder.Add("empty.bin", "");
@@ -93,6 +94,7 @@ TEST(ImageFailures, NameFileAndLine) {
              {"KRAL_IMAGE_GetInfo", info(endless), {KRAL_ERROR_BAD_FILE, "no end-of-file record", 0, 0, 2}},
              {"KRAL_IMAGE_GetInfo", info(far), {KRAL_ERROR_BAD_FILE, "lie outside of the image", 0, 0, 4}},
              {"KRAL_IMAGE_GetInfo", info(empty, KRAL_IMAGE_FORMAT_HEX), {KRAL_ERROR_BAD_FILE, "no Intel HEX record"}},
+             {"KRAL_IMAGE_GetInfo", info(glued), {KRAL_ERROR_BAD_FILE, "have no place in the image", 0, 0, 2}},
              {"KRAL_IMAGE_GetInfo", info(dropped), {KRAL_ERROR_BAD_FILE, "have no place in the image", 0, 0, 1}},
              {"KRAL_HEX_FindLoss",
               [&] { return KRAL_HEX_FindLoss(broken.c_str(), &line, nullptr, nullptr); },

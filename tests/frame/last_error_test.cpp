@@ -1,6 +1,7 @@
 // Why a call failed: every way to fail leaves a record that is right.
 #include <thread>
 
+#include "base/time_outs.h"
 #include "frame/resource_manager.h"
 #include "handset/line/faults.h"
 #include "kral/kral.h"
@@ -155,11 +156,36 @@ TEST_F(LastError, NamesWhatWasWrong) {
        KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 19, "75/11/1"},
       {"target", [&] { handset().faults().Add(handset::Ignore(), When::Always()); },
        [&] { return KRAL_IsFTM_Mode(h, &flag); }, "KRAL_IsFTM_Mode", KRAL_ERROR_NO_ANSWER, 0, 0, "75/15/0"},
+      {"a mode that is refused", [&] { handset().faults().Add(handset::Refuse(24), When::Always().Of("29")); },
+       [&] { return KRAL_DIAG_CONTROL_F(h, 3); }, "KRAL_DIAG_CONTROL_F", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL,
+       24, "command 41"},
+      {"a boot mode that is refused",
+       [&] {
+         handset().faults().Add(handset::Refuse(20), When::Always().Of("27"));
+         handset().faults().Add(handset::Ignore(), When::From(2).Of("29"));
+       },
+       [&] { return KRAL_ChangeFTM_BootMode(h, 1, 1); }, "KRAL_ChangeFTM_BootMode", KRAL_ERROR_REFUSED,
+       KRAL_ERROR_STATUS_REFUSAL, 20, "command 39"},
+      {"a packet mode that is refused", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
+       [&] { return KRAL_SetPacketMode(h, 1); }, "KRAL_SetPacketMode", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL,
+       19, "command 68"},
+      {"another reply to an EFS2 request", [&] { handset().faults().Add(handset::WrongCode(77), When::Always()); },
+       [&] { return KRAL_EfsMkDir(h, "/x", nullptr); }, "KRAL_EfsMkDir", KRAL_ERROR_LINK, KRAL_ERROR_STATUS_REPLY, 77,
+       "75/19"},
+      {"no capture",
+       {},
+       [&] { return KRAL_StopCapture(h); },
+       "KRAL_StopCapture",
+       KRAL_ERROR_ARGUMENT,
+       0,
+       0,
+       "no capture is running"},
   };
   for (const auto& row : kRows) {
     SCOPED_TRACE(row.what);
     handset().faults().Clear();
     KRAL_ConfigureTimeOut(h, 0, 40);
+    KRAL_ConfigureTimeOut(h, kTimeOutModeReadBack, 40);
     if (row.setup) row.setup();
     EXPECT_EQ(row.call(), 0u);
     const KRAL_ERROR error = Record(h);
@@ -170,6 +196,8 @@ TEST_F(LastError, NamesWhatWasWrong) {
     EXPECT_NE(std::string_view(error.text).find(row.text), std::string_view::npos) << error.text;
   }
   // Functions without a handle, and connects.
+  EXPECT_EQ(KRAL_Band_Helper_GetBandName(60000, name.data(), 8), 0);
+  EXPECT_STREQ(Record(0).function, "KRAL_Band_Helper_GetBandName");
   EXPECT_EQ(KRAL_FTM_GetCommandInfo(0, nullptr, name.data(), 1), 0);
   EXPECT_STREQ(Record(0).function, "KRAL_FTM_GetCommandInfo");
   EXPECT_EQ(KRAL_ConnectServer_LogicalPort(4711), 0u);
@@ -201,6 +229,8 @@ TEST_F(LastError, PortThatDoesNotOpenIsToldByTheHandleOfTheConnect) {
   EXPECT_STREQ(Record(busy).text, "COM9 is in use by another program");
   EXPECT_EQ(KRAL_ConnectServerWithVerify(9), 0u);
   EXPECT_STREQ(Record(0).function, "KRAL_ConnectServerWithVerify");
+  EXPECT_EQ(KRAL_ConnectServerWithWait(10, 1), 0u);
+  EXPECT_EQ(Record(0).code, uint32_t{KRAL_ERROR_PORT_IN_USE}) << "and nothing of what the clean-up met with";
   KRAL_DisconnectServer(busy);
   KRAL_DisconnectServer(busy);
   Kral_ResourceManager::SetDeviceOpener({});

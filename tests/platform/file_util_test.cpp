@@ -61,6 +61,24 @@ TEST(FileReaderTest, ReadsOrdinaryFilesToTheirEndAndOpensNothingElse) {
   EXPECT_EQ(count, 0u);
 }
 
+TEST(OpenToWriteTextTest, EmptiesNothingThatIsBeingWrittenOrRead) {
+  const test::TempFolder folder;
+  const std::string path = folder.Add("file", "abc");
+  const auto close = [](std::FILE* stream) { CloseStream(stream); };
+  using Stream = std::unique_ptr<std::FILE, decltype(close)>;
+  for (const bool reads : {true, false}) {
+    const Stream held(reads ? OpenToRead(path) : OpenToWrite(path), close);
+    ASSERT_TRUE(held);
+    if (!reads) std::fputs("abc", held.get());
+    std::fflush(held.get());
+    EXPECT_EQ(OpenToWriteText(path), nullptr);
+    EXPECT_EQ(std::filesystem::file_size(path), 3u);
+  }
+  const Stream one(OpenToWriteText(path), close);
+  const Stream two(OpenToWriteText(path), close);
+  EXPECT_TRUE(one && two) << "text logs may share a file";
+}
+
 TEST(ReadWholeFileTest, AMissingFileIsNoSuchFile) {
   const test::TempFolder folder;
   Bytes bytes;

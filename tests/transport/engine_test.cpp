@@ -275,24 +275,47 @@ TEST_F(Engine, FlushDropsThePartialPacket) {
 TEST_F(Engine, WhatBrokeOffBelongsToTheConnectionThatHasEnded) {
   engine_->sorter.SetCollection(true);
   const auto open = [this](bool callers) { callers ? OpenUser() : Open(); };
-  for (const bool callers : {false, true}) {
+  // A caller's transport stays open after a time-out.
+  enum class End { kTimeOut, kStop, kTimeOutOfCallers };
+  for (const End end : {End::kTimeOut, End::kStop, End::kTimeOutOfCallers}) {
+    const bool callers = end != End::kTimeOut;
     for (const Bytes& frame : {PlainFrame({75, 1, 2}), PlainFrame({16, 1, 2, 3}), Bytes{0x7D, 0x7D}}) {
       open(callers);
       wire_.OnWrite({});
       const uint64_t before = engine_->transport.counters().bytes_received;
       wire_.ToHost(Bytes(frame.begin(), frame.end() - 1));
       ASSERT_TRUE(Eventually([&] { return engine_->transport.counters().bytes_received > before; }));
-      if (callers) {
+      if (end == End::kStop) {
         ASSERT_TRUE(engine_->transport.StopThread());
       } else {
         ASSERT_FALSE(Ask({75}, 16, kShort).succeeded);
       }
-      open(callers);
+      if (end != End::kTimeOutOfCallers) open(callers);
       AnswerWith({75, 1});
       EXPECT_TRUE(Ask({75}, 16, kBusy).succeeded) << HexDump(frame);
       EXPECT_EQ(engine_->asynchronous.size(), 0u) << "half a packet, and a reply for its other half";
     }
   }
+}
+
+TEST_F(Engine, ShowsWhatARequestDropsAndTellsDamageFromSilence) {
+  Open();
+  engine_->responses.Push(Bytes{75, 19, 2, 0});
+  std::vector<Packet> dropped;
+  engine_->transport.SetForgotten(
+      [&](std::span<const uint8_t> late) { dropped.emplace_back(late.begin(), late.end()); });
+  // Damaged while the request is still being written.
+  wire_.OnWrite([this](const Bytes&) {
+    Bytes bad = PlainFrame({75, 3});
+    bad[1] ^= 1;
+    const uint64_t before = engine_->transport.counters().bad_fcs;
+    wire_.ToHost(bad);
+    EXPECT_TRUE(Eventually([&] { return engine_->transport.counters().bad_fcs > before; }));
+    return Bytes();
+  });
+  Bytes room(16);
+  EXPECT_EQ(engine_->transport.SendSync(Bytes{75}, room, 75, kShort, 0).kind(), ReplyKind::kGarbled);
+  EXPECT_EQ(dropped, (std::vector<Packet>{{75, 19, 2, 0}}));
 }
 
 TEST_F(Engine, CountsWhatCameAndWhatWasLost) {

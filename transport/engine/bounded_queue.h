@@ -110,12 +110,14 @@ class BoundedQueue {
     told_interrupts_ = interrupts_;
   }
 
-  void Clear() {
-    std::deque<Record> doomed;
+  std::deque<Record> TakeAll() {
+    std::deque<Record> all;
     Publish();
     const std::lock_guard lock(mutex_);
-    doomed.swap(records_);
+    all.swap(records_);
+    return all;
   }
+  void Clear() { TakeAll(); }
 
   size_t size() const {
     const std::lock_guard lock(mutex_);

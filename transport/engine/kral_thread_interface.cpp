@@ -92,7 +92,10 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
 
 // A second connect with the same functions leaves the thread alone: it may sit in the caller's receive function.
 bool CKralThreadInterface::BindUserTransport(const UserTransport& user) {
-  if (port_.IsOpen() != 0 && port_.user_defined() && IsSame(bound_, user)) return true;
+  if (port_.IsOpen() != 0 && port_.user_defined() && IsSame(bound_, user)) {
+    splitter_.DropPartialPacket();
+    return true;
+  }
   if (!QuietThread()) return false;
   BeginTraffic();
   bound_ = user;

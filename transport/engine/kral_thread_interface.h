@@ -2,12 +2,15 @@
 #ifndef KRAL_TRANSPORT_ENGINE_KRAL_THREAD_INTERFACE_H
 #define KRAL_TRANSPORT_ENGINE_KRAL_THREAD_INTERFACE_H
 
+#include <array>
 #include <atomic>
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <span>
+#include <utility>
 #include <vector>
 
 #include "base/worker_thread.h"
@@ -76,6 +79,8 @@ class CKralThreadInterface {
   // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
   // handset that is only slow may answer for a moment still. The port stays open.
   void SetAbort(const std::atomic<bool>* abort) { abort_ = abort; }
+  // Is given what comes between two requests and is dropped, FCS bytes included; empty: nobody.
+  void SetForgotten(std::function<void(std::span<const uint8_t>)> forgotten) { forgotten_ = std::move(forgotten); }
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
   Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
   // Awaits no reply: expected means written.
@@ -84,7 +89,10 @@ class CKralThreadInterface {
   // Empties the response queue of what was read before this call; every synchronous request begins with it.
   void ForgetReplies();
 
-  bool SetPacketMode(uint32_t mode);
+  // Where the handset must agree, what became of the request; one that was answered with anything but yes is kOther.
+  Reply SetPacketMode(uint32_t mode);
+  static constexpr std::array<uint8_t, 1> kUnframedModeRequest{68};
+  static constexpr uint32_t kUnframedModeMs = 80;
   // Whether that change is the handset's as well as ours.
   bool NeedsPhoneFor(uint32_t mode) const;
   PacketMode packet_mode() const { return splitter_.mode(); }
@@ -126,10 +134,10 @@ class CKralThreadInterface {
   std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);
   Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
   ReplyKind WhyNotWritten() const;
-  ReplyKind WhyNoReply(uint64_t garbled_before) const;
+  ReplyKind WhyNoReply() const;
   void TimedOut(std::span<const uint8_t> request);
-  bool AskForUnframedMode();
-  bool ReturnToFramedMode();
+  Reply AskForUnframedMode();
+  Reply ReturnToFramedMode();
 
   void LogWritten(uint32_t time_out_ms, uint32_t start);
 
@@ -140,7 +148,9 @@ class CKralThreadInterface {
   std::atomic<bool> connected_{false};
   std::atomic<bool> null_port_{false};
   std::atomic<bool> waits_ended_{false};      // since the port was opened
-  const std::atomic<bool>* abort_ = nullptr;  // of whoever holds the request lock
+  const std::atomic<bool>* abort_ = nullptr;  // both of whoever holds the request lock
+  std::function<void(std::span<const uint8_t>)> forgotten_;
+  uint64_t garbled_before_ = 0;  // the request that was sent last
   bool user_defined_ = false;
   bool paused_ = false;
   std::vector<uint8_t> timed_out_request_;

@@ -11,13 +11,9 @@
 namespace kral {
 namespace {
 
-constexpr size_t kFcsBytes = 2;  // at the end of every record of the response queue
-
 // A bound for what takes microseconds, unless a listener or a log callback holds the threads up.
 constexpr uint32_t kSettleMs = 20;
 
-constexpr uint8_t kUnframedModeRequest = 68;
-constexpr uint32_t kUnframedModeMs = 80;
 constexpr uint8_t kTry115200 = 0x04;
 
 bool IsUnframed(PacketMode mode) {
@@ -32,7 +28,7 @@ bool BeginsWithAt(std::span<const uint8_t> request) {
 std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> room) {
   const size_t count = std::min(record.size(), room.size());
   std::copy_n(record.begin(), count, room.begin());
-  const size_t length = record.size() > kFcsBytes ? record.size() - kFcsBytes : 0;
+  const size_t length = record.size() > kFcsSize ? record.size() - kFcsSize : 0;
   return room.first(std::min(length, count));
 }
 
@@ -79,17 +75,19 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
 void CKralThreadInterface::ForgetReplies() {
   loop_.WaitForChunk(kSettleMs);
   if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
-  responses_->Clear();
+  for (const Packet& record : responses_->TakeAll()) {
+    if (forgotten_) forgotten_(record);
+  }
+  garbled_before_ = splitter_.deframer().bad_fcs();
 }
 
 Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
                                       const ReplyTest& is_own) {
   const uint32_t start = clock_.TickMs();
-  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (uint32_t waited = 0;; waited = clock_.TickMs() - start) {
-    if (waited > 0 && waited >= time_out_ms) return WhyNoReply(garbled_before);  // nothing but earlier replies
+    if (waited > 0 && waited >= time_out_ms) return WhyNoReply();  // nothing but earlier replies
     const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
-    if (!record || record->empty()) return WhyNoReply(garbled_before);
+    if (!record || record->empty()) return WhyNoReply();
     const auto bytes = CopyRecord(*record, room);
     if (record->front() != expected_code) {
       // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
@@ -113,10 +111,10 @@ ReplyKind CKralThreadInterface::WhyNotWritten() const {
   return port_.gone() ? ReplyKind::kGone : ReplyKind::kWriteFailed;
 }
 
-ReplyKind CKralThreadInterface::WhyNoReply(uint64_t garbled_before) const {
+ReplyKind CKralThreadInterface::WhyNoReply() const {
   if (port_.gone()) return ReplyKind::kGone;
   if (abort_ != nullptr && *abort_) return ReplyKind::kAborted;
-  return splitter_.deframer().bad_fcs() != garbled_before ? ReplyKind::kGarbled : ReplyKind::kNone;
+  return splitter_.deframer().bad_fcs() != garbled_before_ ? ReplyKind::kGarbled : ReplyKind::kNone;
 }
 
 // A handset that does not answer is given up: the next request finds the port closed and opens it afresh.
@@ -124,6 +122,8 @@ void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
   timed_out_request_.assign(request.begin(), request.end());
   log_.WriteLine(kLogErr, "Request timed out");
   Close();
+  splitter_
+      .DropPartialPacket();  // a caller's transport stays open: what broke off belongs to what has ended all the same
 }
 
 Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
@@ -151,7 +151,6 @@ Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<
 
 Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_out_ms) {
   const uint32_t start = clock_.TickMs();
-  const uint64_t garbled_before = splitter_.deframer().bad_fcs();
   for (;;) {
     const bool ended = responses_->closed();
     if (const auto record = responses_->Pop()) {
@@ -160,7 +159,7 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
       log_.WriteLine(kLogRet, "READ STACK TIME (ms):\t%d", static_cast<int>(clock_.TickMs() - start));
       return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
     }
-    if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply(garbled_before);
+    if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply();
     clock_.SleepMs(1);
   }
 }
@@ -188,16 +187,19 @@ bool CKralThreadInterface::Transmit(std::span<const uint8_t> request, uint32_t t
   return false;
 }
 
-bool CKralThreadInterface::SetPacketMode(uint32_t mode) {
+Reply CKralThreadInterface::SetPacketMode(uint32_t mode) {
   if (mode > static_cast<uint32_t>(PacketMode::kLengthPrefixed)) {
     log_.WriteLine(kLogErr, "KRAL_SetPacketMode() -  Error, Invalid packet mode");
-    return false;
+    return ReplyKind::kNotSent;
   }
-  if (NeedsPhoneFor(mode) && !(mode == 0 ? ReturnToFramedMode() : AskForUnframedMode())) return false;
+  if (NeedsPhoneFor(mode)) {
+    const Reply reply = mode == 0 ? ReturnToFramedMode() : AskForUnframedMode();
+    if (!reply) return reply;
+  }
   framer_.SetRawDataFlag(mode);
   splitter_.SetMode(static_cast<PacketMode>(mode));
   log_.WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
-  return true;
+  return ReplyKind::kExpected;
 }
 
 // Only between the framed and the first unframed mode.
@@ -208,23 +210,23 @@ bool CKralThreadInterface::NeedsPhoneFor(uint32_t mode) const {
          (from == PacketMode::kUnframed1 && to == PacketMode::kFramed);
 }
 
-bool CKralThreadInterface::AskForUnframedMode() {
+Reply CKralThreadInterface::AskForUnframedMode() {
   std::array<uint8_t, kMaximumPacket> room;
-  const uint8_t request = kUnframedModeRequest;
-  const Reply reply = SendSync({&request, 1}, room, request, kUnframedModeMs, 0);
-  return reply && reply.bytes().size() >= 2 && reply.bytes()[1] == 1;
+  const Reply reply = SendSync(kUnframedModeRequest, room, kUnframedModeRequest[0], kUnframedModeMs, 0);
+  const bool agreed = reply.bytes().size() >= 2 && reply.bytes()[1] == 1;
+  return {reply && !agreed ? ReplyKind::kOther : reply.kind(), reply.code(), {}};
 }
 
 // The framer reads the handset's answer itself, so the receive thread must not.
-bool CKralThreadInterface::ReturnToFramedMode() {
+Reply CKralThreadInterface::ReturnToFramedMode() {
   const bool was_paused = paused_;
   if (!PauseThread()) {
     ResumeThread();
-    return false;
+    return ReplyKind::kNotSent;
   }
   const bool switched = framer_.Data2DM(kTry115200) == 1;
   if (!was_paused) ResumeThread();
-  return switched;
+  return switched ? ReplyKind::kExpected : ReplyKind::kNone;
 }
 
 bool CKralThreadInterface::FlushRxBuffer() {
