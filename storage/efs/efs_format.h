@@ -71,6 +71,7 @@ inline constexpr u32 kFirstEntry = 1;
 
 inline constexpr u32 kDone = 0;
 inline constexpr u32 kMissing = 2;
+inline constexpr u32 kNoRoom = 28;
 inline constexpr u32 kExists = 6;
 inline constexpr u32 kBadDescriptor = 9;
 

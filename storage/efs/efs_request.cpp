@@ -27,7 +27,7 @@ constexpr KnownError kErrors[] = {
     {22, "the handset finds something invalid about"},
     {24, "too many files are open for"},
     {27, "too large for the handset:"},
-    {28, "no room on the handset for"},
+    {kNoRoom, "no room on the handset for"},
     {36, "a name is too long in"},
     {39, "the folder is not empty:"},
     {40, "too many links in"},

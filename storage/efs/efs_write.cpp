@@ -31,8 +31,10 @@ bool HasRoom(Diag_FTM& phone, u32 size) {
   if (size <= available) return true;
   phone.log().WriteLine(kLogErr, "Available size on local disk is insufficient.  tot_data_size = %u,  availSpace=%lld",
                         size, static_cast<long long>(available));
+  // The number that the handset itself would come to later.
   return Fail(Failure(KRAL_ERROR_REFUSED, "no room on the handset for %u bytes: %llu are free", size,
-                      static_cast<unsigned long long>(available)));
+                      static_cast<unsigned long long>(available))
+                  .Status(KRAL_ERROR_STATUS_EFS, kNoRoom));
 }
 
 // Tried like every packet of a transfer, also after an abort.

@@ -71,4 +71,16 @@ Failure ToolFailure(NvError error, const std::string& what) {
   return Failure(ClassOf(error), "%s", what.c_str()).Status(KRAL_ERROR_STATUS_RESULT, static_cast<uint32_t>(error));
 }
 
+NvError Told(NvError error, const std::string& what) {
+  Fail(ToolFailure(error, what));
+  return error;
+}
+
+NvError NotWritten(NvError error, const std::string& file, const std::error_code& system) {
+  Fail(FileFailure(file, "cannot be written")
+           .System(system)
+           .Status(KRAL_ERROR_STATUS_RESULT, static_cast<uint32_t>(error)));
+  return error;
+}
+
 }  // namespace kral::nv

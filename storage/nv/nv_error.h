@@ -43,6 +43,10 @@ const char* TextOf(uint32_t code);
 Failure ToolFailure(NvError error);
 // The same where more is known: `what` names it.
 Failure ToolFailure(NvError error, const std::string& what);
+// Notes it, and gives the code again.
+NvError Told(NvError error, const std::string& what);
+// A file that cannot be written, and what the system says.
+NvError NotWritten(NvError error, const std::string& file, const std::error_code& system);
 
 }  // namespace kral::nv
 

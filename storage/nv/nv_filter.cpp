@@ -137,7 +137,8 @@ NvError SaveFilter(const std::string& path, std::span<const NvItem* const> items
   }
   text += "</NvFilter>\n";
   const std::vector<uint8_t> bytes(text.begin(), text.end());
-  return ReplaceWholeFile(path, bytes) ? NvError::kCannotOpenFilter : NvError::kNone;
+  const std::error_code error = ReplaceWholeFile(path, bytes);
+  return error ? NotWritten(NvError::kCannotOpenFilter, path, error) : NvError::kNone;
 }
 
 }  // namespace kral::nv

@@ -122,9 +122,11 @@ std::string SourceText(const NvSource& source) {
 NvError SaveSource(const std::string& path, const NvSource& source) {
   const std::string text = SourceText(source);
   AtomicFile file;
-  if (file.Open(path)) return NvError::kCannotOpenSource;
+  if (const auto error = file.Open(path)) return NotWritten(NvError::kCannotOpenSource, path, error);
   const std::vector<uint8_t> bytes(text.begin(), text.end());
-  return file.Write(bytes) || file.Commit() ? NvError::kCannotSaveSource : NvError::kNone;
+  std::error_code error = file.Write(bytes);
+  if (!error) error = file.Commit();
+  return error ? NotWritten(NvError::kCannotSaveSource, path, error) : NvError::kNone;
 }
 
 }  // namespace kral::nv

@@ -9,6 +9,14 @@
 #include "storage/nv/nv_value.h"
 
 namespace kral::nv {
+namespace {
+
+NvError NoSuchElement(const NvItem& item, uint16_t element) {
+  return Told(NvError::kIndexOutOfBound, item.Title() + ": element " + std::to_string(element) +
+                                             " is not one of 0 to " + std::to_string(item.max_index));
+}
+
+}  // namespace
 
 void NVTool_Manager::Walk::Report(const std::string& title, NvError error) {
   ++done_;
@@ -82,15 +90,15 @@ NvSlot NVTool_Manager::SlotOf(const NvItem& item, uint16_t element) const {
 }
 
 NvError NVTool_Manager::GetValue(const NvItem& item, uint16_t element, const NvBytes*& value) const {
-  if (element > item.max_index) return NvError::kIndexOutOfBound;
+  if (element > item.max_index) return NoSuchElement(item, element);
   const auto found = item.values.find(SlotOf(item, element));
-  if (found == item.values.end()) return NvError::kNoValue;
+  if (found == item.values.end()) return Told(NvError::kNoValue, item.Title() + " has no value");
   value = &found->second;
   return NvError::kNone;
 }
 
 NvError NVTool_Manager::SetBytes(Diag_FTM& phone, NvItem& item, uint16_t element, std::span<const uint8_t> value) {
-  if (element > item.max_index) return NvError::kIndexOutOfBound;
+  if (element > item.max_index) return NoSuchElement(item, element);
   if (!item.type->Holds(value)) {
     phone.log().WriteLine(kLogErr, "%s: %d bytes are no value of its type", item.Title().c_str(),
                           static_cast<int>(value.size()));
@@ -102,7 +110,7 @@ NvError NVTool_Manager::SetBytes(Diag_FTM& phone, NvItem& item, uint16_t element
 }
 
 NvError NVTool_Manager::SetText(Diag_FTM& phone, NvItem& item, uint16_t element, std::string_view text) {
-  if (element > item.max_index) return NvError::kIndexOutOfBound;
+  if (element > item.max_index) return NoSuchElement(item, element);
   std::string problem;
   auto value = item.type->FromText(text, problem);
   if (!value) {
@@ -185,7 +193,8 @@ NvError NVTool_Manager::CreateFilter(const std::string& file, bool with_value) {
                                        [&](const auto& value) { return value.first.subscription == subscription; });
     if (has_value == with_value) items.push_back(&item);
   });
-  return items.empty() ? NvError::kNoValue : SaveFilter(file, items);
+  if (!items.empty()) return SaveFilter(file, items);
+  return Told(NvError::kNoValue, with_value ? "no item has a value" : "there is no item without a value");
 }
 
 // --- Subscriptions ---------------------------------------------------------------------------------------------------
@@ -196,7 +205,10 @@ void NVTool_Manager::SetMultiSim(bool supported) {
 }
 
 NvError NVTool_Manager::SetSubscription(uint16_t subscription) {
-  if (subscription != 0 && !multi_sim_) return NvError::kIndexOutOfBound;
+  if (subscription != 0 && !multi_sim_) {
+    return Told(NvError::kIndexOutOfBound,
+                "there is no subscription " + std::to_string(subscription) + ": the handset has one only");
+  }
   subscription_ = subscription;
   return NvError::kNone;
 }

@@ -90,7 +90,8 @@ class NVTool_Manager final : public FamilyObject {
 
   struct PkvArrays;
   NvItem* ItemOfPkv(Diag_FTM& phone, const pkv::PkvNvItem& entry, const PkvArrays& arrays);
-  NvError TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored);
+  NvError TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored,
+                     uint32_t failure);  // the KRAL_ERROR_ code of bytes that do not fit
   NvError TakeFile(Diag_FTM& phone, const pkv::PkvEfsFile& entry);
   // The highest index of the id in the source file makes an item that nobody defined an array.
   NvError TakeSource(Diag_FTM& phone, const NvSourceItem& entry, uint16_t highest_index);

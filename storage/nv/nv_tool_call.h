@@ -26,9 +26,11 @@ uint32_t OnTool(KRAL_HANDLE handle, const char* function, Operation&& operation)
           .Result(NvError::kNoConnection, NvError::kUnknown, NvError::kNone, [&](Diag_FTM& phone) {
             const auto tool = Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, FamilySlot::kNvManager, MakeTool);
             const std::lock_guard lock(phone.request_lock());
-            const NvError told = !tool               ? NvError::kNoConnection
-                                 : tool->is_moving() ? NvError::kUnknown
-                                                     : operation(*tool, phone);
+            if (tool && tool->is_moving()) {
+              Fail(Failure(KRAL_ERROR_ARGUMENT, "the NV tool is moving a set, and takes no calls from its callback"));
+              return NvError::kUnknown;
+            }
+            const NvError told = tool ? operation(*tool, phone) : NvError::kNoConnection;
             if (told != NvError::kNone && !IsFailureNoted()) Fail(ToolFailure(told));
             return told;
           });
@@ -52,17 +54,21 @@ struct AtIndex {
 
 inline NvError Find(NVTool_Manager& tool, AtIndex at, NvItem*& item) {
   item = tool.definitions().At(at.index);
-  return item == nullptr ? NvError::kIndexOutOfBound : NvError::kNone;
+  if (item != nullptr) return NvError::kNone;
+  return Told(NvError::kIndexOutOfBound, "there is no item with index " + std::to_string(at.index) + ": " +
+                                             std::to_string(tool.definitions().count()) + " are defined");
 }
 
 inline NvError Find(NVTool_Manager& tool, uint16_t id, NvItem*& item) {
   item = tool.definitions().Find(id);
-  return item == nullptr ? NvError::kNotDefined : NvError::kNone;
+  if (item != nullptr) return NvError::kNone;
+  return Told(NvError::kNotDefined, "NV item " + std::to_string(id) + " is not defined");
 }
 
 inline NvError Find(NVTool_Manager& tool, const char* path, NvItem*& item) {
   item = tool.definitions().Find(TextOrEmpty(path));
-  return item == nullptr ? NvError::kNotDefined : NvError::kNone;
+  if (item != nullptr) return NvError::kNone;
+  return Told(NvError::kNotDefined, "the item file " + std::string(TextOrEmpty(path)) + " is not defined");
 }
 
 // Runs operation(tool, phone, item).

@@ -18,7 +18,11 @@ namespace {
 // --- Texts handed out ------------------------------------------------------------------------------------------------
 
 NvError Give(std::string_view result, char* text, uint32_t size) {
-  if (text == nullptr || result.size() >= size) return NvError::kCannotGetValue;
+  if (text == nullptr) return Told(NvError::kCannotGetValue, "there is no buffer for the text");
+  if (result.size() >= size) {
+    return Told(NvError::kCannotGetValue, "the text of " + std::to_string(result.size() + 1) +
+                                              " bytes does not fit into " + std::to_string(size));
+  }
   *std::copy(result.begin(), result.end(), text) = '\0';
   return NvError::kNone;
 }
@@ -58,7 +62,8 @@ template <class Target>
 uint32_t GiveType(KRAL_HANDLE handle, const char* name, const char* type_name, Target target) {
   return OnTool(handle, name, [&](NVTool_Manager& tool, Diag_FTM&) {
     const auto type = tool.definitions().FindType(TextOrEmpty(type_name));
-    return type == nullptr ? NvError::kNotDefined : target.Take(DataTypeText(*type));
+    if (type != nullptr) return target.Take(DataTypeText(*type));
+    return Told(NvError::kNotDefined, "the data type " + std::string(TextOrEmpty(type_name)) + " is not defined");
   });
 }
 
@@ -83,10 +88,13 @@ uint32_t GetBytes(KRAL_HANDLE handle, const char* name, Key key, uint16_t elemen
   return OnItem(handle, name, key, [&](NVTool_Manager& tool, Diag_FTM&, NvItem& item) {
     const NvBytes* value = nullptr;
     if (const NvError error = tool.GetValue(item, element, value); error != NvError::kNone) return error;
-    if (size == nullptr) return NvError::kCannotGetValue;
+    if (size == nullptr) return Told(NvError::kCannotGetValue, "there is no size of the buffer");
     const uint32_t room = data == nullptr ? 0 : *size;
     *size = static_cast<uint32_t>(value->size());
-    if (value->size() > room) return NvError::kCannotGetValue;
+    if (value->size() > room) {
+      return Told(NvError::kCannotGetValue, item.Title() + ": the value of " + std::to_string(value->size()) +
+                                                " bytes does not fit into " + std::to_string(room));
+    }
     std::copy(value->begin(), value->end(), data);
     return NvError::kNone;
   });
@@ -95,7 +103,7 @@ uint32_t GetBytes(KRAL_HANDLE handle, const char* name, Key key, uint16_t elemen
 template <class Key>
 uint32_t SetBytes(KRAL_HANDLE handle, const char* name, Key key, uint16_t element, const uint8_t* data, uint32_t size) {
   return OnItem(handle, name, key, [&](NVTool_Manager& tool, Diag_FTM& phone, NvItem& item) {
-    if (data == nullptr && size > 0) return NvError::kCannotSetValue;
+    if (data == nullptr && size > 0) return Told(NvError::kCannotSetValue, "there is no buffer with the value");
     return tool.SetBytes(phone, item, element, {data, size});
   });
 }

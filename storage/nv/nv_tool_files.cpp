@@ -58,19 +58,21 @@ std::string Printable(std::string path) {
 
 NvError SaveText(const std::string& file, const std::string& text, NvError failure) {
   const std::vector<uint8_t> bytes(text.begin(), text.end());
-  return ReplaceWholeFile(file, bytes) ? failure : NvError::kNone;
+  const std::error_code error = ReplaceWholeFile(file, bytes);
+  return error ? NotWritten(failure, file, error) : NvError::kNone;
 }
 
 }  // namespace
 
 // --- PKV files -------------------------------------------------------------------------------------------------------
 
-NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored) {
+NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, std::span<const uint8_t> stored,
+                                   uint32_t failure) {
   auto value = FromStored(item, stored);
   if (!value) {
     phone.log().WriteLine(kLogErr, "%s: %d bytes are no value of its type", item.Title().c_str(),
                           static_cast<int>(stored.size()));
-    Fail(Failure(KRAL_ERROR_BAD_FILE, "%s: %zu bytes are no value of the type in its definition", item.Title().c_str(),
+    Fail(Failure(failure, "%s: %zu bytes are no value of the type in its definition", item.Title().c_str(),
                  stored.size()));
     return NvError::kCannotGetValue;
   }
@@ -121,9 +123,9 @@ NvError NVTool_Manager::LoadFromPkv(Diag_FTM& phone, const std::string& file) {
                    entry.index));
     } else {
       const size_t size = item->is_array() ? kDataSize - 1 : kDataSize;
-      error = !item->will_read
-                  ? NvError::kNone
-                  : TakeStored(phone, *item, {entry.subscription, entry.index}, std::span(entry.data).first(size));
+      error = !item->will_read ? NvError::kNone
+                               : TakeStored(phone, *item, {entry.subscription, entry.index},
+                                            std::span(entry.data).first(size), KRAL_ERROR_BAD_FILE);
     }
     walk.Report("NV ID " + std::to_string(entry.id), error);
   }
@@ -146,7 +148,7 @@ NvError NVTool_Manager::TakeFile(Diag_FTM& phone, const pkv::PkvEfsFile& entry) 
     item = &Define(phone, GenericFile(entry.path, entry.bytes.size()));
   }
   if (!item->will_read) return NvError::kNone;
-  const NvError error = TakeStored(phone, *item, {}, entry.bytes);
+  const NvError error = TakeStored(phone, *item, {}, entry.bytes, KRAL_ERROR_BAD_FILE);
   if (error == NvError::kNone) item->mode = entry.mode;
   return error;
 }
@@ -176,7 +178,7 @@ NvError NVTool_Manager::WriteToPkv(Diag_FTM& phone, const std::string& file) {
   const std::vector<NvItem*> items = Chosen(&NvItem::will_write);
   size_t total = 0;
   for (const NvItem* item : items) total += item->values.size();
-  if (total == 0) return NvError::kNoValue;
+  if (total == 0) return Told(NvError::kNoValue, "no item that the filter lets pass has a value");
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_PKV, total);
   pkv::PkvSet set;
   std::set<uint16_t> arrays;
@@ -281,7 +283,9 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
     }
   }
   source.roaming_lists = roaming_lists_;
-  if (source.items.empty() && source.roaming_lists.empty()) return NvError::kNoValue;
+  if (source.items.empty() && source.roaming_lists.empty()) {
+    return Told(NvError::kNoValue, "no item that the filter lets pass has a value");
+  }
   Walk walk(*this, KRAL_NV_OPERATION_WRITE_SOURCE, source.items.size());
   for (const NvSourceItem& entry : source.items) {
     walk.Report(entry.id ? "NV ID " + std::to_string(*entry.id) : entry.path, NvError::kNone);
@@ -289,7 +293,6 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
   const NvError error = SaveSource(file, source);
   if (error == NvError::kNone) return error;
   phone.log().WriteLine(kLogErr, "%s cannot be written", file.c_str());
-  Fail(FileFailure(file, "cannot be written"));
   return error;
 }
 
@@ -313,7 +316,8 @@ NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, co
 NvError NVTool_Manager::GenerateQdf(const std::string& file) {
   const std::string text = QdfText(definitions_);
   // An older list is worth more than an empty one.
-  return text.empty() ? NvError::kNoValue : SaveText(file, text, NvError::kCannotOpenQdf);
+  if (text.empty()) return Told(NvError::kNoValue, "no item has a value");
+  return SaveText(file, text, NvError::kCannotOpenQdf);
 }
 
 }  // namespace kral::nv

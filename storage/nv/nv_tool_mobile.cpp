@@ -67,7 +67,7 @@ NvError NVTool_Manager::ReadElement(Diag_FTM& phone, NvMobile& mobile, NvItem& i
   if (answer.kind == NvAnswer::Kind::kNoAnswer) return NvError::kNoConnection;
   status = answer.status;
   const NvSlot slot = SlotOf(item, element);
-  if (answer.done()) return TakeStored(phone, item, slot, stored);
+  if (answer.done()) return TakeStored(phone, item, slot, stored, KRAL_ERROR_LINK);
   item.values.erase(slot);
   if (status == kNeverWritten) return NvError::kNoValue;
   phone.log().WriteLine(kLogErr, "%s was refused with status %d", item.Title().c_str(), status);
@@ -115,7 +115,7 @@ NvError NVTool_Manager::ReadItem(Diag_FTM& phone, uint16_t id, uint16_t& status)
 NvError NVTool_Manager::ReadItem(Diag_FTM& phone, const std::string& path) {
   uint16_t status = 0;
   if (NvItem* item = definitions_.Find(path)) return ReadWhole(phone, *item, status);
-  if (!IsUsualPath(path)) return NvError::kNotDefined;
+  if (!IsUsualPath(path)) return Told(NvError::kNotDefined, "the path " + path + " is not one of an item file");
   NvItem generic = GenericFile(path, 0);
   const NvError error = ReadWhole(phone, generic, status);
   if (error == NvError::kNone) Define(phone, std::move(generic));
@@ -170,6 +170,7 @@ NvError NVTool_Manager::WriteItem(Diag_FTM& phone, const NvItem& item, uint16_t&
     result = WriteElement(phone, mobile, item, slot, value, status);
     if (result != NvError::kNone) return result;
   }
+  if (result == NvError::kNoValue) return Told(result, item.Title() + " has no value");
   return result;
 }
 

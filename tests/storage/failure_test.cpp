@@ -123,7 +123,7 @@ TEST_F(StorageFailure, OfFilesNamesTheFile) {
        kEfs,
        2,
        "no such file /nope"},
-      {"too large", {}, [&] { return Put("/x", 2000); }, "KRAL_EfsWriteMem", 7, 0, 0, "no room on the handset"},
+      {"too large", {}, [&] { return Put("/x", 2000); }, "KRAL_EfsWriteMem", 7, kEfs, 28, "no room on the handset"},
       {"silence", silent, [&] { return Put("/x"); }, "KRAL_EfsWriteMem", 5, 0, 0, "75/19/19"},
       {"refused", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
        [&] { return KRAL_EfsDelete(h, "/f", &error); }, "KRAL_EfsDelete", 7, KRAL_ERROR_STATUS_REFUSAL, 19, "75/19/8"},
@@ -322,7 +322,8 @@ TEST_F(StorageFailure, OfItemsIsWhatBecameOfTheRequest) {
                   "<NvDefinition><NvItem id='3'><DataType><Member name='a' typeid='word8'/></DataType></NvItem>"
                   "<NvItem id='4' maxIndex='2'><DataType><Member name='a' typeid='word8'/></DataType></NvItem>"
                   "<NvEfsItem fullpathname='/nv/item_files/rfnv/00020002'>"
-                  "<DataType><Member name='a' typeid='word8'/></DataType></NvEfsItem></NvDefinition>");
+                  "<DataType><Member name='a' typeid='word8'/></DataType></NvEfsItem><NvEfsItem fullpathname='/short'>"
+                  "<DataType><Member name='a' typeid='word16'/></DataType></NvEfsItem></NvDefinition>");
   ASSERT_EQ(KRAL_NV_LoadNVDefinitionFile(h, definitions.c_str()), 0u);
   handset().efs().AddItemFile("/nv/item_files/rfnv/00020002", Bytes{1});
   handset().nv().Set(3, Bytes{1});
@@ -337,6 +338,33 @@ TEST_F(StorageFailure, OfItemsIsWhatBecameOfTheRequest) {
   const auto load = [&] { return uint8_t{KRAL_NV_LoadNVsFromMobile(h) == 0}; };
 
   const Row kRows[] = {
+      {"index",
+       {},
+       [&] { return uint8_t{KRAL_NV_ClearNVValueByIndex(h, 99) == 0}; },
+       "KRAL_NV_ClearNVValueByIndex",
+       2,
+       kResult,
+       KRAL_NV_ERROR_INDEX_OUT_OF_BOUND,
+       "index 99"},
+      {"no value",
+       {},
+       [&] { return uint8_t{KRAL_NV_WriteNVItemToMobileByNVID(h, 3, &status) == 0}; },
+       "KRAL_NV_WriteNVItemToMobileByNVID",
+       2,
+       kResult,
+       KRAL_NV_ERROR_NO_VALUE,
+       "NV ID 3"},
+      {"no buffer",
+       {},
+       [&] { return uint8_t{KRAL_NV_GetErrorText(h, 8, nullptr, 0) == 0}; },
+       "KRAL_NV_GetErrorText",
+       2,
+       kResult,
+       KRAL_NV_ERROR_CANNOT_GET_VALUE,
+       "no buffer"},
+      {"bytes of no type", [&] { handset().efs().AddItemFile("/short", Bytes{1}); },
+       [&] { return uint8_t{KRAL_NV_ReadNVItemFromMobileByEfsFilename(h, "/short") == 0}; }, kByPath, 6, 0, 0,
+       "1 bytes"},
       {"silence", on(handset::Ignore(), "26"), read(3), kById, 5, 0, 0, "no answer to command 38"},
       {"undefined", on(handset::Ignore(), "26"), read(1), kById, 5, 0, 0, "no answer to command 38"},
       {"damage", on(handset::Corrupt(), "26"), read(3), kById, 6, 0, 0, "wrong check"},
@@ -364,6 +392,16 @@ TEST_F(StorageFailure, OfItemsIsWhatBecameOfTheRequest) {
        read_file, kByPath, 7, kEfs, 13, "no permission for /nope"},
   };
   for (const Row& row : kRows) Check(row);
+  const std::string nowhere = folder_.Path("no folder/items.qdf");
+  KRAL_NV_SetNVValueStringByNVID(h, 3, 0, "1");
+  CheckSystemError({"nowhere",
+                    {},
+                    [&] { return uint8_t{KRAL_NV_WriteNVsToSource(h, nowhere.c_str()) == 0}; },
+                    "KRAL_NV_WriteNVsToSource",
+                    10,
+                    kResult,
+                    KRAL_NV_ERROR_CANNOT_OPEN_SOURCE,
+                    nowhere});
 }
 
 }  // namespace

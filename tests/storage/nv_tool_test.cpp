@@ -363,6 +363,9 @@ void KRAL_CALL OnItem(uint32_t operation, uint32_t done, uint32_t total, const c
   Calls().push_back(std::to_string(operation) + " " + std::to_string(done) + "/" + std::to_string(total) + " " + item +
                     " " + std::to_string(status));
   EXPECT_EQ(KRAL_NV_ClearNVDefinition(handle), 0xFFFFFFFFu) << "in the middle of a set";
+  KRAL_ERROR error{};
+  EXPECT_EQ(KRAL_GetLastError(handle, &error), 1);
+  EXPECT_EQ(error.code, uint32_t{KRAL_ERROR_ARGUMENT}) << error.text;
 }
 
 TEST_F(NvTool, CallbackTellsEveryItem) {

@@ -1,4 +1,5 @@
 """Downloads from diagnostic mode and from the boot loader, plans without a handset, and what failures are called."""
+import errno
 import json
 import os
 import signal
@@ -114,6 +115,10 @@ class Flash(ToolTest):
                       ("write", "--dry-run", "--header", self.add("long", bytes(513)), binary),
                       ("write", "--dry-run", "--partition", self.path("missing"), binary)):
             self.expect_json(10, "flash", *words)
+        error = self.expect_json(10, "flash", "verify-image", self.path("missing"))["error"]
+        self.assertEqual((error["function"], error["system_error"]), ("KRAL_IMAGE_GetInfo", errno.ENOENT))
+        error = self.expect_json(10, "flash", "write", broken)["error"]
+        self.assertEqual((error["function"], error["line"]), ("KRAL_IMAGE_GetInfo", 2))
 
     def test_files_that_lose_data_or_are_too_large_are_refused(self):
         lossy = self.add("lossy.hex", b":020000040002F8\n:02001000AABB89\n:00000001FF\n")

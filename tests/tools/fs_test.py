@@ -56,7 +56,7 @@ class Files(ToolTest):
             self.fs(0, "put", local, ":/file")
             for words, text in ((("rmdir", "/"), "invalid"), (("rm", "/none"), "no such file"),
                                 (("get", ":/none"), "no such file"), (("ls", "/none"), "no such file"),
-                                (("mkdir", "/none/x"), "no such file"), (("put", local, ":/none/x"), "no such file"),
+                                (("mkdir", "/none/x"), "no such file"), (("put", local, ":/none/x/y"), "no directory /none on"),
                                 (("mkdir", "/file"), "exists already")):
                 with self.subTest(words=words):
                     error = self.fs(7, *words)["error"]
@@ -64,7 +64,9 @@ class Files(ToolTest):
                     self.assertEqual(error["status"]["kind"], "efs")
             for words in (("cat", ":/nope"), ("stat", "/nope"), ("get", ":/nope"), ("ls", "/nope"), ("rm", "/nope")):
                 with self.subTest(words=words):
-                    self.assertIn("no such file /nope on COM7", self.fs(7, *words)["error"]["text"])
+                    error = self.fs(7, *words)["error"]
+                    self.assertIn("no such file /nope on COM7", error["text"])
+                    self.assertTrue(error["function"].startswith("KRAL_E"))
 
     def test_mistakes_are_found_before_anything_is_copied(self):
         with self.handset():
@@ -86,7 +88,9 @@ class Files(ToolTest):
             self.assertEqual(self.fs(8, "put", local, ":/f")["mismatch"]["offset"], 1000)
             self.fs(0, "put", "--no-verify", local, ":/f")
         with self.handset("--efs-blocks", "2"):
-            self.assertIn("no room", self.fs(7, "put", local, ":/f")["error"]["text"])
+            error = self.fs(7, "put", local, ":/f")["error"]
+            self.assertIn("no room", error["text"])
+            self.assertIn("kral fs df", error["hint"])
 
     def test_names_of_the_handset_stay_inside_the_target(self):
         names = ("..", ".", "../../out", "/etc", "a\\b", "C:x", "con", "Lpt1.txt", "dot.", "new\nline", "del\x7f")

@@ -42,6 +42,8 @@ class Failures(ToolTest):
     def test_each_has_its_code_and_text(self):
         for fault, words, code, text, hint, status, reply in (
                 ("ignore", ["info"], 5, "COM7", "", None, ""),
+                ("corrupt", ["info"], 6, "frames came with a wrong check", "cable", None, ""),
+                ("wrong=153", ["info"], 6, "a reply of 153", "other program", {"kind": "reply", "value": 153}, ""),
                 ("lose,of=7C", ["--time-out", "300", "raw", "7C"], 5, "no answer to command 124 within 300 ms",
                  "still answers", None, ""),
                 ("refuse=24,of=29", ["raw", "29 05 00"], 7, "not in the present operating mode", "kral mode ftm",

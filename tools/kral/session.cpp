@@ -93,6 +93,13 @@ ToolError PortError(std::uint16_t port, std::int32_t state, bool was_connected,
           "check the cable; a handset that restarts comes back on its port after a while", record};
 }
 
+constexpr const char* kLivenessCheck = "the question whether a handset is there";
+
+// Something answers, if not what was asked for.
+bool IsOtherThanSilence(const std::optional<KRAL_ERROR>& record) {
+  return record && (record->code == KRAL_ERROR_LINK || record->code == KRAL_ERROR_REFUSED);
+}
+
 }  // namespace
 
 std::uint16_t ParsePort(std::string_view text) {
@@ -184,14 +191,17 @@ bool Session::AnswersInTheEnd() {
 void Session::CheckAnswers(Expected expected) {
   if (expected == Expected::kInBootLoader) return;
   answers_ = KRAL_IsPhoneConnected(handle_) != 0;
+  auto record = LastError(handle_);
   // A busy machine may keep a healthy handset's answer for longer than one check waits. With the port in order, ask
   // again, for longer each time; a loader is asked once, for it takes no questions.
   if (!answers_ && expected != Expected::kMayBeInDownload) answers_ = AnswersInTheEnd();
   if (answers_) return;
   ThrowIfInterrupted();
-  const auto record = LastError(handle_);
+  // What came to the first question may be in the way of the later ones.
+  if (!IsOtherThanSilence(record)) record = LastError(handle_);
   if (const auto trouble = TroubleOf(handle_)) throw PortError(port_, *trouble, false, record);
   if (expected == Expected::kMayBeInDownload) return;
+  if (IsOtherThanSilence(record)) throw ExplainRecord(*record, kLivenessCheck, port_);
   throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
                   "longer, --log FILE shows what came",
@@ -206,10 +216,12 @@ std::optional<ToolError> Session::Silence() const {
   // That the device is gone is told only until the asking has closed its port.
   const auto before = TroubleOf(handle_);
   if (KRAL_IsPhoneConnected(handle_) != 0) return std::nullopt;
+  const auto record = LastError(handle_);
   const auto after = TroubleOf(handle_);
-  if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, LastError(handle_));
+  if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, record);
+  if (IsOtherThanSilence(record)) return ExplainRecord(*record, kLivenessCheck, port_);
   return ToolError(ExitCode::kNoAnswer, fmt::format("the handset on {} answers nothing any more", DescribePort(port_)),
-                   "check cable and power", LastError(handle_));
+                   "check cable and power", record);
 }
 
 // The library tells a port that was never there from one that came and went by the same code.

@@ -5,8 +5,11 @@
 
 #include <algorithm>
 #include <charconv>
+#include <optional>
+#include <system_error>
 
 #include "platform/file_util.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/progress.h"
 
 namespace kral::tool {
@@ -15,8 +18,19 @@ namespace {
 constexpr std::uint32_t kLargestProgrammer = 500 * 1024;
 constexpr std::uint32_t kNoStart = 0xFFFFFFFF;
 
-ToolError BadImage(const std::string& file, std::string_view why, std::string hint) {
-  return {ExitCode::kBadFile, fmt::format("{}: {}", file, why), std::move(hint)};
+ToolError BadImage(const std::string& file, std::string_view why, std::string hint,
+                   const std::optional<KRAL_ERROR>& record = {}) {
+  return {ExitCode::kBadFile, fmt::format("{}: {}", file, why), std::move(hint), record};
+}
+
+std::string SystemText(std::uint32_t error) {
+  return std::system_category().message(static_cast<int>(error));
+}
+
+// What the library says, which names the file, and what the system said to it.
+ToolError BadImage(const KRAL_ERROR& record, std::string hint) {
+  const auto reason = record.system_error == 0 ? std::string() : ": " + SystemText(record.system_error);
+  return {ExitCode::kBadFile, record.text + reason, std::move(hint), record};
 }
 
 std::string DescribeLoss(const std::string& file) {
@@ -30,25 +44,27 @@ KRAL_IMAGE_INFO ReadInfo(const std::string& file, std::uint32_t format) {
   KRAL_IMAGE_INFO info{};
   std::uint32_t result = 0;
   if (KRAL_IMAGE_GetInfo(file.c_str(), format, &info, &result) != 0) return info;
+  const auto record = LastError(0).value_or(KRAL_ERROR{});
   switch (result) {
     case KRAL_STREAM_FILE_NOT_OPENED:
-      throw BadImage(file, "the file is missing, empty or unreadable", "check its name and permissions");
+      throw BadImage(record, "check its name and permissions");
     case KRAL_STREAM_FILE_TOO_LARGE:
       throw BadImage(file, "the file has 4 GiB or more, or more than this program can map",
-                     "addresses have 32 bits: split the image");
+                     "addresses have 32 bits: split the image", record);
     case KRAL_STREAM_FILE_NOT_READ:
-      throw BadImage(file, "the file became shorter while it was read", "wait until it is complete");
+      throw BadImage(file, "the file became shorter while it was read", "wait until it is complete", record);
     case KRAL_STREAM_DATA_LOST:
       throw BadImage(file, DescribeLoss(file),
                      "data need an extended address record (type 02 or 04) in front of them, and the lowest of a "
-                     "region must come first: kral flash hex writes such files from a binary");
+                     "region must come first: kral flash hex writes such files from a binary",
+                     record);
     case KRAL_STREAM_PAST_END:
       throw BadImage(file, "its image would go on past address 0xFFFFFFFF",
-                     "each extended address record (type 02 or 04) must have data right behind it");
+                     "each extended address record (type 02 or 04) must have data right behind it", record);
     default:
       break;
   }
-  throw BadImage(file, "this is no sound Intel HEX file",
+  throw BadImage(record,
                  "a broken record, a missing end-of-file record, or data spread over more than 128 MiB; raw images are "
                  "taken with --format bin");
 }
@@ -67,9 +83,10 @@ std::optional<std::uint8_t> TakeType(std::string_view& argument) {
 
 void CheckFile(const std::string& file, std::uint64_t most) {
   FileReader reader;
-  if (reader.Open(file) || reader.size() == 0) {
-    throw BadImage(file, "the file is missing, empty or unreadable", "check its name and permissions");
+  if (const auto error = reader.Open(file)) {
+    throw BadImage(file, "the file cannot be opened: " + error.message(), "check its name and permissions");
   }
+  if (reader.size() == 0) throw BadImage(file, "the file is empty", "check its name");
   if (reader.size() <= most) return;
   throw BadImage(file, fmt::format("it has {} bytes", reader.size()), fmt::format("at most {} are taken", most));
 }

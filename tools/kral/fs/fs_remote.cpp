@@ -16,6 +16,7 @@ namespace {
 
 constexpr std::uint32_t kNoSuchFile = 2;
 constexpr std::uint32_t kExists = 6;
+constexpr const char* kStatus = "KRAL_EFS2_DIAG_STAT";
 constexpr std::size_t kMostEntries = 200'000;  // of all directories that a verb lists; more is a handset gone wrong
 
 // The callbacks carry the handle and nothing else.
@@ -83,8 +84,10 @@ std::string RemoteFiles::Where(std::string_view path) const {
 }
 
 // A call whose answer is an error number has not failed, and leaves no record: the number is told as one is.
-ToolError RemoteFiles::Refusal(std::string_view what, std::string_view path, std::uint32_t error_number) const {
+ToolError RemoteFiles::Refusal(std::string_view what, std::string_view path, std::uint32_t error_number,
+                               std::string_view function) const {
   KRAL_ERROR record{};
+  function.copy(record.function, sizeof record.function - 1);
   record.code = KRAL_ERROR_REFUSED;
   record.status_kind = KRAL_ERROR_STATUS_EFS;
   record.status = error_number;
@@ -101,11 +104,27 @@ void RemoteFiles::Transfer(std::string_view what, Request&& request) {
   if (request() == 0) throw session_.Explain(what);
 }
 
-void RemoteFiles::Ask(std::string_view what, std::string_view path,
+// Of a file that is written it is the directory that is missing.
+template <class Request>
+void RemoteFiles::Put(std::string_view what, const std::string& path, Request&& request) {
+  session_.Begin();
+  if (request() != 0) return;
+  const auto error = session_.Explain(what);
+  if (!IsNoSuchFile(error.record())) throw error;
+  for (std::size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    const auto directory = path.substr(0, end);
+    if (Find(directory)) continue;
+    throw ToolError(error.code(), fmt::format("there is no directory {}", Where(directory)),
+                    "kral fs mkdir --parents makes it", error.record());
+  }
+  throw error;
+}
+
+void RemoteFiles::Ask(std::string_view what, std::string_view path, std::string_view function,
                       const std::function<std::uint8_t(std::uint32_t*)>& request) {
   std::uint32_t error = 0;
   Transfer(what, [&] { return request(&error); });
-  if (error != 0) throw Refusal(what, path, error);
+  if (error != 0) throw Refusal(what, path, error, function);
 }
 
 std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
@@ -117,13 +136,13 @@ std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
                                &status.accessed, &status.modified, &status.changed);
   });
   if (error == kNoSuchFile) return std::nullopt;
-  if (error != 0) throw Refusal(what, path, error);
+  if (error != 0) throw Refusal(what, path, error, kStatus);
   return status;
 }
 
 RemoteStatus RemoteFiles::Status(const std::string& path) {
   if (const auto status = Find(path)) return *status;
-  throw Refusal(fmt::format("the status of {}", Printable(path)), path, kNoSuchFile);
+  throw Refusal(fmt::format("the status of {}", Printable(path)), path, kNoSuchFile, kStatus);
 }
 
 std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
@@ -148,10 +167,10 @@ void RemoteFiles::MakeDirectory(const std::string& path) {
   std::uint32_t error = 0;
   session_.Begin();
   if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) == 0) {
-    throw error != 0 ? Refusal(what, {}, error) : session_.Explain(what);
+    throw error != 0 ? Refusal(what, {}, error, "KRAL_EfsMkDir") : session_.Explain(what);
   }
   // The handset says the same of a file in the way.
-  if (error == kExists && !Status(path).is_directory()) throw Refusal(what, path, kExists);
+  if (error == kExists && !Status(path).is_directory()) throw Refusal(what, path, kExists, "KRAL_EfsMkDir");
 }
 
 void RemoteFiles::MakeParents(const std::string& path) {
@@ -175,7 +194,7 @@ Bytes RemoteFiles::ReadAll(const std::string& path, std::uint32_t size) {
 }
 
 void RemoteFiles::Write(const std::string& path, std::span<const std::uint8_t> bytes) {
-  Transfer(fmt::format("writing {}", Printable(path)), [&] {
+  Put(fmt::format("writing {}", Printable(path)), path, [&] {
     return KRAL_EfsWriteMem(session_.handle(), bytes.data(), static_cast<std::uint32_t>(bytes.size()), path.c_str());
   });
 }
@@ -187,7 +206,7 @@ void RemoteFiles::WriteItem(const std::string& path, std::span<const std::uint8_
                     fmt::format("an item file holds {} bytes; remove it first to put an ordinary file in its place",
                                 KRAL_EFS_ITEM_SIZE));
   }
-  Transfer(fmt::format("writing the item {}", Printable(path)), [&] {
+  Put(fmt::format("writing the item {}", Printable(path)), path, [&] {
     return KRAL_EfsPutItemFromMem(session_.handle(), path.c_str(), bytes.data(),
                                   static_cast<std::uint32_t>(bytes.size()));
   });

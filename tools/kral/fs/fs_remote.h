@@ -63,8 +63,8 @@ class RemoteFiles {
   std::vector<RemoteEntry> List(const std::string& path);  // by name, without "." and ".."
 
   // A request whose answer is an error number; `what` names it, such as "the removal of /a". `path` is what is missing
-  // where there is no such file.
-  void Ask(std::string_view what, std::string_view path,
+  // where there is no such file, `function` what is called.
+  void Ask(std::string_view what, std::string_view path, std::string_view function,
            const std::function<std::uint8_t(std::uint32_t* error_number)>& request);
   void MakeDirectory(const std::string& path);
   void MakeParents(const std::string& path);  // and the directory itself
@@ -80,7 +80,10 @@ class RemoteFiles {
   static void KRAL_CALL OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE handle);
   template <class Request>
   void Transfer(std::string_view what, Request&& request);
-  ToolError Refusal(std::string_view what, std::string_view path, std::uint32_t error_number) const;
+  template <class Request>
+  void Put(std::string_view what, const std::string& path, Request&& request);
+  ToolError Refusal(std::string_view what, std::string_view path, std::uint32_t error_number,
+                    std::string_view function) const;
 
   Session session_;
   Watch watch_;

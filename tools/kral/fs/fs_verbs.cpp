@@ -162,7 +162,7 @@ void Stat(Context& context, RemoteFiles& files, const FsOptions& options) {
 void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   KRAL_EFS_STATFS status{};
-  files.Ask(fmt::format("the room of {}", Printable(path)), path, [&](std::uint32_t* error) {
+  files.Ask(fmt::format("the room of {}", Printable(path)), path, "KRAL_EFS2_DIAG_STATFS", [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_STATFS(files.session().handle(), path.c_str(), error, &status);
   });
   const auto bytes = [&status](std::uint32_t blocks) { return std::uint64_t{blocks} * status.block_size; };
@@ -197,19 +197,20 @@ void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
   context.out.Result(context.found, "");
 }
 
-void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, PathCall call) {
+void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, std::string_view function,
+               PathCall call) {
   ForEachPath(context, files, options, [&](const std::string& path) {
-    files.Ask(fmt::format("the removal of {}", Printable(path)), path,
+    files.Ask(fmt::format("the removal of {}", Printable(path)), path, function,
               [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
   });
 }
 
 void RemoveFiles(Context& context, RemoteFiles& files, const FsOptions& options) {
-  RemoveAll(context, files, options, KRAL_EfsDelete);
+  RemoveAll(context, files, options, "KRAL_EfsDelete", KRAL_EfsDelete);
 }
 
 void RemoveDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
-  RemoveAll(context, files, options, KRAL_EfsRmDir);
+  RemoveAll(context, files, options, "KRAL_EfsRmDir", KRAL_EfsRmDir);
 }
 
 void MakeDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
@@ -226,16 +227,17 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto from = EfsPath(options.paths[0]);
   auto to = EfsPath(options.paths[1]);
   if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
-  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), from, [&](std::uint32_t* error) {
-    return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
-  });
+  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), from, "KRAL_EFS2_DIAG_RENAME",
+            [&](std::uint32_t* error) {
+              return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
+            });
   context.out.Result({{"port", files.session().port()}, {"from", from}, {"to", to}}, "");
 }
 
 void Link(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto target = EfsPath(options.paths[0]);
   const auto link = EfsPath(options.paths[1]);
-  files.Ask(fmt::format("the link {}", Printable(link)), {}, [&](std::uint32_t* error) {
+  files.Ask(fmt::format("the link {}", Printable(link)), {}, "KRAL_EfsCreateLink", [&](std::uint32_t* error) {
     return KRAL_EfsCreateLink(files.session().handle(), target.c_str(), link.c_str(), error);
   });
   context.out.Result({{"port", files.session().port()}, {"target", target}, {"link", link}}, "");
