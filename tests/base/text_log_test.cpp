@@ -4,6 +4,7 @@
 #include <array>
 #include <cstring>
 #include <filesystem>
+#include <regex>
 #include <string>
 #include <vector>
 
@@ -120,17 +121,7 @@ TEST_F(TextLog, ClockStampIsMinutesSecondsAndMillisecondsAndATab) {
   log_.Start(folder_.Path("log.txt").c_str());
   log_.WriteLine(kLogFn, "text");
   const std::string line = FileLines("log.txt").at(0);
-  ASSERT_EQ(line.substr(9), "\t,LOG_FN,text");
-  const std::string stamp = line.substr(0, 9);
-  for (size_t i = 0; i < stamp.size(); ++i) {
-    if (i == 2 || i == 5) {
-      EXPECT_EQ(stamp[i], ':');
-    } else {
-      EXPECT_TRUE(stamp[i] >= '0' && stamp[i] <= '9') << stamp;
-    }
-  }
-  EXPECT_LT(stamp.substr(0, 2), "60");
-  EXPECT_LT(stamp.substr(3, 2), "60");
+  EXPECT_TRUE(std::regex_match(line, std::regex("[0-5]\\d:[0-5]\\d:\\d{3}\\t,LOG_FN,text"))) << line;
 }
 
 TEST_F(TextLog, RelativeStampCountsFromTheLastStop) {
@@ -165,22 +156,9 @@ TEST_F(TextLog, LongMessageReachesTheFileWholeAndTheCallbackCut) {
   EXPECT_EQ(Body(FileLines("log.txt").at(0)), "LOG_FN," + message);
   EXPECT_EQ(Text(0), message.substr(0, 999));
   EXPECT_EQ(records_[0][1007], 0);
-}
-
-TEST_F(TextLog, MessageLongerThanTheBufferIsCut) {
-  log_.SetFlags(0xFFFFFFFF);
-  log_.Start(folder_.Path("log.txt").c_str());
+  log_.SetFlags(kLogIoDev);
   log_.WriteLine(kLogIoDev, "%s", std::string(20000, 'm').c_str());
-  EXPECT_EQ(Body(FileLines("log.txt").at(0)), "LOG_IO_DEV,    " + std::string(12295 - 4, 'm'));
-}
-
-TEST_F(TextLog, FileIsOpenedByTheFirstLineOnly) {
-  folder_.Add("log.txt", "what was there\n");
-  log_.Start(folder_.Path("log.txt").c_str());
-  EXPECT_EQ(FileLines("log.txt").at(0), "what was there");
-  log_.WriteLine(kLogFn, "first");
-  ASSERT_EQ(FileLines("log.txt").size(), 1u);
-  EXPECT_EQ(Body(FileLines("log.txt")[0]), "LOG_FN,first");
+  EXPECT_EQ(Body(FileLines("log.txt").back()), "LOG_IO_DEV,    " + std::string(12295 - 4, 'm')) << "beyond the buffer";
 }
 
 TEST_F(TextLog, SecondStartFinishesTheOldFileAndTruncatesTheNewOne) {
@@ -189,6 +167,7 @@ TEST_F(TextLog, SecondStartFinishesTheOldFileAndTruncatesTheNewOne) {
   log_.Start(folder_.Path("first.txt").c_str());
   log_.WriteLine(kLogFn, "one");
   log_.Start(second.c_str());
+  EXPECT_EQ(FileLines("second.txt").at(0), "what was there") << "until the first line";
   log_.WriteLine(kLogFn, "two");
 
   const auto first = FileLines("first.txt");

@@ -297,17 +297,6 @@ TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
       << "loopback and version: the answers to another handshake would be taken for theirs";
 }
 
-TEST_F(Connection, CallersTransportIsReopenedWithTheSameFunctions) {
-  const KRAL_HANDLE handle = ConnectThroughCable();
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
-  KRAL_ConfigureTimeOut(handle, 1, 20);
-  handset_.faults().Add(handset::Ignore(), When::Nth(1));
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
-  KRAL_ConfigureTimeOut(handle, 1, 1000);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
-  EXPECT_TRUE(ports_.opens().empty()) << "no COM port is touched";
-}
-
 TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt) {
   const KRAL_HANDLE com = KRAL_ConnectServer(kPort);
   KRAL_ConnectServer(kPort);
@@ -320,7 +309,8 @@ TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt
   const KRAL_HANDLE callers = ConnectThroughCable();
   EXPECT_EQ(ConnectThroughCable(), callers);
   KRAL_DisconnectServer(callers);
-  EXPECT_EQ(KRAL_IsPhoneConnected(callers), 1);
+  EXPECT_EQ(KRAL_IsPhoneConnected(callers), 1) << "with the same functions";
+  EXPECT_EQ(ports_.opens(), (Ports{kPort, kPort, kPort}));
 }
 
 TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {

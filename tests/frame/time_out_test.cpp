@@ -22,48 +22,38 @@ class TimeOuts : public testing::Test {
   test::HandsetPorts ports_;
 };
 
-TEST_F(TimeOuts, HaveTheirDefaults) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
-  for (uint32_t id = 0; id < 20; ++id) EXPECT_EQ(KRAL_GetTimeOut(handle, id), kDefaults[id]) << id;
+TEST_F(TimeOuts, HaveTheirDefaultsAndAreStoredPerHandset) {
+  const KRAL_HANDLE one = KRAL_ConnectServer(3);
+  const KRAL_HANDLE other = KRAL_ConnectServer(4);
+  for (uint32_t id = 0; id < 20; ++id) {
+    EXPECT_EQ(KRAL_ConfigureTimeOut(one, id, static_cast<int32_t>(1000 + id)), 1);
+    EXPECT_EQ(KRAL_GetTimeOut(one, id), static_cast<int32_t>(1000 + id));
+    EXPECT_EQ(KRAL_GetTimeOut(other, id), kDefaults[id]) << id;
+  }
+  for (const uint32_t id : {20u, 21u, 1000u, 0xFFFFFFFFu}) {
+    EXPECT_EQ(KRAL_ConfigureTimeOut(one, id, 5), 0) << id;
+    EXPECT_EQ(KRAL_GetTimeOut(one, id), 0) << id;
+  }
 }
 
 TEST_F(TimeOuts, ServerModeRefusesThoseOfTheTransportAndAsksTheDownloadForItsOwn) {
   test::ScriptedServer server;
   const KRAL_HANDLE handle = KRAL_ConnectServer(3);
   const test::PhoneLog log(handle, KRAL_LOG_FN);
-  for (uint32_t id = 0; id < 20; ++id) {
-    EXPECT_EQ(KRAL_GetTimeOut(handle, id), id == 7 || id == 8 ? 0 : kDefaults[id]) << id;
-  }
   for (const uint32_t id : {7u, 8u}) {
+    EXPECT_EQ(KRAL_GetTimeOut(handle, id), 0);
     EXPECT_EQ(KRAL_ConfigureTimeOut(handle, id, 1234), 0);
     EXPECT_EQ(KRAL_GetTimeOut(handle, id), 1234) << "refused, and stored";
   }
   EXPECT_EQ(log.Count("2 KRAL_ConfigureTimeOut() - error, this timeout cannot be set in ORBT mode"), 2u);
   EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 0);
+  EXPECT_EQ(KRAL_GetTimeOut(handle, 19), kDefaults[19]);
   EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 20, 77), 1);
   EXPECT_EQ(KRAL_GetTimeOut(handle, 20), 77);
   EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 21, 78), 0);
   EXPECT_EQ(KRAL_GetTimeOut(handle, 21), 0);
   const auto calls = server.TakeCalls();
   EXPECT_EQ(std::count(calls.begin(), calls.end(), "make KRAL-SW Download"), 1);
-}
-
-TEST_F(TimeOuts, AreStoredPerHandset) {
-  const KRAL_HANDLE one = KRAL_ConnectServer(3);
-  const KRAL_HANDLE other = KRAL_ConnectServer(4);
-  for (uint32_t id = 0; id < 20; ++id) {
-    EXPECT_EQ(KRAL_ConfigureTimeOut(one, id, static_cast<int32_t>(1000 + id)), 1);
-    EXPECT_EQ(KRAL_GetTimeOut(one, id), static_cast<int32_t>(1000 + id));
-    EXPECT_EQ(KRAL_GetTimeOut(other, id), kDefaults[id]);
-  }
-}
-
-TEST_F(TimeOuts, UnknownIdentifiersAreRefused) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer(3);
-  for (const uint32_t id : {20u, 21u, 1000u, 0xFFFFFFFFu}) {
-    EXPECT_EQ(KRAL_ConfigureTimeOut(handle, id, 5), 0) << id;
-    EXPECT_EQ(KRAL_GetTimeOut(handle, id), 0) << id;
-  }
 }
 
 TEST_F(TimeOuts, CallsAreTold) {
