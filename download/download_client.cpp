@@ -101,19 +101,21 @@ constexpr const char* kNoFile = "there is no file name";
 }  // namespace
 
 bool SetCallback(Diag_FTM& phone, KRAL_DOWNLOAD_PROGRESS_CALLBACK callback, uintptr_t value) {
-  phone.download().callback_value = value;
-  phone.download().progress_callback = callback;
+  Settings& settings = phone.state<Settings>();
+  settings.callback_value = value;
+  settings.progress_callback = callback;
   return true;
 }
 
 bool Abort(Diag_FTM& phone) {
-  phone.download().abort = true;
+  phone.state<Settings>().abort = true;
   return true;
 }
 
 bool ConfigureHello(Diag_FTM& phone, uint32_t tries, uint32_t delay_ms) {
-  phone.download().hello_tries = tries;
-  phone.download().hello_retry_delay_ms = delay_ms;
+  Settings& settings = phone.state<Settings>();
+  settings.hello_tries = tries;
+  settings.hello_retry_delay_ms = delay_ms;
   return true;
 }
 
@@ -152,7 +154,7 @@ bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16
   if (IsRefused(phone, "KRAL_STREAM_HELLO")) return false;
   DownloadConnection connection(phone);
   connection.BeginWork();
-  const auto answer = stream::Hello(connection, phone.download(), variant);
+  const auto answer = stream::Hello(connection, phone.state<Settings>(), variant);
   if (!answer) return false;
   if (block_size != nullptr) *block_size = answer->block_size;
   if (window != nullptr) *window = answer->window;

@@ -23,7 +23,7 @@ uint32_t Saturated(uint64_t value) {
 class WholeWay {
  public:
   WholeWay(Diag_FTM& phone, uint64_t total)
-      : settings_(phone.download()),
+      : settings_(phone.state<Settings>()),
         handle_(phone.handle()),
         callback_(settings_.progress_callback),
         value_(settings_.callback_value),
@@ -50,7 +50,7 @@ class WholeWay {
     self.callback_(self.handle_, Saturated(self.before_ + done), Saturated(self.total_), self.value_);
   }
 
-  DownloadSettings& settings_;
+  Settings& settings_;
   const KRAL_HANDLE handle_;
   const KRAL_DOWNLOAD_PROGRESS_CALLBACK callback_;
   const uintptr_t value_;
@@ -105,7 +105,8 @@ bool ServeFlashProgrammer(Diag_FTM& phone, const char* file) {
 
 FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const char* const> images,
                       const uint8_t* types) {
-  phone.download().abort = false;  // here, so that one during the look at the files counts
+  std::atomic<bool>& abort = phone.state<Settings>().abort;
+  abort = false;  // here, so that one during the look at the files counts
   uint64_t programmer_size = 0;
   if (const uint32_t result = CheckProgrammer(programmer, programmer_size)) return {result};
   std::vector<uint64_t> sizes(images.size());
@@ -113,7 +114,7 @@ FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const c
   for (uint32_t i = 0; i < images.size(); ++i) {
     if (const uint32_t result = CheckImage(phone.log(), images[i], sizes[i])) return {result, i};
     total += sizes[i];
-    if (phone.download().abort) return {Aborted()};
+    if (abort) return {Aborted()};
   }
 
   WholeWay whole(phone, total);

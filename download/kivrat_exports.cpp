@@ -15,6 +15,7 @@
 
 namespace {
 
+namespace kivrat = kral::kivrat;
 using kral::Diag_FTM;
 using kral::ExportCall;
 using kral::Fail;
@@ -22,9 +23,10 @@ using kral::Failure;
 using kral::TextOrEmpty;
 
 bool Configure(Diag_FTM& phone, uint32_t hello_retries, uint32_t retry_delay_ms, uint32_t pre_done_delay_ms) {
-  phone.kivrat().hello_retries = hello_retries;
-  phone.kivrat().retry_delay_ms = retry_delay_ms;
-  phone.kivrat().pre_done_delay_ms = pre_done_delay_ms;
+  kivrat::Settings& settings = phone.state<kivrat::Settings>();
+  settings.hello_retries = hello_retries;
+  settings.retry_delay_ms = retry_delay_ms;
+  settings.pre_done_delay_ms = pre_done_delay_ms;
   return true;
 }
 
@@ -33,8 +35,8 @@ bool Connect(Diag_FTM& phone, uint32_t* version, uint32_t* chip_identity) {
   connection.BeginWork();
   uint32_t told_version = 0;
   std::optional<uint32_t> identity;
-  const bool connected = kral::kivrat::Connect(phone, told_version, chip_identity == nullptr ? nullptr : &identity,
-                                               [&connection] { return connection.aborted(); });
+  const bool connected = kivrat::Connect(phone, told_version, chip_identity == nullptr ? nullptr : &identity,
+                                         [&connection] { return connection.aborted(); });
   if (!connected) return false;
   if (version != nullptr) *version = told_version;
   if (identity) *chip_identity = *identity;

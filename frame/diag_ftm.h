@@ -14,13 +14,17 @@
 #include "base/diag_packet.h"
 #include "base/text_log.h"
 #include "base/time_outs.h"
-#include "frame/phone_settings.h"
+#include "frame/phone_state.h"
+#include "kral/connection.h"
 #include "platform/clock.h"
 #include "transport/collection/capture_player.h"
 #include "transport/collection/kral_event_listener.h"
 #include "transport/engine/kral_thread_interface.h"
 
 namespace kral {
+
+inline constexpr uint8_t kTargetModem = KRAL_TARGET_MODEM;              // the diagnostic service runs on the modem chip
+inline constexpr uint8_t kTargetApplication = KRAL_TARGET_APPLICATION;  // ... on an application processor
 
 class CaptureWriter;
 class NameTables;
@@ -156,16 +160,11 @@ class Diag_FTM {
   bool framed() const { return framed_; }  // false in the unframed packet modes
   void SetFramed(bool framed) { framed_ = framed; }
 
-  FtmSettings& ftm() { return ftm_; }
-  const FtmSettings& ftm() const { return ftm_; }
-  KivratSettings& kivrat() { return kivrat_; }
-  EfsSettings& efs() { return efs_; }
-  NvBatch& nv_batch() { return nv_batch_; }
-  PkvSettings& pkv() { return pkv_; }
-  DownloadSettings& download() { return download_; }
-  const DownloadSettings& download() const { return download_; }
-  // The version response as last received: deliberately never cleared between calls.
-  std::array<uint8_t, CDiagPacket::kCapacity>& version_record() { return version_record_; }
+  // What a family keeps for this handset, across its connects: phone.state<efs::Settings>(). The first to ask makes it.
+  template <class T>
+  T& state() {
+    return state_.Get<T>();
+  }
 
  private:
   struct Parts;  // what the threads of the connection keep alive
@@ -194,13 +193,7 @@ class Diag_FTM {
   };
   std::unique_ptr<CKralEvents, StopDispatching> dispatching_;  // null in server mode
   std::array<CDiagPacket, 3> packets_;
-  FtmSettings ftm_;
-  KivratSettings kivrat_;
-  EfsSettings efs_;
-  NvBatch nv_batch_;
-  PkvSettings pkv_;
-  DownloadSettings download_;
-  std::array<uint8_t, CDiagPacket::kCapacity> version_record_{};
+  PhoneState state_;
 
   UserTransport user_;  // of the last explicit open
   bool null_port_ = false;

@@ -20,6 +20,7 @@
 #include "kral/connection.h"
 #include "kral/efs.h"
 #include "kral/transport.h"
+#include "storage/efs/efs_settings.h"
 
 namespace {
 
@@ -55,7 +56,7 @@ class LyingHandset {
         &handset::CallerTransport::Receive, &handset::CallerTransport::Flush);
     KRAL_SetReceiveMode(handle_, 1);
     KRAL_ConfigureTimeOut(handle_, 0, kTimeOutMs);
-    Kral_ResourceManager::GetPhone(handle_)->efs().packet_time_out_ms = kTimeOutMs;
+    Kral_ResourceManager::GetPhone(handle_)->state<efs::Settings>().packet_time_out_ms = kTimeOutMs;
   }
   ~LyingHandset() { KRAL_DisconnectServer(handle_); }
   LyingHandset(const LyingHandset&) = delete;

@@ -16,6 +16,11 @@
 namespace kral::diag {
 namespace {
 
+// The version response as last received in full.
+struct VersionRecord {
+  std::array<uint8_t, CDiagPacket::kCapacity> bytes;
+};
+
 // Written where a serial number cannot be had.
 constexpr uint32_t kNoSerialNumber = 0xDEADBEEF;
 
@@ -47,7 +52,7 @@ bool ReadVersion(Diag_FTM& phone, const VersionOutputs& outputs) {
 
   // A shorter reply is not taken, yet the request counts as answered: the outputs then show the record as the last
   // full reply left it. The record is not cleared between requests, on purpose.
-  std::span<uint8_t> record = phone.version_record();
+  std::span<uint8_t> record = phone.state<VersionRecord>().bytes;
   const auto response = phone.packet().response();
   if (response.size() >= reply::kLeastCopied) std::copy(response.begin(), response.end(), record.begin());
 

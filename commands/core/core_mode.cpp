@@ -3,6 +3,7 @@
 
 #include "commands/core/core_diag.h"
 #include "commands/core/core_diag_format.h"
+#include "commands/ftm_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/request_failure.h"
 
@@ -79,7 +80,7 @@ bool ReadBack(Diag_FTM& phone, uint16_t mode, bool sent) {
   const uint32_t total = phone.TimeOut(kTimeOutModeReadBack);
   phone.log().WriteLine(kLogRet, "DIAG_CONTROL_F -- post-runtime-mode-switch timeout is %d ms.",
                         static_cast<int>(total));
-  if (phone.ftm().command_code != kSubsystemDispatch) {
+  if (phone.state<ftm::Settings>().command_code != kSubsystemDispatch) {
     // Handsets of the legacy FTM command cannot be asked for their mode.
     phone.clock().SleepMs(total);
     phone.log().WriteLine(

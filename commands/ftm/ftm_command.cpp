@@ -57,7 +57,8 @@ uint8_t ExportedCommand(KRAL_HANDLE handle, const Command& command, const uint8_
   return ExportCall(handle, function.data())
       .Logged("( payload_size = %d, response_size = %d )", payload_size, response_size != nullptr ? *response_size : 0)
       .Run([&](Diag_FTM& phone) {
-        return SendCommand(phone, static_cast<u16>(phone.ftm().mode_id), HeaderForm::kPlain, command.id, exchange);
+        return SendCommand(phone, static_cast<u16>(phone.state<Settings>().mode_id), HeaderForm::kPlain, command.id,
+                           exchange);
       });
 }
 

@@ -78,7 +78,7 @@ uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t command, con
   return ExportCall(handle, __func__)
       .Logged("( command = %d, payload_size = %d )", command, payload_size)
       .Run([&](kral::Diag_FTM& phone) {
-        const auto mode_id = static_cast<uint16_t>(phone.ftm().mode_id);
+        const auto mode_id = static_cast<uint16_t>(phone.state<ftm::Settings>().mode_id);
         return ftm::SendCommand(phone, mode_id, ftm::HeaderForm::kPlain, command, exchange);
       });
 }

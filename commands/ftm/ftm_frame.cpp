@@ -86,7 +86,7 @@ bool Enqueue(Diag_FTM& phone, FtmSequencer& sequencer) {
     phone.log().WriteLine(kLogErr, "Failed to add command to queue");
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the sequencer's queue did not take the request"));
   }
-  phone.ftm().sequence_id = sequence_id;
+  phone.state<Settings>().sequence_id = sequence_id;
   phone.log().WriteLine(kLogRet, "Assigned Sequence ID=%d", sequence_id);
   return true;
 }
@@ -107,7 +107,7 @@ u32 ProcessClientRequestPacket(Diag_FTM& phone, Reply& reply) {
   const auto request = phone.packet().request();
   phone.log().WriteLine(kLogFn, "FTM_Sequencer_ProcessClientRequestPacket( iRequestPacketSize = %d )",
                         static_cast<int>(request.size()));
-  FtmSequencer* sequencer = phone.ftm().sequencer;
+  FtmSequencer* sequencer = phone.state<Settings>().sequencer;
   if (sequencer == nullptr) return SendAtOnce(phone, reply);
   if (IsSequencerCommand(request)) return sequencer->Process(phone, request);
   if (sequencer->active()) sequencer->Observe(request);
@@ -120,26 +120,27 @@ u32 ProcessClientRequestPacket(Diag_FTM& phone, Reply& reply) {
 
 }  // namespace
 
-size_t HeaderSize(const Diag_FTM& phone) {
-  return phone.ftm().command_code == kCommandCode59 ? 7 : 6;
+size_t HeaderSize(Diag_FTM& phone) {
+  return phone.state<Settings>().command_code == kCommandCode59 ? 7 : 6;
 }
 
 void BeginHeader(Diag_FTM& phone, u16 mode_id) {
   CDiagPacket& packet = phone.packet();
   packet.Reset();
-  packet.Append8(static_cast<u8>(phone.ftm().command_code));
-  if (phone.ftm().command_code == kCommandCode59) {
+  const Settings& settings = phone.state<Settings>();
+  packet.Append8(static_cast<u8>(settings.command_code));
+  if (settings.command_code == kCommandCode59) {
     packet.Append16(kLegacySelector);
     packet.Append8(0);  // the length, known when the request is complete
     packet.Append8(0);
   } else {
-    packet.Append8(phone.ftm().subsystem);
+    packet.Append8(settings.subsystem);
     packet.Append16(mode_id);
   }
 }
 
 void BeginHeader(Diag_FTM& phone) {
-  BeginHeader(phone, static_cast<u16>(phone.ftm().mode_id));
+  BeginHeader(phone, static_cast<u16>(phone.state<Settings>().mode_id));
 }
 
 void BeginCommand(Diag_FTM& phone, u16 mode_id, HeaderForm form, u16 command) {
@@ -163,10 +164,11 @@ u16 RequestDataLength(u16 mode_id, u16 command) {
 }
 
 Reply Transmit(Diag_FTM& phone) {
-  if (phone.ftm().command_code == kCommandCode59) return TransmitLegacy(phone);
+  const Settings& settings = phone.state<Settings>();
+  if (settings.command_code == kCommandCode59) return TransmitLegacy(phone);
   phone.packet().set_response_length(0);  // a request that the sequencer keeps has none
-  if (phone.ftm().queue_mode != 0 && phone.ftm().sequencer != nullptr) {
-    return Enqueue(phone, *phone.ftm().sequencer) ? ReplyKind::kExpected : ReplyKind::kNotSent;
+  if (settings.queue_mode != 0 && settings.sequencer != nullptr) {
+    return Enqueue(phone, *settings.sequencer) ? ReplyKind::kExpected : ReplyKind::kNotSent;
   }
   Reply reply = ReplyKind::kNotSent;
   if (ProcessClientRequestPacket(phone, reply) == kLayerSent) return reply ? reply : ReplyKind::kExpected;
@@ -174,7 +176,7 @@ Reply Transmit(Diag_FTM& phone) {
 }
 
 void FtmHeader::Begin(Diag_FTM& phone) const {
-  BeginCommand(phone, static_cast<u16>(phone.ftm().mode_id), HeaderForm::kPlain, command);
+  BeginCommand(phone, static_cast<u16>(phone.state<Settings>().mode_id), HeaderForm::kPlain, command);
 }
 
 Reply FtmHeader::Transmit(Diag_FTM& phone, u32) const {

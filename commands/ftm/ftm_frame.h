@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <span>
 
+#include "commands/ftm_settings.h"
 #include "commands/request.h"
 
 namespace kral {
@@ -28,7 +29,7 @@ enum class HeaderForm : u8 {
 inline constexpr u8 kHeaderFormCount = 3;
 
 // Bytes up to and including the command id.
-size_t HeaderSize(const Diag_FTM& phone);
+size_t HeaderSize(Diag_FTM& phone);
 
 // Resets the default packet buffer and writes the header up to the command id, with the current mode id.
 void BeginHeader(Diag_FTM& phone);

@@ -57,13 +57,13 @@ bool ReadBootFlag(Diag_FTM& phone, bool& is_ftm) {
 }  // namespace
 
 bool SetModeId(Diag_FTM& phone, uint16_t mode_id) {
-  phone.ftm().mode_id = mode_id;
+  phone.state<Settings>().mode_id = mode_id;
   BeginHeader(phone);
   return true;
 }
 
 bool GetModeId(Diag_FTM& phone, uint16_t* mode_id) {
-  Put(mode_id, static_cast<u16>(phone.ftm().mode_id));
+  Put(mode_id, static_cast<u16>(phone.state<Settings>().mode_id));
   return true;
 }
 
@@ -71,24 +71,25 @@ bool SetCommandCode(Diag_FTM& phone, uint16_t code) {
   if (code != kCommandCode59 && code != kCommandCode75) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the command code %d is neither 59 nor 75", code));
   }
-  phone.ftm().command_code = code;
+  phone.state<Settings>().command_code = code;
   return true;
 }
 
 bool GetCommandCode(Diag_FTM& phone, uint16_t* code) {
-  Put(code, static_cast<u16>(phone.ftm().command_code));
+  Put(code, static_cast<u16>(phone.state<Settings>().command_code));
   return true;
 }
 
 bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
   phone.packet().Reset();
-  phone.ftm().last_rf_mode = rf_mode;  // also when the mode is refused below
-  const auto mode_id = ModeIdForRfMode(rf_mode, phone.ftm().mode_id);
+  Settings& settings = phone.state<Settings>();
+  settings.last_rf_mode = rf_mode;  // also when the mode is refused below
+  const auto mode_id = ModeIdForRfMode(rf_mode, settings.mode_id);
   if (!mode_id) {
     phone.log().WriteLine(kLogErr, "KRAL_FTM_SET_MODE() -- RF mode %d has no mode id", rf_mode);
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the RF mode %d is not one of the listed modes, 2 to 92", rf_mode));
   }
-  phone.ftm().mode_id = *mode_id;
+  settings.mode_id = *mode_id;
   const bool sent = static_cast<bool>(Send(phone, kSetMode, rf_mode));
   if (IsGsmMode(rf_mode)) WaitAfterGsmMode(phone);
   return sent;
@@ -110,7 +111,8 @@ Reply SetTxOff(Diag_FTM& phone) {
 
 bool QueryFtm(Diag_FTM& phone, bool& is_ftm) {
   phone.log().WriteLine(kLogFn, "KRAL_IsFTM_Mode()");
-  switch (phone.ftm().command_code) {
+  const uint32_t command_code = phone.state<Settings>().command_code;
+  switch (command_code) {
     case kCommandCode75: {
       u32 state = 0;
       if (!QueryOperatingMode(phone, state)) return false;
@@ -122,7 +124,7 @@ bool QueryFtm(Diag_FTM& phone, bool& is_ftm) {
       return ReadBootFlag(phone, is_ftm);
     default:
       phone.log().WriteLine(kLogErr, "KRAL_IsFTM_Mode() - Invalid Command Mode");
-      return Fail(Failure(KRAL_ERROR_ARGUMENT, "the command code %u is neither 59 nor 75", phone.ftm().command_code));
+      return Fail(Failure(KRAL_ERROR_ARGUMENT, "the command code %u is neither 59 nor 75", command_code));
   }
 }
 
@@ -148,7 +150,7 @@ bool ChangeBootMode(Diag_FTM& phone, uint8_t ftm, uint8_t reset) {
 }
 
 bool ChangeModeRuntime(Diag_FTM& phone, uint8_t ftm) {
-  if (phone.ftm().command_code != kCommandCode75) {
+  if (phone.state<Settings>().command_code != kCommandCode75) {
     phone.log().WriteLine(kLogErr, "KRAL_ChangeFTM_ModeRuntime: Failed: Does not support non FTM_COMMAND_75 mode");
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the mode can be changed with command code 75 only"));
   }

@@ -1,6 +1,6 @@
 // The seam of the FTM sequencer, which can collect requests, record them and hold them back.
 //
-// A connection has none unless one is set in its FtmSettings; requests then go out at once. Sequencer commands of the
+// A connection has none unless one is set in its ftm::Settings; requests then go out at once. Sequencer commands of the
 // caller (mode id 37) are passed on to the handset in that case.
 #ifndef KRAL_COMMANDS_FTM_FTM_SEQUENCER_H
 #define KRAL_COMMANDS_FTM_FTM_SEQUENCER_H

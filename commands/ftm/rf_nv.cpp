@@ -19,8 +19,9 @@ constexpr size_t kStatus = 2;
 constexpr size_t kSize = 4;
 constexpr size_t kData = 6;
 
-bool ReachesDispatchers(const Diag_FTM& phone) {
-  return (phone.ftm().command_code == ftm::kCommandCode75 && phone.ftm().queue_mode == 0) ||
+bool ReachesDispatchers(Diag_FTM& phone) {
+  const ftm::Settings& settings = phone.state<ftm::Settings>();
+  return (settings.command_code == ftm::kCommandCode75 && settings.queue_mode == 0) ||
          Fail(Failure(KRAL_ERROR_ARGUMENT, "RF NV items need command code 75 and no queue"));
 }
 

@@ -15,7 +15,7 @@ namespace kral::nv {
 namespace {
 
 // Moves as many items as a packet takes from the queue into its payload.
-u16 FillPayload(Diag_FTM& phone, std::deque<NvQueueItem>& queue, std::vector<u8>& payload) {
+u16 FillPayload(Diag_FTM& phone, std::deque<QueueItem>& queue, std::vector<u8>& payload) {
   u16 count = 0;
   while (!queue.empty()) {
     const auto& [item, data] = queue.front();
@@ -89,7 +89,7 @@ bool AnswersBatch(std::span<const u8> reply, std::span<const u8> request) {
   return true;
 }
 
-Reply SendPacket(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const u16> read_only, BatchOutcome& outcome,
+Reply SendPacket(Diag_FTM& phone, std::deque<QueueItem>& list, std::span<const u16> read_only, BatchOutcome& outcome,
                  const BatchObserver& observer) {
   std::vector<u8> payload;
   payload.reserve(batch::kPayloadLimit);
@@ -108,13 +108,14 @@ Reply SendPacket(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const
 }  // namespace
 
 void SetBatchMode(Diag_FTM& phone, bool on) {
-  phone.nv_batch().queue.clear();
-  phone.nv_batch().on = on;
+  Batch& batch = phone.state<Batch>();
+  batch.queue.clear();
+  batch.on = on;
 }
 
 void Enqueue(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data) {
   const auto kept = data.first(std::min(data.size(), kDataSize));
-  auto& queue = phone.nv_batch().queue;
+  auto& queue = phone.state<Batch>().queue;
   queue.push_back({item, {kept.begin(), kept.end()}});
   phone.log().WriteLine(kLogRet, "DIAG_NV_Add_WRITE_QueueItem(iItemID = %d, iLength = %d)", item,
                         static_cast<int>(kept.size()));
@@ -122,13 +123,13 @@ void Enqueue(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data) {
 }
 
 void SetReadOnlyList(Diag_FTM& phone, std::span<const uint16_t> items) {
-  phone.nv_batch().read_only.assign(items.begin(), items.end());
+  phone.state<Batch>().read_only.assign(items.begin(), items.end());
   for (const uint16_t item : items) {
     phone.log().WriteLine(kLogRet, "KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List( ) -- Adding NV ID #%d", item);
   }
 }
 
-Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const uint16_t> read_only,
+Reply WriteBatch(Diag_FTM& phone, std::deque<QueueItem>& list, std::span<const uint16_t> read_only,
                  BatchOutcome& outcome, const BatchObserver& observer) {
   outcome = {};
   Reply reply(ReplyKind::kExpected);  // of nothing to send, too
@@ -140,7 +141,7 @@ Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const
 
 bool FlushBatchQueue(Diag_FTM& phone, BatchOutcome& outcome, const BatchObserver& observer) {
   const AtExit end([&phone] { SetBatchMode(phone, false); });
-  NvBatch& callers = phone.nv_batch();
+  Batch& callers = phone.state<Batch>();
   phone.log().WriteLine(kLogRet, "KRAL_DIAG_NV_WRITE_FlushBatchQueue( ) -- Queue size = %d",
                         static_cast<int>(callers.queue.size()));
   const Reply reply = WriteBatch(phone, callers.queue, callers.read_only, outcome, observer);

@@ -6,10 +6,23 @@
 #include <deque>
 #include <functional>
 #include <span>
+#include <vector>
 
 #include "frame/diag_ftm.h"
 
 namespace kral::nv {
+
+struct QueueItem {
+  uint16_t item;
+  std::vector<uint8_t> data;  // at most 128 bytes
+};
+
+// NV writes collected for few packets.
+struct Batch {
+  bool on = false;
+  std::deque<QueueItem> queue;
+  std::vector<uint16_t> read_only;  // items whose refusal as read-only is no error
+};
 
 // Clears the queue; the read-only list stays.
 void SetBatchMode(Diag_FTM& phone, bool on);
@@ -30,7 +43,7 @@ using BatchObserver = std::function<void(uint16_t item, uint8_t status)>;
 // Sends a list of items, which it empties packet by packet. The reply is the expected one when all packets were
 // answered in full, up to the first failing item: the outcome has its status. An item of `read_only` does not fail by
 // being refused as such.
-Reply WriteBatch(Diag_FTM& phone, std::deque<NvQueueItem>& list, std::span<const uint16_t> read_only,
+Reply WriteBatch(Diag_FTM& phone, std::deque<QueueItem>& list, std::span<const uint16_t> read_only,
                  BatchOutcome& outcome, const BatchObserver& observer = {});
 
 // Sends what is queued and leaves batch mode, whatever happens. True when every item was answered and none failed;

@@ -41,7 +41,7 @@ bool Write(Diag_FTM& phone, uint16_t item, std::span<const uint8_t> data, uint16
   phone.log().WriteLine(kral::kLogFn, "KRAL_DIAG_NV_WRITE_F (iItemID = %d , pItemData[0] = %d, iLength = %d)", item,
                         data.empty() ? 0 : data[0], static_cast<int>(data.size()));
   uint16_t reported = nv::kDone;
-  if (phone.nv_batch().on) {
+  if (phone.state<nv::Batch>().on) {
     nv::Enqueue(phone, item, data);
   } else if (!nv::Write(phone, item, data, reported)) {
     return false;

@@ -3,6 +3,7 @@
 #ifndef KRAL_DOWNLOAD_BOOT_KIVRAT_H
 #define KRAL_DOWNLOAD_BOOT_KIVRAT_H
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <optional>
@@ -11,6 +12,15 @@
 #include "frame/diag_ftm.h"
 
 namespace kral::kivrat {
+
+// The atomic ones are set from any thread; what has begun goes on with the former values.
+struct Settings {
+  std::atomic<uint32_t> hello_retries{0};
+  std::atomic<uint32_t> retry_delay_ms{500};
+  std::atomic<uint32_t> pre_done_delay_ms{0};
+  uint32_t read_time_out_ms = 5000;  // these two are shorter in tests only
+  uint32_t settle_ms = 500;
+};
 
 // Told after every piece: bytes served, bytes of the file. False gives the transfer up.
 using Progress = std::function<bool(uint64_t done, uint64_t total)>;

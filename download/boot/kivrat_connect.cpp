@@ -15,7 +15,7 @@ constexpr const char* kReadFailed = "Failed to read the Port buffer\n";
 class Greeter {
  public:
   Greeter(Diag_FTM& phone, const Stop& stop) : phone_(phone), port_(phone) {
-    port_.SetReadTimeOut(phone.kivrat().read_time_out_ms);
+    port_.SetReadTimeOut(phone.state<Settings>().read_time_out_ms);
     port_.SetStop(stop);
   }
 
@@ -53,13 +53,13 @@ class Greeter {
 
   // Silence, and a port that is not there (yet), are all that the retries are for.
   bool AwaitFirstHello(Hello& hello) {
-    for (uint32_t retries = phone_.kivrat().hello_retries;; --retries) {
+    for (uint32_t retries = phone_.state<Settings>().hello_retries;; --retries) {
       const Heard heard = port_.Open() ? ReadHello(hello) : Heard::kNothing;
       if (heard == Heard::kHello) return true;
       if (!phone_.port_borrowed()) Fail("Failed KivratInit()", port_.NotOpened());
       if (heard == Heard::kOther || retries == 0 || port_.stopped()) return false;
       if (port_.gone()) port_.GiveBack();  // it may come back as another device
-      port_.Pause(phone_.kivrat().retry_delay_ms);
+      port_.Pause(phone_.state<Settings>().retry_delay_ms);
     }
   }
 
@@ -132,7 +132,7 @@ class Greeter {
     Clock& clock = phone_.clock();
     const uint32_t start = clock.TickMs();
     std::array<uint8_t, 1024> waste{};
-    while (rest > 0 && clock.TickMs() - start < phone_.kivrat().read_time_out_ms) {
+    while (rest > 0 && clock.TickMs() - start < phone_.state<Settings>().read_time_out_ms) {
       const auto piece = std::span(waste).first(std::min(rest, waste.size()));
       if (port_.Read(piece) != piece.size()) return;
       rest -= piece.size();

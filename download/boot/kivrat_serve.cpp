@@ -18,7 +18,7 @@ class Server {
  public:
   Server(Diag_FTM& phone, const Progress& progress, const Stop& stop)
       : phone_(phone), progress_(progress), port_(phone), packet_(kPacketBuffer), piece_(kPacketBuffer) {
-    port_.SetReadTimeOut(phone.kivrat().read_time_out_ms);
+    port_.SetReadTimeOut(phone.state<Settings>().read_time_out_ms);
     port_.SetStop(stop);
   }
 
@@ -132,7 +132,7 @@ class Server {
   bool GoesOn() { return !progress_ || progress_(served_, std::max(served_, file_.size())) || Abort(); }
 
   bool Finish() {
-    if (const uint32_t delay = phone_.kivrat().pre_done_delay_ms) {
+    if (const uint32_t delay = phone_.state<Settings>().pre_done_delay_ms) {
       phone_.log().WriteLine(kLogRet, "Waiting %d ms before Kivrat Done", static_cast<int>(delay));
       port_.Pause(delay);
       if (port_.stopped()) return Abort();
@@ -155,7 +155,7 @@ class Server {
     if (!IsPacket(response, kDoneResponse)) return RefuseLength(Field(response, kLengthAt));
     phone_.log().WriteLine(kLogRet, "Kivrat: image transfer status %u", Field(response, kDoneStatusAt));
     phone_.log().WriteLine(kLogRet, "Flash programmer successfully downloaded using Kivrat Protocol!\n");
-    phone_.clock().SleepMs(phone_.kivrat().settle_ms);
+    phone_.clock().SleepMs(phone_.state<Settings>().settle_ms);
     return true;
   }
 

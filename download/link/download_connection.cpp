@@ -58,7 +58,8 @@ DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const u
 }
 
 void DownloadConnection::BeginWork() {
-  if (!phone_.download().keep_abort) phone_.download().abort = false;
+  Settings& settings = phone_.state<Settings>();
+  if (!settings.keep_abort) settings.abort = false;
   reported_ = false;
 }
 
@@ -75,9 +76,10 @@ void DownloadConnection::Report(uint32_t done, uint32_t total) {
   if (reported_ && done == last_report_) return;
   reported_ = true;
   last_report_ = done;
-  const auto callback = phone_.download().progress_callback.load();
+  const Settings& settings = phone_.state<Settings>();
+  const auto callback = settings.progress_callback.load();
   if (callback == nullptr) return;
-  const uintptr_t value = phone_.download().callback_value;
+  const uintptr_t value = settings.callback_value;
   CallGuarded([&] { callback(phone_.handle(), done, total, value); });
 }
 

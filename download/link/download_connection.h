@@ -9,6 +9,7 @@
 #include <span>
 #include <vector>
 
+#include "download/link/download_settings.h"
 #include "frame/diag_ftm.h"
 
 namespace kral::download {
@@ -34,7 +35,7 @@ class DownloadConnection {
   void ForgetReplies() { phone_.transport().ForgetReplies(); }
 
   uint32_t time_out_ms() const { return phone_.TimeOut(kTimeOutDefaultCommand); }
-  uint32_t acknowledge_ms() const { return std::min(time_out_ms(), phone_.download().acknowledge_limit_ms); }
+  uint32_t acknowledge_ms() const { return std::min(time_out_ms(), phone_.state<Settings>().acknowledge_limit_ms); }
   DataLogFileHandler& log() { return phone_.log(); }
   PacketQueue& responses() { return phone_.responses(); }
   Clock& clock() { return phone_.clock(); }
@@ -43,7 +44,7 @@ class DownloadConnection {
 
   // --- The caller ---
   void BeginWork();  // forgets an abort that came before
-  bool aborted() const { return phone_.download().abort; }
+  bool aborted() const { return phone_.state<Settings>().abort; }
   bool Pause(uint32_t milliseconds);  // false when an abort ended it
   // Tells the caller, on the caller's own thread. Nothing for a figure that was told already.
   void Report(uint32_t done, uint32_t total);

@@ -57,7 +57,7 @@ std::optional<HelloReply> ParseHelloReply(std::span<const uint8_t> reply) {
   return HelloReply{*block_size, *window};
 }
 
-std::optional<HelloReply> Hello(download::DownloadConnection& connection, const DownloadSettings& settings,
+std::optional<HelloReply> Hello(download::DownloadConnection& connection, const download::Settings& settings,
                                 uint32_t variant) {
   auto& log = connection.log();
   const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);

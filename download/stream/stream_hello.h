@@ -18,8 +18,8 @@ struct HelloReply {
 
 inline constexpr uint32_t kHelloVariant = 1;
 
-// Tries up to phone.download().hello_tries times. Variant 2 is a hook that always fails, as every other number does.
-std::optional<HelloReply> Hello(download::DownloadConnection& connection, const DownloadSettings& settings,
+// Tries up to settings.hello_tries times. Variant 2 is a hook that always fails, as every other number does.
+std::optional<HelloReply> Hello(download::DownloadConnection& connection, const download::Settings& settings,
                                 uint32_t variant);
 
 // What the reply says, if it is one. Every length in it is checked first.

@@ -28,7 +28,7 @@ struct Wanted {
 
 // The ids of the range, and beyond it those that are defined. Elements can be named in subscription 0 only.
 std::vector<Wanted> WantedItems(Diag_FTM& phone) {
-  const PkvSettings& settings = phone.pkv();
+  const Settings& settings = phone.state<Settings>();
   auto highest_elements = DefinedItems(phone);
   for (uint32_t id = settings.first_item; id <= settings.last_item; ++id) {
     highest_elements.emplace(static_cast<uint16_t>(id), uint16_t{0});
@@ -126,7 +126,7 @@ class BackupJob {
 uint32_t Backup(Diag_FTM& phone, const std::string& path) {
   const efs::AbortWatch aborts(phone);
   pkv::PkvSet set;
-  phone.pkv().counts = {};
+  phone.state<Settings>().counts = {};
   // Before the many requests that would otherwise be in vain.
   if (const std::error_code error = AtomicFile().Open(path)) {
     phone.log().WriteLine(kLogErr, "%s: %s", path.c_str(), error.message().c_str());

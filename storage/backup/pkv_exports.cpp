@@ -65,25 +65,26 @@ bool IsToldByWhatWasNoted(uint32_t status, const KRAL_PKV_COUNTS& counts) {
 
 bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
   kral::Put(status, uint32_t{KRAL_PKV_STATUS_UNEXPECTED});
-  if (phone.pkv().running) {
+  backup::Settings& settings = phone.state<backup::Settings>();
+  if (settings.running) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "a backup, restore or comparison is under way")
                     .Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_UNEXPECTED));
   }
-  const Running running(phone.pkv().running);
+  const Running running(settings.running);
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   if (result == KRAL_PKV_STATUS_DONE) return true;
-  if (kral::IsFailureNoted() && IsToldByWhatWasNoted(result, phone.pkv().counts)) return false;
-  return Fail(Judgement(result, TextOrEmpty(file), phone.pkv().counts).Status(KRAL_ERROR_STATUS_RESULT, result));
+  if (kral::IsFailureNoted() && IsToldByWhatWasNoted(result, settings.counts)) return false;
+  return Fail(Judgement(result, TextOrEmpty(file), settings.counts).Status(KRAL_ERROR_STATUS_RESULT, result));
 }
 
 bool SetCallback(Diag_FTM& phone, KRAL_PKV_CALLBACK callback) {
-  phone.pkv().callback = callback;
+  phone.state<backup::Settings>().callback = callback;
   return true;
 }
 
 bool GetCounts(Diag_FTM& phone, KRAL_PKV_COUNTS* counts) {
-  kral::Put(counts, phone.pkv().counts);
+  kral::Put(counts, phone.state<backup::Settings>().counts);
   return true;
 }
 

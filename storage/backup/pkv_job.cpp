@@ -35,25 +35,25 @@ bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, u
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "items %d to %d in %d subscriptions cannot be backed up", first_item,
                         last_item, subscriptions));
   }
-  phone.pkv().first_item = first_item;
-  phone.pkv().last_item = last_item;
-  phone.pkv().subscriptions = subscriptions;
+  Settings& settings = phone.state<Settings>();
+  settings.first_item = first_item;
+  settings.last_item = last_item;
+  settings.subscriptions = subscriptions;
   return true;
 }
 
 JobReport::JobReport(Diag_FTM& phone, const efs::AbortWatch& aborts, size_t total, size_t passed_over)
-    : phone_(phone), aborts_(aborts), passed_over_(static_cast<uint32_t>(passed_over)) {
-  phone.pkv().counts = {};
-  phone.pkv().counts.total = static_cast<uint32_t>(total + passed_over);
-  phone.pkv().counts.skipped = passed_over_;
+    : phone_(phone),
+      settings_(phone.state<Settings>()),
+      aborts_(aborts),
+      passed_over_(static_cast<uint32_t>(passed_over)) {
+  settings_.counts = {};
+  settings_.counts.total = static_cast<uint32_t>(total + passed_over);
+  settings_.counts.skipped = passed_over_;
 }
 
 JobReport::~JobReport() {
-  phone_.pkv().counts.not_reached += phone_.pkv().counts.total - passed_over_ - reported_;
-}
-
-const KRAL_PKV_COUNTS& JobReport::counts() const {
-  return phone_.pkv().counts;
+  settings_.counts.not_reached += settings_.counts.total - passed_over_ - reported_;
 }
 
 void JobReport::Add(const pkv::PkvNvItem& item, uint32_t result, uint32_t status) {
@@ -67,11 +67,11 @@ void JobReport::Add(const pkv::PkvEfsFile& file, uint32_t result, uint32_t statu
 }
 
 void JobReport::Add(KRAL_PKV_ITEM& record, const char* path) {
-  KRAL_PKV_COUNTS& counts = phone_.pkv().counts;
+  KRAL_PKV_COUNTS& counts = settings_.counts;
   ++*CounterOf(counts, record.result);
   ++reported_;
   if (stopped()) return;
-  const auto callback = phone_.pkv().callback.load();
+  const auto callback = settings_.callback.load();
   if (callback == nullptr) return;
   // One that fails does not say that it is to go on.
   uint8_t go_on = 0;
@@ -103,7 +103,7 @@ void NoteFile(Diag_FTM& phone, const pkv::PkvOutcome& outcome) {
 }
 
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, pkv::PkvSet& set) {
-  phone.pkv().counts = {};
+  phone.state<Settings>().counts = {};
   const pkv::PkvOutcome outcome = pkv::ReadPkv(path, set);
   if (!outcome.done()) NoteFile(phone, outcome);
   pkv::LogUnread(phone.log(), path, set);

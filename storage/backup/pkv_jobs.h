@@ -2,6 +2,7 @@
 #ifndef KRAL_STORAGE_BACKUP_PKV_JOBS_H
 #define KRAL_STORAGE_BACKUP_PKV_JOBS_H
 
+#include <atomic>
 #include <cstdint>
 #include <map>
 #include <optional>
@@ -9,11 +10,22 @@
 #include <string>
 
 #include "frame/diag_ftm.h"
+#include "kral/pkv.h"
 #include "storage/efs/efs_client.h"
 #include "storage/nv/nv_definitions.h"
 #include "storage/pkv/pkv_set.h"
 
 namespace kral::backup {
+
+// What backups read, and what became of the last one's items.
+struct Settings {
+  std::atomic<KRAL_PKV_CALLBACK> callback{nullptr};  // set from any thread
+  uint16_t first_item = 0;
+  uint16_t last_item = 9999;
+  uint16_t subscriptions = 1;
+  KRAL_PKV_COUNTS counts{};
+  bool running = false;  // a backup, restore or comparison: its callback must not begin another one
+};
 
 uint32_t Backup(Diag_FTM& phone, const std::string& path);   // pkv_backup.cpp
 uint32_t Restore(Diag_FTM& phone, const std::string& path);  // pkv_restore.cpp
@@ -36,12 +48,13 @@ class JobReport {
   void Add(const pkv::PkvNvItem& item, uint32_t result, uint32_t status);
   void Add(const pkv::PkvEfsFile& file, uint32_t result, uint32_t status);
   bool stopped() const { return stopped_ || aborts_.aborted(); }
-  const KRAL_PKV_COUNTS& counts() const;
+  const KRAL_PKV_COUNTS& counts() const { return settings_.counts; }
 
  private:
   void Add(KRAL_PKV_ITEM& record, const char* path);
 
   Diag_FTM& phone_;
+  Settings& settings_;
   const efs::AbortWatch& aborts_;
   const uint32_t passed_over_;
   uint32_t reported_ = 0;

@@ -7,6 +7,7 @@
 
 #include "frame/diag_ftm.h"
 #include "kral/efs.h"
+#include "storage/efs/efs_settings.h"
 #include "transport/engine/reply.h"
 
 namespace kral::efs {
@@ -20,7 +21,7 @@ bool Abort(Diag_FTM& phone);
 // What is made of many transfers and listings, each of which forgets earlier calls of Abort, ends with one of them.
 class AbortWatch {
  public:
-  explicit AbortWatch(Diag_FTM& phone) : aborts_(phone.efs().aborts), before_(aborts_) {}
+  explicit AbortWatch(Diag_FTM& phone) : aborts_(phone.state<Settings>().aborts), before_(aborts_) {}
   bool aborted() const { return aborts_ != before_; }  // since this was made
 
  private:

@@ -55,12 +55,12 @@ bool RemoteHandle::Close() {
   const bool closed = CloseHandle(phone_, close_, value_, time_out_ms_);
   CloseStrays(phone_);
   // As with strays.
-  if (!closed && phone_.efs().gave_up) handles_.strays.push_back(value_);
+  if (!closed && phone_.state<Settings>().gave_up) handles_.strays.push_back(value_);
   return closed;
 }
 
 RemoteFile::RemoteFile(Diag_FTM& phone, const char* path)
-    : RemoteHandle(phone, kClose, phone.efs().files, DefaultTimeOut(phone)), path_(TextOrEmpty(path)) {}
+    : RemoteHandle(phone, kClose, phone.state<Settings>().files, DefaultTimeOut(phone)), path_(TextOrEmpty(path)) {}
 
 bool RemoteFile::CanOpen(Diag_FTM& phone, const char* path) {
   Compose(phone, kOpen, kOpenToRead, kModeOfReading, PathField(path));
@@ -77,7 +77,7 @@ bool RemoteFile::Open(u32 flags, u32 mode) {
 }
 
 RemoteDirectory::RemoteDirectory(Diag_FTM& phone)
-    : RemoteHandle(phone, kCloseDirectory, phone.efs().directories, PacketTimeOut(phone)) {}
+    : RemoteHandle(phone, kCloseDirectory, phone.state<Settings>().directories, PacketTimeOut(phone)) {}
 
 bool RemoteDirectory::Open(const char* path) {
   Compose(phone_, kOpenDirectory, PathField(path));

@@ -3,6 +3,7 @@
 #define KRAL_STORAGE_EFS_EFS_HANDLE_H
 
 #include "storage/efs/efs_format.h"
+#include "storage/efs/efs_settings.h"
 
 namespace kral::efs {
 
@@ -16,7 +17,7 @@ class RemoteHandle {
   u32 value() const { return value_; }
 
  protected:
-  RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, EfsOpenHandles& handles, u32 time_out_ms)
+  RemoteHandle(Diag_FTM& phone, const EfsRequest<u32>& close, OpenHandles& handles, u32 time_out_ms)
       : phone_(phone), close_(close), handles_(handles), time_out_ms_(time_out_ms) {}
 
   // Sends the opening request of a path that the phone's packet buffer holds.
@@ -26,7 +27,7 @@ class RemoteHandle {
 
  private:
   const EfsRequest<u32> close_;
-  EfsOpenHandles& handles_;  // of this kind
+  OpenHandles& handles_;  // of this kind
   const u32 time_out_ms_;
   u32 value_ = 0;
   bool open_ = false;

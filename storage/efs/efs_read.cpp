@@ -53,7 +53,7 @@ bool EndedEarly(Diag_FTM& phone, const char* efs_file, u32 offset, u32 total) {
 
 // False also when the transfer was aborted, and when the file turned out shorter than the handset told.
 bool ReadChunks(Diag_FTM& phone, const RemoteFile& file, u32 total, const Sink& sink) {
-  const u16 packet_size = phone.efs().read_packet_size;
+  const u16 packet_size = phone.state<Settings>().read_packet_size;
   const u32 wanted = packet_size - std::min<u32>(packet_size, kReadOverhead);
   // A larger size works for files that do not fill a packet.
   if (wanted == 0 || kReadOverhead + std::min(wanted, total) > kLongestReply) {

@@ -44,7 +44,8 @@ class RequestScope {
  public:
   explicit RequestScope(Diag_FTM& phone) : phone_(phone) {
     if (phone.server_mode()) return;  // there is no transport of ours
-    phone.transport().SetAbort(phone.efs().abort ? nullptr : &phone.efs().abort);
+    const std::atomic<bool>& abort = phone.state<Settings>().abort;
+    phone.transport().SetAbort(abort ? nullptr : &abort);
     phone.transport().SetForgotten([&phone](std::span<const u8> late) { NoteLateReply(phone, late); });
   }
   ~RequestScope() {
@@ -59,13 +60,13 @@ class RequestScope {
   Diag_FTM& phone_;
 };
 
-void CloseStrays(Diag_FTM& phone, const EfsRequest<u32>& close, EfsOpenHandles& handles) {
+void CloseStrays(Diag_FTM& phone, const EfsRequest<u32>& close, OpenHandles& handles) {
   for (const u32 value : std::exchange(handles.strays, {})) {
     phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
     const KeepFailure keep;
     const bool closed = CloseHandle(phone, close, value, DefaultTimeOut(phone));
     // After an abort a silent handset is not waited for: it is told with the next operation.
-    if (!closed && phone.efs().gave_up) handles.strays.push_back(value);
+    if (!closed && phone.state<Settings>().gave_up) handles.strays.push_back(value);
   }
 }
 
@@ -120,7 +121,7 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     // Where nothing more comes, that was the answer.
     if (reply.kind() == ReplyKind::kNone) Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
   }
-  if (reply.kind() == ReplyKind::kAborted) phone.efs().gave_up = true;
+  if (reply.kind() == ReplyKind::kAborted) phone.state<Settings>().gave_up = true;
   return reply;
 }
 
@@ -148,12 +149,13 @@ Reply AskComposed(Diag_FTM& phone, Tries tries) {
 }
 
 void ForgetAbort(Diag_FTM& phone) {
-  phone.efs().abort = false;
-  phone.efs().gave_up = false;
+  Settings& settings = phone.state<Settings>();
+  settings.abort = false;
+  settings.gave_up = false;
 }
 
 Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms) {
-  if (!phone.efs().gave_up) return ExchangePacket(phone, packet, time_out_ms);
+  if (!phone.state<Settings>().gave_up) return ExchangePacket(phone, packet, time_out_ms);
   constexpr u32 kMomentMs = 50;
   const auto request = packet.request();
   const auto is_own = [&](std::span<const u8> reply) { return IsOwnReply(request, reply, {}); };
@@ -165,11 +167,11 @@ Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms) {
 }
 
 int CleanUpTries(Diag_FTM& phone) {
-  return phone.efs().gave_up ? 1 : kTries;
+  return phone.state<Settings>().gave_up ? 1 : kTries;
 }
 
 bool IsAborted(Diag_FTM& phone, const char* operation) {
-  if (!phone.efs().abort) return false;
+  if (!phone.state<Settings>().abort) return false;
   phone.log().WriteLine(kLogErr, "EFS %s aborted", operation);
   Fail(Failure(KRAL_ERROR_ABORTED, "the %s was aborted", operation));
   return true;
@@ -201,8 +203,9 @@ bool Contradicts(Diag_FTM& phone) {
 }
 
 void CloseStrays(Diag_FTM& phone) {
-  CloseStrays(phone, kClose, phone.efs().files);
-  CloseStrays(phone, kCloseDirectory, phone.efs().directories);
+  Settings& settings = phone.state<Settings>();
+  CloseStrays(phone, kClose, settings.files);
+  CloseStrays(phone, kCloseDirectory, settings.directories);
 }
 
 bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms) {

@@ -10,6 +10,7 @@
 #include "commands/checked_reply.h"
 #include "frame/request_failure.h"
 #include "storage/efs/efs_format.h"
+#include "storage/efs/efs_settings.h"
 
 namespace kral::efs {
 
@@ -62,7 +63,7 @@ inline u32 DefaultTimeOut(const Diag_FTM& phone) {
   return phone.TimeOut(kTimeOutDefaultCommand);
 }
 inline u32 PacketTimeOut(Diag_FTM& phone) {
-  return phone.efs().packet_time_out_ms;
+  return phone.state<Settings>().packet_time_out_ms;
 }
 
 // Closes what late replies have named. The request and the reply in the phone's default packet buffer stay.

@@ -8,21 +8,23 @@ namespace kral::efs {
 
 bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size) {
   // Not tested here: a size that cannot work fails the transfer that uses it.
-  phone.efs().read_packet_size = read_size;
-  phone.efs().write_packet_size = write_size;
+  Settings& settings = phone.state<Settings>();
+  settings.read_packet_size = read_size;
+  settings.write_packet_size = write_size;
   return true;
 }
 
 bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
                   KRAL_EFS_DIRECTORY_CALLBACK directory) {
-  phone.efs().callback_context = context;
-  phone.efs().transfer_callback = transfer;
-  phone.efs().directory_callback = directory;
+  Settings& settings = phone.state<Settings>();
+  settings.callback_context = context;
+  settings.transfer_callback = transfer;
+  settings.directory_callback = directory;
   return true;
 }
 
 Progress CallersProgress(Diag_FTM& phone, const void* source, const void* destination) {
-  return [&settings = phone.efs(), from = reinterpret_cast<uintptr_t>(source),
+  return [&settings = phone.state<Settings>(), from = reinterpret_cast<uintptr_t>(source),
           to = reinterpret_cast<uintptr_t>(destination)](u32 operation, u32 done, u32 total) {
     if (const auto callback = settings.transfer_callback.load()) {
       const KRAL_HANDLE context = settings.callback_context;
@@ -32,14 +34,16 @@ Progress CallersProgress(Diag_FTM& phone, const void* source, const void* destin
 }
 
 void TellCaller(Diag_FTM& phone, const KRAL_EFS_ENTRY& entry) {
-  if (const auto callback = phone.efs().directory_callback.load()) {
-    CallGuarded([&] { callback(&entry, phone.efs().callback_context); });
+  const Settings& settings = phone.state<Settings>();
+  if (const auto callback = settings.directory_callback.load()) {
+    CallGuarded([&] { callback(&entry, settings.callback_context); });
   }
 }
 
 bool Abort(Diag_FTM& phone) {
-  ++phone.efs().aborts;
-  phone.efs().abort = true;
+  Settings& settings = phone.state<Settings>();
+  ++settings.aborts;
+  settings.abort = true;
   phone.responses().EndWaits();
   return true;
 }

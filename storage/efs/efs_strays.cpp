@@ -16,11 +16,11 @@ constexpr int kMostLateReplies = 64;  // a handset that never stops talking is n
 
 struct Kind {
   u16 open;
-  EfsOpenHandles EfsSettings::*handles;
+  OpenHandles Settings::*handles;
 };
 constexpr Kind kKinds[] = {
-    {kOpen.header.command, &EfsSettings::files},
-    {kOpenDirectory.header.command, &EfsSettings::directories},
+    {kOpen.header.command, &Settings::files},
+    {kOpenDirectory.header.command, &Settings::directories},
 };
 
 }  // namespace
@@ -36,7 +36,7 @@ void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply) {
   const auto opened = ReadOpened(reply);
   if (!opened || reply[0] != kSubsystemDispatch || reply[1] != kSubsystem) return;
   for (const Kind& kind : kKinds) {
-    EfsOpenHandles& handles = phone.efs().*kind.handles;
+    OpenHandles& handles = phone.state<Settings>().*kind.handles;
     if (LoadLe<u16>(reply, 2) != kind.open || handles.unanswered == 0) continue;
     if (opened->error == kDone && handles.in_use == opened->value) return;  // an answer that came twice
     --handles.unanswered;
@@ -44,7 +44,7 @@ void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply) {
   }
 }
 
-bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count) {
+bool AwaitLateAnswers(Diag_FTM& phone, const OpenHandles& handles, u32 count) {
   const u32 left = handles.unanswered - std::min(count, handles.unanswered);
   // Through a phone server no reply comes unasked.
   for (int i = 0; i < kMostLateReplies && handles.unanswered > left && !phone.server_mode(); ++i) {

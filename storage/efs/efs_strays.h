@@ -4,6 +4,7 @@
 #define KRAL_STORAGE_EFS_EFS_STRAYS_H
 
 #include "storage/efs/efs_format.h"
+#include "storage/efs/efs_settings.h"
 
 namespace kral::efs {
 
@@ -17,7 +18,7 @@ std::optional<Opened> ReadOpened(std::span<const u8> reply);
 // Looks at a reply that was not waited for.
 void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply);
 // Waits a moment for the answers to so many opening requests that were given up. False (logged) when not all came.
-bool AwaitLateAnswers(Diag_FTM& phone, const EfsOpenHandles& handles, u32 count);
+bool AwaitLateAnswers(Diag_FTM& phone, const OpenHandles& handles, u32 count);
 
 }  // namespace kral::efs
 

@@ -90,15 +90,16 @@ bool WriteChunk(Diag_FTM& phone, const RemoteFile& file, u32 offset, std::span<c
 
 // True also when the transfer was aborted.
 bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, u16 packet_size, const Source& source) {
+  const std::atomic<bool>& abort = phone.state<Settings>().abort;
   std::vector<u8> buffer(packet_size - kWriteOverhead);
-  for (u32 offset = 0; offset < source.size && !phone.efs().abort;) {
+  for (u32 offset = 0; offset < source.size && !abort;) {
     const auto chunk = std::span(buffer).first(std::min<size_t>(buffer.size(), source.size - offset));
     if (!source.read(offset, chunk)) {
       phone.log().WriteLine(kLogErr, "EFS Write: the local file cannot be read at %u", offset);
       return false;
     }
     u32 written = 0;
-    if (!WriteChunk(phone, file, offset, chunk, written)) return phone.efs().abort;
+    if (!WriteChunk(phone, file, offset, chunk, written)) return abort;
     offset += written;
     phone.log().WriteLine(kLogRet, " EFS Write Transferred %u / %u bytes", offset, source.size);
     Tell(source.progress, KRAL_EFS_OPERATION_WRITE, offset, source.size);
@@ -109,7 +110,7 @@ bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, u16 packet_size, const
 bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
   if (efs_file == nullptr) efs_file = "";
   // The handset's old file goes with the next steps, so everything that can be known to fail has failed before.
-  const u16 packet_size = phone.efs().write_packet_size;
+  const u16 packet_size = phone.state<Settings>().write_packet_size;
   if (!RemoteFile::CanOpen(phone, efs_file) || !IsUsable(phone, packet_size)) return false;
   if (!HasRoom(phone, source.size) || IsAborted(phone, "Write") || !RemoveItemFile(phone, efs_file)) return false;
   RemoteFile file(phone, efs_file);

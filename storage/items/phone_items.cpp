@@ -68,7 +68,7 @@ PhoneItems::Answer PhoneItems::WriteBatch(std::span<const pkv::PkvNvItem> items,
                                           std::vector<uint16_t>& statuses) {
   return Try([&] {
     statuses.clear();
-    std::deque<NvQueueItem> list;
+    std::deque<nv::QueueItem> list;
     for (const pkv::PkvNvItem& item : items) list.push_back({item.id, WireData(item, is_element(item))});
     bool ours = true;
     nv::BatchOutcome outcome;
@@ -81,7 +81,7 @@ PhoneItems::Answer PhoneItems::WriteBatch(std::span<const pkv::PkvNvItem> items,
 }
 
 bool PhoneItems::MayBeReadOnly(uint16_t id) const {
-  const auto& list = phone_.nv_batch().read_only;
+  const auto& list = phone_.state<nv::Batch>().read_only;
   return std::find(list.begin(), list.end(), id) != list.end();
 }
 

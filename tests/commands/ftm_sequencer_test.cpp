@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "commands/ftm_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "tests/support/ftm_fixture.h"
@@ -60,7 +61,7 @@ class SequencerTest : public test::FtmTest {
     settings().sequencer = nullptr;
     FtmTest::TearDown();
   }
-  FtmSettings& settings() { return Kral_ResourceManager::GetPhone(handle())->ftm(); }
+  ftm::Settings& settings() { return Kral_ResourceManager::GetPhone(handle())->state<ftm::Settings>(); }
   FakeSequencer sequencer_;
 };
 

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "commands/ftm_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "tests/support/ftm_command_rows.h"
@@ -252,7 +253,7 @@ TEST_F(FtmTest, RfModesKeepTheIdsOfTheirGroupAndReplaceAllOthers) {
   EXPECT_EQ(Traffic(), 0u);
   EXPECT_EQ(ModeId(), 2);
   // The refused mode is stored all the same.
-  EXPECT_EQ(Kral_ResourceManager::GetPhone(handle())->ftm().last_rf_mode, 299);
+  EXPECT_EQ(Kral_ResourceManager::GetPhone(handle())->state<ftm::Settings>().last_rf_mode, 299);
 }
 
 TEST_F(FtmTest, GsmModesWaitForTheTransceiver) {

@@ -4,6 +4,8 @@
 
 #include <array>
 
+#include "download/boot/kivrat.h"
+#include "download/link/download_settings.h"
 #include "frame/diag_ftm.h"
 #include "handset/loaders/software_image.h"
 #include "kral/kral.h"
@@ -29,9 +31,9 @@ class FlashAll : public testing::Test {
     handle_ = handle;
     KRAL_SetReceiveMode(handle_, 1);
     phone_ = Kral_ResourceManager::GetPhone(handle_);
-    phone_->kivrat().settle_ms = 0;
-    phone_->kivrat().read_time_out_ms = 200;
-    phone_->download().handshake_limit_ms = 100;
+    phone_->state<kivrat::Settings>().settle_ms = 0;
+    phone_->state<kivrat::Settings>().read_time_out_ms = 200;
+    phone_->state<download::Settings>().handshake_limit_ms = 100;
     KRAL_STREAM_ConfigureHello(handle_, 1, 0);
     KRAL_ConfigureDownloadCallBack(handle_, &FlashAll::OnProgress, reinterpret_cast<uintptr_t>(this));
   }

@@ -143,7 +143,7 @@ TEST_F(KivratWire, IdentityNeedsItsSecondWordOnly) {
 TEST_F(KivratWire, IdentityDataThatComeLateAreNotTakenForTheHello) {
   Bytes late = FromHex(kIdentity);
   Target({kHello, kReady, ExecuteResponse("30"), kIdentity});
-  phone_->kivrat().read_time_out_ms = 5000;
+  phone_->state<kivrat::Settings>().read_time_out_ms = 5000;
   // They come while they are waited for, else right in front of the hello.
   const kivrat::Stop come_late = [&] {
     if (says_.empty()) wire_.ToHost(std::exchange(late, {}));
@@ -217,14 +217,14 @@ TEST_F(KivratWire, FailedWritesAreToldOfTheirPacket) {
 
 TEST_F(KivratWire, HelloRetriesWaitForATargetThatIsLate) {
   ASSERT_TRUE(phone_->BorrowPort());
-  phone_->kivrat().hello_retries = 3;
-  phone_->kivrat().retry_delay_ms = 1;
+  phone_->state<kivrat::Settings>().hello_retries = 3;
+  phone_->state<kivrat::Settings>().retry_delay_ms = 1;
   uint32_t version = 0;
   EXPECT_FALSE(kivrat::Connect(*phone_, version, nullptr));
   EXPECT_EQ(Lines("16"), Texts(4, "Failed to read the Port buffer\n"));
   // A target that says hello between two tries is heard; a caller that gives up is obeyed.
   Target({""});
-  phone_->kivrat().read_time_out_ms = 0;
+  phone_->state<kivrat::Settings>().read_time_out_ms = 0;
   const kivrat::Stop arrive = [&, looks = 0]() mutable {
     if (++looks == 3) wire_.ToHost(FromHex(kHello));
     return false;
@@ -236,7 +236,7 @@ TEST_F(KivratWire, HelloRetriesWaitForATargetThatIsLate) {
 
 TEST_F(KivratWire, ProgrammerIsServedInOrderWhateverTheOffsets) {
   const std::string file = folder_.Add("programmer", "0123456789");
-  phone_->kivrat().pre_done_delay_ms = 1;
+  phone_->state<kivrat::Settings>().pre_done_delay_ms = 1;
   for (const bool byte_by_byte : {false, true}) {
     // Offsets 0, 100, 2; the last request goes beyond the end of the file, which gives what it has.
     Target({ReadRequest(0, 4), ReadRequest(100, 3), ReadRequest(2, 131072), kEnd, kDoneResponse}, byte_by_byte);
@@ -356,14 +356,14 @@ TEST(KivratPort, DevicesAreGivenPiecesThatTheirDriversHold) {
   const test::TempFolder folder;
   const std::string data(10000, 'x');
   ASSERT_TRUE(phone.BorrowPort());
-  phone.kivrat().read_time_out_ms = 20;
+  phone.state<kivrat::Settings>().read_time_out_ms = 20;
   wire.ToHost(FromHex(ReadRequest(0, 131072)));
   EXPECT_FALSE(kivrat::DownloadFlashProgrammer(phone, folder.Add("file", data)));
   std::vector<size_t> sizes;
   for (const Bytes& piece : wire.Written()) sizes.push_back(piece.size());
   EXPECT_EQ(sizes, (std::vector<size_t>{4096, 4096, 1808}));
   // A device that goes ends the waiting at once.
-  phone.kivrat().read_time_out_ms = 60000;
+  phone.state<kivrat::Settings>().read_time_out_ms = 60000;
   ASSERT_TRUE(phone.BorrowPort());
   wire.Vanish(true);
   EXPECT_FALSE(kivrat::DownloadFlashProgrammer(phone, folder.Path("file")));

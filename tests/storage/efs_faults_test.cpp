@@ -8,6 +8,7 @@
 #include <chrono>
 #include <thread>
 
+#include "storage/efs/efs_settings.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/temp_folder.h"
@@ -250,7 +251,7 @@ TEST(EfsOnAComPort, LostAnswersCloseThePortAndTheNextTryOpensIt) {
   const KRAL_HANDLE com = KRAL_ConnectServer(9);
   ASSERT_NE(com, 0u);
   KRAL_ConfigureTimeOut(com, 0, 200);
-  Kral_ResourceManager::GetPhone(com)->efs().packet_time_out_ms = 200;
+  Kral_ResourceManager::GetPhone(com)->state<efs::Settings>().packet_time_out_ms = 200;
   for (const char* const command : {"13", "0F", "05", "03"}) {
     SCOPED_TRACE(command);
     const size_t opens = ports.opens().size();

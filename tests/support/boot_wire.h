@@ -8,6 +8,7 @@
 #include <memory>
 #include <vector>
 
+#include "download/boot/kivrat.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/connection.h"
@@ -22,8 +23,8 @@ class BootWireTest : public testing::Test {
     handle_ =
         KRAL_ConnectServer_UserDefinedTransport(1, user.handle, user.context, user.send, user.receive, user.flush);
     phone_ = Kral_ResourceManager::GetPhone(handle_);
-    phone_->kivrat().read_time_out_ms = 20;
-    phone_->kivrat().settle_ms = 0;
+    phone_->state<kivrat::Settings>().read_time_out_ms = 20;
+    phone_->state<kivrat::Settings>().settle_ms = 0;
   }
   void TearDown() override {
     phone_.reset();

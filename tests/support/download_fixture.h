@@ -6,6 +6,7 @@
 #include <random>
 #include <vector>
 
+#include "download/link/download_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/diag.h"
@@ -24,7 +25,7 @@ class DownloadTest : public HandsetTest {
 
   // For acknowledgements that do not come; everything else may take its time on a busy machine.
   void AcknowledgeWithin(uint32_t milliseconds) { settings().acknowledge_limit_ms = milliseconds; }
-  DownloadSettings& settings() { return Kral_ResourceManager::GetPhone(handle())->download(); }
+  download::Settings& settings() { return Kral_ResourceManager::GetPhone(handle())->state<download::Settings>(); }
 
   // The programmer runs and has been greeted.
   void StartProgrammer(handset::ProgrammerSettings settings = {}) {

@@ -8,6 +8,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/efs.h"
+#include "storage/efs/efs_settings.h"
 #include "tests/support/handset_connection.h"
 
 namespace kral::test {
@@ -27,7 +28,7 @@ class EfsTest : public HandsetTest {
 
   void ShortenTimeOuts(uint32_t milliseconds = 40) {
     KRAL_ConfigureTimeOut(handle(), 0, static_cast<int32_t>(milliseconds));
-    Kral_ResourceManager::GetPhone(handle())->efs().packet_time_out_ms = milliseconds;
+    Kral_ResourceManager::GetPhone(handle())->state<efs::Settings>().packet_time_out_ms = milliseconds;
   }
 
   static handset::Bytes RandomBytes(size_t size, uint32_t seed = 1) {

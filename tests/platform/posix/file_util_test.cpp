@@ -9,6 +9,7 @@
 #include <filesystem>
 
 #include "base/text_log.h"
+#include "kral/download.h"
 #include "platform/posix/file_descriptor.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"

@@ -1,0 +1,39 @@
+// The EFS settings of a phone object, and what its transfers leave behind.
+#ifndef KRAL_STORAGE_EFS_EFS_SETTINGS_H
+#define KRAL_STORAGE_EFS_EFS_SETTINGS_H
+
+#include <atomic>
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "kral/efs.h"
+
+namespace kral::efs {
+
+// Files or directories that the handset keeps open for this library.
+struct OpenHandles {
+  std::optional<uint32_t> in_use;
+  uint32_t unanswered = 0;       // opening requests whose answers may still come, and tell of further handles
+  std::vector<uint32_t> strays;  // opened by such requests, to be closed
+};
+
+// The atomic ones are set from any thread, also while a transfer runs; the others belong to whoever holds the request
+// lock.
+struct Settings {
+  std::atomic<uint16_t> read_packet_size{536};
+  std::atomic<uint16_t> write_packet_size{524};
+  std::atomic<bool> abort{false};
+  std::atomic<uint32_t> aborts{0};  // how often that was set
+  bool gave_up = false;             // an abort has ended the wait for an answer that did not come
+  std::atomic<KRAL_EFS_TRANSFER_CALLBACK> transfer_callback{nullptr};
+  std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
+  std::atomic<KRAL_HANDLE> callback_context{0};
+  uint32_t packet_time_out_ms = 2000;  // of writes, listings and mkdir; shorter in tests only
+  OpenHandles files;
+  OpenHandles directories;
+};
+
+}  // namespace kral::efs
+
+#endif
