@@ -16,8 +16,7 @@ void AppendBe(std::vector<uint8_t>& packet, uint32_t value, int bytes) {
 }
 
 bool Acknowledged(download::DownloadConnection& connection, const std::vector<uint8_t>& request, uint32_t time_out_ms) {
-  std::vector<uint8_t> reply;
-  return connection.Exchange(request, kAcknowledge, time_out_ms, reply) == download::DownloadConnection::kDone;
+  return bool(connection.Exchange(request, kAcknowledge, time_out_ms));
 }
 
 }  // namespace
@@ -50,12 +49,11 @@ bool Reset(download::DownloadConnection& connection) {
 bool SoftwareVersion(download::DownloadConnection& connection, uint8_t& version) {
   connection.log().WriteLine(kLogRet, "Sending the request for Software Version");
   const uint8_t request = kSoftwareVersion;
-  std::vector<uint8_t> reply;
-  const auto status = connection.Exchange({&request, 1}, kSoftwareVersionReply, connection.time_out_ms(), reply);
-  if (status != download::DownloadConnection::kDone) return false;
-  if (reply.size() < 2)
+  const Reply reply = connection.Exchange({&request, 1}, kSoftwareVersionReply, connection.time_out_ms());
+  if (!reply) return false;
+  if (reply.bytes().size() < 2)
     return Fail(Failure(KRAL_ERROR_LINK, "the loader's answer holds no version").Command({&request, 1}));
-  version = reply[1];
+  version = reply.bytes()[1];
   return true;
 }
 

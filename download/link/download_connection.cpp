@@ -27,34 +27,30 @@ class LeadingFlag {
 
 }  // namespace
 
-DownloadConnection::Status DownloadConnection::ServerHasNoFramer() {
+Reply DownloadConnection::ServerHasNoFramer() {
   Fail(Failure(KRAL_ERROR_ARGUMENT, "a phone server downloads by itself"));
-  return kNotSent;
+  return ReplyKind::kNotSent;
 }
 
-DownloadConnection::Status DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
-                                                        uint32_t time_out_ms, std::vector<uint8_t>& reply) {
-  reply.clear();
+Reply DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code, uint32_t time_out_ms) {
   if (phone_.server_mode()) return ServerHasNoFramer();
   const LeadingFlag flag(phone_.transport().framer());
-  reply.resize(kMaximumPacket);
-  const Reply told = phone_.SendSync(request, reply, expected_code, time_out_ms);
-  reply.resize(told.bytes().size());
-  if (told) return kDone;
-  return told.came() ? kOtherReply : kNoReply;
+  room_.resize(kMaximumPacket);
+  return phone_.SendSync(request, room_, expected_code, time_out_ms);
 }
 
-bool DownloadConnection::AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& reply) {
+Reply DownloadConnection::AwaitReply(uint8_t expected_code, uint32_t time_out_ms) {
   const auto record = responses().PopWithin(std::chrono::milliseconds(time_out_ms));
-  if (!record) return false;
-  const size_t length = record->size() - std::min(record->size(), kFcsBytes);
-  reply.assign(record->begin(), record->begin() + static_cast<std::ptrdiff_t>(length));
-  return true;
+  if (!record) return ReplyKind::kNone;
+  room_.assign(record->begin(), record->end());
+  const auto bytes = std::span<const uint8_t>(room_).first(room_.size() - std::min(room_.size(), kFcsBytes));
+  const uint8_t code = bytes.empty() ? uint8_t{0} : bytes[0];
+  return {!bytes.empty() && code == expected_code ? ReplyKind::kExpected : ReplyKind::kOther, code, bytes};
 }
 
-DownloadConnection::Status DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
+Reply DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
   if (phone_.server_mode()) return ServerHasNoFramer();
-  return phone_.SendASync(request, time_out_ms, true) ? kDone : kNotSent;
+  return phone_.SendASync(request, time_out_ms, true);
 }
 
 void DownloadConnection::BeginWork() {

@@ -17,20 +17,16 @@ namespace kral::download {
 // For the length of one operation, under the phone object's request lock.
 class DownloadConnection {
  public:
-  enum Status : uint32_t { kDone = 0, kNoReply = 1, kOtherReply = 2, kNotSent = 3 };
-
   explicit DownloadConnection(Diag_FTM& phone) : phone_(phone) {}
 
-  // One request and its reply. `reply` is what came, without its FCS: empty when nothing did, and kept when it begins
-  // with another code.
-  Status Exchange(std::span<const uint8_t> request, uint8_t expected_code, uint32_t time_out_ms,
-                  std::vector<uint8_t>& reply);
+  // One request and its reply, whose bytes last until the next.
+  Reply Exchange(std::span<const uint8_t> request, uint8_t expected_code, uint32_t time_out_ms);
 
   // Replies to these come up in responses().
-  Status WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms);
+  Reply WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms);
 
-  // Waits for a further reply to the request of the last exchange; true when one came, with whatever code.
-  bool AwaitReply(uint32_t time_out_ms, std::vector<uint8_t>& reply);
+  // Waits for a further reply to the request of the last exchange.
+  Reply AwaitReply(uint8_t expected_code, uint32_t time_out_ms);
   // What has come and is coming in at this moment answers nothing that is still to be sent.
   void ForgetReplies() { phone_.transport().ForgetReplies(); }
 
@@ -50,9 +46,10 @@ class DownloadConnection {
   void Report(uint32_t done, uint32_t total);
 
  private:
-  static Status ServerHasNoFramer();
+  static Reply ServerHasNoFramer();
 
   Diag_FTM& phone_;
+  std::vector<uint8_t> room_;  // of the last reply
   bool reported_ = false;
   uint32_t last_report_ = 0;
 };

@@ -45,7 +45,7 @@ bool BlockWriter::Run(uint32_t total) {
       case Turn::kNothing:
         continue;
       case Turn::kSendAgain:
-        block = agent_.Newest();
+        block = Load(agent_.Newest());
         break;
       case Turn::kTake:
         block = Take();
@@ -89,8 +89,13 @@ BlockWriter::Turn BlockWriter::AwaitTurn(uint32_t total) {
 
 // What was skipped goes out again before anything new.
 std::optional<CDownloadBlock> BlockWriter::Take() {
-  const auto block = agent_.TakeResend();
+  const auto block = Load(agent_.TakeResend());
   return block ? block : Carve();
+}
+
+std::optional<CDownloadBlock> BlockWriter::Load(std::optional<CDownloadBlock> block) {
+  if (block) image_.Read(block->address, buffer_.data(), block->size, block->device);
+  return block;
 }
 
 std::optional<CDownloadBlock> BlockWriter::Carve() {
@@ -102,7 +107,6 @@ std::optional<CDownloadBlock> BlockWriter::Carve() {
 }
 
 bool BlockWriter::Send(const CDownloadBlock& block) {
-  image_.Read(block.address, buffer_.data(), block.size, block.device);
   if (!command_.Send(block.address, std::span(buffer_).first(block.size))) return false;
   agent_.CountSent();
   if (block.address % kProgressLineEvery == 0) {

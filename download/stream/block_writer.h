@@ -26,8 +26,10 @@ class BlockWriter {
   enum class Turn { kTake, kSendAgain, kNothing, kGiveUp };
 
   Turn AwaitTurn(uint32_t total);
+  // Each leaves the bytes of its block at the beginning of the buffer.
   std::optional<CDownloadBlock> Take();
   std::optional<CDownloadBlock> Carve();
+  std::optional<CDownloadBlock> Load(std::optional<CDownloadBlock> block);
   bool Send(const CDownloadBlock& block);
 
   download::DownloadConnection& connection_;

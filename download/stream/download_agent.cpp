@@ -2,7 +2,6 @@
 #include "download/stream/download_agent.h"
 
 #include <chrono>
-#include <utility>
 
 namespace kral::stream {
 
@@ -19,7 +18,7 @@ void DownloadAgent::Start(uint32_t window) {
 
 void DownloadAgent::Enqueue(const CDownloadBlock& piece) {
   const std::lock_guard lock(mutex_);
-  pending_.Push(std::make_unique<CDownloadBlock>(piece));
+  pending_.Push(piece);
 }
 
 void DownloadAgent::Stop() {
@@ -53,39 +52,32 @@ DownloadAgent::Wait DownloadAgent::AwaitTurn(uint32_t slice_ms) {
 std::optional<CDownloadBlock> DownloadAgent::TakeResend() {
   const std::lock_guard lock(mutex_);
   if (resend_.empty() || !outstanding_.TakeSlot()) return std::nullopt;
-  return MakeOutstanding(resend_.Pop());
+  return MakeOutstanding(*resend_.Pop());
 }
 
 std::optional<CDownloadBlock> DownloadAgent::head() const {
   const std::lock_guard lock(mutex_);
-  const CDownloadBlock* const head = pending_.oldest();
-  return head == nullptr ? std::nullopt : std::optional(*head);
+  return pending_.oldest();
 }
 
 std::optional<CDownloadBlock> DownloadAgent::Carve(uint32_t size) {
   const std::lock_guard lock(mutex_);
-  CDownloadBlock* const head = pending_.oldest();
-  if (head == nullptr || size == 0 || size > head->size || !outstanding_.TakeSlot()) return std::nullopt;
-  DownloadBlockPtr block = free_.Pop();
-  if (block == nullptr) return std::nullopt;
-  *block = {head->address, size, head->device};
-  head->address += size;
-  head->size -= size;
-  if (head->size == 0) pending_.Pop();
-  if (pending_.empty()) final_block_.Record(block->address);
-  return MakeOutstanding(std::move(block));
+  const auto head = pending_.oldest();
+  if (!head || size == 0 || size > head->size || !outstanding_.TakeSlot()) return std::nullopt;
+  if (!free_.Pop()) return std::nullopt;
+  pending_.Shorten(size);
+  if (pending_.empty()) final_block_.Record(head->address);
+  return MakeOutstanding({head->address, size, head->device});
 }
 
 std::optional<CDownloadBlock> DownloadAgent::Newest() const {
   const std::lock_guard lock(mutex_);
-  const CDownloadBlock* const block = outstanding_.newest();
-  return block == nullptr ? std::nullopt : std::optional(*block);
+  return outstanding_.newest();
 }
 
-std::optional<CDownloadBlock> DownloadAgent::MakeOutstanding(DownloadBlockPtr block) {
-  const CDownloadBlock copy = *block;
-  outstanding_.Push(std::move(block));
-  return copy;
+CDownloadBlock DownloadAgent::MakeOutstanding(const CDownloadBlock& block) {
+  outstanding_.Push(block);
+  return block;
 }
 
 std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t address) {
@@ -94,15 +86,15 @@ std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t a
   if (!outstanding_.Holds(address)) return std::nullopt;
   Acknowledged result;
   for (;;) {
-    DownloadBlockPtr block = outstanding_.Pop();
+    const CDownloadBlock block = *outstanding_.Pop();
     outstanding_.ReleaseSlot();
-    if (block->address != address) {
+    if (block.address != address) {
       // Replies come in order, so this one's was lost.
-      resend_.Push(std::move(block));
+      resend_.Push(block);
       continue;
     }
-    result = {block->size, final_block_.Is(address)};
-    free_.Push(std::move(block));
+    result = {block.size, final_block_.Is(address)};
+    free_.Push(block);
     break;
   }
   bytes_acknowledged_ += result.size;

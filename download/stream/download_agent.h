@@ -61,7 +61,7 @@ class DownloadAgent {
 
  private:
   bool HasTurn() const;
-  std::optional<CDownloadBlock> MakeOutstanding(DownloadBlockPtr block);
+  CDownloadBlock MakeOutstanding(const CDownloadBlock& block);
 
   mutable std::mutex mutex_;  // the critical section of every queue below
   std::condition_variable changed_;

@@ -4,8 +4,7 @@
 
 #include <cstdint>
 #include <deque>
-#include <memory>
-#include <utility>
+#include <optional>
 
 namespace kral::stream {
 
@@ -15,33 +14,40 @@ struct CDownloadBlock {
   uint32_t device = 0;  // the region of the image
 };
 
-using DownloadBlockPtr = std::unique_ptr<CDownloadBlock>;
-
 // First in, first out. A block is in one queue at a time and moves between them in one step, so the queues of an agent
 // share its critical section.
 class CDownloadBlockQueue {
  public:
   bool empty() const { return blocks_.empty(); }
-  void Push(DownloadBlockPtr block) { blocks_.push_back(std::move(block)); }
-  DownloadBlockPtr Pop() {  // null when empty
-    if (blocks_.empty()) return nullptr;
-    DownloadBlockPtr block = std::move(blocks_.front());
-    blocks_.pop_front();
+  void Push(const CDownloadBlock& block) { blocks_.push_back(block); }
+  std::optional<CDownloadBlock> Pop() {  // nothing when empty
+    const auto block = oldest();
+    if (block) blocks_.pop_front();
     return block;
   }
-  CDownloadBlock* oldest() { return blocks_.empty() ? nullptr : blocks_.front().get(); }
-  const CDownloadBlock* oldest() const { return blocks_.empty() ? nullptr : blocks_.front().get(); }
-  const CDownloadBlock* newest() const { return blocks_.empty() ? nullptr : blocks_.back().get(); }
+  std::optional<CDownloadBlock> oldest() const {
+    return blocks_.empty() ? std::nullopt : std::optional(blocks_.front());
+  }
+  std::optional<CDownloadBlock> newest() const {
+    return blocks_.empty() ? std::nullopt : std::optional(blocks_.back());
+  }
+  // So much less of the oldest, which goes when nothing is left of it.
+  void Shorten(uint32_t size) {
+    CDownloadBlock& block = blocks_.front();
+    block.address += size;
+    block.size -= size;
+    if (block.size == 0) blocks_.pop_front();
+  }
   bool Holds(uint32_t address) const {
-    for (const DownloadBlockPtr& block : blocks_) {
-      if (block->address == address) return true;
+    for (const CDownloadBlock& block : blocks_) {
+      if (block.address == address) return true;
     }
     return false;
   }
   void Clear() { blocks_.clear(); }
 
  private:
-  std::deque<DownloadBlockPtr> blocks_;
+  std::deque<CDownloadBlock> blocks_;
 };
 
 // Blocks allocated ahead, one per slot of the window.
@@ -49,7 +55,7 @@ class CDownloadBlockFreeQueue : public CDownloadBlockQueue {
  public:
   void Fill(uint32_t window) {
     Clear();
-    for (uint32_t i = 0; i < window; ++i) Push(std::make_unique<CDownloadBlock>());
+    for (uint32_t i = 0; i < window; ++i) Push({});
   }
 };
 

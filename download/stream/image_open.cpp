@@ -7,10 +7,13 @@
 #include "download/stream/stream_format.h"
 
 namespace kral::stream {
-
 namespace {
 
-bool IsAcknowledgement(const std::vector<uint8_t>& reply) {
+// How the log tells what became of a request that was not answered as it should be.
+constexpr unsigned kStatusNoReply = 1;
+constexpr unsigned kStatusOtherReply = 2;
+
+bool IsAcknowledgement(std::span<const uint8_t> reply) {
   return reply.size() == kWriteReplySize && reply[0] == kWriteReply;
 }
 
@@ -26,31 +29,27 @@ WriteLimits CImageOpen::Limited(const WriteLimits& requested) {
 }
 
 // A block that was sent again may be acknowledged once more, long after: that answers neither opening nor closing.
-download::DownloadConnection::Status CImageOpen::Exchange(std::span<const uint8_t> request, uint8_t expected_code,
-                                                          std::vector<uint8_t>& reply) {
-  auto status = connection_.Exchange(request, expected_code, time_out_ms_, reply);
+Reply CImageOpen::Exchange(std::span<const uint8_t> request, uint8_t expected_code) {
+  Reply reply = connection_.Exchange(request, expected_code, time_out_ms_);
   CWaitableTimer timer;  // a storm of them must not hold the call up for ever
   timer.Arm(time_out_ms_);
-  while (status == download::DownloadConnection::kOtherReply && IsAcknowledgement(reply) && !timer.expired()) {
-    if (!connection_.AwaitReply(time_out_ms_, reply)) {
-      reply.clear();
-      return download::DownloadConnection::kNoReply;
-    }
-    if (!reply.empty() && reply[0] == expected_code) return download::DownloadConnection::kDone;
+  while (reply.kind() == ReplyKind::kOther && IsAcknowledgement(reply.bytes()) && !timer.expired()) {
+    reply = connection_.AwaitReply(expected_code, time_out_ms_);
   }
-  return status;
+  return reply;
 }
 
 bool CImageOpen::Close() {
-  std::vector<uint8_t> reply;
   const uint8_t request = kClose;
-  const auto status = Exchange({&request, 1}, kCloseReply, reply);
+  const Reply answer = Exchange({&request, 1}, kCloseReply);
+  const auto reply = answer.bytes();
   auto& log = connection_.log();
-  if (status != download::DownloadConnection::kDone) {
+  if (!answer) {
+    const unsigned status = answer.came() ? kStatusOtherReply : kStatusNoReply;
     if (!reply.empty()) {
-      log.WriteLine(kLogErr, "error - MI close failed: status %u rsp %02X\n", static_cast<unsigned>(status), reply[0]);
+      log.WriteLine(kLogErr, "error - MI close failed: status %u rsp %02X\n", status, reply[0]);
     } else {
-      log.WriteLine(kLogErr, "error - MI close failed: status %u\n", static_cast<unsigned>(status));
+      log.WriteLine(kLogErr, "error - MI close failed: status %u\n", status);
     }
     return false;
   }
@@ -76,9 +75,9 @@ bool CImageOpenFramed::OpenMulti(uint8_t type, images::PhoneImage* header, const
     request.resize(request.size() + size);
     header->Read(header->GetBaseAddress(0), request.data() + 2, size, 0);
   }
-  std::vector<uint8_t> reply;
-  const auto status = Exchange(request, kOpenReply, reply);
-  if (status != download::DownloadConnection::kDone) return false;
+  const Reply answer = Exchange(request, kOpenReply);
+  if (!answer) return false;
+  const auto reply = answer.bytes();
   if (reply.size() != kStatusReplySize) {
     return Fail(Failure(KRAL_ERROR_LINK, "the answer to the opening of the image has %zu bytes", reply.size()));
   }

@@ -4,7 +4,6 @@
 
 #include <cstdint>
 #include <span>
-#include <vector>
 
 #include "base/failure.h"
 #include "download/images/phone_image.h"
@@ -35,8 +34,7 @@ class CImageOpen {
 
  protected:
   static WriteLimits Limited(const WriteLimits& requested);
-  download::DownloadConnection::Status Exchange(std::span<const uint8_t> request, uint8_t expected_code,
-                                                std::vector<uint8_t>& reply);
+  Reply Exchange(std::span<const uint8_t> request, uint8_t expected_code);
 
   download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;

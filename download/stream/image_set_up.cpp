@@ -41,8 +41,7 @@ Failure Refusal(uint8_t status) {
 
 bool CImageSecMode::Send(uint8_t mode) {
   const std::vector<uint8_t> request = {kSecurityMode, mode};
-  std::vector<uint8_t> reply;
-  return connection_.Exchange(request, kSecurityModeReply, time_out_ms_, reply) == download::DownloadConnection::kDone;
+  return bool(connection_.Exchange(request, kSecurityModeReply, time_out_ms_));
 }
 
 bool CImagePartition::Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status) {
@@ -62,13 +61,12 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   request[0] = kPartitionTable;
   request[1] = override_table ? 1 : 0;
   std::copy(table.begin(), table.end(), request.begin() + 2);
-  std::vector<uint8_t> reply;
-  const auto sent = connection_.Exchange(request, kPartitionTableReply, time_out_ms_, reply);
-  if (sent != download::DownloadConnection::kDone) return false;
-  if (reply.size() != kStatusReplySize) {
-    return Fail(Failure(KRAL_ERROR_LINK, "the answer to the partition table has %zu bytes", reply.size()));
+  const Reply reply = connection_.Exchange(request, kPartitionTableReply, time_out_ms_);
+  if (!reply) return false;
+  if (reply.bytes().size() != kStatusReplySize) {
+    return Fail(Failure(KRAL_ERROR_LINK, "the answer to the partition table has %zu bytes", reply.bytes().size()));
   }
-  status = reply[kStatusAt];
+  status = reply.bytes()[kStatusAt];
   if (*status == kStatusDone) return true;
   LogRefusal(log, *status);
   return Fail(Refusal(*status));

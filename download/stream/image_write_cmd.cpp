@@ -19,6 +19,8 @@ static_assert(CImageWriteCmdFramed::kMostFramedData + kWriteHeaderSize == kMaxim
 constexpr size_t kMostStuffed = kEscapePairLimit - 3;
 static_assert(kMostStuffed >= kMaximumPayload);
 
+constexpr unsigned kStatusNotSent = 3;  // in the log
+
 constexpr bool IsEscaped(uint8_t byte) {
   return byte == kFrameFlag || byte == kFrameEscape;
 }
@@ -44,9 +46,8 @@ bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data)
   const auto header = Header(address);
   const auto body = std::copy(header.begin(), header.end(), packet_.begin());
   std::copy(data.begin(), data.end(), body);
-  const auto status = connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_);
-  if (status == download::DownloadConnection::kDone) return true;
-  connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", static_cast<unsigned>(status));
+  if (connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_)) return true;
+  connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", kStatusNotSent);
   return false;
 }
 

@@ -35,13 +35,12 @@ std::optional<HelloReply> ExchangeHello(download::DownloadConnection& connection
     Fail(Failure(KRAL_ERROR_ARGUMENT, "no hello exchange of variant %u is known", variant));
     return std::nullopt;
   }
-  std::vector<uint8_t> reply;
-  if (connection.Exchange(HelloRequest(), kHelloReply, time_out_ms, reply) != download::DownloadConnection::kDone) {
-    return std::nullopt;
-  }
-  const auto answer = ParseHelloReply(std::span(reply).first(std::min(reply.size(), kReplyRoom)));
+  const Reply reply = connection.Exchange(HelloRequest(), kHelloReply, time_out_ms);
+  if (!reply) return std::nullopt;
+  const auto bytes = reply.bytes();
+  const auto answer = ParseHelloReply(bytes.first(std::min(bytes.size(), kReplyRoom)));
   if (!answer)
-    Fail(Failure(KRAL_ERROR_LINK, "an answer of %zu bytes to the hello is no flash programmer's", reply.size()));
+    Fail(Failure(KRAL_ERROR_LINK, "an answer of %zu bytes to the hello is no flash programmer's", bytes.size()));
   return answer;
 }
 
@@ -63,8 +62,7 @@ std::optional<HelloReply> Hello(download::DownloadConnection& connection, const 
   const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);
   for (int i = 1; i <= kNops && !connection.aborted(); ++i) {
     log.WriteLine(kLogRet, "Sending NOP to flash programmer, %d", i);
-    std::vector<uint8_t> ignored;
-    connection.Exchange(kNopRequest, kNopReply, nop_ms, ignored);
+    connection.Exchange(kNopRequest, kNopReply, nop_ms);
   }
   std::optional<HelloReply> answer;
   const uint32_t tries = std::max(settings.hello_tries.load(), 1u);
