@@ -150,7 +150,9 @@ struct DiagHeader {
     phone.packet().Reset();
     phone.packet().Append8(code);
   }
-  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed + 1U, with_data); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const {
+    return SendEchoed(phone, time_out_ms, echoed, echoed + 1U, with_data);
+  }
 };
 
 // The subsystem-dispatch form: 75, the subsystem, its 16-bit command.
@@ -167,7 +169,9 @@ struct SubsystemHeader {
     phone.packet().Append8(subsystem);
     phone.packet().Append16(command);
   }
-  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const { return SendEchoed(phone, time_out_ms, echoed, echoed, with_data); }
+  Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const {
+    return SendEchoed(phone, time_out_ms, echoed, echoed, with_data);
+  }
 };
 
 template <class... Fields>
