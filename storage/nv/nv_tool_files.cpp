@@ -84,8 +84,9 @@ NvError NVTool_Manager::TakeStored(Diag_FTM& phone, NvItem& item, NvSlot slot, s
 struct NVTool_Manager::PkvArrays {
   explicit PkvArrays(const pkv::PkvSet& set) : noted(pkv::NotedArrays(set.properties)) {
     for (const pkv::PkvNvItem& entry : set.items) {
+      // Beyond the last element that there can be the word still says that the item is an array.
       auto& index = highest[entry.id];
-      index = std::max(index, entry.index);
+      index = std::max(index, entry.index <= kHighestElement ? entry.index : uint16_t{1});
     }
     if (!noted) return;
     // One element at least that is not the first: else the item would be a plain one.
@@ -102,10 +103,8 @@ struct NVTool_Manager::PkvArrays {
 NvItem* NVTool_Manager::ItemOfPkv(Diag_FTM& phone, const pkv::PkvNvItem& entry, const PkvArrays& arrays) {
   NvItem* item = definitions_.FindNumbered(entry.id);
   const uint16_t highest_index = arrays.highest.at(entry.id);
-  if (item == nullptr && highest_index <= kHighestElement) {
-    item = &Define(phone, GenericItem(entry.id, highest_index));
-  }
-  if (item == nullptr || entry.index > item->max_index) return nullptr;
+  if (item == nullptr) item = &Define(phone, GenericItem(entry.id, highest_index));
+  if (entry.index > item->max_index) return nullptr;
   return !arrays.noted || item->is_array() == arrays.IsArray(entry.id) ? item : nullptr;
 }
 

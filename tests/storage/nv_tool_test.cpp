@@ -498,6 +498,12 @@ TEST_F(NvTool, PkvFilesWithPathsThatFitNowhereAreLeftOut) {
   KRAL_NV_GetNumOfNVEfsDefinition(handle(), &files);
   EXPECT_EQ(files, 1u);
   EXPECT_EQ(FileValue(longest.c_str()), "2");
+  // One element that cannot be does not take the others of its array with it.
+  pkv::PkvSet array;
+  for (const uint16_t index : {0, 1, 257}) array.items.push_back({300, index, 0, 0, {7, 7}});
+  ASSERT_TRUE(pkv::WritePkv(pkv, array).done());
+  EXPECT_EQ(KRAL_NV_LoadNVsFromPKV(handle(), pkv.c_str()), 20u);
+  EXPECT_EQ(Value(300, 1).substr(0, 4), "7,7,");
 }
 
 // --- Filters ---------------------------------------------------------------------------------------------------------
