@@ -82,8 +82,9 @@ CDownloadBlock DownloadAgent::MakeOutstanding(const CDownloadBlock& block) {
 
 std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t address) {
   const std::lock_guard lock(mutex_);
-  // A reply that came twice, or for a block that is to be sent again, is nothing to go by.
-  if (!outstanding_.Holds(address)) return std::nullopt;
+  // A reply that came twice, or for a block that is to be sent again, is nothing to go by; nor is one that comes after
+  // the writing has failed: what is reported as acknowledged is so at the failure.
+  if (failed_ || !outstanding_.Holds(address)) return std::nullopt;
   Acknowledged result;
   for (;;) {
     const CDownloadBlock block = *outstanding_.Pop();

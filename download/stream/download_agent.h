@@ -42,7 +42,7 @@ class DownloadAgent {
     uint32_t size = 0;
     bool final = false;
   };
-  // Nothing, and nothing changed, for an address that is not outstanding.
+  // Nothing, and nothing changed, for an address that is not outstanding, and after a failure.
   std::optional<Acknowledged> Acknowledge(uint32_t address);
   // What came instead of an acknowledgement.
   struct OtherReply {

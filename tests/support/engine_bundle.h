@@ -35,6 +35,8 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
     return dispatcher.Stop() && stopped;
   }
 
+  // First, so that it goes last: when it has gone, every thread of the bundle has been joined or parked.
+  std::shared_ptr<bool> presence = std::make_shared<bool>();
   LogLines log;
   PacketQueue responses;
   PacketQueue asynchronous;

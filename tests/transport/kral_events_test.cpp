@@ -157,6 +157,11 @@ TEST_F(KralEvents, HooksRunAroundTheThreadAndTheFirstMayRefuse) {
 TEST_F(KralEvents, BlockedListenerBoundsTheStopAndKeepsItsOwnerAlive) {
   std::atomic<bool> release{false};
   std::atomic<bool> inside{false};
+  std::atomic<bool> destroyed{false};
+  events_ = {new CKralEvents, [&](CKralEvents* events) {
+               delete events;
+               destroyed = true;
+             }};
   a_.then = [&] {
     inside = true;
     while (!release) std::this_thread::sleep_for(std::chrono::milliseconds(1));
@@ -164,12 +169,12 @@ TEST_F(KralEvents, BlockedListenerBoundsTheStopAndKeepsItsOwnerAlive) {
   events_->RegisterListener(&a_, nullptr, events_);
   Push(1);
   ASSERT_TRUE(Eventually([&] { return inside.load(); }));
-  const std::weak_ptr<CKralEvents> watched = events_;
   EXPECT_FALSE(events_->Stop(10));
   events_.reset();
-  EXPECT_FALSE(watched.expired());
+  EXPECT_FALSE(destroyed);
   release = true;
-  EXPECT_TRUE(Eventually([&] { return watched.expired(); }));
+  // Only a thread that has been parked can be reaped, and only a reaped one uses nothing of the test any more.
+  ASSERT_TRUE(Eventually([&] { return destroyed.load(); }));
   EXPECT_TRUE(Eventually([] { return ReapParkedThreads() == 0; }));
 }
 

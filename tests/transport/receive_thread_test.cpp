@@ -216,7 +216,7 @@ TEST(ReceiveThread, BlockedReceiveFunctionBoundsTheStopAndTheThreadEndsLater) {
   ASSERT_TRUE(wire.WaitUntilHeld());
   EXPECT_FALSE(bundle->transport.StopThread());
   bundle->dispatcher.Stop();
-  const std::weak_ptr<EngineBundle> watched = bundle;
+  const std::weak_ptr<bool> watched = bundle->presence;
   bundle.reset();
   EXPECT_FALSE(watched.expired());
   wire.HoldReceive(false);
