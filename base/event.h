@@ -4,9 +4,9 @@
 #define KRAL_BASE_EVENT_H
 
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
+
+#include "base/mutex.h"
 
 namespace kral {
 
@@ -17,28 +17,30 @@ class ThreadEvent {
 
   // Notified under the lock: whoever waited may destroy the event as soon as the wait is over.
   void Set() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     set_ = true;
-    changed_.notify_all();
+    changed_.NotifyAll();
   }
 
   void Reset() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     set_ = false;
   }
 
   bool WaitFor(uint32_t milliseconds) {
-    std::unique_lock lock(mutex_);
-    if (!changed_.wait_for(lock, std::chrono::milliseconds(milliseconds), [this] { return set_; })) return false;
+    MutexLock lock(mutex_);
+    if (!changed_.WaitFor(lock, std::chrono::milliseconds(milliseconds),
+                          [this]() KRAL_REQUIRES(mutex_) { return set_; }))
+      return false;
     if (kTakenByWait) set_ = false;
     return true;
   }
 
  private:
   [[maybe_unused]] const char* const label_;  // for whoever looks at it in a debugger
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  bool set_ = false;
+  Mutex mutex_;
+  Condition changed_;
+  bool set_ KRAL_GUARDED_BY(mutex_) = false;
 };
 
 using ManualResetEvent = ThreadEvent<false>;  // stays set until it is reset

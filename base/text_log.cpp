@@ -121,7 +121,7 @@ void DataLogFileHandler::Deliver(uint32_t flag, const char* text, size_t length)
   uint32_t handle = 0;
   std::string fault;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     try {
       fault = WriteToFile(flag, text);
     } catch (...) {
@@ -141,7 +141,7 @@ std::string DataLogFileHandler::WriteToFile(uint32_t flag, const char* text) {
   if (!file_ && !file_name_.empty()) file_.reset(OpenToWriteText(file_name_));
   if (!file_) return {};  // a file that cannot be opened is not reported: its lines are dropped
   std::string fault;
-  CallWithoutPipeSignal([&] { fault = WriteStamped(flag, text); });
+  CallWithoutPipeSignal([&]() KRAL_REQUIRES(mutex_) { fault = WriteStamped(flag, text); });
   return fault;
 }
 
@@ -177,7 +177,7 @@ void DataLogFileHandler::Start(const char* file_name) {
   WriteLine(kLogFn, "KRAL_StartLogging( sLogFile = %s)", file_name);
   bool attached = false;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     file_name_ = file_name;
     active_mask_ = stored_mask_;
     logging_started_ = true;
@@ -188,7 +188,7 @@ void DataLogFileHandler::Start(const char* file_name) {
     // Started twice: the old file takes its last two lines, then the next line opens the new one, truncated.
     const LocalTime now = CurrentLocalTime();
     WriteLine(kLogFn, "%s, %s", DateText(now).c_str(), TimeText(now).c_str());
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     file_.reset();
   }
   started_result_ = true;
@@ -196,7 +196,7 @@ void DataLogFileHandler::Start(const char* file_name) {
 
 void DataLogFileHandler::Stop() {
   WriteLine(kLogFn, "KRAL_StopLogging()");
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   file_name_.clear();
   // The closing line "Stop Log" belongs to the detached log's viewer, which this library does not have.
   file_.reset();
@@ -207,24 +207,24 @@ void DataLogFileHandler::Stop() {
 
 void DataLogFileHandler::SetFlags(uint32_t mask) {
   WriteLine(kLogFn, "KRAL_SetLogFlags(uiLogFlags=0x%04X)", mask);
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   stored_mask_ = mask;
   active_mask_ = mask;
 }
 
 void DataLogFileHandler::SetCallback(TextLogCallback callback, uint32_t handle) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   callback_ = callback;
   callback_handle_ = handle;
 }
 
 void DataLogFileHandler::RegisterCategory(std::string_view name, bool on) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   categories_.push_back({std::string(name), on});
 }
 
 bool DataLogFileHandler::IsCategoryOn(std::string_view name) const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto found = std::find_if(categories_.begin(), categories_.end(),
                                   [name](const Category& category) { return category.name == name; });
   return found != categories_.end() && found->on;

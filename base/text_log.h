@@ -6,13 +6,13 @@
 #include <cstdint>
 #include <cstdio>
 #include <memory>
-#include <mutex>
 #include <span>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "base/log_flags.h"
+#include "base/mutex.h"
 #include "platform/clock.h"
 
 namespace kral {
@@ -65,8 +65,8 @@ class DataLogFileHandler {
   };
 
   void Deliver(uint32_t flag, const char* text, size_t length);
-  std::string WriteToFile(uint32_t flag, const char* text);  // lock held
-  std::string WriteStamped(uint32_t flag, const char* text);
+  std::string WriteToFile(uint32_t flag, const char* text) KRAL_REQUIRES(mutex_);
+  std::string WriteStamped(uint32_t flag, const char* text) KRAL_REQUIRES(mutex_);
   void CallBack(TextLogCallback callback, uint32_t handle, uint32_t flag, std::string_view text);
 
   Clock& clock_;
@@ -76,14 +76,14 @@ class DataLogFileHandler {
   std::atomic<bool> relative_time_stamps_{false};
   std::atomic<uint32_t> start_tick_;
 
-  mutable std::mutex mutex_;  // guards what follows
-  std::string file_name_;     // empty when stopped
-  bool loss_told_ = false;    // of this file
-  std::unique_ptr<std::FILE, FileCloser> file_;
-  uint32_t stored_mask_ = kDefaultLogMask;
-  TextLogCallback callback_ = nullptr;
-  uint32_t callback_handle_ = 0;
-  std::vector<Category> categories_;
+  mutable Mutex mutex_;
+  std::string file_name_ KRAL_GUARDED_BY(mutex_);   // empty when stopped
+  bool loss_told_ KRAL_GUARDED_BY(mutex_) = false;  // of this file
+  std::unique_ptr<std::FILE, FileCloser> file_ KRAL_GUARDED_BY(mutex_);
+  uint32_t stored_mask_ KRAL_GUARDED_BY(mutex_) = kDefaultLogMask;
+  TextLogCallback callback_ KRAL_GUARDED_BY(mutex_) = nullptr;
+  uint32_t callback_handle_ KRAL_GUARDED_BY(mutex_) = 0;
+  std::vector<Category> categories_ KRAL_GUARDED_BY(mutex_);
 };
 
 // Takes nothing: for whoever has no log.

@@ -4,10 +4,10 @@
 
 #include <chrono>
 #include <exception>
-#include <mutex>
 #include <utility>
 
 #include "base/at_exit.h"
+#include "base/mutex.h"
 #include "base/thread_maker.h"
 #include "platform/signals.h"
 
@@ -19,8 +19,8 @@ using Progress = WorkerThread::Progress;
 constexpr std::chrono::milliseconds kLeaveTime{1000};
 
 struct ParkingLot {
-  std::mutex mutex;
-  std::shared_ptr<Progress> first;
+  Mutex mutex;
+  std::shared_ptr<Progress> first KRAL_GUARDED_BY(mutex);
 };
 
 // Never destroyed: a parked thread must not be joined, nor its handle thrown away, while the process ends.
@@ -45,7 +45,7 @@ size_t ReapParkedThreads() {
   size_t left = 0;
   {
     ParkingLot& lot = Lot();
-    const std::lock_guard lock(lot.mutex);
+    const MutexLock lock(lot.mutex);
     for (std::shared_ptr<Progress>* at = &lot.first; *at;) {
       if ((*at)->owner_released && HasEndedWithin((*at)->parked, {})) {
         std::shared_ptr<Progress> taken = std::exchange(*at, (*at)->next_parked);
@@ -66,7 +66,7 @@ WorkerThread::~WorkerThread() {
 
 void WorkerThread::Park() {
   ParkingLot& lot = Lot();
-  const std::lock_guard lock(lot.mutex);
+  const MutexLock lock(lot.mutex);
   progress_->parked = std::move(thread_);
   progress_->parked_module = std::move(module_);
   progress_->next_parked = std::exchange(lot.first, progress_);

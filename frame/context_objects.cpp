@@ -23,7 +23,7 @@ bool IsServerModeOnly(FamilySlot slot) {
 template <class Choose>
 auto Owned(KRAL_HANDLE handle, Choose choose) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   Context* const context = FindContext(library, handle);
   using Pointer = std::remove_reference_t<std::invoke_result_t<Choose, ContextObjects&>>;
   return context == nullptr ? Pointer() : std::invoke(choose, context->objects);
@@ -33,7 +33,7 @@ auto Owned(KRAL_HANDLE handle, Choose choose) {
 template <class Choose, class T>
 bool Own(KRAL_HANDLE handle, Choose choose, const std::shared_ptr<T>& object) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   Context* const context = FindContext(library, handle);
   if (context == nullptr) return false;
   std::invoke(choose, context->objects) = object;
@@ -66,8 +66,9 @@ std::shared_ptr<Diag_FTM> MakePhone(KRAL_HANDLE handle, uint16_t port) {
   } else {
     DeviceOpener opener;
     {
-      const std::lock_guard lock(Library().mutex);
-      opener = Library().device_opener;
+      auto& library = Library();
+      const MutexLock lock(library.mutex);
+      opener = library.device_opener;
     }
     phone = std::make_shared<Diag_FTM>(port, SystemClock(), std::move(opener));
     phone->SetReceiveMode(Kral_ResourceManager::default_receive_mode());
@@ -99,7 +100,7 @@ std::shared_ptr<Diag_FTM> GetPhone(KRAL_HANDLE handle) try {
   if (auto phone = Owned(handle, &ContextObjects::phone)) return phone;
   uint16_t port = 0;
   if (!PortOf(handle, port)) return nullptr;
-  const std::lock_guard building(Library().build_mutex);
+  const MutexLock building(Library().build_mutex);
   if (auto phone = Owned(handle, &ContextObjects::phone)) return phone;
   auto phone = MakePhone(handle, port);
   return phone && Own(handle, &ContextObjects::phone, phone) ? phone : nullptr;
@@ -131,7 +132,7 @@ std::shared_ptr<FamilyObject> GetFamilyObject(KRAL_HANDLE handle, FamilySlot slo
 std::shared_ptr<SoftwareDownload> GetSoftwareDownload(KRAL_HANDLE handle) try {
   const auto phone = GetPhone(handle);
   if (!phone || !phone->server_mode()) return nullptr;
-  const std::lock_guard building(Library().build_mutex);
+  const MutexLock building(Library().build_mutex);
   if (auto download = Owned(handle, &ContextObjects::download)) return download;
   const ServerFactory factory = CurrentServerFactory();
   if (!factory.make_software_download) return nullptr;

@@ -45,7 +45,7 @@ LastErrors::Entry& LastErrors::Place(KRAL_HANDLE handle, uint32_t thread) {
 
 void LastErrors::Note(KRAL_HANDLE handle, const KRAL_ERROR& error) noexcept try {
   const uint32_t thread = ThisThread();
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   Place(handle, thread) = {handle, thread, ++noted_, error};
 } catch (...) {
   // No memory, and no older record to write over.
@@ -53,7 +53,7 @@ void LastErrors::Note(KRAL_HANDLE handle, const KRAL_ERROR& error) noexcept try 
 
 bool LastErrors::Find(KRAL_HANDLE handle, KRAL_ERROR& error) const noexcept {
   const uint32_t thread = ThisThread();
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   const Entry* found = nullptr;
   for (const Entry& entry : entries_) {
     if (entry.handle != handle) continue;
@@ -68,7 +68,7 @@ bool LastErrors::Find(KRAL_HANDLE handle, KRAL_ERROR& error) const noexcept {
 }
 
 void LastErrors::Forget(KRAL_HANDLE handle) noexcept {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   std::erase_if(entries_, [handle](const Entry& entry) { return entry.handle == handle; });
 }
 

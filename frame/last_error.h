@@ -3,9 +3,9 @@
 #define KRAL_FRAME_LAST_ERROR_H
 
 #include <cstdint>
-#include <mutex>
 #include <vector>
 
+#include "base/mutex.h"
 #include "kral/error.h"
 
 namespace kral {
@@ -28,11 +28,11 @@ class LastErrors {
     uint64_t order;  // of the noting
     KRAL_ERROR error;
   };
-  Entry& Place(KRAL_HANDLE handle, uint32_t thread);
+  Entry& Place(KRAL_HANDLE handle, uint32_t thread) KRAL_REQUIRES(mutex_);
 
-  mutable std::mutex mutex_;  // guards what follows
-  uint64_t noted_ = 0;
-  std::vector<Entry> entries_;
+  mutable Mutex mutex_;
+  uint64_t noted_ KRAL_GUARDED_BY(mutex_) = 0;
+  std::vector<Entry> entries_ KRAL_GUARDED_BY(mutex_);
 };
 
 }  // namespace kral

@@ -7,10 +7,10 @@
 #include <atomic>
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <utility>
 #include <vector>
 
+#include "base/mutex.h"
 #include "frame/last_error.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
@@ -42,29 +42,28 @@ struct LibraryState {
   std::atomic<ReceiveMode> default_receive_mode{ReceiveMode::kAsWritten};
   LastErrors last_errors;
 
-  // Guards everything below, for the length of a scan: never held while a port is opened, an object is built or
-  // destroyed, or a callback runs.
-  std::mutex mutex;
-  uint32_t context_counter = 0;  // numbers the named mutexes; never starts again
-  std::array<Context, Kral_ResourceManager::kContextCount> contexts;
-  std::shared_ptr<OrbtServer> port_info;
-  std::vector<std::pair<uint16_t, uint16_t>> aliases;  // logical, physical
-  DeviceOpener device_opener = OpenComPort;
-  Kral_ResourceManager::PortLister port_lister = ListComPorts;
-  Kral_ResourceManager::MutexMaker mutex_maker = CreateNamedMutex;
-  ServerFactory server_factory;
+  // For the length of a scan: never held while a port is opened, an object is built or destroyed, or a callback runs.
+  Mutex mutex;
+  uint32_t context_counter KRAL_GUARDED_BY(mutex) = 0;  // numbers the named mutexes; never starts again
+  std::array<Context, Kral_ResourceManager::kContextCount> contexts KRAL_GUARDED_BY(mutex);
+  std::shared_ptr<OrbtServer> port_info KRAL_GUARDED_BY(mutex);
+  std::vector<std::pair<uint16_t, uint16_t>> aliases KRAL_GUARDED_BY(mutex);  // logical, physical
+  DeviceOpener device_opener KRAL_GUARDED_BY(mutex) = OpenComPort;
+  Kral_ResourceManager::PortLister port_lister KRAL_GUARDED_BY(mutex) = ListComPorts;
+  Kral_ResourceManager::MutexMaker mutex_maker KRAL_GUARDED_BY(mutex) = CreateNamedMutex;
+  ServerFactory server_factory KRAL_GUARDED_BY(mutex);
 
   // Held while a phone object or a server proxy is built, so that two threads do not build it twice. Taken before
   // `mutex`; the builders send no requests, so it is never held across one.
-  std::mutex build_mutex;
+  Mutex build_mutex;
 };
 
 // Never destroyed: the process may exit with connections open, and joining their threads while the library is being
 // unloaded would hang it.
 LibraryState& Library();
 
-// The first row with the handle, in use or not (a free row has handle 0); null for 0. Lock held.
-Context* FindContext(LibraryState& library, KRAL_HANDLE handle);
+// The first row with the handle, in use or not (a free row has handle 0); null for 0.
+Context* FindContext(LibraryState& library, KRAL_HANDLE handle) KRAL_REQUIRES(library.mutex);
 
 // The proxy of that name, or null: no server, or it failed to start.
 std::shared_ptr<OrbtServer> MakeServer(const char* name);

@@ -11,11 +11,11 @@
 #include <functional>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <span>
 #include <string>
 #include <vector>
 
+#include "base/mutex.h"
 #include "frame/efs_server.h"
 #include "transport/line/packet_listener.h"
 
@@ -59,8 +59,8 @@ class SoftwareDownload {
   uint16_t kivrat_hello_behavior() const { return kivrat_hello_behavior_; }
 
  private:
-  mutable std::mutex mutex_;
-  std::map<uint32_t, int32_t> time_outs_;
+  mutable Mutex mutex_;
+  std::map<uint32_t, int32_t> time_outs_ KRAL_GUARDED_BY(mutex_);
   std::atomic<uint16_t> kivrat_hello_behavior_{0};
 };
 

@@ -24,8 +24,9 @@ uint16_t PortNumber(const std::string& name) {
 bool ListMachinePorts(std::vector<uint16_t>& ports) {
   Kral_ResourceManager::PortLister lister;
   {
-    const std::lock_guard lock(Library().mutex);
-    lister = Library().port_lister;
+    auto& library = Library();
+    const MutexLock lock(library.mutex);
+    lister = library.port_lister;
   }
   return lister(ports);
 }
@@ -33,13 +34,13 @@ bool ListMachinePorts(std::vector<uint16_t>& ports) {
 // The proxy that answers for ports rather than for a handset; made on first use, kept until all is disconnected.
 std::shared_ptr<OrbtServer> PortInfo() {
   auto& library = Library();
-  const std::lock_guard building(library.build_mutex);
+  const MutexLock building(library.build_mutex);
   {
-    const std::lock_guard lock(library.mutex);
+    const MutexLock lock(library.mutex);
     if (library.port_info) return library.port_info;
   }
   auto made = MakeServer("KRAL-PortInfo");
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.port_info = made;
   return made;
 }
@@ -107,19 +108,19 @@ bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<c
 
 void AddPortAlias(uint16_t logical, uint16_t physical) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.aliases.emplace_back(logical, physical);
 }
 
 void ClearPortAliases() {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.aliases.clear();
 }
 
 bool ResolvePortAlias(uint16_t logical, uint16_t& physical) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   const auto found = std::find_if(library.aliases.begin(), library.aliases.end(),
                                   [logical](const auto& alias) { return alias.first == logical; });
   if (found == library.aliases.end()) return false;

@@ -58,7 +58,7 @@ KRAL_HANDLE CreateContext(uint16_t port) {
     port = found[0];
   }
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   auto& rows = library.contexts;
   const auto shared =
       std::find_if(rows.begin(), rows.end(), [port](const Context& row) { return row.in_use && row.port == port; });
@@ -93,7 +93,7 @@ void ReleaseContext(KRAL_HANDLE handle, bool force) {
   ContextObjects doomed;
   {
     auto& library = Library();
-    const std::lock_guard lock(library.mutex);
+    const MutexLock lock(library.mutex);
     Context* context = FindContext(library, handle);
     if (context == nullptr) return;
     --context->use_count;
@@ -107,22 +107,21 @@ void ReleaseContext(KRAL_HANDLE handle, bool force) {
 
 void ReleaseAllContexts() {
   auto& library = Library();
-  for (auto& row : library.contexts) {
-    KRAL_HANDLE handle = 0;
-    {
-      const std::lock_guard lock(library.mutex);
-      handle = row.in_use ? row.handle : 0;
-    }
-    ReleaseContext(handle, true);
+  std::array<KRAL_HANDLE, Kral_ResourceManager::kContextCount> handles{};
+  {
+    const MutexLock lock(library.mutex);
+    std::transform(library.contexts.begin(), library.contexts.end(), handles.begin(),
+                   [](const Context& row) { return row.in_use ? row.handle : KRAL_HANDLE{0}; });
   }
+  for (const KRAL_HANDLE handle : handles) ReleaseContext(handle, true);
   std::shared_ptr<OrbtServer> port_info;
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   port_info.swap(library.port_info);
 }
 
 bool PortOf(KRAL_HANDLE handle, uint16_t& port) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   const Context* context = FindContext(library, handle);
   if (context == nullptr) return false;
   port = context->port;
@@ -152,19 +151,19 @@ void SetDefaultReceiveMode(ReceiveMode mode) {
 
 void SetDeviceOpener(DeviceOpener opener) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.device_opener = opener ? std::move(opener) : DeviceOpener(OpenComPort);
 }
 
 void SetPortLister(PortLister lister) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.port_lister = lister ? std::move(lister) : PortLister(ListComPorts);
 }
 
 void SetMutexMaker(MutexMaker maker) {
   auto& library = Library();
-  const std::lock_guard lock(library.mutex);
+  const MutexLock lock(library.mutex);
   library.mutex_maker = maker ? std::move(maker) : MutexMaker(CreateNamedMutex);
 }
 

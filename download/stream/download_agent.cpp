@@ -7,7 +7,7 @@ namespace kral::stream {
 
 void DownloadAgent::Start(uint32_t window) {
   Stop();
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   free_.Fill(window);
   outstanding_.SetWindow(window);
   final_block_.Clear();
@@ -17,12 +17,12 @@ void DownloadAgent::Start(uint32_t window) {
 }
 
 void DownloadAgent::Enqueue(const CDownloadBlock& piece) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   pending_.Push(piece);
 }
 
 void DownloadAgent::Stop() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   free_.Clear();
   pending_.Clear();
   resend_.Clear();
@@ -30,7 +30,7 @@ void DownloadAgent::Stop() {
 }
 
 bool DownloadAgent::done() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return pending_.empty() && resend_.empty() && outstanding_.empty();
 }
 
@@ -41,8 +41,9 @@ bool DownloadAgent::HasTurn() const {
 }
 
 DownloadAgent::Wait DownloadAgent::AwaitTurn(uint32_t slice_ms) {
-  std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, std::chrono::milliseconds(slice_ms), [this] { return failed_ || HasTurn(); });
+  MutexLock lock(mutex_);
+  changed_.WaitFor(lock, std::chrono::milliseconds(slice_ms),
+                   [this]() KRAL_REQUIRES(mutex_) { return failed_ || HasTurn(); });
   if (failed_) return Wait::kFailed;
   if (!HasTurn()) return Wait::kTimeOut;
   acknowledgement_arrived_ = false;
@@ -50,18 +51,18 @@ DownloadAgent::Wait DownloadAgent::AwaitTurn(uint32_t slice_ms) {
 }
 
 std::optional<CDownloadBlock> DownloadAgent::TakeResend() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   if (resend_.empty() || !outstanding_.TakeSlot()) return std::nullopt;
   return MakeOutstanding(*resend_.Pop());
 }
 
 std::optional<CDownloadBlock> DownloadAgent::head() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return pending_.oldest();
 }
 
 std::optional<CDownloadBlock> DownloadAgent::Carve(uint32_t size) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto head = pending_.oldest();
   if (!head || size == 0 || size > head->size || !outstanding_.TakeSlot()) return std::nullopt;
   if (!free_.Pop()) return std::nullopt;
@@ -71,7 +72,7 @@ std::optional<CDownloadBlock> DownloadAgent::Carve(uint32_t size) {
 }
 
 std::optional<CDownloadBlock> DownloadAgent::Newest() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return outstanding_.newest();
 }
 
@@ -81,7 +82,7 @@ CDownloadBlock DownloadAgent::MakeOutstanding(const CDownloadBlock& block) {
 }
 
 std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t address) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   // A reply that came twice, or for a block that is to be sent again, is nothing to go by; nor is one that comes after
   // the writing has failed: what is reported as acknowledged is so at the failure.
   if (failed_ || !outstanding_.Holds(address)) return std::nullopt;
@@ -101,39 +102,39 @@ std::optional<DownloadAgent::Acknowledged> DownloadAgent::Acknowledge(uint32_t a
   bytes_acknowledged_ += result.size;
   ++blocks_acknowledged_;
   acknowledgement_arrived_ = true;
-  changed_.notify_all();
+  changed_.NotifyAll();
   return result;
 }
 
 void DownloadAgent::Fail(const std::optional<OtherReply>& reply) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   failed_ = true;
   other_reply_ = reply;
-  changed_.notify_all();
+  changed_.NotifyAll();
 }
 
 std::optional<DownloadAgent::OtherReply> DownloadAgent::other_reply() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return other_reply_;
 }
 
 void DownloadAgent::CountSent() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   ++blocks_sent_;
 }
 
 uint32_t DownloadAgent::blocks_sent() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return blocks_sent_;
 }
 
 uint32_t DownloadAgent::bytes_acknowledged() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return bytes_acknowledged_;
 }
 
 uint32_t DownloadAgent::blocks_acknowledged() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return blocks_acknowledged_;
 }
 

@@ -3,12 +3,11 @@
 #ifndef KRAL_DOWNLOAD_STREAM_DOWNLOAD_AGENT_H
 #define KRAL_DOWNLOAD_STREAM_DOWNLOAD_AGENT_H
 
-#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
-#include <mutex>
 #include <optional>
 
+#include "base/mutex.h"
 #include "base/waitable_timer.h"
 #include "download/stream/download_block.h"
 
@@ -60,22 +59,22 @@ class DownloadAgent {
   uint32_t blocks_acknowledged() const;
 
  private:
-  bool HasTurn() const;
-  CDownloadBlock MakeOutstanding(const CDownloadBlock& block);
+  bool HasTurn() const KRAL_REQUIRES(mutex_);
+  CDownloadBlock MakeOutstanding(const CDownloadBlock& block) KRAL_REQUIRES(mutex_);
 
-  mutable std::mutex mutex_;  // the critical section of every queue below
-  std::condition_variable changed_;
-  CDownloadBlockFreeQueue free_;
-  CDownloadBlockQueue pending_;
-  CDownloadBlockQueue resend_;
-  CSemaphoreQueue outstanding_;
-  CFinalBlock final_block_;
-  bool acknowledgement_arrived_ = false;  // reset by the wait that it ends
-  bool failed_ = false;
-  std::optional<OtherReply> other_reply_;
-  uint32_t blocks_sent_ = 0;
-  uint32_t blocks_acknowledged_ = 0;
-  uint32_t bytes_acknowledged_ = 0;
+  mutable Mutex mutex_;
+  Condition changed_;
+  CDownloadBlockFreeQueue free_ KRAL_GUARDED_BY(mutex_);
+  CDownloadBlockQueue pending_ KRAL_GUARDED_BY(mutex_);
+  CDownloadBlockQueue resend_ KRAL_GUARDED_BY(mutex_);
+  CSemaphoreQueue outstanding_ KRAL_GUARDED_BY(mutex_);
+  CFinalBlock final_block_ KRAL_GUARDED_BY(mutex_);
+  bool acknowledgement_arrived_ KRAL_GUARDED_BY(mutex_) = false;  // reset by the wait that it ends
+  bool failed_ KRAL_GUARDED_BY(mutex_) = false;
+  std::optional<OtherReply> other_reply_ KRAL_GUARDED_BY(mutex_);
+  uint32_t blocks_sent_ KRAL_GUARDED_BY(mutex_) = 0;
+  uint32_t blocks_acknowledged_ KRAL_GUARDED_BY(mutex_) = 0;
+  uint32_t bytes_acknowledged_ KRAL_GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace kral::stream

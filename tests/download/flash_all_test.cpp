@@ -108,7 +108,7 @@ TEST_F(FlashAll, GoesFromColdToTheNewSoftware) {
 }
 
 TEST_F(FlashAll, FollowsAHandsetThatComesBackAsAnotherDevice) {
-  handset_.mode().SetLoader(std::make_shared<handset::Reappearance>(handset_.boot_loader(), 20, 40));
+  handset_.mode().SetLoader(std::make_shared<handset::Reappearance>(handset_.boot_loader(), 250, 40));
   Use(KRAL_ConnectServer(7));
   EXPECT_EQ(Revision(), "VHS-1.0.105-R2");
   ASSERT_EQ(KRAL_DIAG_DLOAD_F(handle_), 1);

@@ -300,7 +300,7 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   handset().efs().AddItemFile(kRfFile, RandomBytes(300));
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
   const pkv::PkvSet good = Read("good.pkv");
-  ShortenTimeOuts(20);
+  ShortenTimeOuts(100);
   for (const auto& row : kRows) {
     for (uint64_t packet : {2, 8, 14}) {
       SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
@@ -325,7 +325,7 @@ TEST_F(PkvBackup, ALostRequestForAFolderIsMadeAgain) {
   Furnish();
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
   MakeBlank();
-  ShortenTimeOuts(20);
+  ShortenTimeOuts(250);
   const std::string folder = "nv/reg_files/conf/below";
   ASSERT_EQ(KRAL_EfsRmDir(handle(), folder.c_str(), nullptr), 1);
   const std::string request = "4B 13 09 00 FF 01 " + handset::HexText(Bytes(folder.begin(), folder.end()));
@@ -339,7 +339,7 @@ TEST_F(PkvBackup, ALostRequestForAFolderIsMadeAgain) {
 TEST_F(PkvBackup, AnUnpluggedCableLeavesTheOldFileAndTellsWhatWasReached) {
   Furnish();
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
-  ShortenTimeOuts(20);
+  ShortenTimeOuts(250);
   folder_.Add("phone.pkv", "precious");
   handset().faults().Add(handset::HangUp(), When::Nth(30).Of("26"));
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_LOST);

@@ -32,13 +32,13 @@ CapturePlayer::~CapturePlayer() {
 
 bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& dispatcher, CKralEventListener& sorter,
                           std::shared_ptr<void> owner) {
-  const std::lock_guard control(control_mutex_);
+  const MutexLock control(control_mutex_);
   if (!source || state_ == PlayState::kPlaying) return false;
   // Its end is told a moment before the thread has left.
   if (thread_.running() && !ended_.WaitFor(kLeaveMs)) return false;
   thread_.Join();
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     stop_requested_ = false;
   }
   played_ = 0;
@@ -54,9 +54,9 @@ bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& disp
 }
 
 void CapturePlayer::RequestStop() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   stop_requested_ = true;
-  changed_.notify_all();
+  changed_.NotifyAll();
 }
 
 bool CapturePlayer::Stop(uint32_t time_out_ms) {
@@ -64,7 +64,7 @@ bool CapturePlayer::Stop(uint32_t time_out_ms) {
     RequestStop();  // whoever else starts or stops may be waiting for this thread
     return true;
   }
-  const std::lock_guard control(control_mutex_);
+  const MutexLock control(control_mutex_);
   if (thread_.running()) {
     RequestStop();
     if (!ended_.WaitFor(time_out_ms)) return false;
@@ -119,7 +119,7 @@ PlayState CapturePlayer::Run(CaptureReader reader, const Line& line) {
 }
 
 void CapturePlayer::SetCallback(KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   callback_ = callback;
   callback_value_ = value;
 }
@@ -128,7 +128,7 @@ void CapturePlayer::CallBack(const CaptureRecord& record) {
   KRAL_PLAYBACK_CALLBACK callback = nullptr;
   uintptr_t value = 0;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     callback = callback_;
     value = callback_value_;
   }
@@ -178,13 +178,13 @@ bool CapturePlayer::AwaitTurn(uint64_t microseconds) {
 }
 
 bool CapturePlayer::GoesOn() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return !stop_requested_;
 }
 
 bool CapturePlayer::Sleep(std::chrono::microseconds time) {
-  std::unique_lock lock(mutex_);
-  return !changed_.wait_for(lock, time, [this] { return stop_requested_; });
+  MutexLock lock(mutex_);
+  return !changed_.WaitFor(lock, time, [this]() KRAL_REQUIRES(mutex_) { return stop_requested_; });
 }
 
 }  // namespace kral

@@ -4,13 +4,12 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <thread>
 
 #include "base/event.h"
+#include "base/mutex.h"
 #include "base/worker_thread.h"
 #include "kral/log.h"
 #include "transport/collection/capture_reader.h"
@@ -79,12 +78,12 @@ class CapturePlayer {
   bool GoesOn();                               // so does this
   void RequestStop();
 
-  std::mutex control_mutex_;  // one start or stop at a time
-  std::mutex mutex_;          // of what follows
-  std::condition_variable changed_;
-  bool stop_requested_ = false;
-  KRAL_PLAYBACK_CALLBACK callback_ = nullptr;
-  uintptr_t callback_value_ = 0;
+  Mutex control_mutex_;  // one start or stop at a time
+  Mutex mutex_;
+  Condition changed_;
+  bool stop_requested_ KRAL_GUARDED_BY(mutex_) = false;
+  KRAL_PLAYBACK_CALLBACK callback_ KRAL_GUARDED_BY(mutex_) = nullptr;
+  uintptr_t callback_value_ KRAL_GUARDED_BY(mutex_) = 0;
 
   std::atomic<PlayState> state_{PlayState::kIdle};
   std::atomic<uint64_t> played_{0};

@@ -75,7 +75,7 @@ CaptureWriter::~CaptureWriter() {
 }
 
 bool CaptureWriter::Start(const std::function<CaptureSink()>& open, std::shared_ptr<void> owner) {
-  const std::lock_guard control(control_mutex_);
+  const MutexLock control(control_mutex_);
   if (state_ == CaptureState::kRunning || (state_ == CaptureState::kEnding && !ended_.WaitFor(0))) return false;
   thread_.Join();
   state_ = CaptureState::kNone;
@@ -83,7 +83,7 @@ bool CaptureWriter::Start(const std::function<CaptureSink()>& open, std::shared_
   const auto head = MakeHead();
   if (!sink || sink(head) != head.size()) return false;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     stop_requested_ = false;
   }
   sink_ = std::move(sink);
@@ -107,7 +107,7 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
   bool kept = false;
   bool wake = false;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     if (stop_requested_) return;  // it came after the end
     std::vector<uint8_t>& records = pending_.records;
     const size_t before = records.size();
@@ -126,18 +126,18 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
       }
     }
   }
-  if (wake) changed_.notify_one();
+  if (wake) changed_.NotifyOne();
   if (!kept) Lose(1, "the disk is too slow");
 }
 
 bool CaptureWriter::Stop(uint32_t time_out_ms) {
-  const std::lock_guard control(control_mutex_);
+  const MutexLock control(control_mutex_);
   if (state_ == CaptureState::kNone) return false;
   state_ = CaptureState::kEnding;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     stop_requested_ = true;
-    changed_.notify_one();
+    changed_.NotifyOne();
   }
   if (!ended_.WaitFor(time_out_ms)) {
     log_.WriteLine(kLogErr, "Capture file: %u packets still wait for the disk", static_cast<unsigned>(pending()));
@@ -163,8 +163,9 @@ void CaptureWriter::Run() {
 bool CaptureWriter::TakeBatch(Batch& batch) {
   batch.records.clear();
   batch.packets = 0;
-  std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, kGatherTime, [this] { return stop_requested_ || pending_.records.size() >= kGoodPiece; });
+  MutexLock lock(mutex_);
+  changed_.WaitFor(lock, kGatherTime,
+                   [this]() KRAL_REQUIRES(mutex_) { return stop_requested_ || pending_.records.size() >= kGoodPiece; });
   std::swap(batch, pending_);
   return batch.packets != 0 || !stop_requested_;
 }

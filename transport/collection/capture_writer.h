@@ -4,17 +4,16 @@
 #define KRAL_TRANSPORT_COLLECTION_CAPTURE_WRITER_H
 
 #include <atomic>
-#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <span>
 #include <string>
 #include <vector>
 
 #include "base/event.h"
+#include "base/mutex.h"
 #include "base/worker_thread.h"
 
 namespace kral {
@@ -81,13 +80,13 @@ class CaptureWriter {
   std::atomic<uint64_t> lost_{0};
   std::atomic<bool> loss_told_{false};  // in the text log, once for each capture
 
-  std::mutex control_mutex_;  // one start or stop at a time
-  uint64_t lost_before_ = 0;
+  Mutex control_mutex_;  // one start or stop at a time
+  uint64_t lost_before_ KRAL_GUARDED_BY(control_mutex_) = 0;
 
-  std::mutex mutex_;  // of what follows
-  std::condition_variable changed_;
-  Batch pending_;
-  bool stop_requested_ = false;
+  Mutex mutex_;
+  Condition changed_;
+  Batch pending_ KRAL_GUARDED_BY(mutex_);
+  bool stop_requested_ KRAL_GUARDED_BY(mutex_) = false;
 
   CaptureSink sink_;  // the thread's own while it runs
   ManualResetEvent ended_{"KRAL_CAPTURE_ENDED"};

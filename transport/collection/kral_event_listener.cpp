@@ -136,14 +136,14 @@ TrafficCounters CKralEventListener::counters() const {
 }
 
 void CKralEventListener::SetRawPacketCallback(RawPacketCallback callback, uintptr_t value) {
-  const std::lock_guard lock(callback_mutex_);
+  const MutexLock lock(callback_mutex_);
   callback_ = callback;
   callback_value_ = value;
   NoteCallbacks();
 }
 
 void CKralEventListener::SetCollectionCallbacks(const CollectionCallbacks& callbacks) {
-  const std::lock_guard lock(callback_mutex_);
+  const MutexLock lock(callback_mutex_);
   collection_callbacks_ = callbacks;
   NoteCallbacks();
 }
@@ -154,7 +154,7 @@ void CKralEventListener::NoteCallbacks() {
 }
 
 CollectionCallbacks CKralEventListener::collection_callbacks() {
-  const std::lock_guard lock(callback_mutex_);
+  const MutexLock lock(callback_mutex_);
   return collection_callbacks_;
 }
 
@@ -162,7 +162,7 @@ void CKralEventListener::CallRawPacketCallback(std::span<const uint8_t> packet) 
   RawPacketCallback callback = nullptr;
   uintptr_t value = 0;
   {
-    const std::lock_guard lock(callback_mutex_);
+    const MutexLock lock(callback_mutex_);
     callback = callback_;
     value = callback_value_;
   }
@@ -171,28 +171,28 @@ void CKralEventListener::CallRawPacketCallback(std::span<const uint8_t> packet) 
 }
 
 void CKralEventListener::AddEventHandler(EventHandler* handler) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   event_handlers_.push_back(handler);
 }
 
 void CKralEventListener::RemoveEventHandler(EventHandler* handler) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   std::erase(event_handlers_, handler);
 }
 
 void CKralEventListener::AddLogHandler(LogHandler* handler) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   log_handlers_.push_back(handler);
 }
 
 void CKralEventListener::RemoveLogHandler(LogHandler* handler) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   std::erase(log_handlers_, handler);
 }
 
 // By index, because a handler may remove itself.
 bool CKralEventListener::IsClaimed(std::span<const uint8_t> event_report) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   for (size_t i = 0; i < event_handlers_.size(); ++i) {
     if (event_handlers_[i]->Claims(event_report)) return true;
   }
@@ -200,7 +200,7 @@ bool CKralEventListener::IsClaimed(std::span<const uint8_t> event_report) {
 }
 
 void CKralEventListener::OfferLog(std::span<const uint8_t> log_packet) {
-  const std::lock_guard lock(handlers_mutex_);
+  const RecursiveLock lock(handlers_mutex_);
   for (size_t i = 0; i < log_handlers_.size(); ++i) log_handlers_[i]->OnLog(log_packet);
 }
 

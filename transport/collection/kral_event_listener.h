@@ -5,11 +5,11 @@
 #include <atomic>
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <span>
 #include <string>
 #include <vector>
 
+#include "base/mutex.h"
 #include "kral/log.h"
 #include "transport/collection/event_record.h"
 #include "transport/engine/bounded_queue.h"
@@ -93,7 +93,7 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   void QueueAsynchronous(Packet packet);
   void QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks);
   CollectionCallbacks collection_callbacks();
-  void NoteCallbacks();  // callbacks locked
+  void NoteCallbacks() KRAL_REQUIRES(callback_mutex_);
   std::string EventText(uint16_t id) const;
 
   PacketQueue& responses_;
@@ -108,15 +108,15 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   std::atomic<uint64_t> dropped_by_size_{0};
 
   std::atomic<bool> has_callbacks_{false};
-  std::mutex callback_mutex_;
-  RawPacketCallback callback_ = nullptr;
-  uintptr_t callback_value_ = 0;
-  CollectionCallbacks collection_callbacks_;
+  Mutex callback_mutex_;
+  RawPacketCallback callback_ KRAL_GUARDED_BY(callback_mutex_) = nullptr;
+  uintptr_t callback_value_ KRAL_GUARDED_BY(callback_mutex_) = 0;
+  CollectionCallbacks collection_callbacks_ KRAL_GUARDED_BY(callback_mutex_);
 
   // Held while handlers are called; recursive, because one may remove itself.
-  std::recursive_mutex handlers_mutex_;
-  std::vector<EventHandler*> event_handlers_;
-  std::vector<LogHandler*> log_handlers_;
+  RecursiveMutex handlers_mutex_;
+  std::vector<EventHandler*> event_handlers_ KRAL_GUARDED_BY(handlers_mutex_);
+  std::vector<LogHandler*> log_handlers_ KRAL_GUARDED_BY(handlers_mutex_);
 };
 
 }  // namespace kral

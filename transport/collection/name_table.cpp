@@ -83,12 +83,12 @@ NameTables::NameTables() {
 
 void NameTables::Set(NameTableKind kind, std::shared_ptr<const NameTable> table) {
   if (!table) table = std::make_shared<const NameTable>();
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   tables_[static_cast<size_t>(kind)].swap(table);
 }
 
 std::shared_ptr<const NameTable> NameTables::Get(NameTableKind kind) const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return tables_[static_cast<size_t>(kind)];
 }
 

@@ -6,12 +6,13 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <string_view>
 #include <system_error>
 #include <unordered_map>
 #include <vector>
+
+#include "base/mutex.h"
 
 namespace kral {
 
@@ -65,8 +66,8 @@ class NameTables {
   bool Allows(NameTableKind kind, uint16_t id) const;
 
  private:
-  mutable std::mutex mutex_;
-  std::array<std::shared_ptr<const NameTable>, kNameTableCount> tables_;
+  mutable Mutex mutex_;
+  std::array<std::shared_ptr<const NameTable>, kNameTableCount> tables_ KRAL_GUARDED_BY(mutex_);
 };
 
 }  // namespace kral

@@ -5,16 +5,15 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
-#include <mutex>
 #include <optional>
 #include <type_traits>
 #include <utility>
 #include <vector>
 
+#include "base/mutex.h"
 #include "transport/line/packet_listener.h"
 
 namespace kral {
@@ -39,17 +38,17 @@ class BoundedQueue {
     constexpr size_t kManyRecords = 512;
     bool many = false;
     {
-      const std::lock_guard staging(staging_mutex_);
+      const MutexLock staging(staging_mutex_);
       staged_.push_back(std::move(record));
       many = staged_.size() >= kManyRecords;
     }
     if (many) WakeReaders();
   }
   void Publish() {
-    const std::lock_guard staging(staging_mutex_);
+    const MutexLock staging(staging_mutex_);
     if (staged_.empty()) return;
     {
-      const std::lock_guard lock(mutex_);
+      const MutexLock lock(mutex_);
       for (Record& record : staged_) Append(std::move(record));
     }
     staged_.clear();
@@ -57,20 +56,20 @@ class BoundedQueue {
   // Publishes, and tells those who wait.
   void WakeReaders() {
     Publish();
-    not_empty_.notify_all();
+    not_empty_.NotifyAll();
   }
 
   std::optional<Record> Pop() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     return TakeFront();
   }
 
   // The oldest record, or nothing after the time-out, or once `abort` is set. 0 does not wait. Any record that is there
   // counts, also one that came before the call: no signal can be left over from a queue since cleared.
   std::optional<Record> PopWithin(std::chrono::milliseconds time_out, const std::atomic<bool>* abort = nullptr) {
-    std::unique_lock lock(mutex_);
+    MutexLock lock(mutex_);
     const uint64_t known = told_interrupts_;
-    not_empty_.wait_for(lock, time_out, [this, known, abort] {
+    not_empty_.WaitFor(lock, time_out, [this, known, abort]() KRAL_REQUIRES(mutex_) {
       return closed_ || interrupts_ != known || !records_.empty() || (abort != nullptr && abort->load());
     });
     if (records_.empty()) told_interrupts_ = interrupts_;
@@ -78,63 +77,63 @@ class BoundedQueue {
   }
   // After an abort has been set.
   void EndWaits() {
-    const std::lock_guard lock(mutex_);
-    not_empty_.notify_all();
+    const MutexLock lock(mutex_);
+    not_empty_.NotifyAll();
   }
 
   // Nobody waits in this queue until it is opened again; what is in it can be taken.
   void Close() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     closed_ = true;
-    not_empty_.notify_all();
+    not_empty_.NotifyAll();
   }
   void Reopen() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     closed_ = false;
   }
   bool closed() const {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     return closed_;
   }
 
   // What fills the queue is gone. Ends the waits under way, and the next one that finds nothing: its reader may have
   // been busy with a record. Those behind it wait as ever, or a reader that tries again and again would never rest.
   void Interrupt() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     ++interrupts_;
-    not_empty_.notify_all();
+    not_empty_.NotifyAll();
   }
   // It is back: an interruption that nobody has been told of is none any more.
   void ForgetInterrupt() {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     told_interrupts_ = interrupts_;
   }
 
   std::deque<Record> TakeAll() {
     std::deque<Record> all;
     Publish();
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     all.swap(records_);
     return all;
   }
   void Clear() { TakeAll(); }
 
   size_t size() const {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     return records_.size();
   }
 
   uint64_t pushed() const {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     return pushed_;
   }
   uint64_t dropped() const {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     return dropped_;
   }
 
  private:
-  void Append(Record record) {  // locked
+  void Append(Record record) KRAL_REQUIRES(mutex_) {
     ++pushed_;
     try {
       records_.push_back(std::move(record));
@@ -147,7 +146,7 @@ class BoundedQueue {
     ++dropped_;
   }
 
-  std::optional<Record> TakeFront() {
+  std::optional<Record> TakeFront() KRAL_REQUIRES(mutex_) {
     if (records_.empty()) return std::nullopt;
     std::optional<Record> front(std::move(records_.front()));
     records_.pop_front();
@@ -158,16 +157,16 @@ class BoundedQueue {
   }
 
   const size_t capacity_;
-  std::mutex staging_mutex_;  // locked before the other
-  std::vector<Record> staged_;
-  mutable std::mutex mutex_;  // of what follows
-  std::condition_variable not_empty_;
-  std::deque<Record> records_;
-  uint64_t pushed_ = 0;
-  uint64_t dropped_ = 0;
-  bool closed_ = false;
-  uint64_t interrupts_ = 0;
-  uint64_t told_interrupts_ = 0;
+  Mutex staging_mutex_;  // locked before the other
+  std::vector<Record> staged_ KRAL_GUARDED_BY(staging_mutex_);
+  mutable Mutex mutex_;
+  Condition not_empty_;
+  std::deque<Record> records_ KRAL_GUARDED_BY(mutex_);
+  uint64_t pushed_ KRAL_GUARDED_BY(mutex_) = 0;
+  uint64_t dropped_ KRAL_GUARDED_BY(mutex_) = 0;
+  bool closed_ KRAL_GUARDED_BY(mutex_) = false;
+  uint64_t interrupts_ KRAL_GUARDED_BY(mutex_) = 0;
+  uint64_t told_interrupts_ KRAL_GUARDED_BY(mutex_) = 0;
 };
 
 using PacketQueue = BoundedQueue<Packet>;

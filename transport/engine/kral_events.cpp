@@ -19,7 +19,7 @@ CKralEvents::~CKralEvents() {
 
 bool CKralEvents::RegisterListener(PacketListener* listener, const PacketFilter* filter, std::shared_ptr<void> owner) {
   if (listener == nullptr) return false;
-  const std::lock_guard lock(listeners_mutex_);
+  const RecursiveLock lock(listeners_mutex_);
   listeners_.push_back({listener, filter});
   return EnsureThread(std::move(owner));
 }
@@ -27,13 +27,13 @@ bool CKralEvents::RegisterListener(PacketListener* listener, const PacketFilter*
 bool CKralEvents::EnsureThread(std::shared_ptr<void> owner) {
   // In front of the lock, which a running thread holds for as long as a callback takes.
   if (thread_.running()) return true;
-  const std::lock_guard lock(listeners_mutex_);
+  const RecursiveLock lock(listeners_mutex_);
   return StartThread(std::move(owner));
 }
 
 bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
   {
-    const std::lock_guard lock(queue_mutex_);
+    const MutexLock lock(queue_mutex_);
     accepting_ = true;
     stop_requested_ = false;
     pushed_ = 0;
@@ -48,7 +48,7 @@ bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
 }
 
 void CKralEvents::UnregisterListener(PacketListener* listener) {
-  const std::lock_guard lock(listeners_mutex_);
+  const RecursiveLock lock(listeners_mutex_);
   const auto found = std::find_if(listeners_.begin(), listeners_.end(),
                                   [listener](const Registration& entry) { return entry.listener == listener; });
   if (found == listeners_.end()) return;
@@ -68,13 +68,13 @@ void CKralEvents::Push(std::span<const uint8_t> packet) {
 void CKralEvents::PushAll(std::vector<Packet>& packets) {
   // The queue is locked for moments only. The receive thread may be one that shows windows for the caller's
   // transport, whose messages must not wait even so.
-  while (!queue_mutex_.try_lock()) {
+  while (!queue_mutex_.TryLock()) {
     PumpPendingMessages();
     std::this_thread::yield();
   }
   bool was_empty = false;
   {
-    const std::lock_guard lock(queue_mutex_, std::adopt_lock);
+    const MutexLock lock(queue_mutex_, std::adopt_lock);
     was_empty = queue_.empty();
     if (accepting_) {
       queue_.insert(queue_.end(), std::make_move_iterator(packets.begin()), std::make_move_iterator(packets.end()));
@@ -85,13 +85,14 @@ void CKralEvents::PushAll(std::vector<Packet>& packets) {
   }
   packets.clear();
   // The dispatcher takes the whole queue at a time and waits only for an empty one.
-  if (was_empty) new_packet_.notify_one();
+  if (was_empty) new_packet_.NotifyOne();
 }
 
 bool CKralEvents::WaitUntilDispatched(uint32_t time_out_ms) {
-  std::unique_lock lock(queue_mutex_);
-  return batch_done_.wait_for(lock, std::chrono::milliseconds(time_out_ms),
-                              [this, last = pushed_] { return dispatched_ >= last || !accepting_; });
+  MutexLock lock(queue_mutex_);
+  return batch_done_.WaitFor(lock, std::chrono::milliseconds(time_out_ms),
+                             [this, last = pushed_]()
+                                 KRAL_REQUIRES(queue_mutex_) { return dispatched_ >= last || !accepting_; });
 }
 
 bool CKralEvents::Stop(uint32_t time_out_ms) {
@@ -107,13 +108,13 @@ bool CKralEvents::Stop(uint32_t time_out_ms) {
 
 // A notification under the lock: the thread may be the last to need this object.
 void CKralEvents::EndAccepting() {
-  const std::lock_guard lock(queue_mutex_);
+  const MutexLock lock(queue_mutex_);
   accepting_ = false;
   stop_requested_ = true;
   backlog_.fetch_sub(queue_.size(), std::memory_order_relaxed);
   queue_.clear();
-  new_packet_.notify_one();
-  batch_done_.notify_all();
+  new_packet_.NotifyOne();
+  batch_done_.NotifyAll();
 }
 
 void CKralEvents::Run() {
@@ -136,13 +137,13 @@ void CKralEvents::Run() {
 }
 
 bool CKralEvents::TakeBatch(std::vector<Packet>& batch) {
-  std::unique_lock lock(queue_mutex_);
+  MutexLock lock(queue_mutex_);
   if (!batch.empty()) {
     dispatched_ += batch.size();
     batch.clear();
-    batch_done_.notify_all();
+    batch_done_.NotifyAll();
   }
-  new_packet_.wait(lock, [this] { return stop_requested_ || !queue_.empty(); });
+  new_packet_.Wait(lock, [this]() KRAL_REQUIRES(queue_mutex_) { return stop_requested_ || !queue_.empty(); });
   if (stop_requested_) return false;
   batch.swap(queue_);
   return true;
@@ -151,7 +152,7 @@ bool CKralEvents::TakeBatch(std::vector<Packet>& batch) {
 // By index: a listener may register another one, whose turn comes with the next call, and unregister any.
 template <class Call>
 void CKralEvents::ForEachListener(Call call) {
-  const std::lock_guard lock(listeners_mutex_);
+  const RecursiveLock lock(listeners_mutex_);
   dispatching_ = true;
   const size_t count = listeners_.size();
   for (size_t i = 0; i < count; ++i) {

@@ -3,14 +3,13 @@
 #define KRAL_TRANSPORT_ENGINE_KRAL_EVENTS_H
 
 #include <atomic>
-#include <condition_variable>
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <span>
 #include <vector>
 
 #include "base/event.h"
+#include "base/mutex.h"
 #include "base/worker_thread.h"
 #include "transport/engine/bounded_queue.h"
 #include "transport/line/packet_listener.h"
@@ -69,7 +68,7 @@ class CKralEvents {
     const PacketFilter* filter;
   };
 
-  bool StartThread(std::shared_ptr<void> owner);  // listeners locked
+  bool StartThread(std::shared_ptr<void> owner) KRAL_REQUIRES(listeners_mutex_);
   void Run();
   bool TakeBatch(std::vector<Packet>& batch);
   template <class Call>
@@ -78,21 +77,21 @@ class CKralEvents {
   void EndBatch();
   void EndAccepting();
 
-  std::mutex queue_mutex_;
-  std::condition_variable new_packet_;
-  std::condition_variable batch_done_;
-  std::vector<Packet> queue_;
-  bool accepting_ = false;
-  uint64_t pushed_ = 0;
-  uint64_t dispatched_ = 0;
+  Mutex queue_mutex_;
+  Condition new_packet_;
+  Condition batch_done_;
+  std::vector<Packet> queue_ KRAL_GUARDED_BY(queue_mutex_);
+  bool accepting_ KRAL_GUARDED_BY(queue_mutex_) = false;
+  uint64_t pushed_ KRAL_GUARDED_BY(queue_mutex_) = 0;
+  uint64_t dispatched_ KRAL_GUARDED_BY(queue_mutex_) = 0;
   std::atomic<uint64_t> backlog_{0};
   std::atomic<uint64_t> greatest_backlog_{0};  // changed under queue_mutex_
   std::atomic<bool> stop_requested_{false};
 
   // Recursive: a listener may register and unregister from its call.
-  std::recursive_mutex listeners_mutex_;
-  std::vector<Registration> listeners_;
-  bool dispatching_ = false;
+  RecursiveMutex listeners_mutex_;
+  std::vector<Registration> listeners_ KRAL_GUARDED_BY(listeners_mutex_);
+  bool dispatching_ KRAL_GUARDED_BY(listeners_mutex_) = false;
 
   ManualResetEvent stopped_{"KRAL_EVENTS_STOPPED"};
   WorkerThread thread_;  // last: nothing above may be gone while it is parked

@@ -91,17 +91,18 @@ bool ReceiveLoop::ReadChunk() {
 }
 
 void ReceiveLoop::SetSplitting(bool splitting) {
-  const std::lock_guard lock(chunk_mutex_);
+  const MutexLock lock(chunk_mutex_);
   splitting_ = splitting;
   if (splitting) return;
   ++chunks_;
-  chunk_done_.notify_all();
+  chunk_done_.NotifyAll();
 }
 
 bool ReceiveLoop::WaitForChunk(uint32_t time_out_ms) {
-  std::unique_lock lock(chunk_mutex_);
-  return chunk_done_.wait_for(lock, std::chrono::milliseconds(time_out_ms),
-                              [this, chunk = chunks_] { return !splitting_ || chunks_ != chunk; });
+  MutexLock lock(chunk_mutex_);
+  return chunk_done_.WaitFor(lock, std::chrono::milliseconds(time_out_ms),
+                             [this, chunk = chunks_]()
+                                 KRAL_REQUIRES(chunk_mutex_) { return !splitting_ || chunks_ != chunk; });
 }
 
 void ReceiveLoop::Split(uint32_t count) {

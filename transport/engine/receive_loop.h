@@ -3,13 +3,12 @@
 #define KRAL_TRANSPORT_ENGINE_RECEIVE_LOOP_H
 
 #include <atomic>
-#include <condition_variable>
 #include <cstdint>
 #include <functional>
-#include <mutex>
 #include <utility>
 #include <vector>
 
+#include "base/mutex.h"
 #include "kral/connection.h"
 #include "platform/clock.h"
 
@@ -66,10 +65,10 @@ class ReceiveLoop {
   std::atomic<uint32_t> sleep_divisor_{1};
   std::atomic<uint64_t> bytes_received_{0};
 
-  std::mutex chunk_mutex_;
-  std::condition_variable chunk_done_;
-  bool splitting_ = false;
-  uint64_t chunks_ = 0;
+  Mutex chunk_mutex_;
+  Condition chunk_done_;
+  bool splitting_ KRAL_GUARDED_BY(chunk_mutex_) = false;
+  uint64_t chunks_ KRAL_GUARDED_BY(chunk_mutex_) = 0;
 
   // The thread's own. Memory that is refused once it runs has nobody to be told to.
   static constexpr size_t kReadSize = 40960;

@@ -31,14 +31,14 @@ void ThreadControl::RequestStop() {
 }
 
 void ThreadControl::Notify() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   ++changes_;
-  changed_.notify_all();
+  changed_.NotifyAll();
 }
 
 void ThreadControl::WaitForChange(uint32_t seen, uint32_t milliseconds) {
-  std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, std::chrono::milliseconds(milliseconds), [this, seen] { return changes_ != seen; });
+  MutexLock lock(mutex_);
+  changed_.WaitFor(lock, std::chrono::milliseconds(milliseconds), [this, seen] { return changes_ != seen; });
 }
 
 }  // namespace kral

@@ -3,11 +3,10 @@
 #define KRAL_TRANSPORT_ENGINE_THREAD_CONTROL_H
 
 #include <atomic>
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
 
 #include "base/event.h"
+#include "base/mutex.h"
 
 namespace kral {
 
@@ -42,8 +41,8 @@ class ThreadControl {
   std::atomic<uint32_t> pause_wanted_{0};
   uint32_t last_pause_ = 0;
 
-  std::mutex mutex_;
-  std::condition_variable changed_;
+  Mutex mutex_;
+  Condition changed_;
   std::atomic<uint32_t> changes_{0};
 };
 

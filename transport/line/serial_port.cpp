@@ -68,7 +68,7 @@ uint32_t CSerialPort::Open(int32_t number) {
   if (!device) {
     last_error_ = OpenErrorCode(open_result_.error);
     {
-      const std::lock_guard lock(mutex_);
+      const MutexLock lock(mutex_);
       gone_ = gone_ && open_result_.error == DeviceError::kNoSuchPort;
     }
     log_->WriteLine(kLogErr, "CSerialPort::Open(COM%d) failed: %s (%u)", number, open_result_.text.c_str(),
@@ -77,7 +77,7 @@ uint32_t CSerialPort::Open(int32_t number) {
   }
   Prepare(*device);
   baud_rate_ = device->BaudRate();
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   fine_timer_.emplace();
   device_ = std::move(device);
   gone_ = false;
@@ -111,7 +111,7 @@ uint32_t CSerialPort::SetUserDefinedTransport(uintptr_t context, uintptr_t handl
                                               UserReceiveFunction receive, UserFlushFunction flush) {
   Close();
   const bool complete = send != nullptr && receive != nullptr && flush != nullptr;
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   user_ = {handle, context, send, receive, flush};
   user_defined_ = true;
   if (complete) fine_timer_.emplace();
@@ -127,7 +127,7 @@ uint32_t CSerialPort::IsOpen() const {
 uint32_t CSerialPort::Close() {
   std::shared_ptr<SerialDevice> device;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     device = LetGo();
   }
   if (device) device->Wake();
@@ -136,7 +136,7 @@ uint32_t CSerialPort::Close() {
 
 bool CSerialPort::CloseIfGone() {
   std::shared_ptr<SerialDevice> device;
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   if (!device_ || !device_->gone()) return false;
   device = LetGo();
   return true;
@@ -218,7 +218,7 @@ const DeviceResult& CSerialPort::open_result() const {
 }
 
 bool CSerialPort::gone() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return gone_ || (device_ && device_->gone());
 }
 
@@ -236,12 +236,12 @@ void CSerialPort::Wake() {
 }
 
 std::shared_ptr<SerialDevice> CSerialPort::Device() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return device_;
 }
 
 UserTransport CSerialPort::User() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return user_;
 }
 

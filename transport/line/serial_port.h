@@ -6,9 +6,9 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <optional>
 
+#include "base/mutex.h"
 #include "base/text_log.h"
 #include "platform/clock.h"
 #include "platform/serial_device.h"
@@ -100,7 +100,7 @@ class CSerialPort {
   uint32_t SendToUser(const uint8_t* bytes, uint32_t count, uint32_t& sent);
   uint32_t ReceiveFromDevice(uint8_t* buffer, uint32_t count, uint32_t& received);
   uint32_t ReceiveFromUser(uint8_t* buffer, uint32_t count, uint32_t& received);
-  std::shared_ptr<SerialDevice> LetGo();  // locked
+  std::shared_ptr<SerialDevice> LetGo() KRAL_REQUIRES(mutex_);
   int32_t Record(const DeviceResult& result);
 
   Clock& clock_;
@@ -116,11 +116,11 @@ class CSerialPort {
   std::atomic<bool> keep_buffers_{false};
   DeviceResult open_result_;
 
-  mutable std::mutex mutex_;             // guards what follows, for the moment of a copy
-  std::optional<FineTimer> fine_timer_;  // while the port is open
-  bool gone_ = false;                    // of a device that is no longer held
-  std::shared_ptr<SerialDevice> device_;
-  UserTransport user_;
+  mutable Mutex mutex_;                                          // for the moment of a copy
+  std::optional<FineTimer> fine_timer_ KRAL_GUARDED_BY(mutex_);  // while the port is open
+  bool gone_ KRAL_GUARDED_BY(mutex_) = false;                    // of a device that is no longer held
+  std::shared_ptr<SerialDevice> device_ KRAL_GUARDED_BY(mutex_);
+  UserTransport user_ KRAL_GUARDED_BY(mutex_);
 };
 
 }  // namespace kral
