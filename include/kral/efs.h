@@ -154,10 +154,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_
                                                        KRAL_EFS_DIRECTORY_CALLBACK directory);
 
 /**
- * Ends the transfer or listing that runs on another thread, before its next packet; it then returns 0. The answer to
- * the current packet is awaited only briefly: with a silent handset the function is back within 250 ms, and a
- * part of a file may stay there. Each of them forgets earlier calls when it starts. A backup, restore or comparison
- * (pkv.h) is stopped as its callback would stop it.
+ * Ends the transfer, listing or KRAL_EFS2_SyncWithWait that runs on another thread, before its next packet; it then
+ * returns 0. The answer to the current packet is awaited only briefly: with a silent handset the function is back
+ * within 250 ms, and a part of a file may stay there. Each of them forgets earlier calls when it starts. A backup,
+ * restore or comparison (pkv.h) is stopped as its callback would stop it, at whichever request it is.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle);
 

@@ -124,7 +124,7 @@ class BackupJob {
 }  // namespace
 
 uint32_t Backup(Diag_FTM& phone, const std::string& path) {
-  const efs::AbortWatch aborts(phone);
+  const efs::AbortableJob aborts(phone);
   pkv::PkvSet set;
   phone.state<Settings>().counts = {};
   // Before the many requests that would otherwise be in vain.

@@ -138,7 +138,7 @@ class RestoreJob {
 }  // namespace
 
 uint32_t Restore(Diag_FTM& phone, const std::string& path) {
-  const efs::AbortWatch aborts(phone);
+  const efs::AbortableJob aborts(phone);
   pkv::PkvSet set;
   if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
   return RestoreJob(phone, aborts, set).Run();

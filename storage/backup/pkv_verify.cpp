@@ -71,7 +71,7 @@ class VerifyJob {
 }  // namespace
 
 uint32_t Verify(Diag_FTM& phone, const std::string& path) {
-  const efs::AbortWatch aborts(phone);
+  const efs::AbortableJob aborts(phone);
   pkv::PkvSet set;
   if (const uint32_t status = ReadSet(phone, path, set); status != KRAL_PKV_STATUS_DONE) return status;
   return VerifyJob(phone, aborts, set).Run();

@@ -29,6 +29,20 @@ class AbortWatch {
   const uint32_t before_;
 };
 
+// The same for a job that sends requests of other kinds too: while it lives, an abort ends the wait for any reply. With
+// the request lock held.
+class AbortableJob : public AbortWatch {
+ public:
+  explicit AbortableJob(Diag_FTM& phone);
+  ~AbortableJob();
+  AbortableJob(const AbortableJob&) = delete;
+  AbortableJob& operator=(const AbortableJob&) = delete;
+
+ private:
+  Diag_FTM& phone_;
+  const std::atomic<bool>* former_ = nullptr;
+};
+
 // --- Transfers (efs_write.cpp, efs_read.cpp) ------------------------------------------------------------------------
 bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file);
 bool WriteFromMemory(Diag_FTM& phone, const uint8_t* buffer, uint32_t size, const char* efs_file);

@@ -45,12 +45,12 @@ class RequestScope {
   explicit RequestScope(Diag_FTM& phone) : phone_(phone) {
     if (phone.server_mode()) return;  // there is no transport of ours
     const std::atomic<bool>& abort = phone.state<Settings>().abort;
-    phone.transport().SetAbort(abort ? nullptr : &abort);
+    former_ = phone.transport().SetAbort(abort ? nullptr : &abort);
     phone.transport().SetForgotten([&phone](std::span<const u8> late) { NoteLateReply(phone, late); });
   }
   ~RequestScope() {
     if (phone_.server_mode()) return;
-    phone_.transport().SetAbort(nullptr);
+    phone_.transport().SetAbort(former_);
     phone_.transport().SetForgotten({});
   }
   RequestScope(const RequestScope&) = delete;
@@ -58,6 +58,7 @@ class RequestScope {
 
  private:
   Diag_FTM& phone_;
+  const std::atomic<bool>* former_ = nullptr;
 };
 
 void CloseStrays(Diag_FTM& phone, const EfsRequest<u32>& close, OpenHandles& handles) {

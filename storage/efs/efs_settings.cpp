@@ -40,10 +40,22 @@ void TellCaller(Diag_FTM& phone, const KRAL_EFS_ENTRY& entry) {
   }
 }
 
+// A phone server has the wait in its own hands.
+AbortableJob::AbortableJob(Diag_FTM& phone) : AbortWatch(phone), phone_(phone) {
+  Settings& settings = phone.state<Settings>();
+  settings.job_abort = false;
+  if (!phone.server_mode()) former_ = phone.transport().SetAbort(&settings.job_abort);
+}
+
+AbortableJob::~AbortableJob() {
+  if (!phone_.server_mode()) phone_.transport().SetAbort(former_);
+}
+
 bool Abort(Diag_FTM& phone) {
   Settings& settings = phone.state<Settings>();
   ++settings.aborts;
   settings.abort = true;
+  settings.job_abort = true;
   phone.responses().EndWaits();
   return true;
 }

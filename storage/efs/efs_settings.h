@@ -24,8 +24,9 @@ struct Settings {
   std::atomic<uint16_t> read_packet_size{536};
   std::atomic<uint16_t> write_packet_size{524};
   std::atomic<bool> abort{false};
-  std::atomic<uint32_t> aborts{0};  // how often that was set
-  bool gave_up = false;             // an abort has ended the wait for an answer that did not come
+  std::atomic<bool> job_abort{false};  // set with it, and cleared by what is made of many transfers only
+  std::atomic<uint32_t> aborts{0};     // how often they were set
+  bool gave_up = false;                // an abort has ended the wait for an answer that did not come
   std::atomic<KRAL_EFS_TRANSFER_CALLBACK> transfer_callback{nullptr};
   std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
   std::atomic<KRAL_HANDLE> callback_context{0};

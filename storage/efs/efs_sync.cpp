@@ -36,6 +36,7 @@ Reply AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, c
 }  // namespace
 
 bool SyncWithWait(Diag_FTM& phone, const char* path, u32 time_out_ms) {
+  ForgetAbort(phone);
   const u32 start = phone.clock().TickMs();
   const auto elapsed = [&] { return phone.clock().TickMs() - start; };
   SyncAnswer answer;
@@ -48,6 +49,7 @@ bool SyncWithWait(Diag_FTM& phone, const char* path, u32 time_out_ms) {
   }
   for (u32 waited = elapsed(); waited < time_out_ms; waited = elapsed()) {
     phone.clock().SleepMs(std::min(kPollMs, time_out_ms - waited));
+    if (IsAborted(phone, "Sync")) return false;
     reply = AskState(phone, kSyncStatus, "_EFS2_DIAG_GET_SYNC_STATUS", path, answer);
     if (reply.kind() == ReplyKind::kOther || answer.error != kDone) return false;
     // An answer that got lost may come with the next one.

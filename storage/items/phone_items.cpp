@@ -30,7 +30,8 @@ PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
     const Reply reply = ask();
     refusal_ = reply.refusal();
     if (reply) return Answer::kAnswered;
-    if (refusal_ != 0 || aborts_.aborted()) return Answer::kRefused;
+    if (refusal_ != 0) return Answer::kRefused;
+    if (aborts_.aborted()) return Answer::kLost;
   }
   return Unanswered();
 }

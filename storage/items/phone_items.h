@@ -22,7 +22,7 @@ class PhoneItems {
   enum class Answer {
     kAnswered,  // with a status
     kRefused,   // or passed over in silence, or never sent: no status, but the handset is there
-    kLost,      // no answer, in spite of all tries
+    kLost,      // no answer, in spite of all tries or until an abort
   };
   static constexpr uint32_t kRefusedStatus = 0xFFFF;
   // As many full items as one packet of a batch takes.

@@ -124,7 +124,13 @@ TEST_F(Connection, WaitOfZeroMakesOneAttempt) {
 }
 
 TEST_F(Connection, EachAttemptOfAWaitCounts) {
-  EXPECT_EQ(KRAL_ConnectServerWithWait(kNoHandset, 35), 0u);
+  test::FakeClock clock;
+  Kral_ResourceManager::SetDeviceOpener([&](int, DeviceResult& result) {
+    clock.Advance(10);
+    result.error = DeviceError::kNoSuchPort;
+    return std::unique_ptr<SerialDevice>();
+  });
+  EXPECT_EQ(ConnectWithWait(kNoHandset, 35, clock), 0u);
   EXPECT_TRUE(IsSharedRow(KRAL_ConnectServer(kNoHandset))) << "one release for several attempts";
 }
 

@@ -23,7 +23,7 @@ class BootWireTest : public testing::Test {
     handle_ =
         KRAL_ConnectServer_UserDefinedTransport(1, user.handle, user.context, user.send, user.receive, user.flush);
     phone_ = Kral_ResourceManager::GetPhone(handle_);
-    phone_->state<kivrat::Settings>().read_time_out_ms = 20;
+    phone_->state<kivrat::Settings>().read_time_out_ms = 100;
     phone_->state<kivrat::Settings>().settle_ms = 0;
   }
   void TearDown() override {

@@ -267,6 +267,8 @@ TEST_F(Engine, FlushDropsThePartialPacket) {
   const Bytes frame = PlainFrame({75, 1});
   wire_.ToHost(Bytes(frame.begin(), frame.begin() + 1));
   ASSERT_TRUE(Eventually([this] { return engine_->transport.counters().bytes_received == 1; }));
+  const uint64_t reads = wire_.reads();
+  ASSERT_TRUE(Eventually([&] { return wire_.reads() > reads; })) << "the byte is where packets are made";
   EXPECT_TRUE(engine_->transport.FlushRxBuffer());
   AnswerWith({75, 1});
   EXPECT_TRUE(Ask({75}).succeeded);

@@ -77,8 +77,8 @@ class CKralThreadInterface {
   // Awaits another reply to the request that was sent last; a time-out leaves the port open.
   Reply AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms, const ReplyTest& is_own = {});
   // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
-  // handset that is only slow may answer for a moment still. The port stays open.
-  void SetAbort(const std::atomic<bool>* abort) { abort_ = abort; }
+  // handset that is only slow may answer for a moment still. The port stays open. Returns the former one.
+  const std::atomic<bool>* SetAbort(const std::atomic<bool>* abort) { return std::exchange(abort_, abort); }
   // Is given what comes between two requests and is dropped, FCS bytes included; empty: nobody.
   void SetForgotten(std::function<void(std::span<const uint8_t>)> forgotten) { forgotten_ = std::move(forgotten); }
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.

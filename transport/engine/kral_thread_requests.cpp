@@ -233,6 +233,7 @@ bool CKralThreadInterface::FlushRxBuffer() {
   if (!connected()) return false;
   // The purge's own result tells nothing: a caller's transport reports 0 for every flush it made.
   if (!null_port_) port_.FlushPCBuffer();
+  loop_.WaitForChunk(kSettleMs);
   splitter_.DropPartialPacket();
   return true;
 }

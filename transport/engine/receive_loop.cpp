@@ -77,8 +77,8 @@ bool ReceiveLoop::ReadChunk() {
   if (framer_.ReceiveRaw(buffer_.data(), count, read_time_out_ms_) == 0 || count == 0) return false;
   // A caller's function may come back long after the stop: nobody waits for these bytes any more.
   if (control_.stop_requested()) return true;
-  bytes_received_.fetch_add(count, std::memory_order_relaxed);
   SetSplitting(true);
+  bytes_received_.fetch_add(count, std::memory_order_relaxed);
   try {
     Split(count);
   } catch (...) {
