@@ -7,7 +7,8 @@
 namespace kral {
 
 // Each call of a caller's function is guarded alone: an exception out of it stays here, and costs nobody what comes
-// after the call. False after one. What does not stay is the end of the thread: see PassForcedUnwind.
+// after the call. False after one. What does not stay is the end of the thread (see PassForcedUnwind), and an exception
+// of another language's, which cannot be told from it.
 template <class Call>
 bool CallGuarded(Call&& call) {
   if (IsThreadEnding()) return false;

@@ -36,7 +36,8 @@
  *   disconnect waits for each thread of the connection (1,000 ms), leaves it to end on its own, and the library stays
  *   in memory.
  * - No C++ exception leaves a function. One that leaves a callback ends there: the operation goes on, or is stopped
- *   where the callback's result would have decided. On Linux a host may end a thread inside a callback (pthread_exit),
+ *   where the callback's result would have decided. (That of another language is not caught, and ends the process: it
+ *   must not leave a callback.) On Linux a host may end a thread inside a callback (pthread_exit),
  *   as interpreters do that are going down. The library's threads run none of the host's signal handlers.
  * - Functions are __cdecl on Windows, with undecorated names.
  */
