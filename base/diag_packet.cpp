@@ -52,7 +52,7 @@ void CDiagPacket::Append32(uint32_t value) {
 void CDiagPacket::AppendBlock(std::span<const uint8_t> block) {
   // Compared so that a block larger than the whole buffer cannot wrap around.
   if (block.size() >= kCapacity || request_length_ >= kCapacity - block.size()) return;
-  std::copy(block.begin(), block.end(), request_.begin() + request_length_);
+  std::ranges::copy(block, request_.begin() + request_length_);
   request_length_ = static_cast<uint16_t>(request_length_ + block.size());
 }
 

@@ -127,8 +127,7 @@ CallFailure::~CallFailure() {
 }
 
 std::string_view ErrorPhrase(uint32_t code) {
-  const auto* const phrase =
-      std::find_if(std::begin(kPhrases), std::end(kPhrases), [code](const Phrase& p) { return p.code == code; });
+  const auto* const phrase = std::ranges::find(kPhrases, code, &Phrase::code);
   return phrase == std::end(kPhrases) ? std::string_view() : phrase->text;
 }
 

@@ -70,7 +70,7 @@ size_t Escape(Line& line, size_t length) {
     }
   }
   if (written + end.size() < line.size()) {
-    std::copy(end.begin(), end.end(), line.begin() + static_cast<std::ptrdiff_t>(written));
+    std::ranges::copy(end, line.begin() + static_cast<std::ptrdiff_t>(written));
     written += end.size();
   }
   line[written] = 0;
@@ -110,7 +110,7 @@ void DataLogFileHandler::WriteText(uint32_t flag, const char* text) {
   const size_t indentation = Indentation(flag);
   std::fill_n(line.begin(), indentation, ' ');
   const std::string_view taken = std::string_view(text).substr(0, line.size() - 1 - indentation);
-  std::copy(taken.begin(), taken.end(), line.begin() + static_cast<std::ptrdiff_t>(indentation));
+  std::ranges::copy(taken, line.begin() + static_cast<std::ptrdiff_t>(indentation));
   const size_t length = indentation + taken.size();
   line[length] = 0;
   Deliver(flag, line.data(), length);
@@ -167,7 +167,7 @@ void DataLogFileHandler::CallBack(TextLogCallback callback, uint32_t handle, uin
   StoreLe(std::span(record), text_log_record::kFlag, static_cast<uint16_t>(flag));
   StoreLe(std::span(record), text_log_record::kMilliseconds, clock_.TickMs() - start_tick_);
   text = text.substr(0, text_log_record::kTextCapacity);
-  std::copy(text.begin(), text.end(), record.begin() + text_log_record::kText);
+  std::ranges::copy(text, record.begin() + text_log_record::kText);
   in_callback = true;
   const AtExit returned([] { in_callback = false; });
   CallGuarded([&] { callback(text_log_record::kSize, record.data(), handle); });
@@ -225,8 +225,8 @@ void DataLogFileHandler::RegisterCategory(std::string_view name, bool on) {
 
 bool DataLogFileHandler::IsCategoryOn(std::string_view name) const {
   const MutexLock lock(mutex_);
-  const auto found = std::find_if(categories_.begin(), categories_.end(),
-                                  [name](const Category& category) { return category.name == name; });
+  const auto found =
+      std::ranges::find_if(categories_, [name](const Category& category) { return category.name == name; });
   return found != categories_.end() && found->on;
 }
 

@@ -133,7 +133,7 @@ inline Reply SendEchoed(Diag_FTM& phone, u32 time_out_ms, std::size_t echoed, st
 template <class... Rows>
 constexpr bool AreSorted(const Rows&... rows) {
   const std::array<u32, sizeof...(Rows)> keys{rows.header.key()...};
-  return std::is_sorted(keys.begin(), keys.end());
+  return std::ranges::is_sorted(keys);
 }
 
 // --- The two plain headers ------------------------------------------------------------------------------------------

@@ -29,8 +29,8 @@ uint32_t ThisThread() {
 }  // namespace
 
 LastErrors::Entry& LastErrors::Place(KRAL_HANDLE handle, uint32_t thread) {
-  const auto own = std::find_if(entries_.begin(), entries_.end(),
-                                [=](const Entry& e) { return e.handle == handle && e.thread == thread; });
+  const auto own =
+      std::ranges::find_if(entries_, [=](const Entry& e) { return e.handle == handle && e.thread == thread; });
   if (own != entries_.end()) return *own;
   if (entries_.size() < kMostEntries) {
     try {
@@ -39,8 +39,7 @@ LastErrors::Entry& LastErrors::Place(KRAL_HANDLE handle, uint32_t thread) {
       if (entries_.empty()) throw;
     }
   }
-  return *std::min_element(entries_.begin(), entries_.end(),
-                           [](const Entry& a, const Entry& b) { return a.order < b.order; });
+  return *std::ranges::min_element(entries_, {}, &Entry::order);
 }
 
 void LastErrors::Note(KRAL_HANDLE handle, const KRAL_ERROR& error) noexcept try {
@@ -83,7 +82,7 @@ uint8_t KRAL_CALL KRAL_GetLastError(KRAL_HANDLE handle, KRAL_ERROR* error) {
 uint8_t KRAL_CALL KRAL_GetErrorText(uint32_t code, char* text, uint32_t size) {
   const std::string_view phrase = kral::ErrorPhrase(code);
   if (phrase.empty() || text == nullptr || phrase.size() >= size) return 0;
-  *std::copy(phrase.begin(), phrase.end(), text) = '\0';
+  *std::ranges::copy(phrase, text).out = '\0';
   return 1;
 }
 

@@ -99,7 +99,7 @@ bool AvailablePhonePorts(std::span<uint16_t> ports, uint16_t& count, std::span<c
   for (const uint16_t port : listed) {
     if (found >= ports.size()) break;
     if (port >= kNullPort) continue;  // no device: one would always answer, the other picks a port by coming here
-    if (std::find(ignored.begin(), ignored.end(), port) != ignored.end()) continue;
+    if (std::ranges::find(ignored, port) != ignored.end()) continue;
     if (AnswersOnPort(port)) ports[found++] = port;
   }
   count = found;
@@ -121,8 +121,8 @@ void ClearPortAliases() {
 bool ResolvePortAlias(uint16_t logical, uint16_t& physical) {
   auto& library = Library();
   const MutexLock lock(library.mutex);
-  const auto found = std::find_if(library.aliases.begin(), library.aliases.end(),
-                                  [logical](const auto& alias) { return alias.first == logical; });
+  const auto found =
+      std::ranges::find_if(library.aliases, [logical](const auto& alias) { return alias.first == logical; });
   if (found == library.aliases.end()) return false;
   physical = found->second;
   return true;

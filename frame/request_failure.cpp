@@ -24,8 +24,7 @@ constexpr Refusal kRefusals[] = {
 };
 
 const Refusal* FindRefusal(uint8_t code) {
-  const auto* const found =
-      std::find_if(std::begin(kRefusals), std::end(kRefusals), [code](const Refusal& r) { return r.code == code; });
+  const auto* const found = std::ranges::find(kRefusals, code, &Refusal::code);
   return found == std::end(kRefusals) ? nullptr : found;
 }
 

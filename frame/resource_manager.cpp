@@ -20,8 +20,8 @@ LibraryState& Library() {
 
 Context* FindContext(LibraryState& library, KRAL_HANDLE handle) {
   if (handle == 0) return nullptr;
-  const auto found = std::find_if(library.contexts.begin(), library.contexts.end(),
-                                  [handle](const Context& context) { return context.handle == handle; });
+  const auto found =
+      std::ranges::find_if(library.contexts, [handle](const Context& context) { return context.handle == handle; });
   return found == library.contexts.end() ? nullptr : &*found;
 }
 
@@ -60,13 +60,12 @@ KRAL_HANDLE CreateContext(uint16_t port) {
   auto& library = Library();
   const MutexLock lock(library.mutex);
   auto& rows = library.contexts;
-  const auto shared =
-      std::find_if(rows.begin(), rows.end(), [port](const Context& row) { return row.in_use && row.port == port; });
+  const auto shared = std::ranges::find_if(rows, [port](const Context& row) { return row.in_use && row.port == port; });
   if (shared != rows.end()) {
     ++shared->use_count;
     return shared->handle;
   }
-  const auto free = std::find_if(rows.begin(), rows.end(), [](const Context& row) { return !row.in_use; });
+  const auto free = std::ranges::find_if(rows, [](const Context& row) { return !row.in_use; });
   if (free == rows.end()) {
     Fail(Failure(KRAL_ERROR_ARGUMENT, "%zu connections are in use, and there can be no more", rows.size()));
     return 0;
@@ -110,8 +109,8 @@ void ReleaseAllContexts() {
   std::array<KRAL_HANDLE, Kral_ResourceManager::kContextCount> handles{};
   {
     const MutexLock lock(library.mutex);
-    std::transform(library.contexts.begin(), library.contexts.end(), handles.begin(),
-                   [](const Context& row) { return row.in_use ? row.handle : KRAL_HANDLE{0}; });
+    std::ranges::transform(library.contexts, handles.begin(),
+                           [](const Context& row) { return row.in_use ? row.handle : KRAL_HANDLE{0}; });
   }
   for (const KRAL_HANDLE handle : handles) ReleaseContext(handle, true);
   std::shared_ptr<OrbtServer> port_info;

@@ -10,7 +10,7 @@ namespace {
 
 template <class List>
 auto* Find(List& list, std::string_view wanted) {
-  const auto entry = std::find_if(list.begin(), list.end(), [wanted](const auto& e) { return e.name == wanted; });
+  const auto entry = std::ranges::find_if(list, [wanted](const auto& e) { return e.name == wanted; });
   return entry != list.end() ? &*entry : nullptr;
 }
 

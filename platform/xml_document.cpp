@@ -103,8 +103,7 @@ const std::string* XmlElement::Attribute(std::string_view wanted) const {
 }
 
 const XmlElement* XmlElement::Child(std::string_view wanted) const {
-  const auto child =
-      std::find_if(children.begin(), children.end(), [wanted](const auto& c) { return c.name == wanted; });
+  const auto child = std::ranges::find_if(children, [wanted](const auto& c) { return c.name == wanted; });
   return child != children.end() ? &*child : nullptr;
 }
 

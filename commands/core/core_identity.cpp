@@ -33,7 +33,7 @@ void PutText(char* output, std::span<const uint8_t> record, TextField field) {
 
 // The next text of `rest`, up to its terminator or the end of what was received; `rest` then begins behind it.
 std::string TakeText(std::span<const uint8_t>& rest) {
-  const auto end = std::find(rest.begin(), rest.end(), uint8_t{0});
+  const auto end = std::ranges::find(rest, uint8_t{0});
   std::string text(rest.begin(), end);
   rest = rest.subspan(std::min(rest.size(), text.size() + 1));
   return text.substr(0, kBuildTextSize - 1);
@@ -54,7 +54,7 @@ bool ReadVersion(Diag_FTM& phone, const VersionOutputs& outputs) {
   // full reply left it. The record is not cleared between requests, on purpose.
   std::span<uint8_t> record = phone.state<VersionRecord>().bytes;
   const auto response = phone.packet().response();
-  if (response.size() >= reply::kLeastCopied) std::copy(response.begin(), response.end(), record.begin());
+  if (response.size() >= reply::kLeastCopied) std::ranges::copy(response, record.begin());
 
   PutText(outputs.compile_date, record, reply::kCompileDate);
   PutText(outputs.compile_time, record, reply::kCompileTime);

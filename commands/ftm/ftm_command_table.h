@@ -129,8 +129,7 @@ inline constexpr std::array kCommands = {
     Command{914, "FBRX_IQ_CAPTURE_GET_SAMPLES"},
 };
 static_assert(kCommands.size() == 104);
-static_assert(std::is_sorted(kCommands.begin(), kCommands.end(),
-                             [](const Command& a, const Command& b) { return a.id < b.id; }));
+static_assert(std::ranges::is_sorted(kCommands, {}, &Command::id));
 
 // The row of a name; a name that is not in the table does not compile.
 consteval const Command& CommandNamed(std::string_view name) {

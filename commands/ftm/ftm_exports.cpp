@@ -107,7 +107,7 @@ uint8_t KRAL_CALL KRAL_FTM_GetCommandInfo(uint16_t index, uint16_t* command, cha
           if (row.name.size() >= name_size) {
             return kral::Fail(kral::Failure(KRAL_ERROR_ARGUMENT, "the name does not fit into %d bytes", name_size));
           }
-          *std::copy(row.name.begin(), row.name.end(), name) = '\0';
+          *std::ranges::copy(row.name, name).out = '\0';
         }
         kral::Put(command, row.id);
         return 1;

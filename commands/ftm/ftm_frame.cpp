@@ -29,8 +29,7 @@ struct DataLength {
 };
 
 constexpr bool SortedByCommand(std::span<const DataLength> table) {
-  return std::is_sorted(table.begin(), table.end(),
-                        [](const DataLength& a, const DataLength& b) { return a.command < b.command; });
+  return std::ranges::is_sorted(table, {}, &DataLength::command);
 }
 
 constexpr std::array kEvdoLengths = {
@@ -47,8 +46,7 @@ constexpr std::array kAgpsLengths = {
 static_assert(SortedByCommand(kAgpsLengths));
 
 u16 LengthIn(std::span<const DataLength> table, u16 command) {
-  const auto row = std::lower_bound(table.begin(), table.end(), command,
-                                    [](const DataLength& entry, u16 wanted) { return entry.command < wanted; });
+  const auto row = std::ranges::lower_bound(table, command, {}, &DataLength::command);
   return row != table.end() && row->command == command ? row->length : u16{0};
 }
 

@@ -102,22 +102,21 @@ constexpr Group kGroups[] = {
 };
 
 bool Holds(const Group& group, uint16_t rf_mode) {
-  return std::any_of(group.rf_modes.begin(), group.rf_modes.end(),
-                     [rf_mode](const Range& range) { return rf_mode >= range.first && rf_mode <= range.last; });
+  return std::ranges::any_of(group.rf_modes,
+                             [rf_mode](const Range& range) { return rf_mode >= range.first && rf_mode <= range.last; });
 }
 
 }  // namespace
 
 const char* ModeIdName(uint32_t mode_id) {
-  const auto row = std::find_if(kModeNames.begin(), kModeNames.end(),
-                                [mode_id](const ModeName& entry) { return entry.id == mode_id; });
+  const auto row = std::ranges::find_if(kModeNames, [mode_id](const ModeName& entry) { return entry.id == mode_id; });
   return row != kModeNames.end() ? row->name : nullptr;
 }
 
 std::optional<uint16_t> ModeIdForRfMode(uint16_t rf_mode, uint32_t current) {
   for (const Group& group : kGroups) {
     if (!Holds(group, rf_mode)) continue;
-    const auto kept = std::find(group.kept.begin(), group.kept.end(), current);
+    const auto kept = std::ranges::find(group.kept, current);
     return kept != group.kept.end() ? *kept : group.standard;
   }
   return std::nullopt;

@@ -76,8 +76,7 @@ Failure TooManyItems(uint8_t equipment_id, uint32_t items) {
 
 // Codes that the handset has no bit for must not end up in another's.
 bool AreInRange(Diag_FTM& phone, uint8_t equipment_id, Ids codes, uint32_t items, const char* function) {
-  const auto outside =
-      std::find_if(codes.begin(), codes.end(), [=](uint16_t code) { return !ItemOf(equipment_id, code, items); });
+  const auto outside = std::ranges::find_if(codes, [=](uint16_t code) { return !ItemOf(equipment_id, code, items); });
   if (outside == codes.end()) return true;
   phone.log().WriteLine(kLogErr, "%s()--log code 0x%X is outside the range of equipment ID %d", function, *outside,
                         equipment_id);
@@ -165,7 +164,7 @@ std::optional<BitMask> GetLogMask(Diag_FTM& phone, uint8_t equipment_id, uint32_
     Fail(BadReply(phone, "holds a mask of another length than the ranges tell"));
     return std::nullopt;
   }
-  std::copy(told->bytes.begin(), told->bytes.end(), mask.bytes().begin());
+  std::ranges::copy(told->bytes, mask.bytes().begin());
   return mask;
 }
 

@@ -33,7 +33,7 @@ u16 FillPayload(Diag_FTM& phone, std::deque<QueueItem>& queue, std::vector<u8>& 
 }
 
 u8 Judged(Diag_FTM& phone, std::span<const u16> read_only, u16 item, u8 status) {
-  if (status != kReadOnly || std::find(read_only.begin(), read_only.end(), item) == read_only.end()) return status;
+  if (status != kReadOnly || std::ranges::find(read_only, item) == read_only.end()) return status;
   phone.log().WriteLine(kLogRet, "     Found item in the read-only list so no failure: iNvId = %d ", item);
   return kDone;
 }

@@ -1,29 +1,17 @@
 // Exchanges and writes of the download protocols over the phone object's transport.
 #include "download/link/download_connection.h"
 
-#include "base/guarded_call.h"
-
 #include <chrono>
 
+#include "base/at_exit.h"
 #include "base/failure.h"
+#include "base/guarded_call.h"
 
 namespace kral::download {
 namespace {
 
 constexpr size_t kFcsBytes = 2;
 constexpr uint32_t kLookAroundMs = 50;
-
-// The leading flag is on for the length of an exchange, and off behind it whatever it was before: required.
-class LeadingFlag {
- public:
-  explicit LeadingFlag(CProtAHDLC& framer) : framer_(framer) { framer_.SetStartFlag(1); }
-  ~LeadingFlag() { framer_.SetStartFlag(0); }
-  LeadingFlag(const LeadingFlag&) = delete;
-  LeadingFlag& operator=(const LeadingFlag&) = delete;
-
- private:
-  CProtAHDLC& framer_;
-};
 
 }  // namespace
 
@@ -34,7 +22,10 @@ Reply DownloadConnection::ServerHasNoFramer() {
 
 Reply DownloadConnection::Exchange(std::span<const uint8_t> request, uint8_t expected_code, uint32_t time_out_ms) {
   if (phone_.server_mode()) return ServerHasNoFramer();
-  const LeadingFlag flag(phone_.transport().framer());
+  // The leading flag is on for the length of an exchange, and off after it whatever it was before: required.
+  CProtAHDLC& framer = phone_.transport().framer();
+  framer.SetStartFlag(1);
+  const AtExit exchanged([&framer] { framer.SetStartFlag(0); });
   room_.resize(kMaximumPacket);
   return phone_.SendSync(request, room_, expected_code, time_out_ms);
 }

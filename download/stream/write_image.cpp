@@ -1,6 +1,7 @@
 // The steps of writing one image, and what each of them says when it fails.
 #include "download/stream/write_image.h"
 
+#include "base/at_exit.h"
 #include "download/link/download_failure.h"
 #include "download/stream/block_writer.h"
 
@@ -25,18 +26,6 @@ class RunningThread {
 
  private:
   CImageWriteRsp* replies_;
-};
-
-// Leaves the queues empty on every way out.
-class StartedAgent {
- public:
-  StartedAgent(DownloadAgent& agent, uint32_t window) : agent_(agent) { agent_.Start(window); }
-  ~StartedAgent() { agent_.Stop(); }
-  StartedAgent(const StartedAgent&) = delete;
-  StartedAgent& operator=(const StartedAgent&) = delete;
-
- private:
-  DownloadAgent& agent_;
 };
 
 }  // namespace
@@ -70,7 +59,8 @@ WriteOutcome CWriteImage::Write(images::PhoneImage& image, uint8_t type, images:
 WriteOutcome CWriteImage::Stream(images::PhoneImage& image, uint32_t size, const WriteLimits& limits) {
   const auto replies = std::make_shared<CImageWriteRspFramed>(connection_);
   DownloadAgent& agent = replies->agent();
-  const StartedAgent started(agent, limits.window);
+  agent.Start(limits.window);
+  const AtExit empty_queues([&agent] { agent.Stop(); });
   RunningThread thread(*replies);
   switch (replies->StartThread(time_out_ms_)) {
     case CImageWriteRsp::Start::kStarted:

@@ -32,7 +32,7 @@ uint32_t GetField(ByteView bytes, size_t offset, size_t size) {
 
 Bytes FromHex(std::string_view text) {
   std::string digits;
-  std::copy_if(text.begin(), text.end(), std::back_inserter(digits), [](char c) { return c != ' ' && c != '\n'; });
+  std::ranges::copy_if(text, std::back_inserter(digits), [](char c) { return c != ' ' && c != '\n'; });
   if (digits.size() % 2 != 0) throw std::invalid_argument("odd number of hex digits");
   Bytes bytes;
   bytes.reserve(digits.size() / 2);

@@ -69,7 +69,7 @@ Fault HangUp() {
 }
 
 const Fault* Strike::Find(Kind kind) const {
-  const auto found = std::find_if(faults.begin(), faults.end(), [kind](const Fault& f) { return f.kind == kind; });
+  const auto found = std::ranges::find_if(faults, [kind](const Fault& f) { return f.kind == kind; });
   return found == faults.end() ? nullptr : &*found;
 }
 

@@ -16,7 +16,7 @@ void FlashMemory::Program(uint32_t address, ByteView bytes) {
     const uint32_t offset = address % kSectorSize;
     const size_t count = std::min<size_t>(bytes.size(), kSectorSize - offset);
     Bytes& sector = SectorLocked(address);
-    if (erased_.insert(address / kSectorSize).second) std::fill(sector.begin(), sector.end(), kErased);
+    if (erased_.insert(address / kSectorSize).second) std::ranges::fill(sector, kErased);
     // Bits can be cleared only: a second, different write of the same place shows.
     for (size_t i = 0; i < count; ++i) sector[offset + i] &= bytes[i];
     bytes = bytes.subspan(count);

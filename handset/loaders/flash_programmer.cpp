@@ -31,7 +31,7 @@ bool IsTable(ByteView table) {
 
 Bytes Begin(std::string_view magic, uint8_t code) {
   Bytes packet(1 + magic.size(), code);
-  std::copy(magic.begin(), magic.end(), packet.begin() + 1);
+  std::ranges::copy(magic, packet.begin() + 1);
   return packet;
 }
 

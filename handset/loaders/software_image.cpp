@@ -22,7 +22,7 @@ std::optional<std::string> SoftwareRevision(const FlashMemory& flash) {
 
 Bytes MakeSoftware(std::string_view revision, size_t size) {
   Bytes image(kMark.size() + revision.size() + 1);
-  std::copy(revision.begin(), revision.end(), std::copy(kMark.begin(), kMark.end(), image.begin()));
+  std::ranges::copy(revision, std::ranges::copy(kMark, image.begin()).out);
   for (size_t i = image.size(); i < size; ++i) image.push_back(static_cast<uint8_t>(i * 5 + (i >> 8)));
   return image;
 }

@@ -204,7 +204,7 @@ void EfsService::AddNode(std::string_view path, EfsKind kind, uint32_t permissio
   EfsNodePtr node;
   if (tree_.Create(path, kind, permissions, &node) != EfsError::kDone) return;
   node->Resize(data.size());
-  std::copy(data.begin(), data.end(), node->data.begin());
+  std::ranges::copy(data, node->data.begin());
   node->target = std::move(target);
 }
 

@@ -34,8 +34,7 @@ EfsTree::Place Nowhere(EfsError error) {
 
 bool Contains(const EfsNode& node, const EfsNode& wanted) {
   if (&node == &wanted) return true;
-  return std::any_of(node.children.begin(), node.children.end(),
-                     [&](const auto& child) { return Contains(*child.second, wanted); });
+  return std::ranges::any_of(node.children, [&](const auto& child) { return Contains(*child.second, wanted); });
 }
 
 }  // namespace
@@ -150,7 +149,7 @@ EfsError EfsTree::Write(EfsNode& node, size_t offset, ByteView bytes) {
   const uint64_t end = std::max<uint64_t>(node.data.size(), uint64_t{offset} + bytes.size());
   if (BlocksOf(end) - BlocksOf(node.data.size()) > free_blocks()) return EfsError::kNoSpace;
   node.Resize(static_cast<size_t>(end));
-  std::copy(bytes.begin(), bytes.end(), node.data.begin() + static_cast<std::ptrdiff_t>(offset));
+  std::ranges::copy(bytes, node.data.begin() + static_cast<std::ptrdiff_t>(offset));
   Touch(node);
   return EfsError::kDone;
 }

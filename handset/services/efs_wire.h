@@ -32,7 +32,7 @@ inline Bytes ErrorReply(ByteView request, EfsError error) {
 inline std::optional<std::string> TextAt(ByteView request, size_t offset) {
   if (offset >= request.size()) return std::nullopt;
   const ByteView rest = request.subspan(offset);
-  const auto end = std::find(rest.begin(), rest.end(), uint8_t{0});
+  const auto end = std::ranges::find(rest, uint8_t{0});
   if (end == rest.end()) return std::nullopt;
   return std::string(rest.begin(), end);
 }

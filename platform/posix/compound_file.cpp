@@ -123,8 +123,8 @@ class Writer {
       const auto number = static_cast<uint32_t>(entries_.size());
       if (!Add(child.name, {}, siblings) || !CollectChildren(child, number, depth + 1)) return false;
     }
-    std::sort(siblings.begin(), siblings.end(),
-              [this](uint32_t a, uint32_t b) { return ComesBefore(entries_[a].name, entries_[b].name); });
+    std::ranges::sort(siblings,
+                      [this](uint32_t a, uint32_t b) { return ComesBefore(entries_[a].name, entries_[b].name); });
     size_t levels = 0;  // whole ones
     while ((size_t{2} << levels) <= siblings.size() + 1) ++levels;
     entries_[parent].child = BuildTree(siblings, levels);
@@ -195,8 +195,7 @@ class Writer {
     for (Entry& entry : entries_) {
       if (entry.stream == nullptr || IsShort(entry)) continue;
       entry.start = Claim(SectorsOf(entry.size));
-      std::copy(entry.stream->bytes.begin(), entry.stream->bytes.end(),
-                bytes_.begin() + static_cast<std::ptrdiff_t>(OffsetOf(entry.start)));
+      std::ranges::copy(entry.stream->bytes, bytes_.begin() + static_cast<std::ptrdiff_t>(OffsetOf(entry.start)));
     }
     PlaceShortStreams();
     directory_start_ = Claim(SectorsOf(entries_.size() * kEntrySize));
@@ -216,8 +215,8 @@ class Writer {
     for (Entry& entry : entries_) {
       if (entry.stream == nullptr || !IsShort(entry)) continue;
       entry.start = entry.size == 0 ? kEndOfChain : static_cast<uint32_t>(sector);
-      std::copy(entry.stream->bytes.begin(), entry.stream->bytes.end(),
-                bytes_.begin() + static_cast<std::ptrdiff_t>(OffsetOf(entries_[0].start) + sector * kShortSectorSize));
+      std::ranges::copy(entry.stream->bytes, bytes_.begin() + static_cast<std::ptrdiff_t>(OffsetOf(entries_[0].start) +
+                                                                                          sector * kShortSectorSize));
       const size_t end = sector + SectorsOf(entry.size, kShortSectorSize);
       for (; sector < end; ++sector)
         PutShort(sector, sector + 1 < end ? static_cast<uint32_t>(sector + 1) : kEndOfChain);
@@ -263,7 +262,7 @@ class Writer {
 
   void WriteHeader() {
     constexpr std::array<uint8_t, 8> kMagic = {0xD0, 0xCF, 0x11, 0xE0, 0xA1, 0xB1, 0x1A, 0xE1};
-    std::copy(kMagic.begin(), kMagic.end(), bytes_.begin());
+    std::ranges::copy(kMagic, bytes_.begin());
     Put(24, 0x3E, 2);  // minor and major version
     Put(26, 3, 2);
     Put(28, 0xFFFE, 2);  // little-endian

@@ -42,7 +42,7 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
     if (is_link && file.kind != LocalKind::kFile) file = {LocalKind::kOther};
     found.push_back({name, file});
   }
-  std::sort(found.begin(), found.end(), [](const auto& left, const auto& right) { return left.name < right.name; });
+  std::ranges::sort(found, [](const auto& left, const auto& right) { return left.name < right.name; });
   entries = std::move(found);
   return {};
 }

@@ -26,7 +26,7 @@ constexpr std::array<Speed, 30> kSpeeds = {{
 }};
 
 std::optional<speed_t> SpeedConstant(uint32_t rate) {
-  const auto found = std::find_if(kSpeeds.begin(), kSpeeds.end(), [rate](const Speed& s) { return s.rate == rate; });
+  const auto found = std::ranges::find_if(kSpeeds, [rate](const Speed& s) { return s.rate == rate; });
   if (found == kSpeeds.end()) return std::nullopt;
   return found->constant;
 }

@@ -45,7 +45,7 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
     found.push_back({name, file});
   } while (::FindNextFileW(search, &data));
   if (::GetLastError() != ERROR_NO_MORE_FILES) return LastError();
-  std::sort(found.begin(), found.end(), [](const auto& left, const auto& right) { return left.name < right.name; });
+  std::ranges::sort(found, [](const auto& left, const auto& right) { return left.name < right.name; });
   entries = std::move(found);
   return {};
 }

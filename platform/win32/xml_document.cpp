@@ -129,7 +129,7 @@ bool LoadBytes(IXMLDOMDocument2* document, std::span<const uint8_t> bytes) {
   void* memory = nullptr;
   VARIANT_BOOL loaded = VARIANT_FALSE;
   if (SUCCEEDED(::SafeArrayAccessData(array, &memory))) {
-    std::copy(bytes.begin(), bytes.end(), static_cast<uint8_t*>(memory));
+    std::ranges::copy(bytes, static_cast<uint8_t*>(memory));
     ::SafeArrayUnaccessData(array);
     if (FAILED(document->load(source, &loaded))) loaded = VARIANT_FALSE;
   }

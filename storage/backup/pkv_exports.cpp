@@ -1,4 +1,5 @@
 // Exports of PKV backups: name line, handle, operation.
+#include "base/at_exit.h"
 #include "base/outputs.h"
 #include "base/text_argument.h"
 #include "frame/export_call.h"
@@ -7,6 +8,7 @@
 #include "storage/backup/pkv_jobs.h"
 
 namespace backup = kral::backup;
+using kral::AtExit;
 using kral::Diag_FTM;
 using kral::ExportCall;
 using kral::Fail;
@@ -16,17 +18,6 @@ using kral::TextOrEmpty;
 namespace {
 
 using Job = uint32_t (*)(Diag_FTM& phone, const std::string& path);
-
-class Running {
- public:
-  explicit Running(bool& flag) : flag_(flag) { flag_ = true; }
-  ~Running() { flag_ = false; }
-  Running(const Running&) = delete;
-  Running& operator=(const Running&) = delete;
-
- private:
-  bool& flag_;
-};
 
 // What a job as a whole came to. What was noted before may be something that it got over.
 Failure Judgement(uint32_t status, const char* file, const KRAL_PKV_COUNTS& counts) {
@@ -70,7 +61,8 @@ bool Run(Diag_FTM& phone, Job job, const char* file, uint32_t* status) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "a backup, restore or comparison is under way")
                     .Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_UNEXPECTED));
   }
-  const Running running(settings.running);
+  settings.running = true;
+  const AtExit ended([&settings] { settings.running = false; });
   const uint32_t result = job(phone, TextOrEmpty(file));
   kral::Put(status, result);
   if (result == KRAL_PKV_STATUS_DONE) return true;

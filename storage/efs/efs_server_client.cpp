@@ -1,6 +1,7 @@
 // Jobs that the phone server does: removing trees and file-system images. In direct mode they are refused.
 #include "storage/efs/efs_server_client.h"
 
+#include "base/at_exit.h"
 #include "base/failure.h"
 #include "frame/diag_ftm.h"
 #include "frame/orbt_server.h"
@@ -54,16 +55,13 @@ bool EFS::EfsStarter(DataLogFileHandler& log, uint16_t port, const char* failure
       log.WriteLine(kLogErr, "EFS::EfsStarter - LockPhone() failed");
       return false;
     }
-    struct Unlocker {
-      EfsServerPhone& phone;
-      ~Unlocker() {
-        try {
-          phone.UnlockPhone();
-        } catch (...) {
-          // The job's own result stands.
-        }
+    const AtExit unlock([&phone = *phone_] {
+      try {
+        phone.UnlockPhone();
+      } catch (...) {
+        // The job's own result stands.
       }
-    } unlocker{*phone_};
+    });
     if (job(*module_)) return true;
     log.WriteLine(kLogErr, "%s", failure);
   } catch (const OrbtServerException&) {

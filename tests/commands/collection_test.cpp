@@ -349,7 +349,11 @@ TEST_P(Flood, LosesNothingUncounted) {
     while (KRAL_DIAG_GetNextEvent(handle(), &event) == 1) continue;
   }
   const auto sent = traffic.Stop();
-  EXPECT_TRUE(Eventually([&] { return CountersOf(handle()).collected == sent.packets(); }));
+  // Logs and events are published one after the other.
+  EXPECT_TRUE(Eventually([&] {
+    const auto counters = CountersOf(handle());
+    return counters.collected == sent.packets() && counters.events == sent.events;
+  }));
   reader.request_stop();
   reader.join();
   const auto counters = CountersOf(handle());

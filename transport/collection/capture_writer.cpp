@@ -31,7 +31,7 @@ uint64_t MicrosecondsNow() {
 
 std::array<uint8_t, capture_head::kSize> MakeHead() {
   std::array<uint8_t, capture_head::kSize> head{};
-  std::copy(capture_head::kMagic.begin(), capture_head::kMagic.end(), head.begin());
+  std::ranges::copy(capture_head::kMagic, head.begin());
   StoreLe(std::span<uint8_t>(head), capture_head::kVersion, capture_head::kThisVersion);
   StoreLe(std::span<uint8_t>(head), capture_head::kHeadSize, static_cast<uint16_t>(capture_head::kSize));
   return head;

@@ -49,8 +49,8 @@ bool CKralEvents::StartThread(std::shared_ptr<void> owner) {
 
 void CKralEvents::UnregisterListener(PacketListener* listener) {
   const RecursiveLock lock(listeners_mutex_);
-  const auto found = std::find_if(listeners_.begin(), listeners_.end(),
-                                  [listener](const Registration& entry) { return entry.listener == listener; });
+  const auto found =
+      std::ranges::find_if(listeners_, [listener](const Registration& entry) { return entry.listener == listener; });
   if (found == listeners_.end()) return;
   if (dispatching_) {
     found->listener = nullptr;

@@ -18,7 +18,7 @@ constexpr std::array<uint8_t, 4> kUncheckedCodes = {kLogCode, kUnasked31, kEvent
 constexpr uint8_t kIgnoredCode = kUnasked146;
 
 bool IsUnchecked(uint8_t code) {
-  return std::find(kUncheckedCodes.begin(), kUncheckedCodes.end(), code) != kUncheckedCodes.end();
+  return std::ranges::find(kUncheckedCodes, code) != kUncheckedCodes.end();
 }
 
 void Increment(std::atomic<uint64_t>& counter) {

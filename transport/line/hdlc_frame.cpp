@@ -48,7 +48,7 @@ uint8_t* Stuff(std::span<const uint8_t> bytes, uint8_t* out) {
 bool EscapesBehindLimit(std::span<const uint8_t> stuffed) {
   if (stuffed.size() <= kEscapePairLimit) return false;
   const auto tail = stuffed.subspan(kEscapePairLimit);
-  return std::find(tail.begin(), tail.end(), kFrameEscape) != tail.end();
+  return std::ranges::find(tail, kFrameEscape) != tail.end();
 }
 
 }  // namespace

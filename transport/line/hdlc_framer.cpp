@@ -39,7 +39,7 @@ bool ReadsOk(CSerialPort& port, Clock& clock) {
 
 bool AsksForDiagnosticMode(CSerialPort& port, Clock& clock) {
   std::array<uint8_t, kDiagnosticModeCommand.size()> command{};
-  std::copy(kDiagnosticModeCommand.begin(), kDiagnosticModeCommand.end(), command.begin());
+  std::ranges::copy(kDiagnosticModeCommand, command.begin());
   for (int attempt = 0; attempt < kAttemptsPerRate; ++attempt) {
     port.Send(command.data(), static_cast<uint32_t>(command.size()));
     if (ReadsOk(port, clock)) return true;
