@@ -28,7 +28,6 @@ bool IsSecondOf(uint8_t lead, uint8_t second) {
   if (!IsContinuation(second)) return false;
   switch (lead) {
     case 0xC2:
-      return second >= 0xA0;
     case 0xE0:
       return second >= 0xA0;
     case 0xED:

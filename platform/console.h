@@ -25,7 +25,7 @@ class Utf8Terminal {
   Utf8Terminal& operator=(const Utf8Terminal&) = delete;
 
  private:
-  unsigned former_ = 0;
+  [[maybe_unused]] unsigned former_ = 0;  // Windows only
 };
 
 // Bytes written to the standard output come out as they are, line ends included.

@@ -37,7 +37,7 @@ class CMapFileToMemory {
   static constexpr intptr_t kInvalid = -1;
 
   intptr_t file_ = kInvalid;
-  void* mapping_ = nullptr;  // Windows only
+  [[maybe_unused]] void* mapping_ = nullptr;  // Windows only
   uint8_t* view_ = nullptr;
   uint64_t size_ = 0;
   uint32_t last_error_ = 0;

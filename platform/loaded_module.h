@@ -18,7 +18,7 @@ class ModuleReference {
   ~ModuleReference();
 
  private:
-  void* module_ = nullptr;
+  [[maybe_unused]] void* module_ = nullptr;
 };
 
 // Waits until `thread` has left all code of the library, so that joining it does not wait. On Windows the end of a

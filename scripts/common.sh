@@ -45,5 +45,7 @@ build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googlete
   libxml2-utils srecord libgsf-bin python3-olefile)
 # What the checks of the sources need.
 check_packages=(clang-format)
+# What reads them as clang does; only the whole scripts/test needs it.
+tidy_packages=(clang clang-tidy)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)

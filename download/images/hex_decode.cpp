@@ -12,7 +12,7 @@ namespace kral::images {
 namespace {
 
 using LineText = std::string_view;
-using std::string_view_literals::operator""sv;
+using namespace std::string_view_literals;
 
 constexpr uint32_t kUnknown = std::numeric_limits<uint32_t>::max();
 

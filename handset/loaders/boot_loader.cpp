@@ -22,7 +22,6 @@ constexpr uint32_t kImageTransferMode = 0;
 constexpr uint32_t kCommandMode = 3;
 constexpr uint32_t kReadChipIdentity = 2;
 
-constexpr size_t kHelloSize = 48;
 constexpr size_t kLongestIdentity = 24;
 constexpr uint32_t kLongestPacket = 1024;
 

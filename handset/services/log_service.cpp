@@ -158,9 +158,10 @@ void LogService::OnMessageLevels(ByteView request, Wire& wire) {
   const uint32_t first = GetU16(request, 2);
   const uint32_t last = GetU16(request, 4);
   if (request[1] != kSetLevels || last < first) return Refuse(Refusal::kBadParameter, request, wire);
-  if (request.size() != kLevelsHeader + 4 * (last - first + 1)) return Refuse(Refusal::kBadLength, request, wire);
+  if (request.size() != kLevelsHeader + size_t{4} * (last - first + 1))
+    return Refuse(Refusal::kBadLength, request, wire);
   for (uint32_t i = first; i <= last; ++i) {
-    levels_[static_cast<uint16_t>(i)] = GetU32(request, kLevelsHeader + 4 * (i - first));
+    levels_[static_cast<uint16_t>(i)] = GetU32(request, kLevelsHeader + size_t{4} * (i - first));
   }
   ++changes_;
   wire.Send(request);

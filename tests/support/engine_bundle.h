@@ -47,7 +47,7 @@ struct EngineBundle : std::enable_shared_from_this<EngineBundle> {
 };
 
 template <class Condition>
-bool Eventually(Condition condition, std::chrono::milliseconds limit = std::chrono::seconds(5)) {
+bool Eventually(Condition condition, std::chrono::milliseconds limit = std::chrono::seconds(60)) {
   const auto deadline = std::chrono::steady_clock::now() + limit;
   while (!condition()) {
     if (std::chrono::steady_clock::now() > deadline) return false;
