@@ -140,6 +140,9 @@ std::shared_ptr<void> Diag_FTM::KeepParts() {
 CKralThreadInterface& Diag_FTM::transport() {
   return *parts_->transport;
 }
+bool Diag_FTM::device_gone() const {
+  return parts_->transport && parts_->transport->port().gone();
+}
 CKralEventListener& Diag_FTM::sorter() {
   return parts_->sorter;
 }

@@ -64,6 +64,8 @@ class Diag_FTM {
   CSerialPort* BorrowPort();
   void GiveBackPort();  // closes it; the next request opens the connection
   bool port_borrowed() const { return port_borrowed_; }
+  // Unplugged, as far as the library's own port knows: nothing more comes.
+  bool device_gone() const;
   // Closes the port for good, once a running request has ended: its context is being released, and a request of
   // another thread that still holds the object must not open the port again.
   void Retire();

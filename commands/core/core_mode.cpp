@@ -64,7 +64,7 @@ bool PollMode(Diag_FTM& phone, uint16_t mode, uint32_t total) {
     if (answered) told = state;
     const bool reached = answered && HasReached(mode, state);
     const uint32_t used = phone.clock().TickMs() - start;
-    const bool is_gone = !phone.server_mode() && phone.transport().port().gone();
+    const bool is_gone = phone.device_gone();
     if (reached || is_gone || used >= total) {
       phone.log().WriteLine(
           kLogRet, "DIAG_CONTROL_F -- mode switching status polling has %s (time used = %d, total timeout = %d) ms.",

@@ -29,16 +29,12 @@ bool SetCollection(Diag_FTM& phone, bool on) {
   return true;
 }
 
-bool IsGone(Diag_FTM& phone) {
-  return !phone.server_mode() && phone.transport().port().gone();
-}
-
 bool TakeLog(Diag_FTM& phone, uint16_t* size, uint8_t* buffer, uint32_t time_out_ms) {
   if (size == nullptr || buffer == nullptr)
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer for the packet"));
   const auto packet = phone.asynchronous().PopWithin(milliseconds(time_out_ms));
   if (!packet || packet->size() > kral::kMaximumPacket) {
-    if (IsGone(phone)) return Fail(kral::PortFailure(phone));
+    if (phone.device_gone()) return Fail(kral::PortFailure(phone));
     return Fail(Failure(KRAL_ERROR_NO_ANSWER, "no packet is waiting, and none came within %u ms", time_out_ms));
   }
   std::copy(packet->begin(), packet->end(), buffer);
@@ -49,7 +45,7 @@ bool TakeLog(Diag_FTM& phone, uint16_t* size, uint8_t* buffer, uint32_t time_out
 bool TakeEvent(Diag_FTM& phone, const char* function, KRAL_EVENT* event, uint32_t time_out_ms) {
   if (event == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no room for the event"));
   const auto record = phone.events().PopWithin(milliseconds(time_out_ms));
-  if (!record && IsGone(phone)) return Fail(kral::PortFailure(phone));
+  if (!record && phone.device_gone()) return Fail(kral::PortFailure(phone));
   if (!record)
     return Fail(Failure(KRAL_ERROR_NO_ANSWER, "no event is waiting, and none came within %u ms", time_out_ms));
   std::memcpy(event, record->bytes.data(), sizeof(*event));

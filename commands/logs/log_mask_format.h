@@ -2,12 +2,22 @@
 #ifndef KRAL_COMMANDS_LOGS_LOG_MASK_FORMAT_H
 #define KRAL_COMMANDS_LOGS_LOG_MASK_FORMAT_H
 
+#include <algorithm>
 #include <cstddef>
 
 #include "base/little_endian.h"
 #include "commands/request.h"
 
 namespace kral::diag {
+
+inline constexpr std::size_t kEquipmentIds = 16;
+
+namespace log_config_reply {
+inline constexpr std::size_t kHeader = 8;                  // as in the request
+inline constexpr std::size_t kStatus = 4;                  // some handsets; 0: done
+inline constexpr std::size_t kRanges = 4 * kEquipmentIds;  // at the end: the number of items of each equipment id
+inline constexpr std::size_t kMaskHeader = 8;  // equipment id and bits, in front of the mask, which ends the reply
+}  // namespace log_config_reply
 
 // 115, three zero bytes, the operation (u32).
 struct LogConfigHeader {
@@ -23,15 +33,14 @@ struct LogConfigHeader {
   Reply Transmit(Diag_FTM& phone, u32 time_out_ms) const {
     const auto request = phone.packet().request();
     return phone.Send(phone.packet(), time_out_ms, 0, [request](std::span<const u8> reply) {
+      constexpr size_t kHead = log_config_reply::kHeader;
       if (reply.size() < kHead) return true;
-      if (!std::equal(reply.begin(), reply.begin() + kHead, request.begin())) return false;
+      if (!std::ranges::equal(reply.first(kHead), request.first(kHead))) return false;
       const auto equipment_id = LoadLe<u32>(request, kHead);
       return !equipment_id || reply.size() < kHead + 3 * sizeof(u32) || LoadLe<u32>(reply, kHead) == equipment_id ||
              LoadLe<u32>(reply, kHead + sizeof(u32)) == equipment_id;
     });
   }
-
-  static constexpr std::ptrdiff_t kHead = 8;
 };
 
 template <class... Fields>
@@ -48,15 +57,7 @@ inline constexpr DiagRequest<u8, u16> kGetEventMask{129};              // zero, 
 inline constexpr DiagRequest<u8, u16, u16, Bytes> kSetEventMask{130};  // zero, zero, bits, mask
 static_assert(AreSorted(kSetMessageLevels, kGetEventMask, kSetEventMask));
 
-inline constexpr std::size_t kEquipmentIds = 16;
 inline constexpr u32 kItemsPerEquipmentId = 4096;
-
-namespace log_config_reply {
-inline constexpr std::size_t kHeader = 8;
-inline constexpr std::size_t kStatus = 4;                  // some handsets; 0: done
-inline constexpr std::size_t kRanges = 4 * kEquipmentIds;  // at the end: the number of items of each equipment id
-inline constexpr std::size_t kMaskHeader = 8;  // equipment id and bits, in front of the mask, which ends the reply
-}  // namespace log_config_reply
 
 // Nothing longer comes back in a reply.
 inline constexpr std::size_t kLongestMask = 4096 - 2 - log_config_reply::kHeader - log_config_reply::kMaskHeader;
