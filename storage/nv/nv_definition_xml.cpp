@@ -176,7 +176,7 @@ class Reader {
       throw BadXml(item.Title() + " needs either a typeid or a <DataType>");
     }
     if (shared != nullptr) {
-      const NvTypePtr type = FindType(*shared);
+      NvTypePtr type = FindType(*shared);
       if (type == nullptr) throw BadXml(item.Title() + ": there is no data type " + *shared);
       return type;
     }
