@@ -230,8 +230,9 @@ bool DataLogFileHandler::IsCategoryOn(std::string_view name) const {
   return found != categories_.end() && found->on;
 }
 
+// Never destroyed, as the system's clock.
 DataLogFileHandler& NullLog() {
-  static DataLogFileHandler log;
+  static DataLogFileHandler& log = *new DataLogFileHandler;
   return log;
 }
 

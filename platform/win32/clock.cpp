@@ -23,8 +23,9 @@ class MonotonicClock final : public Clock {
 
 }  // namespace
 
+// Never destroyed: a process may exit while threads of its connections still look at it.
 Clock& SystemClock() {
-  static MonotonicClock clock;
+  static Clock& clock = *new MonotonicClock;
   return clock;
 }
 
