@@ -63,7 +63,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Band_Helper_GetBand(uint32_t index, uint16_t* ba
  * The name of a band, such as "LTE band 4".
  *
  * @param      band  a band id
- * @param[out] name  receives the text, cut to fit and always terminated
+ * @param[out] name  [size] receives the text, cut to fit and always terminated
  * @param      size  bytes in `name`; 40 hold every name
  * @return 1; 0 for a band without channels, a null output or size 0
  */

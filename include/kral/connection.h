@@ -56,7 +56,7 @@ KRAL_API void KRAL_CALL KRAL_SetTargetType(uint8_t type);
 /**
  * Returns the version, such as "KRAL V6.0.29,VENTRIMS" (direct mode) or "KRAL V6.0.29,ORBT" (server mode).
  *
- * @param[out] text  terminated; the buffer must hold it (KRAL_LIBRARY_VERSION_SIZE bytes do), nothing is tested
+ * @param[out] text  [KRAL_LIBRARY_VERSION_SIZE] terminated; that the buffer can hold it is not tested
  */
 KRAL_API void KRAL_CALL KRAL_GetLibraryVersion(char* text);
 
@@ -87,7 +87,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SetDefaultReceiveMode(uint8_t mode);
  * Lists the serial ports of the machine without opening any; in server mode, those that the phone server knows.
  *
  * @param[in,out] count  in: entries of `ports`; out: entries written, also on failure
- * @param[out]    ports  COM numbers, in the system's order
+ * @param[out]    ports  [count] COM numbers, in the system's order
  * @return 1 on success; 0 when the ports cannot be listed, and in server mode also when there are none
  */
 KRAL_API uint8_t KRAL_CALL KRAL_GetAllPortList(uint16_t* count, uint16_t* ports);
@@ -99,9 +99,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetAllPortList(uint16_t* count, uint16_t* ports)
  * port is opened exclusively and asked. In server mode the server's list is given as it is.
  *
  * @param[in,out] count         in: entries of `ports`; out: entries written
- * @param[out]    ports         COM numbers, in the system's order
+ * @param[out]    ports         [count] COM numbers, in the system's order
  * @param         ignore_count  entries of `ignore_list`
- * @param         ignore_list   ports that are not to be touched; not consulted in server mode
+ * @param         ignore_list   [ignore_count] ports that are not to be touched; not consulted in server mode
  * @return 1 when the ports could be listed, even if no handset answered; in server mode 0 when there are none
  *
  * Wait: twice time-out 1 (80 ms) for each port that opens.
@@ -181,10 +181,10 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_
  * the boot transfer (kivrat.h). The flush function runs on the calling thread, in KRAL_FlushRxBuffer and in the same
  * two. Send or flush and the receive function may run at the same time; none runs twice at a time.
  */
-/** Writes `count` bytes; `*written` is preset to `count`. */
+/** Writes bytes. @param data  [count] them @param[in,out] written  preset to `count`; out: how many were written */
 typedef uint32_t(KRAL_CALL* KRAL_SEND_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t count,
                                                 const uint8_t* data, uint32_t* written);
-/** Reads what is there, at most `*count` bytes, and says how many; does not wait. */
+/** Reads what is there, does not wait. @param[in,out] count  in: room; out: bytes @param[out] buffer  [count] them */
 typedef uint32_t(KRAL_CALL* KRAL_RECEIVE_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t* count,
                                                    uint8_t* buffer);
 /** Forgets what has been received; its result is ignored. */
@@ -220,7 +220,7 @@ KRAL_API void KRAL_CALL KRAL_TerminateORBTServer(void);
 
 /**
  * Asks whether the handset answers: opens a closed port, sends a loopback and a version request (target type 1: asks
- * for the diagnostic service). Always 1 on the null port.
+ * for the diagnostic service). @return [answer] 1 when it does; always 1 on the null port
  *
  * Wait: twice time-out 1 (80 ms).
  */

@@ -37,18 +37,18 @@ extern "C" {
  * The five texts are runs of characters of exactly the size given; none is terminated.
  *
  * @param      handle                  from a connect function
- * @param[out] compile_date            KRAL_VERNO_DATE_SIZE (11) bytes
- * @param[out] compile_time            KRAL_VERNO_TIME_SIZE (8) bytes
- * @param[out] release_date            KRAL_VERNO_DATE_SIZE bytes
- * @param[out] release_time            KRAL_VERNO_TIME_SIZE bytes
- * @param[out] version_directory       KRAL_VERNO_DIRECTORY_SIZE (8) bytes
- * @param[out] station_class_mark      1 byte
- * @param[out] air_interface_revision  1 byte
- * @param[out] mobile_model            1 byte
+ * @param[out] compile_date            [KRAL_VERNO_DATE_SIZE] 11 bytes
+ * @param[out] compile_time            [KRAL_VERNO_TIME_SIZE] 8 bytes
+ * @param[out] release_date            [KRAL_VERNO_DATE_SIZE] 11 bytes
+ * @param[out] release_time            [KRAL_VERNO_TIME_SIZE] 8 bytes
+ * @param[out] version_directory       [KRAL_VERNO_DIRECTORY_SIZE] 8 bytes
+ * @param[out] station_class_mark      [1] 8 bits
+ * @param[out] air_interface_revision  [1] 8 bits
+ * @param[out] mobile_model            [1] 8 bits
  * @param[out] firmware_revision       16 bits
- * @param[out] slot_cycle_index        1 byte
- * @param[out] vocoder_major           1 byte
- * @param[out] vocoder_minor           1 byte
+ * @param[out] slot_cycle_index        [1] 8 bits
+ * @param[out] vocoder_major           [1] 8 bits
+ * @param[out] vocoder_minor           [1] 8 bits
  * @return 1 when the handset answered. 1 also for an answer of fewer than 54 bytes: the outputs then show the last
  *         full answer of this connection's handset object, or zeros when there was none.
  */
@@ -67,8 +67,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_VERNO_F(KRAL_HANDLE handle, char* compile_d
  * @param      handle             from a connect function
  * @param[out] hardware_version   version of the BXC hardware
  * @param[out] mobile_model       number of the mobile model
- * @param[out] software_revision  4,096 bytes, NUL-terminated
- * @param[out] model              4,096 bytes, NUL-terminated; empty when the handset sent no second text
+ * @param[out] software_revision  [KRAL_BUILD_ID_TEXT_SIZE] NUL-terminated
+ * @param[out] model              [KRAL_BUILD_ID_TEXT_SIZE] NUL-terminated; empty when the handset sent no second text
  * @return 1 on success; 0 also when the answer ends before the mobile model. Texts that were not sent are empty
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_EXT_BUILD_ID_F(KRAL_HANDLE handle, uint32_t* hardware_version,
@@ -126,7 +126,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_CONTROL_F(KRAL_HANDLE handle, uint16_t mode
  * @param      handle   from a connect function
  * @param      address  in the handset
  * @param      count    elements to read; one answer must carry them all, and many handsets carry at most 16 bytes
- * @param[out] data     room for `count` elements
+ * @param[out] data     [count] the elements
  * @return 1 on success; 0 also when the answer holds fewer
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_F(KRAL_HANDLE handle, uint32_t address, uint16_t count, uint8_t* data);
@@ -145,8 +145,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_PEEK_DWORD_F(KRAL_HANDLE handle, uin
  * @param      handle   from a connect function
  * @param      address  in the handset
  * @param      count    elements to write
- * @param      data     the elements
- * @param[out] status   the last byte of the answer, the handset's own status
+ * @param      data     [count] the elements
+ * @param[out] status   [1] the last byte of the answer, the handset's own status
  * @return 1 when the handset answered
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_MEMORY_POKE_F(KRAL_HANDLE handle, uint32_t address, uint16_t count,
@@ -186,9 +186,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SET_DIPSW_F(KRAL_HANDLE handle, uint16_t sw
  * Sends the service programming code, which unlocks protected settings. The code appears in the text log in clear.
  *
  * @param      handle  from a connect function
- * @param      code    six ASCII digits. Exactly six characters are read: no terminator is needed, and a shorter text
- *                     is read beyond its end
- * @param[out] result  the last byte of the answer: 1 when the handset accepted the code
+ * @param      code    [KRAL_SERVICE_CODE_SIZE] ASCII digits. Exactly six characters are read: no terminator is
+ *                     needed, and a shorter text is read beyond its end
+ * @param[out] result  [1] the last byte of the answer: 1 when the handset accepted the code
  * @return 1 when the handset answered, whatever it thought of the code
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char* code, uint8_t* result);
@@ -201,17 +201,17 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SPC_F(KRAL_HANDLE handle, const char* code,
  * @param         handle   from a connect function
  * @param[in,out] size     in: bytes of `records`; out: bytes written. A longer answer is cut at the room. An answer
  *                         has at most KRAL_LONGEST_DIAG_REPLY bytes.
- * @param[out]    records  the answer as it came, its command code (42) first
+ * @param[out]    records  [size] the answer as it came, its command code (42) first
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_READ_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* records);
 
 /** Clears one record of the error log, by its index. */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ERR_CLEAR_F(KRAL_HANDLE handle, uint8_t record);
 
-/** Reads the status record; size and buffer as in KRAL_DIAG_ERR_READ_F, with a first byte of 75. */
+/** Reads the status record; as KRAL_DIAG_ERR_READ_F. @param[out] record  [size] the answer, with 75 first */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_STATUS_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* record);
 
-/** Reads the IS-2000 status record; size and buffer as in KRAL_DIAG_ERR_READ_F, with a first byte of 112. */
+/** Reads the IS-2000 status record; as KRAL_DIAG_ERR_READ_F. @param[out] record  [size] the answer, with 112 first */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_IS2000_STATUS_F(KRAL_HANDLE handle, uint16_t* size, uint8_t* record);
 
 /* --- Whole-handset requests --------------------------------------------------------------------------------------- */

@@ -95,7 +95,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_KOVA_NOP(KRAL_HANDLE handle);
 /** Restarts a handset that is in its loader. Wait: time-out 0. */
 KRAL_API uint8_t KRAL_CALL KRAL_KOVA_RESET(KRAL_HANDLE handle);
 
-/** Reads the software version of the loader. Wait: time-out 0. */
+/** Reads the software version of the loader. Wait: time-out 0. @param[out] version  [1] a number */
 KRAL_API uint8_t KRAL_CALL KRAL_KOVA_SW_VERSION(KRAL_HANDLE handle, uint8_t* version);
 
 /**@}*/
@@ -143,8 +143,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_SECURITY_MODE(KRAL_HANDLE handle, uint8_t
  * @param      handle          of a handset that runs a flash programmer
  * @param      table_file      path of the table, at most 512 bytes
  * @param      override_table  1 to replace a different table
- * @param[out] status          what the handset said, KRAL_STREAM_PARTITION_...; also written when that is a refusal,
- *                             and untouched when it said nothing. May be null.
+ * @param[out] status          [1] what the handset said, KRAL_STREAM_PARTITION_...; also written when that is a
+ * refusal, and untouched when it said nothing. May be null.
  * @return 1 when the table was accepted
  *
  * Wait: time-out 0.
@@ -202,13 +202,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageFile(KRAL_HANDLE handle, const 
                                                       uint32_t block_size, uint16_t window, uint32_t* result);
 
 /**
- * Writes bytes of the caller into flash.
+ * Writes bytes of the caller into flash; otherwise as KRAL_STREAM_WriteImageFile.
  *
  * @param handle       as above, like everything not named here
- * @param data         the bytes; may be null when there are none. An image of nothing is opened and closed.
+ * @param data         [size] the bytes; may be null when there are none. An image of nothing is opened and closed.
  * @param size         how many
  * @param address      of the first byte
- * @param header       for the opening packet; null for none
+ * @param header       [header_size] for the opening packet; null for none
  * @param header_size  its bytes, at most 512
  */
 KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const uint8_t* data, uint32_t size,

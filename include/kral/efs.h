@@ -7,7 +7,7 @@
  * - Paths of the handset are terminated texts with '/' between names. A request of more than 256 bytes is refused
  *   without sending, which leaves 243 characters for the path of a transfer and 249 or more for other paths (two paths
  *   share them). The path of an item request has up to 1,024 characters.
- * - An error number (KRAL_EFS_ERROR_...) is what the handset answers: 0 done, 2 no such file, 6 exists already, 28 no
+ * - @param[out] error_number  what the handset answers (KRAL_EFS_ERROR_...): 0 done, 2 no such file, 6 exists, 28 no
  *   room, and others. A function with an `error_number` returns 1 when the handset answered and leaves the judgement to
  *   its caller; the other outputs are written only when the number is 0. Any output may be null.
  * - Every packet of a transfer and of a listing is tried up to 5 times, the questions for room and status in front of
@@ -172,7 +172,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_AbortEFS_Operation(KRAL_HANDLE handle);
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsWrite(KRAL_HANDLE handle, const char* local_file, const char* efs_file);
 
-/** The same from memory. `buffer` may be null when `size` is 0. */
+/** The same from memory. @param buffer  [size] the bytes; may be null when there are none */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsWriteMem(KRAL_HANDLE handle, const uint8_t* buffer, uint32_t size,
                                             const char* efs_file);
 
@@ -187,7 +187,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsRead(KRAL_HANDLE handle, const char* local_fi
 /**
  * Copies a file of the handset into memory.
  *
- * @param[out]    buffer  on failure it may hold a part of the file
+ * @param[out]    buffer  [size] the file; on failure it may hold a part of the file
  * @param[in,out] size    in: bytes of `buffer`; out: bytes read, on success only. A larger file is a failure
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsReadMem(KRAL_HANDLE handle, const char* efs_file, uint8_t* buffer, uint32_t* size);
@@ -203,7 +203,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsReadMem(KRAL_HANDLE handle, const char* efs_f
  */
 KRAL_API uint8_t KRAL_CALL KRAL_Efs2PutItem(KRAL_HANDLE handle, const char* local_file, const char* efs_file);
 
-/** The same from memory. */
+/** The same from memory. @param buffer  [size] the bytes */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsPutItemFromMem(KRAL_HANDLE handle, const char* efs_file, const uint8_t* buffer,
                                                   uint32_t size);
 
@@ -225,8 +225,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_Efs2GetItem(KRAL_HANDLE handle, const char* loca
  *
  * @param         folder   null and "" list "/"
  * @param         filter   KRAL_EFS_FILTER_...; any other value selects nothing
- * @param[out]    entries  null, or room for `*count` records. On failure it may hold those that had come
- * @param[in,out] count    in: records in `entries`; out: entries selected, of which the first so many are in
+ * @param[out]    entries  [count] the records, or null. On failure it may hold those that had come
+ * @param[in,out] count    in: room in `entries`; out: entries selected, of which the first so many are in
  *                         `entries`. May be null when `entries` is
  *
  * One request for each entry, three for the directory.
@@ -259,7 +259,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EfsCreateLink(KRAL_HANDLE handle, const char* ta
 /**
  * Reads where a symbolic link leads.
  *
- * @param[out] target  terminated
+ * @param[out] target  [size] terminated
  * @param      size    bytes of `target`; 0 is returned when the text and its zero do not fit
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EfsReadLink(KRAL_HANDLE handle, const char* link, uint32_t* error_number, char* target,
@@ -271,7 +271,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_RENAME(KRAL_HANDLE handle, const char*
 
 /* --- Status ------------------------------------------------------------------------------------------------------- */
 
-/** Reads the status of what a path names, links followed. Times are the handset's, in seconds. */
+/** Status, links followed. @param[out] mode, size, link_count, access_time, modify_time, change_time  in seconds */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_STAT(KRAL_HANDLE handle, const char* path, uint32_t* error_number,
                                                uint32_t* mode, uint32_t* size, uint32_t* link_count,
                                                uint32_t* access_time, uint32_t* modify_time, uint32_t* change_time);
@@ -284,7 +284,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_CHMOD(KRAL_HANDLE handle, const char* 
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_ACCESS(KRAL_HANDLE handle, const char* path, uint16_t permission_bits,
                                                  uint32_t* error_number);
 
-/** Reads the status of the file system that holds a path. */
+/** Reads the status of the file system that holds a path. @param[out] status  sizes in blocks */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_STATFS(KRAL_HANDLE handle, const char* path, uint32_t* error_number,
                                                  KRAL_EFS_STATFS* status);
 
@@ -296,7 +296,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_STATFS(KRAL_HANDLE handle, const char*
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_GetGroupInfo(KRAL_HANDLE handle, const char* path, uint64_t* used);
 
-/** Reads the geometry and the make of the memory under the file system. */
+/** Reads the geometry and the make of the memory under the file system. @param[out] info  what it is */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_DEV_INFO(KRAL_HANDLE handle, uint32_t* error_number,
                                                    KRAL_EFS_DEVICE_INFO* info);
 
@@ -304,8 +304,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_DEV_INFO(KRAL_HANDLE handle, uint32_t*
  * Asks for one of the things that the handset can report besides.
  *
  * @param      query      the handset's number for it
- * @param[out] data_type  KRAL_EFS_DATA_NUMBER or KRAL_EFS_DATA_TEXT: where the answer is. Any other type returns 0
- * @param[out] text       terminated
+ * @param[out] data_type, number  KRAL_EFS_DATA_...: where the answer is; the number. Any other type returns 0
+ * @param[out] text       [text_size] the answer, terminated
  * @param      text_size  bytes of `text`; 0 is returned when the answer and its zero do not fit
  */
 KRAL_API uint8_t KRAL_CALL KRAL_EFS2_DIAG_EXTENDED_INFO(KRAL_HANDLE handle, uint32_t query, uint32_t* error_number,

@@ -91,7 +91,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetLastError(KRAL_HANDLE handle, KRAL_ERROR* err
  * Gets what an error code means, as a short phrase ("no answer in time").
  *
  * @param      code  one of the KRAL_ERROR_ codes
- * @param[out] text  the phrase, terminated, in ASCII
+ * @param[out] text  [size] the phrase, terminated, in ASCII
  * @param      size  bytes of text; 64 are enough for every phrase
  * @return 1 on success; 0 for an unknown code and when the phrase does not fit, with text untouched
  *

@@ -79,7 +79,7 @@ extern "C" {
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_MODE_ID(KRAL_HANDLE handle, uint16_t mode_id);
 
-/** Returns the mode id in force. Sends nothing. */
+/** Returns the mode id in force. Sends nothing. @param[out] mode_id  KRAL_FTM_MODE_ID_..., or another number */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t* mode_id);
 
 /**
@@ -90,7 +90,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_MODE_ID(KRAL_HANDLE handle, uint16_t* mo
  */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t code);
 
-/** Returns the command code in force. Sends nothing. */
+/** Returns the command code in force. Sends nothing. @param[out] code  KRAL_FTM_COMMAND_CODE_... */
 KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_t* code);
 
 /* --- Into and out of factory test mode ---------------------------------------------------------------------------- */
@@ -100,7 +100,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_GET_COMMAND_CODE(KRAL_HANDLE handle, uint16_
  * 453) under 59. A handset of target type 1 has no such query: it counts as not in FTM.
  *
  * @param      handle  from a connect function
- * @param[out] is_ftm  1 or 0
+ * @param[out] is_ftm  [1] 1 or 0
  * @return 1 when the handset answered
  */
 KRAL_API uint8_t KRAL_CALL KRAL_IsFTM_Mode(KRAL_HANDLE handle, uint8_t* is_ftm);
@@ -185,7 +185,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SET_TX_OFF(KRAL_HANDLE handle);
 /* --- Commands of every family: additions of this library ---------------------------------------------------------- */
 
 /**
- * Addition. Sends any FTM command to the dispatcher of the current mode id; arguments as in ftm_commands.h.
+ * Addition. Sends any FTM command to the dispatcher of the current mode id, as KRAL_FTM_GSM_CAPTURE_IQ sends its own.
  *
  * @param command  the command id
  */
@@ -198,9 +198,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_FTM_SendCommand(KRAL_HANDLE handle, uint16_t com
 #define KRAL_FTM_HEADER_ZEROS 2   /* two zeros come first: PMIC */
 
 /**
- * Addition. The same to the dispatcher of a given mode id and with a given header, which leaves the current mode id
- * as it is. So every family is reached by its own rule, for example EVDO with mode id 8 and form 1, PMIC with 11 and
- * form 2, AUDIO with 14 and form 0.
+ * Addition. As KRAL_FTM_SendCommand, but to the dispatcher of a given mode id and with a given header, which leaves the
+ * current mode id as it is. So every family is reached by its own rule, for example EVDO with mode id 8 and form 1,
+ * PMIC with 11 and form 2, AUDIO with 14 and form 0.
  *
  * @param mode_id      the dispatcher; not sent under command code 59
  * @param header_form  0: the payload follows the command id.
@@ -226,7 +226,7 @@ KRAL_API uint16_t KRAL_CALL KRAL_FTM_GetCommandCount(void);
  *
  * @param      index      0 to KRAL_FTM_GetCommandCount() - 1
  * @param[out] command    the command id
- * @param[out] name       the name without "KRAL_FTM_", NUL-terminated
+ * @param[out] name       [name_size] the name without "KRAL_FTM_", NUL-terminated
  * @param      name_size  room of `name`; KRAL_FTM_COMMAND_NAME_SIZE bytes hold every name
  * @return 1; 0 for an index out of range or a name that does not fit
  */

@@ -8,11 +8,11 @@
  *               uint8_t *response, uint16_t *response_size);
  *
  * @param          handle         from a connect function
- * @param          payload        fields after the command id, little-endian, as the handset's software defines them;
- *                                may be null when payload_size is 0
+ * @param          payload        [payload_size] fields after the command id, little-endian, as the handset's software
+ * defines them; may be null when payload_size is 0
  * @param          payload_size   0 to 6,137 bytes (6,136 under command code 59). A longer payload does not fit the
  *                                request: the command goes out without it, and the text log says so
- * @param[out]     response       what the handset sent after the command id
+ * @param[out]     response       [response_size] what the handset sent after the command id
  * @param[in,out]  response_size  in: room of `response`, at least 1 byte; out: bytes written, at most the room
  * @return 1 when the handset answered; the status words within the answer are the caller's to judge. 0 without traffic
  *         for a null payload with a size, a null response and a room of 0.

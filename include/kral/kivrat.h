@@ -100,8 +100,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_End(KRAL_HANDLE handle);
  *
  * @param      handle           of a handset in its boot loader
  * @param      programmer_file  as for KRAL_Kivrat_DownloadFlashProgrammer
- * @param      image_files      paths, binary or Intel HEX by their content
- * @param      image_types      one for each image, for its opening packet; null: 0 for all
+ * @param      image_files      [image_count] paths, binary or Intel HEX by their content
+ * @param      image_types      [image_count] one for each image, for its opening packet; null: 0 for all
  * @param      image_count      at least 1
  * @param[out] result           KRAL_FLASH_..., KRAL_STREAM_... or KRAL_DOWNLOAD_ABORTED; written whenever the handle is
  *                              known, may be null
@@ -123,7 +123,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_Kivrat_FlashAll(KRAL_HANDLE handle, const char* 
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t behavior);
 
-/** Returns the number that was set last, 0 by default. @return 1; 0 in direct mode */
+/** Gives the number that was set last. @param[out] behavior  0 by default @return 1; 0 in direct mode */
 KRAL_API uint8_t KRAL_CALL KRAL_GetKivratHelloBehavior(KRAL_HANDLE handle, uint16_t* behavior);
 
 #ifdef __cplusplus

@@ -16,8 +16,8 @@
  *     - KRAL_SetStartFlag returns the former value of the setting, not whether the call worked.
  *     - A result that is an answer, as of KRAL_IsLoggingStarted or KRAL_IsPhoneConnected, is 1 for yes and 0 for no.
  *     - Connect functions return the handle, 0 for failure; KRAL_GetTimeOut, counts and the band functions a value.
- * - Outputs are written on success only. The caller owns all buffers; sizes are in bytes. Narrow integers are passed
- *   and returned zero-extended.
+ * - Outputs are written on success only. The caller owns all buffers; sizes are in bytes. [N] in front of a parameter's
+ *   text is how many elements its buffer has. Narrow integers are passed and returned zero-extended.
  * - Values that carry a caller's pointer are uintptr_t. Multi-byte fields of handset records are little-endian.
  * - Calls that send a request may block for the time-out they name (KRAL_ConfigureTimeOut). A request that gets no
  *   answer closes the port, and so does the handset's going away; the next request on the handle opens it again, with

@@ -70,8 +70,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetPhoneLoggingState(KRAL_HANDLE handle, ui
  *
  * @param      handle  from a connect function
  * @param[out] size    bytes of the packet, its two FCS bytes at the end included
- * @param[out] buffer  room for KRAL_LONGEST_PACKET bytes
- * @return 1, or 0 when the queue is empty
+ * @param[out] buffer  [KRAL_LONGEST_PACKET] the packet
+ * @return [answer] 1, or 0 when the queue is empty
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer);
 
@@ -80,9 +80,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextPhoneLog(KRAL_HANDLE handle, uint16_
  *
  * @param      handle       from a connect function; released meanwhile, it ends the wait
  * @param[out] size         as above
- * @param[out] buffer       as above
+ * @param[out] buffer       [KRAL_LONGEST_PACKET] as above
  * @param      time_out_ms  0 does not wait
- * @return 1, or 0 when no packet came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
+ * @return [answer] 1, or 0 when no packet came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextPhoneLog(KRAL_HANDLE handle, uint16_t* size, uint8_t* buffer,
                                                       uint32_t time_out_ms);
@@ -95,7 +95,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_ClearPhoneLogQueue(KRAL_HANDLE handle);
  *
  * @param      handle  from a connect function
  * @param[out] count   written for an empty queue as well
- * @return 1 when there are any, 0 when the queue is empty
+ * @return [answer] 1 when there are any, 0 when the queue is empty
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetPhoneLogQueueSize(KRAL_HANDLE handle, uint32_t* count);
 
@@ -104,7 +104,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetPhoneLogQueueSize(KRAL_HANDLE handle, ui
  *
  * @param      handle  from a connect function
  * @param[out] event   the event
- * @return 1, or 0 when the queue is empty
+ * @return [answer] 1, or 0 when the queue is empty
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event);
 
@@ -114,7 +114,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetNextEvent(KRAL_HANDLE handle, KRAL_EVENT
  * @param      handle       from a connect function; released meanwhile, it ends the wait
  * @param[out] event        the event
  * @param      time_out_ms  0 does not wait
- * @return 1, or 0 when no event came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
+ * @return [answer] 1, or 0 when no event came in time; at once, too, when the handset is unplugged (KRAL_GetPortState)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_WaitNextEvent(KRAL_HANDLE handle, KRAL_EVENT* event, uint32_t time_out_ms);
 
@@ -201,7 +201,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_AddExtendedLogCode(KRAL_HANDLE handle, uint
  *
  * @param handle        from a connect function
  * @param equipment_id  0 to 15
- * @param log_codes     one that is refused fails the call, and nothing is changed
+ * @param log_codes     [count] one that is refused fails the call, and nothing is changed
  * @param count         codes of the list
  * @return 1 when all are on
  */
@@ -242,7 +242,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogRanges(KRAL_HANDLE handle, uint32_t* 
  * @param         equipment_id  0 to 15
  * @param[out]    bits          items of the equipment id
  * @param[in,out] size          in: bytes of room; out: bytes of the mask
- * @param[out]    mask          item i is bit (i mod 8) of byte (i / 8)
+ * @param[out]    mask          [size] item i is bit (i mod 8) of byte (i / 8)
  * @return 1; 0 also when there is not enough room (KRAL_LONGEST_MASK bytes always are)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetLogMask(KRAL_HANDLE handle, uint8_t equipment_id, uint32_t* bits,
@@ -264,7 +264,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEventMaskBit(KRAL_HANDLE handle, uint16_
  * Switches several events.
  *
  * @param handle     from a connect function
- * @param event_ids  one that is refused fails the call, and nothing is changed
+ * @param event_ids  [count] one that is refused fails the call, and nothing is changed
  * @param count      ids of the list
  * @param state      1: on; every other value: off
  * @return 1 when the handset has taken the mask
@@ -287,7 +287,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_SetEntireEventMaskState(KRAL_HANDLE handle,
  * @param         handle  from a connect function
  * @param[out]    bits    events that the handset has
  * @param[in,out] size    in: bytes of room; out: bytes of the mask
- * @param[out]    mask    event i is bit (i mod 8) of byte (i / 8)
+ * @param[out]    mask    [size] event i is bit (i mod 8) of byte (i / 8)
  * @return 1; 0 also when there is not enough room (KRAL_LONGEST_MASK bytes always are)
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_GetEventMask(KRAL_HANDLE handle, uint16_t* bits, uint16_t* size, uint8_t* mask);
@@ -319,7 +319,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_LoadNameTable(KRAL_HANDLE handle, uint32_t table
  * @param      handle    from a connect function
  * @param      event_id  0 to 4,095
  * @param      size      bytes of room, at least 1
- * @param[out] text      terminated; a longer one is cut
+ * @param[out] text      [size] terminated; a longer one is cut
  * @return 1, or 0 when the table has no such event
  */
 KRAL_API uint8_t KRAL_CALL KRAL_GetEventText(KRAL_HANDLE handle, uint16_t event_id, uint16_t size, char* text);
@@ -343,7 +343,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListSize(KRAL_HAN
  * @param      index     from 0
  * @param[out] category  its id
  * @param      size      bytes of room for the name, at least 1
- * @param[out] name      terminated; a longer one is cut
+ * @param[out] name      [size] terminated; a longer one is cut
  * @return 1, or 0 for an index outside the table
  */
 KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_GetCategoryListItem(KRAL_HANDLE handle, uint32_t index,
@@ -419,7 +419,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* fi
  *
  * @param microseconds  since 1970-01-01 UTC, by the clock of the PC that wrote the file
  * @param length        bytes of the packet
- * @param bytes         the packet; valid during the call only
+ * @param bytes         [length] the packet; valid during the call only
  * @param value         as given to KRAL_ConfigurePlaybackCallBack
  */
 typedef void(KRAL_CALL* KRAL_PLAYBACK_CALLBACK)(uint64_t microseconds, uint32_t length, const uint8_t* bytes,

@@ -39,7 +39,7 @@ extern "C" {
  *
  * @param         handle  from a connect function
  * @param         item    the item's id
- * @param[in,out] data    sent with the request unchanged; receives the item. Untouched unless the status is 0
+ * @param[in,out] data    [length] sent with the request unchanged; receives the item. Untouched unless the status is 0
  * @param         length  bytes of `data`, normally KRAL_NV_DATA_SIZE
  * @param[in,out] status  sent unchanged; the handset's answer
  * @return 1 when an answer came that is at least as long as the request
@@ -50,7 +50,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_F(KRAL_HANDLE handle, uint16_t item
 /**
  * Writes an item, or in batch mode appends it to the queue with status 0.
  *
- * @param      data    what the data field begins with; the rest of it becomes 0
+ * @param      data    [length] what the data field begins with; the rest of it becomes 0
  * @param      length  bytes of `data`; what is beyond 128 is not written
  * @param[out] status  the handset's answer
  * @return 1 when an answer with a status came
@@ -73,7 +73,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_EXT_F(KRAL_HANDLE handle, uint16_t
  * Reads one element of an array item.
  *
  * @param      index   of the element, from 0
- * @param[out] data    the element; `length` bytes, which the answer must hold
+ * @param[out] data    [length] the element; the answer must hold so many bytes
  * @param[out] status  the handset's answer, also written with a refusal
  * @return 1 when the status is 0
  */
@@ -82,7 +82,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_READ_ARRAY_F(KRAL_HANDLE handle, uint16_
 
 /**
  * Writes one element of an array item: a plain write of the index byte and the data, of which 127 bytes at most are
- * written. In batch mode it is queued like any other.
+ * written. In batch mode it is queued like any other. Otherwise as KRAL_DIAG_NV_WRITE_F.
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_ARRAY_F(KRAL_HANDLE handle, uint16_t item, uint8_t index,
                                                       const uint8_t* data, uint16_t length, uint16_t* status);
@@ -99,7 +99,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_SetBatchMode(KRAL_HANDLE handle, u
 /**
  * Replaces the list of items whose refusal as read-only (status 7) is no error in a flush.
  *
- * @param items  ids; may be null when `count` is 0, which empties the list
+ * @param items  [count] ids; may be null when `count` is 0, which empties the list
  */
 KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE handle, const uint16_t* items,
                                                                     uint16_t count);
@@ -113,7 +113,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_DIAG_NV_WRITE_BatchQueue_SetRO_List(KRAL_HANDLE 
  * @param[out] last_error_item    id of the last item whose result was read: the failing one, if any; 65535 when none
  * was
  * @param[out] last_total_status  of the last packet, as the handset reported
- * @param[out] last_item_status   of that item; 0 when it is read-only and in the list
+ * @param[out] last_item_status   [1] of that item; 0 when it is read-only and in the list
  * @return 1 when every packet was answered, with a result for each of its items, and no item failed
  *
  * Wait: time-out 0 for each packet.

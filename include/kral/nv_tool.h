@@ -7,7 +7,7 @@
  *
  * - Every function returns an error code, 0 for success (KRAL_NV_GetErrorText has the texts). With an unknown handle
  *   it is 16; 0xFFFFFFFF is a failure of the machine, such as a lack of memory.
- * - Definitions, values, filters and the current subscription belong to the handle and live until its release.
+ * - Definitions, values, filters, the current @param[out] subscription  belong to the handle, until its release.
  * - An item is a numbered NV item or a file of the handset, known by its full path; a missing first slash and doubled
  *   ones make no difference. Items that are kept as "/nv/item_files/rfnv/" and eight decimal digits are RF NV items:
  *   they are files and have an NV id too.
@@ -19,8 +19,8 @@
  * - No request to the handset names both an array index and a subscription: the handset holds arrays of subscription 0
  *   only. In another one, array items have no value when they are read (status 5) and are refused when they are written
  *   (11); files take their values of every subscription.
- * - Texts are terminated. A function that returns one has a companion, ...StringLength, that returns the bytes it
- *   needs, the zero included; with a buffer that is too small the code is 12, and the buffer is untouched.
+ * - @param[out] text  [size] terminated. Of each function with a text there is a companion, ...StringLength, for the
+ *   @param[out] length  that it needs, zero included; with less room the code is 12, and the buffer is untouched.
  * - Functions that move a set continue after an item that fails, and name it in the text log. The files that
  *   they write are replaced in one step. What moves is limited by the filters, if any are loaded.
  * - A request to the handset may wait for time-out 0 (4,000 ms). One that gets no answer is tried 3 times and then
@@ -113,7 +113,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_LoadNVDataTypeDictinary(KRAL_HANDLE handle, 
 /** Forgets all definitions with their values, all data types and roaming lists. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_ClearNVDefinition(KRAL_HANDLE handle);
 
-/** The number of numbered items, and of files. */
+/** The number of numbered items, and of files. @param[out] count  of definitions */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNumOfNVDefinition(KRAL_HANDLE handle, uint32_t* count);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNumOfNVEfsDefinition(KRAL_HANDLE handle, uint32_t* count);
 
@@ -151,13 +151,13 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenamesStringLength(KRAL_HANDLE ha
  * definition. 12: the buffer is too small.
  */
 
-/** @param[in,out] size  the room of `data`; the bytes of the value, also when the room is too small */
+/** @param[out] data  [size] the value @param[in,out] size  the room; its bytes, also when the room is too small */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
                                                                 uint16_t array_index, uint8_t* data, uint32_t* size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                                uint8_t* data, uint32_t* size);
 
-/** @param size  bytes of `data`: those of the item's type, or of a value of variable size */
+/** @param data  [size] the value @param size  bytes of the item's type, or of a value of variable size */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
                                                                 uint16_t array_index, const uint8_t* data,
                                                                 uint32_t size);
@@ -239,7 +239,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVsToSource(KRAL_HANDLE handle, const c
  * answer.
  */
 
-/** An item without a definition gets a generic one. */
+/** An item without a definition gets a generic one. @param[out] status  NV status (nv.h) */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_ReadNVItemFromMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t* status);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_WriteNVItemToMobileByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t* status);

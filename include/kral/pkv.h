@@ -11,8 +11,8 @@
  *   value and are left out. RF NV items are files, too.
  * - Every request is tried up to 3 times, each of them for time-out 0 (4,000 ms). A handset that cannot be reached any
  *   more ends the work: a backup then leaves the file as it was.
- * - `status` reports how the work ended: the code of the NV tool (KRAL_NV_GetErrorText), or one of those below. It is
- *   written in every case but for an unknown handle, and may be null.
+ * - @param[out] status  how the work ended: the code of the NV tool (KRAL_NV_GetErrorText), or one of those below.
+ *   Written in every case but for an unknown handle, and may be null.
  * - The work takes as long as its requests: plan for one round trip per item of a backup or comparison, and for 1.2 of
  *   a restore. The callback receives the progress and can end it; other requests on the handle wait for its end.
  * - A backup lists the item folders first. Until that is done the total is not known and the callback is not called;
@@ -105,7 +105,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_PKV_ConfigureCallBack(KRAL_HANDLE handle, KRAL_P
 KRAL_API uint8_t KRAL_CALL KRAL_PKV_ConfigureBackup(KRAL_HANDLE handle, uint16_t first_item, uint16_t last_item,
                                                     uint16_t subscriptions);
 
-/** Gives the counts of the last backup, restore or comparison of the handle, also of one that failed. */
+/** Gives the counts of the last backup, restore or comparison, also of one that failed. @param[out] counts  of each */
 KRAL_API uint8_t KRAL_CALL KRAL_PKV_GetCounts(KRAL_HANDLE handle, KRAL_PKV_COUNTS* counts);
 
 /**

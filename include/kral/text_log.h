@@ -60,7 +60,7 @@ extern "C" {
  * |   1007 |    1 | 0                                                                          |
  *
  * @param size    KRAL_TEXT_LOG_RECORD_SIZE
- * @param record  valid during the call; multi-byte fields are little-endian
+ * @param record  [size] valid during the call; multi-byte fields are little-endian
  * @param handle  the handle with which the callback was configured
  */
 typedef void(KRAL_CALL* KRAL_TEXT_LOG_CALLBACK)(uint32_t size, const void* record, uint32_t handle);
@@ -86,7 +86,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_StartLogging(KRAL_HANDLE handle, const char* fil
  */
 KRAL_API uint8_t KRAL_CALL KRAL_StopLogging(KRAL_HANDLE handle);
 
-/** Returns 1 between KRAL_StartLogging and KRAL_StopLogging, otherwise 0. */
+/** Tells whether a log is being written. @return [answer] 1 between KRAL_StartLogging and KRAL_StopLogging */
 KRAL_API uint8_t KRAL_CALL KRAL_IsLoggingStarted(KRAL_HANDLE handle);
 
 /**
@@ -113,7 +113,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_AddUserMessageToTextLog(KRAL_HANDLE handle, uint
  *
  * @param handle      from a connect function
  * @param flag        category of the line
- * @param message     the de-framed packet
+ * @param message     [size] the de-framed packet
  * @param size        bytes of the message
  * @param with_code   1: the first byte is shown as a number too
  * @param with_bytes  1: the bytes follow in hexadecimal

@@ -33,10 +33,10 @@ extern "C" {
  *
  * @param         handle         from a connect function
  * @param         request_size   1 to 16,381 bytes
- * @param         request        command code first
+ * @param         request        [request_size] command code first
  * @param[in,out] response_size  in: bytes of room; out: bytes of the reply without its two FCS bytes, at most the room
- * @param[out]    response       the reply, cut at the room; where there is room its FCS bytes follow. Written, as the
- *                               size is, whenever a reply came; untouched when none did
+ * @param[out]    response       [response_size] the reply, cut at the room; where there is room its FCS bytes follow.
+ * Written, as the size is, whenever a reply came; untouched when none did
  * @param         time_out_ms    for the reply, after the request has been written
  * @return 1 when the reply came; 0 also after the time-out, which closes the port
  *
@@ -50,7 +50,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SendSync(KRAL_HANDLE handle, uint16_t request_si
  *
  * @param handle        from a connect function
  * @param request_size  1 to 16,381 bytes
- * @param request       command code first
+ * @param request       [request_size] command code first
  * @param time_out_ms   only shown in the text log
  * @param start_flag    1: a flag byte goes before the frame, whatever KRAL_SetStartFlag says
  * @return 1 when the request was written; always 0 through a phone server
@@ -68,10 +68,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_SendASync(KRAL_HANDLE handle, uint16_t request_s
  *
  * @param         handle         from a connect function
  * @param         request_size   1 to 16,381 bytes
- * @param         request        framed in packet mode 0, written as it is in the others
+ * @param         request        [request_size] framed in packet mode 0, written as it is in the others
  * @param[in,out] response_size  in: bytes of room; out: bytes of the packet, FCS included where it has one, at most
  *                               the room; untouched when nothing came
- * @param[out]    response       the packet, cut at the room
+ * @param[out]    response       [response_size] the packet, cut at the room
  * @param         time_out_ms    for the packet; a time-out leaves the port open
  * @return 1 when a packet came. Through a phone server always 1, although nothing is sent
  *
@@ -87,7 +87,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_SendRAW(KRAL_HANDLE handle, uint16_t request_siz
  *
  * @param handle      from a connect function
  * @param start_flag  1: on; 0: off
- * @return whether the setting was on before the call, not whether the call worked: 0 for the first call on a
+ * @return [answer] whether the setting was on before the call, not whether the call worked: 0 for the first call on a
  *         connection. Always 0 through a phone server
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetStartFlag(KRAL_HANDLE handle, uint8_t start_flag);
@@ -127,7 +127,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_FlushRxBuffer(KRAL_HANDLE handle);
  * that takes long makes them run into their time-outs.
  *
  * @param length  bytes of the packet
- * @param bytes   the packet
+ * @param bytes   [length] the packet
  * @param value   as given to KRAL_ConfigureCallBacks
  */
 typedef void(KRAL_CALL* KRAL_RAW_PACKET_CALLBACK)(uint32_t length, const uint8_t* bytes, uintptr_t value);
