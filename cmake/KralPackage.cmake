@@ -11,7 +11,7 @@ endif()
 if(TARGET kral_tool)
   install(TARGETS kral_tool RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
 endif()
-install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h")
+install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h*")
 
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/kral)
 install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder})

@@ -42,10 +42,13 @@ machine_sources() {
 
 # What every build needs, and what the 32-bit Windows platform needs beside it.
 build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev python3
-  libxml2-utils srecord libgsf-bin python3-olefile)
+  python3-pycparser libxml2-utils srecord libgsf-bin python3-olefile)
 # What the checks of the sources need.
 check_packages=(clang-format)
 # What reads them as clang does; only the whole scripts/test needs it.
 tidy_packages=(clang clang-tidy)
+# What tries the library from other languages.
+language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy python3-build python3-cffi python3-pytest
+  python3-setuptools python3-venv python3-wheel)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)
