@@ -115,22 +115,13 @@ class FloodLine {
   bool woken_ = false;
 };
 
-class FloodDevice final : public SerialDevice {
+class FloodDevice final : public test::FakeDevice {
  public:
   explicit FloodDevice(FloodLine& line) : line_(line) {}
   size_t Write(std::span<const uint8_t> bytes, uint32_t) override { return line_.Write(bytes); }
-  size_t OutputRoom() override { return 4096; }
   size_t Read(std::span<uint8_t> buffer) override { return line_.Read(buffer); }
-  size_t InputWaiting() override { return 0; }
-  bool gone() const override { return false; }
   bool WaitReadable(uint32_t milliseconds) override { return line_.Wait(milliseconds); }
   void Wake() override { line_.Wake(); }
-  DeviceResult SetBaudRate(uint32_t) override { return {}; }
-  uint32_t BaudRate() const override { return 115200; }
-  DeviceResult SetDtr(bool) override { return {}; }
-  DeviceResult SetRts(bool) override { return {}; }
-  void PurgeInput() override {}
-  void PurgeBoth() override {}
 
  private:
   FloodLine& line_;

@@ -53,7 +53,7 @@ class LyingLoader {
   Bytes TakeWritten() { return std::exchange(written_, {}); }
 
  private:
-  class Device final : public SerialDevice {
+  class Device final : public test::FakeDevice {
    public:
     explicit Device(LyingLoader& loader) : loader_(loader) {}
     size_t Write(std::span<const uint8_t> bytes, uint32_t) override {
@@ -61,7 +61,6 @@ class LyingLoader {
       loader_.Say();
       return bytes.size();
     }
-    size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override {
       auto& line = loader_.line_;
       const size_t count = std::min({line.size(), buffer.size(), loader_.single_bytes_ ? size_t{1} : line.size()});
@@ -70,19 +69,12 @@ class LyingLoader {
       return count;
     }
     size_t InputWaiting() override { return loader_.line_.size(); }
-    bool gone() const override { return false; }
     bool WaitReadable(uint32_t milliseconds) override {
       if (loader_.line_.empty() && !loader_.says_.empty() && (loader_.says_[0] & kLate) != 0) loader_.Say();
       if (loader_.line_.empty()) loader_.clock_.Advance(std::max(milliseconds, 1u));
       return !loader_.line_.empty();
     }
-    void Wake() override {}
-    DeviceResult SetBaudRate(uint32_t) override { return {}; }
-    uint32_t BaudRate() const override { return 115200; }
-    DeviceResult SetDtr(bool) override { return {}; }
-    DeviceResult SetRts(bool) override { return {}; }
     void PurgeInput() override { loader_.line_.clear(); }
-    void PurgeBoth() override { loader_.line_.clear(); }
 
    private:
     LyingLoader& loader_;

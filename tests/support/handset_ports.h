@@ -13,7 +13,7 @@
 #include "frame/resource_manager.h"
 #include "handset/virtual_handset.h"
 #include "kral/connection.h"
-#include "platform/serial_device.h"
+#include "tests/support/fake_device.h"
 
 namespace kral::test {
 
@@ -80,7 +80,7 @@ class HandsetPorts {
     std::set<uint16_t> open;
   };
 
-  class Device final : public SerialDevice {
+  class Device final : public FakeDevice {
    public:
     Device(std::shared_ptr<State> state, std::shared_ptr<handset::VirtualHandset> handset, uint16_t port)
         : state_(std::move(state)), handset_(std::move(handset)), appearance_(handset_->appearances()), port_(port) {}
@@ -91,18 +91,11 @@ class HandsetPorts {
     size_t Write(std::span<const uint8_t> bytes, uint32_t) override {
       return handset_->FromHost(bytes) ? bytes.size() : 0;
     }
-    size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override { return handset_->ToHost(buffer); }
-    size_t InputWaiting() override { return 0; }
     bool gone() const override { return handset_->vanished() || handset_->appearances() != appearance_; }
     bool WaitReadable(uint32_t milliseconds) override { return handset_->WaitForOutput(milliseconds); }
     void Wake() override { handset_->Wake(); }
-    DeviceResult SetBaudRate(uint32_t) override { return {}; }
-    uint32_t BaudRate() const override { return 115200; }
-    DeviceResult SetDtr(bool) override { return {}; }
-    DeviceResult SetRts(bool) override { return {}; }
     void PurgeInput() override { handset_->DropOutput(); }
-    void PurgeBoth() override { handset_->DropOutput(); }
 
    private:
     const std::shared_ptr<State> state_;

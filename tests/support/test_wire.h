@@ -14,6 +14,7 @@
 #include <utility>
 #include <vector>
 
+#include "tests/support/fake_device.h"
 #include "tests/support/plain_codec.h"
 #include "transport/line/serial_port.h"
 
@@ -68,22 +69,15 @@ class TestWire {
   }
 
  private:
-  class Device final : public SerialDevice {
+  class Device final : public FakeDevice {
    public:
     explicit Device(TestWire& wire) : wire_(wire) {}
     size_t Write(std::span<const uint8_t> bytes, uint32_t) override { return wire_.Write(bytes); }
-    size_t OutputRoom() override { return 4096; }
     size_t Read(std::span<uint8_t> buffer) override { return wire_.Read(buffer); }
-    size_t InputWaiting() override { return 0; }
     bool gone() const override { return wire_.vanished_; }
     bool WaitReadable(uint32_t milliseconds) override { return wire_.WaitReadable(milliseconds); }
     void Wake() override { wire_.Wake(); }
-    DeviceResult SetBaudRate(uint32_t) override { return {}; }
-    uint32_t BaudRate() const override { return 115200; }
-    DeviceResult SetDtr(bool) override { return {}; }
-    DeviceResult SetRts(bool) override { return {}; }
     void PurgeInput() override { wire_.Purge(); }
-    void PurgeBoth() override { wire_.Purge(); }
 
    private:
     TestWire& wire_;
