@@ -16,7 +16,7 @@
 #include "kral/connection.h"
 #include "kral/log.h"
 #include "kral/transport.h"
-#include "platform/serial_device.h"
+#include "tests/support/fake_device.h"
 
 namespace {
 

@@ -16,6 +16,7 @@
 
 #include "download/boot/kivrat.h"
 #include "tests/support/fake_clock.h"
+#include "tests/support/fake_device.h"
 #include "tests/support/temp_folder.h"
 
 namespace {

@@ -1,11 +1,6 @@
 // The packet buffer: its limits, which are one byte short, and its reading from the end.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <functional>
-#include <vector>
-
 #include "base/diag_packet.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -35,22 +30,16 @@ TEST(DiagPacket, AppendsLittleEndian) {
   EXPECT_TRUE(std::ranges::equal(packet.request(), std::vector<uint8_t>{1, 2, 3, 4, 5, 6, 7, 8, 9}));
 }
 
-struct AppendLimit {
-  const char* name;
-  std::function<void(CDiagPacket&)> append;
-  size_t size;
-};
-
-const AppendLimit kAppendLimits[] = {
-    {"8 bits", [](CDiagPacket& p) { p.Append8(0); }, 1},
-    {"16 bits", [](CDiagPacket& p) { p.Append16(0); }, 2},
-    {"32 bits", [](CDiagPacket& p) { p.Append32(0); }, 4},
-    {"block", [](CDiagPacket& p) { p.AppendBlock(std::vector<uint8_t>(100)); }, 100},
-};
-
 TEST(DiagPacket, AppendThatWouldFillTheLastByteIsDropped) {
-  for (const auto& limit : kAppendLimits) {
-    SCOPED_TRACE(limit.name);
+  const struct {
+    size_t size;
+    std::function<void(CDiagPacket&)> append;
+  } kLimits[] = {{1, [](CDiagPacket& p) { p.Append8(0); }},
+                 {2, [](CDiagPacket& p) { p.Append16(0); }},
+                 {4, [](CDiagPacket& p) { p.Append32(0); }},
+                 {100, [](CDiagPacket& p) { p.AppendBlock(std::vector<uint8_t>(100)); }}};
+  for (const auto& limit : kLimits) {
+    SCOPED_TRACE(limit.size);
     const size_t full = CDiagPacket::kCapacity - limit.size;  // the append would end exactly at the capacity
     CDiagPacket packet;
     packet.AppendBlock(std::vector<uint8_t>(full));
@@ -77,32 +66,25 @@ class Answered : public testing::Test {
     for (uint8_t i = 0; i < 7; ++i) packet_.response_area()[i] = static_cast<uint8_t>(i + 1);
     packet_.set_response_length(7);
   }
+
   CDiagPacket packet_;
 };
 
-TEST_F(Answered, ReadsFromTheEndBackwardsAndBeginsThereAgainAfterTheFront) {
+TEST_F(Answered, ReadsFromTheEndBackwardsBeginsThereAgainAfterTheFrontAndNeverReadsMoreThanRemains) {
   uint8_t byte = 0;
   uint16_t word = 0;
-  uint32_t double_word = 0;
-  EXPECT_TRUE(packet_.Read8(byte));
-  EXPECT_EQ(byte, 7);
-  EXPECT_TRUE(packet_.Read16(word));
-  EXPECT_EQ(word, 0x0605);
-  EXPECT_TRUE(packet_.Read32(double_word));
-  EXPECT_EQ(double_word, 0x04030201u);
-  EXPECT_TRUE(packet_.Read8(byte));
-  EXPECT_EQ(byte, 7);
-}
-
-TEST_F(Answered, ReadOfMoreThanRemainsFailsAndLeavesTheOutput) {
-  uint32_t value = 0;
-  EXPECT_TRUE(packet_.Read32(value));
-  value = 0xDEADBEEF;
-  EXPECT_FALSE(packet_.Read32(value));  // 3 bytes remain
-  EXPECT_EQ(value, 0xDEADBEEF);
+  uint32_t double_word = 0xDEADBEEF;
+  EXPECT_TRUE(packet_.Read16(word) && packet_.Read16(word));
+  EXPECT_EQ(word, 0x0504);
+  EXPECT_FALSE(packet_.Read32(double_word));  // 3 bytes remain
+  EXPECT_EQ(double_word, 0xDEADBEEF);
   std::vector<uint8_t> rest(3);
   EXPECT_TRUE(packet_.ReadBlock(rest));
   EXPECT_EQ(rest, (std::vector<uint8_t>{1, 2, 3}));
+  EXPECT_TRUE(packet_.Read8(byte) && packet_.Read16(word) && packet_.Read32(double_word));
+  EXPECT_EQ(byte, 7);
+  EXPECT_EQ(word, 0x0605);
+  EXPECT_EQ(double_word, 0x04030201u);
 }
 
 TEST_F(Answered, FieldsBeyondTheReceivedLengthAreRefused) {

@@ -1,13 +1,9 @@
 // Into and out of factory test mode, at run time and for the next boot.
-#include <gtest/gtest.h>
-
 #include "tests/support/ftm_fixture.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
-
-using handset::ByteView;
-using handset::HexText;
 
 class ModeSwitchTest : public test::FtmTest {
  protected:

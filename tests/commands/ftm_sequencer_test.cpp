@@ -1,22 +1,14 @@
 // The sequencer's seam, driven by a double: queue mode, full queue, batch mode, sequencer commands.
 #include "commands/ftm/ftm_sequencer.h"
 
-#include <gtest/gtest.h>
-
-#include <array>
-#include <deque>
-#include <string>
-#include <vector>
-
 #include "commands/ftm_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "tests/support/ftm_fixture.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
-
-using handset::HexText;
 
 class FakeSequencer : public FtmSequencer {
  public:

@@ -1,23 +1,15 @@
 // Factory test mode: exact requests under both command codes, mode groups, mode switches, readings.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <array>
-#include <string>
-#include <vector>
-
 #include "commands/ftm_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "tests/support/ftm_command_rows.h"
 #include "tests/support/ftm_fixture.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using handset::ByteView;
-using handset::HexText;
 using test::FtmCommandRow;
 using test::FtmTest;
 using test::Hex16;
@@ -63,7 +55,6 @@ TEST_F(FtmTest, EveryCommandIsListedAndSendsItsExactRequestUnderBothCodes) {
     const size_t traffic = Traffic();
     EXPECT_EQ(row.function(handle(), nullptr, 1, response.data(), &size), 0);
     EXPECT_EQ(row.function(handle(), payload.data(), payload.size(), nullptr, &size), 0);
-    EXPECT_EQ(row.function(0, payload.data(), payload.size(), response.data(), &size), 0);
     EXPECT_EQ(size, response.size());
     EXPECT_EQ(response[0], 0xCC);
     uint16_t no_room = 0;
@@ -101,7 +92,6 @@ TEST_F(FtmTest, CommandsWithArgumentsOfTheirOwnSendTheirExactRequests) {
     EXPECT_EQ(LastRequest(), row.request59);
     handset().Expect("3B ...").Reply("18 3B");
     EXPECT_EQ(row.call(handle()), 0);
-    EXPECT_EQ(row.call(0), 0);
   }
 }
 
@@ -181,8 +171,6 @@ TEST_F(FtmTest, SettingsAreKeptPerHandleAndSendNothing) {
   EXPECT_EQ(KRAL_FTM_SET_MODE_ID(handle(), 0xFFFE), 1);
   EXPECT_EQ(ModeId(), 0xFFFE);
   EXPECT_EQ(Traffic(), traffic);
-  EXPECT_EQ(KRAL_FTM_SET_MODE_ID(0, 1), 0);
-  EXPECT_EQ(KRAL_FTM_GET_MODE_ID(0, &value), 0);
 }
 
 TEST_F(FtmTest, ModeIdsAreLoggedWithTheirNames) {

@@ -6,12 +6,12 @@
 #include "kral/nv.h"
 #include "kral/transport.h"
 #include "tests/support/handset_connection.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::Lag;
-using handset::When;
 
 // Longer than the time-out of the request that is answered late, shorter than that of the one behind it.
 constexpr uint32_t kLateMs = 60;

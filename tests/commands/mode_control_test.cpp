@@ -1,10 +1,7 @@
 // Switching the operating mode: the delays, the read-back, and the line each leaves in the log.
-#include <gtest/gtest.h>
-
-#include <string>
-
 #include "kral/kral.h"
 #include "tests/support/handset_connection.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -1,12 +1,9 @@
 // What the exports tell of image files, and conversions between them.
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <string>
-
 #include "kral/download.h"
+#include "tests/support/failures.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -55,12 +52,11 @@ TEST_F(ImageFiles, GoToHexAndBackWithTheirGaps) {
   EXPECT_EQ(info_.size[0], bytes.size());
 }
 
-TEST_F(ImageFiles, SecondRegionIsToldAndFitsIntoNoBinary) {
+TEST_F(ImageFiles, SecondRegionIsTold) {
   const auto file = folder_.Add("two.hex", test::kTwoRegionsHex);
   ASSERT_EQ(Info(file), 0u);
   EXPECT_EQ(info_.base[1], 0x08000000u);
   EXPECT_EQ(info_.size[1], 1u);
-  EXPECT_EQ(Convert(file, folder_.Path("two.bin"), KRAL_HEX_TO_BINARY), KRAL_STREAM_BAD_IMAGE);
 }
 
 TEST_F(ImageFiles, ThatWouldLoseDataAreRefusedWithTheLineOfTheFirstLoss) {
@@ -115,38 +111,73 @@ TEST_F(ImageFiles, ThatWouldLoseDataAreRefusedWithTheLineOfTheFirstLoss) {
 }
 
 TEST_F(ImageFiles, EndWhereTheAddressesEnd) {
-  const auto output = folder_.Path("output");
   uint32_t base = 0xFFFF0000;
-  EXPECT_EQ(Convert(folder_.Add("over", std::string(0x10001, 'x')), output, KRAL_HEX_FROM_BINARY, &base),
-            KRAL_STREAM_PAST_END);
-  EXPECT_FALSE(std::filesystem::exists(output));
-  EXPECT_EQ(Convert(folder_.Add("full", std::string(0x10000, 'x')), output, KRAL_HEX_FROM_BINARY, &base), 0u);
+  const auto full = folder_.Add("full", std::string(0x10000, 'x'));
+  EXPECT_EQ(Convert(full, folder_.Path("output"), KRAL_HEX_FROM_BINARY, &base), 0u);
   // Without a record that tells the base, it is the last address: the image would go on from 0.
   const auto baseless = folder_.Add(
       "baseless.hex", test::HexRecord("020000040000") + test::HexRecord("0400000500000000") +
                           test::HexRecord("020000005555") + test::HexRecord("0100020055") + ":00000001FF\n");
   EXPECT_EQ(Info(baseless), KRAL_STREAM_PAST_END);
-  const auto large = folder_.Add("large", "x");
-  std::filesystem::resize_file(large, uint64_t{5} << 30);
-  EXPECT_EQ(Info(large), KRAL_STREAM_FILE_TOO_LARGE);
 }
 
-TEST_F(ImageFiles, FailuresHaveTheirResultsAndLeaveTheOutputAlone) {
-  const auto good = folder_.Add("good.bin", "abc");
+TEST_F(ImageFiles, FailuresHaveTheirResultsNameFileAndLineAndLeaveTheOutputAlone) {
   const auto broken = folder_.Add("broken.hex", test::kBrokenHex);
+  const auto dropped = folder_.Add("dropped.hex", test::kDroppedHex);
+  const std::string head = ":020000040002F8\n:0100000055AA\n";
+  const auto endless = folder_.Add("endless.hex", head);
+  const auto far = folder_.Add("far.hex", head + test::HexRecord("02000004F000") + test::HexRecord("0100000055"));
+  const auto glued = folder_.Add("glued.hex", ":020000040002F8\n:0100000055AA:0100010055A9\n:00000001FF\n");
+  const auto two = folder_.Add("two.hex", test::kTwoRegionsHex);
+  const auto binary = folder_.Add("image.bin", std::string(0x10001, 'x'));
+  const auto empty = folder_.Add("empty.bin", "");
+  const auto large = folder_.Add("large.bin", "");
+  std::filesystem::resize_file(large, uint64_t{5} << 30);
+  const auto missing = folder_.Path("missing.bin");
+  const auto nowhere = folder_.Path("no/folder");
   const auto output = folder_.Add("output", "as it was");
-  uint32_t odd_base = 0x8000;
-  EXPECT_EQ(Convert(good, output, KRAL_HEX_FROM_BINARY, &odd_base), KRAL_STREAM_BAD_ARGUMENT);
-  EXPECT_EQ(Convert(good, output, 2), KRAL_STREAM_BAD_ARGUMENT);
-  EXPECT_EQ(Convert(broken, output, KRAL_HEX_TO_BINARY), KRAL_STREAM_FILE_NOT_DECODED);
-  EXPECT_EQ(Convert(folder_.Path("missing"), output, KRAL_HEX_TO_BINARY), KRAL_STREAM_FILE_NOT_OPENED);
-  EXPECT_EQ(Convert(folder_.Add("empty", ""), output, KRAL_HEX_FROM_BINARY), KRAL_STREAM_FILE_NOT_OPENED);
-  EXPECT_EQ(Convert(good, folder_.Path("no/such/folder"), KRAL_HEX_FROM_BINARY), KRAL_HEX_NOT_WRITTEN);
-  EXPECT_EQ(folder_.Content("output"), "as it was");
-  EXPECT_EQ(Info(broken), KRAL_STREAM_FILE_NOT_DECODED);
-  EXPECT_EQ(Info(good, 9), KRAL_STREAM_BAD_ARGUMENT);
-  EXPECT_EQ(KRAL_IMAGE_GetInfo(nullptr, 0, &info_, nullptr), 0);
+  const auto info = [this](const std::string& file, uint32_t result, uint32_t format = KRAL_IMAGE_FORMAT_BY_CONTENT) {
+    return [=, this] { return Info(file, format) != result; };
+  };
+  const auto convert = [this](const std::string& input, const std::string& target, uint32_t direction, uint32_t result,
+                              uint32_t base = 0) {
+    return [=, this]() mutable { return Convert(input, target, direction, &base) != result; };
+  };
+  const auto find_loss = [](const char* file) {
+    uint32_t line = 0;
+    return KRAL_HEX_FindLoss(file, &line, nullptr, nullptr);
+  };
+  const std::string bad_file = "KRAL_IMAGE_GetInfo BAD_FILE";
+  test::ExpectFailures(
+      0,
+      {{"KRAL_IMAGE_GetInfo ARGUMENT", "file", [] { return KRAL_IMAGE_GetInfo(nullptr, 0, nullptr, nullptr); }},
+       {"KRAL_IMAGE_GetInfo ARGUMENT", "no image format 9", info(binary, KRAL_STREAM_BAD_ARGUMENT, 9)},
+       {bad_file, "missing.bin cannot be opened", info(missing, KRAL_STREAM_FILE_NOT_OPENED)},
+       {bad_file, "cannot be opened", info(missing, KRAL_STREAM_FILE_NOT_OPENED, KRAL_IMAGE_FORMAT_HEX)},
+       {bad_file, "empty.bin is empty", info(empty, KRAL_STREAM_FILE_NOT_OPENED)},
+       {bad_file, "no Intel HEX record", info(empty, KRAL_STREAM_FILE_NOT_DECODED, KRAL_IMAGE_FORMAT_HEX)},
+       {bad_file, "large.bin has 4 GiB or more", info(large, KRAL_STREAM_FILE_TOO_LARGE)},
+       {bad_file + " line 2", "holds no sound Intel HEX record", info(broken, KRAL_STREAM_FILE_NOT_DECODED)},
+       {bad_file + " line 2", "no end-of-file record", info(endless, KRAL_STREAM_FILE_NOT_DECODED)},
+       {bad_file + " line 4", "lie outside of the image", info(far, KRAL_STREAM_FILE_NOT_DECODED)},
+       {bad_file + " line 2", "have no place in the image", info(glued, KRAL_STREAM_DATA_LOST)},
+       {bad_file + " line 1", "have no place in the image", info(dropped, KRAL_STREAM_DATA_LOST)},
+       {"KRAL_HEX_FindLoss BAD_FILE line 2", "broken.hex", [&] { return find_loss(broken.c_str()); }},
+       {"KRAL_HEX_FindLoss ARGUMENT", "file", [&] { return find_loss(nullptr); }},
+       {"KRAL_HEX_Convert BAD_FILE", "second region", convert(two, output, KRAL_HEX_TO_BINARY, KRAL_STREAM_BAD_IMAGE)},
+       {"KRAL_HEX_Convert BAD_FILE line 2", "broken.hex",
+        convert(broken, output, KRAL_HEX_TO_BINARY, KRAL_STREAM_FILE_NOT_DECODED)},
+       {"KRAL_HEX_Convert BAD_FILE", "missing.bin",
+        convert(missing, output, KRAL_HEX_TO_BINARY, KRAL_STREAM_FILE_NOT_OPENED)},
+       {"KRAL_HEX_Convert ARGUMENT", "0x00000100",
+        convert(binary, output, KRAL_HEX_FROM_BINARY, KRAL_STREAM_BAD_ARGUMENT, 0x100)},
+       {"KRAL_HEX_Convert ARGUMENT", "past address 0xFFFFFFFF",
+        convert(binary, output, KRAL_HEX_FROM_BINARY, KRAL_STREAM_PAST_END, 0xFFFF0000)},
+       {"KRAL_HEX_Convert ARGUMENT", "direction", convert(binary, output, 2, KRAL_STREAM_BAD_ARGUMENT)},
+       {"KRAL_HEX_Convert BAD_FILE", "cannot be written",
+        convert(binary, nowhere, KRAL_HEX_FROM_BINARY, KRAL_HEX_NOT_WRITTEN), true}});
   EXPECT_EQ(KRAL_HEX_Convert(nullptr, nullptr, 0, nullptr, nullptr), 0);
+  EXPECT_EQ(folder_.Content("output"), "as it was");
 }
 
 }  // namespace

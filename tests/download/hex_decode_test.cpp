@@ -1,12 +1,10 @@
 // Intel HEX into an image: every oddity of the reader, and every way a file can be broken.
-#include <gtest/gtest.h>
-
 #include <cstdio>
-#include <string>
 
 #include "download/images/hex_phone_image_decoder.h"
 #include "download/images/phone_image_dpaged.h"
 #include "tests/support/hex_files.h"
+#include "tests/support/test.h"
 
 namespace kral::images {
 namespace {

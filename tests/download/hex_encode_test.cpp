@@ -1,15 +1,10 @@
 // An image out as Intel HEX: the exact text, with the limits and shortcuts of the writer.
-#include <gtest/gtest.h>
-
-#include <string>
-#include <utility>
-#include <vector>
-
 #include "download/images/hex_phone_image_decoder.h"
 #include "download/images/phone_image_binary.h"
 #include "download/images/phone_image_dpaged.h"
 #include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::images {
 namespace {

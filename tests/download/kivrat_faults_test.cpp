@@ -1,22 +1,18 @@
 // Every fault of the line at every packet of a boot transfer, against the boot loader of the virtual handset: the
 // programmer runs, byte for byte, or the call failed and the next one works.
-#include <gtest/gtest.h>
-
-#include <array>
-
 #include "download/boot/kivrat.h"
 #include "handset/caller_transport.h"
 #include "handset/loaders/boot_loader.h"
 #include "handset/virtual_handset.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::BootLoader;
 using handset::Bytes;
-using handset::Fault;
 
 enum class Harm { kPasses, kFails, kEither };
 

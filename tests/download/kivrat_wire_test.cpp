@@ -1,20 +1,19 @@
 // The boot transfer byte by byte: what goes over the port, what the log says, and what is made of every wrong answer.
 #include "download/boot/kivrat.h"
 
-#include <gtest/gtest.h>
-
 #include "handset/line/bytes.h"
+#include "kral/download.h"
+#include "kral/kivrat.h"
 #include "tests/support/boot_wire.h"
+#include "tests/support/failures.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using handset::FromHex;
-using handset::HexText;
-using test::Bytes;
-
+using handset::Bytes;
 using Texts = std::vector<std::string>;
 
 // Hello of version 2: longest command 1,024, mode image transfer, six reserved words.
@@ -162,56 +161,67 @@ TEST_F(KivratWire, IdentityDataThatComeLateAreNotTakenForTheHello) {
   EXPECT_EQ(identity, 0x008140E1u);
 }
 
+// What the target says, the line and the record that it leaves, and how often the host has written by then.
+struct WrongAnswer {
+  Texts says;
+  std::string line;
+  std::string record;  // behind the function's name
+  std::string text;
+  size_t written;
+};
+
 TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheConnect) {
   const std::string read_failed = "Failed to read the Port buffer\n";
   const std::string no_hello = "The packet recieved from the device is not a HELLO_REQ";
+  const std::string no_answer = "The packet received from the device is not an execute response";
+  const std::string not_ready = "The command mode is not ready \r \n";
   std::string long_hello = kHello;
   long_hello.replace(4 * 3, 2, "31");
-  struct Row {
-    const char* name;
-    Texts says;
-    std::string line;
+  const std::string execute = ExecuteResponse("18");
+  const WrongAnswer rows[] = {
+      {{""}, read_failed, "NO_ANSWER", "hello of the boot loader did not come", 0},
+      {{kHello.substr(0, 40 * 3)}, read_failed, "LINK", "40 of 48 bytes", 0},
+      {{"07" + kHello.substr(2)}, no_hello, "LINK LOADER 7", "instead of a hello", 0},
+      {{long_hello}, no_hello, "LINK LOADER 1", "", 0},
+      {{kHello}, not_ready, "NO_ANSWER", "", 1},
+      {{kHello, "0A" + kReady.substr(2)}, not_ready, "LINK LOADER 10", "instead of its readiness", 1},
+      {{kHello, kReady}, read_failed, "NO_ANSWER", "", 2},
+      {{kHello, kReady, "0D" + execute.substr(2)}, no_answer, "LINK LOADER 13", "", 2},
+      {{kHello, kReady, execute}, read_failed, "NO_ANSWER", "chip identity", 3},
+      {{kHello, kReady, execute, kIdentity}, read_failed, "NO_ANSWER", "hello", 4},
+      {{kHello, kReady, execute, kIdentity, "02" + kHello.substr(2)}, no_hello, "LINK LOADER 2", "", 4},
   };
-  for (const Row& row : {
-           Row{"silence", {""}, read_failed},
-           Row{"half a hello", {kHello.substr(0, 40 * 3)}, read_failed},
-           Row{"another command", {"07" + kHello.substr(2)}, no_hello},
-           Row{"a hello of another length", {long_hello}, no_hello},
-           Row{"silence behind the response", {kHello}, "The command mode is not ready \r \n"},
-           Row{"not ready", {kHello, "0A" + kReady.substr(2)}, "The command mode is not ready \r \n"},
-           Row{"silence behind the command", {kHello, kReady}, read_failed},
-           Row{"another answer to the command",
-               {kHello, kReady, "0D" + ExecuteResponse("18").substr(2)},
-               "The packet received from the device is not an execute response"},
-           Row{"no identity", {kHello, kReady, ExecuteResponse("18")}, read_failed},
-           Row{"no second hello", {kHello, kReady, ExecuteResponse("18"), kIdentity}, read_failed},
-           Row{"another second hello",
-               {kHello, kReady, ExecuteResponse("18"), kIdentity, "02" + kHello.substr(2)},
-               no_hello},
-       }) {
-    SCOPED_TRACE(row.name);
-    Target(row.says);
+  for (const WrongAnswer& row : rows) {
     uint32_t version = 77;
-    std::optional<uint32_t> identity;
-    EXPECT_FALSE(kivrat::Connect(*phone_, version, &identity));
-    EXPECT_EQ(version, 77u);
-    EXPECT_TRUE(HasError(row.line));
-    EXPECT_LE(Written().size(), row.says.size()) << "nothing is sent again";
+    uint32_t identity = 77;
+    const auto connect = [&] {
+      Target(row.says);
+      return KRAL_Kivrat_Connect(handle_, &version, &identity);
+    };
+    test::ExpectFailures(handle_, {{"KRAL_Kivrat_Connect " + row.record, row.text, connect}});
+    EXPECT_EQ(version + identity, 77u + 77u);
+    EXPECT_TRUE(HasError(row.line)) << row.line;
+    EXPECT_EQ(Written().size(), row.written) << "nothing is sent again";
     EXPECT_FALSE(phone_->port_borrowed());
   }
 }
 
 TEST_F(KivratWire, FailedWritesAreToldOfTheirPacket) {
-  Target({kHello});
+  const auto connect = [this] {
+    Target({kHello});
+    return KRAL_Kivrat_Connect(handle_, nullptr, nullptr);
+  };
+  const auto serve = [this](const std::string& says) {
+    Target({says});
+    return KRAL_Kivrat_DownloadFlashProgrammer(handle_, folder_.Add("file", "abcdef").c_str());
+  };
   wire_.FailWrites(true);
-  uint32_t version = 0;
-  EXPECT_FALSE(kivrat::Connect(*phone_, version, nullptr));
+  test::ExpectFailures(handle_, {{"KRAL_Kivrat_Connect LINK", "answer to the hello could not be written", connect}});
   EXPECT_TRUE(HasError("Failed to write to the KIVRAT_HELLO_RSP from the host to the Device"));
-  Target({ReadRequest(0, 4)});
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+  test::ExpectFailures(handle_, {{"KRAL_Kivrat_DownloadFlashProgrammer LINK offset 0", "could not be written",
+                                  [&] { return serve(ReadRequest(0, 4)); }}});
   EXPECT_TRUE(HasError("Failed to send the command from the host to the device \r \n"));
-  Target({kEnd});
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
+  EXPECT_EQ(serve(kEnd), 0);
   EXPECT_TRUE(HasError("Failed to send the KIVRAT_DONE_REQ (command -> 5) as expected \r\n"));
 }
 
@@ -267,46 +277,45 @@ TEST_F(KivratWire, PacketsMayBeLongerThanTheirFieldsUpToTheBuffer) {
 
 TEST_F(KivratWire, EveryWrongOrMissingAnswerEndsTheTransfer) {
   const std::string read_failed = "Failed to read the command from the opened port \r \n";
+  const std::string no_answer = "Failed to recieve the KIVRAT_DONE_RSP as expected \r\n";
   const auto header = [](uint32_t command, uint32_t length) {
     return HexText(handset::ByteWriter().U32(command).U32(length).Take());
   };
-  struct Row {
-    const char* name;
-    Texts says;
-    std::string line;
-    size_t written;
+  const WrongAnswer rows[] = {
+      {{""}, read_failed, "NO_ANSWER", "next request", 0},
+      {{"03 00 00 00"}, read_failed, "LINK", "4 of 8 bytes", 0},
+      {{ReadRequest(0, 4).substr(0, 19 * 3)}, read_failed, "LINK", "", 0},
+      {{header(4, 7)}, read_failed, "LINK", "7 bytes", 0},
+      {{header(4, 131073)}, read_failed, "LINK", "131073 bytes", 0},
+      {{header(3, 0xFFFFFFFF)}, read_failed, "LINK", "", 0},
+      {{header(3, 8)}, "Kivrat: a request for 0 bytes", "LINK", "", 0},
+      {{ReadRequest(0, 131073)}, "Kivrat: a request for 131073 bytes", "LINK", "131073 bytes", 0},
+      {{ReadRequest(0, 6), ReadRequest(6, 1)},
+       "Kivrat: the file has no more than 6 bytes, 1 are asked for at 6",
+       "BAD_FILE offset 6",
+       "after 6 bytes",
+       1},
+      {{ReadRequest(0, 2), header(7, 8)},
+       "Recieved 7 instead of KIVRAT_END_TRANSFER (command -> 4) \r\n",
+       "LINK LOADER 7",
+       "packet 7",
+       1},
+      {{kEnd}, no_answer, "NO_ANSWER", "answer to the end", 1},
+      {{kEnd, "05" + kDoneResponse.substr(2)},
+       "Recieved 5 instead of KIVRAT_DONE_RSP (command -> 6) \r\n",
+       "LINK LOADER 5",
+       "packet 5",
+       1},
+      {{kEnd, "06 00 00 00 0D 00 00 00 00 00 00 00"}, "Kivrat: a packet of 13 bytes", "LINK", "13 bytes", 1},
   };
-  for (const Row& row : {
-           Row{"silence", {""}, read_failed, 0},
-           Row{"half a header", {"03 00 00 00"}, read_failed, 0},
-           Row{"a packet cut short", {ReadRequest(0, 4).substr(0, 19 * 3)}, read_failed, 0},
-           Row{"a length below the header", {header(4, 7)}, read_failed, 0},
-           Row{"a length over the buffer", {header(4, 131073)}, read_failed, 0},
-           Row{"a length of all ones", {header(3, 0xFFFFFFFF)}, read_failed, 0},
-           Row{"a request without its fields", {header(3, 8)}, "Kivrat: a request for 0 bytes", 0},
-           Row{"a request over the buffer", {ReadRequest(0, 131073)}, "Kivrat: a request for 131073 bytes", 0},
-           Row{"a request behind the end",
-               {ReadRequest(0, 6), ReadRequest(6, 1)},
-               "Kivrat: the file has no more than 6 bytes, 1 are asked for at 6",
-               1},
-           Row{"another command",
-               {ReadRequest(0, 2), header(7, 8)},
-               "Recieved 7 instead of KIVRAT_END_TRANSFER (command -> 4) \r\n",
-               1},
-           Row{"silence behind done", {kEnd}, "Failed to recieve the KIVRAT_DONE_RSP as expected \r\n", 1},
-           Row{"another answer to done",
-               {kEnd, "05" + kDoneResponse.substr(2)},
-               "Recieved 5 instead of KIVRAT_DONE_RSP (command -> 6) \r\n",
-               1},
-           Row{"a done response of another length",
-               {kEnd, "06 00 00 00 0D 00 00 00 00 00 00 00"},
-               "Kivrat: a packet of 13 bytes",
-               1},
-       }) {
-    SCOPED_TRACE(row.name);
-    Target(row.says);
-    EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef")));
-    EXPECT_TRUE(HasError(row.line));
+  const auto file = folder_.Add("file", "abcdef");
+  for (const WrongAnswer& row : rows) {
+    const auto serve = [&] {
+      Target(row.says);
+      return KRAL_Kivrat_DownloadFlashProgrammer(handle_, file.c_str());
+    };
+    test::ExpectFailures(handle_, {{"KRAL_Kivrat_DownloadFlashProgrammer " + row.record, row.text, serve}});
+    EXPECT_TRUE(HasError(row.line)) << row.line;
     EXPECT_EQ(Written().size(), row.written);
     EXPECT_FALSE(phone_->port_borrowed());
   }
@@ -330,22 +339,32 @@ TEST_F(KivratWire, RequestsForNothingGetNothingAndMayNotGoOnForEver) {
 }
 
 TEST_F(KivratWire, TransferNeedsAConnectAndAFile) {
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abc")));
+  const std::string name = "KRAL_Kivrat_DownloadFlashProgrammer";
+  const auto serve = [this](const std::string& file) {
+    return [=, this] { return KRAL_Kivrat_DownloadFlashProgrammer(handle_, file.c_str()); };
+  };
+  const auto file = folder_.Add("file", "abc");
+  test::ExpectFailures(handle_, {{name + " ARGUMENT", "no boot loader", serve(file)}});
   EXPECT_TRUE(HasError("Failed KivratInit()"));
   Target({""});
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("missing")));
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("")));
+  test::ExpectFailures(handle_, {{name + " BAD_FILE", "missing cannot be opened", serve(folder_.Path("missing"))},
+                                 {name + " BAD_FILE", "", serve(folder_.Path(""))}});
   EXPECT_EQ(Lines("16").size(), 2u);
   // Nothing has happened to the target, which takes the right file now.
   EXPECT_TRUE(phone_->port_borrowed());
   Target({ReadRequest(0, 3), kEnd, kDoneResponse});
-  EXPECT_TRUE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Path("file")));
+  EXPECT_EQ(serve(file)(), 1);
 }
 
 TEST_F(KivratWire, CallerEndsTheTransferBetweenTwoPieces) {
   Target({ReadRequest(0, 2), ReadRequest(2, 2)});
-  EXPECT_FALSE(kivrat::DownloadFlashProgrammer(*phone_, folder_.Add("file", "abcdef"),
-                                               [](uint64_t done, uint64_t) { return done < 4; }));
+  const auto file = folder_.Add("file", "abcdef");
+  const auto abort = [](KRAL_HANDLE handle, uint32_t done, uint32_t, uintptr_t) {
+    if (done >= 4) KRAL_AbortDownload(handle);
+  };
+  KRAL_ConfigureDownloadCallBack(handle_, abort, 0);
+  test::ExpectFailures(handle_, {{"KRAL_Kivrat_DownloadFlashProgrammer ABORTED", "aborted",
+                                  [&] { return KRAL_Kivrat_DownloadFlashProgrammer(handle_, file.c_str()); }}});
   EXPECT_TRUE(HasError("Kivrat: the transfer was aborted"));
   EXPECT_EQ(Written(), (Texts{"61 62", "63 64"}));
 }

@@ -1,17 +1,14 @@
 // The loader stage: requests byte for byte, and loading a flash programmer with all that can go wrong.
-#include <gtest/gtest.h>
-
-#include <string>
-
 #include "download/kova/kova.h"
 #include "tests/support/download_fixture.h"
+#include "tests/support/failures.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using handset::When;
 using test::DownloadTest;
 
 // 32 bytes from 0x00020000 on, started there.
@@ -57,8 +54,6 @@ TEST_F(Kova, RequestsByteForByte) {
     EXPECT_EQ(row.call(), 0) << row.line;
   }
   EXPECT_EQ(version, 0x5A);
-  handset().Expect("0C").Reply("0D");
-  EXPECT_EQ(KRAL_KOVA_SW_VERSION(handle(), &version), 0) << "no version in it";
 
   handset().Expect("0F 00 02 00 00 00 10 00 01 02 03 04 05 06 07 08 09 0A 0B 0C 0D 0E 0F").Reply("02");
   handset().Expect("0F 00 02 00 10 00 10 10 11 12 13 14 15 16 17 18 19 1A 1B 1C 1D 1E 1F").Reply("02");
@@ -85,36 +80,53 @@ TEST_F(Kova, ResetLeadsBackToDiagnosticMode) {
   EXPECT_EQ(KRAL_IsPhoneConnected(handle()), 1);
 }
 
-TEST_F(Kova, EveryFailureHasItsResult) {
+TEST_F(Kova, EveryFailureHasItsResultAndSaysWhy) {
+  constexpr uint8_t kOther = 13;  // the code of no reply here
   const auto good = folder_.Add("p.hex", kProgrammer);
   std::string no_start = kProgrammer;
   no_start.erase(no_start.find(":04000005"), 20);
   const auto startless = folder_.Add("startless.hex", no_start);
   const auto broken = folder_.Add("broken.hex", test::kBrokenHex);
+  const auto dropped = folder_.Add("dropped.hex", test::kDroppedHex);
   std::string far = test::kTwoRegionsHex;
   far.replace(far.find("0800F2"), 6, "0009F1");  // beyond 500 KiB
   const auto large = folder_.Add("large.hex", far);
+  const auto missing = folder_.Path("missing");
+  const auto load = [this](const std::string& file, uint32_t result, uint32_t packet = 32) {
+    return [=, this] { return Load(file, packet) != result; };
+  };
+  const auto other_at = [&](uint64_t nth, uint32_t result) {
+    return [&, nth, result] { return Struck(handset::WrongCode(kOther), When::Nth(nth), load(good, result)); };
+  };
+  const auto silent = [this](const std::function<uint8_t()>& call) {
+    return [=, this] { return Silent(When::Nth(1), call); };
+  };
+  const auto nop = [this] { return KRAL_KOVA_NOP(handle()); };
+  const auto version = [this] { return KRAL_KOVA_SW_VERSION(handle(), nullptr); };
+  const std::string name = "KRAL_KOVA_LoadFlashProgrammer";
+  handset().Expect("0C").Reply("0D");
+  test::ExpectFailures(handle(), {{"KRAL_KOVA_SW_VERSION LINK", "no version", version}});
   StartLoader();
-  EXPECT_EQ(Load(folder_.Path("missing")), KRAL_KOVA_FILE_NOT_OPENED);
-  EXPECT_EQ(Load(broken), KRAL_KOVA_FILE_NOT_DECODED);
-  EXPECT_EQ(Load(large), KRAL_KOVA_FILE_NOT_DECODED);
-  EXPECT_EQ(Load(folder_.Add("dropped.hex", test::kDroppedHex)), KRAL_KOVA_DATA_LOST) << "and is not started";
-  EXPECT_TRUE(HasLine(KRAL_LOG_ERR, folder_.Path("dropped.hex") + ": line 1 holds data that have no place in the "
-                                                                  "image, 5 bytes are lost in all"));
-  EXPECT_EQ(KRAL_KOVA_LoadFlashProgrammer(handle(), nullptr, 32, nullptr), 0);
+  test::ExpectFailures(handle(),
+                       {{name + " ARGUMENT", "no file name",
+                         [this] { return KRAL_KOVA_LoadFlashProgrammer(handle(), nullptr, 32, nullptr); }},
+                        {name + " BAD_FILE", "missing cannot be opened", load(missing, KRAL_KOVA_FILE_NOT_OPENED)},
+                        {name + " BAD_FILE line 2", "line 2", load(broken, KRAL_KOVA_FILE_NOT_DECODED)},
+                        {name + " BAD_FILE line 4", "large.hex", load(large, KRAL_KOVA_FILE_NOT_DECODED)},
+                        {name + " BAD_FILE line 1", "line 1", load(dropped, KRAL_KOVA_DATA_LOST)}});
+  EXPECT_TRUE(
+      HasLine(KRAL_LOG_ERR, dropped + ": line 1 holds data that have no place in the image, 5 bytes are lost in all"));
   EXPECT_EQ(handset().loader().packets().size(), 0u) << "nothing was sent";
-
-  EXPECT_EQ(Load(startless), KRAL_KOVA_WRITE_FAILED) << "it starts nowhere";
-  EXPECT_EQ(Load(good, 1), KRAL_KOVA_WRITE_FAILED) << "packets that carry nothing";
+  test::ExpectFailures(handle(),
+                       {{name + " BAD_FILE", "0xFFFFFFFF", load(startless, KRAL_KOVA_WRITE_FAILED)},
+                        {name + " ARGUMENT", "packets", load(good, KRAL_KOVA_WRITE_FAILED, 1)},
+                        {name + " ABORTED", "aborted", [&] { return Aborted(load(good, KRAL_DOWNLOAD_ABORTED)); }},
+                        {name + " LINK REPLY 13", "command 15", other_at(2, KRAL_KOVA_WRITE_FAILED)},
+                        {name + " LINK REPLY 13", "command 5", other_at(3, KRAL_KOVA_GO_FAILED)},
+                        {name + " NO_ANSWER", "command 15", silent(load(good, KRAL_KOVA_WRITE_FAILED))},
+                        {"KRAL_KOVA_NOP NO_ANSWER", "command 6", silent(nop)},
+                        {"KRAL_KOVA_SW_VERSION NO_ANSWER", "command 12", silent(version)}});
   EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "image load failed"));
-  handset().faults().Add(handset::WrongCode(3), When::Nth(2));
-  EXPECT_EQ(Load(good), KRAL_KOVA_WRITE_FAILED);
-  KRAL_ConfigureTimeOut(handle(), 0, 30);
-  handset().faults().Add(handset::Lose(), When::Nth(1));
-  EXPECT_EQ(Load(good), KRAL_KOVA_WRITE_FAILED);
-  KRAL_ConfigureTimeOut(handle(), 0, 4000);
-  handset().faults().Add(handset::WrongCode(3), When::Nth(3));
-  EXPECT_EQ(Load(good), KRAL_KOVA_GO_FAILED);
   EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "GO failed"));
 }
 

@@ -1,16 +1,11 @@
 // The four kinds of image: bounds, regions, and what costs memory.
-#include <gtest/gtest.h>
-
-#include <cstdint>
-#include <functional>
-#include <string>
 #include <typeinfo>
-#include <vector>
 
 #include "download/images/phone_image_binary.h"
 #include "download/images/phone_image_dpaged.h"
 #include "download/images/phone_image_raw.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::images {
 namespace {

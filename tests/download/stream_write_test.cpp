@@ -1,23 +1,16 @@
 // Whole images into the flash of the virtual handset, through every kind of trouble with the acknowledgements. What
 // always holds: flash equals the image, or the call has failed.
-#include <gtest/gtest.h>
-
-#include <atomic>
-#include <functional>
-#include <string>
-#include <thread>
-#include <vector>
-
 #include "download/stream/image_write_cmd.h"
 #include "tests/support/download_fixture.h"
+#include "tests/support/failures.h"
 #include "tests/support/hex_files.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::ProgrammerSettings;
-using handset::When;
 using test::DownloadTest;
 
 constexpr uint8_t kWrite = 0x07;
@@ -64,7 +57,6 @@ TEST_F(StreamWrite, ImagesEndWhereTheAddressesEnd) {
   StartProgrammer();
   const auto bytes = RandomBytes(300);
   EXPECT_EQ(WriteMem(bytes, 0xFFFFFFFF - 298), KRAL_STREAM_PAST_END) << "its last byte would be written to 0";
-  EXPECT_EQ(handset().programmer().images().size(), 0u);
   EXPECT_EQ(WriteMem(bytes, 0xFFFFFFFF - 299), KRAL_STREAM_WRITTEN) << ErrorText();
   ExpectInFlash(bytes, 0xFFFFFFFF - 299);
 }
@@ -211,39 +203,104 @@ TEST_F(StreamWrite, ProgressRisesFromNothingToEverythingAndAnAbortEndsIt) {
   KRAL_ConfigureDownloadCallBack(handle(), nullptr, 0);
 }
 
-TEST_F(StreamWrite, FilesOfBothFormatsAndWhatIsWrongWithThem) {
-  test::TempFolder folder;
+class StreamFiles : public StreamWrite {
+ protected:
+  uint8_t Write(const std::string& file, uint32_t result, uint32_t format = KRAL_IMAGE_FORMAT_BY_CONTENT,
+                uint8_t method = KRAL_STREAM_MULTI_IMAGE, uint32_t block_size = 1000, const char* header = nullptr) {
+    uint32_t told = UINT32_MAX;
+    const uint8_t written =
+        KRAL_STREAM_WriteImageFile(handle(), file.c_str(), format, 5, header, method, block_size, 4, &told);
+    EXPECT_EQ(told, result);
+    return written;
+  }
+
+  test::TempFolder folder_;
+};
+
+TEST_F(StreamFiles, MayBeOfBothFormats) {
   const auto bytes = RandomBytes(5000);
-  const auto binary = folder.Add("image.bin", std::string(bytes.begin(), bytes.end()));
-  const auto hex = folder.Path("image.hex");
+  const auto binary = folder_.Add("image.bin", std::string(bytes.begin(), bytes.end()));
+  const auto hex = folder_.Path("image.hex");
   uint32_t base = 0x30000;
   ASSERT_EQ(KRAL_HEX_Convert(binary.c_str(), hex.c_str(), KRAL_HEX_FROM_BINARY, &base, nullptr), 1);
-  const auto header = folder.Add("header", "head");
+  const auto header = folder_.Add("header", "head");
   StartProgrammer();
-  const auto write = [&](const std::string& file, uint32_t format, const char* header_file = nullptr) {
-    uint32_t result = UINT32_MAX;
-    KRAL_STREAM_WriteImageFile(handle(), file.c_str(), format, 1, header_file, KRAL_STREAM_MULTI_IMAGE, block_size_,
-                               window_, &result);
-    return result;
-  };
-  EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_BY_CONTENT, header.c_str()), KRAL_STREAM_WRITTEN) << LogText();
+  EXPECT_EQ(Write(binary, KRAL_STREAM_WRITTEN, 0, 0, 1000, header.c_str()), 1) << LogText();
   ExpectInFlash(bytes, 0);
   EXPECT_EQ(handset().programmer().images().back().header, (handset::Bytes{'h', 'e', 'a', 'd'}));
-  EXPECT_EQ(write(hex, KRAL_IMAGE_FORMAT_BY_CONTENT), KRAL_STREAM_WRITTEN) << LogText();
+  EXPECT_EQ(Write(hex, KRAL_STREAM_WRITTEN), 1) << LogText();
   ExpectInFlash(bytes, 0x30000);
+}
 
-  const size_t images = handset().programmer().images().size();
-  const auto two = folder.Add("two.hex", test::kTwoRegionsHex);
-  EXPECT_EQ(write(two, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_BAD_IMAGE);
-  EXPECT_EQ(write(folder.Add("dropped.hex", test::kDroppedHex), KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_DATA_LOST);
-  EXPECT_NE(ErrorText().find("dropped.hex: line 1 holds data"), std::string::npos);
-  EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_HEX), KRAL_STREAM_FILE_NOT_DECODED);
-  EXPECT_EQ(write(binary, 7), KRAL_STREAM_BAD_ARGUMENT);
-  EXPECT_EQ(write(folder.Add("empty", ""), KRAL_IMAGE_FORMAT_BY_CONTENT), KRAL_STREAM_FILE_NOT_OPENED);
-  EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_BINARY, folder.Path("missing").c_str()), KRAL_STREAM_FILE_NOT_OPENED);
-  EXPECT_EQ(write(binary, KRAL_IMAGE_FORMAT_BINARY, folder.Add("long", std::string(513, 'x')).c_str()),
-            KRAL_STREAM_OPEN_FAILED);
-  EXPECT_EQ(handset().programmer().images().size(), images) << "no image was begun";
+TEST_F(StreamFiles, EveryFailureHasItsResultAndSaysWhy) {
+  constexpr uint8_t kOther = 13;  // the code of no reply here
+  StartProgrammer();
+  const auto image = folder_.Add("image.bin", std::string(3000, 'x'));
+  const auto missing = folder_.Path("missing");
+  const auto long_header = folder_.Add("header", std::string(513, 'h'));
+  const auto dropped = folder_.Add("dropped.hex", test::kDroppedHex);
+  const auto two = folder_.Add("two.hex", test::kTwoRegionsHex);
+  const auto empty = folder_.Add("empty", "");
+  const auto other_table = folder_.Add("table2", "\x01NAME2");
+  const std::vector<uint8_t> bytes(300);
+  const auto write_bytes = [&](const uint8_t* data, uint32_t address) {
+    return KRAL_STREAM_WriteImageMem(handle(), data, 300, address, 5, nullptr, 0, 0, 1000, 4, nullptr);
+  };
+  const auto write_with_header = [&](const std::string& header, uint32_t result) {
+    return [&, result] { return Write(image, result, 0, 0, 1000, header.c_str()); };
+  };
+  const auto write = [&](uint32_t result) { return [&, result] { return Write(image, result); }; };
+  const auto other = [&](const When& when, uint32_t result) {
+    return [&, when, result] { return Struck(handset::WrongCode(kOther), when, write(result)); };
+  };
+  const auto table = [&](const std::string& file) {
+    return [&] { return KRAL_STREAM_PARTITION_TABLE(handle(), file.c_str(), 0, nullptr); };
+  };
+  const auto hello = [&](uint32_t variant) { return KRAL_STREAM_HELLO(handle(), variant, nullptr, nullptr); };
+  const auto security = [&] { return KRAL_STREAM_SECURITY_MODE(handle(), 1); };
+  EXPECT_EQ(table(folder_.Add("table1", "\x01NAME1"))(), 1);
+  const std::string file = "KRAL_STREAM_WriteImageFile";
+  const std::string in_table = "KRAL_STREAM_PARTITION_TABLE";
+  test::ExpectFailures(
+      handle(),
+      {{file + " ARGUMENT", "no file name",
+        [&] { return KRAL_STREAM_WriteImageFile(handle(), nullptr, 0, 0, nullptr, 0, 1, 1, nullptr); }},
+       {file + " BAD_FILE", "missing cannot be opened", [&] { return Write(missing, KRAL_STREAM_FILE_NOT_OPENED); }},
+       {file + " BAD_FILE", "empty", [&] { return Write(empty, KRAL_STREAM_FILE_NOT_OPENED); }},
+       {file + " BAD_FILE line 1", "",
+        [&] { return Write(image, KRAL_STREAM_FILE_NOT_DECODED, KRAL_IMAGE_FORMAT_HEX); }},
+       {file + " ARGUMENT", "format 9", [&] { return Write(image, KRAL_STREAM_BAD_ARGUMENT, 9); }},
+       {file + " ARGUMENT", "method 9", [&] { return Write(image, KRAL_STREAM_BAD_ARGUMENT, 0, 9); }},
+       {file + " ARGUMENT", "blocks of 0 bytes", [&] { return Write(image, KRAL_STREAM_BAD_ARGUMENT, 0, 0, 0); }},
+       {file + " BAD_FILE", "missing", write_with_header(missing, KRAL_STREAM_FILE_NOT_OPENED)},
+       {file + " ARGUMENT", "513 bytes", write_with_header(long_header, KRAL_STREAM_OPEN_FAILED)},
+       {file + " BAD_FILE line 1", "line 1", [&] { return Write(dropped, KRAL_STREAM_DATA_LOST); }},
+       {file + " BAD_FILE", "second region", [&] { return Write(two, KRAL_STREAM_BAD_IMAGE); }},
+       {"KRAL_STREAM_WriteImageMem ARGUMENT", "no bytes", [&] { return write_bytes(nullptr, 0); }},
+       {"KRAL_STREAM_WriteImageMem ARGUMENT", "past address 0xFFFFFFFF",
+        [&] { return write_bytes(bytes.data(), 0xFFFFFF00); }},
+       {in_table + " ARGUMENT", "no file name",
+        [&] { return KRAL_STREAM_PARTITION_TABLE(handle(), nullptr, 0, nullptr); }},
+       {in_table + " BAD_FILE", "missing cannot be opened", table(missing)},
+       {in_table + " BAD_FILE", "more than the 512 bytes", table(long_header)},
+       {"KRAL_STREAM_HELLO ARGUMENT", "variant 2", [&] { return hello(2); }}});
+  EXPECT_EQ(handset().programmer().images().size(), 0u) << "no image was begun";
+  test::ExpectFailures(
+      handle(),
+      {{file + " NO_ANSWER", "command 27", [&] { return Silent(When::Nth(1), write(KRAL_STREAM_OPEN_FAILED)); }},
+       {file + " LINK REPLY 13", "command 27", other(When::Nth(1), KRAL_STREAM_OPEN_FAILED)},
+       {file + " LINK REPLY 13 offset 0", "instead of an acknowledgement",
+        other(When::Nth(1).Of("08"), KRAL_STREAM_WRITE_FAILED)},
+       {file + " LOST offset 1000", "1000 of 3000 bytes",
+        [&] { return Silent(When::From(2).Of("08"), write(KRAL_STREAM_WRITE_FAILED)); }},
+       {file + " NO_ANSWER", "command 21",
+        [&] { return Silent(When::Nth(1).Of("16"), write(KRAL_STREAM_CLOSE_FAILED)); }},
+       {file + " ABORTED", "aborted", [&] { return Aborted(write(KRAL_DOWNLOAD_ABORTED)); }},
+       {"KRAL_STREAM_SECURITY_MODE NO_ANSWER", "command 23", [&] { return Silent(When::Nth(1), security); }},
+       {in_table + " REFUSED LOADER 1", "differs", table(other_table)},
+       {"KRAL_STREAM_HELLO NO_ANSWER", "command 1", [&] { return Silent(When::Always(), [&] { return hello(1); }); }}});
+  handset().programmer().Set({.open_status = 3});
+  test::ExpectFailures(handle(), {{file + " REFUSED LOADER 3", "type 5", write(KRAL_STREAM_OPEN_FAILED)}});
 }
 
 }  // namespace

@@ -1,13 +1,6 @@
 // Connecting, the liveness check, reopening, and what each way of connecting promises.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <array>
 #include <future>
-#include <string>
 #include <system_error>
-#include <thread>
-#include <vector>
 
 #include "base/thread_maker.h"
 #include "frame/connect.h"
@@ -20,11 +13,11 @@
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using handset::When;
 using Ports = std::vector<uint16_t>;
 
 constexpr uint16_t kPort = 12;

@@ -1,21 +1,15 @@
 // The handle table: rows, handles, sharing, release and its order, and the objects that rows own.
-#include <gtest/gtest.h>
-
 #include <cstdio>
-#include <memory>
 #include <new>
-#include <stdexcept>
-#include <string>
-#include <thread>
-#include <utility>
-#include <vector>
 
 #include "frame/diag_ftm.h"
+#include "frame/phone_state.h"
 #include "frame/resource_manager.h"
 #include "kral/kral.h"
 #include "tests/support/failing_allocation.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/scripted_server.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -282,6 +276,38 @@ TEST_F(ContextTable, ConnectsOfManyThreadsShareOneRowAndOnePhoneObject) {
   EXPECT_EQ(phones, std::vector<Diag_FTM*>(8, phones[0]));
   for (size_t i = 0; i < handles.size(); ++i) KRAL_DisconnectServer(handles[0]);
   EXPECT_FALSE(IsKnown(handles[0]));
+}
+
+// --- What families keep for a phone ---------------------------------------------------------------------------------
+
+template <int N>
+struct Kept {
+  int value = N;
+};
+
+template <int... N>
+std::array<const void*, sizeof...(N)> AddressesOf(PhoneState& state) {
+  return {&state.Get<Kept<N>>()...};
+}
+
+TEST(PhoneState, ThreadsThatAskAtOnceGetTheSameObjectOfEveryType) {
+  for (int round = 0; round < 200; ++round) {
+    PhoneState state;
+    std::atomic<bool> go{false};
+    std::vector<std::array<const void*, 4>> seen(4);
+    std::vector<std::thread> threads;
+    for (auto& addresses : seen) {
+      threads.emplace_back([&] {
+        while (!go) std::this_thread::yield();
+        addresses = AddressesOf<1, 2, 3, 4>(state);
+      });
+    }
+    go = true;
+    for (std::thread& thread : threads) thread.join();
+    for (const auto& addresses : seen) ASSERT_EQ(addresses, seen[0]);
+    ASSERT_EQ((AddressesOf<1, 2, 3, 4>(state)), seen[0]);
+    ASSERT_EQ(state.Get<Kept<3>>().value, 3);
+  }
 }
 
 }  // namespace

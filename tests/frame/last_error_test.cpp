@@ -1,17 +1,15 @@
 // Why a call failed: every way to fail leaves a record that is right.
-#include <thread>
-
 #include "base/time_outs.h"
 #include "frame/resource_manager.h"
 #include "handset/line/faults.h"
 #include "kral/kral.h"
+#include "tests/support/failures.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
-
-using handset::When;
 
 class LastError : public HandsetTest {
  protected:
@@ -36,173 +34,71 @@ TEST_F(LastError, NamesWhatWasWrong) {
   uint8_t flag = 0;
   KRAL_EVENT event;
   std::array<char, 8> name{};
-  const struct {
-    const char* what;
-    std::function<void()> setup;
-    std::function<uint32_t()> call;  // 0 is a failure
-    const char* function;
-    uint32_t code;
-    uint32_t status_kind;
-    uint32_t status;
-    const char* text;  // part of the sentence
-  } kRows[] = {
-      {"silence", [&] { handset().faults().Add(handset::Ignore(), When::Always()); }, [&] { return ReadSwitches(h); },
-       "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_NO_ANSWER, 0, 0, "no answer to command 47 within 40 ms"},
-      {"unknown command", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
-       [&] { return ReadSwitches(h); }, "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 19,
-       "refused command 47 with 19"},
-      {"parameter", [&] { handset().faults().Add(handset::Refuse(20), When::Always()); },
-       [&] { return KRAL_FTM_SET_TX_ON(h); }, "KRAL_FTM_SET_TX_ON", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 20,
-       "refused command 75/11/1 with 20"},
-      {"length", [&] { handset().faults().Add(handset::Refuse(21), When::Always()); }, [&] { return ReadSwitches(h); },
-       "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 21, "with 21"},
-      {"mode", [&] { handset().faults().Add(handset::Refuse(24), When::Always()); },
-       [&] { return KRAL_DIAG_READ_ESN_F(h, &serial); }, "KRAL_DIAG_READ_ESN_F", KRAL_ERROR_REFUSED,
-       KRAL_ERROR_STATUS_REFUSAL, 24, "operating mode"},
-      {"another reply", [&] { handset().faults().Add(handset::WrongCode(77), When::Always()); },
-       [&] { return ReadSwitches(h); }, "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_LINK, KRAL_ERROR_STATUS_REPLY, 77,
-       "answered with a reply of 77"},
-      {"a damaged reply", [&] { handset().faults().Add(handset::Corrupt(), When::Always()); },
-       [&] { return ReadSwitches(h); }, "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_LINK, 0, 0, "wrong check"},
-      {"a short reply", [&] { handset().Expect("2F").Reply("2F 00"); }, [&] { return ReadSwitches(h); },
-       "KRAL_DIAG_GET_DIPSW_F", KRAL_ERROR_LINK, 0, 0, "switch word"},
-      {"status of an NV item", [&] { handset().Expect("26 01 00 07").Reply("26 01 00 07 00 00 05 00"); },
-       [&] { return KRAL_DIAG_NV_READ_ARRAY_F(h, 1, 7, data_.data(), 2, &status_); }, "KRAL_DIAG_NV_READ_ARRAY_F",
-       KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_NV, 5, "NV item 1"},
-      {"liveness", [&] { handset().faults().Add(handset::Ignore(), When::Always()); },
-       [&] { return KRAL_IsPhoneConnected(h); }, "KRAL_IsPhoneConnected", KRAL_ERROR_NO_ANSWER, 0, 0, "command 123"},
-      {"no buffer",
-       {},
-       [&] { return KRAL_DIAG_MEMORY_PEEK_F(h, 0, 4, nullptr); },
-       "KRAL_DIAG_MEMORY_PEEK_F",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "buffer"},
-      {"no request",
-       {},
-       [&] { return KRAL_SendSync(h, 0, nullptr, &size, data_.data(), 10); },
-       "KRAL_SendSync",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "request"},
-      {"packet mode",
-       {},
-       [&] { return KRAL_SetPacketMode(h, 4); },
-       "KRAL_SetPacketMode",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "packet mode 4"},
-      {"RF mode",
-       {},
-       [&] { return KRAL_FTM_SET_MODE(h, 9999); },
-       "KRAL_FTM_SET_MODE",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "9999"},
-      {"command code",
-       {},
-       [&] { return KRAL_FTM_SET_COMMAND_CODE(h, 60); },
-       "KRAL_FTM_SET_COMMAND_CODE",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "60"},
-      {"time-out id",
-       {},
-       [&] { return KRAL_ConfigureTimeOut(h, 21, 1); },
-       "KRAL_ConfigureTimeOut",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "21"},
-      {"empty queue",
-       {},
-       [&] { return KRAL_DIAG_GetNextEvent(h, &event); },
-       "KRAL_DIAG_GetNextEvent",
-       KRAL_ERROR_NO_ANSWER,
-       0,
-       0,
-       "no event"},
-      {"a function without request",
-       {},
-       [&] { return KRAL_DIAG_GSM_STATUS_F(h); },
-       "KRAL_DIAG_GSM_STATUS_F",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "KRAL_DIAG_GSM_STATUS_F"},
-      {"a phone server's",
-       {},
-       [&] { return KRAL_EfsRmTree(h, "/x"); },
-       "KRAL_EfsRmTree",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "phone server"},
-      {"NV tool's code",
-       {},
-       [&] { return KRAL_NV_LoadNVDefinitionFile(h, "no-such.xml") == 0 ? 1u : 0u; },
-       "KRAL_NV_LoadNVDefinitionFile",
-       KRAL_ERROR_BAD_FILE,
-       KRAL_ERROR_STATUS_RESULT,
-       KRAL_NV_ERROR_CANNOT_LOAD_DEFINITION,
-       "no-such.xml"},
-      {"a command with a payload", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
-       [&] { return KRAL_FTM_GET_SYNTH_STATE(h, nullptr, 0, data_.data(), &size); }, "KRAL_FTM_GET_SYNTH_STATE",
-       KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL, 19, "75/11/1"},
-      {"target", [&] { handset().faults().Add(handset::Ignore(), When::Always()); },
-       [&] { return KRAL_IsFTM_Mode(h, &flag); }, "KRAL_IsFTM_Mode", KRAL_ERROR_NO_ANSWER, 0, 0, "75/15/0"},
-      {"a mode that is refused", [&] { handset().faults().Add(handset::Refuse(24), When::Always().Of("29")); },
-       [&] { return KRAL_DIAG_CONTROL_F(h, 3); }, "KRAL_DIAG_CONTROL_F", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL,
-       24, "command 41"},
-      {"a boot mode that is refused",
-       [&] {
-         handset().faults().Add(handset::Refuse(20), When::Always().Of("27"));
-         handset().faults().Add(handset::Ignore(), When::From(2).Of("29"));
-       },
-       [&] { return KRAL_ChangeFTM_BootMode(h, 1, 1); }, "KRAL_ChangeFTM_BootMode", KRAL_ERROR_REFUSED,
-       KRAL_ERROR_STATUS_REFUSAL, 20, "command 39"},
-      {"a packet mode that is refused", [&] { handset().faults().Add(handset::Refuse(19), When::Always()); },
-       [&] { return KRAL_SetPacketMode(h, 1); }, "KRAL_SetPacketMode", KRAL_ERROR_REFUSED, KRAL_ERROR_STATUS_REFUSAL,
-       19, "command 68"},
-      {"another reply to an EFS2 request", [&] { handset().faults().Add(handset::WrongCode(77), When::Always()); },
-       [&] { return KRAL_EfsMkDir(h, "/x", nullptr); }, "KRAL_EfsMkDir", KRAL_ERROR_LINK, KRAL_ERROR_STATUS_REPLY, 77,
-       "75/19"},
-      {"no capture",
-       {},
-       [&] { return KRAL_StopCapture(h); },
-       "KRAL_StopCapture",
-       KRAL_ERROR_ARGUMENT,
-       0,
-       0,
-       "no capture is running"},
+  const auto on = [&](handset::Fault fault, const char* prefix = "") {
+    handset().faults().Add(fault, When::Always().Of(prefix));
   };
-  for (const auto& row : kRows) {
-    SCOPED_TRACE(row.what);
+  const auto switches_with = [&](handset::Fault fault) { return [&, fault] { return on(fault), ReadSwitches(h); }; };
+  const auto expect = [&](const char* request, const char* reply) { handset().Expect(request).Reply(reply); };
+  const auto refuse_boot = [&] {
+    on(handset::Refuse(20), "27");
+    handset().faults().Add(handset::Ignore(), When::From(2).Of("29"));
+  };
+  const std::string kSwitches = "KRAL_DIAG_GET_DIPSW_F";
+  const auto prepare = [&] {
     handset().faults().Clear();
     KRAL_ConfigureTimeOut(h, 0, 40);
     KRAL_ConfigureTimeOut(h, kTimeOutModeReadBack, 40);
-    if (row.setup) row.setup();
-    EXPECT_EQ(row.call(), 0u);
-    const KRAL_ERROR error = Record(h);
-    EXPECT_STREQ(error.function, row.function);
-    EXPECT_EQ(error.code, row.code) << error.text;
-    EXPECT_EQ(error.status_kind, row.status_kind) << error.text;
-    EXPECT_EQ(error.status, row.status);
-    EXPECT_NE(std::string_view(error.text).find(row.text), std::string_view::npos) << error.text;
-  }
+  };
+  const std::vector<test::FailureRow> rows = {
+      {kSwitches + " NO_ANSWER", "no answer to command 47 within 40 ms", switches_with(handset::Ignore())},
+      {kSwitches + " REFUSED REFUSAL 19", "refused command 47 with 19", switches_with(handset::Refuse(19))},
+      {"KRAL_FTM_SET_TX_ON REFUSED REFUSAL 20", "refused command 75/11/1 with 20",
+       [&] { return on(handset::Refuse(20)), KRAL_FTM_SET_TX_ON(h); }},
+      {kSwitches + " REFUSED REFUSAL 21", "with 21", switches_with(handset::Refuse(21))},
+      {"KRAL_DIAG_READ_ESN_F REFUSED REFUSAL 24", "operating mode",
+       [&] { return on(handset::Refuse(24)), KRAL_DIAG_READ_ESN_F(h, &serial); }},
+      {kSwitches + " LINK REPLY 77", "answered with a reply of 77", switches_with(handset::WrongCode(77))},
+      {kSwitches + " LINK", "wrong check", switches_with(handset::Corrupt())},
+      {kSwitches + " LINK", "switch word", [&] { return expect("2F", "2F 00"), ReadSwitches(h); }},
+      {"KRAL_DIAG_NV_READ_ARRAY_F REFUSED NV 5", "NV item 1",
+       [&] {
+         expect("26 01 00 07", "26 01 00 07 00 00 05 00");
+         return KRAL_DIAG_NV_READ_ARRAY_F(h, 1, 7, data_.data(), 2, &status_);
+       }},
+      {"KRAL_IsPhoneConnected NO_ANSWER", "command 123",
+       [&] { return on(handset::Ignore()), KRAL_IsPhoneConnected(h); }},
+      {"KRAL_DIAG_MEMORY_PEEK_F ARGUMENT", "buffer", [&] { return KRAL_DIAG_MEMORY_PEEK_F(h, 0, 4, nullptr); }},
+      {"KRAL_SendSync ARGUMENT", "request", [&] { return KRAL_SendSync(h, 0, nullptr, &size, data_.data(), 10); }},
+      {"KRAL_SetPacketMode ARGUMENT", "packet mode 4", [&] { return KRAL_SetPacketMode(h, 4); }},
+      {"KRAL_FTM_SET_MODE ARGUMENT", "9999", [&] { return KRAL_FTM_SET_MODE(h, 9999); }},
+      {"KRAL_FTM_SET_COMMAND_CODE ARGUMENT", "60", [&] { return KRAL_FTM_SET_COMMAND_CODE(h, 60); }},
+      {"KRAL_ConfigureTimeOut ARGUMENT", "21", [&] { return KRAL_ConfigureTimeOut(h, 21, 1); }},
+      {"KRAL_DIAG_GetNextEvent NO_ANSWER", "no event", [&] { return KRAL_DIAG_GetNextEvent(h, &event); }},
+      {"KRAL_DIAG_GSM_STATUS_F ARGUMENT", "KRAL_DIAG_GSM_STATUS_F", [&] { return KRAL_DIAG_GSM_STATUS_F(h); }},
+      {"KRAL_EfsRmTree ARGUMENT", "phone server", [&] { return KRAL_EfsRmTree(h, "/x"); }},
+      {"KRAL_NV_LoadNVDefinitionFile BAD_FILE RESULT 4", "no-such.xml",
+       [&] { return KRAL_NV_LoadNVDefinitionFile(h, "no-such.xml") == 0; }},
+      {"KRAL_FTM_GET_SYNTH_STATE REFUSED REFUSAL 19", "75/11/1",
+       [&] { return on(handset::Refuse(19)), KRAL_FTM_GET_SYNTH_STATE(h, nullptr, 0, data_.data(), &size); }},
+      {"KRAL_IsFTM_Mode NO_ANSWER", "75/15/0", [&] { return on(handset::Ignore()), KRAL_IsFTM_Mode(h, &flag); }},
+      {"KRAL_DIAG_CONTROL_F REFUSED REFUSAL 24", "command 41",
+       [&] { return on(handset::Refuse(24), "29"), KRAL_DIAG_CONTROL_F(h, 3); }},
+      {"KRAL_ChangeFTM_BootMode REFUSED REFUSAL 20", "command 39",
+       [&] { return refuse_boot(), KRAL_ChangeFTM_BootMode(h, 1, 1); }},
+      {"KRAL_SetPacketMode REFUSED REFUSAL 19", "command 68",
+       [&] { return on(handset::Refuse(19)), KRAL_SetPacketMode(h, 1); }},
+      {"KRAL_EfsMkDir LINK REPLY 77", "75/19",
+       [&] { return on(handset::WrongCode(77)), KRAL_EfsMkDir(h, "/x", nullptr); }},
+      {"KRAL_StopCapture ARGUMENT", "no capture is running", [&] { return KRAL_StopCapture(h); }},
+  };
+  test::ExpectFailures(h, rows, prepare);
   // Functions without a handle, and connects.
-  EXPECT_EQ(KRAL_Band_Helper_GetBandName(60000, name.data(), 8), 0);
-  EXPECT_STREQ(Record(0).function, "KRAL_Band_Helper_GetBandName");
-  EXPECT_EQ(KRAL_FTM_GetCommandInfo(0, nullptr, name.data(), 1), 0);
-  EXPECT_STREQ(Record(0).function, "KRAL_FTM_GetCommandInfo");
-  EXPECT_EQ(KRAL_ConnectServer_LogicalPort(4711), 0u);
-  EXPECT_EQ(Record(0).code, uint32_t{KRAL_ERROR_ARGUMENT});
-  EXPECT_STREQ(Record(0).text, "there is no alias for the logical port 4711");
+  test::ExpectFailures(
+      0, {{"KRAL_Band_Helper_GetBandName ARGUMENT", "",
+           [&] { return KRAL_Band_Helper_GetBandName(60000, name.data(), 8); }},
+          {"KRAL_FTM_GetCommandInfo ARGUMENT", "", [&] { return KRAL_FTM_GetCommandInfo(0, nullptr, name.data(), 1); }},
+          {"KRAL_ConnectServer_LogicalPort ARGUMENT", "there is no alias for the logical port 4711",
+           [] { return KRAL_ConnectServer_LogicalPort(4711); }}});
 }
 
 TEST_F(LastError, SilentServiceOfAnApplicationProcessorIsNoMode) {

@@ -1,13 +1,6 @@
 // Many handsets and many threads at once: nothing is mixed up, nothing waits for what is not its own, and a
 // connection may be let go of while somebody uses it.
-#include <gtest/gtest.h>
-
-#include <chrono>
-#include <functional>
 #include <future>
-#include <string>
-#include <thread>
-#include <vector>
 
 #include "frame/diag_ftm.h"
 #include "frame/export_call.h"
@@ -16,11 +9,10 @@
 #include "kral/connection.h"
 #include "kral/text_log.h"
 #include "tests/support/handset_ports.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
-
-using handset::When;
 
 constexpr uint16_t kFirstPort = 1;
 constexpr uint16_t kHandsets = 50;

@@ -1,13 +1,8 @@
 // Listing ports, asking which of them have a handset, and connecting to the first that answers.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <string>
-#include <vector>
-
 #include "kral/connection.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/scripted_server.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -73,24 +68,23 @@ TEST_F(PortEnumeration, FailsWhenThePortsCannotBeListed) {
   EXPECT_EQ(KRAL_ConnectServer(KRAL_PORT_ANY), 0u);
 }
 
-TEST_F(PortEnumeration, FindsTheHandsetsThatAnswer) {
-  EXPECT_EQ(PhonePorts(), (Listed{1, 2, {7, 9}}));
-  EXPECT_EQ(ports_.opens().front(), 3);
-  EXPECT_TRUE(ports_.open().empty());
-}
-
-TEST_F(PortEnumeration, StopsWhenTheRoomIsFull) {
-  EXPECT_EQ(PhonePorts(1), (Listed{1, 1, {7}}));
-  EXPECT_EQ(ports_.opens().back(), 7);
-}
-
-TEST_F(PortEnumeration, LeavesIgnoredPortsAlone) {
-  EXPECT_EQ(PhonePorts(kRoom, {7, 3, 5}), (Listed{1, 1, {9}}));
-  EXPECT_EQ(ports_.opens(), std::vector<uint16_t>{9});
-}
-
-TEST_F(PortEnumeration, SucceedsEvenWhenNobodyAnswers) {
-  EXPECT_EQ(PhonePorts(kRoom, {7, 9}), (Listed{1, 0, {}}));
+TEST_F(PortEnumeration, FindsTheHandsetsThatAnswerUntilTheRoomIsFullAndLeavesIgnoredPortsAlone) {
+  const struct {
+    uint16_t room;
+    std::vector<uint16_t> ignored;
+    Listed listed;
+    std::set<uint16_t> tried;
+  } kRows[] = {{kRoom, {}, {1, 2, {7, 9}}, {3, 5, 7, 9}},
+               {1, {}, {1, 1, {7}}, {3, 7}},
+               {kRoom, {7, 3, 5}, {1, 1, {9}}, {9}},
+               {kRoom, {7, 9}, {1, 0, {}}, {3, 5}}};
+  for (const auto& row : kRows) {
+    const size_t before = ports_.opens().size();
+    EXPECT_EQ(PhonePorts(row.room, row.ignored), row.listed);
+    const auto opens = ports_.opens();
+    EXPECT_EQ(std::set<uint16_t>(opens.begin() + static_cast<std::ptrdiff_t>(before), opens.end()), row.tried);
+    EXPECT_TRUE(ports_.open().empty());
+  }
 }
 
 TEST_F(PortEnumeration, ClosesEveryConnectionFirst) {

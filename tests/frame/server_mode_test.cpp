@@ -1,17 +1,11 @@
 // Connections through the phone server.
-#include <gtest/gtest.h>
-
-#include <array>
-#include <stdexcept>
-#include <string>
-#include <vector>
-
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/connection.h"
 #include "kral/text_log.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/scripted_server.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -141,11 +135,6 @@ TEST_F(ServerMode, ListenerTakesPacketsOfTheServersThread) {
   auto& phone = Connected();
   server_.listener->OnPacket(std::array<uint8_t, 4>{38, 1, 0, 0});
   EXPECT_EQ(phone.responses().size(), 1u);
-}
-
-TEST_F(ServerMode, ReceiveModeIsRefused) {
-  Connected();
-  EXPECT_EQ(KRAL_SetReceiveMode(handle_, 1), 0);
 }
 
 TEST(ServerModeWithoutServer, ConnectsGiveTheirHandleAndEveryRequestZero) {

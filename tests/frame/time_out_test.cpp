@@ -1,15 +1,11 @@
 // The time-outs of a handset: defaults, refusals, and the file of a station.
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <string>
-
 #include "kral/connection.h"
 #include "kral/text_log.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/scripted_server.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

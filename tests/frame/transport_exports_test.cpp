@@ -1,12 +1,9 @@
 // The exported requests, packet modes and port lines, against a handset on a caller's transport and behind a phone
 // server.
-#include <gtest/gtest.h>
-
-#include <array>
-
 #include "kral/transport.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/scripted_server.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -23,17 +20,6 @@ class TransportExports : public HandsetTest {
   uint16_t size_ = 0;
 };
 
-TEST_F(TransportExports, SendSyncGivesTheReplyWithoutFcs) {
-  handset().Expect("7B 01 02").Reply("7B 01 02");
-  EXPECT_EQ(Ask({0x7B, 1, 2}), 1);
-  EXPECT_EQ(size_, 3);
-  EXPECT_EQ(response_[2], 2);
-  EXPECT_TRUE(HasLine(512, "KRAL_SendSync"));
-  handset().Expect("4B").Reply("13 4B");
-  EXPECT_EQ(Ask({0x4B}), 0);
-  EXPECT_EQ(size_, 2) << "a refusal is given out";
-}
-
 TEST_F(TransportExports, MissingArgumentsGiveZeroWithoutTraffic) {
   const uint8_t request = 0;
   uint16_t size = 4;
@@ -42,6 +28,9 @@ TEST_F(TransportExports, MissingArgumentsGiveZeroWithoutTraffic) {
   EXPECT_EQ(KRAL_SendSync(handle(), 1, nullptr, &size, response.data(), 10), 0);
   EXPECT_EQ(KRAL_SendASync(handle(), 1, nullptr, 10, 0), 0);
   EXPECT_EQ(KRAL_SendRAW(handle(), 0, &request, &size, response.data(), 10), 0);
+  EXPECT_EQ(KRAL_SetPacketMode(handle(), 4), 0);
+  EXPECT_TRUE(HasLine(16, "KRAL_SetPacketMode() -  Error, Invalid packet mode"));
+  EXPECT_EQ(KRAL_SetPacketMode(handle(), 0), 1);
   EXPECT_EQ(handset().request_count(), 0u);
   EXPECT_EQ(KRAL_SendSync(handle(), 1, &request, nullptr, nullptr, 5000), 1) << "a reply that nobody wants to see";
 }
@@ -63,12 +52,6 @@ TEST_F(TransportExports, StartFlagReportsTheFormerSettingAndLeadsTheNextFrame) {
   EXPECT_EQ(bytes[9], 0x7E);
 }
 
-TEST_F(TransportExports, PacketModeIsSetAndRefused) {
-  EXPECT_EQ(KRAL_SetPacketMode(handle(), 4), 0);
-  EXPECT_TRUE(HasLine(16, "KRAL_SetPacketMode() -  Error, Invalid packet mode"));
-  EXPECT_EQ(KRAL_SetPacketMode(handle(), 2), 1);
-}
-
 TEST_F(TransportExports, RawPacketCallbackSeesRepliesAndWhatIsDropped) {
   std::atomic<uint32_t> length{0};
   const auto callback = [](uint32_t size, const uint8_t*, uintptr_t value) {
@@ -79,6 +62,8 @@ TEST_F(TransportExports, RawPacketCallbackSeesRepliesAndWhatIsDropped) {
   handset().Expect("7B 01").Reply("7B 01 02 03");
   EXPECT_EQ(Ask({0x7B, 1}), 1);
   EXPECT_EQ(length, 5u + 6u) << "FCS included";
+  EXPECT_EQ(size_, 4) << "and not here";
+  EXPECT_TRUE(HasLine(512, "KRAL_SendSync"));
   EXPECT_EQ(KRAL_ConfigureCallBacks(handle(), nullptr, 0), 1);
 }
 
@@ -106,6 +91,7 @@ TEST(TransportExportsThroughServer, FunctionsOfTheFramerAreRefused) {
     EXPECT_TRUE(log.Has(std::string("16 ") + name + "() : FAIL in ORBT mode")) << name;
   }
   EXPECT_EQ(KRAL_FlushRxBuffer(handle), 0);
+  EXPECT_EQ(KRAL_SetReceiveMode(handle, 1), 0);
   EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 0);
   EXPECT_EQ(KRAL_SetRTS_State(handle, 1), 0);
   EXPECT_EQ(KRAL_SetSendDataSerialWriteSizeLimit(handle, 512), 0);

@@ -1,8 +1,4 @@
 // A handle that is not, or no longer, known: every export that takes one fails, touches no output and sends nothing.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <array>
 #include <source_location>
 #include <type_traits>
 
@@ -51,7 +47,7 @@ void ExpectFailure(KRAL_HANDLE handle) {
     Call(kFunction, handle);
   } else {
     // The NV tool's functions give error codes, in which 0 is good.
-    EXPECT_EQ(Call(kFunction, handle), (std::is_same_v<Result, uint32_t> ? KRAL_NV_ERROR_NOT_CONNECTED : 0)) << name;
+    EXPECT_EQ(Call(kFunction, handle), (std::is_same_v<Result, uint32_t> ? KRAL_NV_ERROR_NO_CONNECTION : 0)) << name;
   }
   EXPECT_TRUE(std::all_of(g_area.begin(), g_area.end() - 1, [](uint8_t byte) { return byte == 0xCC; })) << name;
 }
@@ -70,7 +66,8 @@ TEST(UnknownHandle, FailsEveryCallWithoutTraffic) {
   const size_t opens = ports.opens().size();
   for (const KRAL_HANDLE handle : {released, KRAL_HANDLE{0}, KRAL_HANDLE{0xDEADBEEF}}) {
     ExpectFailureOfAll<
-#include "handle_functions.inc"
+#include "tests/support/handle_functions.inc"
+#include "tests/support/test.h"
         >(handle);
   }
   EXPECT_EQ(handset.request_count(), 0u);

@@ -2,12 +2,12 @@
 // makes of them.
 #include "handset/line/faults.h"
 
-#include <gtest/gtest.h>
-
 #include <bitset>
 
+#include "handset/line/frame_codec.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_host.h"
+#include "tests/support/test.h"
 
 namespace kral::handset {
 namespace {
@@ -93,6 +93,35 @@ TEST_F(HandsetFaults, UnsolicitedPacketsKnowBitErrorsOnly) {
   handset_.faults().SetBitErrorRate(1);
   handset_.SendUnframed(FromHex("0F F0"));
   EXPECT_EQ(host_.Read(), "F0 0F");
+}
+
+// --- The codec: what damage costs ------------------------------------------------------------------------------------
+
+std::vector<Bytes> Decode(FrameDecoder& decoder, ByteView wire) {
+  std::vector<Bytes> payloads;
+  while (!wire.empty()) {
+    std::optional<Bytes> payload;
+    wire = wire.subspan(decoder.Feed(wire, payload));
+    if (payload) payloads.push_back(*payload);
+  }
+  return payloads;
+}
+
+TEST(HandsetFrameCodec, DamagedFrameCostsOnlyItself) {
+  const Bytes good = EncodeFrame(FromHex("2F"));
+  Bytes endless(FrameDecoder::kLongestBody + 100, 0x55);
+  endless.push_back(kFlag);
+  Bytes flipped = good;
+  flipped[0] ^= 0x01;
+  const Bytes aborted = FromHex("01 02 7D 7E");
+  const Bytes check_only = FromHex("00 00 7E");
+  for (const Bytes& bad : {endless, flipped, aborted, check_only, EncodeCorruptFrame(FromHex("2F"))}) {
+    Bytes wire = bad;
+    wire.insert(wire.end(), good.begin(), good.end());
+    FrameDecoder decoder;
+    EXPECT_EQ(Decode(decoder, wire), std::vector<Bytes>{FromHex("2F")});
+    EXPECT_EQ(decoder.damaged(), 1u);
+  }
 }
 
 }  // namespace

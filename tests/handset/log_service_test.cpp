@@ -1,11 +1,10 @@
 // The handset's side of logs and events: what it refuses, and that it sends what is on and nothing else.
 #include "handset/services/log_service.h"
 
-#include <gtest/gtest.h>
-
 #include "handset/log_generator.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_host.h"
+#include "tests/support/test.h"
 
 namespace kral::handset {
 namespace {

@@ -1,13 +1,11 @@
 // The virtual handset without the library: its services, its modes, its scripts and its trace.
 #include "handset/virtual_handset.h"
 
-#include <gtest/gtest.h>
-
-#include <thread>
-
 #include "handset/line/wire_modes.h"
+#include "handset/loaders/boot_loader.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/handset_host.h"
+#include "tests/support/test.h"
 
 namespace kral::handset {
 namespace {
@@ -224,6 +222,19 @@ TEST(HandsetThreads, ManyThreadsMayUseIt) {
   reader.join();
   EXPECT_EQ(handset.request_count(), 500u);
   EXPECT_GE(read.load(), 500 * (EncodeFrame(FromHex("60 00")).size() + 6));
+}
+
+TEST(HandsetBootLoader, HostThatMakesAMistakeIsHeardNoMore) {
+  VirtualHandset handset;
+  test::HandsetHost host(handset);
+  const auto loader = std::make_shared<BootLoader>();
+  handset.EnterMode(loader);
+  host.Read();
+  handset.FromHost(FromHex("0D 00 00 00 0C 00 00 00 02 00 00 00"));
+  EXPECT_NE(loader->problem(), "");
+  handset.FromHost(FromHex("05 00 00 00 08 00 00 00"));
+  EXPECT_EQ(host.Read(), "");
+  EXPECT_FALSE(loader->transferred());
 }
 
 }  // namespace

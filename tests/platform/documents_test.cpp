@@ -1,14 +1,9 @@
 // Compound documents and XML: what is written is read again, and hostile input is refused.
 #include <fmt/format.h>
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <functional>
-#include <string>
-#include <vector>
 
 #include "platform/compound_file.h"
 #include "platform/xml_document.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -93,8 +88,15 @@ class HandmadeDocument {
       AddEntry(i, fmt::format("{:08}", i - 1), 1, i < storages ? i + 1 : kFree, kFree);
   }
 
-  void Put(size_t at, uint32_t value) {
+  HandmadeDocument& Put(size_t at, uint32_t value) {
     for (size_t i = 0; i < 4; ++i) bytes[at + i] = static_cast<uint8_t>(value >> (8 * i));
+    return *this;
+  }
+  // Makes a stream of an entry, and the file so long that a large one may lie in it.
+  HandmadeDocument& MakeStream(size_t entry, size_t file_size = 0) {
+    bytes[entry + 66] = 2;
+    bytes.resize(std::max(bytes.size(), file_size));
+    return *this;
   }
 
   static constexpr uint32_t kEnd = 0xFFFFFFFE;
@@ -160,12 +162,7 @@ TEST(CompoundFile, EachDamageIsNamed) {
          for (size_t i = 0; i < 20; ++i) d.Put(76 + 4 * i, 1);
        },
        circle},
-      {"list of circles",
-       [](auto& d) {
-         d.Put(68, 1);
-         d.Put(d.table_at + 508, 1);
-       },
-       circle},
+      {"list of circles", [](auto& d) { d.Put(68, 1).Put(d.table_at + 508, 1); }, circle},
       {"no root", [](auto& d) { d.bytes[d.kDirectory + 66] = 1; }, "no directory"},
       {"sibling of its own", [](auto& d) { d.Put(kThird + 68, 3); }, directory},
       {"sibling outside", [](auto& d) { d.Put(kThird + 72, 4); }, directory},
@@ -175,32 +172,12 @@ TEST(CompoundFile, EachDamageIsNamed) {
       {"name too long", [](auto& d) { d.Put(kThird + kType, 0x010042); }, "an entry has a damaged name"},
       {"half a pair", [](auto& d) { d.Put(kThird, 0x0030D83D); }, "an entry has a damaged name"},
       {"unknown kind", [](auto& d) { d.bytes[kThird + 66] = 7; }, "entry 00000002 is neither storage nor stream"},
-      {"short stream nowhere",
-       [](auto& d) {
-         d.bytes[kThird + 66] = 2;
-         d.Put(kThird + 120, 5);
-       },
-       circle},
-      {"stream in the directory",
-       [](auto& d) {
-         d.bytes[kThird + 66] = 2;
-         d.bytes.resize(8192);
-         d.Put(kThird + 120, 4096);
-       },
-       circle},
+      {"short stream nowhere", [](auto& d) { d.MakeStream(kThird).Put(kThird + 120, 5); }, circle},
+      {"stream in the directory", [](auto& d) { d.MakeStream(kThird, 8192).Put(kThird + 120, 4096); }, circle},
       {"stream of no sectors",
-       [](auto& d) {
-         d.bytes[kThird + 66] = 2;
-         d.bytes.resize(8192);
-         d.Put(kThird + 116, d.kEnd);
-         d.Put(kThird + 120, 4096);
-       },
+       [](auto& d) { d.MakeStream(kThird, 8192).Put(kThird + 116, d.kEnd).Put(kThird + 120, 4096); },
        "stream 00000002 is cut short"},
-      {"stream longer than the file",
-       [](auto& d) {
-         d.bytes[kThird + 66] = 2;
-         d.Put(kThird + 120, 0x7FFFFFFF);
-       },
+      {"stream longer than the file", [](auto& d) { d.MakeStream(kThird).Put(kThird + 120, 0x7FFFFFFF); },
        "stream 00000002 is cut short"},
   };
   for (const Damage& damage : damages) {

@@ -1,19 +1,13 @@
 // Whole files: limits of reading, and a target that changes in one step or not at all.
 #include "platform/file_util.h"
 
-#include <gtest/gtest.h>
-
-#include <array>
-#include <filesystem>
-#include <string>
-#include <vector>
-
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using Bytes = std::vector<uint8_t>;
+using handset::Bytes;
 
 Bytes Of(std::string_view text) {
   return {text.begin(), text.end()};

@@ -1,15 +1,10 @@
 // Folders of the PC: what they hold, and making them.
 #include "platform/folder.h"
 
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <string>
-#include <vector>
-
 #include "platform/file_mapping.h"
 #include "platform/file_util.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

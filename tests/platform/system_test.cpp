@@ -1,16 +1,12 @@
 // What both homes give in the same way: time, markers of ports in use, variables of the environment.
-#include <gtest/gtest.h>
-
-#include <algorithm>
 #include <set>
-#include <string>
-#include <vector>
 
 #include "platform/clock.h"
 #include "platform/environment.h"
 #include "platform/local_time.h"
 #include "platform/named_mutex.h"
 #include "platform/serial_device.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -1,16 +1,12 @@
 // Bands and channels: every range edge against the exact table, the refusals, and equal bits on every home.
-#include <gtest/gtest.h>
-
 #include <bit>
-#include <cstring>
-#include <iterator>
 #include <limits>
-#include <string>
 
 #include "kral/band.h"
 #include "rfcal/bands/band_channels.h"
 #include "rfcal/bands/band_helper.h"
 #include "tests/rfcal/band_edges.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

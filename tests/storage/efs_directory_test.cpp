@@ -1,13 +1,11 @@
 // Listing directories: types, filters, names, and replies that are not to be believed.
-#include <gtest/gtest.h>
-
 #include "tests/support/efs_fixture.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::Bytes;
-using handset::ByteWriter;
 
 class EfsDirectory : public test::EfsTest {
  protected:

@@ -1,24 +1,16 @@
 // Every fault of the line at every packet of a transfer and of a listing: exact bytes, or a clean failure. And what
 // becomes of late answers: they are nobody else's, and the handles that they tell of are closed.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <array>
-#include <atomic>
-#include <chrono>
-#include <thread>
-
 #include "storage/efs/efs_settings.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::Bytes;
-using handset::Fault;
 
 // Passes: the host never notices. Again: one try is spoilt; requests that are sent once fail. Gone: nothing works.
 enum class Harm { kPasses, kAgain, kGone };

@@ -1,12 +1,10 @@
 // Jobs that the phone server does: which of its methods are called, and what is logged when one of them fails.
-#include <gtest/gtest.h>
-
-#include <stdexcept>
-
 #include "kral/efs.h"
+#include "kral/pkv.h"
 #include "kral/text_log.h"
 #include "tests/support/phone_log.h"
 #include "tests/support/scripted_server.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
@@ -165,7 +163,35 @@ TEST_F(EfsServerJobs, FailuresAreNamedAndThePhoneIsUnlocked) {
 TEST_F(EfsServerJobs, DirectModeHasNoServer) {
   KRAL_SetLibraryMode(0);
   EXPECT_EQ(Errors(RemoveTree, 0), "EFS::EfsStarter - Not connected to Server|");
+  EXPECT_EQ(Errors([](KRAL_HANDLE handle) { return KRAL_UploadPkvFile(handle, "a.pkv", 0); }, 0),
+            "KRAL_UploadPkvFile() - no phone server|");
   EXPECT_EQ(Calls(), "");
+}
+
+TEST(PkvServer, JobsGoToItsDownloadAgent) {
+  static std::vector<std::string> calls;
+  calls.clear();
+  class Agent : public SoftwareDownload {
+   public:
+    bool UploadPkvFile(const std::string& file, uint32_t options) override { return Note("up " + file, options); }
+    bool DownloadPkvFile(const std::string& file, uint32_t options) override { return Note("down " + file, options); }
+
+   private:
+    static bool Note(const std::string& call, uint32_t options) {
+      calls.push_back(call + " " + std::to_string(options));
+      if (options == 99) throw OrbtServerException();
+      return options != 98;
+    }
+  };
+  test::ScriptedServer server;
+  ServerFactory factory = CurrentServerFactory();
+  factory.make_software_download = [](const char*, OrbtServer&) { return std::make_unique<Agent>(); };
+  SetServerFactory(factory);
+  const KRAL_HANDLE handle = KRAL_ConnectServer(7);
+  EXPECT_EQ(KRAL_UploadPkvFile(handle, "a.pkv", 5), 1);
+  EXPECT_EQ(KRAL_DownloadPkvFile(handle, nullptr, 98), 0);
+  EXPECT_EQ(KRAL_DownloadPkvFile(handle, "b.pkv", 99), 0);
+  EXPECT_EQ(calls, (std::vector<std::string>{"up a.pkv 5", "down  98", "down b.pkv 99"}));
 }
 
 }  // namespace

@@ -1,14 +1,12 @@
 // Transfers between the PC and the handset: what goes over the wire, what ends up on either side, and what fails.
-#include <gtest/gtest.h>
-
 #include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
 using handset::Bytes;
-using handset::ByteWriter;
 
 class EfsTransfer : public test::EfsTest {
  protected:
@@ -327,28 +325,48 @@ class EfsLies : public EfsTransfer {
   }
 };
 
-TEST_F(EfsLies, ReadRepliesAreCheckedAgainstWhatWasAskedAndReceived) {
+TEST_F(EfsLies, RepliesAreCheckedAgainstWhatWasAskedAndReceived) {
   handset().efs().AddFile("/f", Bytes{1, 2, 3, 4});
-  struct Lie {
+  handset().efs().AddItemFile("/i", Bytes{1, 2, 3, 4});
+  constexpr uint16_t kRead = 4, kWrite = 5, kGetItem = 39;
+  const struct {
     const char* name;
-    std::string reply;  // to a read of descriptor 0 at offset 0
+    uint16_t command;
+    std::string reply;  // to a read of four bytes, a write of a hundred, a request for an item of four
+  } kLies[] = {
+      {"more than asked", kRead, "4B 13 04 00 00000000 00000000 05020000 00000000" + HexText(Bytes(517))},
+      {"more than received", kRead, "4B 13 04 00 00000000 00000000 04000000 00000000 01 02 03"},
+      {"negative", kRead, "4B 13 04 00 00000000 00000000 FFFFFFFF 00000000"},
+      {"another descriptor", kRead, "4B 13 04 00 01000000 00000000 04000000 00000000 01 02 03 04"},
+      {"another offset", kRead, "4B 13 04 00 00000000 04000000 04000000 00000000 01 02 03 04"},
+      {"another command", kRead, "4B 13 05 00 00000000 00000000 04000000 00000000 01 02 03 04"},
+      {"cut", kRead, "4B 13 04 00 00000000 00000000 04000000 000000"},
+      {"fewer than the file has", kRead, "4B 13 04 00 00000000 00000000 03000000 00000000 01 02 03"},
+      {"more written than asked", kWrite, "4B 13 05 00 00000000 00000000 65000000 00000000"},
+      {"negative write", kWrite, "4B 13 05 00 00000000 00000000 FFFFFFFF 00000000"},
+      {"write of another descriptor", kWrite, "4B 13 05 00 07000000 00000000 64000000 00000000"},
+      {"write at another offset", kWrite, "4B 13 05 00 00000000 01000000 64000000 00000000"},
+      {"cut write", kWrite, "4B 13 05 00 00000000"},
+      {"larger item", kGetItem, "4B 13 27 00 05000000 00000000 01 00 01 02 03 04 05"},
+      {"item of more than received", kGetItem, "4B 13 27 00 04000000 00000000 01 00 01 02 03"},
+      {"negative item", kGetItem, "4B 13 27 00 FFFFFFFF 00000000 01 00 01 02 03 04"},
+      {"smaller item", kGetItem, "4B 13 27 00 03000000 00000000 01 00 01 02 03"},
+      {"cut item", kGetItem, "4B 13 27 00 00000000 00000000 01"},
   };
-  for (const Lie& lie : {Lie{"more than asked", "4B 13 04 00 00000000 00000000 05020000 00000000"},
-                         Lie{"more than received", "4B 13 04 00 00000000 00000000 04000000 00000000 01 02 03"},
-                         Lie{"negative", "4B 13 04 00 00000000 00000000 FFFFFFFF 00000000"},
-                         Lie{"another descriptor", "4B 13 04 00 01000000 00000000 04000000 00000000 01 02 03 04"},
-                         Lie{"another offset", "4B 13 04 00 00000000 04000000 04000000 00000000 01 02 03 04"},
-                         Lie{"another command", "4B 13 05 00 00000000 00000000 04000000 00000000 01 02 03 04"},
-                         Lie{"cut", "4B 13 04 00 00000000 00000000 04000000 000000"},
-                         Lie{"fewer than the file has", "4B 13 04 00 00000000 00000000 03000000 00000000 01 02 03"}}) {
+  const Bytes data = RandomBytes(100);
+  for (const auto& lie : kLies) {
     SCOPED_TRACE(lie.name);
-    Bytes reply = handset::FromHex(lie.reply);
-    if (std::string_view(lie.name) == "more than asked") reply.resize(20 + 517);
-    Answer(4, [reply](handset::ByteView) { return reply; });
+    Answer(lie.command, [reply = FromHex(lie.reply)](ByteView) { return reply; });
+    if (lie.command == kWrite) {
+      EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 100, "/new"), 0);
+      EXPECT_FALSE(handset().efs().Exists("/new"));
+      continue;
+    }
+    const char* const path = lie.command == kRead ? "/f" : "/i";
     Bytes back(1000, 0xEE);
-    EXPECT_EQ(ReadMem("/f", back), 0);
+    EXPECT_EQ(ReadMem(path, back), 0);
     EXPECT_EQ(back.size(), 1000u);
-    EXPECT_EQ(KRAL_EfsRead(handle(), folder_.Path("local").c_str(), "/f"), 0);
+    EXPECT_EQ(KRAL_EfsRead(handle(), folder_.Path("local").c_str(), path), 0);
     EXPECT_EQ(folder_.Content("local"), "");
   }
 }
@@ -376,33 +394,6 @@ TEST_F(EfsLies, PartThatCannotBeRemovedIsNamed) {
   EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 100, "/f"), 0);
   EXPECT_EQ(unlinks, 5);
   EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "EFS Write leaves a part of /f behind"));
-}
-
-TEST_F(EfsLies, WriteRepliesAreChecked) {
-  const Bytes data = RandomBytes(100);
-  for (const char* reply :
-       {"4B 13 05 00 00000000 00000000 65000000 00000000", "4B 13 05 00 00000000 00000000 FFFFFFFF 00000000",
-        "4B 13 05 00 07000000 00000000 64000000 00000000", "4B 13 05 00 00000000 01000000 64000000 00000000",
-        "4B 13 05 00 00000000"}) {
-    SCOPED_TRACE(reply);
-    Answer(5, [reply](handset::ByteView) { return handset::FromHex(reply); });
-    EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), 100, "/f"), 0);
-    EXPECT_FALSE(handset().efs().Exists("/f"));
-  }
-}
-
-TEST_F(EfsLies, ItemRepliesAreChecked) {
-  handset().efs().AddItemFile("/i", Bytes{1, 2, 3, 4});
-  for (const char* reply :
-       {"4B 13 27 00 05000000 00000000 01 00 01 02 03 04 05", "4B 13 27 00 04000000 00000000 01 00 01 02 03",
-        "4B 13 27 00 FFFFFFFF 00000000 01 00 01 02 03 04", "4B 13 27 00 03000000 00000000 01 00 01 02 03",
-        "4B 13 27 00 00000000 00000000 01"}) {
-    SCOPED_TRACE(reply);
-    Answer(39, [reply](handset::ByteView) { return handset::FromHex(reply); });
-    Bytes back(1000);
-    EXPECT_EQ(ReadMem("/i", back), 0);
-    EXPECT_EQ(back.size(), 1000u);
-  }
 }
 
 }  // namespace

@@ -1,122 +1,20 @@
 // Backups of a handset, their way back, and comparisons: what goes over the wire, what became of each item, and what
 // happens when the handset refuses, answers late or goes away.
-#include <gtest/gtest.h>
-
-#include <map>
-#include <thread>
-
 #include "kral/nv.h"
 #include "kral/nv_tool.h"
-#include "kral/pkv.h"
-#include "storage/pkv/pkv_set.h"
-#include "tests/support/efs_fixture.h"
-#include "tests/support/scripted_server.h"
-#include "tests/support/temp_folder.h"
+#include "tests/support/pkv_fixture.h"
+#include "tests/support/test.h"
 #include "tests/support/version_numbers.h"
 
 namespace kral {
 namespace {
 
 using handset::Bytes;
-using handset::Fault;
 using handset::NvStatus;
-using handset::When;
-
-constexpr const char* kRfFile = "/nv/item_files/rfnv/00020203";
-constexpr uint16_t kItems = 60;  // of the range that is backed up
-
-class PkvBackup : public test::EfsTest {
- protected:
-  void SetUp() override {
-    EfsTest::SetUp();
-    Configure();
-  }
-  void TearDown() override {
-    g_stop_at = 0;
-    EfsTest::TearDown();
-  }
-
-  void Configure(uint16_t subscriptions = 1) {
-    ASSERT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, kItems - 1, subscriptions), 1);
-    ASSERT_EQ(KRAL_PKV_ConfigureCallBack(handle(), OnItem), 1);
-    g_results.clear();
-  }
-
-  // Every third item has a value; the files are an item, an empty item, and one that is no item, in a folder below.
-  void Furnish() {
-    for (uint16_t id = 0; id < kItems; id += 3) handset().nv().Set(id, RandomBytes(128, id));
-    handset().efs().AddItemFile(kRfFile, RandomBytes(300));
-    handset().efs().AddItemFile("/nv/items/empty", {});
-    handset().efs().AddFile("/nv/reg_files/conf/below/plain", RandomBytes(2000));
-  }
-  static constexpr uint32_t kValues = kItems / 3 + 3;
-
-  // A handset as it comes from the line: only what every handset has.
-  void MakeBlank() {
-    for (uint16_t id = 1; id < kItems; ++id) {
-      handset().nv().Erase(id);
-      handset().nv().Erase(id, 1);
-    }
-    for (const char* path : {kRfFile, "/nv/items/empty", "/nv/reg_files/conf/below/plain"}) Remove(path);
-  }
-  void Remove(const char* path) { KRAL_EfsDelete(handle(), path, nullptr); }
-
-  using Job = uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* file, uint32_t* status);
-  // The status; the result must be in step with it.
-  uint32_t Run(Job job, const char* name = "phone.pkv") {
-    g_results.clear();
-    uint32_t status = 0xAAAAAAAA;
-    const uint8_t result = job(handle(), folder_.Path(name).c_str(), &status);
-    EXPECT_EQ(result, status == 0 ? 1 : 0);
-    return status;
-  }
-  pkv::PkvSet Read(const char* name = "phone.pkv") {
-    pkv::PkvSet set;
-    const pkv::PkvOutcome outcome = pkv::ReadPkv(folder_.Path(name), set);
-    EXPECT_TRUE(outcome.done()) << outcome.text;
-    return set;
-  }
-  // "done skipped refused different not-read-back not-reached"
-  std::string Counts() {
-    KRAL_PKV_COUNTS counts{};
-    EXPECT_EQ(KRAL_PKV_GetCounts(handle(), &counts), 1);
-    const uint32_t all[] = {counts.done,      counts.skipped,       counts.refused,
-                            counts.different, counts.not_read_back, counts.not_reached};
-    std::string text;
-    uint32_t sum = 0;
-    for (const uint32_t count : all) {
-      text += (text.empty() ? "" : " ") + std::to_string(count);
-      sum += count;
-    }
-    EXPECT_EQ(sum, counts.total);
-    return text;
-  }
-  size_t RequestsOf(const Bytes& prefix) {
-    const auto requests = handset().requests();
-    return static_cast<size_t>(std::count_if(requests.begin(), requests.end(), [&](const Bytes& request) {
-      return request.size() >= prefix.size() && std::equal(prefix.begin(), prefix.end(), request.begin());
-    }));
-  }
-
-  // Result and status by "id", "id[index]" or path.
-  static inline std::map<std::string, std::pair<uint32_t, uint32_t>> g_results;
-  static inline uint32_t g_stop_at = 0;
-
-  static uint8_t KRAL_CALL OnItem(const KRAL_PKV_ITEM* item, const char* path, uint32_t done, uint32_t total,
-                                  KRAL_HANDLE) {
-    std::string name = path != nullptr ? path : std::to_string(item->id);
-    if (item->index != 0) name += "[" + std::to_string(item->index) + "]";
-    if (item->subscription != 0) name += "/" + std::to_string(item->subscription);
-    EXPECT_TRUE(g_results.emplace(name, std::pair(item->result, item->status)).second) << name << " reported twice";
-    EXPECT_EQ(done, g_results.size());
-    EXPECT_LE(done, total);
-    return done == g_stop_at ? 0 : 1;
-  }
-
-  test::TempFolder folder_;
-};
-
-using Result = std::pair<uint32_t, uint32_t>;
+using PkvBackup = test::PkvTest;
+using test::kItems;
+using test::kRfFile;
+using test::Result;
 
 TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
   Configure(2);
@@ -150,20 +48,6 @@ TEST_F(PkvBackup, RestoredToABlankHandsetItIsTheSameAgain) {
   const pkv::PkvSet again = Read("again.pkv");
   EXPECT_EQ(again.items, first.items);
   EXPECT_EQ(again.files, first.files);
-}
-
-TEST_F(PkvBackup, ItemsAreRestoredInPacketsOfNineAndReadBack) {
-  pkv::PkvSet set;
-  for (uint16_t id = 1; id <= 20; ++id) set.items.push_back({.id = id, .data = {static_cast<uint8_t>(id)}});
-  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
-  handset().ClearTrace();
-  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
-  std::vector<size_t> sizes;
-  for (const Bytes& request : handset().requests()) {
-    if (request[0] == 75) sizes.push_back(request[4]);
-  }
-  EXPECT_EQ(sizes, (std::vector<size_t>{9, 9, 2}));
-  EXPECT_EQ(handset().requests().size(), 3u + 20u);
 }
 
 TEST_F(PkvBackup, EveryRefusalIsTheItemsOwn) {
@@ -497,7 +381,6 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
     EXPECT_EQ(Run(job, "other.pkv"), KRAL_PKV_STATUS_NO_STORAGE);
     EXPECT_EQ(Run(job, "damaged.pkv"), KRAL_PKV_STATUS_BAD_ITEM);
     EXPECT_EQ(job(handle(), nullptr, nullptr), 0);
-    EXPECT_EQ(job(0, "none.pkv", nullptr), 0);
   }
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "no folder/phone.pkv"), KRAL_PKV_STATUS_CANNOT_OPEN);
   uint32_t status = 0;
@@ -512,181 +395,6 @@ TEST_F(PkvBackup, FilesAndArgumentsThatCannotBeUsedAreToldApart) {
   EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 2, 1, 1), 0);
   EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 0), 0);
   EXPECT_EQ(KRAL_PKV_ConfigureBackup(handle(), 0, 1, 17), 0);
-}
-
-TEST_F(PkvBackup, HostileListingsAndFilesAreLeftOut) {
-  handset().efs().AddItemFile("/nv/items/good", Bytes{1});
-  for (int i = 0; i < 300; ++i) handset().efs().AddLink("/nv/items/" + std::to_string(i), "good");  // listed twice
-  handset().efs().AddFile("/nv/items/huge", Bytes((1 << 20) + 1));
-  std::string deep = "/nv/items";
-  for (int i = 0; i < 12; ++i) deep += "/d";
-  handset().efs().AddFile(deep + "/deep", Bytes{1});
-  handset().efs().AddLink("/nv/items/loop", "/nv/items");
-  handset().efs().AddDirectory("/nv/items/self");
-  handset().efs().AddDirectory("/nv/items/above");
-  handset().efs().ShowNameAs("self", ".");
-  handset().efs().ShowNameAs("above", "..");
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE) << ErrorText();
-  EXPECT_EQ(g_results["/nv/items/huge"], Result(KRAL_PKV_REFUSED, 0xFFFF));
-  ASSERT_EQ(Read().files.size(), 1u);
-  EXPECT_EQ(Read().files[0].path, "/nv/items/good");
-}
-
-TEST_F(PkvBackup, ItemFilesBeyondARequestAreReadWhereTheHandsetOpensThem) {
-  const std::string large = "/nv/item_files/rfnv/00020204";
-  handset().efs().AddItemFile(large, RandomBytes(2000));
-  handset().efs().OpenItemFiles(true);
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
-  ASSERT_EQ(Read().files.size(), 1u);
-  EXPECT_EQ(Read().files[0].bytes, RandomBytes(2000));
-  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u) << ErrorText();
-}
-
-// This handset opens no item file as a plain one, so that one beyond an item request cannot be had whole.
-TEST_F(PkvBackup, FilesThatCannotBeHadWholeAreRefused) {
-  const std::string large = "/nv/item_files/rfnv/00020204";
-  const std::string far = "/nv/items/" + std::string(200, 'f') + "/" + std::string(40, 'p');
-  handset().efs().AddItemFile(large, RandomBytes(2000));
-  handset().efs().AddItemFile("/nv/items/full", RandomBytes(1024));
-  handset().efs().AddFile(far, Bytes{1});
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), KRAL_PKV_STATUS_INCOMPLETE) << ErrorText();
-  EXPECT_EQ(g_results[large], Result(KRAL_PKV_REFUSED, 0xFFFF));
-  EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
-  pkv::PkvSet set = Read();
-  ASSERT_EQ(set.files.size(), 1u);
-  EXPECT_EQ(set.files[0].bytes, RandomBytes(1024));
-  set.files.push_back({large, 0xE1FF, RandomBytes(1024)});  // as if it were whole
-  set.files.push_back({far, 0x81FF, {1}});
-  set.files.push_back({"/nv/items/last", 0xE1FF, {1}});
-  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
-  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
-  EXPECT_EQ(g_results[large].first, KRAL_PKV_REFUSED);
-  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
-  EXPECT_EQ(g_results[far], Result(KRAL_PKV_REFUSED, 0xFFFF));
-  EXPECT_EQ(g_results["/nv/items/last"], Result(KRAL_PKV_DONE, 0));
-}
-
-TEST_F(PkvBackup, PermissionsComeBackAndARefusalOfThemIsTold) {
-  const std::string with_none = "/nv/items/none";
-  pkv::PkvSet set;
-  set.files = {{kRfFile, 0xE124, {1, 2}}, {with_none, 0x8000, {3}}};
-  ASSERT_TRUE(pkv::WritePkv(folder_.Path("phone.pkv"), set).done());
-  Run(KRAL_RestoreNVFromPKV);
-  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DONE, 0));
-  EXPECT_EQ(handset().efs().Mode(kRfFile), 0xE124u);
-  EXPECT_EQ(g_results[with_none], Result(KRAL_PKV_DONE, 0)) << ErrorText();
-  EXPECT_EQ(handset().efs().Mode(with_none), 0x8000u);
-
-  Remove(kRfFile);
-  handset().faults().Add(handset::Refuse(20), When::Always().Of("4B 13 12 00"));
-  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
-  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DIFFERENT, 0)) << "content alike, permissions not";
-  EXPECT_EQ(Run(KRAL_PKV_Verify), KRAL_PKV_STATUS_DIFFERENT);
-  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_DIFFERENT, 0));
-}
-
-TEST_F(PkvBackup, AReadOnlyFileIsSkippedWhenItIsEqual) {
-  const std::string plain = "/nv/items/plain";
-  handset().efs().AddFile(plain, RandomBytes(600), 0444);
-  handset().efs().AddItemFile(kRfFile, RandomBytes(30));
-  ASSERT_EQ(KRAL_EFS2_DIAG_CHMOD(handle(), kRfFile, 0444, nullptr), 1);
-  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
-  ASSERT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
-  EXPECT_EQ(g_results[kRfFile], Result(KRAL_PKV_SKIPPED, 13));
-  EXPECT_EQ(g_results[plain].first, KRAL_PKV_SKIPPED);
-  handset().efs().AddFile(plain, RandomBytes(600, 2), 0444);
-  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), KRAL_PKV_STATUS_NOT_WRITTEN);
-  EXPECT_EQ(g_results[plain].first, KRAL_PKV_REFUSED);
-}
-
-// "nv/x" beside "/nv/x", as other programs and older versions of this one wrote them.
-TEST_F(PkvBackup, AFileThatIsThereTwiceIsRestoredOnce) {
-  CompoundStorage root;
-  CompoundStorage& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
-  int number = 0;
-  for (const std::string path : {"/nv/items/x", "nv/items/x"}) {
-    const std::string name = "0000000" + std::to_string(number++);
-    Bytes entry = handset::FromHex("B6 81 00 00 01 00 00 00");
-    entry.insert(entry.end(), path.begin(), path.end());
-    files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream(name).bytes = entry;
-    files.OpenOrAddStorage("EFS_Data").OpenOrAddStream(name).bytes = {static_cast<uint8_t>(number)};
-  }
-  ASSERT_EQ(SaveCompoundFile(folder_.Path("phone.pkv"), root), "");
-  EXPECT_EQ(Run(KRAL_RestoreNVFromPKV), 0u) << ErrorText();
-  EXPECT_EQ(Counts(), "1 1 0 0 0 0") << "the second one counts as skipped";
-  EXPECT_NE(ErrorText().find("nv/items/x: a second content; passed over"), std::string::npos) << ErrorText();
-  EXPECT_EQ(handset().efs().File("/nv/items/x"), Bytes{1});
-  EXPECT_EQ(Run(KRAL_PKV_Verify), 0u);
-}
-
-TEST_F(PkvBackup, APlainFileIsAskedForItsSizeOnce) {
-  const std::string path = "/nv/items/plain";
-  handset().efs().AddFile(path, RandomBytes(600));
-  Bytes request = {75, 19, 15, 0};
-  request.insert(request.end(), path.begin(), path.end());
-  for (const Job job : {KRAL_BackupNVFromMobileToPKV, KRAL_PKV_Verify}) {
-    handset().ClearTrace();
-    ASSERT_EQ(Run(job), 0u) << ErrorText();
-    EXPECT_EQ(RequestsOf(request), 1u);
-  }
-}
-
-// Only what is not there has no files.
-TEST_F(PkvBackup, FoldersThatCannotBeListedAreTold) {
-  Furnish();
-  const struct {
-    const char* name;
-    Fault fault;
-    When when;
-    std::string counts;
-    uint32_t status;
-  } kRows[] = {
-      {"no file system", handset::Refuse(19), When::Always().Of("4B 13"), "20 40 0 0 0 0", 0},
-      {"stat refused", handset::Refuse(20), When::Nth(1).Of("4B 13 0F 00"), "22 40 1 0 0 0", 12},
-      {"opendir refused", handset::Refuse(24), When::Always().Of("4B 13 0B 00"), "20 40 3 0 0 0", 12},
-  };
-  for (const auto& row : kRows) {
-    SCOPED_TRACE(row.name);
-    handset().faults().Add(row.fault, row.when);
-    EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), row.status) << ErrorText();
-    EXPECT_EQ(Counts(), row.counts);
-    EXPECT_EQ(g_results.contains("/nv/items"), std::string_view(row.name) != "no file system");
-    handset().faults().Clear();
-  }
-}
-
-// --- The phone server -----------------------------------------------------------------------------------------------
-
-TEST(PkvServer, JobsGoToItsDownloadAgent) {
-  static std::vector<std::string> calls;
-  calls.clear();
-  class Agent : public SoftwareDownload {
-   public:
-    bool UploadPkvFile(const std::string& file, uint32_t options) override { return Note("up " + file, options); }
-    bool DownloadPkvFile(const std::string& file, uint32_t options) override { return Note("down " + file, options); }
-
-   private:
-    static bool Note(const std::string& call, uint32_t options) {
-      calls.push_back(call + " " + std::to_string(options));
-      if (options == 99) throw OrbtServerException();
-      return options != 98;
-    }
-  };
-  test::ScriptedServer server;
-  ServerFactory factory = CurrentServerFactory();
-  factory.make_software_download = [](const char*, OrbtServer&) { return std::make_unique<Agent>(); };
-  SetServerFactory(factory);
-  const KRAL_HANDLE handle = KRAL_ConnectServer(7);
-  EXPECT_EQ(KRAL_UploadPkvFile(handle, "a.pkv", 5), 1);
-  EXPECT_EQ(KRAL_DownloadPkvFile(handle, nullptr, 98), 0);
-  EXPECT_EQ(KRAL_DownloadPkvFile(handle, "b.pkv", 99), 0);
-  EXPECT_EQ(calls, (std::vector<std::string>{"up a.pkv 5", "down  98", "down b.pkv 99"}));
-}
-
-TEST_F(PkvBackup, WithoutAServerItsJobsGiveZero) {
-  EXPECT_EQ(KRAL_UploadPkvFile(handle(), "a.pkv", 0), 0);
-  EXPECT_EQ(KRAL_DownloadPkvFile(handle(), "a.pkv", 0), 0);
-  EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "KRAL_UploadPkvFile() - no phone server"));
 }
 
 }  // namespace

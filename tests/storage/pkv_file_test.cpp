@@ -1,17 +1,11 @@
 // PKV files: both record layouts, both writers, the library's own file class, and files that are damaged.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <functional>
-#include <optional>
-#include <tuple>
-
 #include "kral/pkv.h"
 #include "storage/backup/pkv_jobs.h"
 #include "storage/pkv/nv_storage.h"
 #include "storage/pkv/pkv_set.h"
 #include "storage/pkv/varn_pkv_file.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 #include "tests/support/version_numbers.h"
 
 namespace kral::pkv {
@@ -217,10 +211,10 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
   const auto array = [&](const std::vector<uint8_t>& records) {
     tree([&](auto& root) { root.OpenOrAddStream("NV_ITEM_ARRAY").bytes = records; });
   };
-  const auto directory = [&](const std::vector<uint8_t>& entry, bool with_content) {
+  const auto directory = [&](const char* entry, bool with_content) {
     tree([&](auto& root) {
       auto& files = root.OpenOrAddStorage("Default_Phone_Configuration").OpenOrAddStorage("EFS_Backup");
-      files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = entry;
+      files.OpenOrAddStorage("EFS_Dir").OpenOrAddStream("00000000").bytes = FromHex(entry);
       if (with_content) files.OpenOrAddStorage("EFS_Data").OpenOrAddStream("00000000");
     });
   };
@@ -241,16 +235,8 @@ TEST_F(PkvFiles, DamagedOnesAreToldApart) {
       {"a record of another id than its storage", [&] { numbered(bytes_of(NumberedRecord(Item(2, 1)))); },
        PkvResult::kDamagedItem},
       {"an array record of another length", [&] { array(bytes_of(longer)); }, PkvResult::kDamagedItem},
-      {"a file without content",
-       [&] {
-         directory({0, 0, 0, 0, 3, 0, 0, 0, '/', 'a'}, false);
-       },
-       PkvResult::kDamagedItem},
-      {"a path with a zero",
-       [&] {
-         directory({0, 0, 0, 0, 0, 0, 0, 0, '/', 0, 'a'}, true);
-       },
-       PkvResult::kDamagedItem},
+      {"a file without content", [&] { directory("00000000 03000000 2F 61", false); }, PkvResult::kDamagedItem},
+      {"a path with a zero", [&] { directory("00000000 00000000 2F 00 61", true); }, PkvResult::kDamagedItem},
   };
   for (const auto& row : kRows) {
     SCOPED_TRACE(row.what);
@@ -404,20 +390,19 @@ TEST_F(PkvFiles, WhatTheReaderWouldRefuseForItsSizeIsNotWritten) {
 TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
   VARN_PkvFile none;
   VARN_PkvFile::Iterator unset;
-  VARN_PkvFile full(Path());
-  full << Item(453, 1);
-  full.set_size_limit(133);
+  // Files of the same item, and maybe of a file, that may grow to so many bytes.
+  std::deque<VARN_PkvFile> made;
+  const auto limited = [&](size_t limit, bool with_file = false) {
+    return [&, limit, with_file] {
+      VARN_PkvFile& file = made.emplace_back(Path());
+      file << Item(453, 1);
+      if (with_file) file << PkvEfsFile{"/nv/items/x", 0xE1FF, {1}};
+      file.set_size_limit(limit);
+      file.writeToDisk();
+    };
+  };
   VARN_PkvFile files_only(Path());
   files_only << PkvEfsFile{"/nv/items/x", 0xE1FF, {1}};
-  VARN_PkvFile without_file(Path());
-  without_file << Item(453, 1) << PkvEfsFile{"/nv/items/x", 0xE1FF, {1}};
-  without_file.set_size_limit(134 + 19);
-  VARN_PkvFile without_properties(Path());
-  without_properties << Item(453, 1);
-  without_properties.set_size_limit(134 + 5);
-  VARN_PkvFile without_version(Path());
-  without_version << Item(453, 1);
-  without_version.set_size_limit(134 + 12 + 3);
   const std::string iterator = "VARN_PkvFile::Iterator::";
   const std::string unset_end = " - The iterator is not initialized.";
   const std::string impl = "VARN_PkvFile::writeToDiskImpl() - Tried to write ";
@@ -431,8 +416,7 @@ TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
       {[&] { files_only.writeToDisk(); },
        "VARN_PkvFile::writeToDisk() - Before calling this member function you need to add at least 1 NV item to the "
        "this object using the insertion operator."},
-      {[&] { without_file.writeToDisk(); },
-       impl + "EFS File: '/nv/items/x' but was only able to write 19 out of 20 bytes"},
+      {limited(134 + 19, true), impl + "EFS File: '/nv/items/x' but was only able to write 19 out of 20 bytes"},
       {[&] { none.begin(); },
        "VARN_PkvFile::begin() - Error no PKV file has been opened.  Either create the PKV with a file name, or call "
        "the open member function with a file name as a parameter."},
@@ -442,11 +426,9 @@ TEST_F(PkvFiles, EveryMisuseRaisesItsText) {
       {[&] { unset++; }, iterator + "operator++( int )" + unset_end},
       {[&] { (void)(unset == unset); }, iterator + "operator==( const VARN_PkvFile::Iterator& rhs )" + unset_end},
       {[&] { (void)(unset != unset); }, iterator + "operator!=( const VARN_PkvFile::Iterator& rhs )" + unset_end},
-      {[&] { full.writeToDisk(); }, impl + "NV Item: '453' but was only able to write 133 out of 134 bytes"},
-      {[&] { without_properties.writeToDisk(); },
-       impl + "the Mobile_Property_Info but was only able to write 5 out of 12 bytes"},
-      {[&] { without_version.writeToDisk(); },
-       impl + "the File_Version Stream but was only able to write 3 out of 8 bytes"},
+      {limited(133), impl + "NV Item: '453' but was only able to write 133 out of 134 bytes"},
+      {limited(134 + 5), impl + "the Mobile_Property_Info but was only able to write 5 out of 12 bytes"},
+      {limited(134 + 12 + 3), impl + "the File_Version Stream but was only able to write 3 out of 8 bytes"},
   };
   for (const auto& row : kRows) EXPECT_EQ(RaisedBy(row.action), row.text);
   EXPECT_EQ(folder_.Content("phone.pkv"), "");

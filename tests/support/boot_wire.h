@@ -2,16 +2,11 @@
 #ifndef KRAL_TESTS_SUPPORT_BOOT_WIRE_H
 #define KRAL_TESTS_SUPPORT_BOOT_WIRE_H
 
-#include <gtest/gtest.h>
-
-#include <deque>
-#include <memory>
-#include <vector>
-
 #include "download/boot/kivrat.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/connection.h"
+#include "tests/support/test.h"
 #include "tests/support/test_wire.h"
 
 namespace kral::test {

@@ -2,16 +2,13 @@
 #ifndef KRAL_TESTS_SUPPORT_DOWNLOAD_FIXTURE_H
 #define KRAL_TESTS_SUPPORT_DOWNLOAD_FIXTURE_H
 
-#include <cstdint>
-#include <random>
-#include <vector>
-
 #include "download/link/download_settings.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/diag.h"
 #include "kral/download.h"
 #include "tests/support/handset_connection.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 
@@ -58,6 +55,35 @@ class DownloadTest : public HandsetTest {
     size_t count = 0;
     for (const auto& packet : handset().programmer().packets()) count += packet[0] == code ? 1 : 0;
     return count;
+  }
+
+  // The call, struck by the fault at the first replies from now on that `when` picks.
+  uint8_t Struck(handset::Fault fault, const handset::When& when, const std::function<uint8_t()>& call) {
+    handset().faults().Clear();
+    handset().faults().Add(fault, when);
+    const uint8_t result = call();
+    handset().faults().Clear();
+    return result;
+  }
+
+  // Replies are lost, and silence is not awaited for long. Everything else may take its time on a busy machine.
+  uint8_t Silent(const handset::When& when, const std::function<uint8_t()>& call) {
+    settings().handshake_limit_ms = 50;
+    AcknowledgeWithin(30);
+    KRAL_ConfigureTimeOut(handle(), 0, 250);
+    const uint8_t result = Struck(handset::Lose(), when, call);
+    settings().handshake_limit_ms = UINT32_MAX;
+    AcknowledgeWithin(UINT32_MAX);
+    KRAL_ConfigureTimeOut(handle(), 0, 2000);
+    return result;
+  }
+
+  uint8_t Aborted(const std::function<uint8_t()>& call) {
+    const auto abort = [](KRAL_HANDLE phone, uint32_t, uint32_t, uintptr_t) { KRAL_AbortDownload(phone); };
+    KRAL_ConfigureDownloadCallBack(handle(), abort, 0);
+    const uint8_t result = call();
+    KRAL_ConfigureDownloadCallBack(handle(), nullptr, 0);
+    return result;
   }
 
   uint32_t block_size_ = 0;

@@ -2,14 +2,12 @@
 #ifndef KRAL_TESTS_SUPPORT_EFS_FIXTURE_H
 #define KRAL_TESTS_SUPPORT_EFS_FIXTURE_H
 
-#include <cstdint>
-#include <random>
-
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "kral/efs.h"
 #include "storage/efs/efs_settings.h"
 #include "tests/support/handset_connection.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

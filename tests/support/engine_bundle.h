@@ -2,14 +2,8 @@
 #ifndef KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
 #define KRAL_TESTS_SUPPORT_ENGINE_BUNDLE_H
 
-#include <gtest/gtest.h>
-
-#include <chrono>
-#include <memory>
-#include <thread>
-#include <utility>
-
 #include "tests/support/log_lines.h"
+#include "tests/support/test.h"
 #include "transport/collection/kral_event_listener.h"
 #include "transport/engine/kral_events.h"
 #include "transport/engine/kral_thread_interface.h"
@@ -73,5 +67,13 @@ class EngineGuard {
 };
 
 }  // namespace kral::test
+
+namespace kral {
+
+using test::EngineBundle;
+using test::EngineGuard;
+using test::Eventually;
+
+}  // namespace kral
 
 #endif

@@ -29,4 +29,10 @@ class FakeClock final : public Clock {
 
 }  // namespace kral::test
 
+namespace kral {
+
+using test::FakeClock;
+
+}  // namespace kral
+
 #endif

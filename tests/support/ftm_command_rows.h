@@ -3,6 +3,7 @@
 #define KRAL_TESTS_SUPPORT_FTM_COMMAND_ROWS_H
 
 #include "kral/ftm.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

@@ -2,13 +2,9 @@
 #ifndef KRAL_TESTS_SUPPORT_FTM_FIXTURE_H
 #define KRAL_TESTS_SUPPORT_FTM_FIXTURE_H
 
-#include <gtest/gtest.h>
-
-#include <array>
-#include <string>
-
 #include "kral/ftm.h"
 #include "tests/support/handset_connection.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

@@ -10,20 +10,12 @@
 #ifndef KRAL_TESTS_SUPPORT_HANDSET_CONNECTION_H
 #define KRAL_TESTS_SUPPORT_HANDSET_CONNECTION_H
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <functional>
-#include <memory>
-#include <string>
-#include <string_view>
-#include <vector>
-
 #include "handset/caller_transport.h"
 #include "handset/virtual_handset.h"
 #include "kral/connection.h"
 #include "kral/text_log.h"
 #include "tests/support/phone_log.h"
+#include "tests/support/test.h"
 
 namespace kral {
 

@@ -2,14 +2,9 @@
 #ifndef KRAL_TESTS_SUPPORT_HANDSET_HOST_H
 #define KRAL_TESTS_SUPPORT_HANDSET_HOST_H
 
-#include <array>
-#include <optional>
-#include <string>
-#include <string_view>
-#include <vector>
-
 #include "handset/line/frame_codec.h"
 #include "handset/virtual_handset.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

@@ -3,17 +3,13 @@
 #ifndef KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 #define KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 
-#include <atomic>
-#include <map>
-#include <memory>
-#include <mutex>
 #include <set>
-#include <vector>
 
 #include "frame/resource_manager.h"
 #include "handset/virtual_handset.h"
 #include "kral/connection.h"
 #include "tests/support/fake_device.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

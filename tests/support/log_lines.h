@@ -53,4 +53,10 @@ class LogLines {
 
 }  // namespace kral::test
 
+namespace kral {
+
+using test::LogLines;
+
+}  // namespace kral
+
 #endif

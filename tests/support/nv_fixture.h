@@ -2,16 +2,10 @@
 #ifndef KRAL_TESTS_SUPPORT_NV_FIXTURE_H
 #define KRAL_TESTS_SUPPORT_NV_FIXTURE_H
 
-#include <gtest/gtest.h>
-
-#include <cstdint>
-#include <string>
-#include <string_view>
-#include <vector>
-
 #include "kral/kral.h"
 #include "tests/support/handset_connection.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 
@@ -19,6 +13,9 @@ namespace kral::test {
 inline std::string ExampleDefinitions() {
   return KRAL_EXAMPLES "/nv_definitions.xml";
 }
+
+inline const std::string kTwoBytes =
+    "<DataType><Member name='a' typeid='word8'/><Member name='b' typeid='word8'/></DataType>";
 
 class NvToolTest : public HandsetTest {
  protected:
@@ -54,6 +51,25 @@ class NvToolTest : public HandsetTest {
   uint32_t Set(uint16_t id, const char* text, uint16_t array_index = 0) {
     return KRAL_NV_SetNVValueStringByNVID(handle(), id, array_index, text);
   }
+  static std::string Item(int id, const char* name = "") {
+    return "<NvItem id='" + std::to_string(id) + "' name='" + name + "'>" + kTwoBytes + "</NvItem>";
+  }
+  std::string Pkv(const std::string& name = "phone.pkv") {
+    const std::string path = Path(name);
+    EXPECT_EQ(KRAL_NV_WriteNVsToPKV(handle(), path.c_str()), 0u) << ErrorText();
+    return path;
+  }
+  std::string Source() {
+    EXPECT_EQ(KRAL_NV_WriteNVsToSource(handle(), Path("out.xml").c_str()), 0u) << ErrorText();
+    return folder_.Content("out.xml");
+  }
+  size_t CountRequests(std::string_view prefix) {
+    const auto requests = handset().requests();
+    return static_cast<size_t>(std::count_if(requests.begin(), requests.end(), [&](const handset::Bytes& request) {
+      return HexText(request).starts_with(prefix);
+    }));
+  }
+
   std::string Path(const std::string& name) const { return folder_.Path(name); }
 
   TempFolder folder_;

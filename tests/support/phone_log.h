@@ -2,16 +2,8 @@
 #ifndef KRAL_TESTS_SUPPORT_PHONE_LOG_H
 #define KRAL_TESTS_SUPPORT_PHONE_LOG_H
 
-#include <algorithm>
-#include <cstring>
-#include <map>
-#include <mutex>
-#include <string>
-#include <string_view>
-#include <utility>
-#include <vector>
-
 #include "kral/text_log.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

@@ -109,4 +109,12 @@ inline Bytes RandomBytes(std::mt19937& random, size_t size, unsigned one_special
 
 }  // namespace kral::test
 
+namespace kral {
+
+using test::PlainFcs;
+using test::PlainFrame;
+using test::WithFcs;
+
+}  // namespace kral
+
 #endif

@@ -3,15 +3,10 @@
 #ifndef KRAL_TESTS_SUPPORT_SCRIPTED_SERVER_H
 #define KRAL_TESTS_SUPPORT_SCRIPTED_SERVER_H
 
-#include <functional>
-#include <memory>
-#include <string>
-#include <utility>
-#include <vector>
-
 #include "frame/orbt_server.h"
 #include "handset/line/bytes.h"
 #include "kral/connection.h"
+#include "tests/support/test.h"
 
 namespace kral::test {
 

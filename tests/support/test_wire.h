@@ -3,19 +3,11 @@
 #ifndef KRAL_TESTS_SUPPORT_TEST_WIRE_H
 #define KRAL_TESTS_SUPPORT_TEST_WIRE_H
 
-#include <algorithm>
-#include <atomic>
-#include <chrono>
 #include <condition_variable>
-#include <deque>
-#include <functional>
-#include <memory>
-#include <mutex>
-#include <utility>
-#include <vector>
 
 #include "tests/support/fake_device.h"
 #include "tests/support/plain_codec.h"
+#include "tests/support/test.h"
 #include "transport/line/serial_port.h"
 
 namespace kral::test {
@@ -159,5 +151,11 @@ class TestWire {
 };
 
 }  // namespace kral::test
+
+namespace kral {
+
+using test::TestWire;
+
+}  // namespace kral
 
 #endif

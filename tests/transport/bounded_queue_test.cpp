@@ -1,14 +1,7 @@
 // The bounded queue: order, the dropping of the oldest, what readers see when, and waiting.
 #include "transport/engine/bounded_queue.h"
 
-#include <gtest/gtest.h>
-
-#include <atomic>
-#include <chrono>
-#include <functional>
-#include <initializer_list>
-#include <thread>
-#include <vector>
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

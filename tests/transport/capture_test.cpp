@@ -1,16 +1,11 @@
 // Capture files: what the writer keeps when the disk does not, what the reader makes of damaged files, and the paces of
 // a playback.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <atomic>
 #include <condition_variable>
-#include <mutex>
-#include <thread>
 
 #include "base/little_endian.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_player.h"
 #include "transport/collection/capture_reader.h"
@@ -19,9 +14,6 @@
 namespace kral {
 namespace {
 
-using test::EngineBundle;
-using test::EngineGuard;
-using test::Eventually;
 using Outcome = CaptureReader::Outcome;
 
 // Takes bytes until it is full, and holds the writer up while it is told to.

@@ -1,20 +1,14 @@
 // The packet modes: how the chunks of a port become packets.
 #include "transport/line/chunk_splitter.h"
 
-#include <gtest/gtest.h>
-
-#include <initializer_list>
-#include <string>
-#include <string_view>
-
 #include "tests/support/log_lines.h"
 #include "tests/support/plain_codec.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using test::Bytes;
-using test::LogLines;
+using handset::Bytes;
 
 Bytes Text(std::string_view text) {
   return {text.begin(), text.end()};

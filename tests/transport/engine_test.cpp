@@ -1,26 +1,14 @@
 // The command engine over a scripted far side: what a request gives back, what it writes to the log, and what becomes
 // of the port.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <array>
-#include <string>
-
 #include "base/hex_dump.h"
 #include "tests/support/engine_bundle.h"
+#include "tests/support/test.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {
 namespace {
 
-using test::Bytes;
-using test::EngineBundle;
-using test::EngineGuard;
-using test::Eventually;
-using test::LogLines;
-using test::PlainFrame;
-using test::TestWire;
-using test::WithFcs;
+using handset::Bytes;
 
 constexpr uint32_t kLong = 5000;
 constexpr uint32_t kShort = 20;

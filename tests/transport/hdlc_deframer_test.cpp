@@ -1,23 +1,15 @@
 // What becomes of a stream: which frames are delivered, which are dropped, and what is said of them.
 #include "transport/line/hdlc_deframer.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <string>
-#include <utility>
-#include <vector>
-
 #include "tests/support/log_lines.h"
 #include "tests/support/plain_codec.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using test::Bytes;
+using handset::Bytes;
 using test::Packets;
-using test::PlainFrame;
-using test::WithFcs;
 using Lines = test::LogLines::Lines;
 
 struct Collector : PacketListener {

@@ -1,18 +1,15 @@
 // Frames as they are built: byte stuffing, the FCS, and what is too long to be sent.
 #include "transport/line/hdlc_frame.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <memory>
-
 #include "tests/support/plain_codec.h"
+#include "tests/support/test.h"
+#include "transport/line/byte_block.h"
+#include "transport/line/fcs16.h"
 
 namespace kral {
 namespace {
 
-using test::Bytes;
-using test::PlainFrame;
+using handset::Bytes;
 
 class HdlcFrame : public testing::Test {
  protected:
@@ -88,6 +85,81 @@ TEST_F(HdlcFrame, EscapePairsBehindTheLimitAreRefusedAndPlainBytesAreNot) {
       }
     }
   }
+}
+
+// --- The frame check -------------------------------------------------------------------------------------------------
+
+uint16_t FcsOf(const Bytes& bytes) {
+  return ComputeFcs16(bytes.data(), static_cast<uint16_t>(bytes.size() * 8));
+}
+
+TEST(Fcs16, AgreesWithPublishedVectors) {
+  const std::string_view digits = "123456789";
+  EXPECT_EQ(FcsOf(Bytes(digits.begin(), digits.end())), 0x906E);
+  EXPECT_EQ(FcsOf({}), 0x0000);
+  // The loopback frame that a port may write when it opens.
+  EXPECT_EQ(FcsOf({0x7B, 0, 1, 2, 3, 4, 5, 6, 7, 8, 9}), 0x5F9D);
+}
+
+TEST(Fcs16, AgreesWithShiftRegisterForEveryLengthAndAlignment) {
+  std::mt19937 random(20);
+  const Bytes bytes = test::RandomBytes(random, 8191 + 16, 128);
+  for (size_t size = 0; size <= 700; ++size) {
+    for (size_t offset = 0; offset < 16; ++offset) {
+      const uint8_t* const data = bytes.data() + offset;
+      ASSERT_EQ(ComputeFcs16(data, static_cast<uint16_t>(size * 8)), PlainFcs(data, size * 8))
+          << size << " bytes at offset " << offset;
+    }
+  }
+  for (size_t size = 701; size <= 8191; size += 1 + random() % 40) {
+    const uint8_t* const data = bytes.data() + random() % 16;
+    ASSERT_EQ(ComputeFcs16(data, static_cast<uint16_t>(size * 8)), PlainFcs(data, size * 8)) << size << " bytes";
+  }
+}
+
+TEST(Fcs16, BitsBehindTheLastWholeByteCountOneByOne) {
+  std::mt19937 random(21);
+  const Bytes bytes = test::RandomBytes(random, 400, 128);
+  for (uint16_t bits = 0; bits < 3200; ++bits) {
+    ASSERT_EQ(ComputeFcs16(bytes.data(), bits), PlainFcs(bytes.data(), bits)) << bits << " bits";
+  }
+  const Bytes longest = test::RandomBytes(random, 8192, 128);
+  EXPECT_EQ(ComputeFcs16(longest.data(), 65535), PlainFcs(longest.data(), 65535));
+}
+
+// --- Blocks of bytes that are searched at once, one by one ----------------------------------------------------------
+
+template <class Block>
+class ByteBlocks : public testing::Test {};
+
+#ifdef __SSE2__
+using Kinds = testing::Types<WordBlock, Sse2Block>;
+#else
+using Kinds = testing::Types<WordBlock>;
+#endif
+TYPED_TEST_SUITE(ByteBlocks, Kinds);
+
+TYPED_TEST(ByteBlocks, FindMarksExactlyTheBytesOfTheValue) {
+  std::mt19937 random(40);
+  // Neighbours of the value are what a search with carries would take for it.
+  const std::array<uint8_t, 8> values = {0x7D, 0x7E, 0x7F, 0x7C, 0xFD, 0xFE, 0x00, 0xFF};
+  for (int round = 0; round < 20000; ++round) {
+    std::array<uint8_t, TypeParam::kSize> bytes;
+    for (uint8_t& byte : bytes) byte = random() % 4 == 0 ? static_cast<uint8_t>(random()) : values[random() % 8];
+    const uint8_t value = values[static_cast<size_t>(round) % values.size()];
+    uint32_t expected = 0;
+    for (size_t i = 0; i < bytes.size(); ++i) expected |= (bytes[i] == value ? 1U : 0U) << i;
+    ASSERT_EQ(TypeParam::Load(bytes.data()).Find(value), expected);
+  }
+}
+
+TYPED_TEST(ByteBlocks, StoreGivesBackWhatWasLoaded) {
+  std::mt19937 random(41);
+  const test::Bytes bytes = test::RandomBytes(random, TypeParam::kSize + 3, 4);
+  test::Bytes copy(bytes.size());
+  TypeParam::Load(bytes.data() + 1).Store(copy.data() + 1);
+  EXPECT_TRUE(std::equal(copy.begin() + 1, copy.end() - 2, bytes.begin() + 1));
+  EXPECT_EQ(copy.front() | copy.back() | copy[copy.size() - 2], 0);
 }
 
 }  // namespace

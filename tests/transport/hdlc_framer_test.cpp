@@ -1,24 +1,16 @@
 // The framer over a scripted port: writes, raw reads, and the switch from data to diagnostic mode.
 #include "transport/line/hdlc_framer.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <deque>
-#include <string>
-#include <utility>
-#include <vector>
-
 #include "tests/support/fake_clock.h"
 #include "tests/support/log_lines.h"
 #include "tests/support/plain_codec.h"
+#include "tests/support/test.h"
 #include "transport/line/serial_port.h"
 
 namespace kral {
 namespace {
 
-using test::Bytes;
-using test::PlainFrame;
+using handset::Bytes;
 using Lines = test::LogLines::Lines;
 using Steps = std::vector<std::string>;
 

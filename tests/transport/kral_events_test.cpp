@@ -1,18 +1,11 @@
 // The dispatcher: who is called with what, in which order, and how its thread begins and ends.
 #include "transport/engine/kral_events.h"
 
-#include <gtest/gtest.h>
-
-#include <functional>
-#include <mutex>
-#include <stdexcept>
-
 #include "tests/support/engine_bundle.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
-
-using test::Eventually;
 
 class Recorder final : public PacketListener {
  public:

@@ -1,9 +1,8 @@
 // Tables of numbers and names, as users write them.
 #include "transport/collection/name_table.h"
 
-#include <gtest/gtest.h>
-
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -1,26 +1,15 @@
 // The receive thread's life: both receive modes, pausing, stopping, and a caller's function that does not come back.
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <string>
-
 #include "tests/support/engine_bundle.h"
 #include "tests/support/failing_allocation.h"
 #include "tests/support/fake_clock.h"
+#include "tests/support/test.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {
 namespace {
 
+using handset::Bytes;
 using std::chrono::milliseconds;
-using test::Bytes;
-using test::EngineBundle;
-using test::EngineGuard;
-using test::Eventually;
-using test::FakeClock;
-using test::LogLines;
-using test::PlainFrame;
-using test::TestWire;
 
 constexpr uint32_t kNoTraffic = 0xFFFFFFFF & ~(kLogIo | kLogInfAhdlc);
 

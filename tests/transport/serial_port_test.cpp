@@ -1,24 +1,16 @@
 // The port over a device that records what is asked of it, and over a caller's functions that misbehave.
 #include "transport/line/serial_port.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <deque>
-#include <stdexcept>
-#include <string>
-#include <vector>
-
 #include "tests/support/fake_clock.h"
+#include "tests/support/fake_device.h"
 #include "tests/support/log_lines.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using test::FakeClock;
-using test::LogLines;
+using handset::Bytes;
 using Lines = LogLines::Lines;
-using Bytes = std::vector<uint8_t>;
 
 // What the device shall do and what was done to it; outlives the device.
 struct Script {
@@ -37,10 +29,10 @@ struct Script {
   int alive = 0;
 };
 
-class FakeDevice : public SerialDevice {
+class ScriptedDevice : public test::FakeDevice {
  public:
-  FakeDevice(Script& script, FakeClock& clock) : script_(script), clock_(clock) { ++script_.alive; }
-  ~FakeDevice() override { --script_.alive; }
+  ScriptedDevice(Script& script, FakeClock& clock) : script_(script), clock_(clock) { ++script_.alive; }
+  ~ScriptedDevice() override { --script_.alive; }
 
   size_t Write(std::span<const uint8_t> bytes, uint32_t longest_ms) override {
     if (script_.throws) throw std::runtime_error("write");
@@ -72,7 +64,6 @@ class FakeDevice : public SerialDevice {
   bool WaitReadable(uint32_t) override { return !script_.chunks.empty(); }
   void Wake() override { script_.calls.push_back("wake"); }
   DeviceResult SetBaudRate(uint32_t rate) override { return Setting("baud " + std::to_string(rate)); }
-  uint32_t BaudRate() const override { return 115200; }
   DeviceResult SetDtr(bool high) override { return Setting(high ? "dtr on" : "dtr off"); }
   DeviceResult SetRts(bool high) override { return Setting(high ? "rts on" : "rts off"); }
   void PurgeInput() override { script_.calls.push_back("purge input"); }
@@ -107,7 +98,7 @@ class SerialPortTest : public testing::Test {
                       opened_.push_back(number);
                       result = open_failure_;
                       if (result.error != DeviceError::kNone) return nullptr;
-                      return std::make_unique<FakeDevice>(script_, clock_);
+                      return std::make_unique<ScriptedDevice>(script_, clock_);
                     }};
 };
 
@@ -281,16 +272,25 @@ TEST_F(SerialPortTest, ReceiveTakesWhatIsThereUpToTheRoom) {
   EXPECT_EQ(buffer[0], 9);
 }
 
-TEST_F(SerialPortTest, ExceptionsInsideAreLoggedAndGiveZero) {
-  OpenQuietly();
-  script_.throws = true;
+TEST_F(SerialPortTest, ExceptionsInsideAreLoggedAndLikeAClosedPortGiveZero) {
   Bytes buffer(4);
-  EXPECT_EQ(port_.Send(buffer.data(), 4), 0u);
-  EXPECT_EQ(port_.Receive(buffer.data(), 4), 0u);
-  EXPECT_EQ(
-      lines_.Take(),
-      (Lines{"2048 CSerialPort::Send(nbyte=4)", "16 CSerialPort::Send(bytes_sent=0)--exception occurred",
-             "16 CSerialPort::Receive(wRec=0, nByte=4)--exception occurred", "16 CSerialPort::Receive() returns=0"}));
+  for (const bool open : {true, false}) {
+    if (open) OpenQuietly();
+    script_.throws = open;
+    EXPECT_EQ(port_.Send(buffer.data(), 4), 0u);
+    EXPECT_EQ(port_.Receive(buffer.data(), 4), 0u);
+    if (open) {
+      EXPECT_EQ(lines_.Take(),
+                (Lines{"2048 CSerialPort::Send(nbyte=4)", "16 CSerialPort::Send(bytes_sent=0)--exception occurred",
+                       "16 CSerialPort::Receive(wRec=0, nByte=4)--exception occurred",
+                       "16 CSerialPort::Receive() returns=0"}));
+      EXPECT_EQ(port_.FlushPCBuffer(), 1u);
+      EXPECT_EQ(script_.calls, std::vector<std::string>{"purge input"}) << "the receive buffer only";
+      EXPECT_EQ(lines_.Take(), Lines{"2048 CSerialPort::FlushPCBuffer()"});
+    }
+    port_.Close();
+  }
+  EXPECT_EQ(port_.FlushPCBuffer(), 0u);
 }
 
 TEST_F(SerialPortTest, SettingsRecordTheMappedSystemError) {
@@ -313,18 +313,7 @@ TEST_F(SerialPortTest, SettingsRecordTheMappedSystemError) {
   }
 }
 
-TEST_F(SerialPortTest, FlushPurgesTheReceiveBufferOnly) {
-  OpenQuietly();
-  EXPECT_EQ(port_.FlushPCBuffer(), 1u);
-  EXPECT_EQ(script_.calls, std::vector<std::string>{"purge input"});
-  EXPECT_EQ(lines_.Take(), Lines{"2048 CSerialPort::FlushPCBuffer()"});
-}
-
-TEST_F(SerialPortTest, AClosedPortMovesNothing) {
-  Bytes buffer(4);
-  EXPECT_EQ(port_.Send(buffer.data(), 4), 0u);
-  EXPECT_EQ(port_.Receive(buffer.data(), 4), 0u);
-  EXPECT_EQ(port_.FlushPCBuffer(), 0u);
+TEST_F(SerialPortTest, AClosedPortSetsNothing) {
   EXPECT_FALSE(port_.SetBaudRate(9600));
   EXPECT_EQ(port_.SetDTR(1), -200);
   EXPECT_FALSE(port_.CanWait());
@@ -337,7 +326,7 @@ struct Caller {
   uint32_t result = 0;
   uint32_t told = 0;
   bool throws = false;
-  std::vector<std::string> calls;
+  std::vector<std::string> calls = {};
 };
 
 constexpr uintptr_t kHandle = 0x77;
@@ -379,16 +368,44 @@ class UserTransportTest : public SerialPortTest {
   Bytes buffer_ = Bytes(8);
 };
 
-TEST_F(UserTransportTest, EveryOperationGoesToTheFunctions) {
-  EXPECT_EQ(port_.IsOpen(), 1u);
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 8u);
-  caller_.told = 3;
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 3u);
-  EXPECT_EQ(port_.Receive(buffer_.data(), 8), 3u);
-  EXPECT_EQ(port_.FlushPCBuffer(), 0u);
-  EXPECT_EQ(caller_.calls, (std::vector<std::string>{"send 119 8 8", "send 119 8 8", "receive 119 8", "flush 119"}));
+TEST_F(UserTransportTest, EveryOperationGoesToTheFunctionsAndWhatIsNotPossibleIsCutAndLogged) {
+  const auto bind = [this](bool whole) {
+    return port_.SetUserDefinedTransport(reinterpret_cast<uintptr_t>(&caller_), kHandle, whole ? UserSend : nullptr,
+                                         whole ? UserReceive : nullptr, whole ? UserFlush : nullptr);
+  };
+  const struct {
+    const char* name;
+    Caller caller;
+    uint32_t sent, received, flushed;
+    std::ptrdiff_t errors;
+  } kRows[] = {
+      {"nothing told", {}, 8, 0, 0, 0},
+      {"fewer", {.told = 3}, 3, 3, 0, 0},
+      {"failures", {.result = 1, .told = 8}, 0, 0, 0, 0},
+      {"exceptions", {.throws = true}, 0, 0, 0, 4},
+      {"more than there is room for", {.told = 9}, 8, 8, 0, 2},
+      {"an incomplete set", {}, 1, 1, 1, 0},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.name);
+    const bool whole = row.name != std::string_view("an incomplete set");
+    EXPECT_EQ(bind(whole), whole ? 1u : 0u);
+    EXPECT_EQ(port_.IsOpen(), whole ? 1u : 0u);
+    EXPECT_TRUE(port_.user_defined());
+    EXPECT_FALSE(port_.CanWait());
+    caller_ = row.caller;
+    lines_.Take();
+    EXPECT_EQ(port_.Send(buffer_.data(), 8), row.sent);
+    EXPECT_EQ(port_.Receive(buffer_.data(), 8), row.received);
+    EXPECT_EQ(port_.FlushPCBuffer(), row.flushed);
+    const Lines lines = lines_.Take();
+    EXPECT_EQ(std::count_if(lines.begin(), lines.end(), [](const auto& line) { return line.starts_with("16 "); }),
+              row.errors)
+        << testing::PrintToString(lines);
+    const std::vector<std::string> all = {"send 119 8 8", "receive 119 8", "flush 119"};
+    EXPECT_EQ(caller_.calls, whole && !row.caller.throws ? all : std::vector<std::string>());
+  }
   EXPECT_TRUE(opened_.empty());
-  EXPECT_FALSE(port_.CanWait());
 }
 
 TEST_F(UserTransportTest, LineSettingsAreRefusedEachInItsOwnWay) {
@@ -401,38 +418,6 @@ TEST_F(UserTransportTest, LineSettingsAreRefusedEachInItsOwnWay) {
   uint32_t rate = 1;
   EXPECT_EQ(port_.GetBaudRate(rate), 1u);
   EXPECT_EQ(rate, 0u);
-}
-
-TEST_F(UserTransportTest, FailuresAndExceptionsMoveNothing) {
-  caller_.result = 1;
-  caller_.told = 8;
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 0u);
-  EXPECT_EQ(port_.Receive(buffer_.data(), 8), 0u);
-  EXPECT_EQ(port_.FlushPCBuffer(), 0u);
-  caller_.throws = true;
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 0u);
-  EXPECT_EQ(port_.Receive(buffer_.data(), 8), 0u);
-  EXPECT_EQ(port_.FlushPCBuffer(), 0u);
-}
-
-TEST_F(UserTransportTest, CountsBeyondWhatIsPossibleAreCutAndLogged) {
-  caller_.told = 9;
-  lines_.Take();
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 8u);
-  EXPECT_EQ(port_.Receive(buffer_.data(), 8), 8u);
-  const Lines lines = lines_.Take();
-  const auto errors =
-      std::count_if(lines.begin(), lines.end(), [](const auto& line) { return line.starts_with("16 "); });
-  EXPECT_EQ(errors, 2);
-}
-
-TEST_F(UserTransportTest, AnIncompleteSetIsBoundButNotOpen) {
-  EXPECT_EQ(port_.SetUserDefinedTransport(0, 0, nullptr, nullptr, nullptr), 0u);
-  EXPECT_EQ(port_.IsOpen(), 0u);
-  EXPECT_TRUE(port_.user_defined());
-  EXPECT_EQ(port_.Send(buffer_.data(), 8), 1u);
-  EXPECT_EQ(port_.Receive(buffer_.data(), 8), 1u);
-  EXPECT_EQ(port_.FlushPCBuffer(), 1u);
 }
 
 TEST_F(UserTransportTest, OpeningANumberGoesBackToTheDevice) {

@@ -1,17 +1,12 @@
 // The sorter: which packet goes where, what is logged of it, and the events of a report.
-#include <gtest/gtest.h>
-
-#include <string>
-
 #include "base/hex_dump.h"
 #include "tests/support/log_lines.h"
+#include "tests/support/test.h"
 #include "transport/collection/event_report.h"
 #include "transport/collection/kral_event_listener.h"
 
 namespace kral {
 namespace {
-
-using test::LogLines;
 
 struct Sorted {
   size_t responses, asynchronous, events;

@@ -1,16 +1,12 @@
 // Intel HEX against two foreign tools, srec_cat and objcopy, in both directions over generated images.
-#include <gtest/gtest.h>
-
-#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
-#include <random>
-#include <string>
 
 #include "download/images/hex_phone_image_decoder.h"
 #include "download/images/phone_image_dpaged.h"
 #include "kral/download.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::images {
 namespace {

@@ -1,12 +1,8 @@
 // Image files that somebody cuts short while they are in use: only Windows keeps others from that.
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <string>
-
 #include "download/images/phone_image_binary.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::images {
 namespace {

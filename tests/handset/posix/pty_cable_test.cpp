@@ -1,15 +1,10 @@
 // The virtual handset at the end of a pseudo terminal, opened on the other side as the library opens a COM port.
 #include "handset/pty_cable.h"
 
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <random>
-#include <string>
-
 #include "platform/environment.h"
 #include "platform/serial_device.h"
 #include "tests/support/engine_bundle.h"
+#include "tests/support/test.h"
 
 namespace kral::handset {
 namespace {

@@ -2,17 +2,16 @@
 #include "platform/file_util.h"
 
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <sys/stat.h>
 
-#include <array>
-#include <filesystem>
+#include <csignal>
 
 #include "base/text_log.h"
 #include "kral/download.h"
 #include "platform/posix/file_descriptor.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 #include "transport/collection/capture_reader.h"
 #include "transport/collection/capture_writer.h"
 
@@ -46,16 +45,25 @@ TEST_F(Pipes, AreNoFilesAndNeverWaitedFor) {
   EXPECT_FALSE(OpenCaptureFile(pipe_));
 }
 
-TEST_F(Pipes, TakeTheTextLogOnceSomebodyReads) {
+TEST_F(Pipes, TakeTheTextLogOnceSomebodyReadsAndTheReadersEndCostsLinesOnly) {
+  const auto before = std::signal(SIGPIPE, SIG_DFL);
   DataLogFileHandler log;
   log.Start(pipe_.c_str());
   log.WriteLine(kLogErr, "lost");
-  const FileDescriptor reader(::open(pipe_.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  EXPECT_FALSE(OpenToWrite(pipe_)) << "not even now";
-  log.WriteLine(kLogErr, "text");
-  std::array<char, 100> read{};
-  ASSERT_GT(::read(reader.get(), read.data(), read.size() - 1), 0);
-  EXPECT_STREQ(read.data() + 10, ",LOG_ERR,text\n");
+  {
+    const FileDescriptor reader(::open(pipe_.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    EXPECT_FALSE(OpenToWrite(pipe_)) << "not even now";
+    log.WriteLine(kLogErr, "text");
+    std::array<char, 100> read{};
+    ASSERT_GT(::read(reader.get(), read.data(), read.size() - 1), 0);
+    EXPECT_STREQ(read.data() + 10, ",LOG_ERR,text\n");
+  }
+  log.WriteLine(kLogErr, "unread");
+  log.Stop();
+  sigset_t pending;
+  sigpending(&pending);
+  EXPECT_EQ(sigismember(&pending, SIGPIPE), 0) << "nothing is left behind";
+  std::signal(SIGPIPE, before);
   log.Start("/dev/full");
   log.WriteLine(kLogErr, "a device that takes nothing");
 }

@@ -1,14 +1,10 @@
 // COM numbers from folders and names of the test's own.
 #include "platform/port_list.h"
 
-#include <gtest/gtest.h>
-
-#include <filesystem>
-#include <vector>
-
 #include "platform/environment.h"
 #include "platform/posix/port_sources.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -1,28 +1,21 @@
 // A tty as a COM port, with a pseudo terminal as the wire.
 #include "platform/serial_device.h"
 
-#include <gtest/gtest.h>
-
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <array>
-#include <chrono>
 #include <numeric>
-#include <optional>
-#include <thread>
-#include <vector>
 
 #include "platform/environment.h"
 #include "platform/pseudo_terminal.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 #include "transport/line/serial_port.h"
 
 namespace kral {
 namespace {
 
-using Bytes = std::vector<uint8_t>;
+using handset::Bytes;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 

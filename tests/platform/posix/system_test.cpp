@@ -1,20 +1,16 @@
 // Marks that other programs see, processes and station switches on Linux.
-#include <gtest/gtest.h>
 #include <spawn.h>
 #include <sys/wait.h>
 
-#include <array>
 #include <csignal>
-#include <filesystem>
 #include <fstream>
-#include <iterator>
-#include <string>
 
 #include "platform/environment.h"
 #include "platform/named_mutex.h"
 #include "platform/process.h"
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -2,23 +2,17 @@
 // to test, unless KRAL_TEST_REQUIRE_COM says that there must be.
 #include "platform/serial_device.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <chrono>
 #include <cstdlib>
-#include <string>
-#include <thread>
-#include <vector>
 
 #include "platform/environment.h"
 #include "platform/file_util.h"
 #include "platform/port_list.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {
 
-using Bytes = std::vector<uint8_t>;
+using handset::Bytes;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 

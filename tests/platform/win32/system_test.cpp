@@ -1,12 +1,5 @@
 // Registry, window messages, processes, and names of devices, of Windows.
-#include <gtest/gtest.h>
 #include <windows.h>
-
-#include <algorithm>
-#include <array>
-#include <filesystem>
-#include <string>
-#include <vector>
 
 #include "platform/file_util.h"
 #include "platform/folder.h"
@@ -17,6 +10,7 @@
 #include "platform/pseudo_terminal.h"
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral {
 namespace {

@@ -1,13 +1,9 @@
 // PKV files against two foreign readers of compound documents, gsf and olefile: every storage and every byte.
-#include <gtest/gtest.h>
-
-#include <cstdint>
 #include <cstdlib>
-#include <map>
-#include <string>
 
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
+#include "tests/support/test.h"
 
 namespace kral::pkv {
 namespace {

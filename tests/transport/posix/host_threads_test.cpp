@@ -1,23 +1,14 @@
 // What a host does with its threads and ours: it ends them inside its own functions, and handles signals on its own.
-#include <gtest/gtest.h>
 #include <pthread.h>
 
-#include <atomic>
-#include <chrono>
 #include <csignal>
-#include <thread>
 
 #include "tests/support/engine_bundle.h"
+#include "tests/support/test.h"
 #include "tests/support/test_wire.h"
 
 namespace kral {
 namespace {
-
-using test::EngineBundle;
-using test::EngineGuard;
-using test::Eventually;
-using test::PlainFrame;
-using test::TestWire;
 
 std::atomic<int> ended_threads;
 std::thread::id spared;
