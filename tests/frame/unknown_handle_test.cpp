@@ -47,7 +47,8 @@ void ExpectFailure(KRAL_HANDLE handle) {
     Call(kFunction, handle);
   } else {
     // The NV tool's functions give error codes, in which 0 is good.
-    EXPECT_EQ(Call(kFunction, handle), (std::is_same_v<Result, uint32_t> ? KRAL_NV_ERROR_NO_CONNECTION : 0)) << name;
+    const auto failure = static_cast<Result>(std::is_same_v<Result, uint32_t> ? KRAL_NV_ERROR_NO_CONNECTION : 0);
+    EXPECT_EQ(Call(kFunction, handle), failure) << name;
   }
   EXPECT_TRUE(std::all_of(g_area.begin(), g_area.end() - 1, [](uint8_t byte) { return byte == 0xCC; })) << name;
 }
