@@ -247,14 +247,14 @@ TEST_F(StreamFiles, EveryFailureHasItsResultAndSaysWhy) {
     return KRAL_STREAM_WriteImageMem(handle(), data, 300, address, 5, nullptr, 0, 0, 1000, 4, nullptr);
   };
   const auto write_with_header = [&](const std::string& header, uint32_t result) {
-    return [&, result] { return Write(image, result, 0, 0, 1000, header.c_str()); };
+    return [&, header, result] { return Write(image, result, 0, 0, 1000, header.c_str()); };
   };
   const auto write = [&](uint32_t result) { return [&, result] { return Write(image, result); }; };
   const auto other = [&](const When& when, uint32_t result) {
     return [&, when, result] { return Struck(handset::WrongCode(kOther), when, write(result)); };
   };
   const auto table = [&](const std::string& file) {
-    return [&] { return KRAL_STREAM_PARTITION_TABLE(handle(), file.c_str(), 0, nullptr); };
+    return [this, file] { return KRAL_STREAM_PARTITION_TABLE(handle(), file.c_str(), 0, nullptr); };
   };
   const auto hello = [&](uint32_t variant) { return KRAL_STREAM_HELLO(handle(), variant, nullptr, nullptr); };
   const auto security = [&] { return KRAL_STREAM_SECURITY_MODE(handle(), 1); };

@@ -55,9 +55,12 @@ TEST_F(Connection, ConnectGivesItsHandleWhetherOrNotThePortOpened) {
   EXPECT_NE(absent, 0u);
   EXPECT_EQ(KRAL_IsPhoneConnected(present), 1);
   EXPECT_EQ(KRAL_IsPhoneConnected(absent), 0);
+  ports_.Add(kNoHandset);
+  EXPECT_EQ(KRAL_IsPhoneConnected(absent), 1) << "found by the liveness check";
   const KRAL_HANDLE out_of_range = KRAL_ConnectServer(256);
   EXPECT_NE(out_of_range, 0u);
   EXPECT_EQ(KRAL_IsPhoneConnected(out_of_range), 0);
+  EXPECT_EQ(KRAL_ConnectServer(0xABCD0000u + kPort), present) << "the low 16 bits count";
 }
 
 TEST_F(Connection, ThreadsThatStartLateCostNothing) {
@@ -87,19 +90,6 @@ TEST_F(Connection, WithoutADispatcherThreadConnectsFailAndSaySo) {
   EXPECT_TRUE(log.Has("16 Error. No thread for the dispatcher of port 12."));
   SetThreadMaker({});
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1) << "as soon as there are threads again";
-}
-
-TEST_F(Connection, PortTakesItsLow16Bits) {
-  uint16_t port = 0;
-  EXPECT_EQ(KRAL_GetComPortNumber(KRAL_ConnectServer(0xABCD0000u + kPort), &port), 1);
-  EXPECT_EQ(port, kPort);
-}
-
-TEST_F(Connection, HandsetThatAppearsLaterIsFoundByTheLivenessCheck) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer(kNoHandset);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
-  ports_.Add(kNoHandset);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
 }
 
 TEST_F(Connection, VerifyGivesZeroAndKeepsTheContextWhenThePortDoesNotOpen) {
@@ -251,6 +241,10 @@ TEST_F(Connection, RefusalsAreNamedAndNothingElseIs) {
   log.Take();
   handset_.Expect("13").Reply("13");  // a request of that code: an answer, no refusal
   EXPECT_TRUE(send(0x13, 1000));
+  const auto requests = handset_.request_count();
+  phone.packet().Reset();
+  EXPECT_FALSE(phone.Send(phone.packet())) << "an empty one";
+  EXPECT_EQ(handset_.request_count(), requests);
   EXPECT_EQ(log.Take(), test::PhoneLog::Lines{});
   // The caller's buffer may hold anything: a time-out is not taken for a refusal.
   handset_.Expect("26");
@@ -263,14 +257,6 @@ TEST_F(Connection, RefusalsAreNamedAndNothingElseIs) {
     EXPECT_EQ(phone.SendSync(std::array<uint8_t, 1>{0x26}, response, 0x26, 1000).refusal(), refusal::kCommand);
   }
   EXPECT_EQ(log.Count(kRefusals[0].second), 3u);
-}
-
-TEST_F(Connection, EmptyRequestFailsWithoutTraffic) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
-  auto& phone = *Kral_ResourceManager::GetPhone(handle);
-  phone.packet().Reset();
-  EXPECT_FALSE(phone.Send(phone.packet()));
-  EXPECT_EQ(handset_.request_count(), 0u);
 }
 
 TEST_F(Connection, PortClosedByATimeOutIsReopenedByTheNextRequest) {
@@ -316,18 +302,13 @@ TEST_F(Connection, CallersTransportForcesDirectModeAndTurnsTheSearchOff) {
   KRAL_SetLibraryMode(1);
   const KRAL_HANDLE handle = ConnectThroughCable();
   EXPECT_FALSE(Kral_ResourceManager::server_mode());
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
+  KRAL_SetLibraryMode(1);
+  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1) << "open connections keep their mode";
+  KRAL_SetLibraryMode(0);
   const auto phone = Kral_ResourceManager::GetPhone(handle);
   EXPECT_FALSE(phone->data_to_diagnostic_search());
   EXPECT_EQ(KRAL_SetData2DiagSearch(handle, 1), 1);
   EXPECT_TRUE(phone->data_to_diagnostic_search());
-}
-
-TEST_F(Connection, LibraryModeChangesDoNotTouchOpenConnections) {
-  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
-  KRAL_SetLibraryMode(1);
-  EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1);
-  KRAL_SetLibraryMode(0);
 }
 
 TEST_F(Connection, OpenAndCloseAreTold) {

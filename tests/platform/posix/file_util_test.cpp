@@ -3,7 +3,10 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 
 #include "base/text_log.h"
@@ -14,6 +17,23 @@
 #include "tests/support/test.h"
 #include "transport/collection/capture_reader.h"
 #include "transport/collection/capture_writer.h"
+
+namespace {
+
+// What becomes of a file on the disk shows in what is synchronised, and when.
+std::function<int(const std::string& path)> on_sync;
+
+}  // namespace
+
+// In the place of the system's own, which it calls.
+int fsync(int descriptor) {
+  if (on_sync) {
+    const int error = on_sync(std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(descriptor)));
+    errno = error;
+    if (error != 0) return -1;
+  }
+  return static_cast<int>(::syscall(SYS_fsync, descriptor));
+}
 
 namespace kral {
 namespace {
@@ -86,6 +106,27 @@ TEST_F(Pipes, DevicesAndFoldersAreNotReplacedAndLinksLeadToWhatIs) {
   EXPECT_FALSE(ReplaceWholeFile(folder_.Path("link"), text));
   EXPECT_TRUE(std::filesystem::is_symlink(folder_.Path("link")));
   EXPECT_EQ(folder_.Content("inner/target"), "new");
+}
+
+TEST(AtomicFileTest, TheFileIsOnTheDiskBeforeItsNameAndTheFolderBehindIt) {
+  const test::TempFolder folder;
+  const std::string target = folder.Add("target", "old");
+  const std::string parent = std::filesystem::canonical(target).parent_path();
+  int error_of_folder = 0;
+  std::vector<std::pair<std::string, std::string>> synced;
+  on_sync = [&](const std::string& path) {
+    const bool is_folder = path == parent;
+    synced.emplace_back(is_folder ? "folder" : path == target ? "target" : "file", folder.Content("target"));
+    return is_folder ? error_of_folder : 0;
+  };
+  const std::vector<uint8_t> text = {'n', 'e', 'w'};
+  EXPECT_FALSE(ReplaceWholeFile(target, text));
+  EXPECT_EQ(synced, (decltype(synced){{"file", "old"}, {"folder", "new"}}));
+  for (const int error : {EIO, EINVAL}) {  // the second: of a file system whose folders cannot be synchronised
+    error_of_folder = error;
+    EXPECT_EQ(ReplaceWholeFile(target, text).value(), error == EINVAL ? 0 : error);
+  }
+  on_sync = {};
 }
 
 TEST(AtomicFileTest, TheFileInTheTargetsPlaceHasItsMode) {
