@@ -1,0 +1,25 @@
+# kral_tool_libraries: the header-only libraries of the tool. Found as CMake packages where they are installed as such for
+# the platform; otherwise the machine's headers serve. Those are linked into the build tree one by one, so that the
+# cross compiler sees these and not the native system headers beside them.
+add_library(kral_tool_libraries INTERFACE)
+
+function(kral_tool_library package target folder)
+  find_package(${package} QUIET)
+  if(TARGET ${target})
+    target_link_libraries(kral_tool_libraries INTERFACE ${target})
+    return()
+  endif()
+  if(NOT EXISTS /usr/include/${folder})
+    message(FATAL_ERROR "${package} is missing, which the tool needs: scripts/test and scripts/demo install it. "
+      "KRAL_TOOL=OFF builds without the tool.")
+  endif()
+  set(headers ${PROJECT_BINARY_DIR}/headers)
+  file(MAKE_DIRECTORY ${headers})
+  file(CREATE_LINK /usr/include/${folder} ${headers}/${folder} SYMBOLIC)
+  target_include_directories(kral_tool_libraries SYSTEM INTERFACE ${headers})
+endfunction()
+
+kral_tool_library(fmt fmt::fmt-header-only fmt)
+kral_tool_library(CLI11 CLI11::CLI11 CLI)
+kral_tool_library(nlohmann_json nlohmann_json::nlohmann_json nlohmann)
+target_compile_definitions(kral_tool_libraries INTERFACE FMT_HEADER_ONLY=1)
