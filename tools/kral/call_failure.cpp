@@ -1,13 +1,12 @@
 // Words for the records of the library. What a verb knows better, it says itself.
 #include "tools/kral/call_failure.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <cctype>
 #include <utility>
 
+#include "tools/kral/format.h"
 #include "tools/kral/output.h"
 #include "tools/kral/session.h"
 
@@ -84,7 +83,7 @@ bool IsOfRequest(const KRAL_ERROR& record) {
 }
 
 bool Names(std::string_view text, std::uint16_t port) {
-  const std::string name = fmt::format("COM{}", port);
+  const std::string name = Format("COM{}", port);
   const auto at = text.find(name);
   const auto end = at + name.size();
   return at != std::string_view::npos && (end == text.size() || std::isdigit(text[end]) == 0);
@@ -95,9 +94,9 @@ std::string SentenceOf(const KRAL_ERROR& record, std::string_view what, std::uin
   const std::string text = record.text;
   if (IsLocal(record)) return text;
   const std::string where = Names(text, port) ? "" : " on " + DescribePort(port);
-  if (IsOfRequest(record)) return fmt::format("{}{}: {}", what, where, text);
+  if (IsOfRequest(record)) return Format("{}{}: {}", what, where, text);
   if (where.empty() || !text.starts_with(kHandset)) return text + where;
-  return fmt::format("the handset{} {}", where, text.substr(kHandset.size()));
+  return Format("the handset{} {}", where, text.substr(kHandset.size()));
 }
 
 }  // namespace
@@ -120,7 +119,7 @@ ToolError ExplainRecord(const KRAL_ERROR& record, std::string_view what, std::ui
 ToolError ExplainRecord(const std::optional<KRAL_ERROR>& record, std::string_view what, std::uint16_t port,
                         std::string hint) {
   if (record) return ExplainRecord(*record, what, port, std::move(hint));
-  return {ExitCode::kInternal, fmt::format("{} failed on {}", what, DescribePort(port)), "--log FILE tells more"};
+  return {ExitCode::kInternal, Format("{} failed on {}", what, DescribePort(port)), "--log FILE tells more"};
 }
 
 }  // namespace kral::tool

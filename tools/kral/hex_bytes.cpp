@@ -1,12 +1,11 @@
 // Reads hex as people write it, with or without separators and prefixes.
 #include "tools/kral/hex_bytes.h"
 
-#include <fmt/format.h>
-
 #include <charconv>
 #include <string_view>
 
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -14,7 +13,7 @@ namespace {
 constexpr std::string_view kSeparators = " ,:\t";
 
 [[noreturn]] void Refuse(std::string_view group) {
-  throw ToolError(ExitCode::kUsage, fmt::format("{} is not hex", group),
+  throw ToolError(ExitCode::kUsage, Format("{} is not hex", group),
                   "give bytes as pairs of hex digits, with or without blanks: 4B 0F 00 00");
 }
 

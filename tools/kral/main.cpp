@@ -1,7 +1,4 @@
 // The command line: common options, the choice of a verb, and how its end becomes an exit code.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
 #include <string>
@@ -10,6 +7,7 @@
 
 #include "platform/console.h"
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/result_lines.h"
 #include "tools/kral/verbs.h"
@@ -25,28 +23,19 @@ std::string VersionText() {
   return text.data();
 }
 
-void AddCommonOptions(CLI::App& app, Context& context) {
-  app.add_option("-p,--port", context.session.port, "COM port number; default: the only one with a handset");
-  app.add_flag_callback(
+void AddCommonOptions(const Command& root, Context& context) {
+  root.Add("-p,--port", context.session.port, "COM port number; default: the only one with a handset");
+  root.Flag(
       "--json", [&context] { context.out.UseJson(); }, "Print one JSON object");
-  app.add_option("--log", context.session.log_file, "Write the text log of the connection to this file");
-  app.add_option("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F");
-  app.add_option("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
-      ->check(CLI::Range(1u, kLongestTimeOutMs));
-}
-
-// Common options are taken behind a verb, too.
-void AllowOptionsAnywhere(CLI::App& app) {
-  for (auto* verb : app.get_subcommands([](CLI::App*) { return true; })) {
-    verb->fallthrough();
-    AllowOptionsAnywhere(*verb);
-  }
+  root.Add("--log", context.session.log_file, "Write the text log of the connection to this file");
+  root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F");
+  root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
+      .Between(1, kLongestTimeOutMs, "ms");
 }
 
 // The verb has done its work all the same.
 void TellLogFileTrouble(const Context& context) {
-  if (const auto trouble = ResultLine(kLogFileTrouble))
-    context.out.Note(fmt::format("{}{}", kLogFileTrouble, *trouble));
+  if (const auto trouble = ResultLine(kLogFileTrouble)) context.out.Note(Format("{}{}", kLogFileTrouble, *trouble));
 }
 
 int End(const Context& context, const ToolError& error) {
@@ -62,39 +51,34 @@ int Run(std::vector<std::string> arguments) {
   Context context;
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.
   if (std::find(arguments.begin(), arguments.end(), "--json") != arguments.end()) context.out.UseJson();
-  CLI::App app("Talks to mobile handsets in production and test.", "kral");
-  app.require_subcommand(1);
-  app.set_version_flag("--version", VersionText);
-  AddCommonOptions(app, context);
-  AddPortVerbs(app, context);
-  AddInfoVerbs(app, context);
-  AddModeVerbs(app, context);
-  AddFsVerbs(app, context);
-  AddFtmVerbs(app, context);
-  AddLogVerbs(app, context);
-  AddEventVerbs(app, context);
-  AddNvVerbs(app, context);
-  AddFlashVerbs(app, context);
-  AddNvBackupVerbs(app, context);
-  AddBootVerbs(app, context);
-  AddBandVerbs(app, context);
-  AddRawVerbs(app, context);
-  AddSimVerbs(app, context);
-  AllowOptionsAnywhere(app);
+  CommandLine command_line("kral", "Talks to mobile handsets in production and test.", VersionText);
+  const auto root = command_line.root();
+  AddCommonOptions(root, context);
+  AddPortVerbs(root, context);
+  AddInfoVerbs(root, context);
+  AddModeVerbs(root, context);
+  AddFsVerbs(root, context);
+  AddFtmVerbs(root, context);
+  AddLogVerbs(root, context);
+  AddEventVerbs(root, context);
+  AddNvVerbs(root, context);
+  AddFlashVerbs(root, context);
+  AddNvBackupVerbs(root, context);
+  AddBootVerbs(root, context);
+  AddBandVerbs(root, context);
+  AddRawVerbs(root, context);
+  AddSimVerbs(root, context);
 
   try {
-    std::reverse(arguments.begin(), arguments.end());  // as the parser wants them
-    app.parse(std::move(arguments));
-    context.run();
+    const auto act = command_line.Parse(std::move(arguments));
+    if (act == nullptr) return static_cast<int>(ExitCode::kDone);  // help
+    act();
     TellLogFileTrouble(context);
     return static_cast<int>(ExitCode::kDone);
-  } catch (const CLI::ParseError& error) {
-    if (error.get_exit_code() == 0) return app.exit(error);  // --help, --version
-    return End(context, ToolError(ExitCode::kUsage, error.what(), "kral --help lists the verbs and options"));
   } catch (const ToolError& error) {
     return End(context, error);
   } catch (const std::exception& error) {
-    return End(context, ToolError(ExitCode::kInternal, fmt::format("internal error: {}", error.what()),
+    return End(context, ToolError(ExitCode::kInternal, Format("internal error: {}", error.what()),
                                   "run again with --log FILE and report what it shows"));
   }
 }

@@ -1,12 +1,12 @@
 // Writes results, notes and failures; knows nothing of what they are about.
 #include "tools/kral/output.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <cstdio>
 #include <iterator>
+
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -63,14 +63,14 @@ void Output::Note(std::string_view text) const {
     const Json object{{"event", "note"}, {"text", text}};
     WriteAside(JsonLine(object));
   } else {
-    WriteAside(fmt::format("kral: {}\n", text));
+    WriteAside(Format("kral: {}\n", text));
   }
 }
 
 void Output::Failure(const ToolError& error, const Json& members) const {
   if (!json_) {
-    WriteAside(fmt::format("kral: {}\n", error.what()));
-    if (!error.hint().empty()) WriteAside(fmt::format("      {}\n", error.hint()));
+    WriteAside(Format("kral: {}\n", error.what()));
+    if (!error.hint().empty()) WriteAside(Format("      {}\n", error.hint()));
     return;
   }
   Json object = members;
@@ -93,7 +93,7 @@ void WriteAside(std::string_view text) noexcept {
 }
 
 std::string JsonLine(const Json& object) {
-  const std::string text = object.dump(-1, ' ', false, Json::error_handler_t::replace);
+  const std::string text = object.dump();
   std::string line;
   line.reserve(text.size() + 1);
   // They stand in strings only.
@@ -101,7 +101,7 @@ std::string JsonLine(const Json& object) {
     const auto at = [&text](std::size_t place) { return static_cast<unsigned char>(text[place]); };
     const bool is_control = at(i) == 0xC2 && i + 1 < text.size() && at(i + 1) < 0xA0;
     if (is_control || at(i) == 0x7F) {
-      line += fmt::format("\\u{:04x}", at(is_control ? ++i : i));
+      line += Format("\\u{:04x}", at(is_control ? ++i : i));
     } else {
       line += text[i];
     }
@@ -118,7 +118,9 @@ std::string Printable(std::string_view text) {
 }
 
 std::string HexText(std::span<const std::uint8_t> bytes) {
-  return fmt::format("{:02X}", fmt::join(bytes, " "));
+  std::string text;
+  for (const auto byte : bytes) text += Format("{}{:02X}", text.empty() ? "" : " ", byte);
+  return text;
 }
 
 std::string HexDump(std::span<const std::uint8_t> bytes) {
@@ -130,7 +132,7 @@ std::string HexDump(std::span<const std::uint8_t> bytes) {
       const auto character = static_cast<char>(byte);
       return IsPrintable(character) ? character : '.';
     });
-    dump += fmt::format("{:04X}  {:<{}}  {}\n", offset, HexText(line), kDumpWidth * 3 - 1, characters);
+    dump += Format("{:04X}  {:<{}}  {}\n", offset, HexText(line), kDumpWidth * 3 - 1, characters);
   }
   return dump;
 }

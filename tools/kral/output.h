@@ -3,16 +3,14 @@
 #define KRAL_TOOLS_OUTPUT_H
 
 #include <cstdint>
-#include <nlohmann/json.hpp>
 #include <span>
 #include <string>
 #include <string_view>
 
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/json.h"
 
 namespace kral::tool {
-
-using Json = nlohmann::ordered_json;
 
 class Output {
  public:

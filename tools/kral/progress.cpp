@@ -1,14 +1,13 @@
 // Decides when and how progress is shown. What the work is, and its end, are the verb's affair.
 #include "tools/kral/progress.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <cmath>
 #include <utility>
 
 #include "platform/console.h"
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -31,17 +30,17 @@ std::string Shortened(const std::string& text, std::size_t room) {
 
 std::string SizeText(std::uint64_t bytes) {
   constexpr std::array<const char*, 4> kUnits{"KiB", "MiB", "GiB", "TiB"};
-  if (bytes < 1024) return fmt::format("{} B", bytes);
+  if (bytes < 1024) return Format("{} B", bytes);
   double value = static_cast<double>(bytes) / 1024;
   std::size_t unit = 0;
   for (; value >= 1023.95 && unit + 1 < kUnits.size(); ++unit) value /= 1024;
-  return fmt::format("{:.1f} {}", value, kUnits[unit]);
+  return Format("{:.1f} {}", value, kUnits[unit]);
 }
 
 std::string DurationText(std::uint64_t seconds) {
   const auto minutes = seconds / 60;
-  if (minutes < 60) return fmt::format("{}:{:02}", minutes, seconds % 60);
-  return fmt::format("{}:{:02}:{:02}", minutes / 60, minutes % 60, seconds % 60);
+  if (minutes < 60) return Format("{}:{:02}", minutes, seconds % 60);
+  return Format("{}:{:02}:{:02}", minutes / 60, minutes % 60, seconds % 60);
 }
 
 Progress::Progress(const Output& out, std::string work, std::uint64_t total, Unit unit, Clock& clock)
@@ -104,15 +103,15 @@ std::uint64_t Progress::SecondsLeft(double rate) const {
 std::string Progress::Figures() const {
   std::string text;
   if (total_ > 0) {
-    text = fmt::format("{:.0f} %", 100 * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
+    text = Format("{:.0f} %", 100 * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
   } else {
-    text = unit_ == Unit::kBytes ? SizeText(done_) : fmt::format("{}", done_);
+    text = unit_ == Unit::kBytes ? SizeText(done_) : Format("{}", done_);
   }
   const double rate = Rate();
   if (rate <= 0) return text;
-  text += unit_ == Unit::kBytes ? fmt::format("  {}/s", SizeText(static_cast<std::uint64_t>(rate)))
-                                : fmt::format("  {:.1f}/s", rate);
-  if (total_ > 0) text += fmt::format("  {} left", DurationText(SecondsLeft(rate)));
+  text +=
+      unit_ == Unit::kBytes ? Format("  {}/s", SizeText(static_cast<std::uint64_t>(rate))) : Format("  {:.1f}/s", rate);
+  if (total_ > 0) text += Format("  {} left", DurationText(SecondsLeft(rate)));
   return text;
 }
 
@@ -128,16 +127,16 @@ void Progress::DrawBar() {
     const auto cells = std::min(room - title.size() - 4, kWidestBar);
     const auto full = static_cast<std::size_t>(
         static_cast<double>(cells) * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
-    bar = fmt::format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
+    bar = Format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
     room -= bar.size();
   }
   title = Shortened(title, room);
-  WriteAside(fmt::format("\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width));
+  WriteAside(Format("\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width));
   drawn_width_ = width;
 }
 
 void Progress::WriteLine() const {
-  out_.Note(fmt::format("{}{}{}: {}", work_, subject_.empty() ? "" : " ", subject_, Figures()));
+  out_.Note(Format("{}{}{}: {}", work_, subject_.empty() ? "" : " ", subject_, Figures()));
 }
 
 void Progress::WriteObject() const {
@@ -155,7 +154,7 @@ void Progress::WriteObject() const {
 
 void Progress::Wipe() {
   if (drawn_width_ == 0) return;
-  WriteAside(fmt::format("\r{:<{}}\r", "", std::exchange(drawn_width_, 0)));
+  WriteAside(Format("\r{:<{}}\r", "", std::exchange(drawn_width_, 0)));
 }
 
 }  // namespace kral::tool

@@ -1,8 +1,6 @@
 // Finds the port, connects, and tells a port and a handset in trouble from a request that failed.
 #include "tools/kral/session.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <charconv>
@@ -13,6 +11,7 @@
 #include "platform/port_list.h"
 #include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/result_lines.h"
 
@@ -41,8 +40,8 @@ std::uint16_t TheOnlyPort(Expected expected) {
   const auto answering = ListPortsWithHandset();
   if (answering.size() == 1) return answering.front();
   if (answering.size() > 1) {
-    throw ToolError(ExitCode::kUsage, fmt::format("handsets answer on several ports: {}", Describe(answering)),
-                    fmt::format("choose one: -p {}", answering.front()));
+    throw ToolError(ExitCode::kUsage, Format("handsets answer on several ports: {}", Describe(answering)),
+                    Format("choose one: -p {}", answering.front()));
   }
   const auto ports = ListPorts();
   if (ports.empty()) {
@@ -50,14 +49,14 @@ std::uint16_t TheOnlyPort(Expected expected) {
                     "plug the handset in, or name its port with -p N");
   }
   if (expected == Expected::kMayBeInDownload && ports.size() == 1) return ports.front();
-  throw ToolError(ExitCode::kNoPort, fmt::format("no handset answers on {}", Describe(ports)),
+  throw ToolError(ExitCode::kNoPort, Format("no handset answers on {}", Describe(ports)),
                   "check cable and power of the handset and that no other program uses its port, or name it with -p N");
 }
 
 // An unwritable log is noticed here: the library drops the lines of a file that it cannot open without a word.
 std::shared_ptr<std::FILE> OpenLogFile(const std::string& name) {
   if (std::FILE* const file = OpenToWriteText(name)) return {file, std::fclose};
-  throw ToolError(ExitCode::kBadFile, fmt::format("the log file {} cannot be written", name),
+  throw ToolError(ExitCode::kBadFile, Format("the log file {} cannot be written", name),
                   "check folder and permissions of the file named by --log; a pipe must have its reader already");
 }
 
@@ -75,21 +74,20 @@ ToolError PortError(std::uint16_t port, std::int32_t state, bool was_connected,
   const auto name = DescribePort(port);
   switch (state) {
     case KRAL_PORT_BUSY:
-      return {ExitCode::kPortInUse, fmt::format("{} is in use by another program", name),
+      return {ExitCode::kPortInUse, Format("{} is in use by another program", name),
               "close the program that holds the port, then run the command again", record};
     case KRAL_PORT_NOT_PERMITTED:
-      return {ExitCode::kPortInUse, fmt::format("{} may not be opened by this user", name),
+      return {ExitCode::kPortInUse, Format("{} may not be opened by this user", name),
               "on Linux, join the group of the device (often dialout) and log in again", record};
     case KRAL_PORT_NOT_FOUND:
       if (was_connected) break;
-      return {ExitCode::kNoPort, fmt::format("there is no port {}", name), "kral ports lists the ports there are",
-              record};
+      return {ExitCode::kNoPort, Format("there is no port {}", name), "kral ports lists the ports there are", record};
     default:
       if (was_connected) break;
-      return {ExitCode::kNoPort, fmt::format("{} cannot be opened as a serial port", name),
+      return {ExitCode::kNoPort, Format("{} cannot be opened as a serial port", name),
               "kral ports lists the ports there are; --log FILE tells what the system said", record};
   }
-  return {ExitCode::kLost, fmt::format("the handset on {} went away", name),
+  return {ExitCode::kLost, Format("the handset on {} went away", name),
           "check the cable; a handset that restarts comes back on its port after a while", record};
 }
 
@@ -108,16 +106,16 @@ std::uint16_t ParsePort(std::string_view text) {
   std::uint16_t port = 0;
   const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), port);
   if (error != std::errc() || end != digits.data() + digits.size()) {
-    throw ToolError(ExitCode::kUsage, fmt::format("{} is not a port number", text),
+    throw ToolError(ExitCode::kUsage, Format("{} is not a port number", text),
                     "give the number of a COM port, such as -p 7");
   }
   return port;
 }
 
 std::string DescribePort(std::uint16_t port) {
-  const std::string name = fmt::format("COM{}", port);
+  const std::string name = Format("COM{}", port);
   const std::string device = ComPortDevice(port);
-  return device.empty() || device.find(name) != std::string::npos ? name : fmt::format("{} ({})", name, device);
+  return device.empty() || device.find(name) != std::string::npos ? name : Format("{} ({})", name, device);
 }
 
 std::vector<std::uint16_t> ListPorts() {
@@ -143,7 +141,7 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
   ThrowIfInterrupted();
   handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
   if (handle_ == 0) {
-    throw ToolError(ExitCode::kInternal, fmt::format("no connection to {} could be made", DescribePort(port_)),
+    throw ToolError(ExitCode::kInternal, Format("no connection to {} could be made", DescribePort(port_)),
                     "close other programs that use the library, then run the command again", LastError(0));
   }
   try {
@@ -202,7 +200,7 @@ void Session::CheckAnswers(Expected expected) {
   if (const auto trouble = TroubleOf(handle_)) throw PortError(port_, *trouble, false, record);
   if (expected == Expected::kMayBeInDownload) return;
   if (IsOtherThanSilence(record)) throw ExplainRecord(*record, kLivenessCheck, port_);
-  throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port_)),
+  throw ToolError(ExitCode::kNoAnswer, Format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
                   "longer, --log FILE shows what came",
                   record);
@@ -220,7 +218,7 @@ std::optional<ToolError> Session::Silence() const {
   const auto after = TroubleOf(handle_);
   if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, record);
   if (IsOtherThanSilence(record)) return ExplainRecord(*record, kLivenessCheck, port_);
-  return ToolError(ExitCode::kNoAnswer, fmt::format("the handset on {} answers nothing any more", DescribePort(port_)),
+  return ToolError(ExitCode::kNoAnswer, Format("the handset on {} answers nothing any more", DescribePort(port_)),
                    "check cable and power", record);
 }
 

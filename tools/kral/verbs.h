@@ -1,39 +1,33 @@
-// The verbs of the tool: each file adds its subcommands to the command line and says what they run.
+// The verbs of the tool: each file adds its own to the command line and says what they run.
 #ifndef KRAL_TOOLS_VERBS_H
 #define KRAL_TOOLS_VERBS_H
 
-#include <functional>
-
+#include "tools/kral/command_line.h"
 #include "tools/kral/output.h"
 #include "tools/kral/session.h"
-
-namespace CLI {
-class App;
-}
 
 namespace kral::tool {
 
 struct Context {
   SessionOptions session;
   Output out;
-  std::function<void()> run;    // set by the subcommand that was chosen
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure
 };
 
-void AddBootVerbs(CLI::App& app, Context& context);  // behind AddFlashVerbs
-void AddBandVerbs(CLI::App& app, Context& context);
-void AddFsVerbs(CLI::App& app, Context& context);
-void AddEventVerbs(CLI::App& app, Context& context);
-void AddFlashVerbs(CLI::App& app, Context& context);
-void AddFtmVerbs(CLI::App& app, Context& context);
-void AddLogVerbs(CLI::App& app, Context& context);
-void AddPortVerbs(CLI::App& app, Context& context);
-void AddInfoVerbs(CLI::App& app, Context& context);
-void AddModeVerbs(CLI::App& app, Context& context);
-void AddNvVerbs(CLI::App& app, Context& context);
-void AddNvBackupVerbs(CLI::App& app, Context& context);
-void AddRawVerbs(CLI::App& app, Context& context);
-void AddSimVerbs(CLI::App& app, Context& context);
+void AddBootVerbs(const Command& root, Context& context);  // behind AddFlashVerbs
+void AddBandVerbs(const Command& root, Context& context);
+void AddFsVerbs(const Command& root, Context& context);
+void AddEventVerbs(const Command& root, Context& context);
+void AddFlashVerbs(const Command& root, Context& context);
+void AddFtmVerbs(const Command& root, Context& context);
+void AddLogVerbs(const Command& root, Context& context);
+void AddPortVerbs(const Command& root, Context& context);
+void AddInfoVerbs(const Command& root, Context& context);
+void AddModeVerbs(const Command& root, Context& context);
+void AddNvVerbs(const Command& root, Context& context);
+void AddNvBackupVerbs(const Command& root, Context& context);
+void AddRawVerbs(const Command& root, Context& context);
+void AddSimVerbs(const Command& root, Context& context);
 
 }  // namespace kral::tool
 

@@ -1,11 +1,9 @@
 // kral band: bands, their channels and carrier frequencies. Pure arithmetic: no handset is needed.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <memory>
 #include <vector>
 
+#include "tools/kral/format.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -44,8 +42,8 @@ std::string NameOfBand(std::uint16_t band) {
 
 void List(const Context& context) {
   Json rows = Json::array();
-  std::string text = fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}  {:>11} {:>11}\n", "id", "band", "direction", "first",
-                                 "last", "MHz", "MHz");
+  std::string text = Format("{:>4}  {:28} {:9} {:>10} {:>10}  {:>11} {:>11}\n", "id", "band", "direction", "first",
+                            "last", "MHz", "MHz");
   for (std::uint32_t i = 0; i < KRAL_Band_Helper_GetBandCount(); ++i) {
     std::uint16_t band = 0;
     if (KRAL_Band_Helper_GetBand(i, &band) == 0) continue;
@@ -56,12 +54,11 @@ void List(const Context& context) {
                  {"direction", direction.name},
                  {"first", first},
                  {"last", last}};
-        text += fmt::format("{:>4}  {:28} {:9} {:>10} {:>10}", band, NameOfBand(band), direction.name, first, last);
+        text += Format("{:>4}  {:28} {:9} {:>10} {:>10}", band, NameOfBand(band), direction.name, first, last);
         if (direction.frequency != nullptr) {
           row["first_mhz"] = direction.frequency(band, first);
           row["last_mhz"] = direction.frequency(band, last);
-          text +=
-              fmt::format("  {:>11.4f} {:>11.4f}", direction.frequency(band, first), direction.frequency(band, last));
+          text += Format("  {:>11.4f} {:>11.4f}", direction.frequency(band, first), direction.frequency(band, last));
         }
         text += '\n';
         rows.push_back(std::move(row));
@@ -75,34 +72,29 @@ void Convert(const Context& context, const Direction& direction, std::uint16_t b
   const double frequency = direction.frequency(band, channel);
   if (frequency == 0.0) {
     throw ToolError(ExitCode::kUsage,
-                    fmt::format("band {} has no {} frequency for channel {}", band, direction.name, channel),
+                    Format("band {} has no {} frequency for channel {}", band, direction.name, channel),
                     "kral band list shows the bands and their channels");
   }
   context.out.Result({{"band", band}, {"channel", channel}, {"direction", direction.name}, {"mhz", frequency}},
-                     fmt::format("{:.4f} MHz\n", frequency));
+                     Format("{:.4f} MHz\n", frequency));
 }
 
-void AddConversion(CLI::App& parent, Context& context, const char* verb, const Direction& direction) {
+void AddConversion(const Command& parent, Context& context, const char* verb, const Direction& direction) {
   const auto band = std::make_shared<std::uint16_t>();
   const auto channel = std::make_shared<std::int32_t>();
-  auto* conversion = parent.add_subcommand(verb, fmt::format("Print the {} carrier of a channel", direction.name));
-  conversion->add_option("band", *band, "Band id, as in the list")->required();
-  conversion->add_option("channel", *channel, "Channel number")->required();
-  conversion->callback([&context, &direction, band, channel] {
-    context.run = [&context, &direction, band, channel] { Convert(context, direction, *band, *channel); };
-  });
+  const auto conversion = parent.Verb(verb, Format("Print the {} carrier of a channel", direction.name));
+  conversion.Add("band", *band, "Band id, as in the list").Required();
+  conversion.Add("channel", *channel, "Channel number").Required();
+  conversion.Run([&context, &direction, band, channel] { Convert(context, direction, *band, *channel); });
 }
 
 }  // namespace
 
-void AddBandVerbs(CLI::App& app, Context& context) {
-  auto* band = app.add_subcommand("band", "Convert bands and channels to carrier frequencies");
-  band->require_subcommand(1);
-  band->add_subcommand("list", "Print every band with its channel ranges and edge frequencies")->callback([&context] {
-    context.run = [&context] { List(context); };
-  });
-  AddConversion(*band, context, "ul", kDirections[1]);
-  AddConversion(*band, context, "dl", kDirections[2]);
+void AddBandVerbs(const Command& root, Context& context) {
+  const auto band = root.Noun("band", "Convert bands and channels to carrier frequencies");
+  band.Verb("list", "Print every band with its channel ranges and edge frequencies").Run([&context] { List(context); });
+  AddConversion(band, context, "ul", kDirections[1]);
+  AddConversion(band, context, "dl", kDirections[2]);
 }
 
 }  // namespace kral::tool

@@ -1,10 +1,9 @@
 // Drives the boot transfer of the library, and says what to do about one that failed.
 #include "tools/kral/flash/boot_target.h"
 
-#include <fmt/format.h>
-
 #include "platform/clock.h"
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/result_lines.h"
 
@@ -79,7 +78,7 @@ void BootTarget::Load(const std::string& programmer) {
   if (status && *status != "0") {
     throw ToolError(
         ExitCode::kRefused,
-        fmt::format("the boot loader on {} refused {}: status {}", DescribePort(session_.port()), programmer, *status),
+        Format("the boot loader on {} refused {}: status {}", DescribePort(session_.port()), programmer, *status),
         "check that the file is a flash programmer for this handset");
   }
 }
@@ -103,10 +102,9 @@ void BootTarget::FlashAll(const std::string& programmer, const std::vector<Flash
     if (result == KRAL_DOWNLOAD_ABORTED) throw InterruptedError();
     if (result == KRAL_FLASH_PROGRAMMER_FAILED) throw Explain();
     if (result == KRAL_FLASH_HELLO_FAILED) {
-      throw ToolError(
-          ExitCode::kNoAnswer,
-          fmt::format("{} was transferred but does not answer on {}", programmer, DescribePort(session_.port())),
-          "check that the programmer is meant for this handset", LastError(session_.handle()));
+      throw ToolError(ExitCode::kNoAnswer,
+                      Format("{} was transferred but does not answer on {}", programmer, DescribePort(session_.port())),
+                      "check that the programmer is meant for this handset", LastError(session_.handle()));
     }
     if (failed < images.size()) throw ExplainWrite(session_, images[failed].file, result);
     throw Explain();

@@ -1,8 +1,6 @@
 // Reads image files through the library and refuses those that a download could not write.
 #include "tools/kral/flash/flash_images.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <charconv>
 #include <optional>
@@ -10,6 +8,7 @@
 
 #include "platform/file_util.h"
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/progress.h"
 
 namespace kral::tool {
@@ -20,7 +19,7 @@ constexpr std::uint32_t kNoStart = 0xFFFFFFFF;
 
 ToolError BadImage(const std::string& file, std::string_view why, std::string hint,
                    const std::optional<KRAL_ERROR>& record = {}) {
-  return {ExitCode::kBadFile, fmt::format("{}: {}", file, why), std::move(hint), record};
+  return {ExitCode::kBadFile, Format("{}: {}", file, why), std::move(hint), record};
 }
 
 std::string SystemText(std::uint32_t error) {
@@ -37,7 +36,7 @@ std::string DescribeLoss(const std::string& file) {
   std::uint32_t line = 0;
   std::uint64_t bytes = 0;
   KRAL_HEX_FindLoss(file.c_str(), &line, &bytes, nullptr);
-  return fmt::format("{} bytes of its data have no place in the image, the first of them on line {}", bytes, line);
+  return Format("{} bytes of its data have no place in the image, the first of them on line {}", bytes, line);
 }
 
 KRAL_IMAGE_INFO ReadInfo(const std::string& file, std::uint32_t format) {
@@ -88,7 +87,7 @@ void CheckFile(const std::string& file, std::uint64_t most) {
   }
   if (reader.size() == 0) throw BadImage(file, "the file is empty", "check its name");
   if (reader.size() <= most) return;
-  throw BadImage(file, fmt::format("it has {} bytes", reader.size()), fmt::format("at most {} are taken", most));
+  throw BadImage(file, Format("it has {} bytes", reader.size()), Format("at most {} are taken", most));
 }
 
 std::uint32_t ParseImageFormat(std::string_view name) {
@@ -118,7 +117,7 @@ FlashImage ReadProgrammer(const std::string& file) {
   image.info = ReadInfo(file, KRAL_IMAGE_FORMAT_HEX);
   if (image.info.size[0] == 0) throw BadImage(file, "it holds no data", "a flash programmer is an Intel HEX file");
   if (image.info.size[0] > kLargestProgrammer) {
-    throw BadImage(file, fmt::format("{} are too much for a flash programmer", SizeText(image.info.size[0])),
+    throw BadImage(file, Format("{} are too much for a flash programmer", SizeText(image.info.size[0])),
                    "a flash programmer has at most 500 KiB");
   }
   if (image.info.start_address == kNoStart) {
@@ -126,8 +125,8 @@ FlashImage ReadProgrammer(const std::string& file) {
   }
   if (image.info.start_address != image.info.base[0]) {
     throw BadImage(file,
-                   fmt::format("it starts at 0x{:08X}, but its lowest address is 0x{:08X}", image.info.start_address,
-                               image.info.base[0]),
+                   Format("it starts at 0x{:08X}, but its lowest address is 0x{:08X}", image.info.start_address,
+                          image.info.base[0]),
                    "the programmer is sent from its start address on: it must be the lowest");
   }
   return image;
@@ -136,14 +135,14 @@ FlashImage ReadProgrammer(const std::string& file) {
 std::string DescribeImage(const FlashImage& image) {
   const auto& info = image.info;
   const bool hex = info.format == KRAL_IMAGE_FORMAT_HEX;
-  auto text = fmt::format("{}: {}\n", image.file, hex ? "Intel HEX" : "binary");
+  auto text = Format("{}: {}\n", image.file, hex ? "Intel HEX" : "binary");
   for (std::size_t region = 0; region < KRAL_IMAGE_REGIONS; ++region) {
     if (info.size[region] == 0) continue;
-    text += fmt::format("  region {}: 0x{:08X} to 0x{:08X}, {} bytes\n", region, info.base[region],
-                        info.base[region] + info.size[region] - 1, info.size[region]);
+    text += Format("  region {}: 0x{:08X} to 0x{:08X}, {} bytes\n", region, info.base[region],
+                   info.base[region] + info.size[region] - 1, info.size[region]);
   }
-  text += fmt::format("  {} bytes are not erased flash\n", info.payload);
-  if (hex && info.start_address != kNoStart) text += fmt::format("  starts at 0x{:08X}\n", info.start_address);
+  text += Format("  {} bytes are not erased flash\n", info.payload);
+  if (hex && info.start_address != kNoStart) text += Format("  starts at 0x{:08X}\n", info.start_address);
   return text;
 }
 

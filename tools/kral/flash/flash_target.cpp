@@ -1,13 +1,12 @@
 // Drives the download functions of the library and turns their results into errors that say what to try next.
 #include "tools/kral/flash/flash_target.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <chrono>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 
 namespace kral::tool {
@@ -109,11 +108,11 @@ std::optional<ProgrammerLimits> FlashTarget::TryHello(std::uint32_t tries) {
 ProgrammerLimits FlashTarget::Hello() {
   if (session_.answers_diagnostics()) {
     throw ToolError(ExitCode::kRefused,
-                    fmt::format("the handset on {} is in diagnostic mode", DescribePort(session_.port())),
+                    Format("the handset on {} is in diagnostic mode", DescribePort(session_.port())),
                     "load a flash programmer first: kral flash load FILE");
   }
   if (const auto limits = TryHello(kAllTries)) return *limits;
-  throw ToolError(ExitCode::kNoAnswer, fmt::format("no flash programmer answers on {}", DescribePort(session_.port())),
+  throw ToolError(ExitCode::kNoAnswer, Format("no flash programmer answers on {}", DescribePort(session_.port())),
                   "kral flash info tells what has the line; a programmer is loaded with kral flash load FILE");
 }
 
@@ -141,8 +140,7 @@ void FlashTarget::Load(const FlashImage& programmer, std::uint32_t maximum_packe
 }
 
 void FlashTarget::SetSecurityMode(std::uint8_t mode) {
-  session_.Run(fmt::format("security mode {}", mode),
-               [&] { return KRAL_STREAM_SECURITY_MODE(session_.handle(), mode); });
+  session_.Run(Format("security mode {}", mode), [&] { return KRAL_STREAM_SECURITY_MODE(session_.handle(), mode); });
 }
 
 void FlashTarget::SendPartitionTable(const std::string& file, bool override_table) {
@@ -157,7 +155,7 @@ void FlashTarget::SendPartitionTable(const std::string& file, bool override_tabl
   static constexpr std::array kHints{"--override replaces the table, and with it what the partitions hold",
                                      "check that the file is a table for this handset",
                                      "the flash could not be erased"};
-  throw ExplainRecord(record, fmt::format("the partition table {}", file), session_.port(),
+  throw ExplainRecord(record, Format("the partition table {}", file), session_.port(),
                       status <= kHints.size() ? kHints[status - 1u] : "see the documentation of the flash programmer");
 }
 
@@ -181,7 +179,7 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
 ToolError ExplainWrite(const Session& session, const std::string& file, std::uint32_t result) {
   const auto record = LastError(session.handle());
   if (result == KRAL_DOWNLOAD_ABORTED) return InterruptedError();
-  return ExplainRecord(record, fmt::format("writing {}", file), session.port(),
+  return ExplainRecord(record, Format("writing {}", file), session.port(),
                        HintOfWrite(result, record ? record->code : KRAL_ERROR_INTERNAL));
 }
 

@@ -1,7 +1,4 @@
 // kral flash: what has the line of a handset in download, flash programmers, images.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <optional>
 #include <string>
@@ -9,6 +6,7 @@
 
 #include "tools/kral/flash/flash_images.h"
 #include "tools/kral/flash/flash_target.h"
+#include "tools/kral/format.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -37,13 +35,13 @@ void ShowInfo(Context& context) {
   if (const auto limits = target.TryHello(1)) {
     return PrintState(
         context, port, "programmer", {{"block_size", limits->block_size}, {"window", limits->window}},
-        fmt::format("flash programmer: blocks of {} bytes, window of {}\n", limits->block_size, limits->window));
+        Format("flash programmer: blocks of {} bytes, window of {}\n", limits->block_size, limits->window));
   }
   if (const auto version = target.LoaderVersion()) {
     return PrintState(context, port, "loader", {{"version", *version}},
-                      fmt::format("loader, software version 0x{:02X}\n", *version));
+                      Format("loader, software version 0x{:02X}\n", *version));
   }
-  throw ToolError(ExitCode::kNoAnswer, fmt::format("nothing answers on {}", DescribePort(port)),
+  throw ToolError(ExitCode::kNoAnswer, Format("nothing answers on {}", DescribePort(port)),
                   "neither a handset in diagnostic mode, nor a loader, nor a flash programmer has the line");
 }
 
@@ -59,8 +57,7 @@ void LoadProgrammer(Context& context, const LoadArguments& arguments) {
     const auto chunk = std::min(arguments.packet / 2, kLargestChunk);
     context.out.Result(
         {{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
-        DescribeImage(programmer) +
-            fmt::format("  {} writes of at most {} bytes\n", CountBlocks(programmer, chunk), chunk));
+        DescribeImage(programmer) + Format("  {} writes of at most {} bytes\n", CountBlocks(programmer, chunk), chunk));
     return;
   }
   FlashTarget target(context);
@@ -68,15 +65,15 @@ void LoadProgrammer(Context& context, const LoadArguments& arguments) {
   target.Load(programmer, arguments.packet);
   const auto limits = target.TryHello(5);
   if (!limits) {
-    throw ToolError(ExitCode::kNoAnswer, fmt::format("{} was started but does not answer", arguments.file),
+    throw ToolError(ExitCode::kNoAnswer, Format("{} was started but does not answer", arguments.file),
                     "check that the programmer is meant for this handset");
   }
-  context.out.Result({{"port", target.session().port()},
-                      {"bytes", programmer.info.size[0]},
-                      {"block_size", limits->block_size},
-                      {"window", limits->window}},
-                     fmt::format("{} is running: blocks of {} bytes, window of {}\n", arguments.file,
-                                 limits->block_size, limits->window));
+  context.out.Result(
+      {{"port", target.session().port()},
+       {"bytes", programmer.info.size[0]},
+       {"block_size", limits->block_size},
+       {"window", limits->window}},
+      Format("{} is running: blocks of {} bytes, window of {}\n", arguments.file, limits->block_size, limits->window));
 }
 
 struct WriteArguments {
@@ -98,11 +95,11 @@ void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uin
     auto row = ImageObject(image);
     row["blocks"] = count;
     rows.push_back(std::move(row));
-    text += DescribeImage(image) + fmt::format("  {} blocks of at most {} bytes\n", count, block_size);
+    text += DescribeImage(image) + Format("  {} blocks of at most {} bytes\n", count, block_size);
     blocks += count;
   }
   const auto bytes = TotalBytes(images);
-  text += fmt::format("in all {} bytes in {} blocks; nothing was written\n", bytes, blocks);
+  text += Format("in all {} bytes in {} blocks; nothing was written\n", bytes, blocks);
   context.out.Result(
       {{"dry_run", true}, {"images", rows}, {"bytes", bytes}, {"blocks", blocks}, {"block_size", block_size}}, text);
 }
@@ -136,7 +133,7 @@ void WriteImages(Context& context, WriteArguments arguments) {
     }
   }
   context.out.Result({{"port", target.session().port()}, {"written", written}, {"bytes", done}},
-                     fmt::format("{} bytes in {} images written and acknowledged\n", done, images.size()));
+                     Format("{} bytes in {} images written and acknowledged\n", done, images.size()));
 }
 
 void VerifyImages(Context& context, const std::vector<std::string>& files, const std::string& format) {
@@ -168,85 +165,82 @@ void Convert(Context& context, const HexArguments& arguments) {
   if (KRAL_HEX_Convert(image.file.c_str(), arguments.output.c_str(),
                        to_binary ? KRAL_HEX_TO_BINARY : KRAL_HEX_FROM_BINARY, &base, &result) == 0) {
     if (result == KRAL_STREAM_BAD_ARGUMENT) {
-      throw ToolError(ExitCode::kUsage, fmt::format("the base 0x{:X} is no multiple of 0x10000", base),
+      throw ToolError(ExitCode::kUsage, Format("the base 0x{:X} is no multiple of 0x10000", base),
                       "give a base such as --base 0x20000");
     }
     if (result == KRAL_STREAM_PAST_END) {
       throw ToolError(ExitCode::kUsage,
-                      fmt::format("{} bytes from 0x{:X} on go past address 0xFFFFFFFF", image.info.size[0], base),
+                      Format("{} bytes from 0x{:X} on go past address 0xFFFFFFFF", image.info.size[0], base),
                       "give a lower base");
     }
     if (result != KRAL_HEX_NOT_WRITTEN) {
-      throw ToolError(ExitCode::kBadFile, fmt::format("{} changed while it was read", arguments.input),
+      throw ToolError(ExitCode::kBadFile, Format("{} changed while it was read", arguments.input),
                       "wait until it is complete");
     }
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written", arguments.output),
+    throw ToolError(ExitCode::kBadFile, Format("{} cannot be written", arguments.output),
                     "check folder, permissions and room on the disk");
   }
   context.out.Result({{"output", arguments.output}, {"base", base}, {"bytes", image.info.size[0]}},
-                     fmt::format("{}: {} bytes from 0x{:08X}\n", arguments.output, image.info.size[0], base));
+                     Format("{}: {} bytes from 0x{:08X}\n", arguments.output, image.info.size[0], base));
 }
 
-void AddFormat(CLI::App& verb, std::string& format) {
-  verb.add_option("--format", format, "Format of the images: auto goes by a colon as the first character")
-      ->check(CLI::IsMember({"auto", "hex", "bin"}))
-      ->capture_default_str();
+void AddFormat(const Command& verb, std::string& format) {
+  verb.Add("--format", format, "Format of the images: auto goes by a colon as the first character")
+      .OneOf({"auto", "hex", "bin"})
+      .ShowDefault();
 }
 
-void AddLoadVerb(CLI::App& flash, Context& context) {
+void AddLoadVerb(const Command& flash, Context& context) {
   const auto arguments = std::make_shared<LoadArguments>();
-  auto* load = flash.add_subcommand("load", "Enter the loader, load a flash programmer and start it");
-  load->add_option("programmer", arguments->file, "Intel HEX file of the flash programmer")->required();
-  load->add_option("--packet", arguments->packet, "Largest packet of the loader, bytes; half of it is data")
-      ->check(CLI::Range(2u, 65535u))
-      ->capture_default_str();
-  load->add_flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
-  load->callback(
-      [&context, arguments] { context.run = [&context, arguments] { LoadProgrammer(context, *arguments); }; });
+  const auto load = flash.Verb("load", "Enter the loader, load a flash programmer and start it");
+  load.Add("programmer", arguments->file, "Intel HEX file of the flash programmer").Required();
+  load.Add("--packet", arguments->packet, "Largest packet of the loader, bytes; half of it is data")
+      .Between(2, 65535, "bytes")
+      .ShowDefault();
+  load.Flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
+  load.Run([&context, arguments] { LoadProgrammer(context, *arguments); });
 }
 
-void AddWriteVerb(CLI::App& flash, Context& context) {
+void AddWriteVerb(const Command& flash, Context& context) {
   const auto arguments = std::make_shared<WriteArguments>();
-  auto* write = flash.add_subcommand("write", "Write images through the flash programmer");
-  write->add_option("images", arguments->images, "Image files, each as FILE or TYPE:FILE")->required();
-  AddFormat(*write, arguments->format);
-  write->add_option("--type", arguments->options.type, "Image type of files that do not name their own");
-  write->add_option("--header", arguments->options.header, "File of at most 512 bytes that opens each image");
-  write->add_flag("--nor", arguments->options.nor, "Neither open nor close: for programmers that take one image");
-  write->add_option("--block-size", arguments->options.block_size, "Bytes per write at most; default: the handset's")
-      ->check(CLI::Range(1u, kLargestBlock));
-  write->add_option("--security", arguments->security_mode, "Set this security mode first");
-  write->add_option("--partition", arguments->partition_table, "Send this partition table first");
-  write->add_flag("--override", arguments->override_table, "Let the partition table replace a different one");
-  write->add_flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
-  write->callback([&context, arguments] { context.run = [&context, arguments] { WriteImages(context, *arguments); }; });
+  const auto write = flash.Verb("write", "Write images through the flash programmer");
+  write.Add("images", arguments->images, "Image files, each as FILE or TYPE:FILE").Required();
+  AddFormat(write, arguments->format);
+  write.Add("--type", arguments->options.type, "Image type of files that do not name their own");
+  write.Add("--header", arguments->options.header, "File of at most 512 bytes that opens each image");
+  write.Flag("--nor", arguments->options.nor, "Neither open nor close: for programmers that take one image");
+  write.Add("--block-size", arguments->options.block_size, "Bytes per write at most; default: the handset's")
+      .Between(1, kLargestBlock, "bytes");
+  write.Add("--security", arguments->security_mode, "Set this security mode first");
+  write.Add("--partition", arguments->partition_table, "Send this partition table first");
+  write.Flag("--override", arguments->override_table, "Let the partition table replace a different one");
+  write.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
+  write.Run([&context, arguments] { WriteImages(context, *arguments); });
 }
 
 }  // namespace
 
-void AddFlashVerbs(CLI::App& app, Context& context) {
-  auto* flash = app.add_subcommand("flash", "Software download: flash programmers and images");
-  flash->require_subcommand(1);
-  flash->add_subcommand("info", "Tell what has the line: diagnostics, loader or flash programmer")
-      ->callback([&context] { context.run = [&context] { ShowInfo(context); }; });
-  AddLoadVerb(*flash, context);
-  AddWriteVerb(*flash, context);
+void AddFlashVerbs(const Command& root, Context& context) {
+  const auto flash = root.Noun("flash", "Software download: flash programmers and images");
+  flash.Verb("info", "Tell what has the line: diagnostics, loader or flash programmer").Run([&context] {
+    ShowInfo(context);
+  });
+  AddLoadVerb(flash, context);
+  AddWriteVerb(flash, context);
 
   const auto files = std::make_shared<std::vector<std::string>>();
   const auto format = std::make_shared<std::string>("auto");
-  auto* verify = flash->add_subcommand("verify-image", "Check image files and tell what is in them; needs no handset");
-  verify->add_option("images", *files, "Image files")->required();
-  AddFormat(*verify, *format);
-  verify->callback([&context, files, format] {
-    context.run = [&context, files, format] { VerifyImages(context, *files, *format); };
-  });
+  const auto verify = flash.Verb("verify-image", "Check image files and tell what is in them; needs no handset");
+  verify.Add("images", *files, "Image files").Required();
+  AddFormat(verify, *format);
+  verify.Run([&context, files, format] { VerifyImages(context, *files, *format); });
 
   const auto arguments = std::make_shared<HexArguments>();
-  auto* hex = flash->add_subcommand("hex", "Convert Intel HEX to binary, or a binary to Intel HEX; needs no handset");
-  hex->add_option("input", arguments->input, "File to read: the other format is written")->required();
-  hex->add_option("output", arguments->output, "File to write")->required();
-  hex->add_option("--base", arguments->base, "First address of a binary; a multiple of 0x10000");
-  hex->callback([&context, arguments] { context.run = [&context, arguments] { Convert(context, *arguments); }; });
+  const auto hex = flash.Verb("hex", "Convert Intel HEX to binary, or a binary to Intel HEX; needs no handset");
+  hex.Add("input", arguments->input, "File to read: the other format is written").Required();
+  hex.Add("output", arguments->output, "File to write").Required();
+  hex.Add("--base", arguments->base, "First address of a binary; a multiple of 0x10000");
+  hex.Run([&context, arguments] { Convert(context, *arguments); });
 }
 
 }  // namespace kral::tool

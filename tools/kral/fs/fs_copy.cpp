@@ -2,8 +2,6 @@
 // handset that does not answer, and a file that arrives changed, do.
 #include "tools/kral/fs/fs_copy.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <cctype>
 #include <set>
@@ -11,6 +9,7 @@
 
 #include "platform/file_util.h"
 #include "platform/folder.h"
+#include "tools/kral/format.h"
 #include "tools/kral/fs/fs_names.h"
 
 namespace kral::tool {
@@ -21,19 +20,19 @@ constexpr std::uint64_t kLargestFile = 256u << 20;  // more than handsets hold; 
 Bytes ReadLocal(const std::string& path) {
   Bytes bytes;
   if (LookAt(path).kind == LocalKind::kOther) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no ordinary file", path),
+    throw ToolError(ExitCode::kBadFile, Format("{} is no ordinary file", path),
                     "write what comes from pipes and devices into a file first");
   }
   if (const auto error = ReadWholeFile(path, kLargestFile, bytes)) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be read: {}", path, error.message()),
-                    fmt::format("check the name and its permissions; a file may have {}", SizeText(kLargestFile)));
+    throw ToolError(ExitCode::kBadFile, Format("{} cannot be read: {}", path, error.message()),
+                    Format("check the name and its permissions; a file may have {}", SizeText(kLargestFile)));
   }
   return bytes;
 }
 
 void MakeLocalFolder(const std::string& path) {
   if (const auto error = MakeFolder(path)) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("the folder {} cannot be made: {}", path, error.message()),
+    throw ToolError(ExitCode::kBadFile, Format("the folder {} cannot be made: {}", path, error.message()),
                     "check the name and the permissions of the folder around it");
   }
 }
@@ -55,12 +54,12 @@ bool IsIn(const std::string& folder, const std::string& path) {
 }
 
 ToolError UnsafeName(const std::string& where) {
-  return {ExitCode::kSafetyStop, fmt::format("the name of {} is not safe on the PC", where),
+  return {ExitCode::kSafetyStop, Format("the name of {} is not safe on the PC", where),
           "kral fs get :PATH NAME fetches one file under another name"};
 }
 
 ToolError NeedsRecursion(const std::string& where) {
-  return {ExitCode::kUsage, fmt::format("{} is a directory", where), "-r copies it with all that is in it"};
+  return {ExitCode::kUsage, Format("{} is a directory", where), "-r copies it with all that is in it"};
 }
 
 }  // namespace
@@ -118,10 +117,10 @@ void Copier::PlanGet(const std::string& source, const std::string& target) {
 const char* Copier::GetOne(const Job& job) {
   const auto there = LookAt(job.to);
   if (there.kind == LocalKind::kFolder) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} is a folder", job.to), "name another file");
+    throw ToolError(ExitCode::kBadFile, Format("{} is a folder", job.to), "name another file");
   }
   if (there.kind == LocalKind::kOther) {  // a device or a pipe, which a new file would replace
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} is no ordinary file", job.to),
+    throw ToolError(ExitCode::kBadFile, Format("{} is no ordinary file", job.to),
                     "name another file; kral fs cat prints a file");
   }
   const bool comparable = there.kind == LocalKind::kFile && there.size == job.size && job.size <= kLargestFile;
@@ -132,7 +131,7 @@ const char* Copier::GetOne(const Job& job) {
   const auto bytes = files_.ReadAll(job.from, job.size);
   if (bytes == ReadLocal(job.to)) return "equal";
   if (const auto error = ReplaceWholeFile(job.to, bytes)) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} cannot be written: {}", job.to, error.message()),
+    throw ToolError(ExitCode::kBadFile, Format("{} cannot be written: {}", job.to, error.message()),
                     "check the disk and the permissions");
   }
   return "copied";
@@ -158,7 +157,7 @@ void Copier::Put(const std::string& source, const std::string& target) {
 void Copier::PlanPut(const std::string& source, const std::string& target) {
   std::vector<FolderEntry> entries;
   if (const auto error = ListFolder(source, entries)) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("the folder {} cannot be read: {}", source, error.message()),
+    throw ToolError(ExitCode::kBadFile, Format("the folder {} cannot be read: {}", source, error.message()),
                     "check its permissions");
   }
   folders_.push_back(target);
@@ -179,7 +178,7 @@ const char* Copier::PutOne(const Job& job) {
   const auto bytes = ReadLocal(job.from);
   const auto before = files_.Find(job.to);
   if (before && before->is_directory()) {
-    throw ToolError(ExitCode::kRefused, fmt::format("{} is a directory", files_.Where(job.to)), "name another file");
+    throw ToolError(ExitCode::kRefused, Format("{} is a directory", files_.Where(job.to)), "name another file");
   }
   // An item file stays one: the firmware that reads it would not find it otherwise.
   const bool as_item = options_.item || (before && before->is_item());
@@ -219,7 +218,7 @@ void Copier::Verify(const Job& job, const Bytes& bytes) {
   }
   context_.found["mismatch"] = {{"from", job.from}, {"to", job.to}, {"offset", difference}};
   throw ToolError(ExitCode::kMismatch,
-                  fmt::format("{} differs from {} at offset {}", files_.Where(job.to), job.from, difference),
+                  Format("{} differs from {} at offset {}", files_.Where(job.to), job.from, difference),
                   "put it again; a handset that keeps changing bytes has worn memory");
 }
 
@@ -302,7 +301,7 @@ void Copier::Run(Plan&& plan, MakeOne&& make_folder, CopyOne&& copy) {
 }
 
 void Copier::Leave(std::string_view path, std::string_view reason) {
-  progress_.Note(fmt::format("{} is left out: {}", Printable(path), reason));
+  progress_.Note(Format("{} is left out: {}", Printable(path), reason));
   left_.push_back({{"path", path}, {"reason", reason}});
 }
 
@@ -323,13 +322,13 @@ Json Copier::Members() const {
 void Copier::Report() const {
   if (failed_ > 0) {
     context_.found.update(Members());
-    const auto more = failed_ > 1 ? fmt::format(", and {} more", failed_ - 1) : std::string();
+    const auto more = failed_ > 1 ? Format(", and {} more", failed_ - 1) : std::string();
     throw ToolError(first_failure_->code(), first_failure_->what() + more, first_failure_->hint(),
                     first_failure_->record());
   }
   auto members = Members();
   if (options_.verify) members["verified"] = true;
-  context_.out.Result(members, fmt::format("{} copied, {} equal already, {}\n", copied_, equal_, SizeText(bytes_)));
+  context_.out.Result(members, Format("{} copied, {} equal already, {}\n", copied_, equal_, SizeText(bytes_)));
 }
 
 }  // namespace kral::tool

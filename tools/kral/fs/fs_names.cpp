@@ -1,8 +1,6 @@
 // What can be told of names, modes, times and error numbers without asking a handset.
 #include "tools/kral/fs/fs_names.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <cctype>
@@ -10,6 +8,7 @@
 #include <utility>
 
 #include "kral/efs.h"
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -89,7 +88,7 @@ std::string EfsPath(std::string_view argument) {
 }
 
 std::string JoinEfs(std::string_view folder, std::string_view name) {
-  return fmt::format("{}{}{}", folder, folder.ends_with('/') ? "" : "/", name);
+  return Format("{}{}{}", folder, folder.ends_with('/') ? "" : "/", name);
 }
 
 std::string_view LastName(std::string_view path) {
@@ -132,16 +131,16 @@ std::string TimeText(std::uint32_t seconds) {
   const auto day = std::chrono::floor<std::chrono::days>(time);
   const std::chrono::year_month_day date(day);
   const std::chrono::hh_mm_ss clock(time - day);
-  return fmt::format("{:04}-{:02}-{:02} {:02}:{:02}:{:02}", static_cast<int>(date.year()),
-                     static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
-                     clock.minutes().count(), clock.seconds().count());
+  return Format("{:04}-{:02}-{:02} {:02}:{:02}:{:02}", static_cast<int>(date.year()),
+                static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
+                clock.minutes().count(), clock.seconds().count());
 }
 
 std::string ErrorText(std::uint32_t error_number) {
   const auto known = std::find_if(kErrors.begin(), kErrors.end(),
                                   [error_number](const KnownError& row) { return row.number == error_number; });
-  return known == kErrors.end() ? fmt::format("error {}", error_number)
-                                : fmt::format("error {}, {}", error_number, known->meaning);
+  return known == kErrors.end() ? Format("error {}", error_number)
+                                : Format("error {}, {}", error_number, known->meaning);
 }
 
 }  // namespace kral::tool

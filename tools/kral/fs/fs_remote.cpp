@@ -1,12 +1,11 @@
 // Calls the library and turns its results and error numbers into errors that name the path.
 #include "tools/kral/fs/fs_remote.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <utility>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/fs/fs_names.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/output.h"
@@ -80,7 +79,7 @@ void KRAL_CALL RemoteFiles::OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE han
 }
 
 std::string RemoteFiles::Where(std::string_view path) const {
-  return fmt::format("{} on {}", Printable(path), DescribePort(session_.port()));
+  return Format("{} on {}", Printable(path), DescribePort(session_.port()));
 }
 
 // A call whose answer is an error number has not failed, and leaves no record: the number is told as one is.
@@ -92,8 +91,8 @@ ToolError RemoteFiles::Refusal(std::string_view what, std::string_view path, std
   record.status_kind = KRAL_ERROR_STATUS_EFS;
   record.status = error_number;
   const std::string text = error_number == kNoSuchFile && !path.empty()
-                               ? fmt::format("no such file {}", Printable(path))
-                               : fmt::format("the handset refused {}: {}", what, ErrorText(error_number));
+                               ? Format("no such file {}", Printable(path))
+                               : Format("the handset refused {}: {}", what, ErrorText(error_number));
   text.copy(record.text, sizeof record.text - 1);
   return ExplainRecord(record, what, session_.port());
 }
@@ -114,7 +113,7 @@ void RemoteFiles::Put(std::string_view what, const std::string& path, Request&& 
   for (std::size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
     const auto directory = path.substr(0, end);
     if (Find(directory)) continue;
-    throw ToolError(error.code(), fmt::format("there is no directory {}", Where(directory)),
+    throw ToolError(error.code(), Format("there is no directory {}", Where(directory)),
                     "kral fs mkdir --parents makes it", error.record());
   }
   throw error;
@@ -130,7 +129,7 @@ void RemoteFiles::Ask(std::string_view what, std::string_view path, std::string_
 std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
   RemoteStatus status;
   std::uint32_t error = 0;
-  const auto what = fmt::format("the status of {}", Printable(path));
+  const auto what = Format("the status of {}", Printable(path));
   Transfer(what, [&] {
     return KRAL_EFS2_DIAG_STAT(session_.handle(), path.c_str(), &error, &status.mode, &status.size, &status.links,
                                &status.accessed, &status.modified, &status.changed);
@@ -142,19 +141,19 @@ std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
 
 RemoteStatus RemoteFiles::Status(const std::string& path) {
   if (const auto status = Find(path)) return *status;
-  throw Refusal(fmt::format("the status of {}", Printable(path)), path, kNoSuchFile, kStatus);
+  throw Refusal(Format("the status of {}", Printable(path)), path, kNoSuchFile, kStatus);
 }
 
 std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
   listed_ = path;
   entries_.clear();
-  const auto what = fmt::format("the listing of {}", Printable(path));
+  const auto what = Format("the listing of {}", Printable(path));
   session_.Begin();
   if (KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr) == 0) {
     if (Interrupted() || entry_count_ < kMostEntries) throw session_.Explain(what);
     throw ToolError(
         ExitCode::kLink,
-        fmt::format("{} on {} does not end: {} entries so far", what, DescribePort(session_.port()), entry_count_),
+        Format("{} on {} does not end: {} entries so far", what, DescribePort(session_.port()), entry_count_),
         "a handset that gives entries without end needs a restart; list its directories one by one");
   }
   std::sort(entries_.begin(), entries_.end(),
@@ -163,7 +162,7 @@ std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
 }
 
 void RemoteFiles::MakeDirectory(const std::string& path) {
-  const auto what = fmt::format("the making of directory {}", Printable(path));
+  const auto what = Format("the making of directory {}", Printable(path));
   std::uint32_t error = 0;
   session_.Begin();
   if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) == 0) {
@@ -181,32 +180,31 @@ void RemoteFiles::MakeParents(const std::string& path) {
 }
 
 void RemoteFiles::ReadInto(const std::string& local, const std::string& path) {
-  Transfer(fmt::format("reading {}", Printable(path)),
+  Transfer(Format("reading {}", Printable(path)),
            [&] { return KRAL_EfsRead(session_.handle(), local.c_str(), path.c_str()); });
 }
 
 Bytes RemoteFiles::ReadAll(const std::string& path, std::uint32_t size) {
   Bytes bytes(size);
-  Transfer(fmt::format("reading {}", Printable(path)),
+  Transfer(Format("reading {}", Printable(path)),
            [&] { return KRAL_EfsReadMem(session_.handle(), path.c_str(), bytes.data(), &size); });
   bytes.resize(size);
   return bytes;
 }
 
 void RemoteFiles::Write(const std::string& path, std::span<const std::uint8_t> bytes) {
-  Put(fmt::format("writing {}", Printable(path)), path, [&] {
+  Put(Format("writing {}", Printable(path)), path, [&] {
     return KRAL_EfsWriteMem(session_.handle(), bytes.data(), static_cast<std::uint32_t>(bytes.size()), path.c_str());
   });
 }
 
 void RemoteFiles::WriteItem(const std::string& path, std::span<const std::uint8_t> bytes) {
   if (bytes.size() > KRAL_EFS_ITEM_SIZE) {
-    throw ToolError(ExitCode::kBadFile,
-                    fmt::format("{} bytes are too many for the item file {}", bytes.size(), Where(path)),
-                    fmt::format("an item file holds {} bytes; remove it first to put an ordinary file in its place",
-                                KRAL_EFS_ITEM_SIZE));
+    throw ToolError(ExitCode::kBadFile, Format("{} bytes are too many for the item file {}", bytes.size(), Where(path)),
+                    Format("an item file holds {} bytes; remove it first to put an ordinary file in its place",
+                           KRAL_EFS_ITEM_SIZE));
   }
-  Put(fmt::format("writing the item {}", Printable(path)), path, [&] {
+  Put(Format("writing the item {}", Printable(path)), path, [&] {
     return KRAL_EfsPutItemFromMem(session_.handle(), path.c_str(), bytes.data(),
                                   static_cast<std::uint32_t>(bytes.size()));
   });

@@ -1,7 +1,4 @@
 // kral fs: the handset's files. Looking and changing names is done here; copying is fs_copy's.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <functional>
 #include <memory>
@@ -9,6 +6,7 @@
 
 #include "platform/console.h"
 #include "platform/folder.h"
+#include "tools/kral/format.h"
 #include "tools/kral/fs/fs_copy.h"
 #include "tools/kral/fs/fs_names.h"
 #include "tools/kral/fs/fs_remote.h"
@@ -57,15 +55,15 @@ Json Describe(const RemoteEntry& entry) {
   const bool is_item = (entry.mode & KRAL_EFS_MODE_KIND) == KRAL_EFS_MODE_ITEM_FILE;
   return {{"name", entry.name},
           {"type", is_item ? "item" : NameOf(entry.kind)},
-          {"mode", fmt::format("{:o}", entry.mode)},
+          {"mode", Format("{:o}", entry.mode)},
           {"size", entry.size},
           {"modified", entry.modified}};
 }
 
 std::string ListLine(const RemoteEntry& entry) {
   const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
-  return fmt::format("{}  {:>10}  {}  {}{}\n", ModeText(entry.mode), entry.size, TimeText(entry.modified),
-                     Printable(entry.name), is_directory ? "/" : "");
+  return Format("{}  {:>10}  {}  {}{}\n", ModeText(entry.mode), entry.size, TimeText(entry.modified),
+                Printable(entry.name), is_directory ? "/" : "");
 }
 
 // --- Looking --------------------------------------------------------------------------------------------------------
@@ -96,7 +94,7 @@ Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent
     const auto& entry = entries[i];
     const bool last = i + 1 == entries.size();
     const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
-    text += fmt::format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", Printable(entry.name), is_directory ? "/" : "");
+    text += Format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", Printable(entry.name), is_directory ? "/" : "");
     rows.push_back(Describe(entry));
     if (!is_directory || entry.name.find('/') != std::string::npos) continue;
     const auto inner = indent + (last ? "    " : "|   ");
@@ -105,7 +103,7 @@ Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent
     } catch (const ToolError& error) {
       if (!ConcernsOneFile(error)) throw;
       rows.back()["error"] = error.what();
-      text += fmt::format("{}`-- [{}]\n", inner, error.what());
+      text += Format("{}`-- [{}]\n", inner, error.what());
     }
   }
   return rows;
@@ -122,10 +120,10 @@ void Cat(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   const auto status = files.Status(path);
   if (status.is_directory()) {
-    throw ToolError(ExitCode::kUsage, fmt::format("{} is a directory", files.Where(path)), "kral fs ls lists it");
+    throw ToolError(ExitCode::kUsage, Format("{} is a directory", files.Where(path)), "kral fs ls lists it");
   }
   if (status.size > kLargestCat) {
-    throw ToolError(ExitCode::kUsage, fmt::format("{} has {}", files.Where(path), SizeText(status.size)),
+    throw ToolError(ExitCode::kUsage, Format("{} has {}", files.Where(path), SizeText(status.size)),
                     "kral fs get fetches files of any size");
   }
   const auto bytes = files.ReadAll(path, status.size);
@@ -146,23 +144,23 @@ void Stat(Context& context, RemoteFiles& files, const FsOptions& options) {
   const Json members{{"port", files.session().port()},
                      {"path", path},
                      {"type", KindName(status)},
-                     {"mode", fmt::format("{:o}", status.mode)},
+                     {"mode", Format("{:o}", status.mode)},
                      {"size", status.size},
                      {"links", status.links},
                      {"accessed", status.accessed},
                      {"modified", status.modified},
                      {"changed", status.changed}};
-  context.out.Result(members, fmt::format("{}\n  type      {}\n  mode      {} ({:o})\n  size      {}\n  links     {}\n"
-                                          "  accessed  {}\n  modified  {}\n  changed   {}\n",
-                                          Printable(path), KindName(status), ModeText(status.mode), status.mode,
-                                          status.size, status.links, TimeText(status.accessed),
-                                          TimeText(status.modified), TimeText(status.changed)));
+  context.out.Result(
+      members, Format("{}\n  type      {}\n  mode      {} ({:o})\n  size      {}\n  links     {}\n"
+                      "  accessed  {}\n  modified  {}\n  changed   {}\n",
+                      Printable(path), KindName(status), ModeText(status.mode), status.mode, status.size, status.links,
+                      TimeText(status.accessed), TimeText(status.modified), TimeText(status.changed)));
 }
 
 void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   KRAL_EFS_STATFS status{};
-  files.Ask(fmt::format("the room of {}", Printable(path)), path, "KRAL_EFS2_DIAG_STATFS", [&](std::uint32_t* error) {
+  files.Ask(Format("the room of {}", Printable(path)), path, "KRAL_EFS2_DIAG_STATFS", [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_STATFS(files.session().handle(), path.c_str(), error, &status);
   });
   const auto bytes = [&status](std::uint32_t blocks) { return std::uint64_t{blocks} * status.block_size; };
@@ -177,8 +175,8 @@ void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
                      {"most_files", status.max_file_count}};
   context.out.Result(
       members,
-      fmt::format("{} in all, {} used, {} available; {} of at most {} files\n", SizeText(bytes(status.total_blocks)),
-                  SizeText(used), SizeText(bytes(status.available_blocks)), status.file_count, status.max_file_count));
+      Format("{} in all, {} used, {} available; {} of at most {} files\n", SizeText(bytes(status.total_blocks)),
+             SizeText(used), SizeText(bytes(status.available_blocks)), status.file_count, status.max_file_count));
 }
 
 // --- Changing -------------------------------------------------------------------------------------------------------
@@ -200,7 +198,7 @@ void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
 void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, std::string_view function,
                PathCall call) {
   ForEachPath(context, files, options, [&](const std::string& path) {
-    files.Ask(fmt::format("the removal of {}", Printable(path)), path, function,
+    files.Ask(Format("the removal of {}", Printable(path)), path, function,
               [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
   });
 }
@@ -227,7 +225,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto from = EfsPath(options.paths[0]);
   auto to = EfsPath(options.paths[1]);
   if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
-  files.Ask(fmt::format("the renaming of {} to {}", Printable(from), Printable(to)), from, "KRAL_EFS2_DIAG_RENAME",
+  files.Ask(Format("the renaming of {} to {}", Printable(from), Printable(to)), from, "KRAL_EFS2_DIAG_RENAME",
             [&](std::uint32_t* error) {
               return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
             });
@@ -237,7 +235,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
 void Link(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto target = EfsPath(options.paths[0]);
   const auto link = EfsPath(options.paths[1]);
-  files.Ask(fmt::format("the link {}", Printable(link)), {}, "KRAL_EfsCreateLink", [&](std::uint32_t* error) {
+  files.Ask(Format("the link {}", Printable(link)), {}, "KRAL_EfsCreateLink", [&](std::uint32_t* error) {
     return KRAL_EfsCreateLink(files.session().handle(), target.c_str(), link.c_str(), error);
   });
   context.out.Result({{"port", files.session().port()}, {"target", target}, {"link", link}}, "");
@@ -247,7 +245,7 @@ void Sync(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   files.session().Begin();
   if (KRAL_EFS2_SyncWithWait(files.session().handle(), path.c_str(), options.wait_ms) == 0) {
-    const ToolError error = files.session().Explain(fmt::format("the sync of {}", Printable(path)));
+    const ToolError error = files.session().Explain(Format("the sync of {}", Printable(path)));
     if (error.code() != ExitCode::kNoAnswer) throw error;
     throw ToolError(error.code(), error.what(), "--wait MS waits longer", error.record());
   }
@@ -259,7 +257,7 @@ void Sync(Context& context, RemoteFiles& files, const FsOptions& options) {
 // The colon tells the sides apart, so that a mistaken order is noticed before anything is overwritten.
 void CheckSides(const std::string& handset_side, const std::string& local_side) {
   if (IsEfsArgument(handset_side) && !IsEfsArgument(local_side) && !local_side.empty()) return;
-  throw ToolError(ExitCode::kUsage, fmt::format("of {} and {}, one is no path of its side", handset_side, local_side),
+  throw ToolError(ExitCode::kUsage, Format("of {} and {}, one is no path of its side", handset_side, local_side),
                   "mark the handset's side with a colon: kral fs get :/nv/item item, kral fs put item :/nv/item");
 }
 
@@ -278,7 +276,7 @@ void Get(Context& context, RemoteFiles& files, const FsOptions& options) {
 void CheckPut(const FsOptions& options) {
   CheckSides(options.paths[1], options.paths[0]);
   if (LookAt(options.paths[0]).kind == LocalKind::kMissing) {
-    throw ToolError(ExitCode::kBadFile, fmt::format("there is no {}", options.paths[0]), "check the name");
+    throw ToolError(ExitCode::kBadFile, Format("there is no {}", options.paths[0]), "check the name");
   }
 }
 
@@ -327,35 +325,32 @@ void Run(Context& context, const FsOptions& options, const Verb& verb) {
   verb.act(context, files, options);
 }
 
-void AddFlags(const CLI::App& fs, FsOptions& options) {
+void AddFlags(const Command& fs, FsOptions& options) {
   for (const char* name : {"get", "put"}) {
-    auto* verb = fs.get_subcommand(name);
-    verb->add_flag("-r,--recursive", options.copy.recursive, "Copy directories with all that is in them");
-    verb->add_flag("--force", options.copy.force, "Copy files that are equal already, too");
+    const auto verb = fs.Find(name);
+    verb.Flag("-r,--recursive", options.copy.recursive, "Copy directories with all that is in them");
+    verb.Flag("--force", options.copy.force, "Copy files that are equal already, too");
   }
-  fs.get_subcommand("put")->add_flag("--item", options.copy.item, "Put item files; those there stay items anyway");
-  fs.get_subcommand("put")->add_flag("--no-verify", options.unverified, "Do not read back and compare");
-  fs.get_subcommand("mkdir")->add_flag("--parents", options.parents, "Make the directories above, too");
-  fs.get_subcommand("sync")
-      ->add_option("--wait", options.wait_ms, "Milliseconds until it is given up")
-      ->check(CLI::Range(1u, kLongestSyncMs));
+  fs.Find("put").Flag("--item", options.copy.item, "Put item files; those there stay items anyway");
+  fs.Find("put").Flag("--no-verify", options.unverified, "Do not read back and compare");
+  fs.Find("mkdir").Flag("--parents", options.parents, "Make the directories above, too");
+  fs.Find("sync").Add("--wait", options.wait_ms, "Milliseconds until it is given up").Between(1, kLongestSyncMs, "ms");
 }
 
 }  // namespace
 
-void AddFsVerbs(CLI::App& app, Context& context) {
+void AddFsVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<FsOptions>();
-  auto* fs = app.add_subcommand("fs", "Files on the handset; a ':' in front of a path marks the handset's side");
-  fs->require_subcommand(1);
-  fs->add_option("--packet-size", options->packet_size, "Bytes of a packet in transfers; larger ones are faster")
-      ->check(CLI::Range(kSmallestPacket, kLargestPacket));
+  const auto fs = root.Noun("fs", "Files on the handset; a ':' in front of a path marks the handset's side");
+  fs.Add("--packet-size", options->packet_size, "Bytes of a packet in transfers; larger ones are faster")
+      .Between(kSmallestPacket, kLargestPacket, "bytes");
   for (const auto& verb : kVerbs) {
-    auto* subcommand = fs->add_subcommand(verb.name, verb.help);
-    subcommand->add_option(verb.paths, options->paths)->expected(verb.least, verb.most)->required(verb.least > 0);
-    subcommand->callback(
-        [&context, options, &verb] { context.run = [&context, options, &verb] { Run(context, *options, verb); }; });
+    const auto subcommand = fs.Verb(verb.name, verb.help);
+    auto paths = subcommand.Add(verb.paths, options->paths).Count(verb.least, verb.most);
+    if (verb.least > 0) paths.Required();
+    subcommand.Run([&context, options, &verb] { Run(context, *options, verb); });
   }
-  AddFlags(*fs, *options);
+  AddFlags(fs, *options);
 }
 
 }  // namespace kral::tool

@@ -1,7 +1,4 @@
 // kral nv backup, restore, verify: the handset's items and item files to and from a PKV file.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <memory>
 #include <optional>
@@ -11,6 +8,7 @@
 
 #include "tools/kral/abort_on_interrupt.h"
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/nv/nv_items.h"
 #include "tools/kral/progress.h"
@@ -101,7 +99,7 @@ class JobRun {
     std::string text;
     for (const auto& [result, count] : All()) {
       if (count == 0 && result != KRAL_PKV_DONE) continue;
-      text += fmt::format("{}{} {}", text.empty() ? "" : ", ", count, WordOf(result, words_));
+      text += Format("{}{} {}", text.empty() ? "" : ", ", count, WordOf(result, words_));
     }
     return text;
   }
@@ -141,21 +139,21 @@ class JobRun {
       name = Printable(path);
       row["path"] = name;
     } else {
-      name = fmt::format("item {}", item.id);
+      name = Format("item {}", item.id);
       row["id"] = item.id;
-      if (item.index != 0) name += fmt::format("[{}]", item.index);
+      if (item.index != 0) name += Format("[{}]", item.index);
       row["index"] = item.index;
-      if (item.subscription != 0) name += fmt::format(" of subscription {}", item.subscription);
+      if (item.subscription != 0) name += Format(" of subscription {}", item.subscription);
       row["subscription"] = item.subscription;
     }
     row["result"] = word;
     row["status"] = item.status;
     items_.push_back(std::move(row));
-    if (worth_a_line) text_ += fmt::format("{}: {}{}\n", name, word, StatusText(item));
+    if (worth_a_line) text_ += Format("{}: {}{}\n", name, word, StatusText(item));
   }
 
   static std::string StatusText(const KRAL_PKV_ITEM& item) {
-    return item.status != 0 ? fmt::format(", status {}", item.status) : "";
+    return item.status != 0 ? Format(", status {}", item.status) : "";
   }
 
   static inline JobRun* running_ = nullptr;
@@ -176,47 +174,46 @@ ToolError BadFile(const std::string& file, std::uint32_t status, const std::opti
   const char* const fault = status == KRAL_PKV_STATUS_NO_STORAGE ? "is no PKV file"
                             : status == KRAL_PKV_STATUS_BAD_ITEM ? "holds a damaged item"
                                                                  : "cannot be used";
-  return {ExitCode::kBadFile, fmt::format("{} {}", file, fault), kHint, record};
+  return {ExitCode::kBadFile, Format("{} {}", file, fault), kHint, record};
 }
 
 // The end of a job that did not come out as wanted.
 ToolError Explain(const Session& session, const char* work, const std::string& file, std::uint32_t status,
                   const KRAL_PKV_COUNTS& counts, const std::optional<KRAL_ERROR>& record) {
-  const std::string where = fmt::format("the {} on {}", work, DescribePort(session.port()));
+  const std::string where = Format("the {} on {}", work, DescribePort(session.port()));
   switch (status) {
     case KRAL_PKV_STATUS_STOPPED:
       return InterruptedError();
     case KRAL_PKV_STATUS_LOST:
-      return {ExitCode::kLost, fmt::format("the handset stopped answering during {}", where),
+      return {ExitCode::kLost, Format("the handset stopped answering during {}", where),
               "check the cable, then run the command again", record};
     case KRAL_PKV_STATUS_NOTHING_READ:
       if (counts.refused > 0) {
-        return {
-            ExitCode::kRefused,
-            fmt::format("the handset on {} gave no item and refused {}", DescribePort(session.port()), counts.refused),
-            "the result names them; some may need an unlock or another mode"};
+        return {ExitCode::kRefused,
+                Format("the handset on {} gave no item and refused {}", DescribePort(session.port()), counts.refused),
+                "the result names them; some may need an unlock or another mode"};
       }
-      return {ExitCode::kRefused, fmt::format("the handset on {} gave no item", DescribePort(session.port())),
+      return {ExitCode::kRefused, Format("the handset on {} gave no item", DescribePort(session.port())),
               "check the range of --items"};
     case KRAL_PKV_STATUS_INCOMPLETE:
       return {ExitCode::kRefused,
-              fmt::format("the handset on {} refused {} items; {} holds the others", DescribePort(session.port()),
-                          counts.refused, file),
+              Format("the handset on {} refused {} items; {} holds the others", DescribePort(session.port()),
+                     counts.refused, file),
               "the result names them; some may need an unlock or another mode"};
     case KRAL_PKV_STATUS_NOT_WRITTEN:
       if (counts.refused > 0) {
         return {ExitCode::kRefused,
-                fmt::format("the handset on {} refused {} items", DescribePort(session.port()), counts.refused),
+                Format("the handset on {} refused {} items", DescribePort(session.port()), counts.refused),
                 "the result names them; some may need an unlock or another mode"};
       }
       return {ExitCode::kMismatch,
-              fmt::format("{} items do not read back as written", counts.different + counts.not_read_back),
+              Format("{} items do not read back as written", counts.different + counts.not_read_back),
               "the result names them"};
     case KRAL_PKV_STATUS_DIFFERENT:
-      return {ExitCode::kMismatch, fmt::format("{} and the handset on {} differ", file, DescribePort(session.port())),
+      return {ExitCode::kMismatch, Format("{} and the handset on {} differ", file, DescribePort(session.port())),
               "the result names the items; kral nv restore writes them"};
     case KRAL_PKV_STATUS_UNEXPECTED:
-      return {ExitCode::kInternal, fmt::format("{} failed within the library", where), "--log FILE tells more", record};
+      return {ExitCode::kInternal, Format("{} failed within the library", where), "--log FILE tells more", record};
     default:
       return BadFile(file, status, record);
   }
@@ -272,27 +269,24 @@ void Verify(Context& context, const BackupOptions& options) {
 
 }  // namespace
 
-void AddNvBackupVerbs(CLI::App& app, Context& context) {
+void AddNvBackupVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<BackupOptions>();
-  const auto present = app.get_subcommands([](const CLI::App* noun) { return noun->get_name() == "nv"; });
-  auto* nv = present.empty() ? app.add_subcommand("nv", "NV items of the handset") : present.front();
-  nv->require_subcommand(1);
+  const auto nv = root.Find("nv");
   const auto add = [&](const char* name, const char* help, void (*act)(Context&, const BackupOptions&)) {
-    auto* verb = nv->add_subcommand(name, help);
-    verb->add_option("file", options->file, "PKV file")->required();
-    AddDefinitionOptions(*verb, options->nv);
-    verb->callback([&context, options, act] { context.run = [&context, options, act] { act(context, *options); }; });
+    const auto verb = nv.Verb(name, help);
+    verb.Add("file", options->file, "PKV file").Required();
+    AddDefinitionOptions(verb, options->nv);
+    verb.Run([&context, options, act] { act(context, *options); });
     return verb;
   };
-  auto* backup = add("backup", "Read all items and item files into a PKV file", Backup);
-  backup->add_option("--items", options->items, "Range of item ids to read");
-  backup->add_option("--subscriptions", options->subscriptions, "How many subscriptions the handset has")
-      ->check(CLI::Range(1, 16));
-  auto* restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);
-  restore->add_flag("--dry-run", options->dry_run, "Only tell what would be written");
-  restore->add_option("--read-only", options->read_only, "Items that may be read-only (0,447): skipped, not refused")
-      ->delimiter(',')
-      ->allow_extra_args(false);
+  const auto backup = add("backup", "Read all items and item files into a PKV file", Backup);
+  backup.Add("--items", options->items, "Range of item ids to read");
+  backup.Add("--subscriptions", options->subscriptions, "How many subscriptions the handset has").Between(1, 16);
+  const auto restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);
+  restore.Flag("--dry-run", options->dry_run, "Only tell what would be written");
+  restore.Add("--read-only", options->read_only, "Items that may be read-only (0,447): skipped, not refused")
+      .Separated(',')
+      .OneEach();
   add("verify", "Compare a PKV file with the handset", Verify);
 }
 

@@ -1,11 +1,11 @@
 // Gives the numbers of a value the names of the members that they belong to.
 #include "tools/kral/nv/nv_item_output.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <charconv>
 #include <set>
+
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -34,7 +34,7 @@ std::uint64_t WordOf(const std::string& number, const std::string& type) {
     std::from_chars(number.data(), end, word);
   }
   for (const unsigned bits : {8u, 16u, 32u}) {
-    if (type.ends_with(fmt::format("word{}", bits))) return word & ((std::uint64_t{1} << bits) - 1);
+    if (type.ends_with(Format("word{}", bits))) return word & ((std::uint64_t{1} << bits) - 1);
   }
   return word;
 }
@@ -45,7 +45,7 @@ const NvForm* FormOf(const NvItem& item, const std::vector<std::string>& numbers
     if (form.selector.empty()) {
       other = &form;
     } else if (!numbers.empty() && !form.members.empty() &&
-               fmt::to_string(WordOf(numbers[0], form.members[0].type)) == form.selector) {
+               std::to_string(WordOf(numbers[0], form.members[0].type)) == form.selector) {
       return &form;
     }
   }
@@ -99,8 +99,8 @@ Json JsonMembers(const std::vector<NamedNumbers>& members) {
 std::string FormText(const NvForm& form) {
   std::string text;
   for (const NvMember& member : form.members) {
-    text += fmt::format("{}{}: {}", text.empty() ? "" : ", ", member.name, member.type);
-    if (member.count > 1) text += fmt::format("[{}]", member.count);
+    text += Format("{}{}: {}", text.empty() ? "" : ", ", member.name, member.type);
+    if (member.count > 1) text += Format("[{}]", member.count);
   }
   return text;
 }
@@ -152,19 +152,19 @@ std::string ValueText(const NvItem& item, const NvReading& reading) {
   std::string text = item.Title() + "\n";
   if (IsOfBytes(item)) return text + HexDump(reading.bytes);
   for (const auto& [index, numbers] : reading.elements) {
-    const std::string element = item.max_index > 0 ? fmt::format("[{}] ", index) : "";
-    if (!item.defined) text += fmt::format("  {}{}\n", element, fmt::join(numbers, ","));
+    const std::string element = item.max_index > 0 ? Format("[{}] ", index) : "";
+    if (!item.defined) text += Format("  {}{}\n", element, Joined(numbers, ","));
     for (const auto& member : Named(item, numbers)) {
-      text += fmt::format("  {}{:<24} {}\n", element, member.name, fmt::join(member.numbers, " "));
+      text += Format("  {}{:<24} {}\n", element, member.name, Joined(member.numbers, " "));
     }
   }
   return text;
 }
 
 std::string DefinitionText(const NvItem& item) {
-  std::string text = item.Title() + (item.max_index > 0 ? fmt::format(" [0-{}]", item.max_index) : "") + "\n";
+  std::string text = item.Title() + (item.max_index > 0 ? Format(" [0-{}]", item.max_index) : "") + "\n";
   for (const NvForm& form : item.forms) {
-    text += fmt::format("  {}{}\n", form.selector.empty() ? "" : form.selector + " -> ", FormText(form));
+    text += Format("  {}{}\n", form.selector.empty() ? "" : form.selector + " -> ", FormText(form));
   }
   return text;
 }

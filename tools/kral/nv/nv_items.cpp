@@ -1,8 +1,6 @@
 // Loads definitions, finds, reads and writes items. How they are shown is in nv_item_output.cpp.
 #include "tools/kral/nv/nv_items.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <charconv>
@@ -10,6 +8,7 @@
 
 #include "platform/xml_document.h"
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/hex_bytes.h"
 #include "tools/kral/output.h"
 
@@ -122,7 +121,7 @@ std::string DescribeNvStatus(std::uint16_t status) {
     case KRAL_NV_STATUS_READ_ONLY:
       return "7, read-only";
     default:
-      return fmt::to_string(status);
+      return std::to_string(status);
   }
 }
 
@@ -133,7 +132,7 @@ std::string DescribeReading(const NvItem& item, const NvReading& reading) {
 }
 
 std::string NvItem::Title() const {
-  const std::string which = path.empty() ? fmt::to_string(id.value_or(0)) : path;
+  const std::string which = path.empty() ? std::to_string(id.value_or(0)) : path;
   return name.empty() ? which : which + " " + Printable(name);
 }
 
@@ -190,7 +189,7 @@ NvItem NvItems::Find(const std::string& which) const {
   if (const auto id = ParseId(which)) return Find(*id);
   if (const auto found = by_text_.find(KeyOf(which)); found != by_text_.end()) return items_[found->second];
   if (which.find('/') == std::string::npos) {
-    throw ToolError(ExitCode::kUsage, fmt::format("there is no item {}", which),
+    throw ToolError(ExitCode::kUsage, Format("there is no item {}", which),
                     "give an NV id, a path of the handset, or the name of an item in a file given by --defs");
   }
   NvItem item;
@@ -209,11 +208,11 @@ void NvItems::Check(std::uint32_t code, const std::string& what, std::uint32_t a
     const bool names_it =
         record->code == KRAL_ERROR_BAD_FILE || std::string_view(error.what()).find(what) != std::string_view::npos;
     if (names_it) throw error;
-    throw ToolError(error.code(), fmt::format("{}: {}", what, error.what()), kHint, record);
+    throw ToolError(error.code(), Format("{}: {}", what, error.what()), kHint, record);
   }
   std::array<char, 128> text{};
   KRAL_NV_GetErrorText(0, code, text.data(), static_cast<std::uint32_t>(text.size()));
-  throw ToolError(ExitOf(code), fmt::format("{}: {}", what, text.data()), kHint, record);
+  throw ToolError(ExitOf(code), Format("{}: {}", what, text.data()), kHint, record);
 }
 
 NvReading NvItems::Read(const NvItem& item) {
@@ -238,7 +237,7 @@ NvReading NvItems::ReadFile(const NvItem& item) {
 NvReading NvItems::ReadDefined(const NvItem& item) {
   NvReading reading;
   const std::uint32_t code = KRAL_NV_ReadNVItemFromMobileByNVID(session_.handle(), *item.id, &reading.status);
-  Check(code, fmt::format("NV item {}", *item.id), KRAL_NV_ERROR_CANNOT_GET_VALUE);
+  Check(code, Format("NV item {}", *item.id), KRAL_NV_ERROR_CANNOT_GET_VALUE);
   if (code != 0) {
     reading.kind = KindOf(reading.status);
   } else {
@@ -248,7 +247,7 @@ NvReading NvItems::ReadDefined(const NvItem& item) {
 }
 
 NvReading NvItems::ReadBytes(const NvItem& item) {
-  const std::string what = fmt::format("NV item {}", *item.id);
+  const std::string what = Format("NV item {}", *item.id);
   const KRAL_HANDLE handle = session_.handle();
   NvReading reading;
   reading.bytes.assign(KRAL_NV_DATA_SIZE, 0);
@@ -282,7 +281,7 @@ NvReading NvItems::ReadBytes(const NvItem& item) {
 void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::string& value) {
   session_.Begin();
   std::uint16_t status = 0;
-  const std::string what = item.path.empty() ? fmt::format("NV item {}", *item.id) : item.path;
+  const std::string what = item.path.empty() ? Format("NV item {}", *item.id) : item.path;
   if (item.defined && item.path.empty()) {
     Check(KRAL_NV_SetNVValueStringByNVID(session_.handle(), *item.id, array_index, value.c_str()), what);
     const std::uint32_t code = KRAL_NV_WriteNVItemToMobileByNVID(session_.handle(), *item.id, &status);
@@ -291,12 +290,12 @@ void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::st
     Check(KRAL_NV_SetNVValueStringByEfsFilename(session_.handle(), item.path.c_str(), value.c_str()), what);
     return Check(KRAL_NV_WriteNVItemToMobileByEfsFilename(session_.handle(), item.path.c_str()), what);
   } else if (!item.path.empty()) {
-    throw ToolError(ExitCode::kUsage, fmt::format("{} is not defined", item.path),
+    throw ToolError(ExitCode::kUsage, Format("{} is not defined", item.path),
                     "give its definition by --defs, or write the file with kral fs put");
   } else {
     const auto bytes = ParseHex({value});
     if (bytes.size() > KRAL_NV_DATA_SIZE) {
-      throw ToolError(ExitCode::kUsage, fmt::format("{} bytes are too many for {}", bytes.size(), what),
+      throw ToolError(ExitCode::kUsage, Format("{} bytes are too many for {}", bytes.size(), what),
                       "an item has 128 bytes at most");
     }
     const auto size = static_cast<std::uint16_t>(bytes.size());
@@ -311,7 +310,7 @@ void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::st
   record.code = KRAL_ERROR_REFUSED;
   record.status_kind = KRAL_ERROR_STATUS_NV;
   record.status = status;
-  throw ToolError(ExitCode::kRefused, fmt::format("the handset refused {}: status {}", what, DescribeNvStatus(status)),
+  throw ToolError(ExitCode::kRefused, Format("the handset refused {}: status {}", what, DescribeNvStatus(status)),
                   "the item may be read-only or the handset may need an unlock", record);
 }
 

@@ -1,24 +1,21 @@
 // Options and texts of all nv verbs.
 #include "tools/kral/nv/nv_options.h"
 
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <charconv>
 
+#include "tools/kral/command_line.h"
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 
-void AddDefinitionOptions(CLI::App& verb, NvOptions& options) {
-  verb.add_option("--defs", options.definitions, "Definition file; may be given several times")
-      ->allow_extra_args(false);
+void AddDefinitionOptions(const Command& verb, NvOptions& options) {
+  verb.Add("--defs", options.definitions, "Definition file; may be given several times").OneEach();
   AddDictionaryOption(verb, options);
 }
 
-void AddDictionaryOption(CLI::App& verb, NvOptions& options) {
-  verb.add_option("--types", options.dictionaries, "Data-type dictionary that the definitions use")
-      ->allow_extra_args(false);
+void AddDictionaryOption(const Command& verb, NvOptions& options) {
+  verb.Add("--types", options.dictionaries, "Data-type dictionary that the definitions use").OneEach();
 }
 
 std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text) {
@@ -31,7 +28,7 @@ std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text) {
     parsed = std::from_chars(parsed.ptr + 1, end, last);
   }
   if (parsed.ec == std::errc() && parsed.ptr == end && first <= last) return {first, last};
-  throw ToolError(ExitCode::kUsage, fmt::format("{} is no range of NV ids", text), "give --items as in 0-9999");
+  throw ToolError(ExitCode::kUsage, Format("{} is no range of NV ids", text), "give --items as in 0-9999");
 }
 
 }  // namespace kral::tool

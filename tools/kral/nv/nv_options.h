@@ -8,11 +8,9 @@
 #include <utility>
 #include <vector>
 
-namespace CLI {
-class App;
-}
-
 namespace kral::tool {
+
+class Command;
 
 struct NvOptions {
   std::vector<std::string> definitions;  // files, loaded in this order
@@ -20,8 +18,8 @@ struct NvOptions {
   std::optional<std::uint16_t> subscription;
 };
 
-void AddDefinitionOptions(CLI::App& verb, NvOptions& options);  // --defs, --types; `options` must outlive the verb
-void AddDictionaryOption(CLI::App& verb, NvOptions& options);   // --types alone
+void AddDefinitionOptions(const Command& verb, NvOptions& options);  // --defs, --types; `options` must outlive the verb
+void AddDictionaryOption(const Command& verb, NvOptions& options);   // --types alone
 
 // "7" or "0-9999", first and last; ToolError for anything else.
 std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text);

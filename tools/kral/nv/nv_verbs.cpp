@@ -1,13 +1,11 @@
 // kral nv read, write, dump, diff, defs: NV items by their definitions. Backups are in nv_backup_verbs.cpp.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
 #include <charconv>
 #include <memory>
 #include <string_view>
 
+#include "tools/kral/format.h"
 #include "tools/kral/nv/nv_item_output.h"
 #include "tools/kral/nv/nv_items.h"
 #include "tools/kral/progress.h"
@@ -32,7 +30,7 @@ struct Arguments {
 // Definitions and files need the library's NV tool and no handset: the null port answers for one.
 SessionOptions WithoutHandset(const Context& context) {
   SessionOptions options = context.session;
-  options.port = fmt::to_string(KRAL_PORT_NULL);
+  options.port = std::to_string(KRAL_PORT_NULL);
   return options;
 }
 
@@ -54,7 +52,7 @@ struct ReadSoFar {
     const std::string reason = DescribeReading(item, reading);
     const bool is_refused = reading.kind == NvReading::Kind::kRefused;
     std::string& list = is_refused ? refusals : missing;
-    list += fmt::format("{}{} ({})", list.empty() ? "" : ", ", item.Title(), reason);
+    list += Format("{}{} ({})", list.empty() ? "" : ", ", item.Title(), reason);
     if (!is_refused) {
       ++without_value;
       return;
@@ -96,7 +94,7 @@ void ReadItems(Context& context, const Arguments& arguments) {
       read.missing + (read.missing.empty() || read.refusals.empty() ? "" : ", ") + read.refusals;
   if (missing.empty()) return context.out.Result({{"port", session.port()}, {"items", read.items}}, read.text);
   read.Keep(context);
-  throw ToolError(ExitCode::kRefused, fmt::format("the handset gives no value for {}", missing),
+  throw ToolError(ExitCode::kRefused, Format("the handset gives no value for {}", missing),
                   read.refusals.empty() ? "an item that was never written has none"
                                         : "what is refused may need an unlock or another mode");
 }
@@ -108,7 +106,7 @@ void WriteItem(Context& context, const Arguments& arguments) {
   items.Write(item, arguments.array_index, arguments.value);
   const NvReading reading = items.Read(item);
   if (!reading.has_value()) {
-    throw ToolError(ExitCode::kMismatch, fmt::format("{} was written and cannot be read back", item.Title()),
+    throw ToolError(ExitCode::kMismatch, Format("{} was written and cannot be read back", item.Title()),
                     "the item may be one that can only be written");
   }
   context.out.Result({{"port", session.port()}, {"item", ValueJson(item, reading)}}, ValueText(item, reading));
@@ -141,8 +139,8 @@ void Dump(Context& context, const Arguments& arguments) {
   if (to_files) items.KeepUndefined();
   ReadSoFar read;
   ReadAll(context, items, wanted, read);
-  context.out.Note(fmt::format("{} items read, {} without a value{}{}", read.items.size(), read.without_value,
-                               read.refusals.empty() ? "" : ", refused: ", read.refusals));
+  context.out.Note(Format("{} items read, {} without a value{}{}", read.items.size(), read.without_value,
+                          read.refusals.empty() ? "" : ", refused: ", read.refusals));
   if (to_files) {
     try {
       if (read.items.empty()) {
@@ -186,9 +184,8 @@ void Compare(Context& context, const Arguments& arguments) {
   session.Begin();
   const std::uint32_t code =
       KRAL_NV_PKV_Diff(session.handle(), arguments.first.c_str(), arguments.second.c_str(), arguments.page.c_str());
-  items.Check(code, code == KRAL_NV_ERROR_CANNOT_OPEN_REPORT
-                        ? arguments.page
-                        : fmt::format("{} and {}", arguments.first, arguments.second));
+  items.Check(code, code == KRAL_NV_ERROR_CANNOT_OPEN_REPORT ? arguments.page
+                                                             : Format("{} and {}", arguments.first, arguments.second));
   DiffCounts counts;
   if (!counts.Read()) {
     throw ToolError(ExitCode::kInternal, "the library tells no counts", "--log FILE tells more");
@@ -198,13 +195,13 @@ void Compare(Context& context, const Arguments& arguments) {
       {"report", arguments.page},
       {"counts",
        {{"equal", equal}, {"different", different}, {"only-in-first", only_first}, {"only-in-second", only_second}}}};
-  const std::string text = fmt::format("{}: {} equal, {} different, {} only in the first, {} only in the second\n",
-                                       arguments.page, equal, different, only_first, only_second);
+  const std::string text = Format("{}: {} equal, {} different, {} only in the first, {} only in the second\n",
+                                  arguments.page, equal, different, only_first, only_second);
   if (different + only_first + only_second == 0) return context.out.Result(members, text);
   context.found = members;
   if (!context.out.json()) context.out.Note(text);
-  throw ToolError(ExitCode::kMismatch, fmt::format("{} and {} differ", arguments.first, arguments.second),
-                  fmt::format("{} shows in what", arguments.page));
+  throw ToolError(ExitCode::kMismatch, Format("{} and {} differ", arguments.first, arguments.second),
+                  Format("{} shows in what", arguments.page));
 }
 
 void ListDefinitions(Context& context, Arguments arguments) {
@@ -222,45 +219,41 @@ void ListDefinitions(Context& context, Arguments arguments) {
 
 }  // namespace
 
-void AddNvVerbs(CLI::App& app, Context& context) {
+void AddNvVerbs(const Command& root, Context& context) {
   const auto arguments = std::make_shared<Arguments>();
-  const auto present = app.get_subcommands([](const CLI::App* noun) { return noun->get_name() == "nv"; });
-  auto* nv = present.empty() ? app.add_subcommand("nv", "NV items of the handset") : present.front();
-  nv->require_subcommand(1);
+  const auto nv = root.Noun("nv", "NV items of the handset");
   const auto add = [&](const char* name, const char* help, auto act) {
-    auto* verb = nv->add_subcommand(name, help);
-    verb->callback(
-        [&context, arguments, act] { context.run = [&context, arguments, act] { act(context, *arguments); }; });
+    const auto verb = nv.Verb(name, help);
+    verb.Run([&context, arguments, act] { act(context, *arguments); });
     return verb;
   };
-  const auto add_subscription = [&](CLI::App& verb) {
-    verb.add_option("--subscription", arguments->options.subscription, "Of a handset with several, from 0");
+  const auto add_subscription = [&](const Command& verb) {
+    verb.Add("--subscription", arguments->options.subscription, "Of a handset with several, from 0");
   };
 
-  auto* read = add("read", "Print the values of items", ReadItems);
-  read->add_option("item", arguments->items, "NV id, path on the handset, or name in a definition file")->required();
-  auto* write = add("write", "Write an item and print what it holds then", WriteItem);
-  write->add_option("item", arguments->item, "NV id, path, or name")->required();
-  write
-      ->add_option("value", arguments->value, "Decimal numbers such as 1,2,3; hex bytes for an item without definition")
-      ->required();
-  write->add_option("--index", arguments->array_index, "Element of an array item");
-  auto* dump = add("dump", "Print the values of all items that are defined", Dump);
-  dump->add_option("--items", arguments->range, "Range of NV ids instead, such as 0-999");
-  dump->add_option("--source", arguments->source_file, "Write the values to this source file (XML), too");
-  dump->add_option("--pkv", arguments->pkv_file, "... to this PKV file");
-  auto* diff = add("diff", "Compare two PKV files in a page of HTML; needs no handset", Compare);
-  diff->add_option("first", arguments->first, "PKV file")->required();
-  diff->add_option("second", arguments->second, "PKV file")->required();
-  diff->add_option("page", arguments->page, "HTML file to be written")->required();
-  auto* definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
-  definitions->add_option("file", arguments->items, "Definition file")->required();
-  AddDictionaryOption(*definitions, arguments->options);
-  for (auto* verb : {read, write, dump}) {
-    AddDefinitionOptions(*verb, arguments->options);
-    add_subscription(*verb);
+  const auto read = add("read", "Print the values of items", ReadItems);
+  read.Add("item", arguments->items, "NV id, path on the handset, or name in a definition file").Required();
+  const auto write = add("write", "Write an item and print what it holds then", WriteItem);
+  write.Add("item", arguments->item, "NV id, path, or name").Required();
+  write.Add("value", arguments->value, "Decimal numbers such as 1,2,3; hex bytes for an item without definition")
+      .Required();
+  write.Add("--index", arguments->array_index, "Element of an array item");
+  const auto dump = add("dump", "Print the values of all items that are defined", Dump);
+  dump.Add("--items", arguments->range, "Range of NV ids instead, such as 0-999");
+  dump.Add("--source", arguments->source_file, "Write the values to this source file (XML), too");
+  dump.Add("--pkv", arguments->pkv_file, "... to this PKV file");
+  const auto diff = add("diff", "Compare two PKV files in a page of HTML; needs no handset", Compare);
+  diff.Add("first", arguments->first, "PKV file").Required();
+  diff.Add("second", arguments->second, "PKV file").Required();
+  diff.Add("page", arguments->page, "HTML file to be written").Required();
+  const auto definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
+  definitions.Add("file", arguments->items, "Definition file").Required();
+  AddDictionaryOption(definitions, arguments->options);
+  for (const auto& verb : {read, write, dump}) {
+    AddDefinitionOptions(verb, arguments->options);
+    add_subscription(verb);
   }
-  AddDefinitionOptions(*diff, arguments->options);
+  AddDefinitionOptions(diff, arguments->options);
 }
 
 }  // namespace kral::tool

@@ -1,12 +1,10 @@
 // kral ftm: factory test mode commands to the dispatcher of one radio technology.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <charconv>
 #include <memory>
 #include <optional>
 
+#include "tools/kral/format.h"
 #include "tools/kral/hex_bytes.h"
 #include "tools/kral/verbs.h"
 
@@ -49,7 +47,7 @@ std::uint16_t ParseCommand(std::string_view text) {
   for (const auto& command : ListCommands()) {
     if (command.name == text) return command.id;
   }
-  throw ToolError(ExitCode::kUsage, fmt::format("there is no FTM command {}", text),
+  throw ToolError(ExitCode::kUsage, Format("there is no FTM command {}", text),
                   "kral ftm list shows the names; any id from 0 to 65535 is taken as well");
 }
 
@@ -58,7 +56,7 @@ void Apply(Session& session, const FtmOptions& options) {
               [&] { return KRAL_FTM_SET_COMMAND_CODE(session.handle(), options.command_code); });
   if (options.mode_id) KRAL_FTM_SET_MODE_ID(session.handle(), *options.mode_id);
   if (!options.rf_mode) return;
-  session.Run(fmt::format("RF mode {}", *options.rf_mode),
+  session.Run(Format("RF mode {}", *options.rf_mode),
               [&] { return KRAL_FTM_SET_MODE(session.handle(), *options.rf_mode); });
 }
 
@@ -74,14 +72,14 @@ void SetMode(const Context& context, FtmOptions options, std::uint16_t rf_mode) 
   Apply(session, options);
   const std::uint16_t mode_id = ModeId(session);
   context.out.Result({{"port", session.port()}, {"rf_mode", rf_mode}, {"mode_id", mode_id}},
-                     fmt::format("RF mode {} (mode id {})\n", rf_mode, mode_id));
+                     Format("RF mode {} (mode id {})\n", rf_mode, mode_id));
 }
 
 void SetChannel(const Context& context, const FtmOptions& options, std::uint16_t channel) {
   Session session(context.session);
   Apply(session, options);
-  session.Run(fmt::format("channel {}", channel), [&] { return KRAL_FTM_SET_CHAN(session.handle(), channel); });
-  context.out.Result({{"port", session.port()}, {"channel", channel}}, fmt::format("channel {}\n", channel));
+  session.Run(Format("channel {}", channel), [&] { return KRAL_FTM_SET_CHAN(session.handle(), channel); });
+  context.out.Result({{"port", session.port()}, {"channel", channel}}, Format("channel {}\n", channel));
 }
 
 void SwitchTx(const Context& context, const FtmOptions& options, bool on) {
@@ -90,7 +88,7 @@ void SwitchTx(const Context& context, const FtmOptions& options, bool on) {
   session.Run("the transmitter switch",
               [&] { return on ? KRAL_FTM_SET_TX_ON(session.handle()) : KRAL_FTM_SET_TX_OFF(session.handle()); });
   context.out.Result({{"port", session.port()}, {"transmitter", on ? "on" : "off"}},
-                     fmt::format("transmitter {}\n", on ? "on" : "off"));
+                     Format("transmitter {}\n", on ? "on" : "off"));
 }
 
 struct CommandArguments {
@@ -106,7 +104,7 @@ void SendCommand(const Context& context, const FtmOptions& options, const Comman
   Apply(session, options);
   std::array<std::uint8_t, 4096> response{};
   auto size = static_cast<std::uint16_t>(response.size());
-  session.Run(fmt::format("FTM command {}", command), [&] {
+  session.Run(Format("FTM command {}", command), [&] {
     return KRAL_FTM_SendCommandTo(session.handle(), ModeId(session), arguments.form, command, payload.data(),
                                   static_cast<std::uint16_t>(payload.size()), response.data(), &size);
   });
@@ -119,65 +117,52 @@ void PrintList(const Context& context) {
   std::string text;
   for (const auto& command : ListCommands()) {
     rows.push_back({{"id", command.id}, {"name", command.name}});
-    text += fmt::format("{:5}  {}\n", command.id, command.name);
+    text += Format("{:5}  {}\n", command.id, command.name);
   }
   context.out.Result({{"commands", rows}}, text);
 }
 
-void AddOptions(CLI::App& verb, const std::shared_ptr<FtmOptions>& options) {
-  verb.add_option("--mode-id", options->mode_id, "Dispatcher of the handset, such as 1 for WCDMA");
-  verb.add_option("--code", options->command_code, "Diagnostic command code that carries FTM: 75 or 59")
-      ->check(CLI::IsMember({75, 59}));
+void AddOptions(const Command& verb, const std::shared_ptr<FtmOptions>& options) {
+  verb.Add("--mode-id", options->mode_id, "Dispatcher of the handset, such as 1 for WCDMA");
+  verb.Add("--code", options->command_code, "Diagnostic command code that carries FTM: 75 or 59").OneOf({"75", "59"});
 }
 
-void AddRfMode(CLI::App& verb, const std::shared_ptr<FtmOptions>& options) {
-  verb.add_option("--rf-mode", options->rf_mode, "Set this RF mode first");
+void AddRfMode(const Command& verb, const std::shared_ptr<FtmOptions>& options) {
+  verb.Add("--rf-mode", options->rf_mode, "Set this RF mode first");
 }
 
 }  // namespace
 
-void AddFtmVerbs(CLI::App& app, Context& context) {
+void AddFtmVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<FtmOptions>();
-  auto* ftm = app.add_subcommand("ftm", "Factory test mode commands (kral mode ftm takes the handset there)");
-  ftm->require_subcommand(1);
-  AddOptions(*ftm, options);
+  const auto ftm = root.Noun("ftm", "Factory test mode commands (kral mode ftm takes the handset there)");
+  AddOptions(ftm, options);
 
   const auto number = std::make_shared<std::uint16_t>();
-  auto* mode = ftm->add_subcommand("mode", "Set the RF mode: technology and band");
-  mode->add_option("rf-mode", *number, "RF mode, such as 9")->required();
-  mode->callback([&context, options, number] {
-    context.run = [&context, options, number] { SetMode(context, *options, *number); };
-  });
+  const auto mode = ftm.Verb("mode", "Set the RF mode: technology and band");
+  mode.Add("rf-mode", *number, "RF mode, such as 9").Required();
+  mode.Run([&context, options, number] { SetMode(context, *options, *number); });
 
-  auto* channel = ftm->add_subcommand("chan", "Set the channel");
-  channel->add_option("channel", *number, "Channel number of the RF mode's band")->required();
-  AddRfMode(*channel, options);
-  channel->callback([&context, options, number] {
-    context.run = [&context, options, number] { SetChannel(context, *options, *number); };
-  });
+  const auto channel = ftm.Verb("chan", "Set the channel");
+  channel.Add("channel", *number, "Channel number of the RF mode's band").Required();
+  AddRfMode(channel, options);
+  channel.Run([&context, options, number] { SetChannel(context, *options, *number); });
 
-  auto* tx = ftm->add_subcommand("tx", "Switch the transmitter");
+  const auto tx = ftm.Verb("tx", "Switch the transmitter");
   const auto state = std::make_shared<std::string>();
-  tx->add_option("state", *state, "on or off")->required()->check(CLI::IsMember({"on", "off"}));
-  AddRfMode(*tx, options);
-  tx->callback([&context, options, state] {
-    context.run = [&context, options, state] { SwitchTx(context, *options, *state == "on"); };
-  });
+  tx.Add("state", *state, "on or off").Required().OneOf({"on", "off"});
+  AddRfMode(tx, options);
+  tx.Run([&context, options, state] { SwitchTx(context, *options, *state == "on"); });
 
   const auto arguments = std::make_shared<CommandArguments>();
-  auto* command = ftm->add_subcommand("cmd", "Send any command and print what the handset answers");
-  command->add_option("command", arguments->command, "Name or id of the command, such as GET_RX_AGC or 53")->required();
-  command->add_option("payload", arguments->payload, "Payload in hex, little-endian fields");
-  command->add_option("--form", arguments->form, "Header: 0 plain, 1 with data lengths, 2 PMIC")
-      ->check(CLI::Range(0, kHeaderForms - 1));
-  AddRfMode(*command, options);
-  command->callback([&context, options, arguments] {
-    context.run = [&context, options, arguments] { SendCommand(context, *options, *arguments); };
-  });
+  const auto command = ftm.Verb("cmd", "Send any command and print what the handset answers");
+  command.Add("command", arguments->command, "Name or id of the command, such as GET_RX_AGC or 53").Required();
+  command.Add("payload", arguments->payload, "Payload in hex, little-endian fields");
+  command.Add("--form", arguments->form, "Header: 0 plain, 1 with data lengths, 2 PMIC").Between(0, kHeaderForms - 1);
+  AddRfMode(command, options);
+  command.Run([&context, options, arguments] { SendCommand(context, *options, *arguments); });
 
-  ftm->add_subcommand("list", "Print the table of RF commands")->callback([&context] {
-    context.run = [&context] { PrintList(context); };
-  });
+  ftm.Verb("list", "Print the table of RF commands").Run([&context] { PrintList(context); });
 }
 
 }  // namespace kral::tool

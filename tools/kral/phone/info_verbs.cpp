@@ -1,11 +1,9 @@
 // kral info: who the handset is.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <string>
 #include <vector>
 
+#include "tools/kral/format.h"
 #include "tools/kral/phone/operating_mode.h"
 #include "tools/kral/verbs.h"
 
@@ -20,7 +18,7 @@ struct Report {
   Json members = Json::object();
   std::string text;
 
-  void Line(std::string_view label, std::string_view value) { text += fmt::format("{:<20}{}\n", label, value); }
+  void Line(std::string_view label, std::string_view value) { text += Format("{:<20}{}\n", label, value); }
 };
 
 template <std::size_t N>
@@ -48,14 +46,14 @@ void ReportVersion(Session& session, Report& report) {
                                {"slot_cycle_index", slot_cycle},
                                {"vocoder", {{"major", vocoder_major}, {"minor", vocoder_minor}}}};
   report.Line("version directory", Text(directory));
-  report.Line("compiled", fmt::format("{} {}", Text(compile_date), Text(compile_time)));
-  report.Line("released", fmt::format("{} {}", Text(release_date), Text(release_time)));
-  report.Line("station class mark", fmt::to_string(station_class));
-  report.Line("air interface", fmt::format("revision {}", air_revision));
-  report.Line("mobile model", fmt::to_string(model));
-  report.Line("firmware revision", fmt::to_string(firmware));
-  report.Line("slot cycle index", fmt::to_string(slot_cycle));
-  report.Line("vocoder", fmt::format("{}.{}", vocoder_major, vocoder_minor));
+  report.Line("compiled", Format("{} {}", Text(compile_date), Text(compile_time)));
+  report.Line("released", Format("{} {}", Text(release_date), Text(release_time)));
+  report.Line("station class mark", std::to_string(station_class));
+  report.Line("air interface", Format("revision {}", air_revision));
+  report.Line("mobile model", std::to_string(model));
+  report.Line("firmware revision", std::to_string(firmware));
+  report.Line("slot cycle index", std::to_string(slot_cycle));
+  report.Line("vocoder", Format("{}.{}", vocoder_major, vocoder_minor));
 }
 
 void ReportBuild(Session& session, Report& report) {
@@ -68,8 +66,8 @@ void ReportBuild(Session& session, Report& report) {
                              {"mobile_model", model_number},
                              {"software_revision", Printable(revision.data())},
                              {"model", Printable(model.data())}};
-  report.Line("hardware version", fmt::format("0x{:08X}", hardware));
-  report.Line("model", fmt::format("{} (0x{:08X})", Printable(model.data()), model_number));
+  report.Line("hardware version", Format("0x{:08X}", hardware));
+  report.Line("model", Format("{} (0x{:08X})", Printable(model.data()), model_number));
   report.Line("software revision", Printable(revision.data()));
 }
 
@@ -83,8 +81,8 @@ void ReportMode(Session& session, Report& report) {
 void ReportSerialNumber(Session& session, Report& report) {
   std::uint32_t serial = 0;
   session.Run("the serial-number request", [&] { return KRAL_DIAG_READ_ESN_F(session.handle(), &serial); });
-  report.members["esn"] = fmt::format("{:08X}", serial);
-  report.Line("esn", fmt::format("0x{:08X}", serial));
+  report.members["esn"] = Format("{:08X}", serial);
+  report.Line("esn", Format("0x{:08X}", serial));
 }
 
 // Not every handset knows every request: what it refuses is left out, with a note, and the rest is reported.
@@ -94,7 +92,7 @@ void ReportIfKnown(const Context& context, Session& session, Report& report, con
     part(session, report);
   } catch (const ToolError& error) {
     if (error.code() != ExitCode::kRefused) throw;
-    report.members[member] = nullptr;
+    report.members[member] = Json();
     context.out.Note(error.what());
   }
 }
@@ -113,9 +111,10 @@ void ShowInfo(Context& context) {
 
 }  // namespace
 
-void AddInfoVerbs(CLI::App& app, Context& context) {
-  app.add_subcommand("info", "Print the identity of the handset: version, build, mode, serial number")
-      ->callback([&context] { context.run = [&context] { ShowInfo(context); }; });
+void AddInfoVerbs(const Command& root, Context& context) {
+  root.Verb("info", "Print the identity of the handset: version, build, mode, serial number").Run([&context] {
+    ShowInfo(context);
+  });
 }
 
 }  // namespace kral::tool

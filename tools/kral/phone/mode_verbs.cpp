@@ -1,9 +1,7 @@
 // kral mode: asks for the operating mode and switches it.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 
+#include "tools/kral/format.h"
 #include "tools/kral/phone/operating_mode.h"
 #include "tools/kral/verbs.h"
 
@@ -27,14 +25,14 @@ void GetMode(const Context& context) {
   std::uint32_t state = 0;
   session.Run("the operating-mode query", [&] { return ReadOperatingState(session, state); });
   context.out.Result({{"port", session.port()}, {"mode", NameOfState(state)}, {"state", state}},
-                     fmt::format("{}\n", NameOfState(state)));
+                     Format("{}\n", NameOfState(state)));
 }
 
 void SetMode(const Context& context, const ModeRequest& request) {
   Session session(context.session);
-  session.Run(fmt::format("the switch to mode {}", request.name),
+  session.Run(Format("the switch to mode {}", request.name),
               [&] { return KRAL_DIAG_CONTROL_F(session.handle(), request.mode); });
-  context.out.Result({{"port", session.port()}, {"mode", request.name}}, fmt::format("{}\n", request.name));
+  context.out.Result({{"port", session.port()}, {"mode", request.name}}, Format("{}\n", request.name));
 }
 
 }  // namespace
@@ -49,8 +47,8 @@ std::uint8_t ReadOperatingState(const Session& session, std::uint32_t& state) {
   }
   if (size < kStateOffset + 4) {
     throw ToolError(ExitCode::kLink,
-                    fmt::format("the reply to the operating-mode query on {} has {} bytes: too few for a mode",
-                                DescribePort(session.port()), size),
+                    Format("the reply to the operating-mode query on {} has {} bytes: too few for a mode",
+                           DescribePort(session.port()), size),
                     "other firmware may tell it; kral raw 4B 0F 00 00 shows the reply");
   }
   state = 0;
@@ -64,17 +62,14 @@ std::string_view NameOfState(std::uint32_t state) {
   return known == kStateNames.end() ? "unknown" : known->name;
 }
 
-void AddModeVerbs(CLI::App& app, Context& context) {
-  auto* mode = app.add_subcommand("mode", "Ask for the operating mode, or switch it");
-  mode->require_subcommand(1);
-  mode->add_subcommand("get", "Print the operating mode")->callback([&context] {
-    context.run = [&context] { GetMode(context); };
-  });
+void AddModeVerbs(const Command& root, Context& context) {
+  const auto mode = root.Noun("mode", "Ask for the operating mode, or switch it");
+  mode.Verb("get", "Print the operating mode").Run([&context] { GetMode(context); });
   for (const auto& request : kModeRequests) {
-    mode->add_subcommand(std::string(request.name),
-                         request.name == "reset" ? "Restart the handset"
-                                                 : fmt::format("Switch to mode {} and wait for it", request.name))
-        ->callback([&context, &request] { context.run = [&context, &request] { SetMode(context, request); }; });
+    mode.Verb(std::string(request.name), request.name == "reset"
+                                             ? "Restart the handset"
+                                             : Format("Switch to mode {} and wait for it", request.name))
+        .Run([&context, &request] { SetMode(context, request); });
   }
 }
 

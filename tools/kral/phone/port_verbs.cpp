@@ -1,11 +1,9 @@
 // kral ports: which serial ports there are, and on which a handset answers.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 
 #include "platform/port_list.h"
+#include "tools/kral/format.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -21,7 +19,7 @@ void ShowPorts(const Context& context, bool probe) {
     Json row{{"port", port}, {"device", ComPortDevice(port)}};
     if (probe) row["handset"] = answers;
     list.push_back(row);
-    text += fmt::format("{}{}\n", DescribePort(port), answers ? "  handset" : "");
+    text += Format("{}{}\n", DescribePort(port), answers ? "  handset" : "");
   }
   if (ports.empty()) context.out.Note("this machine has no serial port");
   context.out.Result({{"ports", list}}, text);
@@ -29,11 +27,11 @@ void ShowPorts(const Context& context, bool probe) {
 
 }  // namespace
 
-void AddPortVerbs(CLI::App& app, Context& context) {
+void AddPortVerbs(const Command& root, Context& context) {
   const auto probe = std::make_shared<bool>(false);
-  auto* ports = app.add_subcommand("ports", "List the serial ports without opening them");
-  ports->add_flag("--probe", *probe, "Open each port that is free and ask whether a handset answers");
-  ports->callback([&context, probe] { context.run = [&context, probe] { ShowPorts(context, *probe); }; });
+  const auto ports = root.Verb("ports", "List the serial ports without opening them");
+  ports.Flag("--probe", *probe, "Open each port that is free and ask whether a handset answers");
+  ports.Run([&context, probe] { ShowPorts(context, *probe); });
 }
 
 }  // namespace kral::tool

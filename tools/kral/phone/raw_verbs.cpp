@@ -1,10 +1,8 @@
 // kral raw: sends one request as given and shows the reply as it came.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <memory>
 
+#include "tools/kral/format.h"
 #include "tools/kral/hex_bytes.h"
 #include "tools/kral/verbs.h"
 
@@ -18,7 +16,7 @@ constexpr std::int32_t kDefaultTimeOutMs = 4000;
 void SendRaw(Context& context, const std::vector<std::string>& words) {
   const auto request = ParseHex(words);
   if (request.empty() || request.size() > kMostRequest) {
-    throw ToolError(ExitCode::kUsage, fmt::format("a request has 1 to {} bytes, not {}", kMostRequest, request.size()),
+    throw ToolError(ExitCode::kUsage, Format("a request has 1 to {} bytes, not {}", kMostRequest, request.size()),
                     "give the bytes in hex, command code first: kral raw 7C");
   }
   Session session(context.session);
@@ -41,16 +39,16 @@ void SendRaw(Context& context, const std::vector<std::string>& words) {
   } else if (replied) {
     context.out.Result(members, HexDump(bytes));
   }
-  throw session.Explain(fmt::format("command {:02X}", request.front()));
+  throw session.Explain(Format("command {:02X}", request.front()));
 }
 
 }  // namespace
 
-void AddRawVerbs(CLI::App& app, Context& context) {
+void AddRawVerbs(const Command& root, Context& context) {
   const auto words = std::make_shared<std::vector<std::string>>();
-  auto* raw = app.add_subcommand("raw", "Send one request, given in hex, and print the reply");
-  raw->add_option("bytes", *words, "The request without framing, such as 4B 0F 00 00")->required();
-  raw->callback([&context, words] { context.run = [&context, words] { SendRaw(context, *words); }; });
+  const auto raw = root.Verb("raw", "Send one request, given in hex, and print the reply");
+  raw.Add("bytes", *words, "The request without framing, such as 4B 0F 00 00").Required();
+  raw.Run([&context, words] { SendRaw(context, *words); });
 }
 
 }  // namespace kral::tool

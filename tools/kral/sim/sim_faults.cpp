@@ -1,8 +1,6 @@
 // Reads the faults of `kral sim --fault`; what a fault does is the handset's business.
 #include "tools/kral/sim/sim_faults.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 #include <array>
 #include <charconv>
@@ -10,6 +8,7 @@
 #include <string_view>
 
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
@@ -46,7 +45,7 @@ static_assert(std::is_sorted(kKinds.begin(), kKinds.end(),
                              [](const Kind& left, const Kind& right) { return left.name < right.name; }));
 
 [[noreturn]] void Reject(const std::string& words, const std::string& why) {
-  throw ToolError(ExitCode::kUsage, fmt::format("--fault {}: {}", words, why),
+  throw ToolError(ExitCode::kUsage, Format("--fault {}: {}", words, why),
                   "kral sim --help lists the faults; for example --fault refuse=19,of=7C");
 }
 
@@ -92,14 +91,14 @@ std::optional<When> ParseWhen(const Word& word) {
 Fault ParseKind(const std::string& words, const Word& word) {
   const auto kind =
       std::find_if(kKinds.begin(), kKinds.end(), [&word](const Kind& known) { return known.name == word.name; });
-  if (kind == kKinds.end()) Reject(words, fmt::format("there is no fault '{}'", word.name));
+  if (kind == kKinds.end()) Reject(words, Format("there is no fault '{}'", word.name));
   if (kind->value.empty()) {
-    if (!word.value.empty()) Reject(words, fmt::format("{} takes no value", kind->name));
+    if (!word.value.empty()) Reject(words, Format("{} takes no value", kind->name));
     return kind->make(0);
   }
   const auto value = ParseNumber(word.value);
   if (!value || (kind->value == "code" && *value > 0xFF)) {
-    Reject(words, fmt::format("{} needs a value, {}={}", kind->name, kind->name, kind->value));
+    Reject(words, Format("{} needs a value, {}={}", kind->name, kind->name, kind->value));
   }
   return kind->make(*value);
 }
@@ -118,21 +117,21 @@ void AddFault(handset::FaultPlan& faults, const std::string& words) {
       continue;
     }
     const auto parsed = ParseWhen(word);
-    if (!parsed) Reject(words, fmt::format("'{}={}' does not say when", word.name, word.value));
+    if (!parsed) Reject(words, Format("'{}={}' does not say when", word.name, word.value));
     when = *parsed;
   }
   try {
     faults.Add(fault, prefix.empty() ? when : when.Of(prefix));
   } catch (const std::invalid_argument&) {
-    Reject(words, fmt::format("of={} is not hex", prefix));
+    Reject(words, Format("of={} is not hex", prefix));
   }
 }
 
 std::string DescribeFaults() {
   std::string text = "Faults of the simulated handset, KIND[=VALUE][,nth=N|from=N|every=N|chance=P][,of=HEX]:\n";
   for (const auto& kind : kKinds) {
-    const auto written = kind.value.empty() ? std::string(kind.name) : fmt::format("{}={}", kind.name, kind.value);
-    text += fmt::format("  {:<14}{}\n", written, kind.meaning);
+    const auto written = kind.value.empty() ? std::string(kind.name) : Format("{}={}", kind.name, kind.value);
+    text += Format("  {:<14}{}\n", written, kind.meaning);
   }
   return text +
          "Without nth, from, every or chance a fault strikes always; of=HEX limits it to requests that begin so.\n";

@@ -1,7 +1,4 @@
 // kral sim: a virtual handset on a pseudo terminal, for as long as it is wanted.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cctype>
 #include <memory>
@@ -14,6 +11,7 @@
 #include "handset/pty_cable.h"
 #include "handset/virtual_handset.h"
 #include "platform/clock.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/sim/sim_faults.h"
 #include "tools/kral/verbs.h"
@@ -26,8 +24,7 @@ constexpr std::size_t kServiceCodeSize = 6;
 
 struct SimOptions {
   handset::Identity identity;
-  std::uint16_t switches = 0;
-  bool switches_given = false;
+  std::optional<std::uint16_t> switches;
   std::uint32_t switching_delay_ms = 0;
   std::uint32_t reset_time_ms = 0;
   std::uint32_t back_after_ms = 0;  // 0: a handset that hung up stays away
@@ -47,7 +44,7 @@ struct SimOptions {
 };
 
 void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
-  if (options.switches_given) handset.maintenance().SetSwitches(options.switches);
+  if (options.switches) handset.maintenance().SetSwitches(*options.switches);
   handset.mode().SetSwitchingDelay(options.switching_delay_ms);
   handset.mode().SetResetTime(options.reset_time_ms);
   if (options.efs_blocks != 0) handset.efs().SetTotalBlocks(options.efs_blocks);
@@ -96,7 +93,7 @@ void Simulate(const Context& context, const SimOptions& options) {
   std::string error;
   const auto cable = handset::PtyCable::Attach(handset, options.link, error);
   if (!cable) {
-    throw ToolError(ExitCode::kUsage, fmt::format("the handset cannot be put on a pseudo terminal: {}", error),
+    throw ToolError(ExitCode::kUsage, Format("the handset cannot be put on a pseudo terminal: {}", error),
                     "kral sim needs Linux, and a --link that can be made");
   }
   std::optional<handset::LiveTraffic> traffic;
@@ -112,63 +109,55 @@ bool IsServiceCode(const std::string& text) {
          std::all_of(text.begin(), text.end(), [](unsigned char character) { return std::isdigit(character) != 0; });
 }
 
-void AddOptions(CLI::App& sim, SimOptions& options) {
+void AddOptions(const Command& sim, SimOptions& options) {
   auto& identity = options.identity;
-  sim.add_option("--esn", identity.serial_number, "Electronic serial number")->capture_default_str();
-  sim.add_option("--model", identity.model, "Model text of the build identity")->capture_default_str();
-  sim.add_option("--software", identity.software_revision, "Software revision text")->capture_default_str();
-  sim.add_option("--hardware", identity.hardware_version, "Hardware version")->capture_default_str();
-  sim.add_option("--directory", identity.version_directory, "Version directory, 8 characters")->capture_default_str();
-  sim.add_option("--spc", identity.service_code, "Service programming code, six digits")
-      ->capture_default_str()
-      ->check([](const std::string& text) { return IsServiceCode(text) ? "" : "six digits are needed"; });
-  sim.add_option_function<std::uint16_t>(
-      "--switches",
-      [&options](std::uint16_t switches) {
-        options.switches = switches;
-        options.switches_given = true;
-      },
-      "Switch word");
-  sim.add_option("--switching-delay", options.switching_delay_ms, "Milliseconds until a new mode is reported");
-  sim.add_option("--reset-time", options.reset_time_ms, "Milliseconds of silence after a reset");
-  sim.add_option("--efs-blocks", options.efs_blocks, "Size of the file system in blocks of 512 bytes");
-  sim.add_option("--efs-bad-offset", options.efs_bad_offset, "Files that are written keep a wrong byte at this offset");
-  sim.add_option("--efs-show", options.efs_shown_names, "NAME SHOWN: listings show one name as another")->take_all();
-  const auto rate = CLI::Range(0., 1e6);
-  sim.add_option("--logs", options.traffic.logs, "Log packets per second, of the codes that are on")->check(rate);
-  sim.add_option("--events", options.traffic.reports, "Event reports per second, of the events that are on")
-      ->check(rate);
-  sim.add_option("--messages", options.traffic.messages, "Messages per second, of the categories that are on")
-      ->check(rate);
-  sim.add_option("--log-size", options.traffic.log_size, "Bytes of a log packet")->check(CLI::Range(16, 4090));
-  sim.add_option("--burst", options.traffic.burst, "Packets that come at once; the rate stays")
-      ->check(CLI::Range(1, 4096));
-  sim.add_option("--flash-block", options.flash_block, "Largest block that the flash programmer announces");
-  sim.add_option("--flash-window", options.flash_window, "Window that the flash programmer announces");
-  sim.add_option("--fault", options.faults, "Misbehaviour, see below; may be given several times")
-      ->take_all()
-      ->allow_extra_args(false);
-  sim.add_option("--bit-errors", options.bit_errors, "Probability of an error per bit sent")->check(CLI::Range(0., 1.));
-  sim.add_option("--seed", options.seed, "Of everything random")->capture_default_str();
-  sim.add_option("--back-after", options.back_after_ms, "Milliseconds after which a handset that hung up is back");
-  sim.add_flag("--boot-loader", options.boot_loader, "Start in the primary boot loader, as without any software");
-  sim.add_option("--loader", options.loader,
-                 "What the download request leads to: the KOVA loader, or the boot loader, "
-                 "for which the handset leaves its port and comes back")
-      ->check(CLI::IsMember({"kova", "boot"}))
-      ->capture_default_str();
-  sim.add_option("--chip-id", options.chip_identity, "Chip identity that the boot loader tells");
-  sim.add_option("--link", options.link, "Keep a symbolic link of this name to the device");
+  sim.Add("--esn", identity.serial_number, "Electronic serial number").ShowDefault();
+  sim.Add("--model", identity.model, "Model text of the build identity").ShowDefault();
+  sim.Add("--software", identity.software_revision, "Software revision text").ShowDefault();
+  sim.Add("--hardware", identity.hardware_version, "Hardware version").ShowDefault();
+  sim.Add("--directory", identity.version_directory, "Version directory, 8 characters").ShowDefault();
+  sim.Add("--spc", identity.service_code, "Service programming code, six digits")
+      .ShowDefault()
+      .Check([](const std::string& text) { return IsServiceCode(text) ? "" : "six digits are needed"; });
+  sim.Add("--switches", options.switches, "Switch word");
+  sim.Add("--switching-delay", options.switching_delay_ms, "Milliseconds until a new mode is reported");
+  sim.Add("--reset-time", options.reset_time_ms, "Milliseconds of silence after a reset");
+  sim.Add("--efs-blocks", options.efs_blocks, "Size of the file system in blocks of 512 bytes");
+  sim.Add("--efs-bad-offset", options.efs_bad_offset, "Files that are written keep a wrong byte at this offset");
+  sim.Add("--efs-show", options.efs_shown_names, "NAME SHOWN: listings show one name as another; several times");
+  constexpr double kMostPerSecond = 1e6;
+  sim.Add("--logs", options.traffic.logs, "Log packets per second, of the codes that are on")
+      .Between(0, kMostPerSecond, "a second");
+  sim.Add("--events", options.traffic.reports, "Event reports per second, of the events that are on")
+      .Between(0, kMostPerSecond, "a second");
+  sim.Add("--messages", options.traffic.messages, "Messages per second, of the categories that are on")
+      .Between(0, kMostPerSecond, "a second");
+  sim.Add("--log-size", options.traffic.log_size, "Bytes of a log packet").Between(16, 4090, "bytes");
+  sim.Add("--burst", options.traffic.burst, "Packets that come at once; the rate stays").Between(1, 4096);
+  sim.Add("--flash-block", options.flash_block, "Largest block that the flash programmer announces");
+  sim.Add("--flash-window", options.flash_window, "Window that the flash programmer announces");
+  sim.Add("--fault", options.faults, "Misbehaviour, see below; may be given several times").OneEach();
+  sim.Add("--bit-errors", options.bit_errors, "Probability of an error per bit sent").Between(0., 1.);
+  sim.Add("--seed", options.seed, "Of everything random").ShowDefault();
+  sim.Add("--back-after", options.back_after_ms, "Milliseconds after which a handset that hung up is back");
+  sim.Flag("--boot-loader", options.boot_loader, "Start in the primary boot loader, as without any software");
+  sim.Add("--loader", options.loader,
+          "What the download request leads to: the KOVA loader, or the boot loader, "
+          "for which the handset leaves its port and comes back")
+      .OneOf({"kova", "boot"})
+      .ShowDefault();
+  sim.Add("--chip-id", options.chip_identity, "Chip identity that the boot loader tells");
+  sim.Add("--link", options.link, "Keep a symbolic link of this name to the device");
 }
 
 }  // namespace
 
-void AddSimVerbs(CLI::App& app, Context& context) {
+void AddSimVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<SimOptions>();
-  auto* sim = app.add_subcommand("sim", "Simulate a handset; its device is the first line of the output");
-  AddOptions(*sim, *options);
-  sim->footer(DescribeFaults);
-  sim->callback([&context, options] { context.run = [&context, options] { Simulate(context, *options); }; });
+  const auto sim = root.Verb("sim", "Simulate a handset; its device is the first line of the output");
+  AddOptions(sim, *options);
+  sim.Explain(DescribeFaults);
+  sim.Run([&context, options] { Simulate(context, *options); });
 }
 
 }  // namespace kral::tool

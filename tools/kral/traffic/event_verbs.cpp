@@ -1,12 +1,10 @@
 // kral event: which events a handset reports, and the events as they come.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <array>
 #include <memory>
 #include <string>
 #include <vector>
 
+#include "tools/kral/format.h"
 #include "tools/kral/traffic/event_report.h"
 #include "tools/kral/traffic/playback.h"
 #include "tools/kral/traffic/traffic.h"
@@ -44,9 +42,9 @@ void Switch(const Context& context, const EventOptions& options, bool on) {
   }
   Session session(context.session);
   SwitchEvents(session, options, on);
-  const auto what = options.all ? std::string("all events") : fmt::format("{} events", ids.size());
+  const auto what = options.all ? std::string("all events") : Format("{} events", ids.size());
   context.out.Result({{"port", session.port()}, {"state", on ? "on" : "off"}, {"all", options.all}, {"ids", ids}},
-                     fmt::format("{} {}\n", what, on ? "on" : "off"));
+                     Format("{} {}\n", what, on ? "on" : "off"));
 }
 
 void Print(const Context& context, KRAL_HANDLE handle, const ReportedEvent& event) {
@@ -57,7 +55,7 @@ void Print(const Context& context, KRAL_HANDLE handle, const ReportedEvent& even
   const auto stamp = HexText(event.time_stamp);
   context.out.Stream(
       {{"event", "event"}, {"id", event.id}, {"name", name}, {"time_stamp", stamp}, {"payload", payload}},
-      fmt::format("{:>5}  {:<32}  {:<23}  {}\n", event.id, name, stamp, payload));
+      Format("{:>5}  {:<32}  {:<23}  {}\n", event.id, name, stamp, payload));
 }
 
 void TailFile(const Context& context, const EventOptions& options) {
@@ -104,34 +102,32 @@ void Tail(const Context& context, EventOptions& options) {
                       {"per_second", rate}},
                      "");
   if (!context.out.json()) {
-    context.out.Note(fmt::format("{} events, {:.1f}/s, {} packets dropped", events, rate, counters.dropped_logs));
+    context.out.Note(Format("{} events, {:.1f}/s, {} packets dropped", events, rate, counters.dropped_logs));
   }
 }
 
 }  // namespace
 
-void AddEventVerbs(CLI::App& app, Context& context) {
+void AddEventVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<EventOptions>();
-  auto* event = app.add_subcommand("event", "Events that a handset reports by itself");
-  event->require_subcommand(1);
-  const auto run = [&context, options](CLI::App* verb, auto action) {
-    verb->callback(
-        [&context, options, action] { context.run = [&context, options, action] { action(context, *options); }; });
+  const auto event = root.Noun("event", "Events that a handset reports by itself");
+  const auto run = [&context, options](const Command& verb, auto action) {
+    verb.Run([&context, options, action] { action(context, *options); });
   };
 
   for (const bool on : {true, false}) {
-    auto* verb = event->add_subcommand(on ? "on" : "off", on ? "Switch events on" : "Switch events off");
-    verb->add_option("ids", options->ids, "Event ids, such as 291 or 290-299");
-    verb->add_flag("--all", options->all, "Every event that the handset has");
+    const auto verb = event.Verb(on ? "on" : "off", on ? "Switch events on" : "Switch events off");
+    verb.Add("ids", options->ids, "Event ids, such as 291 or 290-299");
+    verb.Flag("--all", options->all, "Every event that the handset has");
     run(verb, [on](const Context& c, const EventOptions& o) { Switch(c, o, on); });
   }
 
-  auto* tail = event->add_subcommand("tail", "Print events as they come, until Ctrl-C; or those of a capture file");
-  tail->add_option("--on", options->ids, "Switch these events on first");
-  tail->add_flag("--all", options->all, "Switch all events on first");
-  tail->add_option("--names", options->names, "Table of event texts");
-  tail->add_option("--file", options->file, "A capture file instead of the handset");
-  options->limit.AddTo(*tail, "events");
+  const auto tail = event.Verb("tail", "Print events as they come, until Ctrl-C; or those of a capture file");
+  tail.Add("--on", options->ids, "Switch these events on first");
+  tail.Flag("--all", options->all, "Switch all events on first");
+  tail.Add("--names", options->names, "Table of event texts");
+  tail.Add("--file", options->file, "A capture file instead of the handset");
+  options->limit.AddTo(tail, "events");
   run(tail, Tail);
 }
 

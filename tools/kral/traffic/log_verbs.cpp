@@ -1,7 +1,4 @@
 // kral log: which logs a handset sends, and what becomes of them.
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
 #include <memory>
@@ -10,6 +7,7 @@
 #include <vector>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/traffic/playback.h"
@@ -52,7 +50,7 @@ ItemsOn FindItemsOn(Session& session, std::uint8_t equipment_id) {
   std::vector<std::uint8_t> mask(kMaskRoom);
   auto size = static_cast<std::uint16_t>(mask.size());
   std::uint32_t bits = 0;
-  session.Run(fmt::format("the request for the log mask of equipment id {}", equipment_id),
+  session.Run(Format("the request for the log mask of equipment id {}", equipment_id),
               [&] { return KRAL_DIAG_GetLogMask(session.handle(), equipment_id, &bits, &size, mask.data()); });
   ItemsOn on;
   for (std::uint32_t item = 0; item < std::min<std::uint32_t>(bits, size * 8U); ++item) {
@@ -85,10 +83,10 @@ void List(const Context& context, const LogOptions& options) {
     for (const auto code : on.codes) {
       const auto name = NameOf(session.handle(), code);
       codes.push_back({{"code", code}, {"name", name}});
-      lines += fmt::format("  0x{:04X}  {}\n", code, name);
+      lines += Format("  0x{:04X}  {}\n", code, name);
     }
-    if (on.beyond != 0) lines += fmt::format("  and {} without a code\n", on.beyond);
-    text += fmt::format("equipment id {}: {} items, {} on\n{}", id, ranges[id], codes.size() + on.beyond, lines);
+    if (on.beyond != 0) lines += Format("  and {} without a code\n", on.beyond);
+    text += Format("equipment id {}: {} items, {} on\n{}", id, ranges[id], codes.size() + on.beyond, lines);
     rows.push_back(
         {{"equipment_id", id}, {"items", ranges[id]}, {"on", std::move(codes)}, {"on_without_code", on.beyond}});
   }
@@ -102,7 +100,7 @@ void SwitchCodes(Session& session, const Codes& codes, bool on) {
                                    [=](std::uint16_t code) { return code / kItemsPerEquipmentId != equipment_id; });
     const auto count = static_cast<std::uint16_t>(last - first);
     const auto change = on ? KRAL_DIAG_AddExtendedLogCodes : KRAL_DIAG_ClearExtendedLogCodes;
-    session.Run(fmt::format("switching {} log codes of equipment id {}", on ? "on" : "off", equipment_id),
+    session.Run(Format("switching {} log codes of equipment id {}", on ? "on" : "off", equipment_id),
                 [&] { return change(session.handle(), equipment_id, &*first, count); });
     first = last;
   }
@@ -113,7 +111,7 @@ void SwitchAll(Session& session, bool on) {
   for (std::uint8_t id = 0; id < ranges.size(); ++id) {
     if (ranges[id] == 0) continue;
     if (!on) {
-      session.Run(fmt::format("switching off equipment id {}", id),
+      session.Run(Format("switching off equipment id {}", id),
                   [&] { return KRAL_DIAG_ClearAllLogCodes(session.handle(), id); });
       continue;
     }
@@ -135,15 +133,15 @@ void Switch(const Context& context, const LogOptions& options, bool on) {
   if (options.all) SwitchAll(session, on);
   SwitchCodes(session, codes, on);
   for (const auto category : categories) {
-    session.Run(fmt::format("switching message category {}", category),
+    session.Run(Format("switching message category {}", category),
                 [&] { return KRAL_ExtendedTextMessage_SetCategoryEnable(session.handle(), category, on ? 1 : 0); });
   }
   const auto state = on ? "on" : "off";
   const auto what = options.all ? std::string("all logs")
-                                : fmt::format("{} log codes, {} message categories", codes.size(), categories.size());
+                                : Format("{} log codes, {} message categories", codes.size(), categories.size());
   context.out.Result(
       {{"port", session.port()}, {"state", state}, {"all", options.all}, {"codes", codes}, {"categories", categories}},
-      fmt::format("{} {}\n", what, state));
+      Format("{} {}\n", what, state));
 }
 
 KRAL_TRAFFIC_COUNTERS CountersOf(KRAL_HANDLE handle) {
@@ -188,14 +186,14 @@ void Capture(Context& context, LogOptions& options) {
                      {"seconds", options.limit.seconds()}};
   if (const auto missing = counters.capture_lost + counters.capture_pending; missing != 0) {
     if (context.out.json()) context.found = members;
-    throw ToolError(ExitCode::kBadFile, fmt::format("{} of the packets are not in {}", missing, options.file),
+    throw ToolError(ExitCode::kBadFile, Format("{} of the packets are not in {}", missing, options.file),
                     "check the room on the disk and its speed; what is in the file can be played");
   }
-  context.out.Result(members, fmt::format("{} packets in {}\n", counters.captured, options.file));
+  context.out.Result(members, Format("{} packets in {}\n", counters.captured, options.file));
 }
 
 void NoteCut(const Context& context, const std::string& file) {
-  context.out.Note(fmt::format("{} is cut or damaged behind its last whole packet", file));
+  context.out.Note(Format("{} is cut or damaged behind its last whole packet", file));
 }
 
 void Play(const Context& context, const LogOptions& options) {
@@ -209,8 +207,8 @@ void Play(const Context& context, const LogOptions& options) {
                                                     {"microseconds", packet.microseconds},
                                                     {"what", what},
                                                     {"bytes", HexText(packet.bytes)}},
-                                                   fmt::format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds),
-                                                               what, packet.bytes.size(), HexDump(packet.bytes)));
+                                                   Format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what,
+                                                          packet.bytes.size(), HexDump(packet.bytes)));
                               });
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
@@ -268,52 +266,50 @@ void Statistics(const Context& context, LogOptions& options) {
                       {"counters", JsonOf(counters)},
                       {"rows", table.Rows(session.handle(), seconds)}},
                      table.Text(session.handle(), seconds) +
-                         fmt::format("{} received, {} collected, {} dropped, {} oversized\n", counters.packets_received,
-                                     counters.collected, counters.dropped_logs, counters.oversized));
+                         Format("{} received, {} collected, {} dropped, {} oversized\n", counters.packets_received,
+                                counters.collected, counters.dropped_logs, counters.oversized));
 }
 
-void AddCodes(CLI::App& verb, const std::shared_ptr<LogOptions>& options, const char* name) {
-  verb.add_option(name, options->codes, "Log codes, such as 0x1001 or 0x1000-0x100F");
+void AddCodes(const Command& verb, const std::shared_ptr<LogOptions>& options, const char* name) {
+  verb.Add(name, options->codes, "Log codes, such as 0x1001 or 0x1000-0x100F");
 }
 
 }  // namespace
 
-void AddLogVerbs(CLI::App& app, Context& context) {
+void AddLogVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<LogOptions>();
-  auto* log = app.add_subcommand("log", "Logs and messages that a handset sends by itself");
-  log->require_subcommand(1);
-  const auto run = [&context, options](CLI::App* verb, auto action) {
-    verb->callback(
-        [&context, options, action] { context.run = [&context, options, action] { action(context, *options); }; });
+  const auto log = root.Noun("log", "Logs and messages that a handset sends by itself");
+  const auto run = [&context, options](const Command& verb, auto action) {
+    verb.Run([&context, options, action] { action(context, *options); });
   };
 
-  auto* list = log->add_subcommand("list", "Print which log codes are on");
-  list->add_option("--names", options->names, "Table of log names");
+  const auto list = log.Verb("list", "Print which log codes are on");
+  list.Add("--names", options->names, "Table of log names");
   run(list, List);
 
   for (const bool on : {true, false}) {
-    auto* verb = log->add_subcommand(on ? "on" : "off", on ? "Switch logs on" : "Switch logs off");
-    AddCodes(*verb, options, "codes");
-    verb->add_option("--category", options->categories, "Message categories, as well");
-    verb->add_flag("--all", options->all, "Every log code that the handset has");
+    const auto verb = log.Verb(on ? "on" : "off", on ? "Switch logs on" : "Switch logs off");
+    AddCodes(verb, options, "codes");
+    verb.Add("--category", options->categories, "Message categories, as well");
+    verb.Flag("--all", options->all, "Every log code that the handset has");
     run(verb, [on](const Context& c, LogOptions& o) { Switch(c, o, on); });
   }
 
-  auto* capture = log->add_subcommand("capture", "Write what comes to a file, until Ctrl-C");
-  capture->add_option("file", options->file, "The capture file; it is emptied first")->required();
-  AddCodes(*capture, options, "--on");
-  options->limit.AddTo(*capture, "packets");
+  const auto capture = log.Verb("capture", "Write what comes to a file, until Ctrl-C");
+  capture.Add("file", options->file, "The capture file; it is emptied first").Required();
+  AddCodes(capture, options, "--on");
+  options->limit.AddTo(capture, "packets");
   run(capture, Capture);
 
-  auto* play = log->add_subcommand("play", "Print the packets of a capture file; needs no handset");
-  play->add_option("file", options->file, "The capture file")->required();
-  play->add_flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
+  const auto play = log.Verb("play", "Print the packets of a capture file; needs no handset");
+  play.Add("file", options->file, "The capture file").Required();
+  play.Flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
   run(play, Play);
 
-  auto* stats = log->add_subcommand("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
-  stats->add_option("file", options->file, "A capture file; default: the handset");
-  stats->add_option("--names", options->names, "Table of log names");
-  options->limit.AddTo(*stats, "packets");
+  const auto stats = log.Verb("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
+  stats.Add("file", options->file, "A capture file; default: the handset");
+  stats.Add("--names", options->names, "Table of log names");
+  options->limit.AddTo(stats, "packets");
   run(stats, Statistics);
 }
 

@@ -1,8 +1,6 @@
 // Plays capture files through the library. What a verb makes of the packets is its own affair.
 #include "tools/kral/traffic/playback.h"
 
-#include <fmt/format.h>
-
 #include <chrono>
 #include <condition_variable>
 #include <deque>
@@ -11,6 +9,7 @@
 #include <utility>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 
 namespace kral::tool {
@@ -105,7 +104,7 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
     if (packet) {
       sink(*packet);
     } else if (state == KRAL_PLAYBACK_FOREIGN) {
-      throw ToolError(ExitCode::kBadFile, fmt::format("{} is not a capture file", file),
+      throw ToolError(ExitCode::kBadFile, Format("{} is not a capture file", file),
                       "kral log capture writes such files");
     } else if (state != KRAL_PLAYBACK_RUNNING) {
       return state == KRAL_PLAYBACK_DONE;
@@ -120,9 +119,9 @@ std::string TimeText(std::uint64_t microseconds) {
   const auto day = std::chrono::floor<std::chrono::days>(time);
   const std::chrono::year_month_day date(day);
   const std::chrono::hh_mm_ss clock(time - day);
-  return fmt::format("{:04}-{:02}-{:02}T{:02}:{:02}:{:02}.{:06}Z", static_cast<int>(date.year()),
-                     static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
-                     clock.minutes().count(), clock.seconds().count(), clock.subseconds().count());
+  return Format("{:04}-{:02}-{:02}T{:02}:{:02}:{:02}.{:06}Z", static_cast<int>(date.year()),
+                static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
+                clock.minutes().count(), clock.seconds().count(), clock.subseconds().count());
 }
 
 }  // namespace kral::tool

@@ -1,15 +1,14 @@
 // Counts and collects unsolicited packets for the log and event verbs.
 #include "tools/kral/traffic/traffic.h"
 
-#include <fmt/format.h>
-
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
 #include <charconv>
 #include <set>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/command_line.h"
+#include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/session.h"
 
@@ -31,8 +30,8 @@ std::optional<std::uint16_t> Word(std::span<const std::uint8_t> packet, std::siz
 }
 
 [[noreturn]] void RejectId(const std::string& word, std::uint16_t most) {
-  throw ToolError(ExitCode::kUsage, fmt::format("{} is not an id", word),
-                  fmt::format("give ids from 0 to {}, such as 291, 0x123 or 0x100-0x10F", most));
+  throw ToolError(ExitCode::kUsage, Format("{} is not an id", word),
+                  Format("give ids from 0 to {}, such as 291, 0x123 or 0x100-0x10F", most));
 }
 
 std::uint16_t ParseId(std::string_view text, const std::string& word, std::uint16_t most) {
@@ -69,15 +68,15 @@ std::string DescribePacket(std::span<const std::uint8_t> packet) {
   if (packet.empty()) return "nothing";
   switch (packet.front()) {
     case kLog:
-      if (const auto code = Word(packet, kLogCodeOffset)) return fmt::format("log 0x{:04X}", *code);
+      if (const auto code = Word(packet, kLogCodeOffset)) return Format("log 0x{:04X}", *code);
       return "log";
     case kReport:
       return "events";
     case kMessage:
-      if (const auto category = Word(packet, kCategoryOffset)) return fmt::format("message {}", *category);
+      if (const auto category = Word(packet, kCategoryOffset)) return Format("message {}", *category);
       return "message";
     default:
-      return fmt::format("packet {}", packet.front());
+      return Format("packet {}", packet.front());
   }
 }
 
@@ -119,21 +118,21 @@ Json TrafficTable::Rows(KRAL_HANDLE handle, double seconds) const {
 std::string TrafficTable::Text(KRAL_HANDLE handle, double seconds) const {
   std::string text;
   for (const auto& [what, row] : Sorted()) {
-    const auto rate = seconds > 0 ? fmt::format("{:10.1f}/s", static_cast<double>(row.packets) / seconds) : "";
-    text += fmt::format("{:>10} packets {:>12} bytes {}  {:<12}  {}\n", row.packets, row.bytes, rate, what,
-                        NameOf(handle, row.log_code));
+    const auto rate = seconds > 0 ? Format("{:10.1f}/s", static_cast<double>(row.packets) / seconds) : "";
+    text += Format("{:>10} packets {:>12} bytes {}  {:<12}  {}\n", row.packets, row.bytes, rate, what,
+                   NameOf(handle, row.log_code));
   }
   return text;
 }
 
-void Limit::AddTo(CLI::App& verb, const char* things) {
-  verb.add_option("--seconds", most_seconds_, "Stop after so long; default: with Ctrl-C")->check(CLI::Range(0.01, 1e6));
-  verb.add_option("--count", count_, fmt::format("Stop after so many {}", things));
+void Limit::AddTo(const Command& verb, const char* things) {
+  verb.Add("--seconds", most_seconds_, "Stop after so long; default: with Ctrl-C").Between(0.01, 1e6, "s");
+  verb.Add("--count", count_, Format("Stop after so many {}", things));
 }
 
 void Limit::Reject(const char* what) const {
   if (count_ == 0 && most_seconds_ <= 0) return;
-  throw ToolError(ExitCode::kUsage, fmt::format("{} has an end of its own", what), "leave out --seconds and --count");
+  throw ToolError(ExitCode::kUsage, Format("{} has an end of its own", what), "leave out --seconds and --count");
 }
 
 void Limit::Begin() {
@@ -170,8 +169,7 @@ void CollectPackets(Session& session, const Limit& limit, const std::uint64_t& c
 
 void LoadTable(KRAL_HANDLE handle, std::uint32_t table, const std::string& file) {
   if (file.empty() || KRAL_LoadNameTable(handle, table, file.c_str()) != 0) return;
-  throw ExplainRecord(LastError(handle), fmt::format("the table {}", file), 0,
-                      "one id and its name a line, each id once");
+  throw ExplainRecord(LastError(handle), Format("the table {}", file), 0, "one id and its name a line, each id once");
 }
 
 }  // namespace kral::tool

@@ -16,12 +16,9 @@
 #include "platform/clock.h"
 #include "tools/kral/output.h"
 
-namespace CLI {
-class App;
-}
-
 namespace kral::tool {
 
+class Command;
 class Session;
 
 // "291", "0x1001", "0x1000-0x100F", none above `most`, in rising order and each once. ToolError kUsage.
@@ -54,7 +51,7 @@ class TrafficTable {
 // ordinary end.
 class Limit {
  public:
-  void AddTo(CLI::App& verb, const char* things);
+  void AddTo(const Command& verb, const char* things);
   // For what ends by itself: ToolError kUsage when one was given.
   void Reject(const char* what) const;
   void Begin();

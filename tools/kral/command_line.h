@@ -1,0 +1,109 @@
+// The command line as the verbs declare it: nouns, verbs, their options, and what they run. The parser itself is known
+// to command_line.cpp only.
+#ifndef KRAL_TOOLS_COMMAND_LINE_H
+#define KRAL_TOOLS_COMMAND_LINE_H
+
+#include <cstdint>
+#include <functional>
+#include <initializer_list>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace CLI {
+class App;
+class Option;
+}  // namespace CLI
+
+namespace kral::tool {
+
+// What a number may be, and what it counts: "ms". What a type of its own cannot hold it may not be either.
+struct NumberRange {
+  double least;
+  double most;
+  const char* unit = "";
+};
+
+// An option or an argument, for whatever else is to be said of it.
+class Option {
+ public:
+  Option& Required();
+  Option& Between(double least, double most, const char* unit = "");  // of a number
+  Option& OneOf(std::initializer_list<std::string> words);            // of a text
+  Option& ShowDefault();                                              // in the help: the value that the target has now
+  // Of a list. Without these the values of an option may follow each other: --on 0x1001 0x1002.
+  Option& OneEach();           // every value has the option in front of it
+  Option& Separated(char by);  // values in one word
+  Option& Count(int least, int most);
+  // Gives what is wrong with a text; nothing when it is right.
+  Option& Check(std::function<std::string(const std::string&)> fault);
+
+ private:
+  friend class Command;
+  Option(CLI::Option* option, std::string default_text) : option_(option), default_text_(std::move(default_text)) {}
+
+  CLI::Option* option_;
+  std::shared_ptr<NumberRange> range_;
+  std::string default_text_;
+};
+
+// A noun or a verb. A handle: copies are the same noun or verb.
+class Command {
+ public:
+  Command Noun(const std::string& name, const std::string& help) const;  // takes one of its verbs
+  Command Verb(const std::string& name, const std::string& help) const;
+  Command Find(const std::string& name) const;  // a noun or verb that was added before
+
+  // Options ("--names", "-p,--port") and arguments ("file"), which are taken in the order of their declaration. The
+  // target must live as long as the verb may run. Numbers are decimal, or hexadecimal with 0x in front.
+  Option Add(const char* names, std::string& target, std::string_view help = "") const;
+  Option Add(const char* names, std::vector<std::string>& target, std::string_view help = "") const;
+  Option Add(const char* names, std::vector<std::pair<std::string, std::string>>& target, std::string_view help) const;
+  Option Add(const char* names, std::vector<std::uint16_t>& target, std::string_view help) const;
+  // Of the number types and std::optional of them; command_line.cpp lists those in use.
+  template <class Number>
+  Option Add(const char* names, Number& target, std::string_view help) const;
+  void Flag(const char* names, bool& target, std::string_view help) const;
+  void Flag(const char* names, std::function<void()> given, std::string_view help) const;
+
+  // What the verb does, when it is the one that was given.
+  void Run(std::function<void()> act) const;
+  // Below the options in the help.
+  void Explain(std::function<std::string()> text) const;
+
+ private:
+  friend class CommandLine;
+  using Action = std::function<void()>;
+  using Sink = std::function<void(const std::vector<std::string>& words)>;
+
+  Command(CLI::App& app, Action& chosen) : app_(&app), chosen_(&chosen) {}
+  Option AddWords(const char* names, Sink sink, std::string_view help, std::string default_text) const;
+  template <class Number>
+  Option AddNumbers(const char* names, std::string_view help, std::function<void(Number)> set, std::string now) const;
+
+  CLI::App* app_;
+  Action* chosen_;
+};
+
+class CommandLine {
+ public:
+  CommandLine(const std::string& program, const std::string& description, std::function<std::string()> version);
+  ~CommandLine();
+  CommandLine(const CommandLine&) = delete;
+  CommandLine& operator=(const CommandLine&) = delete;
+
+  Command root();
+  // What the chosen verb does; nothing when help or the version was asked for, which is then printed. ToolError for
+  // mistakes. Options of a noun or of the root are taken behind a verb, too.
+  std::function<void()> Parse(std::vector<std::string> arguments);
+
+ private:
+  struct Parser;
+  std::unique_ptr<Parser> parser_;
+};
+
+}  // namespace kral::tool
+
+#endif
