@@ -2,6 +2,7 @@
 import contextlib
 import json
 import os
+import re
 import signal
 import subprocess
 
@@ -95,6 +96,39 @@ class Failures(ToolTest):
                       ["sim", "--fault", "frobnicate"]):
             with self.subTest(words=words):
                 self.expect_json(2, *words)
+
+    def test_mistakes_are_named_with_what_would_be_right(self):
+        for words, text in (
+                (["bogus"], "there is no verb bogus; did you mean boot?"),
+                (["--json", "-p", "7", "nv", "raed", "1"], "there is no verb nv raed; did you mean nv read?"),
+                (["info", "--tiem-out", "5"], "kral info has no option --tiem-out; did you mean --time-out?"),
+                (["nv"], "kral nv needs a verb: read, write,"),
+                (["flash", "load"], "kral flash load: programmer is required"),
+                (["info", "me"], "kral info takes no 'me'"),
+                (["info", "--time-out", "0"], "--time-out takes a number from 1 to 3600000 ms, not '0'"),
+                (["band", "ul", "gsm", "1"], "band takes a number from 0 to 65535, not 'gsm'"),
+                (["ftm", "tx", "up"], "state cannot be 'up': it is on or off")):
+            with self.subTest(words=words):
+                self.assertIn(text, self.expect_json(2, *words)["error"]["text"])
+
+    def verbs_of(self, *words):
+        """Every verb below these words, with its help."""
+        page = self.expect(0, "help", *words).out
+        self.assertEqual(page, self.expect(0, *words, "--help").out)
+        below = re.findall(r"(?m)^  (\S+)", page.partition("Subcommands:\n")[2])
+        if not below:
+            yield words, page
+        for name in below:
+            yield from self.verbs_of(*words, name)
+
+    def test_help_of_every_verb_has_an_example_and_ranges_without_types(self):
+        pages = dict(self.verbs_of())
+        self.assertGreater(len(pages), 50)
+        for words, page in pages.items():
+            with self.subTest(words=words):
+                self.assertRegex(page, rf"\n  kral (-\S+ (\d+ )?)*{' '.join(words)}\b")
+                self.assertNotRegex(page, r" in \[|INT|FLOAT|:\{")
+        self.assertIn("--time-out 1-3600000 ms", self.expect(0, "help").out)
 
     def test_result_that_cannot_be_written_is_not_a_success(self):
         with self.handset(), open("/dev/full", "w", encoding="ascii") as full:

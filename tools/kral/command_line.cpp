@@ -5,23 +5,26 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
+#include <iostream>
 #include <limits>
+#include <map>
 #include <optional>
+#include <stdexcept>
 #include <string_view>
 #include <type_traits>
 #include <utility>
 
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/nearest_word.h"
 
 namespace kral::tool {
 namespace {
 
 constexpr int kAnyNumber = CLI::detail::expected_max_vector_size;
-constexpr const char* kSeeHelp = "--help behind the verb tells what it takes";
 
 [[noreturn]] void Reject(const std::string& text) {
-  throw ToolError(ExitCode::kUsage, text, kSeeHelp);
+  throw ToolError(ExitCode::kUsage, text, "--help behind the verb tells what it takes");
 }
 
 // "1 to 3600000 ms", for the help "1-3600000 ms".
@@ -85,6 +88,95 @@ struct NumberOf<std::optional<Number>> {
   using Type = Number;
   static std::string Text(const std::optional<Number>& value) { return value ? Format("{}", *value) : ""; }
 };
+
+// --- Words that lead nowhere ----------------------------------------------------------------------------------------
+
+// "kral nv read"
+std::string TitleOf(const CLI::App& app) {
+  const auto* const parent = app.get_parent();
+  return parent == nullptr ? app.get_name() : Format("{} {}", TitleOf(*parent), app.get_name());
+}
+
+std::vector<std::string> VerbsOf(const CLI::App& app) {
+  std::vector<std::string> names;
+  for (const auto* verb : app.get_subcommands([](const CLI::App*) { return true; })) names.push_back(verb->get_name());
+  return names;
+}
+
+std::vector<std::string> OptionsOf(const CLI::App* app) {
+  std::vector<std::string> names;
+  for (; app != nullptr; app = app->get_parent()) {
+    for (const auto* option : app->get_options()) {
+      if (option->nonpositional()) names.push_back(option->get_name());
+    }
+  }
+  return names;
+}
+
+const CLI::Option* FindOption(const CLI::App* app, const std::string& name) {
+  const CLI::Option* option = nullptr;
+  for (; app != nullptr && option == nullptr; app = app->get_parent()) option = app->get_option_no_throw(name);
+  return option;
+}
+
+// The noun or verb that words lead to, and the first word that leads nowhere.
+struct Place {
+  CLI::App* app;
+  std::string unknown;
+};
+
+Place Follow(CLI::App& root, const std::vector<std::string>& words) {
+  Place place{&root, {}};
+  for (std::size_t i = 0; i < words.size() && words[i] != "--"; ++i) {
+    const auto& word = words[i];
+    if (word.size() > 1 && word.front() == '-') {
+      const bool is_long = word.starts_with("--");
+      const auto name = is_long ? word.substr(0, word.find('=')) : word.substr(0, 2);
+      const auto* const option = FindOption(place.app, name);
+      if (option == nullptr) return {place.app, name};
+      if (name.size() == word.size()) i += static_cast<std::size_t>(option->get_items_expected_min());
+    } else if (!VerbsOf(*place.app).empty()) {
+      const auto found = place.app->get_subcommands([&word](const CLI::App* verb) { return verb->check_name(word); });
+      if (found.empty()) return {place.app, word};
+      place.app = found.front();
+    }
+  }
+  return place;
+}
+
+std::string DescribeUnknown(const Place& place) {
+  const auto& word = place.unknown;
+  const auto title = TitleOf(*place.app);
+  if (word.front() == '-') {
+    const auto nearest = NearestWord(word, OptionsOf(place.app));
+    return Format("{} has no option {}{}", title, word, nearest ? Format("; did you mean {}?", *nearest) : "");
+  }
+  const auto nearest = NearestWord(word, VerbsOf(*place.app));
+  const auto noun = place.app->get_parent() == nullptr ? std::string() : place.app->get_name() + " ";
+  return Format("there is no verb {}{}{}", noun, word, nearest ? Format("; did you mean {}{}?", noun, *nearest) : "");
+}
+
+// What was wrong with a command line that the parser did not take.
+ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const CLI::ParseError& error) {
+  const auto place = Follow(root, words);
+  const auto title = TitleOf(*place.app);
+  const auto hint = Format("{} --help tells what it takes", title);
+  if (!place.unknown.empty()) return {ExitCode::kUsage, DescribeUnknown(place), hint};
+  if (const auto verbs = VerbsOf(*place.app); !verbs.empty()) {
+    return {ExitCode::kUsage, Format("{} needs a verb: {}", title, Joined(verbs, ", ")), hint};
+  }
+  if (const auto rest = root.remaining(true); !rest.empty()) {
+    return {ExitCode::kUsage, Format("{} takes no '{}'", title, rest.front()), hint};
+  }
+  return {ExitCode::kUsage, Format("{}: {}", title, error.what()), hint};
+}
+
+void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
+  const auto place = Follow(root, words);
+  if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
+  const auto* const parent = place.app->get_parent();
+  std::cout << place.app->help(parent == nullptr ? "" : TitleOf(*parent));
+}
 
 }  // namespace
 
@@ -254,6 +346,7 @@ struct CommandLine::Parser {
 
   CLI::App app;
   std::function<void()> chosen;
+  std::map<CLI::App*, std::string> examples;
 };
 
 CommandLine::CommandLine(const std::string& program, const std::string& description,
@@ -261,6 +354,10 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
     : parser_(std::make_unique<Parser>(program, description)) {
   parser_->app.set_version_flag("--version", std::move(version));
   parser_->app.require_subcommand(1);
+  const auto words = std::make_shared<std::vector<std::string>>();
+  const auto help = root().Verb("help", "Print the help of a verb");
+  help.Add("verb", *words, "Noun and verb");
+  help.Run([parser = parser_.get(), words] { PrintHelp(parser->app, *words); });
 }
 
 CommandLine::~CommandLine() = default;
@@ -269,17 +366,25 @@ Command CommandLine::root() {
   return {parser_->app, parser_->chosen};
 }
 
+void CommandLine::Example(const std::string& words) {
+  auto list = CLI::detail::split(words, ' ');
+  list.erase(list.begin());
+  const auto place = Follow(parser_->app, list);
+  if (!place.unknown.empty() || !VerbsOf(*place.app).empty()) throw std::logic_error("no example: " + words);
+  auto& text = parser_->examples[place.app];
+  text += Format("{}  {}\n", text.empty() ? "Examples:\n" : "", words);
+  place.app->footer(text);
+}
+
 std::function<void()> CommandLine::Parse(std::vector<std::string> arguments) {
   parser_->chosen = {};
   try {
-    std::reverse(arguments.begin(), arguments.end());  // as the parser wants them
-    parser_->app.parse(std::move(arguments));
+    // The parser wants them from the last to the first.
+    parser_->app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
   } catch (const CLI::ParseError& error) {
-    if (error.get_exit_code() == 0) {  // --help, --version
-      parser_->app.exit(error);
-      return {};
-    }
-    throw ToolError(ExitCode::kUsage, error.what(), "kral --help lists the verbs and options");
+    if (error.get_exit_code() != 0) throw Explain(parser_->app, arguments, error);
+    parser_->app.exit(error);  // --help, --version
+    return {};
   }
   return parser_->chosen;
 }

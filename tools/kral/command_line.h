@@ -95,6 +95,8 @@ class CommandLine {
   CommandLine& operator=(const CommandLine&) = delete;
 
   Command root();
+  // Shown at the end of the help of its verb: "kral -p 7 info". Its verb and its options must be there.
+  void Example(const std::string& words);
   // What the chosen verb does; nothing when help or the version was asked for, which is then printed. ToolError for
   // mistakes. Options of a noun or of the root are taken behind a verb, too.
   std::function<void()> Parse(std::vector<std::string> arguments);

@@ -19,4 +19,8 @@ std::string Joined(const std::vector<std::string>& parts, std::string_view separ
   return text;
 }
 
+std::string Counted(std::uint64_t count, std::string_view thing) {
+  return Format("{} {}{}", count, thing, count == 1 ? "" : "s");
+}
+
 }  // namespace kral::tool

@@ -5,6 +5,7 @@
 
 #include <fmt/core.h>
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -20,6 +21,9 @@ std::string Format(fmt::format_string<Arguments...> format, Arguments&&... argum
 
 // "a, b, c"
 std::string Joined(const std::vector<std::string>& parts, std::string_view separator);
+
+// "1 image", "2 images"
+std::string Counted(std::uint64_t count, std::string_view thing);
 
 }  // namespace kral::tool
 

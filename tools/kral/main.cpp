@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "platform/console.h"
+#include "tools/kral/examples.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
@@ -68,6 +69,7 @@ int Run(std::vector<std::string> arguments) {
   AddBandVerbs(root, context);
   AddRawVerbs(root, context);
   AddSimVerbs(root, context);
+  AddExamples(command_line);
 
   try {
     const auto act = command_line.Parse(std::move(arguments));

@@ -59,7 +59,8 @@ void FlashAll(Context& context, const FlashAllArguments& arguments) {
                       {"written", written},
                       {"bytes", TotalBytes(images)},
                       {"reset", arguments.reset}},
-                     Format("{} bytes in {} images written and acknowledged\n", TotalBytes(images), images.size()));
+                     Format("{} in {} written and acknowledged\n", Counted(TotalBytes(images), "byte"),
+                            Counted(images.size(), "image")));
 }
 
 void AddBootOptions(const Command& verb, BootOptions& options) {

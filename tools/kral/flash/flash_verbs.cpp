@@ -57,7 +57,8 @@ void LoadProgrammer(Context& context, const LoadArguments& arguments) {
     const auto chunk = std::min(arguments.packet / 2, kLargestChunk);
     context.out.Result(
         {{"dry_run", true}, {"image", ImageObject(programmer)}, {"writes", CountBlocks(programmer, chunk)}},
-        DescribeImage(programmer) + Format("  {} writes of at most {} bytes\n", CountBlocks(programmer, chunk), chunk));
+        DescribeImage(programmer) +
+            Format("  {} of at most {} bytes\n", Counted(CountBlocks(programmer, chunk), "write"), chunk));
     return;
   }
   FlashTarget target(context);
@@ -95,11 +96,11 @@ void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uin
     auto row = ImageObject(image);
     row["blocks"] = count;
     rows.push_back(std::move(row));
-    text += DescribeImage(image) + Format("  {} blocks of at most {} bytes\n", count, block_size);
+    text += DescribeImage(image) + Format("  {} of at most {} bytes\n", Counted(count, "block"), block_size);
     blocks += count;
   }
   const auto bytes = TotalBytes(images);
-  text += Format("in all {} bytes in {} blocks; nothing was written\n", bytes, blocks);
+  text += Format("in all {} in {}; nothing was written\n", Counted(bytes, "byte"), Counted(blocks, "block"));
   context.out.Result(
       {{"dry_run", true}, {"images", rows}, {"bytes", bytes}, {"blocks", blocks}, {"block_size", block_size}}, text);
 }
@@ -132,8 +133,9 @@ void WriteImages(Context& context, WriteArguments arguments) {
       context.found["written"] = written;
     }
   }
-  context.out.Result({{"port", target.session().port()}, {"written", written}, {"bytes", done}},
-                     Format("{} bytes in {} images written and acknowledged\n", done, images.size()));
+  context.out.Result(
+      {{"port", target.session().port()}, {"written", written}, {"bytes", done}},
+      Format("{} in {} written and acknowledged\n", Counted(done, "byte"), Counted(images.size(), "image")));
 }
 
 void VerifyImages(Context& context, const std::vector<std::string>& files, const std::string& format) {

@@ -197,17 +197,17 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
               "check the range of --items"};
     case KRAL_PKV_STATUS_INCOMPLETE:
       return {ExitCode::kRefused,
-              Format("the handset on {} refused {} items; {} holds the others", DescribePort(session.port()),
-                     counts.refused, file),
+              Format("the handset on {} refused {}; {} holds the others", DescribePort(session.port()),
+                     Counted(counts.refused, "item"), file),
               "the result names them; some may need an unlock or another mode"};
     case KRAL_PKV_STATUS_NOT_WRITTEN:
       if (counts.refused > 0) {
         return {ExitCode::kRefused,
-                Format("the handset on {} refused {} items", DescribePort(session.port()), counts.refused),
+                Format("the handset on {} refused {}", DescribePort(session.port()), Counted(counts.refused, "item")),
                 "the result names them; some may need an unlock or another mode"};
       }
       return {ExitCode::kMismatch,
-              Format("{} items do not read back as written", counts.different + counts.not_read_back),
+              Format("not read back as written: {}", Counted(counts.different + counts.not_read_back, "item")),
               "the result names them"};
     case KRAL_PKV_STATUS_DIFFERENT:
       return {ExitCode::kMismatch, Format("{} and the handset on {} differ", file, DescribePort(session.port())),

@@ -139,7 +139,7 @@ void Dump(Context& context, const Arguments& arguments) {
   if (to_files) items.KeepUndefined();
   ReadSoFar read;
   ReadAll(context, items, wanted, read);
-  context.out.Note(Format("{} items read, {} without a value{}{}", read.items.size(), read.without_value,
+  context.out.Note(Format("{} read, {} without a value{}{}", Counted(read.items.size(), "item"), read.without_value,
                           read.refusals.empty() ? "" : ", refused: ", read.refusals));
   if (to_files) {
     try {

@@ -42,7 +42,7 @@ void Switch(const Context& context, const EventOptions& options, bool on) {
   }
   Session session(context.session);
   SwitchEvents(session, options, on);
-  const auto what = options.all ? std::string("all events") : Format("{} events", ids.size());
+  const auto what = options.all ? std::string("all events") : Counted(ids.size(), "event");
   context.out.Result({{"port", session.port()}, {"state", on ? "on" : "off"}, {"all", options.all}, {"ids", ids}},
                      Format("{} {}\n", what, on ? "on" : "off"));
 }
@@ -102,7 +102,8 @@ void Tail(const Context& context, EventOptions& options) {
                       {"per_second", rate}},
                      "");
   if (!context.out.json()) {
-    context.out.Note(Format("{} events, {:.1f}/s, {} packets dropped", events, rate, counters.dropped_logs));
+    context.out.Note(
+        Format("{}, {:.1f}/s, {} dropped", Counted(events, "event"), rate, Counted(counters.dropped_logs, "packet")));
   }
 }
 

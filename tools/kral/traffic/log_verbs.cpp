@@ -189,7 +189,7 @@ void Capture(Context& context, LogOptions& options) {
     throw ToolError(ExitCode::kBadFile, Format("{} of the packets are not in {}", missing, options.file),
                     "check the room on the disk and its speed; what is in the file can be played");
   }
-  context.out.Result(members, Format("{} packets in {}\n", counters.captured, options.file));
+  context.out.Result(members, Format("{} in {}\n", Counted(counters.captured, "packet"), options.file));
 }
 
 void NoteCut(const Context& context, const std::string& file) {
