@@ -3,6 +3,7 @@
 
 #include <exception>
 #include <optional>
+#include <vector>
 
 #include "download/images/image_file.h"
 #include "download/kova/kova.h"
@@ -44,8 +45,8 @@ uint32_t ResultOf(stream::WriteOutcome outcome) {
   return KRAL_STREAM_WRITE_FAILED;
 }
 
-uint32_t WriteImage(DownloadConnection& connection, images::PhoneImage& image, images::PhoneImage* header,
-                    const WriteArguments& arguments) {
+uint32_t Write(DownloadConnection& connection, const images::PhoneImage& image, const images::PhoneImage* header,
+               const WriteArguments& arguments) {
   // Before anything is erased for it.
   if (arguments.block_size == 0) return BadArgument(KRAL_STREAM_BAD_ARGUMENT, "blocks of 0 bytes cannot be written");
   const stream::WriteLimits requested{arguments.block_size, stream::WriterWindow(arguments.window)};
@@ -125,8 +126,21 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
   connection.BeginWork();
   if (file == nullptr) return Give(BadArgument(KRAL_KOVA_FILE_NOT_OPENED, kNoFile), result);
   // What throws is the image, for which there is no address space.
-  return GiveResultOf(phone, KRAL_KOVA_FILE_NOT_DECODED, result,
-                      [&] { return kova::LoadFlashProgrammer(connection, file, maximum_packet); });
+  return GiveResultOf(phone, KRAL_KOVA_FILE_NOT_DECODED, result, [&] {
+    kova::ProgrammerFile programmer;
+    const uint32_t opened = programmer.Open(file);
+    if (opened == KRAL_KOVA_DATA_LOST) images::LogLoss(connection.log(), file, programmer.loss());
+    return opened != KRAL_KOVA_LOADED ? opened : kova::LoadFlashProgrammer(connection, programmer, maximum_packet);
+  });
+}
+
+bool LoadProgrammer(Diag_FTM& phone, const kova::ProgrammerFile& programmer, uint32_t maximum_packet,
+                    uint32_t* result) {
+  if (IsRefused(phone, "a flash programmer")) return Give(KRAL_KOVA_WRITE_FAILED, result);
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  return GiveResultOf(phone, KRAL_KOVA_WRITE_FAILED, result,
+                      [&] { return kova::LoadFlashProgrammer(connection, programmer, maximum_packet); });
 }
 
 bool KovaNop(Diag_FTM& phone) {
@@ -169,13 +183,28 @@ bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
 
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
   if (IsRefused(phone, "KRAL_STREAM_PARTITION_TABLE")) return false;
-  DownloadConnection connection(phone);
   if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, kNoFile));
+  std::vector<uint8_t> table;
+  if (!stream::ReadPartitionTable(phone.log(), file, table)) return false;
+  return SendPartitionTable(phone, table, override_table, status);
+}
+
+bool SendPartitionTable(Diag_FTM& phone, std::span<const uint8_t> table, uint8_t override_table, uint8_t* status) {
+  if (IsRefused(phone, "a partition table")) return false;
+  DownloadConnection connection(phone);
   std::optional<uint8_t> answer;
   const bool accepted =
-      stream::CImagePartition(connection, connection.time_out_ms()).Send(file, override_table != 0, answer);
+      stream::CImagePartition(connection, connection.time_out_ms()).Send(table, override_table != 0, answer);
   if (answer && status != nullptr) *status = *answer;
   return accepted;
+}
+
+uint32_t OpenImage(const char* file, uint32_t format, const char* header_file, images::ImageFile& image,
+                   images::ImageFile& header) {
+  uint32_t opened = image.Open(file, format);
+  if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
+    opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
+  return opened != KRAL_STREAM_WRITTEN ? opened : image.RefuseSecondRegion(file);
 }
 
 bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const char* header_file,
@@ -187,14 +216,20 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
     images::ImageFile image;
     images::ImageFile header;
-    uint32_t opened = image.Open(file, format);
+    const uint32_t opened = OpenImage(file, format, header_file, image, header);
     if (opened == KRAL_STREAM_DATA_LOST) images::LogLoss(connection.log(), file, image.loss());
-    if (opened == KRAL_STREAM_WRITTEN && header_file != nullptr)
-      opened = header.Open(header_file, KRAL_IMAGE_FORMAT_BINARY);
     if (opened != KRAL_STREAM_WRITTEN) return opened;
-    if (const uint32_t refused = image.RefuseSecondRegion(file)) return refused;
-    return WriteImage(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments);
+    return Write(connection, image.image(), header_file == nullptr ? nullptr : &header.image(), arguments);
   });
+}
+
+bool WriteImage(Diag_FTM& phone, const images::PhoneImage& image, const images::PhoneImage* header,
+                const WriteArguments& arguments, uint32_t* result) {
+  if (IsRefused(phone, "an image")) return Give(KRAL_STREAM_WRITE_FAILED, result);
+  DownloadConnection connection(phone);
+  connection.BeginWork();
+  return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result,
+                      [&] { return Write(connection, image, header, arguments); });
 }
 
 bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address, const CallersBytes& header,
@@ -220,7 +255,7 @@ bool WriteImageMem(Diag_FTM& phone, const CallersBytes& image, uint32_t address,
     std::unique_ptr<images::PhoneImage> opening;
     if (header.data != nullptr) opening = images::MakeMemoryImage({header.data, header.size}, 0);
     if (header.data != nullptr && opening == nullptr) return KRAL_STREAM_WRITE_FAILED;
-    return WriteImage(connection, *whole, opening.get(), arguments);
+    return Write(connection, *whole, opening.get(), arguments);
   });
 }
 

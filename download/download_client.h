@@ -3,7 +3,10 @@
 #define KRAL_DOWNLOAD_DOWNLOAD_CLIENT_H
 
 #include <cstdint>
+#include <span>
 
+#include "download/images/image_file.h"
+#include "download/kova/kova.h"
 #include "frame/diag_ftm.h"
 #include "kral/download.h"
 
@@ -16,6 +19,8 @@ bool ConfigureHello(Diag_FTM& phone, uint32_t tries, uint32_t delay_ms);
 
 // --- KOVA -----------------------------------------------------------------------------------------------------------
 bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_packet, uint32_t* result);
+// The same with a file that is open already, for this handset and others at the same time.
+bool LoadProgrammer(Diag_FTM& phone, const kova::ProgrammerFile& programmer, uint32_t maximum_packet, uint32_t* result);
 bool KovaNop(Diag_FTM& phone);
 bool KovaReset(Diag_FTM& phone);
 bool KovaSoftwareVersion(Diag_FTM& phone, uint8_t* version);
@@ -24,6 +29,7 @@ bool KovaSoftwareVersion(Diag_FTM& phone, uint8_t* version);
 bool StreamHello(Diag_FTM& phone, uint32_t variant, uint32_t* block_size, uint16_t* window);
 bool SecurityMode(Diag_FTM& phone, uint8_t mode);
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status);
+bool SendPartitionTable(Diag_FTM& phone, std::span<const uint8_t> table, uint8_t override_table, uint8_t* status);
 
 struct WriteArguments {
   uint8_t image_type;
@@ -33,6 +39,12 @@ struct WriteArguments {
 };
 bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const char* header_file,
                     const WriteArguments& arguments, uint32_t* result);
+// An image that is open already, for this handset and others at the same time. `header` may be null.
+bool WriteImage(Diag_FTM& phone, const images::PhoneImage& image, const images::PhoneImage* header,
+                const WriteArguments& arguments, uint32_t* result);
+// Opens both for such a write. The header's name may be null. Gives KRAL_STREAM_... or 0, with the failure noted.
+uint32_t OpenImage(const char* file, uint32_t format, const char* header_file, images::ImageFile& image,
+                   images::ImageFile& header);
 struct CallersBytes {
   const uint8_t* data;
   uint32_t size;

@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <exception>
 
-#include "download/boot/kivrat.h"
 #include "download/download_client.h"
 #include "download/images/image_file.h"
 #include "download/link/download_connection.h"
@@ -91,16 +90,25 @@ bool BootTransfer(Diag_FTM& phone, const WholeWay& whole) {
   return kivrat::Connect(phone, version, nullptr, [&whole] { return whole.aborted(); });
 }
 
-}  // namespace
-
-bool ServeFlashProgrammer(Diag_FTM& phone, const char* file) {
+template <class Source>
+bool Serve(Diag_FTM& phone, const Source& source) {
   DownloadConnection connection(phone);
   connection.BeginWork();
   const auto progress = [&connection](uint64_t done, uint64_t total) {
     connection.Report(Saturated(done), Saturated(total));
     return !connection.aborted();
   };
-  return kivrat::DownloadFlashProgrammer(phone, file, progress, [&connection] { return connection.aborted(); });
+  return kivrat::DownloadFlashProgrammer(phone, source, progress, [&connection] { return connection.aborted(); });
+}
+
+}  // namespace
+
+bool ServeFlashProgrammer(Diag_FTM& phone, const char* file) {
+  return Serve(phone, std::string(file));
+}
+
+bool ServeFlashProgrammer(Diag_FTM& phone, const kivrat::Programmer& programmer) {
+  return Serve(phone, programmer);
 }
 
 FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const char* const> images,

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <span>
 
+#include "download/boot/kivrat.h"
 #include "frame/diag_ftm.h"
 #include "kral/download.h"
 #include "kral/kivrat.h"
@@ -22,6 +23,7 @@ FlashOutcome FlashAll(Diag_FTM& phone, const char* programmer, std::span<const c
 
 // The boot transfer's part of it, with the caller's progress and abort.
 bool ServeFlashProgrammer(Diag_FTM& phone, const char* file);
+bool ServeFlashProgrammer(Diag_FTM& phone, const kivrat::Programmer& programmer);
 
 }  // namespace kral::download
 

@@ -7,7 +7,9 @@
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <span>
 #include <string>
+#include <system_error>
 
 #include "frame/diag_ftm.h"
 
@@ -32,8 +34,17 @@ using Stop = std::function<bool()>;
 // ends the exchange with success, an empty identity, and itself still in command mode.
 bool Connect(Diag_FTM& phone, uint32_t& version, std::optional<uint32_t>* identity, const Stop& stop = {});
 
-// Serves the file to a target that Connect has left waiting. The port is given back, except when the file cannot be
-// opened: then nothing has happened yet.
+// What a flash programmer is made of, wherever it comes from.
+struct Programmer {
+  uint64_t size = 0;
+  // The bytes from there on: as many as there is room for, fewer only at the end.
+  std::function<std::error_code(uint64_t offset, std::span<uint8_t> room, size_t& count)> read;
+};
+
+// Serves it to a target that Connect has left waiting, and gives the port back.
+bool DownloadFlashProgrammer(Diag_FTM& phone, const Programmer& programmer, const Progress& progress = {},
+                             const Stop& stop = {});
+// The same with a file. When that cannot be opened the port stays borrowed: nothing has happened yet.
 bool DownloadFlashProgrammer(Diag_FTM& phone, const std::string& file_name, const Progress& progress = {},
                              const Stop& stop = {});
 

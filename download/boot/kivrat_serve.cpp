@@ -16,28 +16,21 @@ constexpr uint32_t kMostRequestsForNothing = 100;
 
 class Server {
  public:
-  Server(Diag_FTM& phone, const Progress& progress, const Stop& stop)
-      : phone_(phone), progress_(progress), port_(phone), packet_(kPacketBuffer), piece_(kPacketBuffer) {
+  Server(Diag_FTM& phone, const Programmer& programmer, const Progress& progress, const Stop& stop)
+      : phone_(phone),
+        programmer_(programmer),
+        progress_(progress),
+        port_(phone),
+        packet_(kPacketBuffer),
+        piece_(kPacketBuffer) {
     port_.SetReadTimeOut(phone.state<Settings>().read_time_out_ms);
     port_.SetStop(stop);
   }
 
-  bool Run(const std::string& file_name) {
-    if (!phone_.port_borrowed()) {
-      return Fail("Failed KivratInit()", Failure(KRAL_ERROR_ARGUMENT, "no boot loader has been connected to"));
-    }
-    if (const auto error = file_.Open(file_name)) {
-      phone_.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
-                             error.message().c_str());
-      kral::Fail(FileFailure(file_name, "cannot be opened").System(error));
-      port_.Keep();  // the target knows nothing of it and still waits: for a file of the right name
-      return false;
-    }
+  bool Run() {
     if (!port_.Open()) return Fail("Failed KivratInit()", port_.NotOpened());
-    if (progress_ && !progress_(0, file_.size())) return Abort();
-    if (!ServeRequests()) return false;
-    file_.Close();
-    return Finish();
+    if (progress_ && !progress_(0, programmer_.size)) return Abort();
+    return ServeRequests() && Finish();
   }
 
  private:
@@ -104,7 +97,7 @@ class Server {
     if (length == 0) return ServeNothing();
     requests_for_nothing_ = 0;
     size_t count = 0;
-    const auto error = file_.Read(std::span(piece_).first(length), count);
+    const auto error = programmer_.read(served_, std::span(piece_).first(length), count);
     if (error || count == 0) {
       phone_.log().WriteLine(kLogErr, "Kivrat: the file has no more than %llu bytes, %u are asked for at %u",
                              static_cast<unsigned long long>(served_), Field(request, kReadLengthAt),
@@ -129,7 +122,7 @@ class Server {
         Failure(KRAL_ERROR_LINK, "the boot loader asks for nothing, %u times in a row", requests_for_nothing_));
   }
 
-  bool GoesOn() { return !progress_ || progress_(served_, std::max(served_, file_.size())) || Abort(); }
+  bool GoesOn() { return !progress_ || progress_(served_, std::max(served_, programmer_.size)) || Abort(); }
 
   bool Finish() {
     if (const uint32_t delay = phone_.state<Settings>().pre_done_delay_ms) {
@@ -160,20 +153,41 @@ class Server {
   }
 
   Diag_FTM& phone_;
+  const Programmer& programmer_;
   const Progress& progress_;
   RawPort port_;
-  FileReader file_;
   uint64_t served_ = 0;
   uint32_t requests_for_nothing_ = 0;  // in a row
   std::vector<uint8_t> packet_;
   std::vector<uint8_t> piece_;
 };
 
+bool NoBootLoader(Diag_FTM& phone) {
+  phone.log().WriteLine(kLogErr, "%s", "Failed KivratInit()");
+  return kral::Fail(Failure(KRAL_ERROR_ARGUMENT, "no boot loader has been connected to"));
+}
+
 }  // namespace
+
+bool DownloadFlashProgrammer(Diag_FTM& phone, const Programmer& programmer, const Progress& progress,
+                             const Stop& stop) {
+  return phone.port_borrowed() ? Server(phone, programmer, progress, stop).Run() : NoBootLoader(phone);
+}
 
 bool DownloadFlashProgrammer(Diag_FTM& phone, const std::string& file_name, const Progress& progress,
                              const Stop& stop) {
-  return Server(phone, progress, stop).Run(file_name);
+  if (!phone.port_borrowed()) return NoBootLoader(phone);
+  FileReader file;
+  if (const auto error = file.Open(file_name)) {
+    phone.log().WriteLine(kLogErr, "Kivrat: the file %s cannot be opened: %s", file_name.c_str(),
+                          error.message().c_str());
+    // The target knows nothing of it and still waits: for a file of the right name.
+    return kral::Fail(FileFailure(file_name, "cannot be opened").System(error));
+  }
+  // Pieces are asked for in order.
+  const Programmer programmer{
+      file.size(), [&file](uint64_t, std::span<uint8_t> room, size_t& count) { return file.Read(room, count); }};
+  return DownloadFlashProgrammer(phone, programmer, progress, stop);
 }
 
 }  // namespace kral::kivrat

@@ -47,13 +47,13 @@ class MovedImage final : public PhoneImage {
   MovedImage(PhoneImage& image, uint32_t base) : image_(image), base_(base) {}
 
   void Clear() override { image_.Clear(); }
-  uint32_t GetBaseAddress(uint32_t) override { return base_; }
-  uint32_t GetTotalSize() override { return image_.GetTotalSize(); }
-  uint32_t GetSize(uint32_t region) override { return region == 0 ? image_.GetSize(0) : 0; }
-  uint32_t GetLastAddress(uint32_t region) override { return base_ + image_.GetLastAddress(region); }
-  uint32_t GetStartAddress() override { return image_.GetStartAddress(); }
+  uint32_t GetBaseAddress(uint32_t) const override { return base_; }
+  uint32_t GetTotalSize() const override { return image_.GetTotalSize(); }
+  uint32_t GetSize(uint32_t region) const override { return region == 0 ? image_.GetSize(0) : 0; }
+  uint32_t GetLastAddress(uint32_t region) const override { return base_ + image_.GetLastAddress(region); }
+  uint32_t GetStartAddress() const override { return image_.GetStartAddress(); }
   uint8_t* GetPointer(uint32_t offset) override { return image_.GetPointer(offset); }
-  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override {
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const override {
     try {
       image_.Read(address - base_, buffer, count, region);
     } catch (const PhoneImageException&) {
@@ -73,7 +73,7 @@ class MovedImage final : public PhoneImage {
  private:
   PhoneImage& image_;
   uint32_t base_;
-  bool read_failed_ = false;
+  mutable bool read_failed_ = false;
 };
 
 uint32_t NotWritten(const std::string& output, const std::error_code& error) {

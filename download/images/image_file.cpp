@@ -25,7 +25,7 @@ uint32_t FormatByContent(const std::string& path) {
   return hex ? KRAL_IMAGE_FORMAT_HEX : KRAL_IMAGE_FORMAT_BINARY;
 }
 
-uint32_t CountPayload(PhoneImage& image, uint32_t region) {
+uint32_t CountPayload(const PhoneImage& image, uint32_t region) {
   std::vector<uint8_t> piece(kPiece);
   const uint32_t base = image.GetBaseAddress(region);
   const uint32_t size = image.GetSize(region);
@@ -89,7 +89,7 @@ uint32_t ImageFile::OpenHex(const std::string& path) {
   return KRAL_STREAM_PAST_END;
 }
 
-uint32_t ImageFile::RefuseSecondRegion(const std::string& path) {
+uint32_t ImageFile::RefuseSecondRegion(const std::string& path) const {
   if (!has_second_region()) return KRAL_STREAM_WRITTEN;
   Fail(FileFailure(path, "has a second region at 0x08000000, which would be left out"));
   return KRAL_STREAM_BAD_IMAGE;

@@ -22,12 +22,13 @@ class ImageFile {
   uint32_t Open(const std::string& path, uint32_t format);
 
   PhoneImage& image() { return *image_; }
+  const PhoneImage& image() const { return *image_; }
   uint32_t format() const { return format_; }
   uint32_t regions() const { return format_ == KRAL_IMAGE_FORMAT_HEX ? KRAL_IMAGE_REGIONS : 1; }
   // Whether there are bytes that a download, or a binary file, would leave out.
-  bool has_second_region() { return regions() > 1 && image_->GetSize(1) != 0; }
+  bool has_second_region() const { return regions() > 1 && image_->GetSize(1) != 0; }
   // KRAL_STREAM_BAD_IMAGE, or 0.
-  uint32_t RefuseSecondRegion(const std::string& path);
+  uint32_t RefuseSecondRegion(const std::string& path) const;
   const HexLoss& loss() const { return loss_; }  // of a HEX file that could be decoded
 
  private:

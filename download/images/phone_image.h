@@ -53,7 +53,8 @@ class PhoneImageException : public std::exception {
 };
 
 // An image has up to two regions, 0 and 1; the second exists only for HEX files with a block at 0x08000000. Addresses
-// are those of the handset and wrap at 32 bits.
+// are those of the handset and wrap at 32 bits. What is const may be called by several threads at once: one image
+// serves many downloads.
 class PhoneImage {
  public:
   // The decoder, which may be null, is borrowed: it must outlive the image.
@@ -63,13 +64,13 @@ class PhoneImage {
   PhoneImage& operator=(const PhoneImage&) = delete;
 
   virtual void Clear() = 0;
-  virtual uint32_t GetBaseAddress(uint32_t region) = 0;
-  virtual uint32_t GetTotalSize() = 0;  // bytes of backing store
-  virtual uint32_t GetSize(uint32_t region) = 0;
-  virtual uint32_t GetLastAddress(uint32_t region) = 0;
-  virtual uint32_t GetStartAddress() = 0;
+  virtual uint32_t GetBaseAddress(uint32_t region) const = 0;
+  virtual uint32_t GetTotalSize() const = 0;  // bytes of backing store
+  virtual uint32_t GetSize(uint32_t region) const = 0;
+  virtual uint32_t GetLastAddress(uint32_t region) const = 0;
+  virtual uint32_t GetStartAddress() const = 0;
   virtual uint8_t* GetPointer(uint32_t offset) = 0;  // into the backing store
-  virtual void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) = 0;
+  virtual void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const = 0;
   virtual void SetBaseAddress(uint32_t value, uint32_t region) = 0;
   virtual void SetSize(uint32_t value, uint32_t region) = 0;
   virtual void SetStartAddress(uint32_t value) = 0;

@@ -26,26 +26,26 @@ void PhoneImageBinary::Clear() {
   throw PhoneImageException::WriteFailure(0, GetTotalSize());
 }
 
-uint32_t PhoneImageBinary::GetBaseAddress(uint32_t region) {
+uint32_t PhoneImageBinary::GetBaseAddress(uint32_t region) const {
   CheckRegion(region);
   return 0;  // the base that was set is kept but not reported
 }
 
-uint32_t PhoneImageBinary::GetTotalSize() {
+uint32_t PhoneImageBinary::GetTotalSize() const {
   return static_cast<uint32_t>(file_.Size());
 }
 
-uint32_t PhoneImageBinary::GetSize(uint32_t region) {
+uint32_t PhoneImageBinary::GetSize(uint32_t region) const {
   CheckRegion(region);
   return size_;
 }
 
-uint32_t PhoneImageBinary::GetLastAddress(uint32_t region) {
+uint32_t PhoneImageBinary::GetLastAddress(uint32_t region) const {
   CheckRegion(region);
   return GetTotalSize() - 1;  // of the file, whatever size was set
 }
 
-uint32_t PhoneImageBinary::GetStartAddress() {
+uint32_t PhoneImageBinary::GetStartAddress() const {
   return start_;
 }
 
@@ -54,7 +54,7 @@ uint8_t* PhoneImageBinary::GetPointer(uint32_t offset) {
   return file_.view() + offset;
 }
 
-void PhoneImageBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) {
+void PhoneImageBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const {
   CheckRegion(region);
   const bool inside = uint64_t{address} + count <= GetTotalSize();
   if (!inside || !file_.Copy(address, buffer, count)) throw PhoneImageException::ReadFailure(address, count);

@@ -22,13 +22,13 @@ class PhoneImageBinary final : public PhoneImage {
   uint32_t last_error() const { return file_.last_error(); }  // of the system
 
   void Clear() override;  // throws "Write Failure", as Write does
-  uint32_t GetBaseAddress(uint32_t region) override;
-  uint32_t GetTotalSize() override;
-  uint32_t GetSize(uint32_t region) override;
-  uint32_t GetLastAddress(uint32_t region) override;
-  uint32_t GetStartAddress() override;
+  uint32_t GetBaseAddress(uint32_t region) const override;
+  uint32_t GetTotalSize() const override;
+  uint32_t GetSize(uint32_t region) const override;
+  uint32_t GetLastAddress(uint32_t region) const override;
+  uint32_t GetStartAddress() const override;
   uint8_t* GetPointer(uint32_t offset) override;  // read-only memory
-  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const override;
   void SetBaseAddress(uint32_t value, uint32_t region) override;
   void SetSize(uint32_t value, uint32_t region) override;
   void SetStartAddress(uint32_t value) override;

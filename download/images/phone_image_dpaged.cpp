@@ -1,6 +1,8 @@
 // Regions and bounds of the sparse image; the bytes are CDemandPagedMemory's.
 #include "download/images/phone_image_dpaged.h"
 
+#include <utility>
+
 namespace kral::images {
 
 PhoneImageDPaged::PhoneImageDPaged(uint32_t maximum_kib, PhoneImageDecoder* decoder) : PhoneImage(decoder) {
@@ -12,23 +14,23 @@ void PhoneImageDPaged::Clear() {
   memory_.Clear();
 }
 
-uint32_t PhoneImageDPaged::GetBaseAddress(uint32_t region) {
+uint32_t PhoneImageDPaged::GetBaseAddress(uint32_t region) const {
   return At(region).base;
 }
 
-uint32_t PhoneImageDPaged::GetTotalSize() {
+uint32_t PhoneImageDPaged::GetTotalSize() const {
   return memory_.reserved();
 }
 
-uint32_t PhoneImageDPaged::GetSize(uint32_t region) {
+uint32_t PhoneImageDPaged::GetSize(uint32_t region) const {
   return At(region).size;
 }
 
-uint32_t PhoneImageDPaged::GetLastAddress(uint32_t region) {
+uint32_t PhoneImageDPaged::GetLastAddress(uint32_t region) const {
   return At(region).base + At(region).size - 1;
 }
 
-uint32_t PhoneImageDPaged::GetStartAddress() {
+uint32_t PhoneImageDPaged::GetStartAddress() const {
   return start_;
 }
 
@@ -37,7 +39,7 @@ uint8_t* PhoneImageDPaged::GetPointer(uint32_t offset) {
   return memory_.GetPointer(offset);
 }
 
-void PhoneImageDPaged::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) {
+void PhoneImageDPaged::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const {
   const uint32_t offset = OffsetOf(address, region);
   if (!Fits(offset, count)) throw PhoneImageException::ReadFailure(offset, count);
   memory_.Read(offset, buffer, count);
@@ -67,12 +69,16 @@ void PhoneImageDPaged::Write(uint32_t address, const void* data, uint32_t count,
   memory_.Write(offset, data, count);
 }
 
-PhoneImageDPaged::Region& PhoneImageDPaged::At(uint32_t region) {
+const PhoneImageDPaged::Region& PhoneImageDPaged::At(uint32_t region) const {
   if (region >= regions_.size()) throw PhoneImageException::ReadFailure(region, 0);
   return regions_[region];
 }
 
-uint32_t PhoneImageDPaged::OffsetOf(uint32_t address, uint32_t region) {
+PhoneImageDPaged::Region& PhoneImageDPaged::At(uint32_t region) {
+  return const_cast<Region&>(std::as_const(*this).At(region));
+}
+
+uint32_t PhoneImageDPaged::OffsetOf(uint32_t address, uint32_t region) const {
   const uint32_t offset = address - At(region).base;
   return region == 1 ? offset + regions_[0].size : offset;
 }

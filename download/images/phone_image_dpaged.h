@@ -18,13 +18,13 @@ class PhoneImageDPaged final : public PhoneImage {
   PhoneImageDPaged(uint32_t maximum_kib, PhoneImageDecoder* decoder);
 
   void Clear() override;
-  uint32_t GetBaseAddress(uint32_t region) override;
-  uint32_t GetTotalSize() override;
-  uint32_t GetSize(uint32_t region) override;
-  uint32_t GetLastAddress(uint32_t region) override;
-  uint32_t GetStartAddress() override;
+  uint32_t GetBaseAddress(uint32_t region) const override;
+  uint32_t GetTotalSize() const override;
+  uint32_t GetSize(uint32_t region) const override;
+  uint32_t GetLastAddress(uint32_t region) const override;
+  uint32_t GetStartAddress() const override;
   uint8_t* GetPointer(uint32_t offset) override;
-  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const override;
   void SetBaseAddress(uint32_t value, uint32_t region) override;
   void SetSize(uint32_t value, uint32_t region) override;
   void SetStartAddress(uint32_t value) override;
@@ -39,7 +39,8 @@ class PhoneImageDPaged final : public PhoneImage {
   };
 
   Region& At(uint32_t region);
-  uint32_t OffsetOf(uint32_t address, uint32_t region);
+  const Region& At(uint32_t region) const;
+  uint32_t OffsetOf(uint32_t address, uint32_t region) const;
   bool Fits(uint32_t offset, uint32_t count) const;
 
   CDemandPagedMemory memory_;

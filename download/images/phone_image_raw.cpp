@@ -20,12 +20,12 @@ uint8_t* PhoneImageRaw::GetPointer(uint32_t offset) {
   return buffer_ + offset;
 }
 
-void PhoneImageRawBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t) {
+void PhoneImageRawBinary::Read(uint32_t address, void* buffer, uint32_t count, uint32_t) const {
   if (count > length_) throw PhoneImageException::Unnamed(address, count);
   if (count != 0) std::memcpy(buffer, buffer_, count);
 }
 
-void PhoneImageRawBuffer::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) {
+void PhoneImageRawBuffer::Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const {
   if (region != 0 || uint64_t{address} + count > length_) throw PhoneImageException::ReadFailure(address, count);
   if (count != 0) std::memcpy(buffer, buffer_ + address, count);
 }

@@ -18,11 +18,11 @@ class PhoneImageRaw : public PhoneImage {
   bool SetData(const void* data, uint32_t length);
 
   void Clear() override {}
-  uint32_t GetBaseAddress(uint32_t) override { return 0; }
-  uint32_t GetTotalSize() override { return length_; }
-  uint32_t GetSize(uint32_t) override { return length_; }
-  uint32_t GetLastAddress(uint32_t) override { return 0; }
-  uint32_t GetStartAddress() override { return 0; }
+  uint32_t GetBaseAddress(uint32_t) const override { return 0; }
+  uint32_t GetTotalSize() const override { return length_; }
+  uint32_t GetSize(uint32_t) const override { return length_; }
+  uint32_t GetLastAddress(uint32_t) const override { return 0; }
+  uint32_t GetStartAddress() const override { return 0; }
   uint8_t* GetPointer(uint32_t offset) override;
   void SetBaseAddress(uint32_t, uint32_t) override {}
   void SetSize(uint32_t, uint32_t) override {}
@@ -38,14 +38,14 @@ class PhoneImageRaw : public PhoneImage {
 class PhoneImageRawBinary final : public PhoneImageRaw {
  public:
   using PhoneImageRaw::PhoneImageRaw;
-  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const override;
 };
 
 // Honours the address; region 0 only.
 class PhoneImageRawBuffer final : public PhoneImageRaw {
  public:
   using PhoneImageRaw::PhoneImageRaw;
-  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) override;
+  void Read(uint32_t address, void* buffer, uint32_t count, uint32_t region) const override;
 };
 
 }  // namespace kral::images

@@ -6,6 +6,8 @@
 #include <span>
 #include <string>
 
+#include "download/images/hex_phone_image_decoder.h"
+#include "download/images/phone_image_dpaged.h"
 #include "download/link/download_connection.h"
 
 namespace kral::kova {
@@ -20,8 +22,25 @@ bool SoftwareVersion(download::DownloadConnection& connection, uint8_t& version)
 // The bytes that a write carries when the caller's packets have so many.
 uint32_t ChunkSize(uint32_t maximum_packet);
 
+// A flash programmer as an Intel HEX file has it. Once open it can be loaded into many handsets at the same time.
+class ProgrammerFile {
+ public:
+  // Gives KRAL_KOVA_FILE_..., ..._DATA_LOST or 0, with the failure noted. May throw what images throw.
+  uint32_t Open(const std::string& path);
+  const std::string& path() const { return path_; }
+  const images::PhoneImage& image() const { return image_; }
+  const images::HexLoss& loss() const { return decoder_.loss(); }
+
+ private:
+  static constexpr uint32_t kMaximumKib = 500;
+
+  std::string path_;
+  images::HexPhoneImageDecoder decoder_{true, true, true};
+  images::PhoneImageDPaged image_{kMaximumKib, &decoder_};
+};
+
 // Gives KRAL_KOVA_... or KRAL_DOWNLOAD_ABORTED.
-uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const std::string& file,
+uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const ProgrammerFile& programmer,
                              uint32_t maximum_packet);
 
 }  // namespace kral::kova

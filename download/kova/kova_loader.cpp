@@ -3,7 +3,6 @@
 #include <vector>
 
 #include "download/images/image_file.h"
-#include "download/images/phone_image_dpaged.h"
 #include "download/kova/kova.h"
 #include "download/kova/kova_format.h"
 #include "download/link/download_failure.h"
@@ -12,10 +11,8 @@
 namespace kral::kova {
 namespace {
 
-constexpr uint32_t kMaximumKib = 500;
-
 // From the start address on, not from the base: the programmer's entry point is its lowest address. Required.
-bool SendImage(download::DownloadConnection& connection, images::PhoneImage& image, uint32_t chunk_size) {
+bool SendImage(download::DownloadConnection& connection, const images::PhoneImage& image, uint32_t chunk_size) {
   const uint32_t start = image.GetStartAddress();
   const uint32_t size = image.GetSize(0);
   std::vector<uint8_t> chunk(chunk_size);
@@ -41,33 +38,33 @@ uint32_t ChunkSize(uint32_t maximum_packet) {
   return maximum_packet < kAmplePacket ? maximum_packet / 2 : kMostWriteData;
 }
 
-uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const std::string& file,
-                             uint32_t maximum_packet) {
-  auto& log = connection.log();
-  images::HexPhoneImageDecoder decoder(true, true, true);
-  images::PhoneImageDPaged image(kMaximumKib, &decoder);
+uint32_t ProgrammerFile::Open(const std::string& path) {
+  path_ = path;
   images::TextFile text;
-  if (!text.OpenForReading(file)) {
-    Fail(download::NotOpened(file));
+  if (!text.OpenForReading(path)) {
+    Fail(download::NotOpened(path));
     return KRAL_KOVA_FILE_NOT_OPENED;
   }
-  if (!decoder.Decode(image, text)) {
-    Fail(images::NotDecoded(file, decoder.fault()));
+  if (!decoder_.Decode(image_, text)) {
+    Fail(images::NotDecoded(path, decoder_.fault()));
     return KRAL_KOVA_FILE_NOT_DECODED;
   }
-  if (decoder.loss().bytes != 0) {
-    Fail(images::DataLost(file, decoder.loss()));
-    images::LogLoss(log, file, decoder.loss());
-    return KRAL_KOVA_DATA_LOST;
-  }
+  if (decoder_.loss().bytes == 0) return KRAL_KOVA_LOADED;
+  Fail(images::DataLost(path, decoder_.loss()));
+  return KRAL_KOVA_DATA_LOST;
+}
 
+uint32_t LoadFlashProgrammer(download::DownloadConnection& connection, const ProgrammerFile& programmer,
+                             uint32_t maximum_packet) {
+  auto& log = connection.log();
+  const images::PhoneImage& image = programmer.image();
   const bool sent = SendImage(connection, image, ChunkSize(maximum_packet));
   if (connection.aborted()) return download::Aborted();
   if (!sent) {
     log.WriteLine(kLogErr, "image load failed");
     return KRAL_KOVA_WRITE_FAILED;
   }
-  log.WriteLine(kLogRet, "Flash programmer %s loaded, sending GO", file.c_str());
+  log.WriteLine(kLogRet, "Flash programmer %s loaded, sending GO", programmer.path().c_str());
   if (!Go(connection, image.GetStartAddress())) {
     log.WriteLine(kLogErr, "GO failed");
     return KRAL_KOVA_GO_FAILED;

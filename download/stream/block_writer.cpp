@@ -27,8 +27,9 @@ Failure NotAcknowledged(const std::optional<DownloadAgent::OtherReply>& reply, u
 
 }  // namespace
 
-BlockWriter::BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent, images::PhoneImage& image,
-                         CImageWriteCmd& command, uint32_t block_size, uint32_t time_out_ms)
+BlockWriter::BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent,
+                         const images::PhoneImage& image, CImageWriteCmd& command, uint32_t block_size,
+                         uint32_t time_out_ms)
     : connection_(connection),
       agent_(agent),
       image_(image),

@@ -16,7 +16,7 @@ namespace kral::stream {
 class BlockWriter {
  public:
   // Everything is borrowed for the length of one image.
-  BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent, images::PhoneImage& image,
+  BlockWriter(download::DownloadConnection& connection, DownloadAgent& agent, const images::PhoneImage& image,
               CImageWriteCmd& command, uint32_t block_size, uint32_t time_out_ms);
 
   // Until the agent has nothing left, `total` bytes. False when the pipeline broke.
@@ -34,7 +34,7 @@ class BlockWriter {
 
   download::DownloadConnection& connection_;
   DownloadAgent& agent_;
-  images::PhoneImage& image_;
+  const images::PhoneImage& image_;
   CImageWriteCmd& command_;
   const uint32_t time_out_ms_;
   std::vector<uint8_t> buffer_;  // one block

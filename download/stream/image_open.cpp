@@ -66,7 +66,7 @@ bool CImageOpen::Close() {
   return true;
 }
 
-bool CImageOpenFramed::OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested,
+bool CImageOpenFramed::OpenMulti(uint8_t type, const images::PhoneImage* header, const WriteLimits& requested,
                                  WriteLimits& limits) {
   std::vector<uint8_t> request = {kOpen, type};
   if (header != nullptr) {
@@ -90,7 +90,7 @@ bool CImageOpenFramed::OpenMulti(uint8_t type, images::PhoneImage* header, const
   return true;
 }
 
-bool CImageOpenNOR::OpenMulti(uint8_t, images::PhoneImage*, const WriteLimits& requested, WriteLimits& limits) {
+bool CImageOpenNOR::OpenMulti(uint8_t, const images::PhoneImage*, const WriteLimits& requested, WriteLimits& limits) {
   limits = Limited(requested);
   return true;
 }

@@ -29,7 +29,7 @@ class CImageOpen {
   virtual bool Prepare() { return false; }
 
   // `header` may be null. The limits are those asked for, as far as they can be had.
-  virtual bool OpenMulti(uint8_t, images::PhoneImage*, const WriteLimits&, WriteLimits&) { return false; }
+  virtual bool OpenMulti(uint8_t, const images::PhoneImage*, const WriteLimits&, WriteLimits&) { return false; }
   virtual bool Close();
 
  protected:
@@ -43,14 +43,16 @@ class CImageOpen {
 class CImageOpenFramed final : public CImageOpen {
  public:
   using CImageOpen::CImageOpen;
-  bool OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
+  bool OpenMulti(uint8_t type, const images::PhoneImage* header, const WriteLimits& requested,
+                 WriteLimits& limits) override;
 };
 
 // For a programmer that takes one image and wants neither an opening nor a closing packet.
 class CImageOpenNOR final : public CImageOpen {
  public:
   using CImageOpen::CImageOpen;
-  bool OpenMulti(uint8_t type, images::PhoneImage* header, const WriteLimits& requested, WriteLimits& limits) override;
+  bool OpenMulti(uint8_t type, const images::PhoneImage* header, const WriteLimits& requested,
+                 WriteLimits& limits) override;
   bool Close() override { return true; }
 };
 

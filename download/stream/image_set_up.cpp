@@ -44,23 +44,22 @@ bool CImageSecMode::Send(uint8_t mode) {
   return bool(connection_.Exchange(request, kSecurityModeReply, time_out_ms_));
 }
 
-bool CImagePartition::Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status) {
-  auto& log = connection_.log();
-  std::vector<uint8_t> table;
-  if (const auto error = ReadWholeFile(table_file, kPartitionTableSize, table)) {
-    if (error == std::errc::file_too_large) {
-      Fail(FileFailure(table_file, "has more than the 512 bytes of a partition table"));
-      log.WriteLine(kLogErr, "partition : file exceeds 512 bytes");
-    } else {
-      Fail(FileFailure(table_file, "cannot be opened").System(error));
-      log.WriteLine(kLogErr, "partition : failed to open file %s", table_file.c_str());
-    }
-    return false;
+bool ReadPartitionTable(DataLogFileHandler& log, const std::string& file, std::vector<uint8_t>& table) {
+  const auto error = ReadWholeFile(file, kPartitionTableSize, table);
+  if (!error) return true;
+  if (error == std::errc::file_too_large) {
+    log.WriteLine(kLogErr, "partition : file exceeds 512 bytes");
+    return Fail(FileFailure(file, "has more than the 512 bytes of a partition table"));
   }
+  log.WriteLine(kLogErr, "partition : failed to open file %s", file.c_str());
+  return Fail(FileFailure(file, "cannot be opened").System(error));
+}
+
+bool CImagePartition::Send(std::span<const uint8_t> table, bool override_table, std::optional<uint8_t>& status) {
   std::vector<uint8_t> request(2 + kPartitionTableSize);
   request[0] = kPartitionTable;
   request[1] = override_table ? 1 : 0;
-  std::copy(table.begin(), table.end(), request.begin() + 2);
+  std::copy_n(table.begin(), std::min<size_t>(table.size(), kPartitionTableSize), request.begin() + 2);
   const Reply reply = connection_.Exchange(request, kPartitionTableReply, time_out_ms_);
   if (!reply) return false;
   if (reply.bytes().size() != kStatusReplySize) {
@@ -68,7 +67,7 @@ bool CImagePartition::Send(const std::string& table_file, bool override_table, s
   }
   status = reply.bytes()[kStatusAt];
   if (*status == kStatusDone) return true;
-  LogRefusal(log, *status);
+  LogRefusal(connection_.log(), *status);
   return Fail(Refusal(*status));
 }
 

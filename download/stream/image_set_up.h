@@ -4,7 +4,9 @@
 
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string>
+#include <vector>
 
 #include "download/link/download_connection.h"
 
@@ -21,12 +23,15 @@ class CImageSecMode {
   const uint32_t time_out_ms_;
 };
 
+// Of at most 512 bytes; what is wrong with the file is logged and noted.
+bool ReadPartitionTable(DataLogFileHandler& log, const std::string& file, std::vector<uint8_t>& table);
+
 class CImagePartition {
  public:
   CImagePartition(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
   // `status` is set when the handset answered.
-  bool Send(const std::string& table_file, bool override_table, std::optional<uint8_t>& status);
+  bool Send(std::span<const uint8_t> table, bool override_table, std::optional<uint8_t>& status);
 
  private:
   download::DownloadConnection& connection_;

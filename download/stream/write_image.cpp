@@ -39,7 +39,7 @@ CWriteImageFramed::CWriteImageFramed(download::DownloadConnection& connection)
 CWriteNORImageFramed::CWriteNORImageFramed(download::DownloadConnection& connection)
     : CWriteImage(connection, std::make_unique<CImageOpenNOR>(connection, connection.time_out_ms())) {}
 
-WriteOutcome CWriteImage::Write(images::PhoneImage& image, uint8_t type, images::PhoneImage* header,
+WriteOutcome CWriteImage::Write(const images::PhoneImage& image, uint8_t type, const images::PhoneImage* header,
                                 const WriteLimits& requested) {
   const uint32_t size = image.GetSize(0);
   WriteLimits limits;
@@ -56,7 +56,7 @@ WriteOutcome CWriteImage::Write(images::PhoneImage& image, uint8_t type, images:
   return opener_->Close() ? WriteOutcome::kDone : WriteOutcome::kNotClosed;
 }
 
-WriteOutcome CWriteImage::Stream(images::PhoneImage& image, uint32_t size, const WriteLimits& limits) {
+WriteOutcome CWriteImage::Stream(const images::PhoneImage& image, uint32_t size, const WriteLimits& limits) {
   const auto replies = std::make_shared<CImageWriteRspFramed>(connection_);
   DownloadAgent& agent = replies->agent();
   agent.Start(limits.window);
@@ -87,7 +87,7 @@ WriteOutcome CWriteImage::Stream(images::PhoneImage& image, uint32_t size, const
   return Failed(WriteOutcome::kThreadNotStopped, "failed to stop the write response thread\n");
 }
 
-bool CWriteImage::WriteLoop(images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies) {
+bool CWriteImage::WriteLoop(const images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies) {
   connection_.log().WriteLine(kLogRet, "Streaming start max write %u, window size %u\n", limits.block_size,
                               limits.window);
   CImageWriteCmdFramed command(connection_, time_out_ms_);

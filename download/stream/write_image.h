@@ -30,14 +30,15 @@ class CWriteImage {
   virtual ~CWriteImage() = default;
 
   // Region 0 of the image. `header` may be null. Throws what the images throw.
-  WriteOutcome Write(images::PhoneImage& image, uint8_t type, images::PhoneImage* header, const WriteLimits& requested);
+  WriteOutcome Write(const images::PhoneImage& image, uint8_t type, const images::PhoneImage* header,
+                     const WriteLimits& requested);
 
  protected:
   CWriteImage(download::DownloadConnection& connection, std::unique_ptr<CImageOpen> opener);
 
  private:
-  WriteOutcome Stream(images::PhoneImage& image, uint32_t size, const WriteLimits& limits);
-  bool WriteLoop(images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies);
+  WriteOutcome Stream(const images::PhoneImage& image, uint32_t size, const WriteLimits& limits);
+  bool WriteLoop(const images::PhoneImage& image, const WriteLimits& limits, CImageWriteRsp& replies);
   WriteOutcome Failed(WriteOutcome outcome, const char* text);
 
   download::DownloadConnection& connection_;
