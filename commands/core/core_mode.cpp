@@ -1,4 +1,5 @@
 // Switches the handset's operating mode, waits as each mode needs, and reads the mode back.
+#include <algorithm>
 #include <optional>
 
 #include "commands/core/core_diag.h"
@@ -11,6 +12,20 @@ namespace kral::diag {
 namespace {
 
 constexpr uint32_t kPollIntervalMs = 100;
+
+// By whoever has these requests for a part of its work.
+bool IsAborted(Diag_FTM& phone) {
+  return !phone.server_mode() && phone.transport().aborted();
+}
+
+void Pause(Diag_FTM& phone, uint32_t milliseconds) {
+  constexpr uint32_t kLookAroundMs = 50;
+  while (milliseconds > 0 && !IsAborted(phone)) {
+    const uint32_t piece = std::min(milliseconds, kLookAroundMs);
+    phone.clock().SleepMs(piece);
+    milliseconds -= piece;
+  }
+}
 
 // The delay that follows a switch, with its log lines.
 struct SwitchDelay {
@@ -29,7 +44,7 @@ void WaitAfterSwitch(Diag_FTM& phone, const SwitchDelay& delay) {
   }
   phone.log().WriteLine(kLogRet, "KRAL_DIAG_CONTROL_F() -- post-%s-mode-switch delay is %dms.", delay.name,
                         static_cast<int>(milliseconds));
-  phone.clock().SleepMs(milliseconds);
+  Pause(phone, milliseconds);
 }
 
 bool HasReached(uint16_t mode, uint32_t state) {
@@ -64,12 +79,12 @@ bool PollMode(Diag_FTM& phone, uint16_t mode, uint32_t total) {
     if (answered) told = state;
     const bool reached = answered && HasReached(mode, state);
     const uint32_t used = phone.clock().TickMs() - start;
-    const bool is_gone = phone.device_gone();
-    if (reached || is_gone || used >= total) {
+    const bool is_over = IsAborted(phone) || phone.device_gone();
+    if (reached || is_over || used >= total) {
       phone.log().WriteLine(
           kLogRet, "DIAG_CONTROL_F -- mode switching status polling has %s (time used = %d, total timeout = %d) ms.",
           reached ? "succeeded" : "timeout", static_cast<int>(used), static_cast<int>(total));
-      if (!reached && told && !is_gone) Fail(NotReached(mode, *told, total));  // else the last request has said why
+      if (!reached && told && !is_over) Fail(NotReached(mode, *told, total));  // else the last request has said why
       return reached;
     }
     phone.clock().SleepMs(kPollIntervalMs);
@@ -82,7 +97,7 @@ bool ReadBack(Diag_FTM& phone, uint16_t mode, bool sent) {
                         static_cast<int>(total));
   if (phone.state<ftm::Settings>().command_code != kSubsystemDispatch) {
     // Handsets of the legacy FTM command cannot be asked for their mode.
-    phone.clock().SleepMs(total);
+    Pause(phone, total);
     phone.log().WriteLine(
         kLogRet,
         "DIAG_CONTROL_F -- mode switching status polling skipped with FTM_COMMAND_59; did an extra sleep with %d ms",

@@ -142,7 +142,7 @@ uint32_t Backup(Diag_FTM& phone, const std::string& path) {
     return status;
   }
   const pkv::PkvOutcome outcome = pkv::WritePkv(path, set, &phone.log());
-  if (!outcome.done()) NoteFile(phone, outcome);
+  if (!outcome.done()) NoteFile(phone.log(), outcome);
   return outcome.done() ? status : StatusOf(outcome.result);
 }
 

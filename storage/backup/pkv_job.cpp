@@ -96,19 +96,23 @@ uint32_t StatusOf(pkv::PkvResult result) {
   return KRAL_PKV_STATUS_CANNOT_OPEN;
 }
 
-void NoteFile(Diag_FTM& phone, const pkv::PkvOutcome& outcome) {
-  phone.log().WriteLine(kLogErr, "%s", outcome.text.c_str());
+void NoteFile(DataLogFileHandler& log, const pkv::PkvOutcome& outcome) {
+  log.WriteLine(kLogErr, "%s", outcome.text.c_str());
   Fail(Failure(KRAL_ERROR_BAD_FILE, "%s", outcome.text.c_str())
            .Status(KRAL_ERROR_STATUS_RESULT, StatusOf(outcome.result)));
 }
 
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, pkv::PkvSet& set) {
   phone.state<Settings>().counts = {};
+  return ReadSet(phone.log(), path, set);
+}
+
+uint32_t ReadSet(DataLogFileHandler& log, const std::string& path, pkv::PkvSet& set) {
   const pkv::PkvOutcome outcome = pkv::ReadPkv(path, set);
-  if (!outcome.done()) NoteFile(phone, outcome);
-  pkv::LogUnread(phone.log(), path, set);
+  if (!outcome.done()) NoteFile(log, outcome);
+  pkv::LogUnread(log, path, set);
   if (!outcome.done() || !set.items.empty() || !set.files.empty()) return StatusOf(outcome.result);
-  phone.log().WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
+  log.WriteLine(kLogErr, "%s: holds no item and no file", path.c_str());
   Fail(FileFailure(path, "holds no item and no file").Status(KRAL_ERROR_STATUS_RESULT, KRAL_PKV_STATUS_BAD_ITEM));
   return KRAL_PKV_STATUS_BAD_ITEM;
 }

@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <optional>
 #include <set>
@@ -30,6 +31,14 @@ struct Settings {
 uint32_t Backup(Diag_FTM& phone, const std::string& path);   // pkv_backup.cpp
 uint32_t Restore(Diag_FTM& phone, const std::string& path);  // pkv_restore.cpp
 uint32_t Verify(Diag_FTM& phone, const std::string& path);   // pkv_verify.cpp
+
+// With a set that has been read already, for this handset and others at the same time.
+uint32_t Restore(Diag_FTM& phone, const pkv::PkvSet& set);
+uint32_t Verify(Diag_FTM& phone, const pkv::PkvSet& set);
+
+// One of these as a whole: refused while another one of the handset runs, and judged at its end, by the name of the
+// file. True when the status is 0.
+bool Run(Diag_FTM& phone, const std::string& file, const std::function<uint32_t()>& job, uint32_t* status);
 
 bool ConfigureBackup(Diag_FTM& phone, uint16_t first_item, uint16_t last_item, uint16_t subscriptions);
 
@@ -62,9 +71,10 @@ class JobReport {
 };
 
 // What is wrong with a file is logged, and noted as the failure.
-void NoteFile(Diag_FTM& phone, const pkv::PkvOutcome& outcome);
+void NoteFile(DataLogFileHandler& log, const pkv::PkvOutcome& outcome);
 // Reads the file of a restore or a comparison.
 uint32_t ReadSet(Diag_FTM& phone, const std::string& path, pkv::PkvSet& set);
+uint32_t ReadSet(DataLogFileHandler& log, const std::string& path, pkv::PkvSet& set);
 uint32_t StatusOf(pkv::PkvResult result);
 
 // The highest element (0: no array) by id, of the items that are defined for the handset's NV tool.

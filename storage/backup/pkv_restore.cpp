@@ -144,4 +144,9 @@ uint32_t Restore(Diag_FTM& phone, const std::string& path) {
   return RestoreJob(phone, aborts, set).Run();
 }
 
+uint32_t Restore(Diag_FTM& phone, const pkv::PkvSet& set) {
+  const efs::AbortableJob aborts(phone);
+  return RestoreJob(phone, aborts, set).Run();
+}
+
 }  // namespace kral::backup

@@ -77,4 +77,9 @@ uint32_t Verify(Diag_FTM& phone, const std::string& path) {
   return VerifyJob(phone, aborts, set).Run();
 }
 
+uint32_t Verify(Diag_FTM& phone, const pkv::PkvSet& set) {
+  const efs::AbortableJob aborts(phone);
+  return VerifyJob(phone, aborts, set).Run();
+}
+
 }  // namespace kral::backup

@@ -79,6 +79,7 @@ class CKralThreadInterface {
   // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
   // handset that is only slow may answer for a moment still. The port stays open. Returns the former one.
   const std::atomic<bool>* SetAbort(const std::atomic<bool>* abort) { return std::exchange(abort_, abort); }
+  bool aborted() const { return abort_ != nullptr && abort_->load(); }
   // Is given what comes between two requests and is dropped, FCS bytes included; empty: nobody.
   void SetForgotten(std::function<void(std::span<const uint8_t>)> forgotten) { forgotten_ = std::move(forgotten); }
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
