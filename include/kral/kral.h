@@ -68,5 +68,6 @@
 #include "kral/pkv.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"
+#include "kral/ventrims.h"
 
 #endif

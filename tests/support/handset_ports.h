@@ -47,6 +47,11 @@ class HandsetPorts {
     const std::lock_guard lock(state_->mutex);
     state_->handsets.erase(port);
   }
+  // Another program has the port from now on.
+  void Occupy(uint16_t port) {
+    const std::lock_guard lock(state_->mutex);
+    state_->open.insert(port);
+  }
   void SetCanList(bool can) {
     const std::lock_guard lock(state_->mutex);
     state_->can_list = can;

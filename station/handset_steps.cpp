@@ -1,0 +1,167 @@
+// The steps of a job on one handset, each with the operation of the family it belongs to.
+#include <algorithm>
+
+#include "base/at_exit.h"
+#include "commands/core/core_diag.h"
+#include "download/boot/kivrat.h"
+#include "download/download_client.h"
+#include "download/flash_all.h"
+#include "kral/diag.h"
+#include "station/handset_worker.h"
+#include "storage/backup/pkv_jobs.h"
+#include "storage/items/phone_identity.h"
+
+namespace kral::station {
+namespace {
+
+constexpr uint32_t kPauseMs = 100;
+constexpr uint32_t kFirstPatienceMs = 200;
+constexpr uint32_t kAmplePacket = 8178;  // so the loader gets the largest writes
+
+kivrat::Programmer AsProgrammer(const CMapFileToMemory& file) {
+  return {file.Size(), [&file](uint64_t offset, std::span<uint8_t> room, size_t& count) {
+            count = static_cast<size_t>(std::min<uint64_t>(room.size(), file.Size() - std::min(offset, file.Size())));
+            return file.Copy(offset, room.data(), count) ? std::error_code()
+                                                         : std::make_error_code(std::errc::io_error);
+          }};
+}
+
+}  // namespace
+
+bool HandsetWorker::Do(const Step& step) {
+  switch (step.kind) {
+    case StepKind::kIdentity:
+      return AwaitDiagnostics(phone_.TimeOut(kTimeOutDefaultCommand)) && ReadIdentity(step.asked_for);
+    case StepKind::kEnterLoader:
+      return EnterLoader();
+    case StepKind::kProgrammer:
+      return StartProgrammer(step) && Greet();
+    case StepKind::kPartitionTable:
+      return Greet() && download::SendPartitionTable(phone_, *step.table, step.number != 0 ? 1 : 0, nullptr);
+    case StepKind::kImage:
+      return Greet() && WriteImage(step);
+    case StepKind::kReset:
+      return Restart();
+    case StepKind::kMode:
+      return SetMode(step.number);
+    case StepKind::kRestore:
+      return backup::Run(
+          phone_, step.file, [&] { return backup::Restore(phone_, *step.set); }, nullptr);
+    case StepKind::kVerify:
+      return backup::Run(
+          phone_, step.file, [&] { return backup::Verify(phone_, *step.set); }, nullptr);
+  }
+  return false;
+}
+
+// Where the identity is only taken along, a handset that does not know a request may be a good one; one that is gone
+// is not.
+bool HandsetWorker::ReadIdentity(bool whole) {
+  pkv::PkvProperties properties;
+  items::AppendIdentity(phone_, properties);
+  const auto value = [&properties](std::string_view name) {
+    for (const auto& [key, text] : properties.values) {
+      if (key == name) return text;
+    }
+    return std::string();
+  };
+  const std::string serial = value("ESN");
+  const std::string revision = value("SoftwareRevision");
+  handset_.SetIdentity(value("Model"), revision, serial);
+  if (!serial.empty() && !revision.empty()) return true;
+  return !whole && failure_->record().code != KRAL_ERROR_LOST && failure_->record().code != KRAL_ERROR_NO_ANSWER;
+}
+
+// A handset may change over without an answer, and its port with it: what comes next shows whether it has.
+bool HandsetWorker::EnterLoader() {
+  const Reply reply = diag::EnterDownload(phone_);
+  if (!reply && reply.kind() != ReplyKind::kNone && reply.kind() != ReplyKind::kGone && !reply.not_sent()) return false;
+  const auto programmer =
+      std::find_if(plan_.begin(), plan_.end(), [](const Step& step) { return step.kind == StepKind::kProgrammer; });
+  return programmer->number == KRAL_VENTRIMS_PROGRAMMER_BOOT || AwaitLoader(options_.start_ms);
+}
+
+bool HandsetWorker::StartProgrammer(const Step& step) {
+  if (programmer_started_) return true;
+  programmer_started_ =
+      step.hex ? download::LoadProgrammer(phone_, *step.hex, kAmplePacket, nullptr) : BootTransfer(step);
+  return programmer_started_;
+}
+
+bool HandsetWorker::BootTransfer(const Step& step) {
+  kivrat::Settings& settings = phone_.state<kivrat::Settings>();
+  const uint32_t retries = settings.hello_retries;
+  settings.hello_retries = UINT32_MAX;
+  const AtExit set_back([&] { settings.hello_retries = retries; });
+  const uint32_t start = Now();
+  const auto is_late = [&] { return Now() - start >= options_.start_ms; };
+  uint32_t version = 0;
+  if (!kivrat::Connect(phone_, version, nullptr, [&] { return stopped() || is_late(); })) {
+    if (stopped() || !is_late()) return false;
+    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the boot loader on COM%d said no hello within %u ms", phone_.port(),
+                        options_.start_ms));
+  }
+  if (download::ServeFlashProgrammer(phone_, AsProgrammer(*step.boot))) return true;
+  phone_.GiveBackPort();
+  return false;
+}
+
+bool HandsetWorker::Greet() {
+  if (greeted_) return true;
+  greeted_ = download::StreamHello(phone_, KRAL_STREAM_HELLO_VARIANT, &block_size_, &window_);
+  if (options_.block_size != 0) block_size_ = std::min(block_size_, options_.block_size);
+  return greeted_;
+}
+
+bool HandsetWorker::WriteImage(const Step& step) {
+  const download::WriteArguments arguments{step.image_type, step.method, block_size_, window_};
+  const images::PhoneImage* const header = step.image->has_header ? &step.image->header.image() : nullptr;
+  return download::WriteImage(phone_, step.image->image.image(), header, arguments, nullptr);
+}
+
+// What answers again in diagnostics has been restarted, whether or not it could say so.
+bool HandsetWorker::Restart() {
+  if (!download::KovaReset(phone_) && failure_->record().code == KRAL_ERROR_REFUSED) return false;
+  greeted_ = programmer_started_ = false;
+  return AwaitDiagnostics(options_.start_ms) && ReadIdentity(false);
+}
+
+bool HandsetWorker::SetMode(uint32_t mode) {
+  if (!diag::ControlMode(phone_, static_cast<uint16_t>(mode))) return false;
+  return mode != KRAL_MODE_RESET || AwaitDiagnostics(options_.start_ms);
+}
+
+// With a request that every handset knows. The first tries are short, for one that is still starting; each later one
+// waits longer, for one that is slow.
+bool HandsetWorker::AwaitDiagnostics(uint32_t within_ms) {
+  const uint32_t start = Now();
+  const uint32_t longest = std::max(phone_.TimeOut(kTimeOutDefaultCommand), 1u);
+  uint32_t patience = std::min(kFirstPatienceMs, longest);
+  for (;;) {
+    CDiagPacket& version = phone_.packet();
+    version.Reset();
+    version.Append8(0);
+    if (phone_.IsPortOpen() && phone_.Send(version, patience)) return true;
+    if (stopped()) return false;
+    if (Now() - start >= within_ms) break;
+    patience = std::min(2 * patience, longest);
+    if (!Pause(kPauseMs)) return false;
+  }
+  return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the handset on COM%d did not answer in diagnostics within %u ms",
+                      phone_.port(), within_ms));
+}
+
+bool HandsetWorker::AwaitLoader(uint32_t within_ms) {
+  const uint32_t start = Now();
+  while (!download::KovaNop(phone_)) {
+    if (stopped()) return false;
+    if (Now() - start >= within_ms) {
+      return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the loader of the handset on COM%d did not answer within %u ms",
+                          phone_.port(), within_ms));
+    }
+    if (!Pause(kPauseMs)) return false;
+  }
+  return true;
+}
+
+}  // namespace kral::station

@@ -1,0 +1,127 @@
+// The attempts at each step, and the way back of a handset that was lost. The steps are in handset_steps.cpp.
+#include "station/handset_worker.h"
+
+#include <algorithm>
+#include <mutex>
+
+#include "download/download_client.h"
+#include "download/link/download_settings.h"
+#include "frame/request_failure.h"
+#include "station/attempt.h"
+
+namespace kral::station {
+namespace {
+
+constexpr uint32_t kLookAroundMs = 50;
+
+// The cable, the port or the handset's patience; a retry helps against nothing else.
+bool MayPass(uint32_t code) {
+  return code == KRAL_ERROR_NO_PORT || code == KRAL_ERROR_PORT_IN_USE || code == KRAL_ERROR_NO_ANSWER ||
+         code == KRAL_ERROR_LINK || code == KRAL_ERROR_LOST;
+}
+
+KRAL_ERROR RecordOf(const CallFailure& failure, const Step& step) {
+  if (failure.noted()) return failure.record();
+  return Failure(KRAL_ERROR_INTERNAL, "%s failed; the text log may say why", step.name.c_str()).record();
+}
+
+}  // namespace
+
+HandsetWorker::HandsetWorker(JobHandset& handset, const Plan& plan, const KRAL_VENTRIMS_OPTIONS& options)
+    : handset_(handset), phone_(handset.phone()), plan_(plan), options_(options), retries_left_(options.retries) {}
+
+void HandsetWorker::Run() {
+  if (!handset_.Begin()) return;
+  for (uint32_t i = 0; i < plan_.size(); ++i) {
+    handset_.BeginStep(i, plan_[i]);
+    phone_.log().WriteLine(kLogFn, "KRAL_VENTRIMS: step %u of %zu, %s", i + 1, plan_.size(), plan_[i].name.c_str());
+    if (!RunStep(plan_[i])) return;
+    handset_.EndStep();
+  }
+  handset_.Pass();
+}
+
+bool HandsetWorker::RunStep(const Step& step) {
+  bool lost = false;  // the attempt before
+  for (;;) {
+    CallFailure failure;
+    failure_ = &failure;
+    bool recovered = true;
+    bool done = false;
+    {
+      const std::lock_guard lock(phone_.request_lock());
+      const Attempt attempt(phone_, handset_, options_.command_ms);
+      if (!stopped() && lost) recovered = Recover(step);
+      if (lost && recovered && !stopped()) handset_.EndReturn();
+      if (!stopped() && recovered) done = Do(step);
+    }
+    failure_ = nullptr;
+    if (done && !stopped()) return true;
+    const KRAL_ERROR record = RecordOf(failure, step);
+    if (stopped() || !recovered || !MayPass(record.code) || retries_left_ == 0) {
+      phone_.log().WriteLine(kLogErr, "KRAL_VENTRIMS: %s: %s", step.name.c_str(), record.text);
+      handset_.FailWith(record);
+      return false;
+    }
+    --retries_left_;
+    lost_by_ = record.code;
+    lost = true;
+    handset_.BeginReturn();
+  }
+}
+
+// What of the handset's state is needed to go on with the step. Nothing is done again here that was done before.
+bool HandsetWorker::Recover(const Step& step) {
+  if (!AwaitPort()) return false;
+  switch (step.kind) {
+    case StepKind::kEnterLoader:
+    case StepKind::kReset:
+      return true;  // they may have been carried out: what they wait for tells
+    case StepKind::kProgrammer:
+      if (programmer_started_ || step.number == KRAL_VENTRIMS_PROGRAMMER_BOOT) return true;
+      return download::KovaNop(phone_) ||
+             Fail(Failure(KRAL_ERROR_LOST, "COM%d came back without its loader: it cannot go on", phone_.port()));
+    case StepKind::kPartitionTable:
+    case StepKind::kImage: {
+      greeted_ = false;
+      // Nothing tells when a caller's transport is back.
+      const uint32_t start = Now();
+      while (!Greet()) {
+        if (stopped()) return false;
+        const bool may_come = phone_.transport().port().user_defined() || !phone_.IsPortOpen();
+        if (!may_come || Now() - start >= options_.return_ms) {
+          if (lost_by_ != KRAL_ERROR_LOST) return false;  // silent, then and now
+          return Fail(
+              Failure(KRAL_ERROR_LOST, "COM%d came back without its flash programmer: it cannot go on", phone_.port()));
+        }
+        if (!Pause(kLookAroundMs)) return false;
+      }
+      return true;
+    }
+    default:
+      return AwaitDiagnostics(options_.return_ms);
+  }
+}
+
+bool HandsetWorker::AwaitPort() {
+  phone_.GiveBackPort();
+  const uint32_t start = Now();
+  while (!phone_.IsPortOpen()) {
+    if (Now() - start >= options_.return_ms) {
+      return Fail(Failure(KRAL_ERROR_LOST, "COM%d did not return within %u ms", phone_.port(), options_.return_ms));
+    }
+    if (!Pause(kLookAroundMs)) return false;
+  }
+  return true;
+}
+
+bool HandsetWorker::Pause(uint32_t milliseconds) {
+  while (milliseconds > 0 && !stopped()) {
+    const uint32_t piece = std::min(milliseconds, kLookAroundMs);
+    phone_.clock().SleepMs(piece);
+    milliseconds -= piece;
+  }
+  return !stopped();
+}
+
+}  // namespace kral::station
