@@ -125,7 +125,7 @@ using Handsets = std::vector<std::unique_ptr<VirtualHandset>>;
 // The handsets are there before the first look: only the library's side is counted.
 void IdleMemory(benchmark::State& state) {
   if (ProcessFigure("VmRSS") < 0) {
-    state.SkipWithError("this home does not tell");
+    state.SkipWithError("this platform does not tell");
     return;
   }
   const auto count = static_cast<size_t>(state.range(0));

@@ -36,7 +36,7 @@ if(KRAL_SANITIZE)
 endif()
 
 if(WIN32)
-  set(KRAL_HOME win32)
+  set(KRAL_PLATFORM win32)
   # SSE2 is the baseline, and SSE arithmetic gives the same doubles as on 64-bit Linux. Callers may keep
   # only 4-byte stack alignment, hence -mstackrealign.
   add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
@@ -44,5 +44,5 @@ if(WIN32)
   # The runtimes are linked in: every program and the DLL are one file.
   add_link_options(-static)
 else()
-  set(KRAL_HOME posix)
+  set(KRAL_PLATFORM posix)
 endif()

@@ -1,4 +1,4 @@
-# Header-only libraries of the tool, taken from the machine's packages on both homes. Linked into the build tree one
+# Header-only libraries of the tool, taken from the machine's packages on both platforms. Linked into the build tree one
 # by one, so that the cross compiler sees these and not the native system headers beside them.
 set(KRAL_HEADERS_DIR ${PROJECT_BINARY_DIR}/headers)
 file(MAKE_DIRECTORY ${KRAL_HEADERS_DIR})

@@ -14,7 +14,7 @@ set(KRAL_LIBRARIES_storage_nv z)
 
 function(kral_layer name folder arrows)
   file(GLOB sources CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/${folder}/*.cpp
-    ${PROJECT_SOURCE_DIR}/${folder}/${KRAL_HOME}/*.cpp)
+    ${PROJECT_SOURCE_DIR}/${folder}/${KRAL_PLATFORM}/*.cpp)
   list(TRANSFORM arrows REPLACE "/" "_")
   list(TRANSFORM arrows PREPEND kral_)
   if(sources)

@@ -1,5 +1,5 @@
 // Runs one fuzz target over every file of the folders named on the command line. Stands in for libFuzzer's main, so
-// that the committed inputs are tested on every home and under every sanitizer. Nothing run is a failure.
+// that the committed inputs are tested on every platform and under every sanitizer. Nothing run is a failure.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>

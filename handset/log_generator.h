@@ -34,7 +34,7 @@ struct LogTrafficCount {
   uint64_t packets() const { return logs + reports + messages; }
 };
 
-// The packets follow from the traffic and the masks alone: the same on every home.
+// The packets follow from the traffic and the masks alone: the same on every platform.
 class LogGenerator {
  public:
   LogGenerator(VirtualHandset& handset, const LogTraffic& traffic) : handset_(handset), traffic_(traffic) {}

@@ -1,6 +1,6 @@
-// Reads compound documents into the tree, alike on both homes. The systems' own readers take too much on trust here:
-// a circle of sectors keeps one of them for ever, the other goes one call deeper for each sibling until the stack is
-// used up, and both take time with the square of the siblings.
+// Reads compound documents into the tree, alike on both platforms. The systems' own readers take too much on trust
+// here: a circle of sectors keeps one of them for ever, the other goes one call deeper for each sibling until the stack
+// is used up, and both take time with the square of the siblings.
 #include <algorithm>
 #include <array>
 #include <cstddef>

@@ -1,4 +1,4 @@
-// Files in one go, on either home.
+// Files in one go, on either platform.
 #include "platform/file_util.h"
 
 #include <algorithm>

@@ -30,7 +30,7 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
 // A folder that is there already is no error.
 std::error_code MakeFolder(const std::string& path);
 
-// '/' goes between them, which both homes understand.
+// '/' goes between them, which both platforms understand.
 std::string JoinPath(const std::string& folder, const std::string& name);
 
 }  // namespace kral

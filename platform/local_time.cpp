@@ -1,4 +1,4 @@
-// The texts of the wall clock; the reading of it is the home's.
+// The texts of the wall clock; the reading of it is the platform's.
 #include "platform/local_time.h"
 
 #include <array>

@@ -26,7 +26,7 @@ class TextSink {
   virtual bool Write(std::string_view text) = 0;
 };
 
-// An open file. Lines are passed as they are on the disk: nothing is translated on either home.
+// An open file. Lines are passed as they are on the disk: nothing is translated on either platform.
 class TextFile final : public TextSource, public TextSink {
  public:
   bool OpenForReading(const std::string& path);

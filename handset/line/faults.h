@@ -109,7 +109,7 @@ class FaultPlan {
     uint64_t seen = 0;
   };
 
-  double Draw();  // 0 <= x < 1, the same on every home
+  double Draw();  // 0 <= x < 1, the same on every platform
   Bytes Noise(uint32_t count);
 
   mutable std::mutex mutex_;

@@ -116,7 +116,7 @@ bool Tty::WaitQueueBelow(size_t level, steady_clock::time_point deadline) const 
 }
 
 // Done when the driver holds the bytes; where it holds a whole buffer of them, when it has room again, as the end of
-// a write means room on the other home.
+// a write means room on the other platform.
 size_t Tty::Write(std::span<const uint8_t> bytes, uint32_t longest_ms) {
   const auto deadline =
       steady_clock::now() + std::min(milliseconds(bytes.size()) + kWriteConstant, milliseconds(longest_ms));

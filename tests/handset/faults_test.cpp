@@ -59,7 +59,7 @@ TEST_F(HandsetFaults, SelectionCountsMatchingRequestsFromOne) {
   EXPECT_EQ(fates, ".xxx");
 }
 
-// The same on every home and in every run, so that a failure seen once can be seen again.
+// The same on every platform and in every run, so that a failure seen once can be seen again.
 TEST_F(HandsetFaults, ChanceAndBitErrorsFollowTheSeed) {
   const auto run = [this](uint64_t seed) {
     handset_.faults().Clear();

@@ -1,4 +1,4 @@
-// What both homes give in the same way: time, markers of ports in use, variables of the environment.
+// What both platforms give in the same way: time, markers of ports in use, variables of the environment.
 #include <set>
 
 #include "platform/clock.h"

@@ -1,4 +1,4 @@
-// Bands and channels: every range edge against the exact table, the refusals, and equal bits on every home.
+// Bands and channels: every range edge against the exact table, the refusals, and equal bits on every platform.
 #include <bit>
 #include <limits>
 
@@ -125,7 +125,7 @@ uint64_t DigestOfAllFrequencies() {
   return digest;
 }
 
-TEST(BandHelper, BothHomesGiveTheSameBits) {
+TEST(BandHelper, BothPlatformsGiveTheSameBits) {
   EXPECT_EQ(KRAL_Band_Helper_CalculateULFrequency(200, 991), 0x1.9c051eb851eb8p+9);
   EXPECT_EQ(KRAL_Band_Helper_CalculateDLFrequency(601, 21), 0x1.da2aaaaaaaaabp+8);
   EXPECT_EQ(KRAL_Band_Helper_CalculateDLFrequency(400, 14140001), 0x1.618001a36e2ebp+9);

@@ -172,8 +172,8 @@ TEST_F(PkvFiles, WhatOneWriterWritesTheReaderReads) {
   }
 }
 
-// The same set, written by each writer of each home; the fuzzer begins with these, too.
-TEST_F(PkvFiles, FilesOfBothHomesHoldTheSame) {
+// The same set, written by each writer of each platform; the fuzzer begins with these, too.
+TEST_F(PkvFiles, FilesOfBothPlatformsHoldTheSame) {
   PkvSet set;
   for (const uint16_t id : {0, 3, 453, 9999}) {
     for (const uint16_t subscription : {0, 1}) {

@@ -1,4 +1,4 @@
-// The lines of a text, without their ends on either home.
+// The lines of a text, without their ends on either platform.
 #ifndef KRAL_TESTS_SUPPORT_TEXT_LINES_H
 #define KRAL_TESTS_SUPPORT_TEXT_LINES_H
 

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""A download from cold with the tool, on any home: the handset on COM7 starts in its boot loader and ends with the
+"""A download from cold with the tool, on any platform: the handset on COM7 starts in its boot loader and ends with the
 software that was written.
 
 usage: with-sim 7 flash_from_cold.py COMMAND..., where COMMAND runs the tool. The last line tells what runs.

@@ -19,7 +19,7 @@ std::string_view LastName(std::string_view path);     // of the PC's side; empty
 std::string_view ParentOf(std::string_view path);     // of the handset's side; "/" at the top
 
 // Whether a name that the handset gave can be a file inside a folder of the PC, and of no other place. The rule is the
-// same on both homes: what was fetched on one can be taken to the other.
+// same on both platforms: what was fetched on one can be taken to the other.
 bool IsSafeLocalName(std::string_view name);
 
 std::string ModeText(std::uint32_t mode);     // "-rw-r--r--"
