@@ -199,7 +199,7 @@ class Reader:
                 self.read_function(node.name, node.type.type, line, self.callbacks)
             elif isinstance(node.type, c_ast.TypeDecl) and isinstance(node.type.type, c_ast.Struct):
                 self.read_record(node.name, node.type.type, line)
-            elif not node.name.endswith("_SIZE_CHECK"):
+            else:
                 self.read_handle(node, line)
         elif isinstance(node, c_ast.Decl) and isinstance(node.type, c_ast.FuncDecl):
             self.read_function(node.name, node.type, line, self.functions)

@@ -231,9 +231,6 @@ typedef struct KRAL_IMAGE_INFO {
   uint32_t payload;                  /**< bytes that are not those of erased flash, 0xFF */
 } KRAL_IMAGE_INFO;
 
-/** Fails to compile where the record would be padded. */
-typedef char KRAL_IMAGE_INFO_SIZE_CHECK[sizeof(KRAL_IMAGE_INFO) == 28 ? 1 : -1];
-
 /**
  * Reads an image file from end to end and reports what is in it.
  *

@@ -84,9 +84,6 @@ typedef struct KRAL_EFS_ENTRY {
   char name[KRAL_EFS_NAME_SIZE]; /**< the full path */
 } KRAL_EFS_ENTRY;
 
-/** Fails to compile where the record would be padded. */
-typedef char KRAL_EFS_ENTRY_SIZE_CHECK[sizeof(KRAL_EFS_ENTRY) == 536 ? 1 : -1];
-
 /** What a file system reports about itself; sizes in blocks unless said otherwise. */
 typedef struct KRAL_EFS_STATFS {
   uint32_t file_system_id;
@@ -100,8 +97,6 @@ typedef struct KRAL_EFS_STATFS {
   uint32_t max_file_count;
 } KRAL_EFS_STATFS;
 
-typedef char KRAL_EFS_STATFS_SIZE_CHECK[sizeof(KRAL_EFS_STATFS) == 36 ? 1 : -1];
-
 /** The memory under the file system. */
 typedef struct KRAL_EFS_DEVICE_INFO {
   uint32_t total_blocks;
@@ -113,8 +108,6 @@ typedef struct KRAL_EFS_DEVICE_INFO {
   uint32_t device_type;
   char name[64]; /**< terminated; a longer one is cut */
 } KRAL_EFS_DEVICE_INFO;
-
-typedef char KRAL_EFS_DEVICE_INFO_SIZE_CHECK[sizeof(KRAL_EFS_DEVICE_INFO) == 92 ? 1 : -1];
 
 /**
  * Called after every chunk of a transfer, on the thread that called the transfer function. It must not send requests;

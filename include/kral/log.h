@@ -51,9 +51,6 @@ typedef struct KRAL_EVENT {
   uint8_t payload[256];
 } KRAL_EVENT;
 
-/** Fails to compile where the record would be padded. */
-typedef char KRAL_EVENT_SIZE_CHECK[sizeof(KRAL_EVENT) == 268 ? 1 : -1];
-
 /* --- Collecting --------------------------------------------------------------------------------------------------- */
 
 /**
@@ -160,8 +157,6 @@ typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t waiting;          /**< packets received that still wait for callbacks and queues; 0 through a phone server */
   uint64_t most_waiting;     /**< the most that ever waited so */
 } KRAL_TRAFFIC_COUNTERS;
-
-typedef char KRAL_TRAFFIC_COUNTERS_SIZE_CHECK[sizeof(KRAL_TRAFFIC_COUNTERS) == 120 ? 1 : -1];
 
 /**
  * Reads the counters. An addition.

@@ -60,9 +60,6 @@ typedef struct KRAL_PKV_ITEM {
   uint32_t result; /**< KRAL_PKV_DONE, ... */
 } KRAL_PKV_ITEM;
 
-/** Fails to compile where the record would be padded. */
-typedef char KRAL_PKV_ITEM_SIZE_CHECK[sizeof(KRAL_PKV_ITEM) == 16 ? 1 : -1];
-
 /** How many of each result there were. */
 typedef struct KRAL_PKV_COUNTS {
   uint32_t total; /**< items, files and what the PKV file holds beside (skipped); the others add up to it */
@@ -73,8 +70,6 @@ typedef struct KRAL_PKV_COUNTS {
   uint32_t not_read_back;
   uint32_t not_reached;
 } KRAL_PKV_COUNTS;
-
-typedef char KRAL_PKV_COUNTS_SIZE_CHECK[sizeof(KRAL_PKV_COUNTS) == 28 ? 1 : -1];
 
 /**
  * Called once for every item and file, with its final result, on the thread that called the function, until it stops

@@ -68,9 +68,11 @@ typedef struct KRAL_VENTRIMS_OPTIONS {
   uint32_t block_size; /**< the most that a write to flash carries; 0, as at first: what the programmer announces */
 } KRAL_VENTRIMS_OPTIONS;
 
-typedef char KRAL_VENTRIMS_OPTIONS_SIZE_CHECK[sizeof(KRAL_VENTRIMS_OPTIONS) == 32 ? 1 : -1];
-
-/** Gets the options, for a caller that changes some of them. */
+/**
+ * Gets the options, for a caller that changes some of them.
+ *
+ * @param[in,out] options `size` filled in by the caller
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetOptions(KRAL_VENTRIMS_JOB job, KRAL_VENTRIMS_OPTIONS* options);
 /** Sets them all: flags as above, at most 50 at once, 100 retries, and 3,600,000 ms. */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_SetOptions(KRAL_VENTRIMS_JOB job, const KRAL_VENTRIMS_OPTIONS* options);
@@ -122,7 +124,13 @@ KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_AddRestore(KRAL_VENTRIMS_JOB job, const
 /** Compares the handset with a PKV file; as KRAL_PKV_Verify. */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_AddVerify(KRAL_VENTRIMS_JOB job, const char* file);
 
-/** Gets the name of a step, "image 2 (modem.hex)", also of those that the options add; from 0. 64 bytes hold any. */
+/**
+ * Gets the name of a step, "image 2 (modem.hex)", also of those that the options add.
+ *
+ * @param      step from 0
+ * @param[out] text [size] terminated
+ * @param      size bytes; 64 hold any name
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetStepName(KRAL_VENTRIMS_JOB job, uint32_t step, char* text, uint32_t size);
 
 /**@}*/
@@ -142,10 +150,16 @@ KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_AddPort(KRAL_VENTRIMS_JOB job, uint32_t
 /**
  * Adds a handset that is connected. It must stay so until the job has ended; its callbacks of downloads and backups are
  * not called meanwhile, and requests of others on the handle wait for the end of a step.
+ *
+ * @param[out] handset its number in the job; may be null
  */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_AddHandle(KRAL_VENTRIMS_JOB job, KRAL_HANDLE handle, uint32_t* handset);
 
-/** Gets the handle of a handset, for its text log and settings: KRAL_StartLogging, KRAL_ConfigureTimeOut. */
+/**
+ * Gets the handle of a handset, for its text log and settings: KRAL_StartLogging, KRAL_ConfigureTimeOut.
+ *
+ * @param[out] handle of the connection
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetHandle(KRAL_VENTRIMS_JOB job, uint32_t handset, KRAL_HANDLE* handle);
 
 /**@}*/
@@ -220,9 +234,11 @@ typedef struct KRAL_VENTRIMS_STATE {
   uint64_t bytes_total;
 } KRAL_VENTRIMS_STATE;
 
-typedef char KRAL_VENTRIMS_STATE_SIZE_CHECK[sizeof(KRAL_VENTRIMS_STATE) == 56 ? 1 : -1];
-
-/** Gets how far a job has come. */
+/**
+ * Gets how far a job has come.
+ *
+ * @param[in,out] state `size` filled in by the caller
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetState(KRAL_VENTRIMS_JOB job, KRAL_VENTRIMS_STATE* state);
 
 /** States of a handset. */
@@ -254,9 +270,11 @@ typedef struct KRAL_VENTRIMS_PROGRESS {
   char serial[16];   /**< eight hexadecimal digits */
 } KRAL_VENTRIMS_PROGRESS;
 
-typedef char KRAL_VENTRIMS_PROGRESS_SIZE_CHECK[sizeof(KRAL_VENTRIMS_PROGRESS) == 264 ? 1 : -1];
-
-/** Gets how far a handset has come. */
+/**
+ * Gets how far a handset has come.
+ *
+ * @param[in,out] progress `size` filled in by the caller
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetProgress(KRAL_VENTRIMS_JOB job, uint32_t handset,
                                                      KRAL_VENTRIMS_PROGRESS* progress);
 
@@ -268,9 +286,11 @@ typedef struct KRAL_VENTRIMS_RESULT {
   KRAL_VENTRIMS_PROGRESS progress; /**< at the end: the step that failed, attempts, time, bytes, identity */
 } KRAL_VENTRIMS_RESULT;
 
-typedef char KRAL_VENTRIMS_RESULT_SIZE_CHECK[sizeof(KRAL_VENTRIMS_RESULT) == 632 ? 1 : -1];
-
-/** Gets the verdict on a handset; 0 while there is none yet. */
+/**
+ * Gets the verdict on a handset; 0 while there is none yet.
+ *
+ * @param[in,out] result `size` filled in by the caller
+ */
 KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetResult(KRAL_VENTRIMS_JOB job, uint32_t handset,
                                                    KRAL_VENTRIMS_RESULT* result);
 
