@@ -104,6 +104,8 @@ class Failures(ToolTest):
                 (["info", "--tiem-out", "5"], "kral info has no option --tiem-out; did you mean --time-out?"),
                 (["nv"], "kral nv needs a verb: read, write,"),
                 (["flash", "load"], "kral flash load: programmer is required"),
+                (["fs", "mv", "a"], "kral fs mv: paths needs 2 values"),
+                (["-p", "7", "-p", "8", "info"], "kral info: --port is given too often"),
                 (["info", "me"], "kral info takes no 'me'"),
                 (["info", "--time-out", "0"], "--time-out takes a number from 1 to 3600000 ms, not '0'"),
                 (["band", "ul", "gsm", "1"], "band takes a number from 0 to 65535, not 'gsm'"),

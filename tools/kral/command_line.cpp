@@ -156,6 +156,15 @@ std::string DescribeUnknown(const Place& place) {
   return Format("there is no verb {}{}{}", noun, word, nearest ? Format("; did you mean {}{}?", noun, *nearest) : "");
 }
 
+// An option with too few or too many values; the parser names it in front of a colon.
+std::string DescribeCount(const CLI::App& app, std::string_view problem) {
+  const std::string name(problem.substr(0, problem.find(':')));
+  const auto* const option = FindOption(&app, name);
+  const auto least = option == nullptr ? 1 : option->get_items_expected_min();
+  if (option != nullptr && static_cast<int>(option->count()) > least) return name + " is given too often";
+  return Format("{} needs {}", name, least > 1 ? Counted(static_cast<std::uint64_t>(least), "value") : "a value");
+}
+
 // What was wrong with a command line that the parser did not take.
 ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const CLI::ParseError& error) {
   const auto place = Follow(root, words);
@@ -168,14 +177,16 @@ ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const C
   if (const auto rest = root.remaining(true); !rest.empty()) {
     return {ExitCode::kUsage, Format("{} takes no '{}'", title, rest.front()), hint};
   }
-  return {ExitCode::kUsage, Format("{}: {}", title, error.what()), hint};
+  const bool is_count = dynamic_cast<const CLI::ArgumentMismatch*>(&error) != nullptr;
+  const auto problem = is_count ? DescribeCount(*place.app, error.what()) : std::string(error.what());
+  return {ExitCode::kUsage, Format("{}: {}", title, problem), hint};
 }
 
 void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
   const auto place = Follow(root, words);
   if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
-  const auto* const parent = place.app->get_parent();
-  std::cout << place.app->help(parent == nullptr ? "" : TitleOf(*parent));
+  // Its own help() would be that of the verb in use, which is "help".
+  std::cout << place.app->get_formatter()->make_help(place.app, TitleOf(*place.app), CLI::AppFormatMode::Normal);
 }
 
 }  // namespace
@@ -376,7 +387,7 @@ void CommandLine::Example(const std::string& words) {
   place.app->footer(text);
 }
 
-std::function<void()> CommandLine::Parse(std::vector<std::string> arguments) {
+std::function<void()> CommandLine::Parse(const std::vector<std::string>& arguments) {
   parser_->chosen = {};
   try {
     // The parser wants them from the last to the first.

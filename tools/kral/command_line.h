@@ -99,7 +99,7 @@ class CommandLine {
   void Example(const std::string& words);
   // What the chosen verb does; nothing when help or the version was asked for, which is then printed. ToolError for
   // mistakes. Options of a noun or of the root are taken behind a verb, too.
-  std::function<void()> Parse(std::vector<std::string> arguments);
+  std::function<void()> Parse(const std::vector<std::string>& arguments);
 
  private:
   struct Parser;

@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <array>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "platform/console.h"
@@ -48,7 +47,7 @@ int End(const Context& context, const ToolError& error) {
   return static_cast<int>(error.code());
 }
 
-int Run(std::vector<std::string> arguments) {
+int Run(const std::vector<std::string>& arguments) {
   Context context;
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.
   if (std::find(arguments.begin(), arguments.end(), "--json") != arguments.end()) context.out.UseJson();
@@ -72,7 +71,7 @@ int Run(std::vector<std::string> arguments) {
   AddExamples(command_line);
 
   try {
-    const auto act = command_line.Parse(std::move(arguments));
+    const auto act = command_line.Parse(arguments);
     if (act == nullptr) return static_cast<int>(ExitCode::kDone);  // help
     act();
     TellLogFileTrouble(context);

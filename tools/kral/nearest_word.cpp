@@ -29,6 +29,11 @@ std::size_t CommonBeginning(std::string_view one, std::string_view other) {
   return static_cast<std::size_t>(end - one.begin());
 }
 
+// Of an option, what stands behind the dashes.
+std::string_view LettersOf(std::string_view word) {
+  return word.substr(std::min(word.find_first_not_of('-'), word.size()));
+}
+
 }  // namespace
 
 std::optional<std::string> NearestWord(std::string_view word, const std::vector<std::string>& known) {
@@ -37,7 +42,9 @@ std::optional<std::string> NearestWord(std::string_view word, const std::vector<
   };
   const auto nearest = std::min_element(
       known.begin(), known.end(), [&rank](const auto& left, const auto& right) { return rank(left) < rank(right); });
-  if (nearest == known.end() || 2 * Distance(word, *nearest) > std::max(word.size(), nearest->size()) + 1) return {};
+  if (nearest == known.end()) return {};
+  const auto most = std::max(LettersOf(word).size(), LettersOf(*nearest).size()) + 1;
+  if (2 * Distance(word, *nearest) > most) return {};
   return *nearest;
 }
 
