@@ -88,7 +88,7 @@ void Compare(benchmark::State& state, Station& station, const std::vector<Bytes>
   double whole = 0;
   for (auto _ : state) {
     bare += SecondsOf(state, [&] {
-      return std::all_of(packets.begin(), packets.end(), [&](const Bytes& packet) { return station.Exchange(packet); });
+      return std::ranges::all_of(packets, [&](const Bytes& packet) { return station.Exchange(packet); });
     });
     const uint64_t before = station.phone().request_count();
     whole += SecondsOf(state, transfer);

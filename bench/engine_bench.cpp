@@ -94,7 +94,7 @@ void RoundTrip(benchmark::State& state, bool over_pty, uint8_t receive_mode) {
     }
     times.push_back(MicrosecondsSince(start));
   }
-  std::sort(times.begin(), times.end());
+  std::ranges::sort(times);
   state.counters["p50_us"] = Percentile(times, 0.5);
   state.counters["p99_us"] = Percentile(times, 0.99);
   state.SetItemsProcessed(state.iterations());

@@ -75,7 +75,7 @@ class FloodLine {
     std::copy_n(frames_.begin(), packets * frame_.size(), buffer.begin());
     sent_ += packets;
     const size_t count = packets * frame_.size() + answer_.size();
-    std::copy(answer_.begin(), answer_.end(), buffer.begin() + static_cast<std::ptrdiff_t>(packets * frame_.size()));
+    std::ranges::copy(answer_, buffer.begin() + static_cast<std::ptrdiff_t>(packets * frame_.size()));
     answer_.clear();
     return count;
   }
@@ -237,7 +237,7 @@ std::vector<double> RoundTrips(KRAL_HANDLE handle, size_t count) {
     times.push_back(SecondsSince(start) * 1e6);
     std::this_thread::sleep_for(microseconds(100));  // as a station does something between two commands
   }
-  std::sort(times.begin(), times.end());
+  std::ranges::sort(times);
   return times;
 }
 

@@ -59,7 +59,7 @@ bool FlashAll(Diag_FTM& phone, const char* programmer, const char* const* images
     Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no flash programmer, or there are no images"));
   } else {
     const std::span all(images, count);
-    const auto missing = std::find(all.begin(), all.end(), nullptr);
+    const auto missing = std::ranges::find(all, nullptr);
     if (missing != all.end()) {
       outcome.image = static_cast<uint32_t>(missing - all.begin());
       Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no name of image %u", outcome.image));

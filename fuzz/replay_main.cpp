@@ -18,7 +18,7 @@ std::vector<std::filesystem::path> FilesOf(const std::filesystem::path& folder) 
   for (const auto& entry : std::filesystem::directory_iterator(folder)) {
     if (entry.is_regular_file()) files.push_back(entry.path());
   }
-  std::sort(files.begin(), files.end());
+  std::ranges::sort(files);
   return files;
 }
 

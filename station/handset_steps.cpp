@@ -77,7 +77,7 @@ bool HandsetWorker::EnterLoader() {
   const Reply reply = diag::EnterDownload(phone_);
   if (!reply && reply.kind() != ReplyKind::kNone && reply.kind() != ReplyKind::kGone && !reply.not_sent()) return false;
   const auto programmer =
-      std::find_if(plan_.begin(), plan_.end(), [](const Step& step) { return step.kind == StepKind::kProgrammer; });
+      std::ranges::find_if(plan_, [](const Step& step) { return step.kind == StepKind::kProgrammer; });
   return programmer->number == KRAL_VENTRIMS_PROGRAMMER_BOOT || AwaitLoader(options_.start_ms);
 }
 

@@ -70,9 +70,8 @@ const char* WhatIsWrong(const std::vector<Step>& steps, size_t first, size_t las
     return resets ? "a restart is to follow the download, but there is none" : nullptr;
   }
   const auto download = std::span(steps).subspan(first, last - first);
-  if (!std::all_of(download.begin(), download.end(), IsOfDownload))
-    return "a step in diagnostics stands between those of the download";
-  if (!std::is_sorted(download.begin(), download.end(), [](const Step& a, const Step& b) { return Rank(a) < Rank(b); }))
+  if (!std::ranges::all_of(download, IsOfDownload)) return "a step in diagnostics stands between those of the download";
+  if (!std::ranges::is_sorted(download, [](const Step& a, const Step& b) { return Rank(a) < Rank(b); }))
     return "flash programmer, partition table and images are not in this order";
   const bool has_programmer = download[0].kind == StepKind::kProgrammer;
   if (has_programmer && download.size() > 1 && download[1].kind == StepKind::kProgrammer)
@@ -86,7 +85,7 @@ const char* WhatIsWrong(const std::vector<Step>& steps, size_t first, size_t las
 }  // namespace
 
 std::optional<Plan> MakePlan(const std::vector<Step>& steps, uint32_t flags) {
-  const auto begin = std::find_if(steps.begin(), steps.end(), IsOfDownload);
+  const auto begin = std::ranges::find_if(steps, IsOfDownload);
   const auto end = std::find_if(steps.rbegin(), steps.rend(), IsOfDownload).base();
   const auto first = static_cast<size_t>(begin - steps.begin());
   const size_t last = begin == steps.end() ? first : static_cast<size_t>(end - steps.begin());

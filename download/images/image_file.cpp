@@ -34,7 +34,7 @@ uint32_t CountPayload(const PhoneImage& image, uint32_t region) {
     const uint32_t count = std::min(kPiece, size - done);
     image.Read(base + done, piece.data(), count, region);
     const auto read = std::span(piece).first(count);
-    payload += count - static_cast<uint32_t>(std::count(read.begin(), read.end(), kErased));
+    payload += count - static_cast<uint32_t>(std::ranges::count(read, kErased));
     done += count;
   }
   return payload;

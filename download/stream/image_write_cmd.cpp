@@ -32,7 +32,7 @@ std::array<uint8_t, kWriteHeaderSize> Header(uint32_t address) {
 }
 
 size_t CountEscaped(std::span<const uint8_t> bytes) {
-  return static_cast<size_t>(std::count_if(bytes.begin(), bytes.end(), IsEscaped));
+  return static_cast<size_t>(std::ranges::count_if(bytes, IsEscaped));
 }
 
 }  // namespace
@@ -44,8 +44,8 @@ bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data)
   }
   packet_.resize(kWriteBufferSize);
   const auto header = Header(address);
-  const auto body = std::copy(header.begin(), header.end(), packet_.begin());
-  std::copy(data.begin(), data.end(), body);
+  const auto body = std::ranges::copy(header, packet_.begin()).out;
+  std::ranges::copy(data, body);
   if (connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_)) return true;
   connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", kStatusNotSent);
   return false;

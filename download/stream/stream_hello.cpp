@@ -22,7 +22,7 @@ constexpr size_t kRequestSize = kVersionAt + 3;
 
 std::array<uint8_t, kRequestSize> HelloRequest() {
   std::array<uint8_t, kRequestSize> request{kHello};
-  std::copy(kHostMagic.begin(), kHostMagic.end(), request.begin() + kMagicAt);
+  std::ranges::copy(kHostMagic, request.begin() + kMagicAt);
   request[kVersionAt] = kVersion;
   request[kVersionAt + 1] = kCompatibleVersion;
   request[kVersionAt + 2] = kFeatures;

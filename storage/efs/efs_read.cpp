@@ -123,7 +123,7 @@ Sink SinkOfMemory(Diag_FTM& phone, const char* efs_file, std::span<u8> room, con
   sink.open = [] { return true; };
   sink.write = [&phone, &done, room, efs_file](std::span<const u8> bytes) {
     if (!Fits(phone, efs_file, uint64_t{done} + bytes.size(), room.size())) return false;
-    std::copy(bytes.begin(), bytes.end(), room.subspan(done).begin());
+    std::ranges::copy(bytes, room.subspan(done).begin());
     done += static_cast<u32>(bytes.size());
     return true;
   };

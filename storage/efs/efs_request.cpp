@@ -84,7 +84,7 @@ Path PathField(const char* path) {
 std::optional<std::string> TextAt(std::span<const u8> reply, size_t offset) {
   if (offset >= reply.size()) return std::nullopt;
   const auto rest = reply.subspan(offset);
-  const auto end = std::find(rest.begin(), rest.end(), u8{0});
+  const auto end = std::ranges::find(rest, u8{0});
   if (end == rest.end()) return std::nullopt;
   return std::string(rest.begin(), end);
 }
@@ -181,7 +181,7 @@ bool IsAborted(Diag_FTM& phone, const char* operation) {
 bool ReadFromEnd(Diag_FTM& phone, std::initializer_list<u32*> fields) {
   CDiagPacket& packet = phone.packet();
   if (packet.response_length() < kHeaderSize + fields.size() * sizeof(u32)) return Fail(BadReply(phone, kTooShort));
-  return std::all_of(fields.begin(), fields.end(), [&](u32* field) { return packet.Read32(*field); });
+  return std::ranges::all_of(fields, [&](u32* field) { return packet.Read32(*field); });
 }
 
 bool ReadAt(Diag_FTM& phone, size_t offset, u32& field) {
@@ -190,8 +190,8 @@ bool ReadAt(Diag_FTM& phone, size_t offset, u32& field) {
 
 bool IsDone(u32 error, const char* path) {
   if (error == kDone) return true;
-  const auto* const known = std::find_if(std::begin(kErrors), std::end(kErrors),
-                                         [error](const KnownError& row) { return row.number == error; });
+  const auto* const known =
+      std::ranges::find_if(kErrors, [error](const KnownError& row) { return row.number == error; });
   const Failure failure =
       known == std::end(kErrors)
           ? Failure(KRAL_ERROR_REFUSED, "the handset gives error %u for %s", error, TextOrEmpty(path))

@@ -83,7 +83,7 @@ PhoneItems::Answer PhoneItems::WriteBatch(std::span<const pkv::PkvNvItem> items,
 
 bool PhoneItems::MayBeReadOnly(uint16_t id) const {
   const auto& list = phone_.state<nv::Batch>().read_only;
-  return std::find(list.begin(), list.end(), id) != list.end();
+  return std::ranges::find(list, id) != list.end();
 }
 
 }  // namespace kral::items

@@ -71,7 +71,7 @@ class Reader {
     const auto ends = [&](const XmlElement& element) {
       return element.name != "DataType" || TextAttribute(element, "name") != name;
     };
-    const auto end = std::find_if(elements.begin(), elements.end(), ends);
+    const auto end = std::ranges::find_if(elements, ends);
     const auto count = static_cast<size_t>(end - elements.begin());
     const NvTypePtr type = MakeType(name, elements.first(count), false);
     own_types_[name] = type;

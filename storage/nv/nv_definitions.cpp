@@ -34,7 +34,7 @@ std::optional<uint16_t> RfIdOfPath(std::string_view path) {
 
 bool IsUsualPath(std::string_view path) {
   return !path.empty() && path.size() <= kLongestGenericPath &&
-         std::all_of(path.begin(), path.end(), [](char c) { return c >= ' ' && c <= '~'; });
+         std::ranges::all_of(path, [](char c) { return c >= ' ' && c <= '~'; });
 }
 
 NvTypePtr NvDefinitions::FindType(std::string_view name) const {

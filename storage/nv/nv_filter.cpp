@@ -41,7 +41,7 @@ void ForEachPart(std::string_view list, Take take) {
 // Of sorted parts of which none begins with another, the one that a text begins with is the last that is not above it.
 bool HoldsAny(std::string_view text, const std::vector<std::string>& parts) {
   for (; !text.empty(); text.remove_prefix(1)) {
-    const auto above = std::upper_bound(parts.begin(), parts.end(), text);
+    const auto above = std::ranges::upper_bound(parts, text);
     if (above != parts.begin() && text.starts_with(*std::prev(above))) return true;
   }
   return false;
@@ -52,15 +52,14 @@ bool HoldsAny(std::string_view text, const std::vector<std::string>& parts) {
 bool NvFilter::Passes(const NvItem& item) const {
   if (is_empty()) return true;
   if (item.id) {
-    const auto above = std::upper_bound(ids_.begin(), ids_.end(), *item.id,
-                                        [](uint16_t id, const auto& range) { return id < range.first; });
+    const auto above = std::ranges::upper_bound(ids_, *item.id, {}, [](const auto& range) { return range.first; });
     if (above != ids_.begin() && *item.id <= std::prev(above)->second) return true;
   }
   return HoldsAny(item.name, parts_) || (item.is_file() && HoldsAny(pkv::PathKey(item.path), parts_));
 }
 
 void NvFilter::Sort() {
-  std::sort(ids_.begin(), ids_.end());
+  std::ranges::sort(ids_);
   size_t kept = 0;
   for (const auto& range : ids_) {
     if (kept > 0 && range.first <= uint32_t{ids_[kept - 1].second} + 1) {
@@ -71,7 +70,7 @@ void NvFilter::Sort() {
   }
   ids_.resize(kept);
   // A part that begins with another is found with it.
-  std::sort(parts_.begin(), parts_.end());
+  std::ranges::sort(parts_);
   std::vector<std::string> parts;
   for (std::string& part : parts_) {
     if (parts.empty() || !part.starts_with(parts.back())) parts.push_back(std::move(part));

@@ -189,8 +189,8 @@ NvError NVTool_Manager::CreateFilter(const std::string& file, bool with_value) {
   std::vector<const NvItem*> items;
   definitions_.ForEach([&](const NvItem& item) {
     const uint16_t subscription = SlotOf(item, 0).subscription;
-    const bool has_value = std::any_of(item.values.begin(), item.values.end(),
-                                       [&](const auto& value) { return value.first.subscription == subscription; });
+    const bool has_value =
+        std::ranges::any_of(item.values, [&](const auto& value) { return value.first.subscription == subscription; });
     if (has_value == with_value) items.push_back(&item);
   });
   if (!items.empty()) return SaveFilter(file, items);

@@ -23,7 +23,7 @@ NvError Give(std::string_view result, char* text, uint32_t size) {
     return Told(NvError::kCannotGetValue, "the text of " + std::to_string(result.size() + 1) +
                                               " bytes does not fit into " + std::to_string(size));
   }
-  *std::copy(result.begin(), result.end(), text) = '\0';
+  *std::ranges::copy(result, text).out = '\0';
   return NvError::kNone;
 }
 

@@ -14,7 +14,7 @@ std::vector<uint8_t> EntryRecord(const PkvEfsFile& file) {
   std::vector<uint8_t> record(kEntryPath + file.path.size());
   StoreLe<uint32_t>(record, 0, file.mode);
   StoreLe<uint32_t>(record, kEntrySize, static_cast<uint32_t>(file.bytes.size()));
-  std::copy(file.path.begin(), file.path.end(), record.begin() + kEntryPath);
+  std::ranges::copy(file.path, record.begin() + kEntryPath);
   return record;
 }
 
@@ -115,8 +115,8 @@ void WriteEfsFiles(CompoundStorage& configuration, const std::vector<PkvEfsFile>
   };
   std::optional<CItemFileStgAccess> item_files;
   std::optional<CEFSBackup> others;
-  open(item_files, kItemFiles, std::any_of(files.begin(), files.end(), is_item));
-  open(others, kEfsBackup, !std::all_of(files.begin(), files.end(), is_item));
+  open(item_files, kItemFiles, std::ranges::any_of(files, is_item));
+  open(others, kEfsBackup, !std::ranges::all_of(files, is_item));
   for (const PkvEfsFile& file : files) {
     if (is_item(file)) {
       if (others) others->Remove(file.path);

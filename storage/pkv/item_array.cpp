@@ -47,7 +47,7 @@ std::vector<PkvNvItem> CNVItemStream::Items() const {
     for (const auto& [position, index] : records) last[index] = position;
     for (const auto& [index, position] : last) positions.push_back(position);
   }
-  std::sort(positions.begin(), positions.end());
+  std::ranges::sort(positions);
   std::vector<PkvNvItem> items;
   items.reserve(positions.size());
   for (const size_t position : positions) items.push_back(ItemAt(position));
@@ -72,7 +72,7 @@ size_t CNVItemStream::Write(const PkvNvItem& item) {
   if (!writable()) return 0;
   const auto record = ArrayRecord(item);
   const size_t position = ClaimPosition(item.id);  // first: it may move the bytes
-  std::copy(record.begin(), record.end(), stream_->bytes.begin() + static_cast<ptrdiff_t>(position));
+  std::ranges::copy(record, stream_->bytes.begin() + static_cast<ptrdiff_t>(position));
   records_[item.id][position] = item.index;
   return record.size();
 }

@@ -20,8 +20,7 @@ void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties) {
 
 std::optional<std::set<uint16_t>> NotedArrays(const PkvProperties& properties) {
   const auto& values = properties.values;
-  const auto note =
-      std::find_if(values.begin(), values.end(), [](const auto& v) { return v.first == kArraysProperty; });
+  const auto note = std::ranges::find_if(values, [](const auto& v) { return v.first == kArraysProperty; });
   if (note == values.end()) return std::nullopt;
   std::set<uint16_t> ids;
   for (std::string_view rest = note->second; !rest.empty();) {

@@ -34,12 +34,12 @@ std::optional<uint32_t> ParseDigits(std::string_view digits, uint32_t base, uint
 
 template <size_t kSize>
 void StoreData(std::array<uint8_t, kSize>& record, size_t offset, const PkvNvItem& item) {
-  std::copy(item.data.begin(), item.data.end(), record.begin() + static_cast<ptrdiff_t>(offset));
+  std::ranges::copy(item.data, record.begin() + static_cast<ptrdiff_t>(offset));
 }
 
 void LoadData(std::span<const uint8_t> bytes, size_t offset, PkvNvItem& item) {
   const auto data = bytes.subspan(offset, kItemDataSize);
-  std::copy(data.begin(), data.end(), item.data.begin());
+  std::ranges::copy(data, item.data.begin());
 }
 
 }  // namespace

@@ -25,7 +25,7 @@ auto KeyOf(const PkvNvItem& item) {
 
 // The first one of several with the same key stays; the others are told when they are different.
 void Normalize(std::vector<PkvNvItem>& items, std::vector<std::string>& dropped) {
-  std::stable_sort(items.begin(), items.end(), [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); });
+  std::ranges::stable_sort(items, [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); });
   const auto is_again = [&](const PkvNvItem& first, const PkvNvItem& item) {
     if (KeyOf(first) != KeyOf(item)) return false;
     if (first != item) dropped.push_back("NV ID " + std::to_string(item.id) + ": a second value");

@@ -15,7 +15,7 @@ TEST(DiagPacket, ResetFillsBothAreas) {
   EXPECT_EQ(packet.request_length(), 0);
   EXPECT_EQ(packet.response_length(), 6144);
   const auto all = [](std::span<const uint8_t> bytes, uint8_t value) {
-    return std::count(bytes.begin(), bytes.end(), value) == 6144;
+    return std::ranges::count(bytes, value) == 6144;
   };
   EXPECT_TRUE(all(packet.request_area(), 0xAA));
   EXPECT_TRUE(all(packet.response_area(), 0xBB));

@@ -32,7 +32,7 @@ TEST_F(FtmTest, EveryCommandIsListedAndSendsItsExactRequestUnderBothCodes) {
   const std::array<uint8_t, 3> payload{0xA1, 0xB2, 0xC3};
   for (const FtmCommandRow& row : test::kFtmCommandRows) {
     SCOPED_TRACE(row.name);
-    EXPECT_EQ(std::count(listed.begin(), listed.end(), std::pair(row.id, std::string(row.name))), 1);
+    EXPECT_EQ(std::ranges::count(listed, std::pair(row.id, std::string(row.name))), 1);
     std::array<uint8_t, 8> response{};
     uint16_t size = response.size();
 
@@ -223,7 +223,7 @@ TEST_F(FtmTest, RfModesKeepTheIdsOfTheirGroupAndReplaceAllOthers) {
       grouped[mode] = true;
       // The kept ids, and some of other technologies.
       for (const uint16_t id : std::array<uint16_t, 16>{0, 1, 2, 3, 19, 21, 29, 32, 37, 40, 42, 43, 45, 47, 48, 49}) {
-        const uint16_t expected = std::find(kept.begin(), kept.end(), id) != kept.end() ? id : group.otherwise;
+        const uint16_t expected = std::ranges::find(kept, id) != kept.end() ? id : group.otherwise;
         KRAL_FTM_SET_MODE_ID(handle(), id);
         ASSERT_EQ(KRAL_FTM_SET_MODE(handle(), mode), 1);
         ASSERT_EQ(LastRequest(), "4B 0B " + Hex16(expected) + " 07 00 " + Hex16(mode)) << "from mode id " << id;

@@ -96,7 +96,7 @@ TEST_F(FlashAll, GoesFromColdToTheNewSoftware) {
   EXPECT_TRUE(images[1].closed);
 
   ASSERT_FALSE(figures_.empty());
-  EXPECT_TRUE(std::is_sorted(figures_.begin(), figures_.end()));
+  EXPECT_TRUE(std::ranges::is_sorted(figures_));
   EXPECT_EQ(figures_.front(), std::pair(0u, 7504u));
   EXPECT_EQ(figures_.back(), std::pair(7504u, 7504u)) << "2500 of the programmer, 5000 and 4 of the images";
 

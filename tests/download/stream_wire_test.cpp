@@ -43,7 +43,7 @@ TEST_F(StreamWire, HelloTellsTheLimitsAndEveryFrameBeginsWithAFlag) {
   }
   const auto bytes = handset().received();
   EXPECT_EQ(bytes[0], 0x7E);
-  EXPECT_EQ(std::count(bytes.begin(), bytes.end(), 0x7E), 8) << "a flag in front of and behind each of four frames";
+  EXPECT_EQ(std::ranges::count(bytes, 0x7E), 8) << "a flag in front of and behind each of four frames";
   EXPECT_EQ(Kral_ResourceManager::GetPhone(handle())->transport().framer().SetStartFlag(0), 0) << "left on";
 }
 

@@ -185,7 +185,7 @@ TEST_F(StreamWrite, ProgressRisesFromNothingToEverythingAndAnAbortEndsIt) {
   EXPECT_EQ(reports.total, bytes.size());
   EXPECT_EQ(reports.acknowledged.front(), 0u);
   EXPECT_EQ(reports.acknowledged.back(), bytes.size());
-  EXPECT_TRUE(std::is_sorted(reports.acknowledged.begin(), reports.acknowledged.end()));
+  EXPECT_TRUE(std::ranges::is_sorted(reports.acknowledged));
 
   reports.abort_at_first = handle();
   EXPECT_EQ(WriteMem(bytes), KRAL_DOWNLOAD_ABORTED);

@@ -28,7 +28,7 @@ Listed List(uint16_t room, Call call) {
   std::vector<uint16_t> ports(kRoom + 1, 0xFFFF);
   uint16_t count = room;
   const uint8_t result = call(&count, ports.data());
-  const auto end = std::find(ports.begin(), ports.end(), 0xFFFF);
+  const auto end = std::ranges::find(ports, 0xFFFF);
   return {result, count, {ports.begin(), end}};
 }
 

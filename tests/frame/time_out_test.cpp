@@ -49,7 +49,7 @@ TEST_F(TimeOuts, ServerModeRefusesThoseOfTheTransportAndAsksTheDownloadForItsOwn
   EXPECT_EQ(KRAL_ConfigureTimeOut(handle, 21, 78), 0);
   EXPECT_EQ(KRAL_GetTimeOut(handle, 21), 0);
   const auto calls = server.TakeCalls();
-  EXPECT_EQ(std::count(calls.begin(), calls.end(), "make KRAL-SW Download"), 1);
+  EXPECT_EQ(std::ranges::count(calls, "make KRAL-SW Download"), 1);
 }
 
 TEST_F(TimeOuts, CallsAreTold) {

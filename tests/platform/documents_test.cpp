@@ -1,6 +1,4 @@
 // Compound documents and XML: what is written is read again, and hostile input is refused.
-#include <fmt/format.h>
-
 #include "platform/compound_file.h"
 #include "platform/xml_document.h"
 #include "tests/support/test.h"
@@ -67,7 +65,7 @@ class HandmadeDocument {
     while (tables_ * kPerSector < directory_sectors + tables_ + Lists()) ++tables_;
     bytes.resize(512 * (1 + directory_sectors + tables_ + Lists()));
     const uint8_t magic[] = {0xD0, 0xCF, 0x11, 0xE0, 0xA1, 0xB1, 0x1A, 0xE1};
-    std::copy(std::begin(magic), std::end(magic), bytes.begin());
+    std::ranges::copy(magic, bytes.begin());
     bytes[30] = 9;
     Put(60, kEnd);
     Put(68, Lists() == 0 ? kEnd : directory_sectors + tables_);
@@ -85,7 +83,7 @@ class HandmadeDocument {
       Put(table_at + 4 * i, i + 1 < directory_sectors ? i + 1 : i + 1 == directory_sectors ? kEnd : kFree);
     AddEntry(0, "Root Entry", 5, kFree, storages > 0 ? 1 : kFree);
     for (uint32_t i = 1; i <= storages; ++i)
-      AddEntry(i, fmt::format("{:08}", i - 1), 1, i < storages ? i + 1 : kFree, kFree);
+      AddEntry(i, std::to_string(100000000 + i - 1).substr(1), 1, i < storages ? i + 1 : kFree, kFree);
   }
 
   HandmadeDocument& Put(size_t at, uint32_t value) {

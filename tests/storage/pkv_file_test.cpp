@@ -126,7 +126,7 @@ TEST(PkvNames, OnlyTheirOwnFormIsTaken) {
 // --- Sets, through both writers -------------------------------------------------------------------------------------
 
 void SortItems(PkvSet& set) {
-  std::sort(set.items.begin(), set.items.end(), [](const auto& a, const auto& b) {
+  std::ranges::sort(set.items, [](const auto& a, const auto& b) {
     return std::tuple(a.subscription, a.id, a.index) < std::tuple(b.subscription, b.id, b.index);
   });
 }
@@ -296,7 +296,7 @@ TEST_F(PkvFiles, WhatNoReaderTakesIsTold) {
   ASSERT_TRUE(outcome.done()) << outcome.text;
   EXPECT_EQ(read.items, set.items);
   EXPECT_EQ(read.files, set.files);
-  std::sort(read.unread.begin(), read.unread.end());
+  std::ranges::sort(read.unread);
   EXPECT_EQ(read.unread, (std::vector<std::string>{
                              "EFS_Backup/EFS_Data/00000009: a content without an entry",
                              "EFS_Backup/EFS_Dir/nine: no number of a file",

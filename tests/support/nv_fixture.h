@@ -65,9 +65,8 @@ class NvToolTest : public HandsetTest {
   }
   size_t CountRequests(std::string_view prefix) {
     const auto requests = handset().requests();
-    return static_cast<size_t>(std::count_if(requests.begin(), requests.end(), [&](const handset::Bytes& request) {
-      return HexText(request).starts_with(prefix);
-    }));
+    return static_cast<size_t>(std::ranges::count_if(
+        requests, [&](const handset::Bytes& request) { return HexText(request).starts_with(prefix); }));
   }
 
   std::string Path(const std::string& name) const { return folder_.Path(name); }

@@ -43,7 +43,7 @@ class PhoneLog {
   size_t Count(std::string_view line) const {
     const std::lock_guard lock(Registry().mutex);
     const Lines& lines = Registry().lines[handle_];
-    return static_cast<size_t>(std::count(lines.begin(), lines.end(), line));
+    return static_cast<size_t>(std::ranges::count(lines, line));
   }
 
  private:

@@ -82,7 +82,7 @@ class PkvTest : public EfsTest {
   }
   size_t RequestsOf(const handset::Bytes& prefix) {
     const auto requests = handset().requests();
-    return static_cast<size_t>(std::count_if(requests.begin(), requests.end(), [&](const handset::Bytes& request) {
+    return static_cast<size_t>(std::ranges::count_if(requests, [&](const handset::Bytes& request) {
       return request.size() >= prefix.size() && std::equal(prefix.begin(), prefix.end(), request.begin());
     }));
   }

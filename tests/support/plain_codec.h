@@ -55,7 +55,7 @@ class PlainDeframer {
  public:
   void Feed(const Bytes& chunk) {
     for (const uint8_t byte : chunk) Take(byte);
-    const bool zeros = std::all_of(packet_.begin(), packet_.end(), [](uint8_t byte) { return byte == 0; });
+    const bool zeros = std::ranges::all_of(packet_, [](uint8_t byte) { return byte == 0; });
     if (zeros) packet_.clear();
   }
 

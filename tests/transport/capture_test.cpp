@@ -144,7 +144,7 @@ TEST(CaptureFile, DamageEndsTheReadingAndForeignFilesAreRefused) {
   };
   for (const auto& c : cases) {
     Packet damaged = file;
-    std::copy(c.bytes.begin(), c.bytes.end(), damaged.begin() + static_cast<std::ptrdiff_t>(c.offset));
+    std::ranges::copy(c.bytes, damaged.begin() + static_cast<std::ptrdiff_t>(c.offset));
     const Reading reading = ReadAll(damaged);
     EXPECT_EQ(reading.packets.size(), c.packets) << c.name;
     EXPECT_EQ(reading.end, c.end) << c.name;

@@ -142,7 +142,7 @@ TEST_F(Engine, TimeOutClosesThePortAndKeepsTheRequest) {
   const auto kept = engine_->transport.timed_out_request();
   EXPECT_EQ(Bytes(kept.begin(), kept.end()), (Bytes{75, 9}));
   const auto lines = EngineLines();
-  EXPECT_NE(std::find(lines.begin(), lines.end(), "16 Request timed out"), lines.end());
+  EXPECT_NE(std::ranges::find(lines, "16 Request timed out"), lines.end());
 
   Open();
   AnswerWith({75});

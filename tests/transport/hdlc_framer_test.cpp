@@ -123,7 +123,7 @@ TEST_F(HdlcFramer, TooLongPayloadsAreRefusedBeforeAnythingIsWritten) {
   EXPECT_EQ(Send(Bytes(16381, 0x7E)), 0U);
   EXPECT_TRUE(port_.steps.empty());
   const Lines lines = lines_.Take();
-  EXPECT_EQ(std::count(lines.begin(), lines.end(), refusal[0]), 5);
+  EXPECT_EQ(std::ranges::count(lines, refusal[0]), 5);
   EXPECT_EQ(Send(Bytes(16381, 0x31)), 1U);
 }
 

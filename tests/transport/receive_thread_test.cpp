@@ -14,7 +14,7 @@ using std::chrono::milliseconds;
 constexpr uint32_t kNoTraffic = 0xFFFFFFFF & ~(kLogIo | kLogInfAhdlc);
 
 bool Has(const LogLines::Lines& lines, const std::string& line) {
-  return std::find(lines.begin(), lines.end(), line) != lines.end();
+  return std::ranges::find(lines, line) != lines.end();
 }
 
 struct Modes : testing::TestWithParam<std::tuple<ReceiveMode, bool>> {

@@ -399,8 +399,7 @@ TEST_F(UserTransportTest, EveryOperationGoesToTheFunctionsAndWhatIsNotPossibleIs
     EXPECT_EQ(port_.Receive(buffer_.data(), 8), row.received);
     EXPECT_EQ(port_.FlushPCBuffer(), row.flushed);
     const Lines lines = lines_.Take();
-    EXPECT_EQ(std::count_if(lines.begin(), lines.end(), [](const auto& line) { return line.starts_with("16 "); }),
-              row.errors)
+    EXPECT_EQ(std::ranges::count_if(lines, [](const auto& line) { return line.starts_with("16 "); }), row.errors)
         << testing::PrintToString(lines);
     const std::vector<std::string> all = {"send 119 8 8", "receive 119 8", "flush 119"};
     EXPECT_EQ(caller_.calls, whole && !row.caller.throws ? all : std::vector<std::string>());

@@ -67,7 +67,7 @@ std::string HintOf(const KRAL_ERROR& record) {
 // A code of a later library is a failure all the same.
 ExitCode CodeOf(const KRAL_ERROR& record) {
   const auto code = static_cast<ExitCode>(record.code);
-  const bool known = std::any_of(kExitNames.begin(), kExitNames.end(), [code](auto& row) { return row.first == code; });
+  const bool known = std::ranges::any_of(kExitNames, [code](auto& row) { return row.first == code; });
   return known && code != ExitCode::kDone ? code : ExitCode::kInternal;
 }
 

@@ -208,7 +208,7 @@ Option& Option::OneOf(std::initializer_list<std::string> words) {
   const std::vector<std::string> list(words);
   option_->type_name(Joined(list, "|"));
   return Check([list](const std::string& text) {
-    const bool known = std::find(list.begin(), list.end(), text) != list.end();
+    const bool known = std::ranges::find(list, text) != list.end();
     return known ? std::string() : Format("it is {}", Joined(list, " or "));
   });
 }

@@ -67,8 +67,7 @@ Json& Json::operator[](std::size_t index) {
 
 Json& Json::operator[](std::string_view name) {
   kind_ = Kind::kObject;
-  const auto found =
-      std::find_if(entries_.begin(), entries_.end(), [name](const Entry& entry) { return entry.name == name; });
+  const auto found = std::ranges::find_if(entries_, [name](const Entry& entry) { return entry.name == name; });
   if (found != entries_.end()) return found->value;
   entries_.push_back({std::string(name), {}});
   return entries_.back().value;

@@ -50,7 +50,7 @@ int End(const Context& context, const ToolError& error) {
 int Run(const std::vector<std::string>& arguments) {
   Context context;
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.
-  if (std::find(arguments.begin(), arguments.end(), "--json") != arguments.end()) context.out.UseJson();
+  if (std::ranges::find(arguments, "--json") != arguments.end()) context.out.UseJson();
   CommandLine command_line("kral", "Talks to mobile handsets in production and test.", VersionText);
   const auto root = command_line.root();
   AddCommonOptions(root, context);

@@ -40,8 +40,8 @@ std::optional<std::string> NearestWord(std::string_view word, const std::vector<
   const auto rank = [word](const std::string& other) {
     return std::pair(Distance(word, other), word.size() - CommonBeginning(word, other));
   };
-  const auto nearest = std::min_element(
-      known.begin(), known.end(), [&rank](const auto& left, const auto& right) { return rank(left) < rank(right); });
+  const auto nearest = std::ranges::min_element(
+      known, [&rank](const auto& left, const auto& right) { return rank(left) < rank(right); });
   if (nearest == known.end()) return {};
   const auto most = std::max(LettersOf(word).size(), LettersOf(*nearest).size()) + 1;
   if (2 * Distance(word, *nearest) > most) return {};

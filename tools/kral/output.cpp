@@ -128,7 +128,7 @@ std::string HexDump(std::span<const std::uint8_t> bytes) {
   for (std::size_t offset = 0; offset < bytes.size(); offset += kDumpWidth) {
     const auto line = bytes.subspan(offset, std::min(kDumpWidth, bytes.size() - offset));
     std::string characters;
-    std::transform(line.begin(), line.end(), std::back_inserter(characters), [](std::uint8_t byte) {
+    std::ranges::transform(line, std::back_inserter(characters), [](std::uint8_t byte) {
       const auto character = static_cast<char>(byte);
       return IsPrintable(character) ? character : '.';
     });

@@ -102,7 +102,7 @@ TEST_F(ComPortTest, RatesCanBeChanged) {
 TEST_F(ComPortTest, ThePortIsListedAndOpensAgainAfterAClose) {
   std::vector<uint16_t> ports;
   ASSERT_TRUE(ListComPorts(ports));
-  EXPECT_NE(std::find(ports.begin(), ports.end(), number_), ports.end());
+  EXPECT_NE(std::ranges::find(ports, number_), ports.end());
   port_.reset();
   EXPECT_EQ(OpenToWriteText("COM" + std::to_string(number_)), nullptr) << "lines of a log do not go to a handset";
   DeviceResult result;

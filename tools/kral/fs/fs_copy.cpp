@@ -38,8 +38,8 @@ void MakeLocalFolder(const std::string& path) {
 }
 
 std::string LowerCase(std::string text) {
-  std::transform(text.begin(), text.end(), text.begin(),
-                 [](unsigned char character) { return static_cast<char>(std::tolower(character)); });
+  std::ranges::transform(text, text.begin(),
+                         [](unsigned char character) { return static_cast<char>(std::tolower(character)); });
   return text;
 }
 

@@ -21,9 +21,9 @@ constexpr std::array<std::string_view, 6> kDevices{"aux", "con", "conin$", "cono
 bool IsDevice(std::string_view name) {
   std::string stem(name.substr(0, name.find('.')));
   stem.erase(stem.find_last_not_of(' ') + 1);
-  std::transform(stem.begin(), stem.end(), stem.begin(),
-                 [](unsigned char character) { return static_cast<char>(std::tolower(character)); });
-  if (std::find(kDevices.begin(), kDevices.end(), stem) != kDevices.end()) return true;
+  std::ranges::transform(stem, stem.begin(),
+                         [](unsigned char character) { return static_cast<char>(std::tolower(character)); });
+  if (std::ranges::find(kDevices, stem) != kDevices.end()) return true;
   if (!stem.starts_with("com") && !stem.starts_with("lpt")) return false;
   // One digit, or one of the three superscript digits, in Latin-1 or in UTF-8.
   const std::string_view digit = std::string_view(stem).substr(stem.size() == 5 && stem[3] == '\xC2' ? 4 : 3);
@@ -57,8 +57,8 @@ constexpr std::array<KnownError, 21> kErrors{{
     {39, "directory not empty"},
     {40, "too many links"},
 }};
-static_assert(std::is_sorted(kErrors.begin(), kErrors.end(),
-                             [](const auto& left, const auto& right) { return left.number < right.number; }));
+static_assert(std::ranges::is_sorted(kErrors,
+                                     [](const auto& left, const auto& right) { return left.number < right.number; }));
 
 char KindLetter(std::uint32_t mode) {
   switch (mode & KRAL_EFS_MODE_KIND) {
@@ -137,8 +137,8 @@ std::string TimeText(std::uint32_t seconds) {
 }
 
 std::string ErrorText(std::uint32_t error_number) {
-  const auto known = std::find_if(kErrors.begin(), kErrors.end(),
-                                  [error_number](const KnownError& row) { return row.number == error_number; });
+  const auto known =
+      std::ranges::find_if(kErrors, [error_number](const KnownError& row) { return row.number == error_number; });
   return known == kErrors.end() ? Format("error {}", error_number)
                                 : Format("error {}, {}", error_number, known->meaning);
 }

@@ -156,8 +156,7 @@ std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
         Format("{} on {} does not end: {} entries so far", what, DescribePort(session_.port()), entry_count_),
         "a handset that gives entries without end needs a restart; list its directories one by one");
   }
-  std::sort(entries_.begin(), entries_.end(),
-            [](const RemoteEntry& left, const RemoteEntry& right) { return left.name < right.name; });
+  std::ranges::sort(entries_, [](const RemoteEntry& left, const RemoteEntry& right) { return left.name < right.name; });
   return std::move(entries_);
 }
 

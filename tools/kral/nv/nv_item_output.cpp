@@ -81,8 +81,8 @@ Json JsonNumbers(const std::vector<std::string>& numbers) {
 // An object of the members; a list of them where names are missing or stand for several.
 Json JsonMembers(const std::vector<NamedNumbers>& members) {
   std::set<std::string> names{""};
-  const bool told_apart = std::all_of(members.begin(), members.end(),
-                                      [&](const NamedNumbers& member) { return names.insert(member.name).second; });
+  const bool told_apart =
+      std::ranges::all_of(members, [&](const NamedNumbers& member) { return names.insert(member.name).second; });
   Json json = told_apart ? Json::object() : Json::array();
   for (const NamedNumbers& member : members) {
     Json list = JsonNumbers(member.numbers);

@@ -57,8 +57,7 @@ std::uint8_t ReadOperatingState(const Session& session, std::uint32_t& state) {
 }
 
 std::string_view NameOfState(std::uint32_t state) {
-  const auto known = std::find_if(kStateNames.begin(), kStateNames.end(),
-                                  [state](const StateName& row) { return row.state == state; });
+  const auto known = std::ranges::find_if(kStateNames, [state](const StateName& row) { return row.state == state; });
   return known == kStateNames.end() ? "unknown" : known->name;
 }
 

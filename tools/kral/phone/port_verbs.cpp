@@ -15,7 +15,7 @@ void ShowPorts(const Context& context, bool probe) {
   Json list = Json::array();
   std::string text;
   for (const auto port : ports) {
-    const bool answers = std::find(answering.begin(), answering.end(), port) != answering.end();
+    const bool answers = std::ranges::find(answering, port) != answering.end();
     Json row{{"port", port}, {"device", ComPortDevice(port)}};
     if (probe) row["handset"] = answers;
     list.push_back(row);

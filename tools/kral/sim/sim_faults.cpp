@@ -41,8 +41,8 @@ constexpr std::array<Kind, 13> kKinds{{
     {"wrong", "code", [](std::uint32_t value) { return handset::WrongCode(static_cast<std::uint8_t>(value)); },
      "another first byte"},
 }};
-static_assert(std::is_sorted(kKinds.begin(), kKinds.end(),
-                             [](const Kind& left, const Kind& right) { return left.name < right.name; }));
+static_assert(std::ranges::is_sorted(kKinds,
+                                     [](const Kind& left, const Kind& right) { return left.name < right.name; }));
 
 [[noreturn]] void Reject(const std::string& words, const std::string& why) {
   throw ToolError(ExitCode::kUsage, Format("--fault {}: {}", words, why),
@@ -89,8 +89,7 @@ std::optional<When> ParseWhen(const Word& word) {
 }
 
 Fault ParseKind(const std::string& words, const Word& word) {
-  const auto kind =
-      std::find_if(kKinds.begin(), kKinds.end(), [&word](const Kind& known) { return known.name == word.name; });
+  const auto kind = std::ranges::find_if(kKinds, [&word](const Kind& known) { return known.name == word.name; });
   if (kind == kKinds.end()) Reject(words, Format("there is no fault '{}'", word.name));
   if (kind->value.empty()) {
     if (!word.value.empty()) Reject(words, Format("{} takes no value", kind->name));

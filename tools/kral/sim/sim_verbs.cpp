@@ -106,7 +106,7 @@ void Simulate(const Context& context, const SimOptions& options) {
 
 bool IsServiceCode(const std::string& text) {
   return text.size() == kServiceCodeSize &&
-         std::all_of(text.begin(), text.end(), [](unsigned char character) { return std::isdigit(character) != 0; });
+         std::ranges::all_of(text, [](unsigned char character) { return std::isdigit(character) != 0; });
 }
 
 void AddOptions(const Command& sim, SimOptions& options) {

@@ -89,8 +89,8 @@ void TrafficTable::Add(std::span<const std::uint8_t> packet) {
 
 std::vector<std::pair<std::string, TrafficTable::Row>> TrafficTable::Sorted() const {
   std::vector<std::pair<std::string, Row>> sorted(rows_.begin(), rows_.end());
-  std::stable_sort(sorted.begin(), sorted.end(),
-                   [](const auto& left, const auto& right) { return left.second.packets > right.second.packets; });
+  std::ranges::stable_sort(
+      sorted, [](const auto& left, const auto& right) { return left.second.packets > right.second.packets; });
   return sorted;
 }
 
