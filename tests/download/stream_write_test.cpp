@@ -277,6 +277,8 @@ TEST_F(StreamFiles, EveryFailureHasItsResultAndSaysWhy) {
        {file + " BAD_FILE line 1", "line 1", [&] { return Write(dropped, KRAL_STREAM_DATA_LOST); }},
        {file + " BAD_FILE", "second region", [&] { return Write(two, KRAL_STREAM_BAD_IMAGE); }},
        {"KRAL_STREAM_WriteImageMem ARGUMENT", "no bytes", [&] { return write_bytes(nullptr, 0); }},
+       {"KRAL_STREAM_WriteImageMem ARGUMENT", "513 bytes",
+        [&] { return WriteMem(bytes, 0, 0, std::vector<uint8_t>(513)) == KRAL_STREAM_WRITTEN; }},
        {"KRAL_STREAM_WriteImageMem ARGUMENT", "past address 0xFFFFFFFF",
         [&] { return write_bytes(bytes.data(), 0xFFFFFF00); }},
        {in_table + " ARGUMENT", "no file name",
