@@ -34,7 +34,7 @@ std::optional<NvBytes> ToStored(const NvItem& item, std::span<const uint8_t> val
 
 std::optional<NvBytes> FromStored(NvItem& item, std::span<const uint8_t> stored) {
   if (item.compressed) {
-    const auto plain = Decompress(stored, item.type->longest());
+    auto plain = Decompress(stored, item.type->longest());
     if (!plain || !item.type->Holds(*plain)) return std::nullopt;
     return plain;
   }

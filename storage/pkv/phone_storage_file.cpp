@@ -38,7 +38,7 @@ CompoundStorage& CPhoneStorageFile::configuration() {
 
 std::vector<uint8_t> CPhoneStorageFile::PropertyBytes(const PkvProperties& properties) {
   std::string text = properties.version + '\n';
-  for (const auto& [name, value] : properties.values) text += name + '=' + value + '\n';
+  for (const auto& [name, value] : properties.values) text.append(name).append(1, '=').append(value).append(1, '\n');
   return {text.begin(), text.end()};
 }
 

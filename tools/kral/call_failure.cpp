@@ -91,7 +91,7 @@ bool Names(std::string_view text, std::uint16_t port) {
 
 std::string SentenceOf(const KRAL_ERROR& record, std::string_view what, std::uint16_t port) {
   constexpr std::string_view kHandset = "the handset ";
-  const std::string text = record.text;
+  std::string text = record.text;
   if (IsLocal(record)) return text;
   const std::string where = Names(text, port) ? "" : " on " + DescribePort(port);
   if (IsOfRequest(record)) return Format("{}{}: {}", what, where, text);

@@ -40,10 +40,9 @@ std::optional<Number> ParseNumber(std::string_view text) {
   std::from_chars_result parsed{};
   if constexpr (std::is_floating_point_v<Number>) {
     parsed = std::from_chars(text.data(), end, value);
-  } else if (text.starts_with("0x") || text.starts_with("0X")) {
-    parsed = std::from_chars(text.data() + 2, end, value, 16);
   } else {
-    parsed = std::from_chars(text.data(), end, value);
+    const bool hex = text.starts_with("0x") || text.starts_with("0X");
+    parsed = std::from_chars(text.data() + (hex ? 2 : 0), end, value, hex ? 16 : 10);
   }
   if (parsed.ec != std::errc() || parsed.ptr != end) return std::nullopt;
   return value;
@@ -298,14 +297,14 @@ Option Command::Add(const char* names, std::vector<std::pair<std::string, std::s
 
 template <class Number>
 Option Command::AddNumbers(const char* names, std::string_view help, std::function<void(Number)> set,
-                           std::string now) const {
+                           const std::string& now) const {
   const auto range = std::make_shared<NumberRange>(RangeOf<Number>());
   auto option = AddWords(
       names,
       [name = NameOf(names), range, set = std::move(set)](const std::vector<std::string>& words) {
         for (const auto& word : words) set(TakeNumber<Number>(name, word, *range));
       },
-      help, std::move(now));
+      help, now);
   option.range_ = range;
   option.option_->type_name("NUMBER");
   return option;

@@ -81,7 +81,8 @@ class Command {
   Command(CLI::App& app, Action& chosen) : app_(&app), chosen_(&chosen) {}
   Option AddWords(const char* names, Sink sink, std::string_view help, std::string default_text) const;
   template <class Number>
-  Option AddNumbers(const char* names, std::string_view help, std::function<void(Number)> set, std::string now) const;
+  Option AddNumbers(const char* names, std::string_view help, std::function<void(Number)> set,
+                    const std::string& now) const;
 
   CLI::App* app_;
   Action* chosen_;
