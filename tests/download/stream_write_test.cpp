@@ -1,5 +1,6 @@
 // Whole images into the flash of the virtual handset, through every kind of trouble with the acknowledgements. What
 // always holds: flash equals the image, or the call has failed.
+#include "download/stream/download_agent.h"
 #include "download/stream/image_write_cmd.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/failures.h"
@@ -21,6 +22,18 @@ class StreamWrite : public DownloadTest {
     EXPECT_TRUE(handset().flash().Load(address, bytes.size()) == bytes) << "flash differs from the image";
   }
 };
+
+// What a failed call reports as acknowledged was so when it failed, whatever comes until it returns.
+TEST(DownloadAgent, AcknowledgesNothingAfterAFailure) {
+  stream::DownloadAgent agent;
+  agent.Start(2);
+  agent.Enqueue({0, 20, 0});
+  ASSERT_TRUE(agent.Carve(10) && agent.Carve(10));
+  ASSERT_TRUE(agent.Acknowledge(0));
+  agent.Fail({});
+  EXPECT_FALSE(agent.Acknowledge(10));
+  EXPECT_EQ(agent.bytes_acknowledged(), 10u);
+}
 
 TEST_F(StreamWrite, ImageIsInFlashAndTheWindowIsKept) {
   ProgrammerSettings settings;
