@@ -1,8 +1,8 @@
 // Requests as typed rows: a row names the fields behind its header, and Send appends exactly those, little-endian. A
 // missing, surplus or too wide field does not compile.
 //
-//   inline constexpr DiagRequest<u16> kSetDipsw{48};
-//   Send(phone, kSetDipsw, switches);              // 30 lo hi
+//   inline constexpr DiagRequest<u16> kSetSwitches{48};
+//   Send(phone, kSetSwitches, switches);           // 30 lo hi
 //
 // What stands in front of the fields, and how the packet goes out, is the row's header type. A header has
 //   key()                         by which a table of rows is sorted

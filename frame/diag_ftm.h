@@ -71,10 +71,10 @@ class Diag_FTM {
   void Retire();
 
   // --- Requests ---------------------------------------------------------------------------------------------------
-  // Held for a whole operation by OnPhone; recursive, so that operations may be built from operations.
+  // Held for a whole operation by ExportCall::Run; recursive, so that operations may be built from operations.
   std::recursive_mutex& request_lock() { return request_lock_; }
 
-  // The default buffer of the core, FTM and NV commands. Index 0..2.
+  // The default buffer of all commands; by index 1 that of EFS2 requests beside one under way, and 2, which is spare.
   CDiagPacket& packet(size_t index = 0) { return packets_[index]; }
 
   // Sends the buffer's request and awaits the reply that begins with the request's first byte, into the buffer's
@@ -85,7 +85,7 @@ class Diag_FTM {
   Reply Send(CDiagPacket& packet) { return Send(packet, TimeOut(kTimeOutDefaultCommand)); }
 
   // After a request whose answer is still owed the next one may be answered by it, where the reply does not tell. With
-  // this on, Send and Synchronize ask for a loopback first, which tells: what comes in front of its echo is passed
+  // this on, Send and Synchronise ask for a loopback first, which tells: what comes in front of its echo is passed
   // over.
   void SetResynchronise(bool on) { resynchronise_ = on; }
   // Asks for it where it is due. `passed_over` sees the replies in front. Not the echo within the time-out: the request

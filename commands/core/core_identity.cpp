@@ -12,6 +12,7 @@
 #include "commands/nv/nv_item.h"
 #include "frame/diag_ftm.h"
 #include "frame/request_failure.h"
+#include "kral/diag.h"
 
 namespace kral::diag {
 namespace {
@@ -20,12 +21,6 @@ namespace {
 struct VersionRecord {
   std::array<uint8_t, CDiagPacket::kCapacity> bytes;
 };
-
-// Written where a serial number cannot be had.
-constexpr uint32_t kNoSerialNumber = 0xDEADBEEF;
-
-// What a caller's text buffer of the build identity must hold, the terminator included.
-constexpr size_t kBuildTextSize = 4096;
 
 void PutText(char* output, std::span<const uint8_t> record, TextField field) {
   if (output != nullptr) std::memcpy(output, record.data() + field.offset, field.size);
@@ -36,7 +31,7 @@ std::string TakeText(std::span<const uint8_t>& rest) {
   const auto end = std::ranges::find(rest, uint8_t{0});
   std::string text(rest.begin(), end);
   rest = rest.subspan(std::min(rest.size(), text.size() + 1));
-  return text.substr(0, kBuildTextSize - 1);
+  return text.substr(0, KRAL_BUILD_ID_TEXT_SIZE - 1);
 }
 
 void PutTerminated(char* output, const std::string& text) {
@@ -104,12 +99,12 @@ bool ReadSerialNumber(Diag_FTM& phone, uint32_t* serial) {
   phone.log().WriteLine(kLogFn, "DIAG_READ_ESN_F() -- Start");
   if (phone.target_type() == kTargetApplication) {
     phone.log().WriteLine(kLogRet, "DIAG_READ_ESN() is not supported on ZTD target. Return 0xDEADBEEF ");
-    Put(serial, kNoSerialNumber);
+    Put(serial, uint32_t{KRAL_NO_SERIAL_NUMBER});
     return true;
   }
   if (phone.target_type() != kTargetModem) {
     phone.log().WriteLine(kLogErr, "DIAG_READ_ESN(), Unknown target type!");
-    Put(serial, kNoSerialNumber);  // written although the call fails
+    Put(serial, uint32_t{KRAL_NO_SERIAL_NUMBER});  // written although the call fails
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the target type %d is unknown", phone.target_type()));
   }
 

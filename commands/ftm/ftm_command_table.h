@@ -1,4 +1,4 @@
-// The RF commands that go out with the current mode id: id, name and whether the caller gives the payload.
+// The RF commands that go out with the current mode id: id, name and which mode takes it.
 #ifndef KRAL_COMMANDS_FTM_FTM_COMMAND_TABLE_H
 #define KRAL_COMMANDS_FTM_FTM_COMMAND_TABLE_H
 

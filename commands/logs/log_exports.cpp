@@ -19,7 +19,6 @@ using kral::Failure;
 using kral::Put;
 using std::chrono::milliseconds;
 
-static_assert(sizeof(KRAL_EVENT) == kral::EventRecord::kSize);
 static_assert(KRAL_LONGEST_PACKET == kral::kMaximumPacket);
 
 constexpr const char* kNoFileName = "there is no file name";

@@ -6,11 +6,11 @@
 #include "base/at_exit.h"
 #include "base/failure.h"
 #include "base/guarded_call.h"
+#include "base/wire_codes.h"
 
 namespace kral::download {
 namespace {
 
-constexpr size_t kFcsBytes = 2;
 constexpr uint32_t kLookAroundMs = 50;
 
 }  // namespace
@@ -34,7 +34,7 @@ Reply DownloadConnection::AwaitReply(uint8_t expected_code, uint32_t time_out_ms
   const auto record = responses().PopWithin(std::chrono::milliseconds(time_out_ms));
   if (!record) return ReplyKind::kNone;
   room_.assign(record->begin(), record->end());
-  const auto bytes = std::span<const uint8_t>(room_).first(room_.size() - std::min(room_.size(), kFcsBytes));
+  const auto bytes = std::span<const uint8_t>(room_).first(room_.size() - std::min(room_.size(), kFcsSize));
   const uint8_t code = bytes.empty() ? uint8_t{0} : bytes[0];
   return {!bytes.empty() && code == expected_code ? ReplyKind::kExpected : ReplyKind::kOther, code, bytes};
 }

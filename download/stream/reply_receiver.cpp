@@ -3,10 +3,11 @@
 
 #include <algorithm>
 
+#include "base/wire_codes.h"
+
 namespace kral::stream {
 namespace {
 
-constexpr size_t kFcsBytes = 2;
 constexpr size_t kShortestFrame = 5;
 
 const char* TextOf(WriteReply result) {
@@ -31,7 +32,7 @@ const char* TextOf(WriteReply result) {
 void CReplyRcvrCont::OnFrame(std::span<const uint8_t> frame) {
   if (!response_.Accepts(frame)) return;
   if (frame.size() < kShortestFrame) log_.WriteLine(kLogErr, "yes: size too small\n");
-  const auto payload = frame.first(frame.size() - std::min(frame.size(), kFcsBytes));
+  const auto payload = frame.first(frame.size() - std::min(frame.size(), kFcsSize));
   const WriteReply result = parser_.ParseReply(payload);
   switch (result) {
     case WriteReply::kAcknowledged:

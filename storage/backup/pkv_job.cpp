@@ -1,4 +1,5 @@
-// The counts and reports of backups, restores and comparisons, and the files that the latter two begin with.
+// What backups, restores and comparisons share: counts and reports, the files that the latter two begin with, which
+// items are elements of arrays, and when files are the same. The jobs are run in pkv_run.cpp.
 #include "storage/backup/pkv_jobs.h"
 
 #include "base/failure.h"

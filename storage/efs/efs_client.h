@@ -16,7 +16,9 @@ namespace kral::efs {
 bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size);
 bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
                   KRAL_EFS_DIRECTORY_CALLBACK directory);
-bool Abort(Diag_FTM& phone);
+
+// --- Aborts (efs_settings.cpp) ------------------------------------------------------------------------------------
+bool Abort(Diag_FTM& phone);  // without the request lock
 
 // What is made of many transfers and listings, each of which forgets earlier calls of Abort, ends with one of them.
 class AbortWatch {

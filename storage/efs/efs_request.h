@@ -27,7 +27,8 @@ inline constexpr size_t kSidePacket = 1;  // for requests that leave the default
 // not put every later one off by one.
 Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own = {});
 
-// All of these act on the request in the phone's default packet buffer, where the reply is found afterwards.
+// These act on the request in the phone's default packet buffer unless they are given one, and the reply is found there
+// afterwards.
 
 // False (logged) when a request with a path is longer than the handset takes.
 bool IsWithinLimit(Diag_FTM& phone);

@@ -1,4 +1,5 @@
-// The EFS settings of a phone object. They are read by a transfer as it goes, so none of this waits for one.
+// The EFS settings of a phone object, its callbacks and its aborts. A transfer reads them as it goes, so that setting
+// them never waits for one.
 #include "storage/efs/efs_client.h"
 
 #include "base/guarded_call.h"

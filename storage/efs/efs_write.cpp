@@ -29,6 +29,7 @@ bool HasRoom(Diag_FTM& phone, u32 size) {
   }
   const uint64_t available = uint64_t{status.available_blocks} * status.block_size;
   if (size <= available) return true;
+  // Kept: the line says local disk, and means the handset's.
   phone.log().WriteLine(kLogErr, "Available size on local disk is insufficient.  tot_data_size = %u,  availSpace=%lld",
                         size, static_cast<long long>(available));
   // The number that the handset itself would come to later.

@@ -44,7 +44,7 @@ class EfsEntryStorage {
   const Access access_;
   CompoundStorage* directory_ = nullptr;
   CompoundStorage* data_ = nullptr;
-  std::map<std::string, uint32_t> numbers_;  // by pkv::PathKey
+  std::map<std::string, uint32_t> numbers_;  // by PathKey
   std::set<uint32_t> used_;
   uint32_t next_number_ = 0;  // none below it is free
 };

@@ -1,4 +1,5 @@
-// The frame of a PKV file; what is in the configuration belongs to the storage-access classes.
+// The frame of a PKV file; what is in the configuration belongs to nv_storage, item_array and
+// file_section.
 #include "storage/pkv/phone_storage_file.h"
 
 #include <algorithm>

@@ -46,11 +46,11 @@ TEST_F(LastError, NamesWhatWasWrong) {
   const std::string kSwitches = "KRAL_DIAG_GET_DIPSW_F";
   const auto prepare = [&] {
     handset().faults().Clear();
-    KRAL_ConfigureTimeOut(h, 0, 40);
-    KRAL_ConfigureTimeOut(h, kTimeOutModeReadBack, 40);
+    KRAL_ConfigureTimeOut(h, 0, 150);
+    KRAL_ConfigureTimeOut(h, kTimeOutModeReadBack, 150);
   };
   const std::vector<test::FailureRow> rows = {
-      {kSwitches + " NO_ANSWER", "no answer to command 47 within 40 ms", switches_with(handset::Ignore())},
+      {kSwitches + " NO_ANSWER", "no answer to command 47 within 150 ms", switches_with(handset::Ignore())},
       {kSwitches + " REFUSED REFUSAL 19", "refused command 47 with 19", switches_with(handset::Refuse(19))},
       {"KRAL_FTM_SET_TX_ON REFUSED REFUSAL 20", "refused command 75/11/1 with 20",
        [&] { return on(handset::Refuse(20)), KRAL_FTM_SET_TX_ON(h); }},

@@ -56,6 +56,7 @@ TEST_F(EfsWire, SingleRequestsHandOutTheErrorNumber) {
     SCOPED_TRACE(row.name);
     handset().Expect(row.request).Reply(row.reply);
     uint32_t error_number = 0;
+    ShortenTimeOuts(4000);
     EXPECT_EQ(row.call(handle(), &error_number), 1) << LogText();
     EXPECT_EQ(error_number, 13u);
     EXPECT_TRUE(HasLine(KRAL_LOG_C_HIGH_LEVEL_START, row.name));

@@ -16,7 +16,7 @@ class StorageFailure : public test::EfsTest {
   void ExpectFailures(const std::vector<test::FailureRow>& rows) {
     test::ExpectFailures(handle(), rows, [this] {
       handset().faults().Clear();
-      ShortenTimeOuts(40);
+      ShortenTimeOuts(150);
     });
   }
 

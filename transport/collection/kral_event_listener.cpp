@@ -1,5 +1,5 @@
-// Sorts packets into the queues by their first byte. How the queues are emptied is left to the engine and to the
-// collection functions.
+// Sorts packets into the queues by their first byte, and hands them to callbacks and the capture on the way. How the
+// queues are emptied is left to the engine and to the collection functions.
 #include "transport/collection/kral_event_listener.h"
 
 #include <algorithm>

@@ -1,5 +1,5 @@
-// The life of a connection: port and receive thread, opened, paused, resumed and stopped. Requests are in
-// kral_thread_requests.cpp, the thread's own work in receive_loop.cpp.
+// The life of a connection: port and receive thread, opened, paused, resumed and stopped; and the way of the thread's
+// packets to the dispatcher. Requests are in kral_thread_requests.cpp, the thread's own work in receive_loop.cpp.
 #include "transport/engine/kral_thread_interface.h"
 
 #include <utility>

@@ -14,8 +14,6 @@ namespace {
 // A bound for what takes microseconds, unless a listener or a log callback holds the threads up.
 constexpr uint32_t kSettleMs = 20;
 
-constexpr uint8_t kTry115200 = 0x04;
-
 bool IsUnframed(PacketMode mode) {
   return mode == PacketMode::kUnframed1 || mode == PacketMode::kUnframed2;
 }
@@ -122,8 +120,8 @@ void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
   timed_out_request_.assign(request.begin(), request.end());
   log_.WriteLine(kLogErr, "Request timed out");
   Close();
-  splitter_
-      .DropPartialPacket();  // a caller's transport stays open: what broke off belongs to what has ended all the same
+  // A caller's transport stays open: what broke off belongs to what has ended all the same.
+  splitter_.DropPartialPacket();
 }
 
 Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
@@ -224,7 +222,7 @@ Reply CKralThreadInterface::ReturnToFramedMode() {
     ResumeThread();
     return ReplyKind::kNotSent;
   }
-  const bool switched = framer_.Data2DM(kTry115200) == 1;
+  const bool switched = framer_.Data2DM(CProtAHDLC::kTry115200) == 1;
   if (!was_paused) ResumeThread();
   return switched ? ReplyKind::kExpected : ReplyKind::kNone;
 }

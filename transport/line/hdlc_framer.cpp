@@ -1,5 +1,5 @@
-// The sender's I/O: frames to the port, and the AT exchange that brings a port into diagnostic mode. The frame format
-// is hdlc_frame's.
+// The framer's I/O: frames to the port, raw reads for the receive thread, and the AT exchange that brings a port into
+// diagnostic mode. The frame format is hdlc_frame's.
 #include "transport/line/hdlc_framer.h"
 
 #include <algorithm>
@@ -14,8 +14,6 @@ namespace {
 
 constexpr char kTooLong[] = "Error. String size exceeds maximum buffer size.";
 
-constexpr uint8_t kTry19200 = 0x01;
-constexpr uint8_t kTry115200 = 0x04;
 constexpr std::string_view kDiagnosticModeCommand = "AT$XJDMG\r";
 constexpr int kAttemptsPerRate = 2;
 constexpr uint32_t kAnswerMs = 200;

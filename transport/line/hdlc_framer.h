@@ -1,4 +1,4 @@
-// The sending side of async-HDLC framing, and the switch of an AT-command port into diagnostic mode.
+// The sending side of async-HDLC framing, raw reads, and the switch of an AT-command port into diagnostic mode.
 #ifndef KRAL_TRANSPORT_LINE_HDLC_FRAMER_H
 #define KRAL_TRANSPORT_LINE_HDLC_FRAMER_H
 
@@ -13,10 +13,14 @@ class CSerialPort;
 
 class CProtAHDLC {
  public:
+  // The rates that Data2DM tries.
+  static constexpr uint8_t kTry19200 = 0x01;
+  static constexpr uint8_t kTry115200 = 0x04;
+
   explicit CProtAHDLC(Clock& clock = SystemClock()) : clock_(clock) {}
   virtual ~CProtAHDLC() = default;
 
-  virtual uint32_t Data2DM(uint8_t baud_rate_mask);  // bit 0: 19200 baud, bit 2: 115200 baud
+  virtual uint32_t Data2DM(uint8_t baud_rate_mask);  // of kTry...
   virtual uint32_t FlushPhoneBuffer();               // writes one flag byte
   virtual uint8_t SetStartFlag(uint8_t on);          // gives the previous setting
   virtual uint32_t SetRawDataFlag(uint32_t value);

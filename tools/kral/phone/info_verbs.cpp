@@ -10,9 +10,6 @@
 namespace kral::tool {
 namespace {
 
-// The room that the library asks for each text of the build identity.
-constexpr std::size_t kBuildTextSize = 4096;
-
 // The report in its two forms: an object, and lines of label and value.
 struct Report {
   Json members = Json::object();
@@ -58,7 +55,7 @@ void ReportVersion(Session& session, Report& report) {
 
 void ReportBuild(Session& session, Report& report) {
   std::uint32_t hardware = 0, model_number = 0;
-  std::vector<char> revision(kBuildTextSize), model(kBuildTextSize);
+  std::vector<char> revision(KRAL_BUILD_ID_TEXT_SIZE), model(KRAL_BUILD_ID_TEXT_SIZE);
   session.Run("the build-identity request", [&] {
     return KRAL_DIAG_EXT_BUILD_ID_F(session.handle(), &hardware, &model_number, revision.data(), model.data());
   });
