@@ -8,6 +8,7 @@
 #include "frame/resource_manager.h"
 #include "handset/caller_transport.h"
 #include "kral/connection.h"
+#include "kral/diag.h"
 #include "kral/text_log.h"
 #include "kral/transport.h"
 #include "tests/support/fake_clock.h"
@@ -287,14 +288,15 @@ TEST_F(Connection, DisconnectOfASharedRowClosesThePortAndTheNextRequestReopensIt
   KRAL_ConnectServer(kPort);
   KRAL_DisconnectServer(com);
   EXPECT_FALSE(ports_.IsOpen(kPort));
-  EXPECT_EQ(KRAL_IsPhoneConnected(com), 1);
+  uint32_t serial = 0;
+  EXPECT_EQ(KRAL_DIAG_READ_ESN_F(com, &serial), 1);
   EXPECT_TRUE(ports_.IsOpen(kPort));
   KRAL_DisconnectServer(com);
 
   const KRAL_HANDLE callers = ConnectThroughCable();
   EXPECT_EQ(ConnectThroughCable(), callers);
   KRAL_DisconnectServer(callers);
-  EXPECT_EQ(KRAL_IsPhoneConnected(callers), 1) << "with the same functions";
+  EXPECT_EQ(KRAL_DIAG_READ_ESN_F(callers, &serial), 1) << "with the same functions";
   EXPECT_EQ(ports_.opens(), (Ports{kPort, kPort, kPort}));
 }
 
