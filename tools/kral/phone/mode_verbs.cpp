@@ -11,7 +11,6 @@ namespace {
 // The operating-mode query: subsystem 15, command 0; the state is a 32-bit value at offset 8 of the reply.
 constexpr std::array<std::uint8_t, 4> kQuery{0x4B, 0x0F, 0x00, 0x00};
 constexpr std::size_t kStateOffset = 8;
-constexpr std::uint32_t kDefaultTimeOutMs = 4000;
 
 struct StateName {
   std::uint32_t state;

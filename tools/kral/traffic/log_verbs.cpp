@@ -75,7 +75,8 @@ void List(const Context& context, const LogOptions& options) {
   const auto ranges = ReadRanges(session);
   Json rows = Json::array();
   std::string text;
-  for (std::uint8_t id = 0; id < ranges.size(); ++id) {
+  for (std::uint32_t equipment = 0; equipment < ranges.size(); ++equipment) {
+    const auto id = static_cast<std::uint8_t>(equipment);
     if (ranges[id] == 0) continue;
     Json codes = Json::array();
     std::string lines;
@@ -108,7 +109,8 @@ void SwitchCodes(Session& session, const Codes& codes, bool on) {
 
 void SwitchAll(Session& session, bool on) {
   const auto ranges = ReadRanges(session);
-  for (std::uint8_t id = 0; id < ranges.size(); ++id) {
+  for (std::uint32_t equipment = 0; equipment < ranges.size(); ++equipment) {
+    const auto id = static_cast<std::uint8_t>(equipment);
     if (ranges[id] == 0) continue;
     if (!on) {
       session.Run(Format("switching off equipment id {}", id),

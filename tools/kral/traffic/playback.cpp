@@ -115,7 +115,7 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
 std::string TimeText(std::uint64_t microseconds) {
   constexpr std::uint64_t kEndOfYear9999 = 253'402'300'800'000'000;
   if (microseconds >= kEndOfYear9999) return std::to_string(microseconds);
-  const std::chrono::sys_time time{std::chrono::microseconds(microseconds)};
+  const std::chrono::sys_time<std::chrono::microseconds> time{std::chrono::microseconds(microseconds)};
   const auto day = std::chrono::floor<std::chrono::days>(time);
   const std::chrono::year_month_day date(day);
   const std::chrono::hh_mm_ss clock(time - day);
