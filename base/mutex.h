@@ -21,9 +21,7 @@ namespace kral {
 template <class StdMutex>
 class KRAL_THREAD_SAFETY(capability("mutex")) CheckedMutex {
  public:
-  void Lock() KRAL_THREAD_SAFETY(acquire_capability()) { mutex_.lock(); }
   bool TryLock() KRAL_THREAD_SAFETY(try_acquire_capability(true)) { return mutex_.try_lock(); }
-  void Unlock() KRAL_THREAD_SAFETY(release_capability()) { mutex_.unlock(); }
 
  private:
   template <class>

@@ -15,7 +15,7 @@ namespace {
 // Bounds the table where threads come and go: some 90 KiB.
 constexpr size_t kMostEntries = 256;
 
-static_assert(sizeof(KRAL_ERROR) == 360, "no padding: callers of other languages declare it field by field");
+// No padding: callers of other languages declare it field by field.
 static_assert(offsetof(KRAL_ERROR, offset) == 32 && offsetof(KRAL_ERROR, text) == 104);
 
 // The system hands thread ids out again; these numbers are each thread's alone.
