@@ -90,7 +90,7 @@ class Diag_FTM {
   void SetResynchronise(bool on) { resynchronise_ = on; }
   // Asks for it where it is due. `passed_over` sees the replies in front. Not the echo within the time-out: the request
   // that was to follow counts as not answered, and is better not sent.
-  Reply Synchronise(uint32_t time_out_ms, const std::function<void(std::span<const uint8_t>)>& passed_over = {});
+  Reply Synchronise(uint32_t time_out_ms);
   // After a request whose answer nobody awaits any more.
   void OweAnswer();
   // Whether such an answer may come instead of the next request's.

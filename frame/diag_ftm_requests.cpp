@@ -64,7 +64,7 @@ Reply Diag_FTM::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms
   return Noted(reply, request, time_out_ms);
 }
 
-Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::span<const uint8_t>)>& passed_over) {
+Reply Diag_FTM::Synchronise(uint32_t time_out_ms) {
   if (!answer_owed_ || !(resynchronise_ || resynchronising_ > 0) || server_mode() || !framed_) {
     return ReplyKind::kExpected;
   }
@@ -72,9 +72,7 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::
   std::array<uint8_t, 6> loopback{kLoopbackRequest[0], 'S'};  // the liveness check's has other content
   StoreLe(loopback, 2, ++loopbacks_);
   const ReplyTest is_own = [&](std::span<const uint8_t> reply) {
-    if (std::equal(loopback.begin(), loopback.end(), reply.begin(), reply.end())) return true;
-    if (passed_over) passed_over(reply);
-    return false;
+    return std::equal(loopback.begin(), loopback.end(), reply.begin(), reply.end());
   };
   std::array<uint8_t, kMaximumPacket> room;
   const uint32_t start = clock_.TickMs();
@@ -86,7 +84,6 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms, const std::function<void(std::
       reply = {ReplyKind::kExpected, reply.code(), reply.bytes()};
       break;
     }
-    is_own(reply.bytes());
     const uint32_t elapsed = clock_.TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
     reply = transport().AwaitNext(room, loopback[0], time_out_ms - elapsed, is_own);

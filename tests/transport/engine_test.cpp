@@ -288,11 +288,11 @@ TEST_F(Engine, WhatBrokeOffBelongsToTheConnectionThatHasEnded) {
   }
 }
 
-TEST_F(Engine, ShowsWhatARequestDropsAndTellsDamageFromSilence) {
+TEST_F(Engine, ShowsWhatNoRequestTakesAndTellsDamageFromSilence) {
   Open();
-  engine_->responses.Push(Bytes{75, 19, 2, 0});
+  engine_->responses.Push(Bytes{75, 19, 2, 0, 0xF, 0xC});
   std::vector<Packet> dropped;
-  engine_->transport.SetForgotten(
+  engine_->transport.SetUnclaimed(
       [&](std::span<const uint8_t> late) { dropped.emplace_back(late.begin(), late.end()); });
   // Damaged while the request is still being written.
   wire_.OnWrite([this](const Bytes&) {
@@ -306,6 +306,20 @@ TEST_F(Engine, ShowsWhatARequestDropsAndTellsDamageFromSilence) {
   Bytes room(16);
   EXPECT_EQ(engine_->transport.SendSync(Bytes{75}, room, 75, kShort, 0).kind(), ReplyKind::kGarbled);
   EXPECT_EQ(dropped, (std::vector<Packet>{{75, 19, 2, 0}}));
+
+  Open();
+  dropped.clear();
+  wire_.OnWrite([](const Bytes&) {
+    Bytes both = PlainFrame({38, 1});
+    const Bytes right = PlainFrame({38, 2});
+    both.insert(both.end(), right.begin(), right.end());
+    return both;
+  });
+  const ReplyTest second = [](std::span<const uint8_t> reply) { return reply[1] == 2; };
+  EXPECT_TRUE(engine_->transport.SendSync(Bytes{38}, room, 38, kBusy, 0, second));
+  AnswerWith({75, 1});
+  EXPECT_EQ(engine_->transport.SendSync(Bytes{38}, room, 38, kBusy, 0).kind(), ReplyKind::kOther);
+  EXPECT_EQ(dropped, (std::vector<Packet>{{38, 1}, {75, 1}}));
 }
 
 TEST_F(Engine, CountsWhatCameAndWhatWasLost) {

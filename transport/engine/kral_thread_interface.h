@@ -80,8 +80,9 @@ class CKralThreadInterface {
   // handset that is only slow may answer for a moment still. The port stays open. Returns the former one.
   const std::atomic<bool>* SetAbort(const std::atomic<bool>* abort) { return std::exchange(abort_, abort); }
   bool aborted() const { return abort_ != nullptr && abort_->load(); }
-  // Is given what comes between two requests and is dropped, FCS bytes included; empty: nobody.
-  void SetForgotten(std::function<void(std::span<const uint8_t>)> forgotten) { forgotten_ = std::move(forgotten); }
+  // Is given every reply that no request takes: one that comes between two requests, answers an earlier one, or has
+  // another first byte; empty: nobody.
+  void SetUnclaimed(std::function<void(std::span<const uint8_t>)> unclaimed) { unclaimed_ = std::move(unclaimed); }
   // Takes whatever comes first, FCS bytes included. A time-out leaves the port open.
   Reply SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms);
   // Awaits no reply: expected means written.
@@ -150,7 +151,7 @@ class CKralThreadInterface {
   std::atomic<bool> null_port_{false};
   std::atomic<bool> waits_ended_{false};      // since the port was opened
   const std::atomic<bool>* abort_ = nullptr;  // both of whoever holds the request lock
-  std::function<void(std::span<const uint8_t>)> forgotten_;
+  std::function<void(std::span<const uint8_t>)> unclaimed_;
   uint64_t garbled_before_ = 0;  // the request that was sent last
   bool user_defined_ = false;
   bool paused_ = false;

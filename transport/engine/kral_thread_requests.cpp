@@ -23,11 +23,14 @@ bool BeginsWithAt(std::span<const uint8_t> request) {
 }
 
 // What of a record the room takes, less the FCS bytes at the record's end.
+std::span<const uint8_t> WithoutFcs(const Packet& record) {
+  return std::span(record).first(record.size() > kFcsSize ? record.size() - kFcsSize : 0);
+}
+
 std::span<const uint8_t> CopyRecord(const Packet& record, std::span<uint8_t> room) {
   const size_t count = std::min(record.size(), room.size());
   std::copy_n(record.begin(), count, room.begin());
-  const size_t length = record.size() > kFcsSize ? record.size() - kFcsSize : 0;
-  return room.first(std::min(length, count));
+  return room.first(std::min(WithoutFcs(record).size(), count));
 }
 
 }  // namespace
@@ -74,7 +77,7 @@ void CKralThreadInterface::ForgetReplies() {
   loop_.WaitForChunk(kSettleMs);
   if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
   for (const Packet& record : responses_->TakeAll()) {
-    if (forgotten_) forgotten_(record);
+    if (unclaimed_) unclaimed_(WithoutFcs(record));
   }
   garbled_before_ = splitter_.deframer().bad_fcs();
 }
@@ -87,13 +90,15 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
     const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
     if (!record || record->empty()) return WhyNoReply();
     const auto bytes = CopyRecord(*record, room);
-    if (record->front() != expected_code) {
+    const bool expected = record->front() == expected_code;
+    if (expected && (!is_own || is_own(bytes))) return {ReplyKind::kExpected, expected_code, bytes};
+    if (unclaimed_) unclaimed_(WithoutFcs(*record));
+    if (!expected) {
       // The first other reply ends the request: the handset answers in order, so what was asked for will not come.
       log_.WriteLine(kLogErr, "Received different response command byte (0x%X)than was requested (0x%X)",
                      record->front(), expected_code);
       return {ReplyKind::kOther, record->front(), bytes};
     }
-    if (!is_own || is_own(bytes)) return {ReplyKind::kExpected, expected_code, bytes};
     log_.WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
   }
 }
