@@ -17,7 +17,8 @@
  *   a restore. The callback receives the progress and can end it; other requests on the handle wait for its end.
  * - A backup lists the item folders first. Until that is done the total is not known and the callback is not called;
  *   the directory callback (KRAL_ConfigureEfs2CallBacks) is, with every entry. KRAL_AbortEFS_Operation ends the work
- *   also then, and in the midst of a file.
+ *   also then, and in the midst of an item or a file. The answer that it did not wait for may come late, in front of
+ *   that to the next request, which then fails unless the handle resynchronises (KRAL_SetResynchronise).
  */
 #ifndef KRAL_PKV_H
 #define KRAL_PKV_H

@@ -14,7 +14,8 @@ using Answer = items::PhoneItems::Answer;
 class RestoreJob {
  public:
   RestoreJob(Diag_FTM& phone, const efs::AbortWatch& aborts, const pkv::PkvSet& set)
-      : items_(phone),
+      : aborts_(aborts),
+        items_(phone),
         set_(set),
         arrays_(phone, set),
         report_(phone, aborts, set.items.size() + set.files.size(), set.unread.size()) {}
@@ -52,6 +53,7 @@ class RestoreJob {
     std::vector<uint16_t> statuses;
     if (count > 0) WritePacket(packet, statuses);
     WriteSingly(packet, statuses);
+    lost_ = lost_ || aborts_.aborted();  // what was written is not read back any more
     for (size_t i = 0; i < packet.size(); ++i) {
       if (i < statuses.size()) {
         Judge(packet[i], statuses[i]);
@@ -127,6 +129,7 @@ class RestoreJob {
     return items_.Status(file.path.c_str(), present.mode, size, status);
   }
 
+  const efs::AbortWatch& aborts_;
   items::PhoneItems items_;
   const pkv::PkvSet& set_;
   const ArrayItems arrays_;

@@ -93,7 +93,7 @@ bool Complete(Diag_FTM& phone, const std::string& folder, Entry& entry) {
 }  // namespace
 
 bool ListEntries(Diag_FTM& phone, const std::string& folder, uint8_t filter, const EntrySink& sink) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   RemoteDirectory directory(phone);
   if (!directory.Open(folder.c_str())) return false;
   for (u32 sequence = kFirstEntry;; ++sequence) {

@@ -21,6 +21,11 @@ RemoteHandle::~RemoteHandle() noexcept(false) {
 
 bool RemoteHandle::OpenWithRequest(const char* path) {
   if (!IsWithinLimit(phone_)) return false;
+  // For good: what answers a try that is given up here may come in front of any later request.
+  if (!phone_.server_mode()) {
+    phone_.transport().SetUnclaimed([&phone = phone_](std::span<const u8> reply) { NoteLateReply(phone, reply); });
+  }
+  CloseStrays(phone_);  // first: the handset may give out their numbers anew
   u32 unanswered = 0;
   for (int attempt = 0; attempt < kTries && !open_; ++attempt) {
     if (attempt > 0 && IsAborted(phone_, "request")) break;

@@ -58,6 +58,7 @@ bool PutItemFromMemory(Diag_FTM& phone, const char* efs_file, const u8* buffer, 
     return Fail(TooLargeForAnItem("a buffer", size));
   }
   if (buffer == nullptr && size > 0) return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer with the data"));
+  const Transfer transfer(phone);
   u32 error = 0;
   return PutItem(phone, efs_file, {buffer, size}, error) && IsDone(error, efs_file);
 }
@@ -92,6 +93,7 @@ bool GetItemToFile(Diag_FTM& phone, const char* local_file, const char* efs_file
     return local_file == nullptr ? Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no name of a local file"))
                                  : Fail(TooLargeForAnItem("a length", length));
   }
+  const Transfer transfer(phone);
   std::vector<u8> data;
   u32 error = 0;
   if (!GetItem(phone, Tries::kOne, efs_file, length, data, error) || !IsDone(error, efs_file)) return false;

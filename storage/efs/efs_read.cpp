@@ -133,7 +133,7 @@ Sink SinkOfMemory(Diag_FTM& phone, const char* efs_file, std::span<u8> room, con
 }  // namespace
 
 bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   FileStatus status;
   if (!StatExisting(phone, efs_file, status)) return false;
   const char* const name = TextOrEmpty(local_file);
@@ -157,7 +157,7 @@ bool ReadToFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
 }
 
 bool ReadToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   if (size == nullptr || (buffer == nullptr && *size > 0)) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no buffer, or no size of one"));
   }
@@ -171,7 +171,7 @@ bool ReadToMemory(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) 
 }
 
 bool ReadPlainFile(Diag_FTM& phone, const char* efs_file, u8* buffer, u32* size) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   const Progress nobody;
   u32 done = 0;
   if (!ReadOpened(phone, efs_file, *size, SinkOfMemory(phone, efs_file, {buffer, *size}, nobody, done))) return false;

@@ -38,20 +38,15 @@ bool IsOwnReply(std::span<const u8> request, std::span<const u8> reply, const Re
          (!is_own || is_own(reply));
 }
 
-// What the engine does for an EFS2 request while it is under way: it heeds the abort (but for what is sent after one,
-// to clean up) and shows the late replies that it drops.
+// While an EFS2 request is under way the engine heeds the abort.
 class RequestScope {
  public:
   explicit RequestScope(Diag_FTM& phone) : phone_(phone) {
     if (phone.server_mode()) return;  // there is no transport of ours
-    const std::atomic<bool>& abort = phone.state<Settings>().abort;
-    former_ = phone.transport().SetAbort(abort ? nullptr : &abort);
-    phone.transport().SetForgotten([&phone](std::span<const u8> late) { NoteLateReply(phone, late); });
+    former_ = phone.transport().SetAbort(phone.state<Settings>().heeded_abort());
   }
   ~RequestScope() {
-    if (phone_.server_mode()) return;
-    phone_.transport().SetAbort(former_);
-    phone_.transport().SetForgotten({});
+    if (!phone_.server_mode()) phone_.transport().SetAbort(former_);
   }
   RequestScope(const RequestScope&) = delete;
   RequestScope& operator=(const RequestScope&) = delete;
@@ -61,11 +56,16 @@ class RequestScope {
   const std::atomic<bool>* former_ = nullptr;
 };
 
+bool HasAbort(Diag_FTM& phone) {
+  const std::atomic<bool>* const abort = phone.state<Settings>().heeded_abort();
+  return abort != nullptr && *abort;
+}
+
 void CloseStrays(Diag_FTM& phone, const EfsRequest<u32>& close, OpenHandles& handles) {
   for (const u32 value : std::exchange(handles.strays, {})) {
     phone.log().WriteLine(kLogRet, "EFS2 handle %u was opened by a request given up, and is closed", value);
     const KeepFailure keep;
-    const bool closed = CloseHandle(phone, close, value, DefaultTimeOut(phone));
+    const bool closed = CloseHandle(phone, close, value, DefaultTimeOut(phone), true);
     // After an abort a silent handset is not waited for: it is told with the next operation.
     if (!closed && phone.state<Settings>().gave_up) handles.strays.push_back(value);
   }
@@ -97,28 +97,29 @@ bool IsWithinLimit(Diag_FTM& phone) {
 }
 
 Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, const ReplyTest& is_own) {
+  if (IsAborted(phone, "request")) {
+    packet.set_response_length(0);
+    return ReplyKind::kAborted;
+  }
   const RequestScope scope(phone);
-  const Reply synchronised =
-      phone.Synchronise(time_out_ms, [&](std::span<const u8> late) { NoteLateReply(phone, late); });
-  if (!synchronised) {
+  if (const Reply synchronised = phone.Synchronise(time_out_ms); !synchronised) {
     packet.set_response_length(0);
     return synchronised;
   }
   const u32 start = phone.clock().TickMs();
-  const ReplyTest own_or_noted = [&](std::span<const u8> reply) {
+  const ReplyTest own = [&](std::span<const u8> reply) {
     if (IsOwnReply(packet.request(), reply, is_own)) return true;
     phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
-    NoteLateReply(phone, reply);
     return false;
   };
-  Reply reply = phone.Send(packet, time_out_ms, 0, own_or_noted);
+  Reply reply = phone.Send(packet, time_out_ms, 0, own);
   // A reply with another first byte ends a request of the engine; here it may be late as well, and ours behind it.
   while (reply.kind() == ReplyKind::kOther && reply.refusal() == 0) {
-    own_or_noted(reply.bytes());
+    phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
     const u32 elapsed = phone.clock().TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
     const Reply other(reply.kind(), reply.code(), {});
-    reply = phone.AwaitNext(packet, time_out_ms - elapsed, own_or_noted);
+    reply = phone.AwaitNext(packet, time_out_ms - elapsed, own);
     // Where nothing more comes, that was the answer.
     if (reply.kind() == ReplyKind::kNone) Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
   }
@@ -149,30 +150,36 @@ Reply AskComposed(Diag_FTM& phone, Tries tries) {
   return ExchangeUntil(phone, time_out_ms, {}, [](std::span<const u8>) { return true; });
 }
 
-void ForgetAbort(Diag_FTM& phone) {
-  Settings& settings = phone.state<Settings>();
-  settings.abort = false;
-  settings.gave_up = false;
+Transfer::Transfer(Diag_FTM& phone) : settings_(phone.state<Settings>()) {
+  settings_.in_transfer = true;
+  settings_.abort = settings_.in_job && settings_.job_abort;
+  settings_.gave_up = settings_.gave_up && settings_.abort;
+}
+
+Transfer::~Transfer() {
+  settings_.in_transfer = false;
 }
 
 Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms) {
-  if (!phone.state<Settings>().gave_up) return ExchangePacket(phone, packet, time_out_ms);
-  constexpr u32 kMomentMs = 50;
+  if (!HasAbort(phone)) return ExchangePacket(phone, packet, time_out_ms);
+  Settings& settings = phone.state<Settings>();
+  const u32 moment_ms = settings.gave_up ? 50 : 150;  // of a handset that has been silent before, or has not
   const auto request = packet.request();
   const auto is_own = [&](std::span<const u8> reply) { return IsOwnReply(request, reply, {}); };
   // Without a loopback in front: unanswered, it would keep the request from being sent.
   const Reply reply =
-      phone.SendSync(request, packet.response_area(), request[0], std::min(time_out_ms, kMomentMs), 0, is_own);
+      phone.SendSync(request, packet.response_area(), request[0], std::min(time_out_ms, moment_ms), 0, is_own);
   packet.set_response_length(static_cast<u16>(reply.bytes().size()));
+  if (!reply.came()) settings.gave_up = true;
   return reply;
 }
 
 int CleanUpTries(Diag_FTM& phone) {
-  return phone.state<Settings>().gave_up ? 1 : kTries;
+  return HasAbort(phone) ? 1 : kTries;
 }
 
 bool IsAborted(Diag_FTM& phone, const char* operation) {
-  if (!phone.state<Settings>().abort) return false;
+  if (!HasAbort(phone)) return false;
   phone.log().WriteLine(kLogErr, "EFS %s aborted", operation);
   Fail(Failure(KRAL_ERROR_ABORTED, "the %s was aborted", operation));
   return true;
@@ -209,16 +216,15 @@ void CloseStrays(Diag_FTM& phone) {
   CloseStrays(phone, kCloseDirectory, settings.directories);
 }
 
-bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms) {
+bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms, bool may_be_closed) {
   CDiagPacket& packet = phone.packet(kSidePacket);
   packet.Reset();
   packet.Append8(kSubsystemDispatch);
   packet.Append8(close.header.subsystem);
   packet.Append16(close.header.command);
   packet.Append32(value);
-  bool unanswered = false;
-  const int tries = CleanUpTries(phone);
-  for (int attempt = 0; attempt < tries; ++attempt) {
+  bool unanswered = may_be_closed;
+  for (int attempt = 0; attempt < CleanUpTries(phone); ++attempt) {
     u32 error = 0;
     const Reply reply = Checked(ExchangeToCleanUp(phone, packet, time_out_ms), [&] {
       return packet.ResponseAt32(kErrorBehindHeader, error) ||

@@ -38,9 +38,19 @@ Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {
 // earlier one's time-out has closed. Whoever does not accept a reply has noted why.
 Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
 
-// Every transfer and listing begins with it.
-void ForgetAbort(Diag_FTM& phone);
-// What cleans up behind an aborted one. A handset that was silent when the abort came is told, but hardly waited for.
+// A transfer, listing or sync, as long as it runs: an abort ends each of its requests but those that clean up. Earlier
+// aborts are forgotten, but for one of the job that it is a part of.
+class Transfer {
+ public:
+  explicit Transfer(Diag_FTM& phone);
+  ~Transfer();
+  Transfer(const Transfer&) = delete;
+  Transfer& operator=(const Transfer&) = delete;
+
+ private:
+  Settings& settings_;
+};
+// What cleans up after one. After an abort the handset is told, but hardly waited for.
 Reply ExchangeToCleanUp(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms);
 int CleanUpTries(Diag_FTM& phone);
 
@@ -69,8 +79,9 @@ inline u32 PacketTimeOut(Diag_FTM& phone) {
 
 // Closes what late replies have named. The request and the reply in the phone's default packet buffer stay.
 void CloseStrays(Diag_FTM& phone);
-// Tried until the handset confirms it; a failure is logged. The default packet buffer stays, too.
-bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms);
+// Tried until the handset confirms it; a failure is logged. One that may be closed by now: the handset need not know it.
+// The default packet buffer stays, too.
+bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms, bool may_be_closed = false);
 
 // Requests that stand alone are sent once. Those of a transfer that change nothing are repeated until answered.
 enum class Tries { kOne, kTransfer };

@@ -45,10 +45,12 @@ void TellCaller(Diag_FTM& phone, const KRAL_EFS_ENTRY& entry) {
 AbortableJob::AbortableJob(Diag_FTM& phone) : AbortWatch(phone), phone_(phone) {
   Settings& settings = phone.state<Settings>();
   settings.job_abort = false;
+  settings.in_job = true;
   if (!phone.server_mode()) former_ = phone.transport().SetAbort(&settings.job_abort);
 }
 
 AbortableJob::~AbortableJob() {
+  phone_.state<Settings>().in_job = false;
   if (!phone_.server_mode()) phone_.transport().SetAbort(former_);
 }
 

@@ -26,7 +26,12 @@ struct Settings {
   std::atomic<bool> abort{false};
   std::atomic<bool> job_abort{false};  // set with it, and cleared by what is made of many transfers only
   std::atomic<uint32_t> aborts{0};     // how often they were set
+  bool in_job = false;                 // an AbortableJob lives, or
+  bool in_transfer = false;            // a Transfer: an abort ends what they do
   bool gave_up = false;                // an abort has ended the wait for an answer that did not come
+
+  // What ends the requests under way; null: nothing does.
+  const std::atomic<bool>* heeded_abort() const { return in_job ? &job_abort : in_transfer ? &abort : nullptr; }
   std::atomic<KRAL_EFS_TRANSFER_CALLBACK> transfer_callback{nullptr};
   std::atomic<KRAL_EFS_DIRECTORY_CALLBACK> directory_callback{nullptr};
   std::atomic<KRAL_HANDLE> callback_context{0};

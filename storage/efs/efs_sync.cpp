@@ -36,7 +36,7 @@ Reply AskState(Diag_FTM& phone, const EfsRequest<Path>& row, const char* name, c
 }  // namespace
 
 bool SyncWithWait(Diag_FTM& phone, const char* path, u32 time_out_ms) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   const u32 start = phone.clock().TickMs();
   const auto elapsed = [&] { return phone.clock().TickMs() - start; };
   SyncAnswer answer;

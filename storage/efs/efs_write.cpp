@@ -41,8 +41,7 @@ bool HasRoom(Diag_FTM& phone, u32 size) {
 // Tried like every packet of a transfer, also after an abort.
 bool Remove(Diag_FTM& phone, const char* efs_file) {
   bool unanswered = false;
-  const int tries = CleanUpTries(phone);
-  for (int attempt = 0; attempt < tries; ++attempt) {
+  for (int attempt = 0; attempt < CleanUpTries(phone); ++attempt) {
     u32 error = 0;
     Compose(phone, kUnlink, PathField(efs_file));
     if (!ExchangeToCleanUp(phone, phone.packet(), DefaultTimeOut(phone)) || !ReadFromEnd(phone, {&error})) {
@@ -91,7 +90,7 @@ bool WriteChunk(Diag_FTM& phone, const RemoteFile& file, u32 offset, std::span<c
 
 // True also when the transfer was aborted.
 bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, u16 packet_size, const Source& source) {
-  const std::atomic<bool>& abort = phone.state<Settings>().abort;
+  const std::atomic<bool>& abort = *phone.state<Settings>().heeded_abort();
   std::vector<u8> buffer(packet_size - kWriteOverhead);
   for (u32 offset = 0; offset < source.size && !abort;) {
     const auto chunk = std::span(buffer).first(std::min<size_t>(buffer.size(), source.size - offset));
@@ -156,14 +155,14 @@ bool WriteLocalFile(Diag_FTM& phone, const char* local_file, const char* efs_fil
 }  // namespace
 
 bool WriteFromFile(Diag_FTM& phone, const char* local_file, const char* efs_file) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   const bool passed = WriteLocalFile(phone, local_file, efs_file);
   phone.log().WriteLine(passed ? kLogRet : kLogErr, "KRAL_EfsWrite() - %s", passed ? "PASS" : "FAIL");
   return passed;
 }
 
 bool WriteMemory(Diag_FTM& phone, std::span<const u8> bytes, const char* efs_file, const Progress& progress) {
-  ForgetAbort(phone);
+  const Transfer transfer(phone);
   Source source{.size = static_cast<u32>(bytes.size()), .progress = progress};
   source.read = [bytes](u32 offset, std::span<u8> chunk) {
     std::copy_n(bytes.subspan(offset).begin(), chunk.size(), chunk.begin());

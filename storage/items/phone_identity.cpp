@@ -23,6 +23,7 @@ std::string PropertyText(const char* text) {
 }  // namespace
 
 void AppendIdentity(Diag_FTM& phone, pkv::PkvProperties& properties) {
+  const Diag_FTM::Resynchronising resynchronising(phone);  // these replies repeat nothing
   uint32_t serial = 0;
   if (diag::ReadSerialNumber(phone, &serial)) {
     std::array<char, 16> text{};

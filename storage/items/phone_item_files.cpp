@@ -139,7 +139,7 @@ PhoneItems::Answer PhoneItems::ReadPlainFile(pkv::PkvEfsFile& file, uint32_t siz
     file.bytes.resize(size);
     return Answer::kAnswered;
   }
-  if (aborts_.aborted()) return Answer::kRefused;
+  if (aborts_.aborted()) return Answer::kLost;
   const KeepFailure keep;
   uint32_t mode = 0;
   // Lost, or only not to be had: a handset that still answers tells.

@@ -1,5 +1,6 @@
 // Every fault of the line at every packet of a transfer and of a listing: exact bytes, or a clean failure. And what
 // becomes of late answers: they are nobody else's, and the handles that they tell of are closed.
+#include "kral/nv.h"
 #include "storage/efs/efs_settings.h"
 #include "tests/support/efs_fixture.h"
 #include "tests/support/engine_bundle.h"
@@ -205,6 +206,37 @@ TEST_F(EfsFaults, HandlesThatLateAnswersTellOfAreClosed) {
   EXPECT_EQ(KRAL_EfsReadMem(handle(), "/f", back.data(), &size), 1) << LogText();
   EXPECT_EQ(back, data_);
   EXPECT_EQ(handset().efs().open_descriptors(), 0u) << LogText();
+
+  // All tries given up, and their answers in front of requests of another family.
+  handset().faults().Add(handset::Delay(600), handset::When::Always().Of("4B 13 02"));
+  EXPECT_EQ(KRAL_EfsReadMem(handle(), "/f", back.data(), &size), 0);
+  handset().faults().Clear();
+  const efs::OpenHandles& files = Kral_ResourceManager::GetPhone(handle())->state<efs::Settings>().files;
+  EXPECT_TRUE(test::Eventually([&] {
+    std::array<uint8_t, 128> item;
+    uint16_t status = 0;
+    KRAL_DIAG_NV_READ_F(handle(), 1, item.data(), item.size(), &status);
+    return files.unanswered == 0;
+  }));
+  uint32_t error = 0;
+  EXPECT_EQ(KRAL_EfsMkDir(handle(), "/after", &error), 1);
+  EXPECT_EQ(handset().efs().open_descriptors(), 0u) << LogText();
+}
+
+// A handset gives out the lowest free number.
+TEST_F(EfsFaults, AHandleIsNotClosedAfterAnotherFolderHasItsNumber) {
+  handset().efs().AddFile("/d/one", {});
+  ShortenTimeOuts(3000);
+  handset().faults().Add(handset::Delay(300), handset::When::Nth(1).Of("4B 13 0D"));
+  const uint64_t struck = handset().faults().struck();
+  std::thread other([&] {
+    EXPECT_TRUE(test::Eventually([&] { return handset().faults().struck() > struck; }));
+    KRAL_AbortEFS_Operation(handle());
+  });
+  const auto list = [&] { return KRAL_EfsDirectory(handle(), "/d", KRAL_EFS_FILTER_ALL, nullptr, nullptr); };
+  list();
+  other.join();
+  for (int i = 0; i < 2; ++i) EXPECT_EQ(list(), 1) << LogText();
 }
 
 TEST_F(EfsFaults, AWriteThatFailedMayHaveOpenedAFile) {
@@ -279,18 +311,19 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       {"list", "4B 13 0C", [&] { return KRAL_EfsDirectory(handle(), "/d", KRAL_EFS_FILTER_ALL, nullptr, nullptr); }},
   };
   // One that answers nothing any more is not waited for when it comes to cleaning up, either.
-  // One whose answers come too late for that is told all the same.
-  enum Manner { kSlow, kSilent, kLate, kDead };
-  for (const Manner manner : {kSlow, kSilent, kLate, kDead}) {
+  // One whose answers come too late for that is told all the same. Dying: the packet under way is the last answered.
+  enum Manner { kSlow, kSilent, kLate, kDead, kDying };
+  for (const Manner manner : {kSlow, kSilent, kLate, kDead, kDying}) {
     for (const Operation& operation : operations) {
-      constexpr std::array<const char*, 4> kNames = {", slow answers", ", no answer", ", late answers",
-                                                     ", never an answer"};
+      constexpr std::array<const char*, 5> kNames = {", slow answers", ", no answer", ", late answers",
+                                                     ", never an answer", ", a last answer"};
       SCOPED_TRACE(testing::Message() << operation.name << kNames[manner]);
       ShortenTimeOuts(3000);
       KRAL_SetResynchronise(handle(), manner == kLate ? 1 : 0);
-      handset().faults().Add(manner == kSlow   ? handset::Delay(5)
-                             : manner == kLate ? handset::Lag(400)
-                                               : handset::Ignore(),
+      handset().faults().Add(manner == kSlow    ? handset::Delay(5)
+                             : manner == kDying ? handset::Lag(30)
+                             : manner == kLate  ? handset::Lag(400)
+                                                : handset::Ignore(),
                              handset::When::Always().Of(operation.command));
       std::chrono::steady_clock::time_point aborted;
       handset().ClearTrace();
@@ -298,7 +331,7 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       std::thread other([&] {
         const auto has_begun = [&] { return handset().faults().struck() > struck; };
         for (int i = 0; i < 5000 && !has_begun(); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(1));
-        if (manner == kDead) handset().faults().Add(handset::Ignore(), handset::When::Always());
+        if (manner == kDead || manner == kDying) handset().faults().Add(handset::Ignore(), handset::When::Always());
         aborted = std::chrono::steady_clock::now();
         KRAL_AbortEFS_Operation(handle());
       });
@@ -313,7 +346,7 @@ TEST_F(EfsFaults, AbortOfAnotherThreadEndsWhatRuns) {
       for (int i = 0; i < 2000 && manner == kLate && is_kept(); ++i) {
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
       }
-      EXPECT_TRUE(manner == kDead || !is_kept());
+      EXPECT_TRUE(manner == kDead || manner == kDying || !is_kept());
       EXPECT_EQ(folder_.Content("target"), "before");
       handset().faults().Clear();
       ClearLog();
