@@ -14,8 +14,11 @@ constexpr size_t kPieceSize = 65536;
 std::error_code ReadWholeFile(const std::string& path, size_t limit, std::vector<uint8_t>& bytes) {
   FileReader file;
   if (const auto error = file.Open(path, FileReader::Others::kMayWrite)) return error;
+  if (file.size() > limit) return std::make_error_code(std::errc::file_too_large);
   limit = std::min(limit, SIZE_MAX - 1);
   std::vector<uint8_t> content;
+  // A vector that grows copies a large file once more.
+  content.reserve(static_cast<size_t>(file.size()) + kPieceSize);
   // Pieces rather than the size: that is 0 for what /proc has, and may change meanwhile.
   size_t used = 0;
   do {

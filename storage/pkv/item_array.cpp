@@ -2,8 +2,23 @@
 #include "storage/pkv/item_array.h"
 
 #include <algorithm>
+#include <functional>
+#include <utility>
+
+#include "base/little_endian.h"
 
 namespace kral::pkv {
+namespace {
+
+// Of keys with the same upper half the one with the greatest lower half, and all in the order of those.
+void KeepLastOfEach(std::vector<uint64_t>& keys) {
+  std::ranges::sort(keys, std::greater<>());
+  const auto again = std::ranges::unique(keys, [](uint64_t a, uint64_t b) { return a >> 32 == b >> 32; });
+  keys.erase(again.begin(), again.end());
+  std::ranges::sort(keys, {}, [](uint64_t key) { return static_cast<uint32_t>(key); });
+}
+
+}  // namespace
 
 void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, Access access) {
   Close();
@@ -12,7 +27,10 @@ void CNVItemStream::Open(CompoundStorage& storage, uint16_t subscription, Access
   subscription_ = subscription;
   const std::string name = NameOfSubscription(kItemArray, subscription);
   stream_ = access == Access::kReadWrite ? &storage.OpenOrAddStream(name) : storage.FindStream(name);
-  if (stream_ == nullptr) return;
+}
+
+void CNVItemStream::Index() {
+  if (std::exchange(indexed_, true) || stream_ == nullptr) return;
   const std::span<const uint8_t> bytes(stream_->bytes);
   PkvNvItem item;
   uint16_t flags = 0;
@@ -33,28 +51,35 @@ PkvNvItem CNVItemStream::ItemAt(size_t position) const {
   return item;
 }
 
-bool CNVItemStream::Find(uint16_t id, PkvNvItem& item) const {
+bool CNVItemStream::Find(uint16_t id, PkvNvItem& item) {
+  Index();
   const auto found = records_.find(id);
   if (found == records_.end()) return false;
   item = ItemAt(found->second.rbegin()->first);
   return true;
 }
 
-std::vector<PkvNvItem> CNVItemStream::Items() const {
-  std::vector<size_t> positions;
-  for (const auto& [id, records] : records_) {
-    std::map<uint16_t, size_t> last;
-    for (const auto& [position, index] : records) last[index] = position;
-    for (const auto& [index, position] : last) positions.push_back(position);
+// Numbers are sorted, and only where ids come out of order: an array may hold tens of thousands of records.
+void CNVItemStream::AppendItems(std::vector<PkvNvItem>& items) const {
+  if (stream_ == nullptr) return;
+  const std::span<const uint8_t> bytes(stream_->bytes);
+  const auto count = static_cast<uint32_t>(bytes.size() / kArrayRecordSize);
+  std::vector<uint64_t> keys;  // id, index word, number of the record
+  keys.reserve(count);
+  for (uint32_t number = 0; number < count; ++number) {
+    const auto record = bytes.subspan(number * kArrayRecordSize, kArrayData);
+    if ((*LoadLe<uint16_t>(record, kArrayFlags) & kRecordInUse) == 0) continue;
+    const uint32_t item = uint32_t{*LoadLe<uint16_t>(record, kArrayId)} << 16 | *LoadLe<uint16_t>(record, kArrayIndex);
+    keys.push_back(uint64_t{item} << 32 | number);
   }
-  std::ranges::sort(positions);
-  std::vector<PkvNvItem> items;
-  items.reserve(positions.size());
-  for (const size_t position : positions) items.push_back(ItemAt(position));
-  return items;
+  const auto is_not_below = [](uint64_t a, uint64_t b) { return a >> 32 >= b >> 32; };
+  if (std::ranges::adjacent_find(keys, is_not_below) != keys.end()) KeepLastOfEach(keys);
+  items.reserve(items.size() + keys.size());
+  for (const uint64_t key : keys) items.push_back(ItemAt(static_cast<uint32_t>(key) * kArrayRecordSize));
 }
 
 size_t CNVItemStream::ClaimPosition(uint16_t id) {
+  Index();
   if (const auto known = records_.find(id); known != records_.end()) return known->second.rbegin()->first;
   size_t position = 0;
   if (!free_slots_.empty()) {
@@ -78,6 +103,7 @@ size_t CNVItemStream::Write(const PkvNvItem& item) {
 }
 
 bool CNVItemStream::Delete(uint16_t id, std::optional<uint16_t> index) {
+  Index();
   const auto found = records_.find(id);
   if (!writable() || found == records_.end()) return false;
   const size_t count = std::erase_if(found->second, [&](const auto& record) {

@@ -21,10 +21,10 @@ class CNVItemStream {
   bool is_open() const { return open_; }
 
   // By id: of several records with one id the last counts.
-  bool Find(uint16_t id, PkvNvItem& item) const;
-  // In the order of their records. Records of one id with different index words are items of their own, as others write
-  // arrays; of several with the same index word the last counts.
-  std::vector<PkvNvItem> Items() const;
+  bool Find(uint16_t id, PkvNvItem& item);
+  // Appends them in the order of their records. Records of one id with different index words are items of their own, as
+  // others write arrays; of several with the same index word the last counts.
+  void AppendItems(std::vector<PkvNvItem>& items) const;
 
   // In place when the id is there, else into the lowest free slot, else at the end. Gives the bytes written: 136, or
   // 0 when the stream was opened for reading.
@@ -35,6 +35,7 @@ class CNVItemStream {
 
  private:
   bool writable() const { return stream_ != nullptr && access_ == Access::kReadWrite; }
+  void Index();
   size_t ClaimPosition(uint16_t id);
   PkvNvItem ItemAt(size_t position) const;
 
@@ -42,6 +43,8 @@ class CNVItemStream {
   Access access_ = Access::kRead;
   uint16_t subscription_ = 0;
   bool open_ = false;
+  // Of what is written or looked for by id; reading everything needs none of it.
+  bool indexed_ = false;
   std::map<uint16_t, std::map<size_t, uint16_t>> records_;  // by id: where they are, and their index words
   std::set<size_t> free_slots_;                             // the lowest is used first
 };

@@ -25,7 +25,8 @@ auto KeyOf(const PkvNvItem& item) {
 
 // The first one of several with the same key stays; the others are told when they are different.
 void Normalize(std::vector<PkvNvItem>& items, std::vector<std::string>& dropped) {
-  std::ranges::stable_sort(items, [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); });
+  const auto comes_first = [](const auto& a, const auto& b) { return KeyOf(a) < KeyOf(b); };
+  if (!std::ranges::is_sorted(items, comes_first)) std::ranges::stable_sort(items, comes_first);
   const auto is_again = [&](const PkvNvItem& first, const PkvNvItem& item) {
     if (KeyOf(first) != KeyOf(item)) return false;
     if (first != item) dropped.push_back("NV ID " + std::to_string(item.id) + ": a second value");
@@ -62,10 +63,9 @@ bool AreRecordsWhole(const CompoundStorage& storage, uint16_t subscription) {
   const CompoundStream* const stream = storage.FindStream(NameOfSubscription(kItemArray, subscription));
   if (stream == nullptr) return true;
   const std::span<const uint8_t> bytes(stream->bytes);
-  PkvNvItem item;
-  uint16_t flags = 0;
-  for (size_t at = 0; ParseArrayRecord(bytes.subspan(at), item, flags); at += kArrayRecordSize) {
-    if ((flags & kRecordInUse) != 0 && LoadLe<uint16_t>(bytes, at) != kArrayRecordSize) return false;
+  for (size_t at = 0; bytes.size() - at >= kArrayRecordSize; at += kArrayRecordSize) {
+    const bool in_use = (*LoadLe<uint16_t>(bytes, at + kArrayFlags) & kRecordInUse) != 0;
+    if (in_use && LoadLe<uint16_t>(bytes, at) != kArrayRecordSize) return false;
   }
   return true;
 }
@@ -78,8 +78,7 @@ bool AppendItems(CompoundStorage& storage, std::vector<PkvNvItem>& items, std::s
     }
     CNVStorage source(storage, subscription, Access::kRead);
     source.OpenItemArray();
-    const std::vector<PkvNvItem> array = source.item_array().Items();
-    items.insert(items.end(), array.begin(), array.end());
+    source.item_array().AppendItems(items);
     if (!source.ReadNumbered(items, problem)) return false;
   }
   return true;

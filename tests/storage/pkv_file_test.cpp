@@ -23,6 +23,12 @@ std::vector<uint16_t> IdsOf(const std::vector<PkvNvItem>& items) {
   return ids;
 }
 
+std::vector<PkvNvItem> ItemsOf(const CNVItemStream& array) {
+  std::vector<PkvNvItem> items;
+  array.AppendItems(items);
+  return items;
+}
+
 // --- The item array -------------------------------------------------------------------------------------------------
 
 TEST(CNVItemStream, FreeSlotsAreReusedFromTheLowestAndItemsAreOverwrittenInPlace) {
@@ -36,7 +42,7 @@ TEST(CNVItemStream, FreeSlotsAreReusedFromTheLowestAndItemsAreOverwrittenInPlace
 
   bytes[136 + 2] = 0;  // the second record's flags
   array.Open(storage, 0, Access::kReadWrite);
-  EXPECT_EQ(IdsOf(array.Items()), (std::vector<uint16_t>{1, 3}));
+  EXPECT_EQ(IdsOf(ItemsOf(array)), (std::vector<uint16_t>{1, 3}));
   array.Write(Item(9, 0x99));
   EXPECT_EQ(bytes.size(), 3u * 136u);
   EXPECT_EQ(bytes[136 + 4], 9);
@@ -64,7 +70,7 @@ TEST(CNVItemStream, AShortRecordAtTheEndIsOverwritten) {
   array.Write(Item(2, 2));
   EXPECT_EQ(storage.FindStream("NV_ITEM_ARRAY")->bytes.size(), 272u);
   array.Open(storage, 0, Access::kRead);
-  EXPECT_EQ(IdsOf(array.Items()), (std::vector<uint16_t>{1, 2}));
+  EXPECT_EQ(IdsOf(ItemsOf(array)), (std::vector<uint16_t>{1, 2}));
 }
 
 TEST(CNVItemStream, ReadOnlyAccessCreatesAndWritesNothing) {
@@ -72,7 +78,7 @@ TEST(CNVItemStream, ReadOnlyAccessCreatesAndWritesNothing) {
   CNVItemStream array;
   array.Open(storage, 2, Access::kRead);
   EXPECT_TRUE(array.is_open());
-  EXPECT_TRUE(array.Items().empty());
+  EXPECT_TRUE(ItemsOf(array).empty());
   EXPECT_EQ(array.Write(Item(1, 1)), 0u);
   EXPECT_TRUE(storage.streams.empty());
   array.Open(storage, 2, Access::kReadWrite);
