@@ -21,6 +21,8 @@ class Recorder final : public PacketListener {
   void OnBatchEnd() override {
     if (at_end) at_end();
   }
+  bool IsPrompt() const override { return prompt; }
+  bool prompt = true;
   std::function<void()> then;
   std::function<void()> at_end;
 
@@ -93,6 +95,41 @@ TEST_F(KralEvents, ListenerMayUnregisterAtTheEndOfABatch) {
   Push(1);
   EXPECT_TRUE(Eventually([&] { return ends == 1; })) << "not passed over";
   EXPECT_TRUE(events_->Stop());
+}
+
+TEST_F(KralEvents, DispatchesHereOnlyWhatOvertakesNothingAndHoldsUpNobody) {
+  const auto here = [this](uint8_t number, size_t count = 1) {
+    std::vector<Packet> packets(count, Packet{number});
+    const bool done = events_->DispatchHere(packets);
+    EXPECT_EQ(packets.empty(), done);
+    return done;
+  };
+  EXPECT_FALSE(here(1)) << "there is no dispatcher";
+  events_->RegisterListener(&a_, nullptr, events_);
+  EXPECT_TRUE(here(2));
+  EXPECT_EQ(Calls(1), (Names{"a2"})) << "before it returned";
+  EXPECT_FALSE(here(3, 1000)) << "many";
+
+  ManualResetEvent entered;
+  ManualResetEvent leave;
+  a_.then = [&] {
+    entered.Set();
+    leave.WaitFor(60000);
+  };
+  Push(4);
+  ASSERT_TRUE(entered.WaitFor(60000));
+  Push(5);
+  EXPECT_FALSE(here(6)) << "another is with a listener";
+  leave.Set();
+  EXPECT_TRUE(events_->WaitUntilDispatched(60000));
+  a_.then = nullptr;
+  EXPECT_TRUE(here(7));
+  a_.prompt = false;
+  EXPECT_FALSE(here(8)) << "a listener that may take long";
+  EXPECT_TRUE(events_->Stop());
+  a_.prompt = true;
+  EXPECT_FALSE(here(9)) << "after the stop";
+  EXPECT_EQ(Calls(4), (Names{"a2", "a4", "a5", "a7"}));
 }
 
 TEST_F(KralEvents, KeepsTheOrderOfAFlood) {

@@ -56,6 +56,7 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   void OnPacket(std::span<const uint8_t> packet) override;
   void TakePacket(Packet packet) override;
   void OnBatchEnd() override;
+  bool IsPrompt() const override { return !IsWatched(); }
 
   PacketQueue& responses() { return responses_; }
   PacketQueue& asynchronous() { return asynchronous_; }

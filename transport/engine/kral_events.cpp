@@ -88,6 +88,42 @@ void CKralEvents::PushAll(std::vector<Packet>& packets) {
   if (was_empty) new_packet_.NotifyOne();
 }
 
+// A packet that goes to the dispatcher's thread costs its reader a change of threads, and a packet that overtakes
+// another its order: this is for what comes when nothing is under way, such as the reply that a request waits for.
+bool CKralEvents::DispatchHere(std::vector<Packet>& packets) {
+  constexpr size_t kFewPackets = 16;  // of more than that reading should go on meanwhile
+  const size_t count = packets.size();
+  if (count > kFewPackets || !listeners_mutex_.TryLock()) return false;
+  const RecursiveLock lock(listeners_mutex_, std::adopt_lock);
+  const auto takes_long = [](const Registration& entry) {
+    return entry.listener != nullptr && !entry.listener->IsPrompt();
+  };
+  if (std::ranges::any_of(listeners_, takes_long) || !BeginHere(count)) return false;
+  const AtExit ended([this, count] { EndHere(count); });
+  for (Packet& packet : packets) Dispatch(std::move(packet));
+  EndBatch();
+  packets.clear();
+  return true;
+}
+
+bool CKralEvents::BeginHere(size_t count) {
+  if (!queue_mutex_.TryLock()) return false;
+  const MutexLock lock(queue_mutex_, std::adopt_lock);
+  if (!accepting_ || pushed_ != dispatched_) return false;
+  pushed_ += count;
+  const uint64_t backlog = backlog_.fetch_add(count, std::memory_order_relaxed) + count;
+  greatest_backlog_ = std::max(greatest_backlog(), backlog);
+  return true;
+}
+
+// The lock is for moments only, as in PushAll: others hold it for no longer.
+void CKralEvents::EndHere(size_t count) {
+  backlog_.fetch_sub(count, std::memory_order_relaxed);
+  const MutexLock lock(queue_mutex_);
+  dispatched_ += count;
+  batch_done_.NotifyAll();
+}
+
 bool CKralEvents::WaitUntilDispatched(uint32_t time_out_ms) {
   MutexLock lock(queue_mutex_);
   return batch_done_.WaitFor(lock, std::chrono::milliseconds(time_out_ms),
@@ -97,12 +133,9 @@ bool CKralEvents::WaitUntilDispatched(uint32_t time_out_ms) {
 
 bool CKralEvents::Stop(uint32_t time_out_ms) {
   EndAccepting();
-  if (!thread_.running()) {
-    thread_.Join();
-    return true;
-  }
-  if (!stopped_.WaitFor(time_out_ms)) return false;
+  if (thread_.running() && !stopped_.WaitFor(time_out_ms)) return false;
   thread_.Join();
+  const RecursiveLock none_here(listeners_mutex_);  // listeners that are called on another thread are prompt
   return true;
 }
 

@@ -46,6 +46,10 @@ class CKralEvents {
   // The same for several at once, which are gone from the vector afterwards.
   void PushAll(std::vector<Packet>& packets);
 
+  // Takes the packets through the listeners at once, on the calling thread, and empties the vector. False where that is
+  // not done: packets that came before are still on their way, the packets are many, or a listener may take long.
+  bool DispatchHere(std::vector<Packet>& packets);
+
   // What was pushed and has not been through its listeners, now and at its most.
   uint64_t backlog() const { return backlog_.load(std::memory_order_relaxed); }
   uint64_t greatest_backlog() const { return greatest_backlog_.load(std::memory_order_relaxed); }
@@ -68,6 +72,8 @@ class CKralEvents {
     const PacketFilter* filter;
   };
 
+  bool BeginHere(size_t count);
+  void EndHere(size_t count);
   bool StartThread(std::shared_ptr<void> owner) KRAL_REQUIRES(listeners_mutex_);
   void Run();
   bool TakeBatch(std::vector<Packet>& batch);

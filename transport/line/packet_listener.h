@@ -20,6 +20,8 @@ class PacketListener {
   virtual void OnPacket(std::span<const uint8_t> packet) = 0;
   // The same for a packet that nobody else needs any more: a listener that keeps packets keeps this one uncopied.
   virtual void TakePacket(Packet packet) { OnPacket(packet); }
+  // Whether its calls take moments only, and run nobody else's code: then they may come on the thread that receives.
+  virtual bool IsPrompt() const { return false; }
   // Follows the last of some packets that came together: a listener need not wake anybody sooner.
   virtual void OnBatchEnd() {}
 };
