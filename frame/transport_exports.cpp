@@ -119,6 +119,24 @@ bool SetWriteSizeLimit(Diag_FTM& phone, uint32_t bytes) {
   return true;
 }
 
+Failure NoCallersTransport() {
+  return Failure(KRAL_ERROR_ARGUMENT, "the connection does not go through functions of the caller");
+}
+
+bool NotifyReceived(Diag_FTM& phone) {
+  return (!phone.server_mode() && phone.transport().NotifyReceived()) || Fail(NoCallersTransport());
+}
+
+bool SetReceiveWait(Diag_FTM& phone, uint32_t milliseconds) {
+  if (phone.server_mode()) return Fail(NoCallersTransport());
+  if (milliseconds > KRAL_LONGEST_RECEIVE_WAIT) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a receive function that waits %u ms holds up a disconnect: at most %u ms",
+                        milliseconds, static_cast<unsigned>(KRAL_LONGEST_RECEIVE_WAIT)));
+  }
+  phone.transport().SetCallersWait(milliseconds);
+  return true;
+}
+
 bool SetResynchronise(Diag_FTM& phone, bool on) {
   phone.SetResynchronise(on);
   return true;
@@ -184,6 +202,14 @@ uint8_t KRAL_CALL KRAL_SetRTS_State(KRAL_HANDLE handle, uint8_t state) {
 
 uint8_t KRAL_CALL KRAL_SetResynchronise(KRAL_HANDLE handle, uint8_t on) {
   return ExportCall(handle, __func__).Logged("( bOn = %d )", on).RunAtOnce(SetResynchronise, on == 1);
+}
+
+uint8_t KRAL_CALL KRAL_NotifyReceived(KRAL_HANDLE handle) {
+  return ExportCall(handle, __func__).Unlogged().RunAtOnce(NotifyReceived);
+}
+
+uint8_t KRAL_CALL KRAL_SetReceiveWait(KRAL_HANDLE handle, uint32_t milliseconds) {
+  return ExportCall(handle, __func__).Logged("( iWait_ms = %u )", milliseconds).RunAtOnce(SetReceiveWait, milliseconds);
 }
 
 uint8_t KRAL_CALL KRAL_SetSendDataSerialWriteSizeLimit(KRAL_HANDLE handle, uint32_t bytes) {

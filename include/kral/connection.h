@@ -184,7 +184,8 @@ KRAL_API KRAL_HANDLE KRAL_CALL KRAL_ConnectServerWithWait(uint32_t port, uint32_
 /** Writes bytes. @param data  [count] them @param[in,out] written  preset to `count`; out: how many were written */
 typedef uint32_t(KRAL_CALL* KRAL_SEND_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t count,
                                                 const uint8_t* data, uint32_t* written);
-/** Reads what is there, does not wait. @param[in,out] count  in: room; out: bytes @param[out] buffer  [count] them */
+/** Reads what is there, and waits no longer than KRAL_SetReceiveWait was told. @param[in,out] count  in: room; out:
+ * bytes @param[out] buffer  [count] them */
 typedef uint32_t(KRAL_CALL* KRAL_RECEIVE_FUNCTION)(uintptr_t context, uintptr_t transport, uint32_t* count,
                                                    uint8_t* buffer);
 /** Forgets what has been received; its result is ignored. */
@@ -305,7 +306,7 @@ KRAL_API int32_t KRAL_CALL KRAL_GetTimeOut(KRAL_HANDLE handle, uint32_t id);
  *
  * @param handle  from a connect function
  * @param mode    KRAL_RECEIVE_MODE_POLL (the default) or KRAL_RECEIVE_MODE_WAKE (with a caller's transport: sleeps
- *                1 ms only when nothing came)
+ *                1 ms only when nothing came, and not at all with KRAL_NotifyReceived or KRAL_SetReceiveWait)
  * @return 1 on success; 0 for another mode and in server mode
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetReceiveMode(KRAL_HANDLE handle, uint8_t mode);

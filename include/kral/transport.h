@@ -165,6 +165,42 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCallBacks(KRAL_HANDLE handle, KRAL_RAW_
  */
 KRAL_API uint8_t KRAL_CALL KRAL_SetResynchronise(KRAL_HANDLE handle, uint8_t on);
 
+/* --- Functions of the caller -------------------------------------------------------------------------------------- */
+/* What these two say is forgotten when the handle is connected through other functions. */
+
+/**
+ * Tells that a caller's transport has bytes: the receive function is called at once. For receive mode 1; in mode 0 it
+ * is called every millisecond anyway.
+ *
+ * From the first call on, the library relies on it: an idle connection does not call the receive function any more.
+ * While a request awaits its answer it is called every 20 ms all the same. Calls that come faster than bytes can be
+ * taken count as one, and those from inside the receive function count as none: after it has brought bytes it is
+ * called again anyway.
+ *
+ * @param handle  from KRAL_ConnectServer_UserDefinedTransport
+ * @return 1; 0 on a COM port, through a phone server, and for an unknown handle, such as one already disconnected
+ *
+ * Wait: none. Any thread, also inside the three functions. Writes no line into the text log.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_NotifyReceived(KRAL_HANDLE handle);
+
+/** Milliseconds that a receive function may wait: a disconnect waits for it, and gives up after 1,000. */
+#define KRAL_LONGEST_RECEIVE_WAIT 500
+
+/**
+ * Says that the receive function of a caller's transport waits for bytes itself, so that it can be called again at
+ * once. For receive mode 1. One that comes back at once with nothing is called every millisecond even so; one that
+ * waits longer than it should delays a disconnect, which goes on without it after 1,000 ms.
+ *
+ * @param handle        from a connect function
+ * @param milliseconds  the longest that the function waits, at most KRAL_LONGEST_RECEIVE_WAIT; 0: it does not wait (the
+ *                      default)
+ * @return 1, or 0 for more and through a phone server
+ *
+ * Wait: none. Any thread.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetReceiveWait(KRAL_HANDLE handle, uint32_t milliseconds);
+
 /* --- The port ----------------------------------------------------------------------------------------------------- */
 
 /**

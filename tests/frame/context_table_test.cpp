@@ -105,6 +105,9 @@ TEST_F(ContextTable, DefaultReceiveModeIsRefusedBeyondOne) {
   const KRAL_HANDLE handle = KRAL_ConnectServer(3);
   EXPECT_EQ(KRAL_SetReceiveMode(handle, 1), 1);
   EXPECT_EQ(KRAL_SetReceiveMode(handle, 2), 0);
+  EXPECT_EQ(KRAL_SetReceiveWait(handle, KRAL_LONGEST_RECEIVE_WAIT), 1);
+  EXPECT_EQ(KRAL_SetReceiveWait(handle, KRAL_LONGEST_RECEIVE_WAIT + 1), 0);
+  EXPECT_EQ(KRAL_NotifyReceived(handle), 0) << "a port tells by itself";
 }
 
 TEST_F(ContextTable, FirstAliasOfALogicalPortWins) {

@@ -92,6 +92,8 @@ TEST(TransportExportsThroughServer, FunctionsOfTheFramerAreRefused) {
   }
   EXPECT_EQ(KRAL_FlushRxBuffer(handle), 0);
   EXPECT_EQ(KRAL_SetReceiveMode(handle, 1), 0);
+  EXPECT_EQ(KRAL_NotifyReceived(handle), 0);
+  EXPECT_EQ(KRAL_SetReceiveWait(handle, 1), 0);
   EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 0);
   EXPECT_EQ(KRAL_SetRTS_State(handle, 1), 0);
   EXPECT_EQ(KRAL_SetSendDataSerialWriteSizeLimit(handle, 512), 0);

@@ -94,7 +94,8 @@ class HandsetPorts {
     }
     size_t Read(std::span<uint8_t> buffer) override { return handset_->ToHost(buffer); }
     bool gone() const override { return handset_->vanished() || handset_->appearances() != appearance_; }
-    bool WaitReadable(uint32_t milliseconds) override { return handset_->WaitForOutput(milliseconds); }
+    // In slices: unlike a real one, the handset does not tell this of its going.
+    bool WaitReadable(uint32_t milliseconds) override { return handset_->WaitForOutput(std::min(milliseconds, 20u)); }
     void Wake() override { handset_->Wake(); }
     void PurgeInput() override { handset_->DropOutput(); }
 

@@ -132,6 +132,95 @@ TEST(ReceiveThread, WakeOnDataReadsOnlyWhatIsThereAndLeavesAVanishedDeviceAlone)
   EXPECT_TRUE(Eventually([&] { return engine->responses.size() == 2; })) << "the reopened one is read";
 }
 
+// --- Caller's transports that tell of bytes, or wait for them -------------------------------------------------------
+
+struct CallersTransport : testing::Test {
+  CallersTransport() {
+    engine->transport.SetReceiveMode(ReceiveMode::kWakeOnData);
+    wire.OnWrite([](const Bytes&) { return PlainFrame({5, 6}); });
+  }
+  bool Asks(uint32_t time_out_ms = 60000) {
+    Bytes response(8);
+    return static_cast<bool>(engine->transport.SendSync(Bytes{5}, response, 5, time_out_ms, 0));
+  }
+  // Calls of the receive function in a millisecond without traffic.
+  double IdleReads() {
+    const uint64_t before = wire.reads();
+    const auto start = std::chrono::steady_clock::now();
+    std::this_thread::sleep_for(milliseconds(30));
+    const std::chrono::duration<double, std::milli> passed = std::chrono::steady_clock::now() - start;
+    return static_cast<double>(wire.reads() - before) / passed.count();
+  }
+
+  TestWire wire;
+  EngineGuard engine{EngineBundle::Make({}, SystemClock(), 0)};
+};
+
+TEST_F(CallersTransport, IsAskedWhenItTellsAndOtherwiseNotAtAll) {
+  ASSERT_TRUE(engine->OpenUser(wire.AsUserTransport()));
+  EXPECT_TRUE(Eventually([this] { return wire.reads() > 5; })) << "again and again until it tells for the first time";
+  EXPECT_TRUE(engine->transport.NotifyReceived());
+  std::this_thread::sleep_for(milliseconds(20));
+  EXPECT_EQ(IdleReads(), 0);
+  wire.ToHost(PlainFrame({1, 2}));
+  EXPECT_TRUE(engine->transport.NotifyReceived());
+  EXPECT_TRUE(Eventually([this] { return engine->responses.size() == 1; }));
+  EXPECT_TRUE(Asks()) << "it tells no more: while an answer is awaited it is asked all the same";
+  Bytes room(8);
+  EXPECT_TRUE(engine->transport.SendRaw(Bytes{5}, room, 60000));
+
+  TestWire other;
+  ASSERT_TRUE(engine->OpenUser(other.AsUserTransport()));
+  EXPECT_TRUE(Eventually([&] { return other.reads() > 5; })) << "another one has told nothing yet";
+}
+
+TEST_F(CallersTransport, MayTellFarTooOften) {
+  ASSERT_TRUE(engine->OpenUser(wire.AsUserTransport()));
+  std::atomic<bool> stop{false};
+  std::thread noise([&] {
+    while (!stop) engine->transport.NotifyReceived();
+  });
+  for (int i = 0; i < 50; ++i) EXPECT_TRUE(Asks()) << i;
+  EXPECT_TRUE(engine->transport.PauseThread());
+  engine->transport.ResumeThread();
+  EXPECT_TRUE(engine->transport.StopThread());
+  stop = true;
+  noise.join();
+}
+
+TEST_F(CallersTransport, TellsNothingFromInsideItsReceiveFunction) {
+  struct Self {
+    CKralThreadInterface& transport;
+    std::atomic<uint64_t> reads{0};
+  } self{engine->transport};
+  const auto receive = [](uintptr_t context, uintptr_t, uint32_t* count, uint8_t*) -> uint32_t {
+    auto& me = *reinterpret_cast<Self*>(context);
+    ++me.reads;
+    me.transport.NotifyReceived();
+    *count = 0;
+    return 0;
+  };
+  const auto send = [](uintptr_t, uintptr_t, uint32_t, const uint8_t*, uint32_t*) -> uint32_t { return 0; };
+  const auto flush = [](uintptr_t, uintptr_t) -> uint32_t { return 0; };
+  ASSERT_TRUE(engine->OpenUser({0, reinterpret_cast<uintptr_t>(&self), send, receive, flush}));
+  ASSERT_TRUE(Eventually([&] { return self.reads > 0; }));
+  std::this_thread::sleep_for(milliseconds(20));
+  EXPECT_LE(self.reads, 2u);
+  EXPECT_TRUE(engine->transport.StopThread());
+}
+
+TEST_F(CallersTransport, ThatWaitsItselfIsAskedAgainAtOnce) {
+  // One that is held up waits; let go, it comes back with nothing at once.
+  wire.HoldReceive(true);
+  ASSERT_TRUE(engine->OpenUser(wire.AsUserTransport()));
+  engine->transport.SetCallersWait(100);
+  ASSERT_TRUE(wire.WaitUntilHeld());
+  EXPECT_EQ(IdleReads(), 0);
+  wire.HoldReceive(false);
+  EXPECT_LE(IdleReads(), 3) << "one that does not wait does not keep a processor busy";
+  EXPECT_TRUE(Asks());
+}
+
 // --- Opening --------------------------------------------------------------------------------------------------------
 
 TEST(ReceiveThread, FailedOpenLeavesThePortClosedAndSaysSo) {

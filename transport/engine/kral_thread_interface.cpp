@@ -56,7 +56,7 @@ void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   if (gathered_.empty()) return;
   // Counted first: whoever has been given a packet finds it counted.
   packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
-  if (dispatcher != nullptr) dispatcher->PushAll(gathered_);
+  if (dispatcher != nullptr && !dispatcher->DispatchHere(gathered_)) dispatcher->PushAll(gathered_);
   gathered_.clear();
 }
 
@@ -98,6 +98,7 @@ bool CKralThreadInterface::BindUserTransport(const UserTransport& user) {
   }
   if (!QuietThread()) return false;
   BeginTraffic();
+  if (!IsSame(bound_, user)) loop_.ForgetCaller();
   bound_ = user;
   return port_.SetUserDefinedTransport(user.context, user.handle, user.send, user.receive, user.flush) == 1;
 }
@@ -203,6 +204,17 @@ void CKralThreadInterface::SetThreadReadTimeOut(uint32_t milliseconds) {
 
 void CKralThreadInterface::SetSleepDivisor(uint32_t divisor) {
   loop_.SetSleepDivisor(divisor);
+}
+
+void CKralThreadInterface::SetCallersWait(uint32_t milliseconds) {
+  loop_.SetCallersWait(milliseconds);
+  WakeReceiver();
+}
+
+bool CKralThreadInterface::NotifyReceived() {
+  if (!user_defined_) return false;
+  loop_.NotifyReceived();
+  return true;
 }
 
 void CKralThreadInterface::SetReceiveMode(ReceiveMode mode) {

@@ -65,6 +65,9 @@ class CKralThreadInterface {
   void SetOpenFlags(bool send_loopback, bool keep_buffers);
   void SetThreadReadTimeOut(uint32_t milliseconds);
   void SetReceiveMode(ReceiveMode mode);
+  // Of a caller's transport: how long its receive function waits, and that it has bytes.
+  void SetCallersWait(uint32_t milliseconds);
+  bool NotifyReceived();                   // false on a port
   void SetSleepDivisor(uint32_t divisor);  // for: trading processor time for latency. Kept; nothing sets it
 
   // --- Requests (kral_thread_requests.cpp) --------------------------------------------------------------------------
@@ -134,6 +137,7 @@ class CKralThreadInterface {
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
   std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);
+  std::optional<Packet> PopWithin(std::chrono::milliseconds time_out);
   Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
   ReplyKind WhyNotWritten() const;
   ReplyKind WhyNoReply() const;
@@ -153,7 +157,7 @@ class CKralThreadInterface {
   const std::atomic<bool>* abort_ = nullptr;  // both of whoever holds the request lock
   std::function<void(std::span<const uint8_t>)> unclaimed_;
   uint64_t garbled_before_ = 0;  // the request that was sent last
-  bool user_defined_ = false;
+  std::atomic<bool> user_defined_{false};
   bool paused_ = false;
   std::vector<uint8_t> timed_out_request_;
 

@@ -14,6 +14,9 @@ namespace {
 // A bound for what takes microseconds, unless a listener or a log callback holds the threads up.
 constexpr uint32_t kSettleMs = 20;
 
+// A caller that tells of bytes may have missed some: while they are awaited its transport is looked at all the same.
+constexpr uint32_t kLookEveryMs = 20;
+
 bool IsUnframed(PacketMode mode) {
   return mode == PacketMode::kUnframed1 || mode == PacketMode::kUnframed2;
 }
@@ -105,9 +108,22 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
 
 std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
   constexpr std::chrono::milliseconds kMoment{80};
-  auto record = responses_->PopWithin(time_out, abort_);
+  auto record = PopWithin(time_out);
   if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMoment));
   return record;
+}
+
+std::optional<Packet> CKralThreadInterface::PopWithin(std::chrono::milliseconds time_out) {
+  using std::chrono::steady_clock;
+  const auto end = steady_clock::now() + time_out;
+  auto left = time_out;
+  while (user_defined_ && loop_.caller_notifies() && left.count() > kLookEveryMs) {
+    auto record = responses_->PopWithin(std::chrono::milliseconds(kLookEveryMs), abort_);
+    if (record || responses_->closed() || aborted()) return record;
+    control_.Notify();
+    left = std::chrono::ceil<std::chrono::milliseconds>(end - steady_clock::now());
+  }
+  return responses_->PopWithin(std::max(left, std::chrono::milliseconds(0)), abort_);
 }
 
 ReplyKind CKralThreadInterface::WhyNotWritten() const {
@@ -154,7 +170,7 @@ Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<
 
 Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_out_ms) {
   const uint32_t start = clock_.TickMs();
-  for (;;) {
+  for (uint32_t turn = 1;; ++turn) {
     const bool ended = responses_->closed();
     if (const auto record = responses_->Pop()) {
       const size_t count = std::min(record->size(), room.size());
@@ -163,6 +179,7 @@ Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_ou
       return {ReplyKind::kExpected, record->empty() ? uint8_t{0} : record->front(), room.first(count)};
     }
     if (clock_.TickMs() - start >= time_out_ms || ended) return WhyNoReply();
+    if (user_defined_ && turn % kLookEveryMs == 0) control_.Notify();
     clock_.SleepMs(1);
   }
 }

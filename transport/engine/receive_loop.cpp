@@ -14,14 +14,18 @@
 namespace kral {
 namespace {
 
-// How long a wait goes without looking around. Everything that matters ends it at once.
-constexpr uint32_t kIdleWaitMs = 1000;
+// What matters to an idle connection ends its wait: it costs no processor time at all.
+constexpr uint32_t kUntilSomethingHappens = UINT32_MAX;
+
+// Between two looks at a caller's transport that tells of nothing.
+constexpr uint32_t kLookEveryMs = 1;
 
 }  // namespace
 
 void ReceiveLoop::Run() {
   // Also when its host ends the thread inside a function of its own.
   const AtExit left([this] { control_.AcknowledgeStop(); });
+  thread_ = std::this_thread::get_id();
   acknowledged_pause_ = 0;
   sleep_counter_ = 0;
   while (!control_.stop_requested()) {
@@ -29,14 +33,15 @@ void ReceiveLoop::Run() {
     const bool wake_on_data = mode_ == ReceiveMode::kWakeOnData;
     if (!wake_on_data) SleepByRule();
     if (IsPaused()) {
-      if (wake_on_data) control_.WaitForChange(changes_seen, kIdleWaitMs);
+      if (wake_on_data) control_.WaitForChange(changes_seen, kUntilSomethingHappens);
       continue;
     }
     if (!wake_on_data) {
       ReadChunk();
+    } else if (port_.user_defined()) {
+      ReadFromCaller(changes_seen);
     } else if (WaitForBytes(changes_seen) && !ReadChunk()) {
-      // Nothing came from where something was promised, or from a caller's function, which cannot be waited on.
-      clock_.SleepMs(1);
+      clock_.SleepMs(1);  // nothing came where something was promised
     }
     if (port_.CloseIfGone() && on_gone_) on_gone_();
   }
@@ -65,11 +70,36 @@ bool ReceiveLoop::IsPaused() {
 
 // True when the port is to be read.
 bool ReceiveLoop::WaitForBytes(uint32_t changes_seen) {
-  if (port_.IsOpen() == 0 || port_.gone()) {
-    control_.WaitForChange(changes_seen, kIdleWaitMs);
+  if (port_.IsOpen() == 0) {
+    control_.WaitForChange(changes_seen, kUntilSomethingHappens);
     return false;
   }
-  return !port_.CanWait() || port_.WaitReadable(kIdleWaitMs);
+  return !port_.gone() && port_.WaitReadable(kUntilSomethingHappens);
+}
+
+// A caller's functions cannot be waited on, so the caller waits, tells of bytes, or is asked again and again. Bytes of
+// which it tells while it is asked end the wait that follows.
+void ReceiveLoop::ReadFromCaller(uint32_t changes_seen) {
+  if (port_.IsOpen() == 0) return control_.WaitForChange(changes_seen, kUntilSomethingHappens);
+  const uint32_t longest_wait = callers_wait_ms_;
+  const uint32_t start = clock_.TickMs();
+  if (ReadChunk()) return;
+  const bool has_waited = longest_wait > 0 && clock_.TickMs() - start > 0;
+  if (has_waited) return;
+  const bool is_told = caller_notifies_ && longest_wait == 0;
+  control_.WaitForChange(changes_seen, is_told ? kUntilSomethingHappens : kLookEveryMs);
+}
+
+void ReceiveLoop::ForgetCaller() {
+  callers_wait_ms_ = 0;
+  caller_notifies_ = false;
+}
+
+void ReceiveLoop::NotifyReceived() {
+  caller_notifies_ = true;
+  // In the receive function itself it tells nothing: what brings bytes is asked again anyway, and what brings none and
+  // tells of some would be asked for ever.
+  if (std::this_thread::get_id() != thread_.load()) control_.Notify();
 }
 
 bool ReceiveLoop::ReadChunk() {

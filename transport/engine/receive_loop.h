@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cstdint>
 #include <functional>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -36,6 +37,12 @@ class ReceiveLoop {
   void SetGoneHandler(std::function<void()> handler) { on_gone_ = std::move(handler); }
   void SetMode(ReceiveMode mode) { mode_ = mode; }
   void SetReadTimeOut(uint32_t milliseconds) { read_time_out_ms_ = milliseconds; }
+  // How long a caller's receive function waits for bytes by itself; 0: it does not.
+  void SetCallersWait(uint32_t milliseconds) { callers_wait_ms_ = milliseconds; }
+  // The caller's transport has bytes. From the first time on it is relied upon to say so.
+  void NotifyReceived();
+  void ForgetCaller();  // another one brings the bytes: what the former one said of itself no longer holds
+  bool caller_notifies() const { return caller_notifies_; }
   void SetSleepDivisor(uint32_t divisor) { sleep_divisor_ = divisor == 0 ? 1 : divisor; }
 
   void Run();
@@ -49,6 +56,7 @@ class ReceiveLoop {
   void SleepByRule();
   bool IsPaused();
   bool WaitForBytes(uint32_t changes_seen);
+  void ReadFromCaller(uint32_t changes_seen);
   bool ReadChunk();
   void Split(uint32_t count);
   void SetSplitting(bool splitting);
@@ -63,6 +71,9 @@ class ReceiveLoop {
   std::atomic<ReceiveMode> mode_{ReceiveMode::kAsWritten};
   std::atomic<uint32_t> read_time_out_ms_{500};
   std::atomic<uint32_t> sleep_divisor_{1};
+  std::atomic<uint32_t> callers_wait_ms_{0};
+  std::atomic<bool> caller_notifies_{false};
+  std::atomic<std::thread::id> thread_{};
   std::atomic<uint64_t> bytes_received_{0};
 
   Mutex chunk_mutex_;

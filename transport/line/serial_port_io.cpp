@@ -63,6 +63,7 @@ uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_
       log_->WriteLine(kLogInfDev, "CSerialPort::Send: %u of %u bytes after more than %u ms", sent, count, time_out);
       return 0;
     }
+    if (device->gone()) device->Wake();  // who waits for its bytes may not have noticed
     if (sent == count || device->gone()) break;
     if (taken == 0) clock_.SleepMs(1);  // a driver that refuses at once must not keep the thread busy
   } while (device->OutputRoom() > 0);
