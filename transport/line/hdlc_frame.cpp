@@ -2,6 +2,7 @@
 #include "transport/line/hdlc_frame.h"
 
 #include <algorithm>
+#include <array>
 #include <bit>
 
 #include "transport/line/byte_block.h"
@@ -10,12 +11,24 @@
 namespace kral {
 namespace {
 
-// One byte without a branch: a plain byte's second write is overwritten by what comes next, the closing flag at last.
+// What each byte becomes: the first byte in the lower half, and in the upper half the second one, or 0.
+constexpr auto kStuffed = [] {
+  std::array<uint16_t, 256> stuffed{};
+  for (unsigned byte = 0; byte < stuffed.size(); ++byte) {
+    const bool special = byte == kFrameFlag || byte == kFrameEscape;
+    stuffed[byte] = static_cast<uint16_t>(special ? kFrameEscape | (byte ^ kEscapeBit) << 8 : byte);
+  }
+  return stuffed;
+}();
+static_assert(((kFrameFlag ^ kEscapeBit) >> 6) == 1 && ((kFrameEscape ^ kEscapeBit) >> 6) == 1);
+
+// One byte without a branch, which a processor could not guess, and the compiler would make of a comparison: a plain
+// byte's second write is overwritten by what comes next, the closing flag at last.
 uint8_t* StuffByte(uint8_t byte, uint8_t* out) {
-  const bool special = byte == kFrameFlag || byte == kFrameEscape;
-  out[0] = special ? kFrameEscape : byte;
-  out[1] = byte ^ kEscapeBit;
-  return out + 1 + (special ? 1 : 0);
+  const uint16_t stuffed = kStuffed[byte];
+  out[0] = static_cast<uint8_t>(stuffed);
+  out[1] = static_cast<uint8_t>(stuffed >> 8);
+  return out + 1 + (stuffed >> 14);
 }
 
 // Gives the end of what was written; the byte behind it may have been written too.
