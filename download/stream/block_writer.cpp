@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "base/failure.h"
+#include "download/stream/stream_format.h"
 
 namespace kral::stream {
 namespace {
@@ -35,7 +36,8 @@ BlockWriter::BlockWriter(download::DownloadConnection& connection, DownloadAgent
       image_(image),
       command_(command),
       time_out_ms_(time_out_ms),
-      buffer_(std::min(block_size, CImageWriteCmdFramed::kMostFramedData)) {}
+      most_data_(std::min(block_size, CImageWriteCmdFramed::kMostFramedData)),
+      buffer_(kWriteHeaderSize + 2 * size_t{most_data_}) {}
 
 bool BlockWriter::Run(uint32_t total) {
   while (!agent_.done()) {
@@ -95,20 +97,39 @@ std::optional<CDownloadBlock> BlockWriter::Take() {
 }
 
 std::optional<CDownloadBlock> BlockWriter::Load(std::optional<CDownloadBlock> block) {
-  if (block) image_.Read(block->address, buffer_.data(), block->size, block->device);
+  if (block) Hold(*block);
   return block;
+}
+
+std::span<const uint8_t> BlockWriter::Hold(const CDownloadBlock& block) {
+  if (held_.address != block.address || held_.device != block.device || held_.size == 0) {
+    held_ = {block.address, 0, block.device};
+    held_begin_ = kWriteHeaderSize;
+  }
+  if (held_begin_ + block.size > buffer_.size()) {
+    std::copy_n(buffer_.data() + held_begin_, held_.size, buffer_.data() + kWriteHeaderSize);
+    held_begin_ = kWriteHeaderSize;
+  }
+  uint8_t* const begin = buffer_.data() + held_begin_;
+  if (held_.size < block.size) {
+    image_.Read(block.address + held_.size, begin + held_.size, block.size - held_.size, block.device);
+    held_.size = block.size;
+  }
+  return {begin, block.size};
 }
 
 std::optional<CDownloadBlock> BlockWriter::Carve() {
   const auto head = agent_.head();
   if (!head) return std::nullopt;
-  const auto size = std::min(head->size, static_cast<uint32_t>(buffer_.size()));
-  image_.Read(head->address, buffer_.data(), size, head->device);
-  return agent_.Carve(CImageWriteCmdFramed::FittingSize(head->address, std::span(buffer_).first(size)));
+  const auto data = Hold({head->address, std::min(head->size, most_data_), head->device});
+  return agent_.Carve(CImageWriteCmdFramed::FittingSize(head->address, data));
 }
 
 bool BlockWriter::Send(const CDownloadBlock& block) {
-  if (!command_.Send(block.address, std::span(buffer_).first(block.size))) return false;
+  const auto packet = std::span(buffer_).subspan(held_begin_ - kWriteHeaderSize, kWriteHeaderSize + block.size);
+  if (!command_.Send(block.address, packet)) return false;
+  held_ = {block.address + block.size, held_.size - block.size, block.device};
+  held_begin_ += block.size;
   agent_.CountSent();
   if (block.address % kProgressLineEvery == 0) {
     connection_.log().WriteLine(kLogRet, "Streaming address 0x%08X, acknowledged 0x%X\n", block.address,

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <vector>
 
 #include "download/images/phone_image.h"
@@ -26,10 +27,12 @@ class BlockWriter {
   enum class Turn { kTake, kSendAgain, kNothing, kGiveUp };
 
   Turn AwaitTurn(uint32_t total);
-  // Each leaves the bytes of its block at the beginning of the buffer.
+  // Each holds its block.
   std::optional<CDownloadBlock> Take();
   std::optional<CDownloadBlock> Carve();
   std::optional<CDownloadBlock> Load(std::optional<CDownloadBlock> block);
+  // Reads of the block what is not held yet, and gives its bytes.
+  std::span<const uint8_t> Hold(const CDownloadBlock& block);
   bool Send(const CDownloadBlock& block);
 
   download::DownloadConnection& connection_;
@@ -37,7 +40,12 @@ class BlockWriter {
   const images::PhoneImage& image_;
   CImageWriteCmd& command_;
   const uint32_t time_out_ms_;
-  std::vector<uint8_t> buffer_;  // one block
+  const uint32_t most_data_;
+  // What has been read of the image and not sent: a frame may take less than was read for it. `held_begin_` is its
+  // place in the buffer, with room for a header in front.
+  std::vector<uint8_t> buffer_;
+  CDownloadBlock held_{};
+  size_t held_begin_ = 0;
   uint32_t time_outs_in_a_row_ = 0;
   uint32_t acknowledged_ = 0;
 };

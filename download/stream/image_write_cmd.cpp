@@ -37,16 +37,13 @@ size_t CountEscaped(std::span<const uint8_t> bytes) {
 
 }  // namespace
 
-bool CImageWriteCmdFramed::Send(uint32_t address, std::span<const uint8_t> data) {
-  if (data.size() > kMostWriteData) {
+bool CImageWriteCmdFramed::Send(uint32_t address, std::span<uint8_t> packet) {
+  if (packet.size() > kWriteBufferSize) {
     connection_.log().WriteLine(kLogErr, "write command too long\n");
-    return Fail(Failure(KRAL_ERROR_INTERNAL, "a write command of %zu bytes is too long", data.size()));
+    return Fail(Failure(KRAL_ERROR_INTERNAL, "a write command of %zu bytes is too long", packet.size()));
   }
-  packet_.resize(kWriteBufferSize);
-  const auto header = Header(address);
-  const auto body = std::ranges::copy(header, packet_.begin()).out;
-  std::ranges::copy(data, body);
-  if (connection_.WriteHDLCNoRead(std::span(packet_).first(header.size() + data.size()), time_out_ms_)) return true;
+  std::ranges::copy(Header(address), packet.begin());
+  if (connection_.WriteHDLCNoRead(packet, time_out_ms_)) return true;
   connection_.log().WriteLine(kLogErr, "WriteHDLCNoRead failed with status %u\n", kStatusNotSent);
   return false;
 }

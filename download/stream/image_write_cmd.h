@@ -4,7 +4,6 @@
 
 #include <cstdint>
 #include <span>
-#include <vector>
 
 #include "download/link/download_connection.h"
 
@@ -13,7 +12,8 @@ namespace kral::stream {
 class CImageWriteCmd {
  public:
   virtual ~CImageWriteCmd() = default;
-  virtual bool Send(uint32_t address, std::span<const uint8_t> data) = 0;
+  // `packet` is room for the header, kWriteHeaderSize bytes that are written to, and the data behind it.
+  virtual bool Send(uint32_t address, std::span<uint8_t> packet) = 0;
 };
 
 class CImageWriteCmdFramed final : public CImageWriteCmd {
@@ -24,7 +24,7 @@ class CImageWriteCmdFramed final : public CImageWriteCmd {
   CImageWriteCmdFramed(download::DownloadConnection& connection, uint32_t time_out_ms)
       : connection_(connection), time_out_ms_(time_out_ms) {}
 
-  bool Send(uint32_t address, std::span<const uint8_t> data) override;
+  bool Send(uint32_t address, std::span<uint8_t> packet) override;
 
   // How much of the data, from its beginning, one frame takes.
   static uint32_t FittingSize(uint32_t address, std::span<const uint8_t> data);
@@ -32,7 +32,6 @@ class CImageWriteCmdFramed final : public CImageWriteCmd {
  private:
   download::DownloadConnection& connection_;
   const uint32_t time_out_ms_;
-  std::vector<uint8_t> packet_;
 };
 
 }  // namespace kral::stream
