@@ -12,6 +12,13 @@ else()
 endif()
 set(KRAL_LIBRARIES_storage_nv z)
 
+if(KRAL_PRECOMPILE)
+  file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/generated/precompiled.cpp CONTENT "")
+  add_library(kral_precompiled OBJECT ${PROJECT_BINARY_DIR}/generated/precompiled.cpp)
+  target_link_libraries(kral_precompiled PRIVATE Threads::Threads kral_compile)
+  target_precompile_headers(kral_precompiled PRIVATE ${PROJECT_SOURCE_DIR}/cmake/precompiled.h)
+endif()
+
 function(kral_layer name folder arrows)
   file(GLOB sources CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/${folder}/*.cpp
     ${PROJECT_SOURCE_DIR}/${folder}/${KRAL_PLATFORM}/*.cpp)
@@ -23,6 +30,9 @@ function(kral_layer name folder arrows)
     target_link_libraries(kral_${name} PUBLIC ${arrows} Threads::Threads
       PRIVATE kral_compile ${KRAL_LIBRARIES_${name}})
     target_include_directories(kral_${name} PUBLIC ${PROJECT_SOURCE_DIR})
+    if(KRAL_PRECOMPILE)
+      target_precompile_headers(kral_${name} REUSE_FROM kral_precompiled)
+    endif()
   else()
     add_library(kral_${name} INTERFACE)
     target_link_libraries(kral_${name} INTERFACE ${arrows})

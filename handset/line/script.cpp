@@ -46,7 +46,7 @@ Script::Step Script::Expect(std::string_view hex) {
   for (size_t i = 0; i + 1 < known.size(); i += 2) {
     const bool any = known[i] == '?' && known[i + 1] == '?';
     entry.any.push_back(any);
-    if (any) known.replace(i, 2, "00");
+    if (any) known[i] = known[i + 1] = '0';
   }
   entry.expected = FromHex(known);
 
@@ -64,8 +64,8 @@ std::string Script::Problems() const {
   const std::lock_guard lock(mutex_);
   std::string text = problems_;
   if (next_ < entries_.size()) {
-    text += "never asked: " + std::to_string(entries_.size() - next_) + " of " + std::to_string(entries_.size()) +
-            " requests, the first of them\n" + HexDump(entries_[next_].expected);
+    text += std::string("never asked: ") + std::to_string(entries_.size() - next_) + " of " +
+            std::to_string(entries_.size()) + " requests, the first of them\n" + HexDump(entries_[next_].expected);
   }
   return text;
 }
@@ -79,9 +79,10 @@ Script::Outcome Script::Match(ByteView request, std::vector<ScriptedReply>& repl
     replies = entry.replies;
     return Outcome::kMatched;
   }
-  problems_ += "request " + std::to_string(next_) + " differs at offset " + std::to_string(difference) + "; awaited " +
-               std::to_string(entry.expected.size()) + (entry.any_rest ? " bytes or more\n" : " bytes\n") +
-               HexDump(entry.expected) + "but got " + std::to_string(request.size()) + " bytes\n" + HexDump(request);
+  problems_ += std::string("request ") + std::to_string(next_) + " differs at offset " + std::to_string(difference) +
+               "; awaited " + std::to_string(entry.expected.size()) +
+               (entry.any_rest ? " bytes or more\n" : " bytes\n") + HexDump(entry.expected) + "but got " +
+               std::to_string(request.size()) + " bytes\n" + HexDump(request);
   return Outcome::kMismatch;
 }
 

@@ -133,7 +133,7 @@ class Reader {
       throw BadXml(type_name + " has forms or a variable size, and cannot be a member's type");
     }
     for (uint32_t i = 0; i < count; ++i) {
-      const std::string prefix = name + (count > 1 ? "[" + std::to_string(i) + "]." : ".");
+      const std::string prefix = count > 1 ? name + "[" + std::to_string(i) + "]." : name + ".";
       for (const NvMember& inner : type->forms()[0].members) {
         Append(members, size, {prefix + inner.name, inner.width, inner.is_signed, inner.count});
       }
@@ -202,20 +202,17 @@ class Reader {
   size_t name_bytes_ = 0;
 };
 
-std::string Attribute(std::string_view name, std::string_view value) {
-  return " " + std::string(name) + "=\"" + EscapeXml(value) + "\"";
-}
-
 std::string FormText(const NvDataType& type, const NvForm& form) {
   std::string text = "<DataType";
-  if (!type.name().empty()) text += Attribute("name", type.name());
-  if (form.selector) text += Attribute("variantType", std::to_string(*form.selector));
-  if (type.variable_size()) text += Attribute("variableSize", "1");
+  if (!type.name().empty()) text += AttributeText("name", type.name());
+  if (form.selector) text += AttributeText("variantType", std::to_string(*form.selector));
+  if (type.variable_size()) text += AttributeText("variableSize", "1");
   text += ">";
   for (const NvMember& member : form.members) {
-    text += "<Member" + Attribute("name", member.name) + Attribute("typeid", "word" + std::to_string(8 * member.width));
-    if (member.is_signed) text += Attribute("signed", "1");
-    if (member.count != 1) text += Attribute("num_of_element", std::to_string(member.count));
+    text += "<Member" + AttributeText("name", member.name) +
+            AttributeText("typeid", "word" + std::to_string(8 * member.width));
+    if (member.is_signed) text += AttributeText("signed", "1");
+    if (member.count != 1) text += AttributeText("num_of_element", std::to_string(member.count));
     text += "/>";
   }
   return text + "</DataType>";
@@ -258,12 +255,13 @@ std::string DataTypeText(const NvDataType& type) {
 
 std::string DefinitionText(const NvItem& item) {
   const char* const element = item.is_file() ? "NvEfsItem" : "NvItem";
-  std::string text = "<" + std::string(element);
-  text += item.is_file() ? Attribute("fullpathname", item.path) : Attribute("id", std::to_string(*item.id));
-  text += Attribute("name", item.name);
-  if (!item.version.empty()) text += Attribute("version", item.version);
-  if (item.is_array()) text += Attribute("maxIndex", std::to_string(item.max_index));
-  if (item.compressed) text += Attribute("compressed", "1");
+  std::string text("<");
+  text += element;
+  text += item.is_file() ? AttributeText("fullpathname", item.path) : AttributeText("id", std::to_string(*item.id));
+  text += AttributeText("name", item.name);
+  if (!item.version.empty()) text += AttributeText("version", item.version);
+  if (item.is_array()) text += AttributeText("maxIndex", std::to_string(item.max_index));
+  if (item.compressed) text += AttributeText("compressed", "1");
   const NvDataType unnamed("", item.type->forms(), item.type->variable_size());
   return text + ">" + DataTypeText(unnamed) + "</" + element + ">";
 }

@@ -51,21 +51,19 @@ uint32_t ReadRoamingListNumber(const XmlElement& element) {
   return number;
 }
 
-std::string Quoted(std::string_view name, std::string_view value) {
-  return " " + std::string(name) + "=\"" + EscapeXml(value) + "\"";
-}
-
 std::string ItemText(const NvSourceItem& item) {
   const std::string element = item.id ? "NvItem" : "NvEfsItem";
   std::string text = "<" + element;
   if (item.id) {
-    text += Quoted("id", std::to_string(*item.id)) + Quoted("subscriptionid", std::to_string(item.slot.subscription));
+    text += AttributeText("id", std::to_string(*item.id)) +
+            AttributeText("subscriptionid", std::to_string(item.slot.subscription));
   } else {
-    text += Quoted("fullpathname", item.path);
+    text += AttributeText("fullpathname", item.path);
   }
-  text += Quoted("name", item.name);
+  text += AttributeText("name", item.name);
   text += item.is_direct ? " mapping=\"direct\" encoding=\"dec\"" : " mapping=\"byteStream\" encoding=\"hex\"";
-  return text + Quoted("index", std::to_string(item.slot.element)) + ">" + EscapeXml(item.value) + "</" + element + ">";
+  return text + AttributeText("index", std::to_string(item.slot.element)) + ">" + EscapeXml(item.value) + "</" +
+         element + ">";
 }
 
 std::string HexNumber(uint32_t number) {

@@ -45,4 +45,8 @@ std::string TextAttribute(const XmlElement& element, std::string_view name) {
   return text == nullptr ? std::string() : *text;
 }
 
+std::string AttributeText(std::string_view name, std::string_view value) {
+  return std::string(" ").append(name).append("=\"").append(EscapeXml(value)).append("\"");
+}
+
 }  // namespace kral::nv

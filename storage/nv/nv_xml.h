@@ -29,6 +29,9 @@ uint64_t RequiredNumber(const XmlElement& element, std::string_view name, uint64
 // Empty when absent.
 std::string TextAttribute(const XmlElement& element, std::string_view name);
 
+// As it is written: a blank, the name, and the value in quotation marks.
+std::string AttributeText(std::string_view name, std::string_view value);
+
 }  // namespace kral::nv
 
 #endif

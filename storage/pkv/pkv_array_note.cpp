@@ -14,7 +14,7 @@ constexpr const char* kArraysProperty = "Arrays";
 
 void NoteArrays(const std::set<uint16_t>& ids, PkvProperties& properties) {
   std::string list;
-  for (const uint16_t id : ids) list += (list.empty() ? "" : ",") + std::to_string(id);
+  for (const uint16_t id : ids) list.append(list.empty() ? "" : ",").append(std::to_string(id));
   properties.values.emplace_back(kArraysProperty, list);
 }
 
