@@ -5,13 +5,21 @@
 #include "base/text_log.h"
 #include "download/download_client.h"
 #include "download/link/download_failure.h"
-#include "download/stream/image_open.h"
 #include "download/stream/image_set_up.h"
 #include "download/stream/stream_format.h"
 #include "kral/ventrims.h"
 #include "storage/backup/pkv_jobs.h"
 
 namespace kral::station {
+namespace {
+
+Failure HeaderTooLong(const std::string& file, uint32_t size) {
+  const std::string what =
+      "has " + std::to_string(size) + " bytes: a header takes " + std::to_string(stream::kLongestHeader) + " at most";
+  return FileFailure(file, what.c_str());
+}
+
+}  // namespace
 
 bool JobFiles::Open(Step& step) try {
   switch (step.kind) {
@@ -53,6 +61,7 @@ bool JobFiles::OpenHex(Step& step) {
 bool JobFiles::OpenTable(Step& step) {
   auto table = std::make_shared<std::vector<uint8_t>>();
   if (!stream::ReadPartitionTable(NullLog(), step.file, *table)) return false;
+  if (table->empty()) return Fail(FileFailure(step.file, "is empty: it is no partition table"));
   step.table = std::move(table);
   return true;
 }
@@ -70,7 +79,7 @@ bool JobFiles::OpenImage(Step& step) {
       return false;
     }
     if (const uint32_t size = step.has_header ? opened->header.image().GetSize(0) : 0; size > stream::kLongestHeader)
-      return Fail(stream::HeaderTooLong(size));
+      return Fail(HeaderTooLong(step.header_file, size));
     known = std::move(opened);
   }
   step.bytes = known->image.image().GetSize(0);

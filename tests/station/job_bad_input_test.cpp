@@ -50,7 +50,7 @@ TEST_F(JobBadInput, IsRefusedBeforeAnythingIsSent) {
       {"a broken HEX file", KRAL_ERROR_BAD_FILE, "line 2", [&] { AddImage(broken); }},
       {"a HEX file that loses data", KRAL_ERROR_BAD_FILE, "line 1", [&] { AddImage(dropped); }},
       {"a second region", KRAL_ERROR_BAD_FILE, "second region", [&] { AddImage(second_region); }},
-      {"a long header", KRAL_ERROR_ARGUMENT, "513",
+      {"a long header", KRAL_ERROR_BAD_FILE, "header has 513 bytes: a header takes 512",
        [&] {
          KRAL_VENTRIMS_AddImage(job_, image_.c_str(), KRAL_IMAGE_FORMAT_BINARY, 1, long_header.c_str(),
                                 KRAL_STREAM_MULTI_IMAGE);
@@ -58,6 +58,8 @@ TEST_F(JobBadInput, IsRefusedBeforeAnythingIsSent) {
       {"a missing programmer", KRAL_ERROR_BAD_FILE, "missing", [&] { Programmer(missing.c_str()); }},
       {"a programmer without content", KRAL_ERROR_BAD_FILE, "empty",
        [&] { KRAL_VENTRIMS_AddProgrammer(job_, empty.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT); }},
+      {"an empty table", KRAL_ERROR_BAD_FILE, "is empty",
+       [&] { KRAL_VENTRIMS_AddPartitionTable(job_, empty.c_str(), 0); }},
       {"a long table", KRAL_ERROR_BAD_FILE, "512", [&] { KRAL_VENTRIMS_AddPartitionTable(job_, image_.c_str(), 0); }},
       {"no PKV file", KRAL_ERROR_BAD_FILE, "image.bin", [&] { KRAL_VENTRIMS_AddRestore(job_, image_.c_str()); }},
       {"the programmer behind an image", KRAL_ERROR_ARGUMENT, "order",
