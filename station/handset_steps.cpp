@@ -1,11 +1,14 @@
 // The steps of a job on one handset, each with the operation of the family it belongs to.
 #include <algorithm>
+#include <utility>
 
 #include "base/at_exit.h"
 #include "commands/core/core_diag.h"
 #include "download/boot/kivrat.h"
 #include "download/download_client.h"
 #include "download/flash_all.h"
+#include "download/kova/kova_format.h"
+#include "download/link/download_settings.h"
 #include "kral/diag.h"
 #include "station/handset_worker.h"
 #include "storage/backup/pkv_jobs.h"
@@ -14,9 +17,8 @@
 namespace kral::station {
 namespace {
 
-constexpr uint32_t kPauseMs = 100;
+constexpr uint32_t kHelloNops = 3;
 constexpr uint32_t kFirstPatienceMs = 200;
-constexpr uint32_t kAmplePacket = 8178;  // so the loader gets the largest writes
 
 kivrat::Programmer AsProgrammer(const CMapFileToMemory& file) {
   return {file.Size(), [&file](uint64_t offset, std::span<uint8_t> room, size_t& count) {
@@ -84,7 +86,7 @@ bool HandsetWorker::EnterLoader() {
 bool HandsetWorker::StartProgrammer(const Step& step) {
   if (programmer_started_) return true;
   programmer_started_ =
-      step.hex ? download::LoadProgrammer(phone_, *step.hex, kAmplePacket, nullptr) : BootTransfer(step);
+      step.hex ? download::LoadProgrammer(phone_, *step.hex, kova::kAmplePacket, nullptr) : BootTransfer(step);
   return programmer_started_;
 }
 
@@ -106,8 +108,19 @@ bool HandsetWorker::BootTransfer(const Step& step) {
   return false;
 }
 
-bool HandsetWorker::Greet() {
+// A hello is a row of waits; together they end within `within_ms`.
+bool HandsetWorker::Greet(uint32_t within_ms) {
   if (greeted_) return true;
+  download::Settings& settings = phone_.state<download::Settings>();
+  const uint32_t limit = settings.handshake_limit_ms;
+  const uint32_t delay = settings.hello_retry_delay_ms;
+  const uint32_t wait = std::max(within_ms / (kHelloNops + 2 * std::max(settings.hello_tries.load(), 1u)), 1u);
+  const AtExit set_back([&] {
+    settings.handshake_limit_ms = limit;
+    settings.hello_retry_delay_ms = delay;
+  });
+  settings.handshake_limit_ms = std::min({limit, wait, options_.command_ms != 0 ? options_.command_ms : UINT32_MAX});
+  settings.hello_retry_delay_ms = std::min(delay, wait);
   greeted_ = download::StreamHello(phone_, KRAL_STREAM_HELLO_VARIANT, &block_size_, &window_);
   if (options_.block_size != 0) block_size_ = std::min(block_size_, options_.block_size);
   return greeted_;
@@ -131,37 +144,30 @@ bool HandsetWorker::SetMode(uint32_t mode) {
   return mode != KRAL_MODE_RESET || AwaitDiagnostics(options_.start_ms);
 }
 
-// With a request that every handset knows. The first tries are short, for one that is still starting; each later one
-// waits longer, for one that is slow.
+// With a request that every handset knows, or refuses: it answers either way. The first tries are short, for one that
+// is still starting; each later one waits longer, for one that is slow.
 bool HandsetWorker::AwaitDiagnostics(uint32_t within_ms) {
-  const uint32_t start = Now();
   const uint32_t longest = std::max(phone_.TimeOut(kTimeOutDefaultCommand), 1u);
   uint32_t patience = std::min(kFirstPatienceMs, longest);
-  for (;;) {
+  const auto answers = [&] {
     CDiagPacket& version = phone_.packet();
     version.Reset();
     version.Append8(0);
-    if (phone_.IsPortOpen() && phone_.Send(version, patience)) return true;
-    if (stopped()) return false;
-    if (Now() - start >= within_ms) break;
-    patience = std::min(2 * patience, longest);
-    if (!Pause(kPauseMs)) return false;
-  }
-  return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the handset on COM%d did not answer in diagnostics within %u ms",
+    if (!phone_.IsPortOpen()) return false;
+    const Reply reply = phone_.Send(version, std::exchange(patience, std::min(2 * patience, longest)));
+    return reply || reply.refusal() != 0;
+  };
+  if (Await(within_ms, answers)) return true;
+  return !stopped() &&
+         Fail(Failure(KRAL_ERROR_NO_ANSWER, "the handset on COM%d did not answer in diagnostics within %u ms",
                       phone_.port(), within_ms));
 }
 
 bool HandsetWorker::AwaitLoader(uint32_t within_ms) {
-  const uint32_t start = Now();
-  while (!download::KovaNop(phone_)) {
-    if (stopped()) return false;
-    if (Now() - start >= within_ms) {
-      return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the loader of the handset on COM%d did not answer within %u ms",
-                          phone_.port(), within_ms));
-    }
-    if (!Pause(kPauseMs)) return false;
-  }
-  return true;
+  if (Await(within_ms, [this] { return download::KovaNop(phone_); })) return true;
+  return !stopped() &&
+         Fail(Failure(KRAL_ERROR_NO_ANSWER, "the loader of the handset on COM%d did not answer within %u ms",
+                      phone_.port(), within_ms));
 }
 
 }  // namespace kral::station

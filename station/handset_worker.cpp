@@ -82,35 +82,42 @@ bool HandsetWorker::Recover(const Step& step) {
       return download::KovaNop(phone_) ||
              Fail(Failure(KRAL_ERROR_LOST, "COM%d came back without its loader: it cannot go on", phone_.port()));
     case StepKind::kPartitionTable:
-    case StepKind::kImage: {
-      greeted_ = false;
-      // Nothing tells when a caller's transport is back.
-      const uint32_t start = Now();
-      while (!Greet()) {
-        if (stopped()) return false;
-        const bool may_come = phone_.transport().port().user_defined() || !phone_.IsPortOpen();
-        if (!may_come || Now() - start >= options_.return_ms) {
-          if (lost_by_ != KRAL_ERROR_LOST) return false;  // silent, then and now
-          return Fail(
-              Failure(KRAL_ERROR_LOST, "COM%d came back without its flash programmer: it cannot go on", phone_.port()));
-        }
-        if (!Pause(kLookAroundMs)) return false;
-      }
-      return true;
-    }
+    case StepKind::kImage:
+      return GreetAgain();
     default:
       return AwaitDiagnostics(options_.return_ms);
   }
 }
 
+bool HandsetWorker::GreetAgain() {
+  greeted_ = false;
+  const uint32_t start = Now();
+  const auto greeted_or_over = [&] {
+    if (Greet(options_.return_ms - std::min(Now() - start, options_.return_ms))) return true;
+    // Nothing tells when a caller's transport is back.
+    return phone_.IsPortOpen() && !phone_.transport().port().user_defined();
+  };
+  Await(options_.return_ms, greeted_or_over);
+  if (greeted_ || stopped()) return greeted_;
+  if (lost_by_ != KRAL_ERROR_LOST) return false;  // silent or garbled, then and now
+  if (failure_->record().code != KRAL_ERROR_NO_ANSWER)
+    return Fail(
+        Failure(KRAL_ERROR_LOST, "COM%d came back without its flash programmer: it cannot go on", phone_.port()));
+  return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the handset on COM%d stopped answering: no hello came within %u ms",
+                      phone_.port(), options_.return_ms));
+}
+
 bool HandsetWorker::AwaitPort() {
   phone_.GiveBackPort();
+  if (Await(options_.return_ms, [this] { return phone_.IsPortOpen(); })) return true;
+  return !stopped() &&
+         Fail(Failure(KRAL_ERROR_LOST, "COM%d did not return within %u ms", phone_.port(), options_.return_ms));
+}
+
+bool HandsetWorker::Await(uint32_t within_ms, const std::function<bool()>& holds) {
   const uint32_t start = Now();
-  while (!phone_.IsPortOpen()) {
-    if (Now() - start >= options_.return_ms) {
-      return Fail(Failure(KRAL_ERROR_LOST, "COM%d did not return within %u ms", phone_.port(), options_.return_ms));
-    }
-    if (!Pause(kLookAroundMs)) return false;
+  while (!holds()) {
+    if (stopped() || Now() - start >= within_ms || !Pause(kLookAroundMs)) return false;
   }
   return true;
 }

@@ -3,6 +3,7 @@
 #define KRAL_STATION_HANDSET_WORKER_H
 
 #include <cstdint>
+#include <functional>
 
 #include "base/failure.h"
 #include "kral/ventrims.h"
@@ -31,7 +32,8 @@ class HandsetWorker {
   bool EnterLoader();
   bool StartProgrammer(const Step& step);
   bool BootTransfer(const Step& step);
-  bool Greet();
+  bool Greet(uint32_t within_ms = UINT32_MAX);
+  bool GreetAgain();
   bool WriteImage(const Step& step);
   bool Restart();
   bool SetMode(uint32_t mode);
@@ -39,7 +41,8 @@ class HandsetWorker {
   bool AwaitPort();
   bool AwaitDiagnostics(uint32_t within_ms);
   bool AwaitLoader(uint32_t within_ms);
-  bool Pause(uint32_t milliseconds);  // false when an abort ended it
+  bool Await(uint32_t within_ms, const std::function<bool()>& holds);  // false also when an abort ended it
+  bool Pause(uint32_t milliseconds);                                   // false when an abort ended it
   bool stopped() const { return handset_.stop(); }
   uint32_t Now() const { return phone_.clock().TickMs(); }
 

@@ -130,6 +130,18 @@ TEST_F(JobMisfortune, APortIsNotAwaitedForEver) {
       << Result(0).error.text;
 }
 
+TEST_F(JobMisfortune, SilenceInsideAnImageIsToldAsSuchWithinTheJobsTimeOuts) {
+  AddProgrammed(11).faults().Add(handset::Ignore(), When::From(12));  // from the seventh write on
+  AddToJob(11);
+  Phone(0).state<download::Settings>().acknowledge_limit_ms = 10;
+  SetOptions(0, 1, 50);
+  ASSERT_EQ(AddImage(AddBytes("image.bin", Pattern(20000))), 1);
+  RunToEnd();
+  EXPECT_EQ(Result(0).error.code, static_cast<uint32_t>(KRAL_ERROR_NO_ANSWER));
+  EXPECT_NE(std::string(Result(0).error.text).find("stopped answering"), std::string::npos) << Result(0).error.text;
+  EXPECT_LT(Result(0).progress.elapsed_ms, 3000u) << "five waits of a whole second each";
+}
+
 TEST_F(JobMisfortune, AnAbortEndsWhateverIsUnderWay) {
   VirtualHandset& writing = AddProgrammed(11);
   writing.faults().Add(handset::Lose(), When::From(5).Of("08"));

@@ -100,6 +100,17 @@ TEST_F(Job, GoesFromTheBootLoaderToFlash) {
   }
 }
 
+TEST_F(Job, AHandsetThatRefusesTheVersionRequestIsThere) {
+  AddSocket(11).faults().Add(handset::Refuse(19), handset::When::Always().Of("00"));
+  AddToJob(11);
+  KRAL_ConfigureTimeOut(Progress(0).handle, KRAL_TIME_OUT_COMMAND, 300);
+  SetOptions(0);
+  ASSERT_EQ(KRAL_VENTRIMS_AddIdentity(job_), 1);
+  RunToEnd();
+  EXPECT_EQ(Result(0).passed, 1u) << Result(0).error.text;
+  EXPECT_STREQ(Result(0).progress.serial, "0000000B");
+}
+
 TEST_F(Job, TakesAConnectedHandsetAndLeavesItsSettingsAlone) {
   handset::VirtualHandset& handset = AddSocket(11);
   const KRAL_HANDLE handle = KRAL_ConnectServer(11);
