@@ -101,11 +101,8 @@ bool Job::AddLocked(KRAL_HANDLE handle, bool own_port, uint32_t* handset) {
     Kral_ResourceManager::ReleaseContext(handle, false);
     throw;
   }
-  if (!added) {
-    Kral_ResourceManager::ReleaseContext(handle, false);
-    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a job needs direct mode"));
-  }
-  if (added->phone().server_mode()) return Fail(Failure(KRAL_ERROR_ARGUMENT, "a job needs direct mode"));
+  if (!added) Kral_ResourceManager::ReleaseContext(handle, false);
+  if (!added || added->phone().server_mode()) return Fail(Failure(KRAL_ERROR_ARGUMENT, "a job needs direct mode"));
   const int port = added->phone().port();
   for (const auto& other : handsets_) {
     if (other->handle() == handle) return Fail(Failure(KRAL_ERROR_ARGUMENT, "COM%d is in the job already", port));

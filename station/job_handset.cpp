@@ -5,7 +5,6 @@
 #include <cstdio>
 
 #include "base/failure.h"
-#include "base/utf8_text.h"
 #include "download/download_client.h"
 #include "frame/resource_manager.h"
 #include "storage/efs/efs_client.h"
@@ -14,12 +13,6 @@ namespace kral::station {
 namespace {
 
 constexpr uint32_t kTellEveryMs = 100;
-
-template <size_t kSize>
-void PutText(char (&field)[kSize], const std::string& text) {
-  std::snprintf(field, kSize, "%s", text.c_str());
-  MakePrintableUtf8(field);
-}
 
 uint32_t Now() {
   return SystemClock().TickMs();

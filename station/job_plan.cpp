@@ -2,11 +2,8 @@
 #include "station/job_plan.h"
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
 
 #include "base/failure.h"
-#include "base/utf8_text.h"
 
 namespace kral::station {
 namespace {
@@ -46,14 +43,6 @@ std::string NameOf(const Step& step, uint32_t image) {
       return "verify (" + FileName(step.file) + ")";
   }
   return "";
-}
-
-// As the records hold it.
-std::string Fitting(const std::string& name) {
-  std::array<char, sizeof(KRAL_VENTRIMS_PROGRESS::step_name)> text{};
-  std::snprintf(text.data(), text.size(), "%s", name.c_str());
-  MakePrintableUtf8(text.data());
-  return text.data();
 }
 
 std::optional<Plan> Wrong(const char* what) {
@@ -103,9 +92,11 @@ std::optional<Plan> MakePlan(const std::vector<Step>& steps, uint32_t flags) {
       plan.push_back({.kind = StepKind::kReset, .asked_for = false});
   }
   uint32_t images = 0;
+  KRAL_VENTRIMS_PROGRESS as_in_records{};
   for (Step& step : plan) {
     if (step.kind == StepKind::kImage) ++images;
-    step.name = Fitting(NameOf(step, images));
+    PutText(as_in_records.step_name, NameOf(step, images));
+    step.name = as_in_records.step_name;
   }
   return plan;
 }

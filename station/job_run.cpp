@@ -182,22 +182,19 @@ bool Job::IsCalling() const {
 }
 
 bool Job::Abort(uint32_t handset) {
+  const bool all = handset == KRAL_VENTRIMS_ALL;
   Handsets chosen;
   {
     const MutexLock lock(mutex_);
-    if (handset != KRAL_VENTRIMS_ALL && handset >= handsets_.size())
+    if (!all && handset >= handsets_.size())
       return Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no handset %u in the job", handset));
     if (state_ == KRAL_VENTRIMS_NEW) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the job has not been started"));
     if (state_ == KRAL_VENTRIMS_STARTING) {
-      if (handset == KRAL_VENTRIMS_ALL) stop_ = true;
-      if (handset != KRAL_VENTRIMS_ALL) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the job is only just being started"));
+      if (!all) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the job is only just being started"));
+      stop_ = true;
       return true;
     }
-    if (handset == KRAL_VENTRIMS_ALL) {
-      chosen = handsets_;
-    } else {
-      chosen.push_back(handsets_[handset]);
-    }
+    chosen = all ? handsets_ : Handsets{handsets_[handset]};
   }
   for (const auto& one : chosen) one->Abort();
   return true;

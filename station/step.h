@@ -2,11 +2,14 @@
 #ifndef KRAL_STATION_STEP_H
 #define KRAL_STATION_STEP_H
 
+#include <cstddef>
 #include <cstdint>
+#include <cstdio>
 #include <memory>
 #include <string>
 #include <vector>
 
+#include "base/utf8_text.h"
 #include "download/images/image_file.h"
 #include "download/kova/kova.h"
 #include "platform/file_mapping.h"
@@ -53,6 +56,13 @@ struct Step {
   std::shared_ptr<const OpenedImage> image = {};
   std::shared_ptr<const pkv::PkvSet> set = {};
 };
+
+// A text as it fits into a field of a record: terminated, and fit for a terminal.
+template <size_t kSize>
+void PutText(char (&field)[kSize], const std::string& text) {
+  std::snprintf(field, kSize, "%s", text.c_str());
+  MakePrintableUtf8(field);
+}
 
 using Plan = std::vector<Step>;
 
