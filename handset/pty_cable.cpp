@@ -12,17 +12,22 @@ namespace {
 
 constexpr uint32_t kIdleWaitMs = 1000;
 constexpr uint32_t kReturnWaitMs = 20;
-// A full terminal gives no sign when the host has read from it.
+// A full terminal gives no sign when the host has read from it, and a full cable none at all.
 constexpr uint32_t kFullWaitMs = 1;
 constexpr size_t kChunk = size_t{64} << 10;
 
 }  // namespace
 
-PtyCable::PtyCable(VirtualHandset& handset, std::string link)
-    : handset_(handset), link_(std::move(link)), chunk_(kChunk) {}
+PtyCable::PtyCable(VirtualHandset& handset, std::string link, uint32_t bytes_per_second)
+    : handset_(handset),
+      link_(std::move(link)),
+      from_host_(bytes_per_second),
+      to_host_(bytes_per_second),
+      chunk_(kChunk) {}
 
-std::unique_ptr<PtyCable> PtyCable::Attach(VirtualHandset& handset, std::string link, std::string& error) {
-  std::unique_ptr<PtyCable> cable(new PtyCable(handset, std::move(link)));
+std::unique_ptr<PtyCable> PtyCable::Attach(VirtualHandset& handset, std::string link, std::string& error,
+                                           uint32_t bytes_per_second) {
+  std::unique_ptr<PtyCable> cable(new PtyCable(handset, std::move(link), bytes_per_second));
   if (!cable->Plug(error)) return nullptr;
   handset.SetOutputListener([raw = cable.get()] {
     const std::lock_guard lock(raw->mutex_);
@@ -93,7 +98,8 @@ void PtyCable::Run() {
 void PtyCable::Serve() {
   std::array<uint8_t, 4096> chunk;
   while (!stop_) {
-    for (size_t count = terminal_->Read(chunk); count > 0; count = terminal_->Read(chunk)) {
+    while (const size_t count = terminal_->Read(std::span(chunk).first(std::min(chunk.size(), from_host_.Room())))) {
+      from_host_.Take(count);
       handset_.FromHost(std::span(chunk).first(count));
       Write();
     }
@@ -102,13 +108,18 @@ void PtyCable::Serve() {
       return Unplug();
     }
     const bool room_left = Write();
+    // What the cable has no room for would end every wait at once.
+    if (from_host_.Room() == 0) {
+      handset_.clock().SleepMs(kFullWaitMs);
+      continue;
+    }
     // What is put on the line from here on wakes the terminal, which keeps a wake that comes before the wait.
     const uint32_t wait = room_left ? std::min(kIdleWaitMs, handset_.MillisecondsToOutput()) : kFullWaitMs;
     if (wait > 0) terminal_->WaitReadable(wait);
   }
 }
 
-// Everything that is due; false when the terminal is full.
+// Everything that is due; false when the terminal or the cable is full.
 bool PtyCable::Write() {
   for (;;) {
     if (chunk_begin_ == chunk_end_) {
@@ -116,7 +127,10 @@ bool PtyCable::Write() {
       chunk_end_ = handset_.ToHost(chunk_);
       if (chunk_end_ == 0) return true;
     }
-    chunk_begin_ += terminal_->Write(std::span(chunk_).subspan(chunk_begin_, chunk_end_ - chunk_begin_));
+    const size_t room = std::min(chunk_end_ - chunk_begin_, to_host_.Room());
+    const size_t written = terminal_->Write(std::span(chunk_).subspan(chunk_begin_, room));
+    to_host_.Take(written);
+    chunk_begin_ += written;
     if (chunk_begin_ < chunk_end_) return false;
   }
 }

@@ -8,6 +8,7 @@
 #include <string>
 #include <thread>
 
+#include "handset/byte_rate.h"
 #include "handset/virtual_handset.h"
 #include "platform/pseudo_terminal.h"
 
@@ -19,7 +20,9 @@ class PtyCable {
  public:
   // `link` is kept as a symbolic link to the terminal while there is one; empty for none. Null with a sentence in
   // `error` where the system refuses. The handset outlives the cable, and has one cable at a time.
-  static std::unique_ptr<PtyCable> Attach(VirtualHandset& handset, std::string link, std::string& error);
+  // `bytes_per_second` is what the cable carries in each direction; 0: as much as there is.
+  static std::unique_ptr<PtyCable> Attach(VirtualHandset& handset, std::string link, std::string& error,
+                                          uint32_t bytes_per_second = 0);
   ~PtyCable();
   PtyCable(const PtyCable&) = delete;
   PtyCable& operator=(const PtyCable&) = delete;
@@ -27,7 +30,7 @@ class PtyCable {
   std::string device_path() const;  // empty while the device has vanished
 
  private:
-  PtyCable(VirtualHandset& handset, std::string link);
+  PtyCable(VirtualHandset& handset, std::string link, uint32_t bytes_per_second);
 
   bool Plug(std::string& error);
   void Unplug();
@@ -38,6 +41,8 @@ class PtyCable {
 
   VirtualHandset& handset_;
   const std::string link_;
+  ByteRate from_host_;
+  ByteRate to_host_;
   mutable std::mutex mutex_;  // of the terminal's pointer, against wakes from other threads
   std::unique_ptr<PseudoTerminal> terminal_;
   uint32_t appearance_ = 0;  // of the handset that has the terminal
