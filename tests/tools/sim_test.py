@@ -1,8 +1,9 @@
 """Factory test mode, the channels of the bands, and the simulated handset itself."""
 import os
 import signal
+import time
 
-from tool import PATIENCE, ToolTest
+from tool import PATIENCE, ToolTest, command, fixture, wait_until
 
 
 class Simulation(ToolTest):
@@ -30,6 +31,30 @@ class Simulation(ToolTest):
         self.assertEqual(self.expect(0, "band", "ul", "0", "1000").out, "885.2000 MHz\n")
         self.assertAlmostEqual(self.expect_json(0, "band", "dl", "0", "1000")["mhz"], 930.2)
         self.expect(2, "band", "ul", "101", "100")
+
+    def test_sim_simulates_a_fixture_of_many(self):
+        with self.handset():
+            self.text("nv", "write", "10", "0A")
+            backup = self.path("phone.pkv")
+            self.text("nv", "backup", "--items", "1-20", backup)
+        with fixture(3, self.path("ports"), "--esn", "0x100", "--pkv", backup, "--fault-at", "2:refuse=19,of=7C",
+                     "--rate", "20k") as (sim, self.ports):
+            self.assertEqual([row["esn"] for row in sim.handsets], ["00000100", "00000101", "00000102"])
+            for port, build in ((1, True), (2, False)):
+                answer = self.expect_json(0, "-p", str(port), "info")
+                self.assertEqual((answer["esn"], answer["build"] is not None), (f"{0xFF + port:08X}", build))
+            self.expect(0, "-p", "3", "nv", "verify", backup)
+            command(sim, "unplug 3")
+            wait_until(lambda: not os.path.lexists(self.ports[3]))
+            self.expect(3, "-p", "3", "info")
+            self.expect(0, "-p", "1", "info")
+            command(sim, "plug all")
+            wait_until(lambda: os.path.lexists(self.ports[3]))
+            self.expect(0, "-p", "3", "info")
+            begin = time.monotonic()
+            self.expect(0, "-p", "1", "fs", "put", self.add("file", bytes(10000)), ":/file")
+            self.assertGreater(time.monotonic() - begin, 0.9, "10,000 bytes there and back, at 20,000 a second")
+        self.assertEqual(os.listdir(self.path("ports")), [])
 
     def test_sim_ends_cleanly_on_request(self):
         for number in (signal.SIGINT, signal.SIGTERM):

@@ -19,8 +19,8 @@ def clean_environment(ports):
     return env
 
 
-def start(*words, ports=None, before=()):
-    return subprocess.Popen([*before, KRAL, *words], env=clean_environment(ports or {}), stdin=subprocess.DEVNULL,
+def start(*words, ports=None, before=(), stdin=subprocess.DEVNULL):
+    return subprocess.Popen([*before, KRAL, *words], env=clean_environment(ports or {}), stdin=stdin,
                             stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
 
 
@@ -56,6 +56,28 @@ def handset(*options):
         if sim.poll() is None:
             sim.terminate()
         sim.communicate(timeout=PATIENCE)
+
+
+@contextlib.contextmanager
+def fixture(count, folder, *options):
+    """So many simulated handsets, on COM1 and up; gives the process, which takes commands, and the ports."""
+    sim = start("sim", "--json", "--count", str(count), "--ports", folder, "--script", "-", *options,
+                stdin=subprocess.PIPE)
+    try:
+        sim.handsets = json.loads(sim.stdout.readline())["handsets"]
+        yield sim, {number: os.path.join(folder, f"com{number}") for number in range(1, count + 1)}
+    finally:
+        sim.terminate()
+        sim.communicate(timeout=PATIENCE)
+
+
+def command(sim, line):
+    """Has a fixture do something, and waits until it has."""
+    sim.stdin.write(line + "\n")
+    sim.stdin.flush()
+    done = json.loads(sim.stdout.readline())
+    if done["command"] != line:
+        raise AssertionError(f"{line}: {done}")
 
 
 class ToolTest(unittest.TestCase):

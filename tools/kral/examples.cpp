@@ -71,6 +71,7 @@ constexpr const char* kExamples[] = {
     "kral -p 7 boot load programmer.bin --enter",
     "kral -p 7 raw 4B 0F 00 00",
     "kral sim --link com7",
+    "kral sim --count 8 --ports ports --rate 250k --fault-at 3:lose,of=08",
     "kral sim --model TESTER-9 --fault refuse=19,of=7C",
     "kral help fs get",
 };

@@ -1,19 +1,15 @@
-// kral sim: a virtual handset on a pseudo terminal, for as long as it is wanted.
+// kral sim: virtual handsets on pseudo terminals, for as long as they are wanted.
 #include <algorithm>
 #include <cctype>
 #include <memory>
-#include <optional>
 #include <string>
-#include <utility>
-#include <vector>
 
-#include "handset/log_generator.h"
-#include "handset/pty_cable.h"
-#include "handset/virtual_handset.h"
 #include "platform/clock.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/sim/sim_faults.h"
+#include "tools/kral/sim/sim_fixture.h"
+#include "tools/kral/sim/sim_script.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -21,87 +17,29 @@ namespace {
 
 constexpr std::uint32_t kWatchIntervalMs = 20;
 constexpr std::size_t kServiceCodeSize = 6;
+constexpr std::uint16_t kMostHandsets = 255;
 
-struct SimOptions {
-  handset::Identity identity;
-  std::optional<std::uint16_t> switches;
-  std::uint32_t switching_delay_ms = 0;
-  std::uint32_t reset_time_ms = 0;
-  std::uint32_t back_after_ms = 0;  // 0: a handset that hung up stays away
-  std::uint32_t efs_blocks = 0;     // 0: as many as there are
-  std::optional<std::uint32_t> efs_bad_offset;
-  std::vector<std::pair<std::string, std::string>> efs_shown_names;
-  std::uint32_t flash_block = 0;  // 0: as the programmer has it
-  std::uint16_t flash_window = 0;
-  std::vector<std::string> faults;
-  double bit_errors = 0;
-  handset::LogTraffic traffic;
-  std::uint64_t seed = 1;
-  std::string link;
-  bool boot_loader = false;
-  std::string loader = "kova";
-  std::optional<std::uint32_t> chip_identity;
-};
-
-void Prepare(handset::VirtualHandset& handset, const SimOptions& options) {
-  if (options.switches) handset.maintenance().SetSwitches(*options.switches);
-  handset.mode().SetSwitchingDelay(options.switching_delay_ms);
-  handset.mode().SetResetTime(options.reset_time_ms);
-  if (options.efs_blocks != 0) handset.efs().SetTotalBlocks(options.efs_blocks);
-  if (options.efs_bad_offset) handset.efs().SetBadOffset(*options.efs_bad_offset);
-  for (const auto& [name, shown] : options.efs_shown_names) handset.efs().ShowNameAs(name, shown);
-  auto programmer = handset.programmer().settings();
-  if (options.flash_block != 0) programmer.block_size = options.flash_block;
-  if (options.flash_window != 0) programmer.window = options.flash_window;
-  handset.programmer().Set(programmer);
-  handset.programmer().KeepPackets(false);
-  handset.loader().KeepPackets(false);
-  handset.faults().SetSeed(options.seed);
-  handset.faults().SetBitErrorRate(options.bit_errors);
-  for (const auto& fault : options.faults) AddFault(handset.faults(), fault);
-  const auto& boot_loader = handset.boot_loader();
-  if (options.chip_identity) boot_loader->Set({.chip_identity = *options.chip_identity});
-  if (options.loader == "boot") handset.mode().SetLoader(std::make_shared<handset::Reappearance>(boot_loader));
-  if (options.boot_loader) {
-    handset.SetStartMode(boot_loader);
-    handset.Restart();
-  }
-  handset.KeepTrace(false);  // nobody asks for it, and it would grow without end
-}
-
-// Until Ctrl-C; what hung up is plugged in again when that was asked for.
-void Serve(handset::VirtualHandset& handset, const SimOptions& options) {
-  Clock& clock = SystemClock();
-  bool away = false;
-  std::uint32_t since = 0;
-  while (!Interrupted()) {
-    clock.SleepMs(kWatchIntervalMs);
-    if (!handset.vanished()) {
-      away = false;
-    } else if (!away) {
-      away = true;
-      since = clock.TickMs();
-    } else if (options.back_after_ms != 0 && clock.TickMs() - since >= options.back_after_ms) {
-      handset.PlugIn();
-    }
+// Until Ctrl-C, or the end that the script makes.
+void Serve(SimFixture& fixture, SimScript& script) {
+  while (!Interrupted() && script.Run()) {
+    SystemClock().SleepMs(kWatchIntervalMs);
+    for (auto& socket : fixture.sockets()) socket.Watch();
   }
 }
 
 void Simulate(const Context& context, const SimOptions& options) {
-  handset::VirtualHandset handset(options.identity);
-  Prepare(handset, options);
-  std::string error;
-  const auto cable = handset::PtyCable::Attach(handset, options.link, error);
-  if (!cable) {
-    throw ToolError(ExitCode::kUsage, Format("the handset cannot be put on a pseudo terminal: {}", error),
-                    "kral sim needs Linux, and a --link that can be made");
+  SimFixture fixture(options);
+  SimScript script(context.out, fixture, options.script);
+  Json rows = Json::array();
+  std::string text;
+  for (auto& socket : fixture.sockets()) {
+    const auto serial = Format("{:08X}", socket.serial_number());
+    rows.push_back({{"number", socket.number()}, {"device", socket.device()}, {"esn", serial}});
+    text +=
+        options.count == 1 ? socket.device() + "\n" : Format("{}  {}  {}\n", socket.number(), socket.device(), serial);
   }
-  std::optional<handset::LiveTraffic> traffic;
-  if (options.traffic.logs + options.traffic.reports + options.traffic.messages > 0) {
-    traffic.emplace(handset, options.traffic);
-  }
-  context.out.Result({{"device", cable->device_path()}}, cable->device_path() + "\n");
-  Serve(handset, options);
+  context.out.Result({{"device", fixture.sockets().front().device()}, {"handsets", rows}}, text);
+  Serve(fixture, script);
 }
 
 bool IsServiceCode(const std::string& text) {
@@ -119,6 +57,15 @@ void AddOptions(const Command& sim, SimOptions& options) {
   sim.Add("--spc", identity.service_code, "Service programming code, six digits")
       .ShowDefault()
       .Check([](const std::string& text) { return IsServiceCode(text) ? "" : "six digits are needed"; });
+  sim.Add("--count", options.count, "Handsets, each with a serial number of its own behind that of --esn")
+      .Between(1, kMostHandsets)
+      .ShowDefault();
+  sim.Add("--ports", options.ports, "Keep links com1, com2, ... in this folder, for KRAL_PORT_DIR");
+  sim.Add("--pkv", options.pkv, "Items and files of each handset, from a backup");
+  sim.Add("--rate", options.rate, "Bytes per second in each direction: 250k, 1M").Check([](const std::string& text) {
+    return ParseRate(text) ? "" : "a rate is a number such as 250000, 250k or 1M";
+  });
+  sim.Add("--script", options.script, "Commands to carry out, see below; - reads them from the standard input");
   sim.Add("--switches", options.switches, "Switch word");
   sim.Add("--switching-delay", options.switching_delay_ms, "Milliseconds until a new mode is reported");
   sim.Add("--reset-time", options.reset_time_ms, "Milliseconds of silence after a reset");
@@ -137,6 +84,7 @@ void AddOptions(const Command& sim, SimOptions& options) {
   sim.Add("--flash-block", options.flash_block, "Largest block that the flash programmer announces");
   sim.Add("--flash-window", options.flash_window, "Window that the flash programmer announces");
   sim.Add("--fault", options.faults, "Misbehaviour, see below; may be given several times").OneEach();
+  sim.Add("--fault-at", options.faults_at, "N:FAULT: the same of one handset").OneEach();
   sim.Add("--bit-errors", options.bit_errors, "Probability of an error per bit sent").Between(0., 1.);
   sim.Add("--seed", options.seed, "Of everything random").ShowDefault();
   sim.Add("--back-after", options.back_after_ms, "Milliseconds after which a handset that hung up is back");
@@ -154,9 +102,9 @@ void AddOptions(const Command& sim, SimOptions& options) {
 
 void AddSimVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<SimOptions>();
-  const auto sim = root.Verb("sim", "Simulate a handset; its device is the first line of the output");
+  const auto sim = root.Verb("sim", "Simulate a handset, or many; the first lines of the output are their devices");
   AddOptions(sim, *options);
-  sim.Explain(DescribeFaults);
+  sim.Explain([] { return DescribeFaults() + SimScript::Describe(); });
   sim.Run([&context, options] { Simulate(context, *options); });
 }
 

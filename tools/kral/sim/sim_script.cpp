@@ -1,0 +1,169 @@
+// Reads and carries out the commands of kral sim --script.
+#include "tools/kral/sim/sim_script.h"
+
+#include <array>
+#include <charconv>
+#include <fstream>
+#include <iostream>
+#include <mutex>
+#include <thread>
+#include <utility>
+
+#include "platform/clock.h"
+#include "tools/kral/format.h"
+#include "tools/kral/sim/sim_faults.h"
+
+namespace kral::tool {
+namespace {
+
+using handset::VirtualHandset;
+
+// What is done to one handset, or to all.
+struct Deed {
+  std::string_view name;
+  bool takes_fault;
+  void (*act)(VirtualHandset& handset, const std::string& fault);
+};
+
+constexpr std::array<Deed, 5> kDeeds{{
+    {"fault", true, [](VirtualHandset& handset, const std::string& fault) { AddFault(handset.faults(), fault); }},
+    {"heal", false, [](VirtualHandset& handset, const std::string&) { handset.faults().Clear(); }},
+    {"plug", false, [](VirtualHandset& handset, const std::string&) { handset.PlugIn(); }},
+    {"restart", false, [](VirtualHandset& handset, const std::string&) { handset.Restart(); }},
+    {"unplug", false, [](VirtualHandset& handset, const std::string&) { handset.HangUp(); }},
+}};
+
+// Words with one blank between them, without a comment.
+std::string Cleaned(const std::string& line) {
+  std::string words;
+  bool blank = false;
+  for (const char character : line) {
+    if (character == '#') break;
+    const bool is_blank = character == ' ' || character == '\t' || character == '\r';
+    if (!is_blank && blank && !words.empty()) words += ' ';
+    if (!is_blank) words += character;
+    blank = is_blank;
+  }
+  return words;
+}
+
+std::string TakeWord(std::string& words) {
+  const auto word = words.substr(0, words.find(' '));
+  words.erase(0, word.size() + 1);
+  return word;
+}
+
+std::optional<std::uint32_t> NumberOf(const std::string& word) {
+  std::uint32_t value = 0;
+  const auto* const end = word.data() + word.size();
+  const auto [rest, error] = std::from_chars(word.data(), end, value);
+  return error == std::errc() && rest == end ? std::optional(value) : std::nullopt;
+}
+
+struct SimCommand {
+  const Deed* deed = nullptr;  // null: wait, quit
+  bool quits = false;
+  std::uint32_t number = 0;  // of the handset, 0 for all; or milliseconds
+  std::string fault;
+};
+
+[[noreturn]] void Reject(const std::string& line) {
+  throw ToolError(ExitCode::kUsage, Format("'{}' is no command", line),
+                  "kral sim --help lists the commands of --script");
+}
+
+SimCommand ParseCommand(const std::string& line, std::size_t count) {
+  SimCommand command;
+  auto rest = line;
+  const auto name = TakeWord(rest);
+  const auto where = TakeWord(rest);
+  command.fault = rest;
+  if (name == "quit") {
+    command.quits = true;
+    return command;
+  }
+  const auto number = NumberOf(where);
+  if (!number && where != "all") Reject(line);
+  command.number = number.value_or(0);
+  if (name == "wait" && number) return command;
+  for (const auto& deed : kDeeds) {
+    if (deed.name == name) command.deed = &deed;
+  }
+  if (command.deed == nullptr || command.deed->takes_fault == rest.empty() ||
+      (number && (*number == 0 || *number > count)))
+    Reject(line);
+  handset::FaultPlan unused;
+  if (command.deed->takes_fault) AddFault(unused, rest);
+  return command;
+}
+
+}  // namespace
+
+struct SimScript::Inbox {
+  std::mutex mutex;
+  std::deque<std::string> lines;
+};
+
+SimScript::SimScript(const Output& out, SimFixture& fixture, const std::string& file) : out_(out), fixture_(fixture) {
+  if (file == "-") {
+    inbox_ = std::make_shared<Inbox>();
+    // It cannot be woken from its wait for a line: the end of the process is its end.
+    std::thread([inbox = inbox_] {
+      for (std::string line; std::getline(std::cin, line);) {
+        const std::lock_guard lock(inbox->mutex);
+        inbox->lines.push_back(Cleaned(line));
+      }
+    }).detach();
+  } else if (!file.empty()) {
+    std::ifstream text(file);
+    if (!text) throw ToolError(ExitCode::kBadFile, Format("the script {} cannot be read", file), "check its name");
+    for (std::string line; std::getline(text, line);) {
+      lines_.push_back(Cleaned(line));
+      if (!lines_.back().empty()) ParseCommand(lines_.back(), fixture_.sockets().size());
+    }
+  }
+}
+
+bool SimScript::Run() {
+  if (inbox_) {
+    const std::lock_guard lock(inbox_->mutex);
+    for (auto& line : inbox_->lines) lines_.push_back(std::move(line));
+    inbox_->lines.clear();
+  }
+  while (!lines_.empty()) {
+    if (wait_since_ && SystemClock().TickMs() - *wait_since_ < wait_ms_) return true;
+    wait_since_.reset();
+    const auto line = lines_.front();
+    lines_.pop_front();
+    if (!line.empty() && !Do(line)) return false;
+  }
+  return true;
+}
+
+bool SimScript::Do(const std::string& line) try {
+  const auto command = ParseCommand(line, fixture_.sockets().size());
+  if (command.quits) return false;
+  if (command.deed == nullptr) {
+    wait_since_ = SystemClock().TickMs();
+    wait_ms_ = command.number;
+  } else {
+    for (auto& socket : fixture_.sockets()) {
+      if (command.number == 0 || command.number == socket.number()) command.deed->act(socket.handset(), command.fault);
+    }
+  }
+  out_.Stream({{"event", "done"}, {"command", line}}, line + "\n");
+  return true;
+} catch (const ToolError& error) {  // a person may type something else
+  out_.Note(error.what());
+  return true;
+}
+
+std::string SimScript::Describe() {
+  return "Commands of --script, one a line; N is the number of a handset, or all:\n"
+         "  unplug N, plug N    the device vanishes, and comes back\n"
+         "  restart N           power off and on\n"
+         "  fault N KIND...     misbehaviour as above; heal N takes all of it away\n"
+         "  wait MS, quit       # and what follows it is a comment\n";
+}
+
+}  // namespace kral::tool
