@@ -11,7 +11,10 @@ namespace kral {
 enum class StandardStream { kInput, kOutput, kError };
 
 bool IsTerminal(StandardStream stream);
-int TerminalWidth(StandardStream stream);  // columns; 80 when it is no terminal
+int TerminalWidth(StandardStream stream);   // columns; 80 when it is no terminal
+int TerminalHeight(StandardStream stream);  // lines; 24 when it is none
+// A terminal on which "ESC [ 3 A" leads three lines up.
+bool ObeysCursorSequences(StandardStream stream);
 
 // What the program was started with, behind its own name, in UTF-8.
 std::vector<std::string> ProgramArguments(int count, char** values);

@@ -6,11 +6,14 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstdlib>
+#include <string_view>
 
 namespace kral {
 namespace {
 
 constexpr int kDefaultWidth = 80;
+constexpr int kDefaultHeight = 24;
 constexpr int kInterrupted = 130;
 
 // A signal handler reaches nothing but process-wide lock-free state.
@@ -45,6 +48,17 @@ int TerminalWidth(StandardStream stream) {
   winsize size{};
   if (::ioctl(Descriptor(stream), TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kDefaultWidth;
   return size.ws_col;
+}
+
+int TerminalHeight(StandardStream stream) {
+  winsize size{};
+  if (::ioctl(Descriptor(stream), TIOCGWINSZ, &size) != 0 || size.ws_row == 0) return kDefaultHeight;
+  return size.ws_row;
+}
+
+bool ObeysCursorSequences(StandardStream stream) {
+  const char* const kind = std::getenv("TERM");
+  return IsTerminal(stream) && kind != nullptr && std::string_view(kind) != "dumb";
 }
 
 std::vector<std::string> ProgramArguments(int count, char** values) {

@@ -16,6 +16,7 @@ namespace kral {
 namespace {
 
 constexpr int kDefaultWidth = 80;
+constexpr int kDefaultHeight = 24;
 constexpr UINT kInterrupted = 130;
 
 // The system calls the handler on a thread of its own, without an argument to carry this.
@@ -54,6 +55,19 @@ int TerminalWidth(StandardStream stream) {
   CONSOLE_SCREEN_BUFFER_INFO info{};
   if (!::GetConsoleScreenBufferInfo(Handle(stream), &info)) return kDefaultWidth;
   return info.srWindow.Right - info.srWindow.Left + 1;
+}
+
+int TerminalHeight(StandardStream stream) {
+  CONSOLE_SCREEN_BUFFER_INFO info{};
+  if (!::GetConsoleScreenBufferInfo(Handle(stream), &info)) return kDefaultHeight;
+  return info.srWindow.Bottom - info.srWindow.Top + 1;
+}
+
+// Older ones do not know the mode.
+bool ObeysCursorSequences(StandardStream stream) {
+  DWORD mode = 0;
+  return ::GetConsoleMode(Handle(stream), &mode) != 0 &&
+         ::SetConsoleMode(Handle(stream), mode | ENABLE_VIRTUAL_TERMINAL_PROCESSING) != 0;
 }
 
 // Not those that are given: they have been through the ANSI code page, which knows few characters.
