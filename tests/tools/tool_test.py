@@ -14,6 +14,7 @@ from flash_test import BootLoader, Flash
 from fs_test import Files
 from info_test import Info, Ports
 from log_test import Traffic
+from many_test import ManyHandsets
 from nv_test import Backups, NvItems
 from raw_test import Failures, Requests
 from sim_test import Simulation

@@ -4,6 +4,7 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <array>
 #include <charconv>
 #include <iostream>
 #include <limits>
@@ -19,6 +20,16 @@
 #include "tools/kral/nearest_word.h"
 
 namespace kral::tool {
+
+struct Chosen {
+  std::function<void()> act;
+  const CLI::App* verb = nullptr;
+  std::set<const CLI::App*> for_many;
+  std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
+  Names names;
+  std::set<std::string> asked;
+};
+
 namespace {
 
 constexpr int kAnyNumber = CLI::detail::expected_max_vector_size;
@@ -87,6 +98,30 @@ struct NumberOf<std::optional<Number>> {
   using Type = Number;
   static std::string Text(const std::optional<Number>& value) { return value ? Format("{}", *value) : ""; }
 };
+
+// --- Names of files -------------------------------------------------------------------------------------------------
+
+constexpr std::array kPlaceholders{"port", "serial", "model", "slot"};
+
+// Everything else in braces is a name like any other.
+std::string Expanded(std::string text, Chosen& chosen) {
+  for (const std::string name : kPlaceholders) {
+    const auto braced = "{" + name + "}";
+    for (auto at = text.find(braced); at != std::string::npos; at = text.find(braced, at)) {
+      chosen.asked.insert(name);
+      const auto known = chosen.names.find(name);
+      if (known == chosen.names.end()) break;
+      text.replace(at, braced.size(), known->second);
+      at += known->second.size();
+    }
+  }
+  return text;
+}
+
+std::vector<std::string> Expanded(std::vector<std::string> words, Chosen& chosen) {
+  for (auto& word : words) word = Expanded(word, chosen);
+  return words;
+}
 
 // --- Words that lead nowhere ----------------------------------------------------------------------------------------
 
@@ -232,6 +267,11 @@ Option& Option::Count(int least, int most) {
   return *this;
 }
 
+Option& Option::File() {
+  *is_file_ = true;
+  return *this;
+}
+
 Option& Option::Check(std::function<std::string(const std::string&)> fault) {
   const auto name = option_->get_name();
   option_->check([name, fault = std::move(fault)](const std::string& text) {
@@ -261,15 +301,16 @@ Command Command::Find(const std::string& name) const {
 }
 
 Option Command::AddWords(const char* names, Sink sink, std::string_view help, std::string default_text) const {
+  const auto is_file = std::make_shared<bool>(false);
   auto* const option = app_->add_option(
       names,
-      [sink = std::move(sink)](const std::vector<std::string>& words) {
-        sink(words);
+      [sink = std::move(sink), is_file, chosen = chosen_](const std::vector<std::string>& words) {
+        sink(*is_file ? Expanded(words, *chosen) : words);
         return true;
       },
       std::string(help));
   option->type_name("TEXT");
-  return {option, std::move(default_text)};
+  return {option, std::move(default_text), is_file};
 }
 
 Option Command::Add(const char* names, std::string& target, std::string_view help) const {
@@ -342,7 +383,18 @@ void Command::Flag(const char* names, std::function<void()> given, std::string_v
 }
 
 void Command::Run(std::function<void()> act) const {
-  app_->callback([chosen = chosen_, act = std::move(act)] { *chosen = act; });
+  app_->callback([chosen = chosen_, app = app_, act = std::move(act)] {
+    chosen->act = act;
+    chosen->verb = app;
+  });
+}
+
+void Command::ForMany() const {
+  chosen_->for_many.insert(app_);
+}
+
+void Command::Writes(std::function<std::vector<std::string>()> files) const {
+  chosen_->writes[app_] = std::move(files);
 }
 
 void Command::Explain(std::function<std::string()> text) const {
@@ -355,7 +407,7 @@ struct CommandLine::Parser {
   Parser(const std::string& program, const std::string& description) : app(description, program) {}
 
   CLI::App app;
-  std::function<void()> chosen;
+  Chosen chosen;
   std::map<CLI::App*, std::string> examples;
 };
 
@@ -387,7 +439,7 @@ void CommandLine::Example(const std::string& words) {
 }
 
 std::function<void()> CommandLine::Parse(const std::vector<std::string>& arguments) {
-  parser_->chosen = {};
+  parser_->chosen.act = {};
   try {
     // The parser wants them from the last to the first.
     parser_->app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
@@ -396,7 +448,29 @@ std::function<void()> CommandLine::Parse(const std::vector<std::string>& argumen
     parser_->app.exit(error);  // --help, --version
     return {};
   }
-  return parser_->chosen;
+  return parser_->chosen.act;
+}
+
+void CommandLine::SetNames(Names names) {
+  parser_->chosen.names = std::move(names);
+}
+
+std::string CommandLine::verb() const {
+  const auto* const verb = parser_->chosen.verb;
+  return verb == nullptr ? std::string() : TitleOf(*verb).substr(parser_->app.get_name().size() + 1);
+}
+
+bool CommandLine::for_many() const {
+  return parser_->chosen.for_many.count(parser_->chosen.verb) != 0;
+}
+
+std::vector<std::string> CommandLine::Written() const {
+  const auto found = parser_->chosen.writes.find(parser_->chosen.verb);
+  return found == parser_->chosen.writes.end() ? std::vector<std::string>() : found->second();
+}
+
+const std::set<std::string>& CommandLine::asked() const {
+  return parser_->chosen.asked;
 }
 
 }  // namespace kral::tool

@@ -6,7 +6,9 @@
 #include <cstdint>
 #include <functional>
 #include <initializer_list>
+#include <map>
 #include <memory>
+#include <set>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -18,6 +20,9 @@ class Option;
 }  // namespace CLI
 
 namespace kral::tool {
+
+// What is known of a command line behind its parsing.
+struct Chosen;
 
 // What a number may be, and what it counts: "ms". What a type of its own cannot hold it may not be either.
 struct NumberRange {
@@ -37,16 +42,21 @@ class Option {
   Option& OneEach();           // every value has the option in front of it
   Option& Separated(char by);  // values in one word
   Option& Count(int least, int most);
+  // Of a text, or a list of them: names of files, in which {port}, {serial}, {model} and {slot} stand for the
+  // handset's.
+  Option& File();
   // Gives what is wrong with a text; nothing when it is right.
   Option& Check(std::function<std::string(const std::string&)> fault);
 
  private:
   friend class Command;
-  Option(CLI::Option* option, std::string default_text) : option_(option), default_text_(std::move(default_text)) {}
+  Option(CLI::Option* option, std::string default_text, std::shared_ptr<bool> is_file)
+      : option_(option), default_text_(std::move(default_text)), is_file_(std::move(is_file)) {}
 
   CLI::Option* option_;
   std::shared_ptr<NumberRange> range_;
   std::string default_text_;
+  std::shared_ptr<bool> is_file_;
 };
 
 // A noun or a verb. A handle: copies are the same noun or verb.
@@ -70,23 +80,29 @@ class Command {
 
   // What the verb does, when it is the one that was given.
   void Run(std::function<void()> act) const;
+  // The verb may be given several handsets: it runs for each of them, with a command line of its own.
+  void ForMany() const;
+  // Which local files it writes, asked behind the parsing: no two handsets may write the same.
+  void Writes(std::function<std::vector<std::string>()> files) const;
   // Below the options in the help.
   void Explain(std::function<std::string()> text) const;
 
  private:
   friend class CommandLine;
-  using Action = std::function<void()>;
   using Sink = std::function<void(const std::vector<std::string>& words)>;
 
-  Command(CLI::App& app, Action& chosen) : app_(&app), chosen_(&chosen) {}
+  Command(CLI::App& app, Chosen& chosen) : app_(&app), chosen_(&chosen) {}
   Option AddWords(const char* names, Sink sink, std::string_view help, std::string default_text) const;
   template <class Number>
   Option AddNumbers(const char* names, std::string_view help, std::function<void(Number)> set,
                     const std::string& now) const;
 
   CLI::App* app_;
-  Action* chosen_;
+  Chosen* chosen_;
 };
+
+// What "port", "serial", ... stand for in the names of files.
+using Names = std::map<std::string, std::string>;
 
 class CommandLine {
  public:
@@ -101,6 +117,13 @@ class CommandLine {
   // What the chosen verb does; nothing when help or the version was asked for, which is then printed. ToolError for
   // mistakes. Options of a noun or of the root are taken behind a verb, too.
   std::function<void()> Parse(const std::vector<std::string>& arguments);
+  void SetNames(Names names);  // before it; without, names of files stay as they are
+
+  // --- Of the verb that was chosen ---
+  std::string verb() const;  // "nv backup"
+  bool for_many() const;
+  std::vector<std::string> Written() const;    // local files, as far as it has said so
+  const std::set<std::string>& asked() const;  // which names were asked for: "serial"
 
  private:
   struct Parser;

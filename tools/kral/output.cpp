@@ -43,23 +43,26 @@ void WriteData(std::string_view text) {
 }  // namespace
 
 void Output::Result(const Json& members, std::string_view text) const {
-  if (json_) {
-    WriteObject(true, members);
-  } else {
-    WriteData(text);
-  }
+  if (!json_) return Data(text);
+  lane_ != nullptr ? lane_->Object(members) : WriteObject(true, members);
+}
+
+void Output::Data(std::string_view text) const {
+  lane_ != nullptr ? lane_->Data(text) : WriteData(text);
 }
 
 void Output::Stream(const Json& members, std::string_view text) const {
   if (json_) {
     WriteData(JsonLine(members));
   } else {
-    WriteData(text);
+    Data(text);
   }
 }
 
 void Output::Note(std::string_view text) const {
-  if (json_) {
+  if (lane_ != nullptr) {
+    lane_->Note(text);
+  } else if (json_) {
     const Json object{{"event", "note"}, {"text", text}};
     WriteAside(JsonLine(object));
   } else {
@@ -74,11 +77,7 @@ void Output::Failure(const ToolError& error, const Json& members) const {
     return;
   }
   Json object = members;
-  object["error"] = {{"code", static_cast<int>(error.code())},
-                     {"name", NameOf(error.code())},
-                     {"text", error.what()},
-                     {"hint", error.hint()}};
-  if (error.record()) AddRecord(object["error"], *error.record());
+  object["error"] = ErrorJson(error);
   WriteObject(false, object);
 }
 
@@ -86,6 +85,15 @@ void Output::WriteObject(bool ok, const Json& members) const {
   Json object{{"ok", ok}};
   object.update(members);
   WriteData(JsonLine(object));
+}
+
+Json ErrorJson(const ToolError& error) {
+  Json object{{"code", static_cast<int>(error.code())},
+              {"name", NameOf(error.code())},
+              {"text", error.what()},
+              {"hint", error.hint()}};
+  if (error.record()) AddRecord(object, *error.record());
+  return object;
 }
 
 void WriteAside(std::string_view text) noexcept {

@@ -9,6 +9,7 @@
 
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/json.h"
+#include "tools/kral/lane.h"
 
 namespace kral::tool {
 
@@ -16,9 +17,15 @@ class Output {
  public:
   void UseJson() { json_ = true; }
   bool json() const { return json_; }
+  // Results and notes go there from now on, as does progress; it must live as long.
+  void UseLane(Lane& lane) { lane_ = &lane; }
+  Lane* lane() const { return lane_; }
 
   // The result of a verb: `members` join "ok" in the object; `text` is what a person reads, with its line ends.
   void Result(const Json& members, std::string_view text) const;
+
+  // A piece of a text that is no result by itself.
+  void Data(std::string_view text) const;
 
   // One of many: an object of its own on a line of its own, without "ok". The result of the verb follows behind the
   // last.
@@ -34,7 +41,11 @@ class Output {
   void WriteObject(bool ok, const Json& members) const;
 
   bool json_ = false;
+  Lane* lane_ = nullptr;
 };
+
+// "error" of an object that tells a failure.
+Json ErrorJson(const ToolError& error);
 
 // On the standard error. That nobody reads it any more is no reason to stop anything.
 void WriteAside(std::string_view text) noexcept;

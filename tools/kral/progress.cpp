@@ -37,6 +37,21 @@ std::string SizeText(std::uint64_t bytes) {
   return Format("{:.1f} {}", value, kUnits[unit]);
 }
 
+std::string BarLine(const std::string& title, const WorkShown& shown, std::size_t width) {
+  const auto text = shown.subject.empty() ? shown.work : shown.work + " " + shown.subject;
+  std::string bar;
+  const auto taken = title.size() + shown.figures.size() + 2;
+  auto room = width - std::min(width, taken);
+  if (shown.total > 0 && room > text.size() + kNarrowestBar + 4) {
+    const auto cells = std::min(room - text.size() - 4, kWidestBar);
+    const auto done = static_cast<double>(std::min(shown.done, shown.total));
+    const auto full = static_cast<std::size_t>(static_cast<double>(cells) * done / static_cast<double>(shown.total));
+    bar = Format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
+    room -= bar.size();
+  }
+  return (title + Shortened(text, room) + bar + "  " + shown.figures).substr(0, width);
+}
+
 std::string DurationText(std::uint64_t seconds) {
   const auto minutes = seconds / 60;
   if (minutes < 60) return Format("{}:{:02}", minutes, seconds % 60);
@@ -47,15 +62,18 @@ Progress::Progress(const Output& out, std::string work, std::uint64_t total, Uni
     : out_(out),
       work_(std::move(work)),
       unit_(unit),
-      style_(out.json()                           ? Style::kJson
+      style_(out.lane() != nullptr                ? Style::kLane
+             : out.json()                         ? Style::kJson
              : IsTerminal(StandardStream::kError) ? Style::kBar
                                                   : Style::kLines),
       clock_(clock),
       total_(total),
       last_tick_(clock.TickMs()),
-      next_ms_(style_ == Style::kLines  ? kLineIntervalMs
-               : style_ == Style::kJson ? kObjectIntervalMs
-                                        : kBarIntervalMs) {}
+      next_ms_(style_ == Style::kLines ? kLineIntervalMs
+               : out.json()            ? kObjectIntervalMs
+                                       : kBarIntervalMs) {
+  if (style_ == Style::kLane && !out.json()) TellLane();
+}
 
 Progress::~Progress() {
   Wipe();
@@ -89,6 +107,9 @@ void Progress::Show() {
     case Style::kJson:
       next_ms_ = elapsed_ms_ + kObjectIntervalMs;
       return WriteObject();
+    case Style::kLane:
+      next_ms_ = elapsed_ms_ + (out_.json() ? kObjectIntervalMs : kBarIntervalMs);
+      return TellLane();
   }
 }
 
@@ -116,22 +137,10 @@ std::string Progress::Figures() const {
 }
 
 void Progress::DrawBar() {
-  const auto figures = Figures();
   // The last column stays free: a terminal may wrap behind it.
   const auto width = static_cast<std::size_t>(std::max(TerminalWidth(StandardStream::kError) - 1, 1));
-  auto title = subject_.empty() ? work_ : work_ + " " + subject_;
-  std::string bar;
-  const auto taken = figures.size() + 2;
-  auto room = width - std::min(width, taken);
-  if (total_ > 0 && room > title.size() + kNarrowestBar + 4) {
-    const auto cells = std::min(room - title.size() - 4, kWidestBar);
-    const auto full = static_cast<std::size_t>(
-        static_cast<double>(cells) * static_cast<double>(std::min(done_, total_)) / static_cast<double>(total_));
-    bar = Format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
-    room -= bar.size();
-  }
-  title = Shortened(title, room);
-  WriteAside(Format("\r{:<{}}", (title + bar + "  " + figures).substr(0, width), width));
+  const WorkShown shown{work_, subject_, done_, total_, Figures(), {}};
+  WriteAside(Format("\r{:<{}}", BarLine("", shown, width), width));
   drawn_width_ = width;
 }
 
@@ -139,8 +148,8 @@ void Progress::WriteLine() const {
   out_.Note(Format("{}{}{}: {}", work_, subject_.empty() ? "" : " ", subject_, Figures()));
 }
 
-void Progress::WriteObject() const {
-  Json object{{"event", "progress"}, {"work", work_}};
+Json Progress::Members() const {
+  Json object{{"work", work_}};
   if (!subject_.empty()) object["subject"] = subject_;
   object["unit"] = unit_ == Unit::kBytes ? "bytes" : "items";
   object["done"] = done_;
@@ -149,7 +158,17 @@ void Progress::WriteObject() const {
     object["per_second"] = std::round(rate * 10) / 10;
     if (total_ > 0) object["seconds_left"] = SecondsLeft(rate);
   }
+  return object;
+}
+
+void Progress::WriteObject() const {
+  Json object{{"event", "progress"}};
+  object.update(Members());
   WriteAside(JsonLine(object));
+}
+
+void Progress::TellLane() const {
+  out_.lane()->Show({work_, subject_, done_, total_, Figures(), out_.json() ? Members() : Json()});
 }
 
 void Progress::Wipe() {

@@ -37,12 +37,14 @@ class Progress {
   void Note(std::string_view text);
 
  private:
-  enum class Style { kBar, kLines, kJson };
+  enum class Style { kBar, kLines, kJson, kLane };
 
   void Show();
   void DrawBar();
   void WriteLine() const;
   void WriteObject() const;
+  void TellLane() const;
+  Json Members() const;
   void Wipe();
 
   std::string Figures() const;  // "45 %  1.2 MiB/s  0:07 left", as far as known
@@ -62,6 +64,9 @@ class Progress {
   std::uint64_t next_ms_;  // when something is to be shown again
   std::size_t drawn_width_ = 0;
 };
+
+// Title, bar and figures in so many columns; what there is no room for is left out.
+std::string BarLine(const std::string& title, const WorkShown& shown, std::size_t width);
 
 std::string SizeText(std::uint64_t bytes);        // "512 B", "1.5 MiB"
 std::string DurationText(std::uint64_t seconds);  // "0:07", "1:02:03"

@@ -10,6 +10,8 @@ namespace kral::tool {
 
 struct Context {
   SessionOptions session;
+  bool all = false;        // every port on which a handset answers
+  std::uint16_t jobs = 0;  // handsets that are worked on at once; 0: as many as there are
   Output out;
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure
 };

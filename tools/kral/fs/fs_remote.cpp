@@ -19,7 +19,7 @@ constexpr const char* kStatus = "KRAL_EFS2_DIAG_STAT";
 constexpr std::size_t kMostEntries = 200'000;  // of all directories that a verb lists; more is a handset gone wrong
 
 // The callbacks carry the handle and nothing else.
-RemoteFiles* current = nullptr;
+thread_local RemoteFiles* current = nullptr;
 
 RemoteEntry::Kind KindOfEntry(const KRAL_EFS_ENTRY& entry) {
   if (entry.type == KRAL_EFS_ENTRY_FILE) return RemoteEntry::Kind::kFile;

@@ -348,6 +348,9 @@ void AddFsVerbs(const Command& root, Context& context) {
     const auto subcommand = fs.Verb(verb.name, verb.help);
     auto paths = subcommand.Add(verb.paths, options->paths).Count(verb.least, verb.most);
     if (verb.least > 0) paths.Required();
+    paths.File();
+    if (verb.act != Cat) subcommand.ForMany();
+    if (verb.act == Get) subcommand.Writes([options] { return std::vector<std::string>{LocalTarget(*options)}; });
     subcommand.Run([&context, options, &verb] { Run(context, *options, verb); });
   }
   AddFlags(fs, *options);

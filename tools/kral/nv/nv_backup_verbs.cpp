@@ -58,7 +58,7 @@ const char* WordOf(std::uint32_t result, const Words& words) {
 }
 
 // One run of a job: its progress, and what became of each item. The library's callback carries the handle and nothing
-// else, so there is one at a time.
+// else, so there is one at a time on a thread.
 class JobRun {
  public:
   JobRun(const Context& context, const char* work, const Words& words, bool keeps_all)
@@ -156,7 +156,7 @@ class JobRun {
     return item.status != 0 ? Format(", status {}", item.status) : "";
   }
 
-  static inline JobRun* running_ = nullptr;
+  static inline thread_local JobRun* running_ = nullptr;
 
   const Words words_;
   const bool keeps_all_;  // or only those that went wrong
@@ -274,12 +274,14 @@ void AddNvBackupVerbs(const Command& root, Context& context) {
   const auto nv = root.Find("nv");
   const auto add = [&](const char* name, const char* help, void (*act)(Context&, const BackupOptions&)) {
     const auto verb = nv.Verb(name, help);
-    verb.Add("file", options->file, "PKV file").Required();
+    verb.Add("file", options->file, "PKV file").Required().File();
+    verb.ForMany();
     AddDefinitionOptions(verb, options->nv);
     verb.Run([&context, options, act] { act(context, *options); });
     return verb;
   };
   const auto backup = add("backup", "Read all items and item files into a PKV file", Backup);
+  backup.Writes([options] { return std::vector<std::string>{options->file}; });
   backup.Add("--items", options->items, "Range of item ids to read");
   backup.Add("--subscriptions", options->subscriptions, "How many subscriptions the handset has").Between(1, 16);
   const auto restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);

@@ -240,8 +240,8 @@ void AddNvVerbs(const Command& root, Context& context) {
   write.Add("--index", arguments->array_index, "Element of an array item");
   const auto dump = add("dump", "Print the values of all items that are defined", Dump);
   dump.Add("--items", arguments->range, "Range of NV ids instead, such as 0-999");
-  dump.Add("--source", arguments->source_file, "Write the values to this source file (XML), too");
-  dump.Add("--pkv", arguments->pkv_file, "... to this PKV file");
+  dump.Add("--source", arguments->source_file, "Write the values to this source file (XML), too").File();
+  dump.Add("--pkv", arguments->pkv_file, "... to this PKV file").File();
   const auto diff = add("diff", "Compare two PKV files in a page of HTML; needs no handset", Compare);
   diff.Add("first", arguments->first, "PKV file").Required();
   diff.Add("second", arguments->second, "PKV file").Required();
@@ -249,7 +249,15 @@ void AddNvVerbs(const Command& root, Context& context) {
   const auto definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
   definitions.Add("file", arguments->items, "Definition file").Required();
   AddDictionaryOption(definitions, arguments->options);
+  dump.Writes([arguments] {
+    std::vector<std::string> files;
+    for (const auto& file : {arguments->source_file, arguments->pkv_file}) {
+      if (!file.empty()) files.push_back(file);
+    }
+    return files;
+  });
   for (const auto& verb : {read, write, dump}) {
+    verb.ForMany();
     AddDefinitionOptions(verb, arguments->options);
     add_subscription(verb);
   }

@@ -162,6 +162,8 @@ void AddFtmVerbs(const Command& root, Context& context) {
   AddRfMode(command, options);
   command.Run([&context, options, arguments] { SendCommand(context, *options, *arguments); });
 
+  for (const auto& verb : {mode, channel, tx, command}) verb.ForMany();
+
   ftm.Verb("list", "Print the table of RF commands").Run([&context] { PrintList(context); });
 }
 

@@ -109,9 +109,9 @@ void ShowInfo(Context& context) {
 }  // namespace
 
 void AddInfoVerbs(const Command& root, Context& context) {
-  root.Verb("info", "Print the identity of the handset: version, build, mode, serial number").Run([&context] {
-    ShowInfo(context);
-  });
+  const auto info = root.Verb("info", "Print the identity of the handset: version, build, mode, serial number");
+  info.ForMany();
+  info.Run([&context] { ShowInfo(context); });
 }
 
 }  // namespace kral::tool

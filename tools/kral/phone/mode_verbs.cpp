@@ -62,12 +62,16 @@ std::string_view NameOfState(std::uint32_t state) {
 
 void AddModeVerbs(const Command& root, Context& context) {
   const auto mode = root.Noun("mode", "Ask for the operating mode, or switch it");
-  mode.Verb("get", "Print the operating mode").Run([&context] { GetMode(context); });
+  const auto add = [&mode](std::string_view name, const std::string& help, std::function<void()> act) {
+    const auto verb = mode.Verb(std::string(name), help);
+    verb.ForMany();
+    verb.Run(std::move(act));
+  };
+  add("get", "Print the operating mode", [&context] { GetMode(context); });
   for (const auto& request : kModeRequests) {
-    mode.Verb(std::string(request.name), request.name == "reset"
-                                             ? "Restart the handset"
-                                             : Format("Switch to mode {} and wait for it", request.name))
-        .Run([&context, &request] { SetMode(context, request); });
+    add(request.name,
+        request.name == "reset" ? "Restart the handset" : Format("Switch to mode {} and wait for it", request.name),
+        [&context, &request] { SetMode(context, request); });
   }
 }
 

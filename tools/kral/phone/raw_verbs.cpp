@@ -48,6 +48,7 @@ void AddRawVerbs(const Command& root, Context& context) {
   const auto words = std::make_shared<std::vector<std::string>>();
   const auto raw = root.Verb("raw", "Send one request, given in hex, and print the reply");
   raw.Add("bytes", *words, "The request without framing, such as 4B 0F 00 00").Required();
+  raw.ForMany();
   raw.Run([&context, words] { SendRaw(context, *words); });
 }
 

@@ -1,0 +1,127 @@
+"""One verb on several handsets: who they are, what becomes of each, and the one verdict."""
+import fcntl
+import json
+import os
+import pty
+import re
+import signal
+import struct
+import subprocess
+import termios
+
+import tool
+from tool import PATIENCE, ToolTest, clean_environment, command, fixture, start, wait_until
+
+
+class ManyHandsets(ToolTest):
+    def fixture(self, count, *options):
+        return fixture(count, self.path("ports"), "--esn", "0x10", *options)
+
+    def verdicts(self, code, *words):
+        """The code of each handset by port; the whole agrees with them."""
+        answer = self.expect_json(code, *words)
+        return {row["port"]: 0 if row["ok"] else row["error"]["code"] for row in answer["handsets"]}
+
+    def test_each_handset_has_a_verdict_and_all_have_one(self):
+        with self.fixture(4, "--fault-at", "3:refuse=24,of=4B 0F", "--fault-at", "4:ignore") as (_, self.ports):
+            answer = self.expect_json(0, "-p", "2,1", "info")
+            self.assertEqual([[row[name] for name in ("port", "serial", "model", "esn", "mode")]
+                              for row in answer["handsets"]],
+                             [[2, "00000011", "VH-1", "00000011", "online"],
+                              [1, "00000010", "VH-1", "00000010", "online"]])
+            self.assertEqual(self.verdicts(12, "-p", "1-4", "mode", "get"), {1: 0, 2: 0, 3: 7, 4: 5})
+            self.assertEqual(self.verdicts(0, "--all", "--jobs", "1", "nv", "write", "10", "0A"), {1: 0, 2: 0, 3: 0})
+            done = self.expect(12, "-p", "1-3", "mode", "get")
+            self.assertEqual(done.out, "COM1: online\nCOM2: online\n")
+            self.assertRegex(done.err, r"(?m)^COM1 +00000010 .* passed$")
+            self.assertRegex(done.err, r"(?m)^COM3 +00000012 .* FAILED: .*not in the present operating mode$")
+            self.assertIn("1 of 3 handsets failed: COM3", done.err)
+
+    def test_those_that_fail_alike_end_with_their_code(self):
+        with self.fixture(2, "--fault", "refuse=24,of=4B 0F") as (_, self.ports):
+            self.assertEqual(self.verdicts(7, "-p", "1,2", "mode", "get"), {1: 7, 2: 7})
+
+    def test_names_of_files_are_those_of_the_handset(self):
+        with self.fixture(2, "--model", "VH/..") as (_, self.ports):
+            backup = self.path("{serial}-{model}-{slot}-{port}.pkv")
+            self.expect(0, "-p", "2,1", "nv", "backup", backup, "--items", "0-20")
+            self.assertEqual(sorted(os.listdir(self.folder)),
+                             ["00000010-VH_..-2-1.pkv", "00000011-VH_..-1-2.pkv", "ports"])
+            self.expect(0, "-p", "2,1", "nv", "verify", backup)
+            self.expect(8, "-p", "2", "nv", "verify", self.path("00000010-VH_..-2-1.pkv"))
+            self.expect(0, "-p", "1", "nv", "verify", self.path("{serial}-VH_..-2-1.pkv"))
+            for port in (1, 2):
+                self.add(f"cal-0000001{port - 1}", bytes([port]))
+            self.expect(0, "--all", "fs", "put", self.path("cal-{serial}"), ":/cal")
+            self.expect(0, "--all", "fs", "get", ":/cal", self.path("back{port}"), "--log", self.path("log{port}"))
+            self.assertEqual([self.content(f"back{port}") for port in (1, 2)], [b"\1", b"\2"])
+            self.assertGreater(len(self.content("log2")), 0)
+
+    def test_mistakes_are_told_before_anything_is_done(self):
+        with self.fixture(3) as (sim, self.ports):
+            log = self.path("log")
+            for code, text, words in (
+                    (2, "COM2 is named twice", ("-p", "1,2,2", "info")),
+                    (2, "COM2 is named twice", ("-p", "1-2,2-3", "info")),
+                    (2, "is no list of ports", ("-p", "3-1", "info")),
+                    (2, "is no list of ports", ("-p", "1,0", "info")),
+                    (2, "is not a port number", ("-p", "1,", "info")),
+                    (2, "different things", ("-p", "1", "--all", "info")),
+                    (2, "one handset at a time", ("-p", "1,2", "sim")),
+                    (2, "x.pkv for both COM1 and COM2", ("-p", "1,2", "nv", "backup", self.path("x.pkv"))),
+                    (2, "both COM1 and COM2", ("--all", "fs", "get", ":/x")),
+                    (2, "both COM1 and COM3", ("-p", "1,3", "info", "--log", log)),
+                    (3, "nothing was done", ("-p", "1-3,5", "fs", "mkdir", ":/made"))):
+                with self.subTest(words=words):
+                    self.assertIn(text, self.expect_json(code, *words)["error"]["text"])
+            self.assertFalse(os.path.exists(self.path("x.pkv")))
+            command(sim, "fault 3 lose,of=7C")
+            held = start("-p", "3", "--time-out", "20000", "--log", log, "raw", "7C", ports=self.ports)
+            try:
+                wait_until(lambda: tool.holds(log, "SEND (1 bytes):7C"))
+                self.expect_json(4, "-p", "1-3", "fs", "mkdir", ":/made")
+            finally:
+                held.kill()
+                held.communicate()
+            self.expect(7, "-p", "1", "fs", "stat", ":/made")
+
+    def test_an_interrupt_ends_all_of_them(self):
+        with self.fixture(3, "--rate", "20k") as (_, self.ports):
+            process = start("-p", "1-3", "--jobs", "2", "--json", "fs", "put", self.add("big", bytes(200000)), ":/big",
+                            ports=self.ports)
+            for _ in range(2):
+                self.assertEqual(json.loads(process.stderr.readline())["event"], "progress")
+            process.send_signal(signal.SIGINT)
+            out, _ = process.communicate(timeout=PATIENCE)
+            self.assertEqual(process.returncode, 130)
+            rows = json.loads(out)["handsets"]
+            self.assertEqual([row["error"]["name"] for row in rows], ["interrupted"] * 3)
+            self.assertEqual(self.verdicts(7, "-p", "1-3", "fs", "stat", ":/big"), {1: 7, 2: 7, 3: 7})
+
+    def test_a_terminal_has_a_line_for_each_that_fits(self):
+        with self.fixture(6, "--rate", "20k") as (_, self.ports):
+            master, slave = pty.openpty()
+            fcntl.ioctl(slave, termios.TIOCSWINSZ, struct.pack("HHHH", 6, 40, 0, 0))
+            environment = {**clean_environment(self.ports), "TERM": "xterm"}
+            process = subprocess.Popen([tool.KRAL, "--all", "fs", "put", self.add("f", bytes(10000)), ":/f"],
+                                       env=environment, stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=slave)
+            os.close(slave)
+            shown = b""
+            try:
+                while piece := os.read(master, 65536):
+                    shown += piece
+            except OSError:  # nobody has the terminal any more
+                pass
+            finally:
+                os.close(master)
+            out = process.communicate(timeout=PATIENCE)[0]
+        self.assertEqual(process.returncode, 0)
+        self.assertEqual(out.count(b"copied"), 6)
+        frames = re.split("\x1b\\[\\d+A\r\x1b\\[J", shown.decode())
+        self.assertGreater(len(frames), 2)
+        for frame in frames[:-1]:
+            lines = frame.splitlines()
+            self.assertLessEqual(len(lines), 5)
+            self.assertLessEqual(max(map(len, lines), default=0), 39)
+        self.assertIn("6 in all: 6 working", frames[0] + frames[1])
+        self.assertIn("6 handsets passed", frames[-1])

@@ -1,0 +1,379 @@
+// Finds out who the handsets are, has the verb run on each, and makes one verdict of all.
+#include "tools/kral/many_handsets.h"
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <cctype>
+#include <chrono>
+#include <cmath>
+#include <condition_variable>
+#include <map>
+#include <mutex>
+#include <optional>
+#include <set>
+#include <thread>
+#include <utility>
+
+#include "tools/kral/board.h"
+#include "tools/kral/format.h"
+#include "tools/kral/interrupt.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr std::uint16_t kLastPort = 255;
+constexpr std::size_t kMostAtOnce = 48;  // the library keeps 50 connections
+constexpr std::chrono::milliseconds kDrawEvery{100};
+
+// --- Who they are ---------------------------------------------------------------------------------------------------
+
+// As a part of a file's name: what a handset tells must not lead into another folder.
+std::string AsFileName(std::string text) {
+  std::replace_if(
+      text.begin(), text.end(),
+      [](unsigned char character) {
+        return std::isalnum(character) == 0 && character != '-' && character != '_' && character != '.';
+      },
+      '_');
+  return text;
+}
+
+std::string SerialOf(Session& session) {
+  std::uint32_t serial = 0;
+  session.Run("the serial-number request", [&] { return KRAL_DIAG_READ_ESN_F(session.handle(), &serial); });
+  return Format("{:08X}", serial);
+}
+
+std::string ModelOf(Session& session) {
+  std::uint32_t hardware = 0, number = 0;
+  std::vector<char> revision(KRAL_BUILD_ID_TEXT_SIZE), model(KRAL_BUILD_ID_TEXT_SIZE);
+  session.Run("the build-identity request", [&] {
+    return KRAL_DIAG_EXT_BUILD_ID_F(session.handle(), &hardware, &number, revision.data(), model.data());
+  });
+  return Printable(model.data());
+}
+
+// What a handset refuses to tell stays empty, unless it is `needed`.
+std::string Ask(Session& session, bool needed, std::string (*question)(Session&)) {
+  try {
+    return question(session);
+  } catch (const ToolError& error) {
+    if (needed || error.code() != ExitCode::kRefused) throw;
+    return {};
+  }
+}
+
+bool Asks(const CommandLine& line, const char* name) {
+  return line.asked().count(name) != 0;
+}
+
+// Without its log: the verb begins that anew.
+SessionOptions ForIdentity(SessionOptions options) {
+  options.log_file.clear();
+  return options;
+}
+
+SessionOptions ForIdentity(SessionOptions options, std::uint16_t port) {
+  options.port = std::to_string(port);
+  return ForIdentity(std::move(options));
+}
+
+// So that it is seen whose it is: "COM7: online".
+std::string Labelled(const Verdict& verdict) {
+  std::string text;
+  std::string_view rest = verdict.data;
+  while (!rest.empty()) {
+    const auto line = rest.substr(0, rest.find('\n'));
+    rest.remove_prefix(std::min(rest.size(), line.size() + 1));
+    text += Format("COM{}: {}\n", verdict.port, line);
+  }
+  return text;
+}
+
+// --- The work -------------------------------------------------------------------------------------------------------
+
+struct OneHandset {
+  std::unique_ptr<ParsedCommand> command;
+  Verdict verdict;
+  std::atomic<bool> ended{false};
+};
+
+class ManyHandsets {
+ public:
+  ManyHandsets(ParsedCommand& command, const ParseFor& parse) : command_(command), parse_(parse) {}
+
+  void Run();
+
+ private:
+  const Context& context() const { return command_.context; }
+  const Output& out() const { return context().out; }
+
+  // `work` on all handsets without a failure, so many at once. A failure of it is that of the handset.
+  void OnEach(const std::function<void(std::size_t number)>& work);
+  void Identify(const std::vector<std::uint16_t>& ports);
+  void RefuseTrouble() const;
+  void Prepare();
+  void RefuseSameFiles() const;
+  void Work();
+  void WorkOn(std::size_t number, Board& board);
+  void Conclude();
+  Json Rows() const;
+  std::string Table() const;
+
+  ParsedCommand& command_;
+  const ParseFor& parse_;
+  std::vector<std::unique_ptr<OneHandset>> handsets_;
+
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  bool has_changed_ = false;  // one of them has ended
+};
+
+void ManyHandsets::OnEach(const std::function<void(std::size_t number)>& work) {
+  const auto count = handsets_.size();
+  std::size_t at_once = std::min(count, kMostAtOnce);
+  if (context().jobs != 0) at_once = std::min<std::size_t>(at_once, context().jobs);
+  std::atomic<std::size_t> next{0};
+  std::vector<std::jthread> threads;
+  for (std::size_t i = 0; i < at_once; ++i) {
+    threads.emplace_back([&] {
+      for (auto number = next++; number < count; number = next++) {
+        auto& verdict = handsets_[number]->verdict;
+        try {
+          ThrowIfInterrupted();
+          if (verdict.passed()) work(number);
+        } catch (const ToolError& error) {
+          verdict.failure = error;
+        } catch (const std::exception& error) {
+          verdict.failure = ToolError(ExitCode::kInternal, Format("internal error: {}", error.what()),
+                                      "run again with --log FILE and report what it shows");
+        }
+        handsets_[number]->ended = true;
+        const std::lock_guard lock(mutex_);
+        has_changed_ = true;
+        changed_.notify_one();
+      }
+    });
+  }
+}
+
+void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
+  for (const auto port : ports) {
+    handsets_.push_back(std::make_unique<OneHandset>());
+    handsets_.back()->verdict.port = port;
+  }
+  OnEach([this](std::size_t number) {
+    auto& verdict = handsets_[number]->verdict;
+    Session session(ForIdentity(context().session, verdict.port));
+    verdict.serial = Ask(session, Asks(*command_.line, "serial"), SerialOf);
+    if (Asks(*command_.line, "model") || out().json()) {
+      verdict.model = Ask(session, Asks(*command_.line, "model"), ModelOf);
+    }
+  });
+  ThrowIfInterrupted();
+  if (!context().all) return RefuseTrouble();
+  // Those that nobody named and that do not answer are none of the handsets.
+  std::erase_if(handsets_, [](const auto& handset) { return !handset->verdict.passed(); });
+  if (handsets_.empty()) {
+    throw ToolError(ExitCode::kNoPort, "no handset answers on any port",
+                    "check cables and power of the handsets and that no other program uses their ports");
+  }
+}
+
+// A port that was named and cannot be had is told before anything is done to the others.
+void ManyHandsets::RefuseTrouble() const {
+  for (const auto& handset : handsets_) {
+    const auto& failure = handset->verdict.failure;
+    if (!failure || (failure->code() != ExitCode::kNoPort && failure->code() != ExitCode::kPortInUse)) continue;
+    throw ToolError(failure->code(), Format("{}; nothing was done on the other ports", failure->what()),
+                    failure->hint(), failure->record());
+  }
+}
+
+void ManyHandsets::Prepare() {
+  for (std::size_t number = 0; number < handsets_.size(); ++number) {
+    auto& handset = *handsets_[number];
+    if (!handset.verdict.passed()) continue;
+    handset.command = parse_(handset.verdict.port, {{"port", std::to_string(handset.verdict.port)},
+                                                    {"slot", std::to_string(number + 1)},
+                                                    {"serial", AsFileName(handset.verdict.serial)},
+                                                    {"model", AsFileName(handset.verdict.model)}});
+  }
+  RefuseSameFiles();
+}
+
+void ManyHandsets::RefuseSameFiles() const {
+  std::map<std::string, std::uint16_t> writers;
+  for (const auto& handset : handsets_) {
+    if (!handset->command) continue;
+    auto files = handset->command->line->Written();
+    if (!context().session.log_file.empty()) files.push_back(handset->command->context.session.log_file);
+    for (const auto& file : files) {
+      const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
+      if (is_new) continue;
+      throw ToolError(ExitCode::kUsage,
+                      Format("kral {} would write {} for both COM{} and COM{}", command_.line->verb(), file,
+                             first->second, handset->verdict.port),
+                      "put {port}, {serial}, {model} or {slot} into the name, for example backup-{serial}.pkv");
+    }
+  }
+}
+
+void ManyHandsets::WorkOn(std::size_t number, Board& board) {
+  auto& [command, verdict, ended] = *handsets_[number];
+  const auto begin = std::chrono::steady_clock::now();
+  board.Begin(number, verdict);
+  command->context.out.UseLane(board.LaneOf(number, verdict));
+  const auto stop_clock = [&] {
+    verdict.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
+  };
+  try {
+    command->act();
+    stop_clock();
+  } catch (...) {
+    stop_clock();
+    verdict.members.update(command->context.found);
+    throw;
+  }
+}
+
+// The data of each as soon as those in front of it have theirs.
+void ManyHandsets::Work() {
+  std::vector<std::uint16_t> ports;
+  for (const auto& handset : handsets_) {
+    ports.push_back(handset->verdict.port);
+    handset->ended = false;
+  }
+  Board board(out(), ports);
+  std::jthread workers([&] { OnEach([&](std::size_t number) { WorkOn(number, board); }); });
+  std::vector<bool> told(handsets_.size());
+  for (std::size_t printed = 0; printed < handsets_.size();) {
+    {
+      std::unique_lock lock(mutex_);
+      changed_.wait_for(lock, kDrawEvery, [this] { return std::exchange(has_changed_, false); });
+    }
+    for (std::size_t number = 0; number < handsets_.size(); ++number) {
+      if (told[number] || !handsets_[number]->ended) continue;
+      told[number] = true;
+      board.End(number, handsets_[number]->verdict);
+    }
+    for (; printed < handsets_.size() && told[printed]; ++printed) {
+      if (!out().json()) board.Print(Labelled(handsets_[printed]->verdict));
+    }
+    board.Draw();
+  }
+}
+
+// --- The verdict ----------------------------------------------------------------------------------------------------
+
+Json ManyHandsets::Rows() const {
+  Json rows = Json::array();
+  for (const auto& handset : handsets_) {
+    const auto& verdict = handset->verdict;
+    Json row{{"port", verdict.port},
+             {"ok", verdict.passed()},
+             {"serial", verdict.serial},
+             {"model", verdict.model},
+             {"seconds", std::round(verdict.seconds * 1000) / 1000}};
+    row.update(verdict.members);
+    if (!verdict.passed()) row["error"] = ErrorJson(*verdict.failure);
+    rows.push_back(std::move(row));
+  }
+  return rows;
+}
+
+std::string ManyHandsets::Table() const {
+  std::string text;
+  for (const auto& handset : handsets_) {
+    const auto& verdict = handset->verdict;
+    text += Format("{:<7} {:<8} {:>8.1f} s  {}\n", Format("COM{}", verdict.port), verdict.serial, verdict.seconds,
+                   verdict.passed() ? "passed" : Format("FAILED: {}", verdict.failure->what()));
+  }
+  return text;
+}
+
+void ManyHandsets::Conclude() {
+  std::vector<std::string> failed;
+  std::set<ExitCode> codes;
+  const ToolError* first = nullptr;
+  for (const auto& handset : handsets_) {
+    if (handset->verdict.passed()) continue;
+    failed.push_back(Format("COM{}", handset->verdict.port));
+    codes.insert(handset->verdict.failure->code());
+    if (first == nullptr) first = &*handset->verdict.failure;
+  }
+  if (!out().json()) WriteAside(Table());
+  command_.context.found = {{"handsets", Rows()}};
+  const auto all = Counted(handsets_.size(), "handset");
+  if (first == nullptr) {
+    out().Result(command_.context.found, "");
+    if (!out().json()) out().Note(Format("{} passed", all));
+    return;
+  }
+  if (Interrupted()) throw InterruptedError();
+  const bool alike = failed.size() == handsets_.size() && codes.size() == 1;
+  throw ToolError(alike ? first->code() : ExitCode::kSomeFailed,
+                  alike ? Format("none of {} passed: {}", all, first->what())
+                        : Format("{} of {} failed: {}", failed.size(), all, Joined(failed, ", ")),
+                  first->hint());
+}
+
+void ManyHandsets::Run() {
+  Identify(command_.context.all ? ListPorts() : ParsePorts(command_.context.session.port));
+  Prepare();
+  Work();
+  Conclude();
+}
+
+std::uint16_t PortAt(std::string_view text, std::string_view whole) {
+  const auto port = ParsePort(text);
+  if (port != 0 && port <= kLastPort) return port;
+  throw ToolError(ExitCode::kUsage, Format("{} is no list of ports", whole), "give numbers and ranges: -p 7,8,20-27");
+}
+
+}  // namespace
+
+std::vector<std::uint16_t> ParsePorts(std::string_view text) {
+  std::vector<std::uint16_t> ports;
+  for (std::size_t at = 0; at <= text.size();) {
+    const auto part = text.substr(at, text.find(',', at) - at);
+    at += part.size() + 1;
+    const auto dash = part.find('-');
+    const auto first = PortAt(part.substr(0, dash), text);
+    const auto last = dash == std::string_view::npos ? first : PortAt(part.substr(dash + 1), text);
+    if (last < first) PortAt("0", text);
+    for (unsigned port = first; port <= last; ++port) {
+      if (std::ranges::find(ports, port) != ports.end()) {
+        throw ToolError(ExitCode::kUsage, Format("COM{} is named twice in {}", port, text), "name each port once");
+      }
+      ports.push_back(static_cast<std::uint16_t>(port));
+    }
+  }
+  return ports;
+}
+
+Names NamesOf(const CommandLine& line, const SessionOptions& options) {
+  Session session(ForIdentity(options));
+  Names names{{"port", std::to_string(session.port())}, {"slot", "1"}};
+  if (Asks(line, "serial")) names["serial"] = AsFileName(SerialOf(session));
+  if (Asks(line, "model")) names["model"] = AsFileName(ModelOf(session));
+  return names;
+}
+
+bool IsForMany(const ParsedCommand& command) {
+  const auto& context = command.context;
+  if (context.all && !context.session.port.empty()) {
+    throw ToolError(ExitCode::kUsage, "--all and --port say different things", "give one of them");
+  }
+  const bool many = context.all || context.session.port.find_first_of(",-") != std::string::npos;
+  if (!many || command.line->for_many()) return many;
+  throw ToolError(ExitCode::kUsage, Format("kral {} is for one handset at a time", command.line->verb()),
+                  "name one port: -p 7");
+}
+
+void RunOnMany(ParsedCommand& command, const ParseFor& parse) {
+  ManyHandsets(command, parse).Run();
+}
+
+}  // namespace kral::tool
