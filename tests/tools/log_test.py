@@ -112,6 +112,9 @@ class Traffic(ToolTest):
         with self.handset(*self.RATES):
             self.expect_json(10, "log", "play", foreign)
             self.expect_json(10, "log", "play", "/nonexistent/capture")
+            kept = self.add("kept", b"old recording")
+            self.ask(2, "log", "capture", kept, "--on", "0x1FFF")
+            self.assertEqual(self.content("kept"), b"old recording")
             self.ask(10, "log", "capture", "/nonexistent/capture")
             self.ask(10, "log", "capture", "/dev/full")
             error = self.ask(10, "log", "list", "--names", foreign)["error"]

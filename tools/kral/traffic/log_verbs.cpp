@@ -165,11 +165,12 @@ KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
 void Capture(Context& context, LogOptions& options) {
   const auto codes = ParseIds(options.codes);
   Session session(context.session);
+  // First: the old recording stays as it is where a code is refused.
+  SwitchCodes(session, codes, true);
   if (KRAL_StartCapture(session.handle(), options.file.c_str()) == 0) {
     throw ExplainRecord(LastError(session.handle()), "the capture", session.port(),
                         "check folder, permissions and room on the disk");
   }
-  SwitchCodes(session, codes, true);
   KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   options.limit.Begin();
   std::uint64_t packets = 0;
@@ -298,7 +299,7 @@ void AddLogVerbs(const Command& root, Context& context) {
   }
 
   const auto capture = log.Verb("capture", "Write what comes to a file, until Ctrl-C");
-  capture.Add("file", options->file, "The capture file; it is emptied first").Required();
+  capture.Add("file", options->file, "The capture file; it is emptied when the codes are on").Required();
   AddCodes(capture, options, "--on");
   options->limit.AddTo(capture, "packets");
   run(capture, Capture);
