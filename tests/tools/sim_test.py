@@ -19,6 +19,10 @@ class Simulation(ToolTest):
             self.assertEqual(len(self.ask(0, "ftm", "cmd", "GET_HDET_FROM_TX_SWEEP_CAL")["response"].split()), 2)
             self.ask(0, "ftm", "--code", "59", "cmd", "53")
             self.ask(2, "ftm", "cmd", "NO_SUCH_COMMAND")
+            for most, *options in ((6137,), (6133, "--form", "1"), (253, "--code", "59")):
+                error = self.ask(2, "ftm", "cmd", "53", "00" * (most + 1), *options)["error"]
+                self.assertIn(f"at most {most}", error["text"])
+            self.ask(0, "ftm", "cmd", "53", "00" * 253, "--code", "59")
             self.ask(2, "ftm", "mode", "9", "--code", "60")
 
     def test_ftm_list_and_bands_need_no_handset(self):

@@ -97,9 +97,22 @@ struct CommandArguments {
   std::uint8_t form = 0;
 };
 
+// The library's packet, or the one byte that tells the length under code 59; without the header.
+std::size_t MostPayload(std::uint16_t command_code, std::uint8_t form) {
+  constexpr std::size_t kRoom = 6143;
+  constexpr std::size_t kLegacyRoom = 260;
+  constexpr std::uint16_t kLegacyCode = 59;
+  const std::size_t lengths = form == KRAL_FTM_HEADER_PLAIN ? 0 : 4;
+  return command_code == kLegacyCode ? kLegacyRoom - 7 - lengths : kRoom - 6 - lengths;
+}
+
 void SendCommand(const Context& context, const FtmOptions& options, const CommandArguments& arguments) {
   const std::uint16_t command = ParseCommand(arguments.command);
   const auto payload = arguments.payload.empty() ? std::vector<std::uint8_t>() : ParseHex(arguments.payload);
+  if (const auto most = MostPayload(options.command_code, arguments.form); payload.size() > most) {
+    throw ToolError(ExitCode::kUsage, Format("a payload of {} bytes is too long: at most {}", payload.size(), most),
+                    "an FTM request is one packet");
+  }
   Session session(context.session);
   Apply(session, options);
   std::array<std::uint8_t, 4096> response{};
