@@ -78,6 +78,24 @@ class Flash(ToolTest):
             self.assertIn("--override", self.flash(7, "write", "--partition", tables[1], image)["error"]["hint"])
             self.flash(0, "write", "--partition", tables[1], "--override", image)
             self.flash(10, "write", "--partition", self.add("long", bytes(513)), image)
+            self.assertIn("runs a flash programmer", self.ask(7, "info")["error"]["text"])
+            self.flash(0, "write", "--reset", image)
+            self.assertEqual(self.flash(0, "info")["state"], "diagnostic")
+            self.flash(7, "reset")
+            self.flash(0, "load", self.programmer)
+            self.flash(0, "reset")
+            self.ask(0, "info")
+
+    def test_a_handset_that_answers_slowly_is_in_diagnostic_mode(self):
+        with self.handset("--fault", "lag=150"):
+            self.assertEqual(self.ask(0, "flash", "info")["state"], "diagnostic")
+            self.assertEqual(self.ask(0, "flash", "load", self.programmer)["bytes"], 32)
+
+    def test_a_loader_is_told(self):
+        with self.handset():
+            self.ask(0, "raw", "3A")
+            self.assertIn("runs the loader", self.ask(7, "info")["error"]["text"])
+            self.assertEqual(self.flash(0, "info")["state"], "loader")
 
     def test_broken_pipelines_tell_what_happened(self):
         image = self.add("image.bin", os.urandom(20000))

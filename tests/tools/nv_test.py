@@ -28,6 +28,8 @@ class NvItems(ToolTest):
                                        (10, "", "read", "10", "--defs", "/nonexistent")):
                 with self.subTest(words=words):
                     self.assertIn(text, self.ask(code, "nv", *words)["error"]["text"])
+            done = self.expect(7, "-p", "7", "nv", "read", "10", "453", "7000", *self.DEFS)
+            self.assertRegex(done.out, r"10 PREFERRED_MODE\n  nam +1\n", "what was found before the failure")
 
     def test_dump_makes_files_that_compare_and_validate(self):
         pkv = [self.path("first.pkv"), self.path("second.pkv")]
@@ -95,7 +97,14 @@ class Backups(ToolTest):
             self.assertEqual(self.results(self.nv(8, "verify"))[2], "different")
             self.assertEqual(self.results(self.nv(7, "restore")), {0: "refused", 1: "written", 2: "written"})
             done = self.expect(7, "-p", "7", "nv", "restore", self.path("phone.pkv"))
-            self.assertIn("item 0: refused, status 7\n2 written, 1 refused\n", done.err)
+            self.assertEqual(done.out, "item 0: refused, status 7\n2 written, 1 refused\n")
+            self.assertIn("is of the handset 80C0FFEE", done.err)
+        with self.handset("--model", "OTHER"):
+            text = self.nv(11, "restore")["error"]["text"]
+            self.assertIn("is of the model VH-1", text)
+            self.assertIn("is OTHER", text)
+            self.assertEqual(self.results(self.nv(0, "restore", "--dry-run"))[1], "would-be-written")
+            self.assertEqual(self.results(self.nv(0, "restore", "--force"))[1], "written")
         with self.handset("--fault", "hang-up,nth=9,of=26"):
             self.assertEqual(self.nv(9, "backup", "--items", "0-20")["counts"]["not-reached"], 21 - 7)
 

@@ -17,6 +17,7 @@
 
 #include "tools/kral/board.h"
 #include "tools/kral/format.h"
+#include "tools/kral/handset_identity.h"
 #include "tools/kral/interrupt.h"
 
 namespace kral::tool {
@@ -39,29 +40,9 @@ std::string AsFileName(std::string text) {
   return text;
 }
 
-std::string SerialOf(Session& session) {
-  std::uint32_t serial = 0;
-  session.Run("the serial-number request", [&] { return KRAL_DIAG_READ_ESN_F(session.handle(), &serial); });
-  return Format("{:08X}", serial);
-}
-
-std::string ModelOf(Session& session) {
-  std::uint32_t hardware = 0, number = 0;
-  std::vector<char> revision(KRAL_BUILD_ID_TEXT_SIZE), model(KRAL_BUILD_ID_TEXT_SIZE);
-  session.Run("the build-identity request", [&] {
-    return KRAL_DIAG_EXT_BUILD_ID_F(session.handle(), &hardware, &number, revision.data(), model.data());
-  });
-  return Printable(model.data());
-}
-
 // What a handset refuses to tell stays empty, unless it is `needed`.
 std::string Ask(Session& session, bool needed, std::string (*question)(Session&)) {
-  try {
-    return question(session);
-  } catch (const ToolError& error) {
-    if (needed || error.code() != ExitCode::kRefused) throw;
-    return {};
-  }
+  return needed ? question(session) : IfTold(session, question);
 }
 
 bool Asks(const CommandLine& line, const char* name) {

@@ -19,6 +19,7 @@ namespace kral::tool {
 namespace {
 
 constexpr std::uint16_t kMostPorts = 256;
+constexpr int kMostAskings = 3;
 
 std::string Describe(const std::vector<std::uint16_t>& ports) {
   std::string text;
@@ -127,10 +128,14 @@ std::vector<std::uint16_t> ListPorts() {
 }
 
 std::vector<std::uint16_t> ListPortsWithHandset() {
-  std::vector<std::uint16_t> ports(kMostPorts);
-  std::uint16_t count = kMostPorts;
-  if (KRAL_GetAvailablePhonesPortList(&count, ports.data(), 0, nullptr) == 0) count = 0;
-  ports.resize(count);
+  std::vector<std::uint16_t> ports;
+  // On a busy machine a healthy handset may answer later than a check waits.
+  for (int i = 0; i < kMostAskings && ports.empty() && !Interrupted(); ++i) {
+    std::uint16_t count = kMostPorts;
+    ports.resize(count);
+    if (KRAL_GetAvailablePhonesPortList(&count, ports.data(), 0, nullptr) == 0) count = 0;
+    ports.resize(count);
+  }
   return ports;
 }
 
@@ -173,7 +178,7 @@ void Session::StartLog(const SessionOptions& options) const {
   if (to_file) KRAL_StartLogging(handle_, options.log_file.c_str());
 }
 
-bool Session::AnswersInTheEnd() {
+bool Session::AnswersInTheEnd() const {
   constexpr std::array<std::int32_t, 2> kLonger = {300, 1000};
   const std::int32_t before = KRAL_GetTimeOut(handle_, KRAL_TIME_OUT_LIVENESS);
   bool answers = false;
@@ -186,19 +191,42 @@ bool Session::AnswersInTheEnd() {
   return answers;
 }
 
+// What has the line of a handset that is being downloaded to, in words; null for anything else. A no-operation of
+// either tells; handsets in diagnostic mode refuse both.
+const char* Session::DownloadState() const {
+  const auto answers = [this](std::uint8_t request, std::uint8_t answer) {
+    constexpr std::uint32_t kPatienceMs = 200;
+    std::array<std::uint8_t, 64> reply{};
+    auto size = static_cast<std::uint16_t>(reply.size());
+    KRAL_SendSync(handle_, 1, &request, &size, reply.data(), kPatienceMs);
+    return size > 0 && size < reply.size() && reply[0] == answer;
+  };
+  if (TroubleOf(handle_)) return nullptr;
+  KRAL_SetResynchronise(handle_, 0);  // with a question that neither of them takes
+  const char* const state = answers(9, 10) ? "a flash programmer" : answers(6, 2) ? "the loader" : nullptr;
+  KRAL_SetResynchronise(handle_, 1);
+  return state;
+}
+
 void Session::CheckAnswers(Expected expected) {
   if (expected == Expected::kInBootLoader) return;
+  const bool may_be_in_download = expected == Expected::kMayBeInDownload;
   answers_ = KRAL_IsPhoneConnected(handle_) != 0;
   auto record = LastError(handle_);
+  if (!answers_ && may_be_in_download && DownloadState() != nullptr) return;
   // A busy machine may keep a healthy handset's answer for longer than one check waits. With the port in order, ask
-  // again, for longer each time; a loader is asked once, for it takes no questions.
-  if (!answers_ && expected != Expected::kMayBeInDownload) answers_ = AnswersInTheEnd();
+  // again, for longer each time.
+  if (!answers_) answers_ = AnswersInTheEnd();
   if (answers_) return;
   ThrowIfInterrupted();
   // What came to the first question may be in the way of the later ones.
   if (!IsOtherThanSilence(record)) record = LastError(handle_);
   if (const auto trouble = TroubleOf(handle_)) throw PortError(port_, *trouble, false, record);
-  if (expected == Expected::kMayBeInDownload) return;
+  if (may_be_in_download) return;
+  if (const auto* const state = DownloadState()) {
+    throw ToolError(ExitCode::kRefused, Format("{} runs {}, and no diagnostics", DescribePort(port_), state),
+                    "kral flash info tells more, kral flash reset restarts the handset");
+  }
   if (IsOtherThanSilence(record)) throw ExplainRecord(*record, kLivenessCheck, port_);
   throw ToolError(ExitCode::kNoAnswer, Format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
@@ -213,7 +241,7 @@ void Session::Begin() {
 std::optional<ToolError> Session::Silence() const {
   // That the device is gone is told only until the asking has closed its port.
   const auto before = TroubleOf(handle_);
-  if (KRAL_IsPhoneConnected(handle_) != 0) return std::nullopt;
+  if (KRAL_IsPhoneConnected(handle_) != 0 || AnswersInTheEnd()) return std::nullopt;
   const auto record = LastError(handle_);
   const auto after = TroubleOf(handle_);
   if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, record);

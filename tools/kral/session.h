@@ -65,7 +65,8 @@ class Session {
   std::optional<ToolError> ExplainPort(const KRAL_ERROR& record) const;
   void StartLog(const SessionOptions& options) const;
   void CheckAnswers(Expected expected);
-  bool AnswersInTheEnd();
+  bool AnswersInTheEnd() const;
+  const char* DownloadState() const;
 
   std::uint16_t port_;
   KRAL_HANDLE handle_;

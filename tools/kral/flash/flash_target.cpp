@@ -121,6 +121,11 @@ void FlashTarget::EnterLoader() {
   session_.Run("the switch into download mode", [&] { return KRAL_DIAG_DLOAD_F(session_.handle()); });
 }
 
+// Loader and flash programmer take the same request.
+void FlashTarget::Reset() {
+  session_.Run("the reset", [this] { return KRAL_KOVA_RESET(session_.handle()); });
+}
+
 void FlashTarget::Load(const FlashImage& programmer, std::uint32_t maximum_packet) {
   Progress progress(context_.out, "load", programmer.info.size[0]);
   progress.Describe(programmer.file);

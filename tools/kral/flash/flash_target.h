@@ -64,6 +64,7 @@ class FlashTarget {
   ProgrammerLimits Hello();  // ToolError when no programmer answers
 
   void EnterLoader();  // from diagnostic mode; nothing for a handset that does not speak it
+  void Reset();
   void Load(const FlashImage& programmer, std::uint32_t maximum_packet);
   void SetSecurityMode(std::uint8_t mode);
   void SendPartitionTable(const std::string& file, bool override_table);

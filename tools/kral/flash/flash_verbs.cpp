@@ -85,6 +85,7 @@ struct WriteArguments {
   std::string partition_table;
   bool override_table = false;
   bool dry_run = false;
+  bool reset = false;
 };
 
 void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uint32_t block_size) {
@@ -133,9 +134,21 @@ void WriteImages(Context& context, WriteArguments arguments) {
       context.found["written"] = written;
     }
   }
+  if (arguments.reset) target.Reset();
   context.out.Result(
-      {{"port", target.session().port()}, {"written", written}, {"bytes", done}},
+      {{"port", target.session().port()}, {"written", written}, {"bytes", done}, {"reset", arguments.reset}},
       Format("{} in {} written and acknowledged\n", Counted(done, "byte"), Counted(images.size(), "image")));
+}
+
+void RestartHandset(Context& context) {
+  FlashTarget target(context);
+  const auto port = target.session().port();
+  if (target.session().answers_diagnostics()) {
+    throw ToolError(ExitCode::kRefused, Format("the handset on {} is in diagnostic mode", DescribePort(port)),
+                    "kral mode reset restarts it from there");
+  }
+  target.Reset();
+  context.out.Result({{"port", port}}, "restarted\n");
 }
 
 void VerifyImages(Context& context, const std::vector<std::string>& files, const std::string& format) {
@@ -216,6 +229,7 @@ void AddWriteVerb(const Command& flash, Context& context) {
   write.Add("--security", arguments->security_mode, "Set this security mode first");
   write.Add("--partition", arguments->partition_table, "Send this partition table first");
   write.Flag("--override", arguments->override_table, "Let the partition table replace a different one");
+  write.Flag("--reset", arguments->reset, "Restart the handset afterwards");
   write.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
   write.Run([&context, arguments] { WriteImages(context, *arguments); });
 }
@@ -229,6 +243,10 @@ void AddFlashVerbs(const Command& root, Context& context) {
   });
   AddLoadVerb(flash, context);
   AddWriteVerb(flash, context);
+
+  flash.Verb("reset", "Restart a handset out of its loader or flash programmer").Run([&context] {
+    RestartHandset(context);
+  });
 
   const auto files = std::make_shared<std::vector<std::string>>();
   const auto format = std::make_shared<std::string>("auto");

@@ -9,8 +9,10 @@
 #include "tools/kral/abort_on_interrupt.h"
 #include "tools/kral/call_failure.h"
 #include "tools/kral/format.h"
+#include "tools/kral/handset_identity.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/nv/nv_items.h"
+#include "tools/kral/nv/pkv_origin.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/verbs.h"
 
@@ -23,6 +25,7 @@ struct BackupOptions {
   std::string items = "0-9999";
   std::uint16_t subscriptions = 1;
   bool dry_run = false;
+  bool force = false;
   std::vector<std::uint16_t> read_only;
 };
 
@@ -219,9 +222,27 @@ ToolError Explain(const Session& session, const char* work, const std::string& f
   }
 }
 
+// The values of one model may do harm in another. Those of another handset of the same model are what a golden file is
+// for; it is told all the same.
+void CheckOrigin(Context& context, Session& session, const BackupOptions& options) {
+  const auto origin = OriginOf(options.file);
+  const auto model = origin.model.empty() ? std::string() : IfTold(session, ModelOf);
+  const auto serial = origin.serial.empty() ? std::string() : IfTold(session, SerialOf);
+  if (!serial.empty() && serial != origin.serial) {
+    context.out.Note(Format("{} is of the handset {}; {} has {}", options.file, origin.serial,
+                            DescribePort(session.port()), serial));
+  }
+  if (model.empty() || model == origin.model) return;
+  const auto other = Format("{} is of the model {}, and the handset on {} is {}", options.file, origin.model,
+                            DescribePort(session.port()), model);
+  if (options.dry_run || options.force) return context.out.Note(other);
+  throw ToolError(ExitCode::kSafetyStop, other, "nothing was written; --force restores it all the same");
+}
+
 void RunJob(Context& context, const BackupOptions& options, const char* work, Job job, const Words& words,
-            bool keeps_all) {
+            bool keeps_all, bool restores = false) {
   Session session(context.session);
+  if (restores) CheckOrigin(context, session, options);
   const NvItems definitions(session, options.nv);  // the library then knows arrays, and items beyond the range
   if (job == KRAL_BackupNVFromMobileToPKV) {
     const auto [first, last] = ParseIdRange(options.items);
@@ -248,7 +269,7 @@ void RunJob(Context& context, const BackupOptions& options, const char* work, Jo
   if (status == KRAL_PKV_STATUS_DONE || (options.dry_run && status == KRAL_PKV_STATUS_DIFFERENT)) {
     return context.out.Result(members, text);
   }
-  if (counts.total > 0 && !context.out.json()) context.out.Note(text);
+  if (counts.total > 0 && !context.out.json()) context.out.Data(text);
   context.found = members;
   throw Explain(session, work, options.file, status, counts, record);
 }
@@ -259,8 +280,8 @@ void Backup(Context& context, const BackupOptions& options) {
 }
 
 void Restore(Context& context, const BackupOptions& options) {
-  if (options.dry_run) return RunJob(context, options, "dry run", KRAL_PKV_Verify, kDryRunWords, true);
-  RunJob(context, options, "restore", KRAL_RestoreNVFromPKV, kRestoreWords, true);
+  if (options.dry_run) return RunJob(context, options, "dry run", KRAL_PKV_Verify, kDryRunWords, true, true);
+  RunJob(context, options, "restore", KRAL_RestoreNVFromPKV, kRestoreWords, true, true);
 }
 
 void Verify(Context& context, const BackupOptions& options) {
@@ -286,6 +307,7 @@ void AddNvBackupVerbs(const Command& root, Context& context) {
   backup.Add("--subscriptions", options->subscriptions, "How many subscriptions the handset has").Between(1, 16);
   const auto restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);
   restore.Flag("--dry-run", options->dry_run, "Only tell what would be written");
+  restore.Flag("--force", options->force, "Also what was read from another model");
   restore.Add("--read-only", options->read_only, "Items that may be read-only (0,447): skipped, not refused")
       .Separated(',')
       .OneEach();

@@ -65,7 +65,7 @@ struct ReadSoFar {
   // For the end of a verb that fails.
   void Keep(Context& context) const {
     context.found.update(Json{{"items", items}, {"without_value", without_value}, {"refused", refused}});
-    if (!context.out.json() && !text.empty()) context.out.Note(text);
+    if (!context.out.json() && !text.empty()) context.out.Data(text);
   }
 };
 
@@ -199,7 +199,7 @@ void Compare(Context& context, const Arguments& arguments) {
                                   arguments.page, equal, different, only_first, only_second);
   if (different + only_first + only_second == 0) return context.out.Result(members, text);
   context.found = members;
-  if (!context.out.json()) context.out.Note(text);
+  if (!context.out.json()) context.out.Data(text);
   throw ToolError(ExitCode::kMismatch, Format("{} and {} differ", arguments.first, arguments.second),
                   Format("{} shows in what", arguments.page));
 }
