@@ -62,6 +62,21 @@ class Files(ToolTest):
                     error = self.fs(7, *words)["error"]
                     self.assertIn(text, error["text"])
                     self.assertEqual(error["status"]["kind"], "efs")
+            self.fs(0, "mkdir", "--parents", ":/tree/sub/deep")
+            self.fs(0, "put", local, ":/tree/sub/f")
+            self.fs(0, "ln", "/d", "/tree/link")
+            self.fs(0, "ln", "/tree", "/totree")
+            self.fs(0, "put", local, ":/d/stays")
+            self.assertEqual(self.fs(0, "rm", "-r", "/totree")["done"], ["/totree"])
+            answer = self.fs(7, "rm", "/none", "/file", "/tree", "/none2")
+            self.assertEqual(answer["done"], ["/file"])
+            self.assertRegex(answer["error"]["text"], r"^no such file /none on COM7 .*, and 2 more$")
+            answer = self.fs(0, "rm", "-r", "/tree")
+            self.assertEqual(sorted(answer["done"]),
+                             ["/tree", "/tree/link", "/tree/sub", "/tree/sub/deep", "/tree/sub/f"])
+            self.fs(2, "rm", "-r", "/")
+            self.assertEqual(self.text("fs", "get", ":/d/stays", "-"), "x" * 700)
+            self.fs(0, "put", local, ":/file")
             for words in (("cat", ":/nope"), ("stat", "/nope"), ("get", ":/nope"), ("ls", "/nope"), ("rm", "/nope")):
                 with self.subTest(words=words):
                     error = self.fs(7, *words)["error"]

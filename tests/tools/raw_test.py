@@ -131,6 +131,7 @@ class Failures(ToolTest):
                 self.assertRegex(page, rf"\n  kral (-\S+ (\d+ )?)*{' '.join(words)}\b")
                 self.assertNotRegex(page, r" in \[|INT|FLOAT|:\{")
         self.assertIn("--time-out 1-3600000 ms", self.expect(0, "help").out)
+        self.assertEqual(self.expect_json(0, "--version")["version"] + "\n", self.expect(0, "--version").out)
 
     def test_result_that_cannot_be_written_is_not_a_success(self):
         with self.handset(), open("/dev/full", "w", encoding="ascii") as full:

@@ -48,6 +48,7 @@ constexpr const char* kExamples[] = {
     "kral -p 7 fs mv :/a :/b",
     "kral -p 7 fs put -r rf-config :/nv/item_files",
     "kral -p 7 fs rm :/a :/b",
+    "kral -p 7 fs rm -r :/nv/item_files/old",
     "kral -p 7 fs rmdir :/empty",
     "kral -p 7 fs stat :/nv/item_files",
     "kral -p 7 fs sync",

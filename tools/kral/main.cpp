@@ -56,8 +56,10 @@ constexpr VerbsOf kVerbs[] = {
 // Of one noun, or of all: a command line for each of many handsets costs time.
 std::unique_ptr<ParsedCommand> Declared(std::string_view noun) {
   auto command = std::make_unique<ParsedCommand>();
-  command->line =
-      std::make_unique<CommandLine>("kral", "Talks to mobile handsets in production and test.", VersionText);
+  const auto version = [context = &command->context] {
+    return context->out.json() ? Json{{"ok", true}, {"version", VersionText()}}.dump() : VersionText();
+  };
+  command->line = std::make_unique<CommandLine>("kral", "Talks to mobile handsets in production and test.", version);
   const auto root = command->line->root();
   AddCommonOptions(root, command->context);
   for (const auto& verbs : kVerbs) {

@@ -193,6 +193,10 @@ void ManyHandsets::RefuseSameFiles() const {
     for (const auto& file : files) {
       const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
       if (is_new) continue;
+      if (file == "-") {
+        throw ToolError(ExitCode::kUsage, Format("kral {} writes to the standard output", command_.line->verb()),
+                        "name a file with {port}, {serial}, {model} or {slot}");
+      }
       throw ToolError(ExitCode::kUsage,
                       Format("kral {} would write {} for both COM{} and COM{}", command_.line->verb(), file,
                              first->second, handset->verdict.port),
@@ -335,6 +339,9 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text) {
 }
 
 Names NamesOf(const CommandLine& line, const SessionOptions& options) {
+  const bool asks = Asks(line, "serial") || Asks(line, "model");
+  // Not for a mere number: a boot loader says hello once.
+  if (!asks && !options.port.empty()) return {{"port", std::to_string(ParsePort(options.port))}, {"slot", "1"}};
   Session session(ForIdentity(options));
   Names names{{"port", std::to_string(session.port())}, {"slot", "1"}};
   if (Asks(line, "serial")) names["serial"] = AsFileName(SerialOf(session));

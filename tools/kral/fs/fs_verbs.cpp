@@ -183,32 +183,128 @@ void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
 
 using PathCall = std::uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* path, std::uint32_t* error_number);
 
-// One request for each path; those done before a failure are told.
+// What is done path by path. A path that fails does not stop the others; what was done is told in any case.
+class PathByPath {
+ public:
+  PathByPath(Context& context, RemoteFiles& files) : context_(context) {
+    context_.found = {{"port", files.session().port()}, {"done", Json::array()}};
+  }
+
+  // False when it failed for this path only.
+  bool Try(const std::function<void()>& step) {
+    try {
+      step();
+      return true;
+    } catch (const ToolError& error) {
+      if (!ConcernsOneFile(error)) throw;
+      if (failed_++ == 0) {
+        first_ = error;
+      } else {
+        context_.out.Note(error.what());
+      }
+      return false;
+    }
+  }
+  bool Do(const std::string& path, const std::function<void()>& change) {
+    if (!Try(change)) return false;
+    context_.found["done"].push_back(path);
+    return true;
+  }
+
+  void Conclude() const {
+    if (!first_) return context_.out.Result(context_.found, "");
+    const auto more = failed_ > 1 ? Format(", and {} more", failed_ - 1) : std::string();
+    throw ToolError(first_->code(), first_->what() + more, first_->hint(), first_->record());
+  }
+
+ private:
+  Context& context_;
+  std::optional<ToolError> first_;
+  std::size_t failed_ = 0;
+};
+
 void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
                  const std::function<void(const std::string& path)>& change) {
-  context.found = {{"port", files.session().port()}, {"done", Json::array()}};
+  PathByPath work(context, files);
   for (const auto& argument : options.paths) {
     const auto path = EfsPath(argument);
-    change(path);
-    context.found["done"].push_back(path);
+    work.Do(path, [&] { change(path); });
   }
-  context.out.Result(context.found, "");
+  work.Conclude();
 }
 
-void RemoveAll(Context& context, RemoteFiles& files, const FsOptions& options, std::string_view function,
-               PathCall call) {
-  ForEachPath(context, files, options, [&](const std::string& path) {
-    files.Ask(Format("the removal of {}", Printable(path)), path, function,
-              [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
-  });
+void Remove(RemoteFiles& files, const std::string& path, std::string_view function, PathCall call) {
+  files.Ask(Format("the removal of {}", Printable(path)), path, function,
+            [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
+}
+
+void RemoveFile(RemoteFiles& files, const std::string& path) {
+  Remove(files, path, "KRAL_EfsDelete", KRAL_EfsDelete);
+}
+
+void RemoveDirectory(RemoteFiles& files, const std::string& path) {
+  Remove(files, path, "KRAL_EfsRmDir", KRAL_EfsRmDir);
+}
+
+// With all that is in it, links as such. Names that would lead elsewhere are left alone, and their directory stays.
+bool RemoveTree(PathByPath& work, RemoteFiles& files, const std::string& path) {
+  bool whole = true;
+  std::vector<RemoteEntry> entries;
+  if (!work.Try([&] { entries = files.List(path); })) return false;
+  for (const auto& entry : entries) {
+    const auto inner = JoinEfs(path, entry.name);
+    bool removed = false;
+    if (entry.name.find('/') != std::string::npos) {
+      work.Try([&] {
+        throw ToolError(ExitCode::kSafetyStop, Format("the name of {} leads elsewhere", files.Where(inner)),
+                        "kral fs rm removes it by its whole path");
+      });
+    } else if (entry.kind == RemoteEntry::Kind::kDirectory) {
+      removed = RemoveTree(work, files, inner);
+    } else {
+      removed = work.Do(inner, [&] { RemoveFile(files, inner); });
+    }
+    whole = whole && removed;
+  }
+  return whole && work.Do(path, [&] { RemoveDirectory(files, path); });
+}
+
+// A status would follow a link to a directory, whose contents are not meant.
+bool IsRemovedAsFile(RemoteFiles& files, const std::string& path) {
+  try {
+    RemoveFile(files, path);
+    return true;
+  } catch (const ToolError& error) {
+    if (!ConcernsOneFile(error)) throw;
+    const auto status = files.Find(path);
+    if (!status || !status->is_directory()) throw;
+    return false;
+  }
+}
+
+void RemoveTrees(Context& context, RemoteFiles& files, const FsOptions& options) {
+  PathByPath work(context, files);
+  for (const auto& argument : options.paths) {
+    const auto path = EfsPath(argument);
+    bool is_file = true;
+    const bool known = work.Try([&] { is_file = IsRemovedAsFile(files, path); });
+    if (!known) continue;
+    if (is_file) {
+      work.Do(path, [] {});
+    } else {
+      RemoveTree(work, files, path);
+    }
+  }
+  work.Conclude();
 }
 
 void RemoveFiles(Context& context, RemoteFiles& files, const FsOptions& options) {
-  RemoveAll(context, files, options, "KRAL_EfsDelete", KRAL_EfsDelete);
+  if (options.copy.recursive) return RemoveTrees(context, files, options);
+  ForEachPath(context, files, options, [&](const std::string& path) { RemoveFile(files, path); });
 }
 
 void RemoveDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
-  RemoveAll(context, files, options, "KRAL_EfsRmDir", KRAL_EfsRmDir);
+  ForEachPath(context, files, options, [&](const std::string& path) { RemoveDirectory(files, path); });
 }
 
 void MakeDirectories(Context& context, RemoteFiles& files, const FsOptions& options) {
@@ -269,7 +365,15 @@ void CheckGet(const FsOptions& options) {
   CheckSides(options.paths[0], LocalTarget(options));
 }
 
+void CheckRemove(const FsOptions& options) {
+  for (const auto& path : options.paths) {
+    if (!options.copy.recursive || EfsPath(path).find_first_not_of('/') != std::string::npos) continue;
+    throw ToolError(ExitCode::kUsage, "the root directory is not removed", "name what is in it");
+  }
+}
+
 void Get(Context& context, RemoteFiles& files, const FsOptions& options) {
+  if (LocalTarget(options) == "-") return Cat(context, files, options);
   Copier(context, files, options.copy, "get").Get(EfsPath(options.paths[0]), LocalTarget(options));
 }
 
@@ -303,13 +407,13 @@ struct Verb {
 constexpr Verb kVerbs[] = {
     {"cat", "Print a file", "path", 1, 1, Cat},
     {"df", "Print how much room there is", "path", 0, 1, Room},
-    {"get", "Copy from the handset: get :PATH [LOCAL]", "paths", 1, 2, Get, CheckGet},
+    {"get", "Copy from the handset: get :PATH [LOCAL]; - is the standard output", "paths", 1, 2, Get, CheckGet},
     {"ln", "Make a symbolic link: ln TARGET LINK", "paths", 2, 2, Link},
     {"ls", "List a directory", "path", 0, 1, List},
     {"mkdir", "Make directories", "paths", 1, kMany, MakeDirectories},
     {"mv", "Rename or move: mv OLD NEW", "paths", 2, 2, Move},
     {"put", "Copy to the handset, and compare: put LOCAL :PATH", "paths", 2, 2, Put, CheckPut},
-    {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles},
+    {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles, CheckRemove},
     {"rmdir", "Remove empty directories", "paths", 1, kMany, RemoveDirectories},
     {"stat", "Print what there is to know about a path", "path", 1, 1, Stat},
     {"sync", "Have everything written to the flash", "path", 0, 1, Sync},
@@ -331,6 +435,7 @@ void AddFlags(const Command& fs, FsOptions& options) {
     verb.Flag("-r,--recursive", options.copy.recursive, "Copy directories with all that is in them");
     verb.Flag("--force", options.copy.force, "Copy files that are equal already, too");
   }
+  fs.Find("rm").Flag("-r,--recursive", options.copy.recursive, "Remove directories with all that is in them");
   fs.Find("put").Flag("--item", options.copy.item, "Put item files; those there stay items anyway");
   fs.Find("put").Flag("--no-verify", options.unverified, "Do not read back and compare");
   fs.Find("mkdir").Flag("--parents", options.parents, "Make the directories above, too");
