@@ -79,8 +79,8 @@ inline u32 PacketTimeOut(Diag_FTM& phone) {
 
 // Closes what late replies have named. The request and the reply in the phone's default packet buffer stay.
 void CloseStrays(Diag_FTM& phone);
-// Tried until the handset confirms it; a failure is logged. One that may be closed by now: the handset need not know it.
-// The default packet buffer stays, too.
+// Tried until the handset confirms it; a failure is logged. One that may be closed by now: the handset need not know
+// it. The default packet buffer stays, too.
 bool CloseHandle(Diag_FTM& phone, const EfsRequest<u32>& close, u32 value, u32 time_out_ms, bool may_be_closed = false);
 
 // Requests that stand alone are sent once. Those of a transfer that change nothing are repeated until answered.
