@@ -137,7 +137,6 @@ std::vector<std::string> Board::Lines(std::size_t width, std::size_t height) con
   const bool fits = rows_.size() <= height;
   if (!fits) {
     // The most telling ones, in their own order.
-    const auto by_port = shown;
     std::ranges::stable_sort(shown, {}, &Row::state);
     shown.resize(height - 1);
     std::ranges::sort(shown);
