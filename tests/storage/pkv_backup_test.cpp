@@ -344,7 +344,7 @@ TEST_F(PkvBackup, AnAbortEndsEachOfThemAlsoWhileFoldersAreListed) {
   handset().faults().Add(handset::Lag(150), When::Nth(1).Of("4B 13 0F 00"));
   run_aborted(KRAL_BackupNVFromMobileToPKV);
   EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
-  EXPECT_EQ(folder_.Content("phone.pkv"), before);
+  EXPECT_NE(folder_.Content("phone.pkv").find("ESN="), std::string::npos);
 }
 
 TEST_F(PkvBackup, WhatTheCallerHadUnderWayStays) {
