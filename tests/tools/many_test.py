@@ -42,14 +42,14 @@ class ManyHandsets(ToolTest):
             self.assertEqual(self.verdicts(7, "-p", "1,2", "mode", "get"), {1: 7, 2: 7})
 
     def test_names_of_files_are_those_of_the_handset(self):
-        with self.fixture(2, "--model", "VH/..") as (_, self.ports):
+        with self.fixture(2, "--model", "../VH") as (_, self.ports):
             backup = self.path("{serial}-{model}-{slot}-{port}.pkv")
             self.expect(0, "-p", "2,1", "nv", "backup", backup, "--items", "0-20")
             self.assertEqual(sorted(os.listdir(self.folder)),
-                             ["00000010-VH_..-2-1.pkv", "00000011-VH_..-1-2.pkv", "ports"])
+                             ["00000010-_._VH-2-1.pkv", "00000011-_._VH-1-2.pkv", "ports"])
             self.expect(0, "-p", "2,1", "nv", "verify", backup)
-            self.expect(8, "-p", "2", "nv", "verify", self.path("00000010-VH_..-2-1.pkv"))
-            self.expect(0, "-p", "1", "nv", "verify", self.path("{serial}-VH_..-2-1.pkv"))
+            self.expect(8, "-p", "2", "nv", "verify", self.path("00000010-_._VH-2-1.pkv"))
+            self.expect(0, "-p", "1", "nv", "verify", self.path("{serial}-_._VH-2-1.pkv"))
             for port in (1, 2):
                 self.add(f"cal-0000001{port - 1}", bytes([port]))
             self.expect(0, "--all", "fs", "put", self.path("cal-{serial}"), ":/cal")
@@ -59,6 +59,7 @@ class ManyHandsets(ToolTest):
 
     def test_mistakes_are_told_before_anything_is_done(self):
         with self.fixture(3) as (sim, self.ports):
+            self.ports[9] = os.path.realpath(self.ports[1])
             log = self.path("log")
             for code, text, words in (
                     (2, "COM2 is named twice", ("-p", "1,2,2", "info")),
@@ -66,6 +67,7 @@ class ManyHandsets(ToolTest):
                     (2, "is no list of ports", ("-p", "3-1", "info")),
                     (2, "is no list of ports", ("-p", "1,0", "info")),
                     (2, "is not a port number", ("-p", "1,", "info")),
+                    (2, "are the same device", ("-p", "1,9", "info")),
                     (2, "different things", ("-p", "1", "--all", "info")),
                     (2, "one handset at a time", ("-p", "1,2", "sim")),
                     (2, "x.pkv for both COM1 and COM2", ("-p", "1,2", "nv", "backup", self.path("x.pkv"))),

@@ -8,6 +8,7 @@
 #include <chrono>
 #include <cmath>
 #include <condition_variable>
+#include <filesystem>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -15,6 +16,7 @@
 #include <thread>
 #include <utility>
 
+#include "platform/port_list.h"
 #include "tools/kral/board.h"
 #include "tools/kral/format.h"
 #include "tools/kral/handset_identity.h"
@@ -29,8 +31,9 @@ constexpr std::chrono::milliseconds kDrawEvery{100};
 
 // --- Who they are ---------------------------------------------------------------------------------------------------
 
-// As a part of a file's name: what a handset tells must not lead into another folder.
+// As a part of a file's name: what a handset tells must not lead into another folder, ".." included.
 std::string AsFileName(std::string text) {
+  if (text.starts_with('.')) text.front() = '_';
   std::replace_if(
       text.begin(), text.end(),
       [](unsigned char character) {
@@ -43,6 +46,25 @@ std::string AsFileName(std::string text) {
 // What a handset refuses to tell stays empty, unless it is `needed`.
 std::string Ask(Session& session, bool needed, std::string (*question)(Session&)) {
   return needed ? question(session) : IfTold(session, question);
+}
+
+// Without those that lead to the same device as one in front of them: a link of a port folder has a number beside that
+// of its target.
+std::vector<std::uint16_t> WithoutTwins(const std::vector<std::uint16_t>& ports, bool are_named) {
+  std::vector<std::uint16_t> different;
+  std::map<std::filesystem::path, std::uint16_t> devices;
+  for (const auto port : ports) {
+    std::error_code ignored;
+    const auto device = std::filesystem::canonical(ComPortDevice(port), ignored);
+    const auto [first, is_new] = devices.emplace(device, port);
+    if (is_new || device.empty()) {
+      different.push_back(port);
+    } else if (are_named) {
+      throw ToolError(ExitCode::kUsage, Format("{} and COM{} are the same device", DescribePort(port), first->second),
+                      "name one of them");
+    }
+  }
+  return different;
 }
 
 bool Asks(const CommandLine& line, const char* name) {
@@ -305,7 +327,8 @@ void ManyHandsets::Conclude() {
 }
 
 void ManyHandsets::Run() {
-  Identify(command_.context.all ? ListPorts() : ParsePorts(command_.context.session.port));
+  const bool all = command_.context.all;
+  Identify(WithoutTwins(all ? ListPorts() : ParsePorts(command_.context.session.port), !all));
   Prepare();
   Work();
   Conclude();
