@@ -8,11 +8,8 @@
 #include <string>
 #include <vector>
 
-#include "handset/caller_transport.h"
-#include "handset/virtual_handset.h"
-#include "kral/connection.h"
+#include "bench/support/station.h"
 #include "kral/efs.h"
-#include "kral/transport.h"
 
 namespace {
 
@@ -22,7 +19,7 @@ using handset::ByteView;
 using handset::ByteWriter;
 using std::chrono::steady_clock;
 
-constexpr uint32_t kPort = 240;
+constexpr int kPort = 240;
 constexpr uint32_t kFileSize = 1 << 20;
 constexpr uint32_t kTimeOutMs = 4000;
 constexpr uint32_t kEntries = 10000;
@@ -33,34 +30,21 @@ struct PacketSizes {
 };
 constexpr PacketSizes kSizes[] = {{536, 524}, {4091, 6143}};  // the defaults, and the largest
 
-class Station {
+class Station : public bench::Station {
  public:
-  explicit Station(int64_t receive_mode) {
-    phone_.KeepTrace(false);
-    handle_ = KRAL_ConnectServer_UserDefinedTransport(
-        kPort, transport_.handle_value(), transport_.context(), &handset::CallerTransport::Send,
-        &handset::CallerTransport::Receive, &handset::CallerTransport::Flush);
-    KRAL_SetReceiveMode(handle_, static_cast<uint8_t>(receive_mode));
-  }
-  ~Station() { KRAL_DisconnectServer(handle_); }
-  Station(const Station&) = delete;
-  Station& operator=(const Station&) = delete;
-
-  KRAL_HANDLE handle() const { return handle_; }
-  handset::VirtualHandset& phone() { return phone_; }
+  Station(int64_t receive_mode, bool over_pty)
+      : bench::Station(kPort, over_pty ? bench::Cable::kPty : bench::Cable::kPolled,
+                       static_cast<uint8_t>(receive_mode)) {}
 
   // One packet sent and awaited by itself.
   bool Exchange(const Bytes& request) {
     auto size = static_cast<uint16_t>(reply_.size());
-    return KRAL_SendSync(handle_, static_cast<uint16_t>(request.size()), request.data(), &size, reply_.data(),
+    return KRAL_SendSync(handle(), static_cast<uint16_t>(request.size()), request.data(), &size, reply_.data(),
                          kTimeOutMs) != 0;
   }
 
  private:
-  handset::VirtualHandset phone_;
-  handset::CallerTransport transport_{phone_};
   Bytes reply_ = Bytes(4096);
-  KRAL_HANDLE handle_ = 0;
 };
 
 template <class Work>
@@ -100,11 +84,12 @@ void Compare(benchmark::State& state, Station& station, const std::vector<Bytes>
   state.counters["round_trip_us"] = bare * 1e6 / count / static_cast<double>(state.iterations());
 }
 
-// --- Transfers: receive mode, packet sizes --------------------------------------------------------------------------
+// --- Transfers: receive mode, packet sizes, cable
+// --------------------------------------------------------------------------
 
 // A new handset gives descriptor 0, time and again.
 void Put(benchmark::State& state) {
-  Station station(state.range(0));
+  Station station(state.range(0), state.range(2) != 0);
   const PacketSizes sizes = kSizes[state.range(1)];
   KRAL_SetEfsReadAndWritePacketSize(station.handle(), sizes.read, sizes.write);
   const Bytes contents = Contents();
@@ -122,7 +107,7 @@ void Put(benchmark::State& state) {
 }
 
 void Get(benchmark::State& state) {
-  Station station(state.range(0));
+  Station station(state.range(0), state.range(2) != 0);
   const PacketSizes sizes = kSizes[state.range(1)];
   KRAL_SetEfsReadAndWritePacketSize(station.handle(), sizes.read, sizes.write);
   station.phone().efs().AddFile("/file", Contents());
@@ -142,7 +127,7 @@ void Get(benchmark::State& state) {
 }
 
 void InAllModes(benchmark::internal::Benchmark* transfer) {
-  transfer->ArgNames({"mode", "largest"})->ArgsProduct({{0, 1}, {0, 1}})->Iterations(2)->UseRealTime();
+  transfer->ArgNames({"mode", "largest", "pty"})->ArgsProduct({{0, 1}, {0, 1}, {0, 1}})->Iterations(2)->UseRealTime();
 }
 BENCHMARK(Put)->Apply(InAllModes);
 BENCHMARK(Get)->Apply(InAllModes);
@@ -159,7 +144,7 @@ double ResidentKib() {
 }
 
 void ListTenThousand(benchmark::State& state) {
-  Station station(state.range(0));
+  Station station(state.range(0), false);
   for (uint32_t i = 0; i < kEntries; ++i) station.phone().efs().AddFile("/d/" + std::to_string(100000 + i), {});
   std::vector<Bytes> packets{Request(11).Terminated("/d").Take()};
   // The handset numbers its directory handles from 1.

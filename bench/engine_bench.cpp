@@ -1,5 +1,5 @@
-// What a request costs through the whole library, what an idle connection costs, and how many packets per second go
-// from a port into the queue.
+// What an idle connection costs, and how many packets per second go from a port into the queue. Requests are in
+// latency_bench.cpp.
 #include <benchmark/benchmark.h>
 
 #include <algorithm>
@@ -11,21 +11,20 @@
 #include <thread>
 #include <vector>
 
+#include "bench/support/station.h"
 #include "frame/diag_ftm.h"
 #include "frame/resource_manager.h"
 #include "handset/caller_transport.h"
 #include "handset/line/frame_codec.h"
-#include "handset/pty_cable.h"
 #include "handset/virtual_handset.h"
 #include "kral/connection.h"
 #include "kral/transport.h"
-#include "platform/environment.h"
 
 namespace {
 
 using namespace kral;
+using bench::Station;
 using handset::CallerTransport;
-using handset::PtyCable;
 using handset::VirtualHandset;
 using std::chrono::steady_clock;
 
@@ -36,78 +35,6 @@ KRAL_HANDLE ConnectInProcess(uint32_t port, CallerTransport& transport) {
                                                  &CallerTransport::Send, &CallerTransport::Receive,
                                                  &CallerTransport::Flush);
 }
-
-// A handset and a connection to it, in process or over a pseudo terminal.
-class Station {
- public:
-  Station(int port, bool over_pty) : variable_("KRAL_COM" + std::to_string(port)) {
-    phone_.KeepTrace(false);
-    if (over_pty) {
-      std::string error;
-      cable_ = PtyCable::Attach(phone_, "", error);
-      if (!cable_) return;
-      SetEnvironmentValue(variable_.c_str(), cable_->device_path());
-      handle_ = KRAL_ConnectServer(static_cast<uint32_t>(port));
-    } else {
-      handle_ = ConnectInProcess(static_cast<uint32_t>(port), transport_);
-    }
-  }
-  ~Station() {
-    KRAL_DisconnectServer(handle_);
-    SetEnvironmentValue(variable_.c_str(), std::nullopt);
-  }
-  Station(const Station&) = delete;
-  Station& operator=(const Station&) = delete;
-
-  KRAL_HANDLE handle() const { return handle_; }
-
- private:
-  const std::string variable_;
-  VirtualHandset phone_;
-  CallerTransport transport_{phone_};
-  std::unique_ptr<PtyCable> cable_;
-  KRAL_HANDLE handle_ = 0;
-};
-
-double MicrosecondsSince(steady_clock::time_point start) {
-  return std::chrono::duration<double, std::micro>(steady_clock::now() - start).count();
-}
-
-double Percentile(const std::vector<double>& sorted, double part) {
-  return sorted[static_cast<size_t>(part * static_cast<double>(sorted.size() - 1))];
-}
-
-// --- Round trips ----------------------------------------------------------------------------------------------------
-
-void RoundTrip(benchmark::State& state, bool over_pty, uint8_t receive_mode) {
-  KRAL_SetDefaultReceiveMode(receive_mode);
-  Station station(kFirstPort, over_pty);
-  const uint8_t request = 0;
-  std::vector<uint8_t> response(256);
-  std::vector<double> times;
-  for (auto _ : state) {
-    uint16_t size = 256;
-    const auto start = steady_clock::now();
-    if (KRAL_SendSync(station.handle(), 1, &request, &size, response.data(), 1000) == 0) {
-      state.SkipWithError("no answer");
-      return;
-    }
-    times.push_back(MicrosecondsSince(start));
-  }
-  std::ranges::sort(times);
-  state.counters["p50_us"] = Percentile(times, 0.5);
-  state.counters["p99_us"] = Percentile(times, 0.99);
-  state.SetItemsProcessed(state.iterations());
-}
-
-void RoundTripInProcess(benchmark::State& state) {
-  RoundTrip(state, false, static_cast<uint8_t>(state.range(0)));
-}
-void RoundTripOverPty(benchmark::State& state) {
-  RoundTrip(state, true, static_cast<uint8_t>(state.range(0)));
-}
-BENCHMARK(RoundTripInProcess)->ArgName("mode")->Arg(0)->Arg(1)->UseRealTime();
-BENCHMARK(RoundTripOverPty)->ArgName("mode")->Arg(0)->Arg(1)->UseRealTime();
 
 // --- Idle connections -----------------------------------------------------------------------------------------------
 
@@ -154,9 +81,11 @@ BENCHMARK(IdleMemory)->ArgName("connections")->Arg(1)->Arg(50)->Iterations(1);
 
 // Processor time of the whole process, the handsets' side of the cables included.
 void IdleProcessorOverPty(benchmark::State& state) {
-  KRAL_SetDefaultReceiveMode(static_cast<uint8_t>(state.range(0)));
   std::vector<std::unique_ptr<Station>> stations;
-  for (int i = 0; i < 50; ++i) stations.push_back(std::make_unique<Station>(kFirstPort + i, true));
+  for (int i = 0; i < 50; ++i) {
+    stations.push_back(
+        std::make_unique<Station>(kFirstPort + i, bench::Cable::kPty, static_cast<uint8_t>(state.range(0))));
+  }
   for (const auto& station : stations) {
     if (KRAL_IsPhoneConnected(station->handle()) == 0) {
       state.SkipWithError("no answer");
@@ -168,7 +97,8 @@ void IdleProcessorOverPty(benchmark::State& state) {
     const auto start = steady_clock::now();
     std::this_thread::sleep_for(std::chrono::seconds(3));
     const double used = static_cast<double>(std::clock() - processor) * 1e6 / CLOCKS_PER_SEC;
-    state.counters["percent_of_a_core"] = 100 * used / MicrosecondsSince(start);
+    const double passed = std::chrono::duration<double, std::micro>(steady_clock::now() - start).count();
+    state.counters["percent_of_a_core"] = 100 * used / passed;
   }
 }
 BENCHMARK(IdleProcessorOverPty)->ArgName("mode")->Arg(0)->Arg(1)->Iterations(1)->UseRealTime();

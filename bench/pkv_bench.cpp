@@ -6,24 +6,20 @@
 #include <filesystem>
 #include <string>
 
-#include "handset/caller_transport.h"
-#include "handset/virtual_handset.h"
-#include "kral/connection.h"
+#include "bench/support/station.h"
 #include "kral/nv.h"
 #include "kral/pkv.h"
-#include "kral/transport.h"
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/temp_folder.h"
 
 namespace {
 
 using namespace kral;
-using handset::CallerTransport;
 using std::chrono::steady_clock;
 
 constexpr uint16_t kItems = 3000;
 constexpr uint16_t kPerPacket = 9;
-constexpr uint32_t kPort = 210;
+constexpr int kPort = 210;
 constexpr size_t kRecord = 128;
 
 double SecondsSince(steady_clock::time_point start) {
@@ -31,25 +27,17 @@ double SecondsSince(steady_clock::time_point start) {
 }
 
 // A handset with a value in every item.
-class Station {
+class Station : public bench::Station {
  public:
-  explicit Station(uint8_t receive_mode) {
-    phone_.KeepTrace(false);
+  Station(uint8_t receive_mode, bool over_pty)
+      : bench::Station(kPort, over_pty ? bench::Cable::kPty : bench::Cable::kPolled, receive_mode) {
     for (uint16_t id = 1; id < kItems; ++id) {
-      phone_.nv().Set(id, handset::Bytes{static_cast<uint8_t>(id), static_cast<uint8_t>(id >> 8), 1});
+      phone().nv().Set(id, handset::Bytes{static_cast<uint8_t>(id), static_cast<uint8_t>(id >> 8), 1});
     }
-    KRAL_SetDefaultReceiveMode(receive_mode);
-    handle_ = KRAL_ConnectServer_UserDefinedTransport(kPort, transport_.handle_value(), transport_.context(),
-                                                      &CallerTransport::Send, &CallerTransport::Receive,
-                                                      &CallerTransport::Flush);
-    KRAL_PKV_ConfigureBackup(handle_, 0, kItems - 1, 1);
+    KRAL_PKV_ConfigureBackup(handle(), 0, kItems - 1, 1);
   }
-  ~Station() { KRAL_DisconnectServer(handle_); }
-  Station(const Station&) = delete;
-  Station& operator=(const Station&) = delete;
 
-  KRAL_HANDLE handle() const { return handle_; }
-  uint64_t requests() const { return phone_.request_count(); }
+  uint64_t requests() { return phone().request_count(); }
 
   // What the same requests take one by one, through the functions for single ones.
   double SecondsOfReads(int count) const {
@@ -57,7 +45,7 @@ class Station {
     const auto start = steady_clock::now();
     for (int i = 0; i < count; ++i) {
       uint16_t status = 0;
-      KRAL_DIAG_NV_READ_F(handle_, static_cast<uint16_t>(1 + i % kPerPacket), data.data(), kRecord, &status);
+      KRAL_DIAG_NV_READ_F(handle(), static_cast<uint16_t>(1 + i % kPerPacket), data.data(), kRecord, &status);
     }
     return SecondsSince(start);
   }
@@ -65,20 +53,15 @@ class Station {
     const std::array<uint8_t, kRecord> data{1};
     const auto start = steady_clock::now();
     for (int i = 0; i < count; ++i) {
-      KRAL_DIAG_NV_WRITE_SetBatchMode(handle_, 1);
+      KRAL_DIAG_NV_WRITE_SetBatchMode(handle(), 1);
       for (uint16_t id = 1; id <= kPerPacket; ++id) {
         uint16_t status = 0;
-        KRAL_DIAG_NV_WRITE_F(handle_, 40000u + id, data.data(), kRecord, &status);
+        KRAL_DIAG_NV_WRITE_F(handle(), 40000u + id, data.data(), kRecord, &status);
       }
-      KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle_, nullptr, nullptr, nullptr);
+      KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle(), nullptr, nullptr, nullptr);
     }
     return SecondsSince(start);
   }
-
- private:
-  handset::VirtualHandset phone_;
-  CallerTransport transport_{phone_};
-  KRAL_HANDLE handle_ = 0;
 };
 
 using Job = uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* file, uint32_t* status);
@@ -87,7 +70,7 @@ using Job = uint8_t(KRAL_CALL*)(KRAL_HANDLE handle, const char* file, uint32_t* 
 void Run(benchmark::State& state, Job job, bool batches) {
   const test::TempFolder folder;
   const std::string path = folder.Path("phone.pkv");
-  Station station(static_cast<uint8_t>(state.range(0)));
+  Station station(static_cast<uint8_t>(state.range(0)), state.range(1) != 0);
   uint32_t status = 0;
   if (KRAL_BackupNVFromMobileToPKV(station.handle(), path.c_str(), &status) == 0) state.SkipWithError("no backup");
   const int packets = batches ? (kItems + kPerPacket - 1) / kPerPacket : 0;
@@ -116,8 +99,11 @@ void BackupOf3000(benchmark::State& state) {
 void RestoreOf3000(benchmark::State& state) {
   Run(state, KRAL_RestoreNVFromPKV, true);
 }
-BENCHMARK(BackupOf3000)->ArgName("mode")->Arg(0)->Arg(1)->UseManualTime()->Unit(benchmark::kMillisecond);
-BENCHMARK(RestoreOf3000)->ArgName("mode")->Arg(0)->Arg(1)->UseManualTime()->Unit(benchmark::kMillisecond);
+void InAllModes(benchmark::internal::Benchmark* job) {
+  job->ArgNames({"mode", "pty"})->ArgsProduct({{0, 1}, {0, 1}})->UseManualTime()->Unit(benchmark::kMillisecond);
+}
+BENCHMARK(BackupOf3000)->Apply(InAllModes);
+BENCHMARK(RestoreOf3000)->Apply(InAllModes);
 
 // --- Files ----------------------------------------------------------------------------------------------------------
 

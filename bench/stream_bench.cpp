@@ -17,10 +17,9 @@
 #include <thread>
 #include <vector>
 
+#include "bench/support/station.h"
 #include "handset/line/frame_codec.h"
-#include "kral/connection.h"
 #include "kral/download.h"
-#include "kral/transport.h"
 
 namespace {
 
@@ -29,6 +28,7 @@ using Clock = std::chrono::steady_clock;
 using Seconds = std::chrono::duration<double>;
 
 constexpr uint32_t kPort = 300;
+constexpr int kPtyPort = 241;
 constexpr double kBytesPerSecond = 40e6;
 constexpr Seconds kLatency{0.002};
 constexpr Seconds kPolls{0.002};       // one millisecond each of the receive thread and of the response thread
@@ -170,6 +170,42 @@ BENCHMARK(StreamImage)
     ->Args({32, 64})
     ->Args({4, 64})
     ->Iterations(1)
+    ->UseRealTime()
+    ->Unit(benchmark::kMillisecond);
+
+// --- Over a terminal ------------------------------------------------------------------------------------------------
+
+// To the virtual handset's own programmer, in blocks as it announces them.
+void StreamImageOverPty(benchmark::State& state) {
+  bench::Station station(kPtyPort, bench::Cable::kPty, static_cast<uint8_t>(state.range(0)));
+  handset::ProgrammerSettings settings;
+  settings.block_size = static_cast<uint32_t>(state.range(1));
+  settings.window = 16;
+  station.phone().programmer().Set(settings);
+  station.phone().EnterMode(station.phone().programmer_mode());
+  uint32_t block_size = 0;
+  uint16_t window = 0;
+  if (KRAL_STREAM_HELLO(station.handle(), KRAL_STREAM_HELLO_VARIANT, &block_size, &window) == 0) {
+    return state.SkipWithError("no programmer");
+  }
+  std::vector<uint8_t> image(size_t{4} << 20);
+  std::mt19937_64 random(3);
+  for (uint8_t& byte : image) byte = static_cast<uint8_t>(random());
+  const auto size = static_cast<uint32_t>(image.size());
+  for (auto _ : state) {
+    uint32_t result = 0;
+    if (KRAL_STREAM_WriteImageMem(station.handle(), image.data(), size, 0, 7, nullptr, 0, KRAL_STREAM_MULTI_IMAGE,
+                                  block_size, window, &result) == 0) {
+      return state.SkipWithError("the image did not arrive");
+    }
+  }
+  state.SetBytesProcessed(static_cast<int64_t>(state.iterations()) * size);
+}
+BENCHMARK(StreamImageOverPty)
+    ->ArgNames({"mode", "block"})
+    ->ArgsProduct({{0, 1}, {1024, 8188}})
+    ->Iterations(2)
+    ->MeasureProcessCPUTime()
     ->UseRealTime()
     ->Unit(benchmark::kMillisecond);
 
