@@ -144,12 +144,12 @@ struct CallersTransport : testing::Test {
     return static_cast<bool>(engine->transport.SendSync(Bytes{5}, response, 5, time_out_ms, 0));
   }
   // Calls of the receive function in a millisecond without traffic.
-  double IdleReads() {
-    const uint64_t before = wire.reads();
+  static double IdleReads(const std::function<uint64_t()>& reads) {
+    const uint64_t before = reads();
     const auto start = std::chrono::steady_clock::now();
     std::this_thread::sleep_for(milliseconds(30));
     const std::chrono::duration<double, std::milli> passed = std::chrono::steady_clock::now() - start;
-    return static_cast<double>(wire.reads() - before) / passed.count();
+    return static_cast<double>(reads() - before) / passed.count();
   }
 
   TestWire wire;
@@ -160,8 +160,7 @@ TEST_F(CallersTransport, IsAskedWhenItTellsAndOtherwiseNotAtAll) {
   ASSERT_TRUE(engine->OpenUser(wire.AsUserTransport()));
   EXPECT_TRUE(Eventually([this] { return wire.reads() > 5; })) << "again and again until it tells for the first time";
   EXPECT_TRUE(engine->transport.NotifyReceived());
-  std::this_thread::sleep_for(milliseconds(20));
-  EXPECT_EQ(IdleReads(), 0);
+  EXPECT_TRUE(Eventually([this] { return IdleReads([this] { return wire.reads(); }) == 0; }));
   wire.ToHost(PlainFrame({1, 2}));
   EXPECT_TRUE(engine->transport.NotifyReceived());
   EXPECT_TRUE(Eventually([this] { return engine->responses.size() == 1; }));
@@ -203,9 +202,8 @@ TEST_F(CallersTransport, TellsNothingFromInsideItsReceiveFunction) {
   const auto send = [](uintptr_t, uintptr_t, uint32_t, const uint8_t*, uint32_t*) -> uint32_t { return 0; };
   const auto flush = [](uintptr_t, uintptr_t) -> uint32_t { return 0; };
   ASSERT_TRUE(engine->OpenUser({0, reinterpret_cast<uintptr_t>(&self), send, receive, flush}));
-  ASSERT_TRUE(Eventually([&] { return self.reads > 0; }));
-  std::this_thread::sleep_for(milliseconds(20));
-  EXPECT_LE(self.reads, 2u);
+  ASSERT_TRUE(Eventually([&] { return self.reads > 5; })) << "it is asked as if it had told nothing";
+  EXPECT_LE(IdleReads([&] { return self.reads.load(); }), 3) << "and no more often";
   EXPECT_TRUE(engine->transport.StopThread());
 }
 
@@ -215,9 +213,9 @@ TEST_F(CallersTransport, ThatWaitsItselfIsAskedAgainAtOnce) {
   ASSERT_TRUE(engine->OpenUser(wire.AsUserTransport()));
   engine->transport.SetCallersWait(100);
   ASSERT_TRUE(wire.WaitUntilHeld());
-  EXPECT_EQ(IdleReads(), 0);
+  EXPECT_EQ(IdleReads([this] { return wire.reads(); }), 0);
   wire.HoldReceive(false);
-  EXPECT_LE(IdleReads(), 3) << "one that does not wait does not keep a processor busy";
+  EXPECT_LE(IdleReads([this] { return wire.reads(); }), 3) << "one that does not wait does not keep a processor busy";
   EXPECT_TRUE(Asks());
 }
 

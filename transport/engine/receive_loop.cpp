@@ -96,10 +96,11 @@ void ReceiveLoop::ForgetCaller() {
 }
 
 void ReceiveLoop::NotifyReceived() {
-  caller_notifies_ = true;
   // In the receive function itself it tells nothing: what brings bytes is asked again anyway, and what brings none and
   // tells of some would be asked for ever.
-  if (std::this_thread::get_id() != thread_.load()) control_.Notify();
+  if (std::this_thread::get_id() == thread_.load()) return;
+  caller_notifies_ = true;
+  control_.Notify();
 }
 
 bool ReceiveLoop::ReadChunk() {
