@@ -1,7 +1,11 @@
 // Whole images into the flash of the virtual handset, through every kind of trouble with the acknowledgements. What
 // always holds: flash equals the image, or the call has failed.
+#include <cstring>
+
+#include "download/images/phone_image_raw.h"
 #include "download/stream/download_agent.h"
 #include "download/stream/image_write_cmd.h"
+#include "download/stream/write_image.h"
 #include "tests/support/download_fixture.h"
 #include "tests/support/failures.h"
 #include "tests/support/hex_files.h"
@@ -63,6 +67,33 @@ TEST_F(StreamWrite, LargestBlocksFitTheirFramesWhateverTheBytes) {
   bytes.insert(bytes.end(), random.begin(), random.end());
   bytes.resize(120000, 0);
   ASSERT_EQ(WriteMem(bytes), KRAL_STREAM_WRITTEN) << ErrorText();
+  ExpectInFlash(bytes);
+}
+
+// What frames take of blocks that are full of escapes is less than was read for them.
+TEST_F(StreamWrite, EachByteOfAnImageIsReadOnce) {
+  class Counting final : public images::PhoneImageRaw {
+   public:
+    void Read(uint32_t address, void* buffer, uint32_t count, uint32_t) const override {
+      std::memcpy(buffer, buffer_ + address, count);
+      read += count;
+    }
+    mutable uint64_t read = 0;
+  };
+  ProgrammerSettings settings;
+  settings.block_size = 16376;
+  StartProgrammer(settings);
+  std::vector<uint8_t> bytes(100000, 0x7E);
+  const auto random = RandomBytes(100000);
+  bytes.insert(bytes.end(), random.begin(), random.end());
+  Counting image;
+  ASSERT_TRUE(image.SetData(bytes.data(), static_cast<uint32_t>(bytes.size())));
+  const auto phone = Kral_ResourceManager::GetPhone(handle());
+  download::DownloadConnection connection(*phone);
+  const stream::WriteLimits limits{block_size_, window_};
+  EXPECT_EQ(stream::CWriteNORImageFramed(connection).Write(image, 0, nullptr, limits), stream::WriteOutcome::kDone)
+      << LogText();
+  EXPECT_EQ(image.read, image.GetSize(0));
   ExpectInFlash(bytes);
 }
 
