@@ -153,6 +153,7 @@ struct CallersTransport : testing::Test {
   }
 
   TestWire wire;
+  TestWire other;
   EngineGuard engine{EngineBundle::Make({}, SystemClock(), 0)};
 };
 
@@ -168,7 +169,6 @@ TEST_F(CallersTransport, IsAskedWhenItTellsAndOtherwiseNotAtAll) {
   Bytes room(8);
   EXPECT_TRUE(engine->transport.SendRaw(Bytes{5}, room, 60000));
 
-  TestWire other;
   ASSERT_TRUE(engine->OpenUser(other.AsUserTransport()));
   EXPECT_TRUE(Eventually([&] { return other.reads() > 5; })) << "another one has told nothing yet";
 }
