@@ -7,6 +7,7 @@
 #include "base/failure.h"
 #include "base/guarded_call.h"
 #include "base/wire_codes.h"
+#include "frame/request_failure.h"
 
 namespace kral::download {
 namespace {
@@ -41,6 +42,11 @@ Reply DownloadConnection::AwaitReply(uint8_t expected_code, uint32_t time_out_ms
 
 Reply DownloadConnection::WriteHDLCNoRead(std::span<const uint8_t> request, uint32_t time_out_ms) {
   if (phone_.server_mode()) return ServerHasNoFramer();
+  // Not opened afresh: what comes back on the port knows nothing of what was written before.
+  if (!phone_.transport().connected()) {
+    Fail(RequestFailure(phone_, ReplyKind::kGone, request, time_out_ms));
+    return ReplyKind::kGone;
+  }
   return phone_.SendASync(request, time_out_ms, true);
 }
 

@@ -5,6 +5,7 @@
 #include "frame/diag_ftm.h"
 #include "handset/loaders/software_image.h"
 #include "kral/kral.h"
+#include "tests/support/engine_bundle.h"
 #include "tests/support/failures.h"
 #include "tests/support/handset_ports.h"
 #include "tests/support/hex_files.h"
@@ -63,6 +64,15 @@ class FlashAll : public testing::Test {
     auto& self = *reinterpret_cast<FlashAll*>(value);
     self.figures_.emplace_back(done, total);
     if (done >= self.abort_at_) KRAL_AbortDownload(handle);
+    if (done >= self.replug_at_) self.Replug();
+  }
+
+  // So quickly that nobody but the thread that waits for bytes has noticed.
+  void Replug() {
+    replug_at_ = UINT32_MAX;
+    handset_.HangUp();
+    EXPECT_TRUE(test::Eventually([&] { return !phone_->transport().connected(); }));
+    handset_.PlugIn();
   }
 
   static std::string Text(const Bytes& bytes) { return {bytes.begin(), bytes.end()}; }
@@ -80,6 +90,7 @@ class FlashAll : public testing::Test {
   uint32_t result_ = 77;
   uint32_t failed_image_ = 77;
   uint32_t abort_at_ = UINT32_MAX;
+  uint32_t replug_at_ = UINT32_MAX;
   std::vector<std::pair<uint32_t, uint32_t>> figures_;
 };
 
@@ -158,6 +169,15 @@ TEST_F(FlashAll, TellsTheStepThatFailedAndLeavesThePortUsable) {
   EXPECT_EQ(Flash({image_.c_str()}), 0);
   EXPECT_EQ(result_, KRAL_FLASH_PROGRAMMER_FAILED);
   EXPECT_TRUE(ports_.open().empty());
+}
+
+TEST_F(FlashAll, DoesNotGoOnWithWhatCameBackOnThePort) {
+  const std::string large = folder_.Add("large", std::string(300000, 'x'));
+  StartInBootLoader();
+  replug_at_ = 20000;
+  phone_->state<download::Settings>().acknowledge_limit_ms = 500;
+  test::ExpectFailures(handle_, {{"KRAL_Kivrat_FlashAll LOST", "command 7", [&] { return Flash({large.c_str()}); }}});
+  EXPECT_EQ(failed_image_, 0u);
 }
 
 TEST_F(FlashAll, CanBeAbortedInEveryPart) {
