@@ -42,7 +42,7 @@ TEST(DownloadAgent, AcknowledgesNothingAfterAFailure) {
 TEST_F(StreamWrite, ImageIsInFlashAndTheWindowIsKept) {
   ProgrammerSettings settings;
   settings.window = 4;
-  settings.acknowledge_delay_ms = 5;
+  settings.acknowledge_delay_ms = 20;
   StartProgrammer(settings);
   const auto bytes = RandomBytes(30 * 1024 + 17);
   handset().flash().Fill(0x1000, {bytes.data(), 100});  // what was there before

@@ -184,7 +184,7 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   handset().efs().AddItemFile(kRfFile, RandomBytes(300));
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV, "good.pkv"), 0u);
   const pkv::PkvSet good = Read("good.pkv");
-  ShortenTimeOuts(60);
+  ShortenTimeOuts(120);
   for (const auto& row : kRows) {
     for (uint64_t packet : {2, 8, 14}) {
       SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
