@@ -13,8 +13,8 @@ namespace {
 // Of keys with the same upper half the one with the greatest lower half, and all in the order of those.
 void KeepLastOfEach(std::vector<uint64_t>& keys) {
   std::ranges::sort(keys, std::greater<>());
-  const auto again = std::ranges::unique(keys, [](uint64_t a, uint64_t b) { return a >> 32 == b >> 32; });
-  keys.erase(again.begin(), again.end());
+  const auto is_same = [](uint64_t a, uint64_t b) { return a >> 32 == b >> 32; };
+  keys.erase(std::unique(keys.begin(), keys.end(), is_same), keys.end());
   std::ranges::sort(keys, {}, [](uint64_t key) { return static_cast<uint32_t>(key); });
 }
 

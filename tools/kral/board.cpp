@@ -142,6 +142,7 @@ std::vector<std::string> Board::Lines(std::size_t width, std::size_t height) con
     std::ranges::sort(shown);
   }
   std::vector<std::string> lines;
+  lines.reserve(shown.size() + 1);
   for (const auto* row : shown) lines.push_back(LineOf(*row, width));
   if (!fits) {
     std::array<std::size_t, 4> counts{};

@@ -228,7 +228,8 @@ void ManyHandsets::RefuseSameFiles() const {
 }
 
 void ManyHandsets::WorkOn(std::size_t number, Board& board) {
-  auto& [command, verdict, ended] = *handsets_[number];
+  const auto& command = handsets_[number]->command;
+  auto& verdict = handsets_[number]->verdict;
   const auto begin = std::chrono::steady_clock::now();
   board.Begin(number, verdict);
   command->context.out.UseLane(board.LaneOf(number, verdict));
