@@ -48,7 +48,7 @@ std::string Cleaned(const std::string& line) {
 }
 
 std::string TakeWord(std::string& words) {
-  const auto word = words.substr(0, words.find(' '));
+  auto word = words.substr(0, words.find(' '));
   words.erase(0, word.size() + 1);
   return word;
 }
