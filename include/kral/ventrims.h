@@ -62,9 +62,9 @@ typedef struct KRAL_VENTRIMS_OPTIONS {
   uint32_t flags;      /**< KRAL_VENTRIMS_ENTER_LOADER, KRAL_VENTRIMS_RESET; 0 at first */
   uint32_t at_once;    /**< handsets that are worked on at the same time; 0, as at first: all */
   uint32_t retries;    /**< how often a handset may be lost, or fall silent, and is taken up again; 2 at first */
-  uint32_t return_ms;  /**< how long a lost port may take to return; 30,000 at first */
+  uint32_t return_ms;  /**< how long a lost port, and a hello after it, may take; 30,000 at first */
   uint32_t start_ms;   /**< how long a restarted handset may take to answer; 60,000 at first */
-  uint32_t command_ms; /**< time-out 0 of the handsets while the job runs; 0, as at first: as it is */
+  uint32_t command_ms; /**< time-out 0 while the job runs, and a hello's longest wait; 0, as at first: as they are */
   uint32_t block_size; /**< the most that a write to flash carries; 0, as at first: what the programmer announces */
 } KRAL_VENTRIMS_OPTIONS;
 
