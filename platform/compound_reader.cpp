@@ -9,35 +9,12 @@
 #include <vector>
 
 #include "platform/compound_file.h"
+#include "platform/compound_format.h"
 
 namespace kral {
 namespace {
 
-constexpr std::array<uint8_t, 8> kMagic = {0xD0, 0xCF, 0x11, 0xE0, 0xA1, 0xB1, 0x1A, 0xE1};
-constexpr size_t kHeaderSize = 512;
-constexpr size_t kSectorShift = 30;
-constexpr size_t kFirstDirectorySector = 48;
-constexpr size_t kFirstShortTableSector = 60;
-constexpr size_t kFirstListSector = 68;
-constexpr size_t kListInHeader = 76;  // sectors of the allocation table, up to the header's end
-constexpr unsigned kSmallSectors = 9;
-constexpr unsigned kLargeSectors = 12;  // such documents tell sizes in 64 bits, the others in 32
-constexpr size_t kShortSectorSize = 64;
-constexpr uint32_t kShortStreamBelow = 4096;
-constexpr uint32_t kLastSector = 0xFFFFFFFA;  // larger numbers are marks: end of chain, free ...
-
-constexpr size_t kEntrySize = 128;
-constexpr size_t kEntryNameSize = 64;  // in bytes, with the terminating zero
-constexpr size_t kEntryType = 66;
-constexpr size_t kEntryLeft = 68;
-constexpr size_t kEntryRight = 72;
-constexpr size_t kEntryChild = 76;
-constexpr size_t kEntryStart = 116;
-constexpr size_t kEntryStreamSize = 120;
-constexpr uint8_t kStorage = 1;
-constexpr uint8_t kStream = 2;
-constexpr uint8_t kRoot = 5;
-constexpr uint32_t kNoEntry = 0xFFFFFFFF;
+using namespace compound;
 
 using Bytes = std::span<const uint8_t>;
 

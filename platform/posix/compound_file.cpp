@@ -8,25 +8,17 @@
 #include <optional>
 #include <utility>
 
+#include "platform/compound_format.h"
+
 namespace kral {
 namespace {
 
-constexpr size_t kSectorSize = 512;
-constexpr size_t kShortSectorSize = 64;
-constexpr size_t kShortStreamBelow = 4096;
-constexpr size_t kEntrySize = 128;
-constexpr size_t kLongestName = 31;       // in units of UTF-16, without the terminating zero
-constexpr size_t kTablesInHeader = 109;   // the header lists the first sectors of the allocation table ...
-constexpr size_t kHeaderList = 76;        // ... up to its end
-constexpr size_t kNumbersInSector = 128;  // of an allocation table; a list's last one leads to the next list
+using namespace compound;
 
-constexpr uint32_t kListSector = 0xFFFFFFFC;
-constexpr uint32_t kTableSector = 0xFFFFFFFD;
-constexpr uint32_t kEndOfChain = 0xFFFFFFFE;
-constexpr uint32_t kFree = 0xFFFFFFFF;
-constexpr uint32_t kNoEntry = 0xFFFFFFFF;
-
-enum class Kind : uint8_t { kStorage = 1, kStream = 2, kRoot = 5 };
+constexpr size_t kSectorSize = size_t{1} << kSmallSectors;
+constexpr size_t kLongestName = kEntryNameSize / 2 - 1;  // in units of UTF-16, without the terminating zero
+// Numbers in a sector of an allocation table; a list's last one leads to the next list.
+constexpr size_t kNumbersInSector = kSectorSize / sizeof(uint32_t);
 
 // Nothing for what is no UTF-8, and for names that an entry has no room for.
 std::optional<std::u16string> NameUnits(std::string_view name) {
@@ -65,7 +57,7 @@ bool ComesBefore(const std::u16string& a, const std::u16string& b) {
 
 struct Entry {
   std::u16string name = {};
-  Kind kind = Kind::kStorage;
+  EntryType type = kStorage;
   const CompoundStream* stream = nullptr;
   bool is_red = false;
   uint32_t left = kNoEntry;
@@ -82,7 +74,7 @@ size_t SectorsOf(size_t size, size_t sector = kSectorSize) {
 class Writer {
  public:
   std::string Write(const CompoundStorage& root, std::vector<uint8_t>& file) {
-    entries_.push_back({.name = u"Root Entry", .kind = Kind::kRoot});
+    entries_.push_back({.name = u"Root Entry", .type = kRoot});
     if (!CollectChildren(root, 0, 0)) return problem_;
     if (!Measure()) return problem_;
     bytes_.resize(kSectorSize * (1 + sectors_));
@@ -117,7 +109,7 @@ class Writer {
     for (const CompoundStream& stream : storage.streams) {
       if (stream.bytes.size() > kCompoundFileLimit) return Fail("too large");
       const auto size = static_cast<uint32_t>(stream.bytes.size());
-      if (!Add(stream.name, {.kind = Kind::kStream, .stream = &stream, .size = size}, siblings)) return false;
+      if (!Add(stream.name, {.type = kStream, .stream = &stream, .size = size}, siblings)) return false;
     }
     for (const CompoundStorage& child : storage.storages) {
       const auto number = static_cast<uint32_t>(entries_.size());
@@ -229,15 +221,15 @@ class Writer {
     for (size_t i = 0; i < entry.name.size(); ++i) Put(at + 2 * i, entry.name[i], 2);
     const bool is_used = !entry.name.empty();
     if (is_used) {
-      Put(at + 64, static_cast<uint32_t>(2 * entry.name.size() + 2), 2);
-      Put(at + 66, static_cast<uint32_t>(entry.kind), 1);
-      Put(at + 67, entry.is_red ? 0 : 1, 1);
-      Put(at + 116, entry.start);
-      Put(at + 120, entry.size);
+      Put(at + kEntryNameSize, static_cast<uint32_t>(2 * entry.name.size() + 2), 2);
+      Put(at + kEntryType, entry.type, 1);
+      Put(at + kEntryColour, entry.is_red ? 0 : 1, 1);
+      Put(at + kEntryStart, entry.start);
+      Put(at + kEntryStreamSize, entry.size);
     }
-    Put(at + 68, entry.left);
-    Put(at + 72, entry.right);
-    Put(at + 76, entry.child);
+    Put(at + kEntryLeft, entry.left);
+    Put(at + kEntryRight, entry.right);
+    Put(at + kEntryChild, entry.child);
   }
 
   void PlaceTables() {
@@ -261,21 +253,20 @@ class Writer {
   }
 
   void WriteHeader() {
-    constexpr std::array<uint8_t, 8> kMagic = {0xD0, 0xCF, 0x11, 0xE0, 0xA1, 0xB1, 0x1A, 0xE1};
     std::ranges::copy(kMagic, bytes_.begin());
     Put(24, 0x3E, 2);  // minor and major version
     Put(26, 3, 2);
     Put(28, 0xFFFE, 2);  // little-endian
-    Put(30, 9, 2);       // sectors of 2^9 bytes, short ones of 2^6
-    Put(32, 6, 2);
+    Put(kSectorShift, kSmallSectors, 2);
+    Put(32, 6, 2);  // short sectors of 2^6 bytes
     Put(44, static_cast<uint32_t>(table_sectors_));
-    Put(48, directory_start_);
+    Put(kFirstDirectorySector, directory_start_);
     Put(56, kShortStreamBelow);
-    Put(60, short_table_start_);
+    Put(kFirstShortTableSector, short_table_start_);
     Put(64, static_cast<uint32_t>(short_table_sectors_));
-    Put(68, list_sectors_ > 0 ? static_cast<uint32_t>(list_start_) : kEndOfChain);
+    Put(kFirstListSector, list_sectors_ > 0 ? static_cast<uint32_t>(list_start_) : kEndOfChain);
     Put(72, static_cast<uint32_t>(list_sectors_));
-    for (size_t i = 0; i < kTablesInHeader; ++i) Put(kHeaderList + i * sizeof(uint32_t), TableSector(i));
+    for (size_t i = 0; i < kTablesInHeader; ++i) Put(kListInHeader + i * sizeof(uint32_t), TableSector(i));
   }
 
   std::vector<Entry> entries_;  // the root first

@@ -13,15 +13,12 @@
 #include <utility>
 
 #include "platform/posix/file_descriptor.h"
+#include "platform/posix/last_error.h"
 
 namespace kral {
 namespace {
 
 constexpr int kNameAttempts = 64;
-
-std::error_code LastError() {
-  return {errno, std::generic_category()};
-}
 
 bool IsOrdinary(mode_t mode) {
   return S_ISREG(mode);

@@ -8,15 +8,9 @@
 #include <cerrno>
 #include <memory>
 
+#include "platform/posix/last_error.h"
+
 namespace kral {
-namespace {
-
-std::error_code LastError() {
-  return {errno, std::generic_category()};
-}
-
-}  // namespace
-
 LocalFile LookAt(const std::string& path) {
   struct stat status {};
   if (::stat(path.c_str(), &status) != 0) return {};
