@@ -46,3 +46,15 @@ if(WIN32)
 else()
   set(KRAL_PLATFORM posix)
 endif()
+
+# kral_unite(<target>): with CMAKE_UNITY_BUILD the files of a folder are compiled as one, which halves the time of a whole
+# build. So what a folder's files keep to themselves needs different names.
+function(kral_unite target)
+  get_target_property(sources ${target} SOURCES)
+  set_target_properties(${target} PROPERTIES UNITY_BUILD_MODE GROUP)
+  foreach(source IN LISTS sources)
+    cmake_path(GET source PARENT_PATH folder)
+    string(MAKE_C_IDENTIFIER "${folder}" folder)
+    set_source_files_properties(${source} PROPERTIES UNITY_GROUP ${folder})
+  endforeach()
+endfunction()

@@ -10,8 +10,6 @@
 namespace kral::images {
 namespace {
 
-constexpr int kErased = 0xFF;
-
 // Calls piece(offset, position, length) for each part of a copy that lies within one stretch.
 template <class Piece>
 void ForEachPiece(uint32_t offset, uint32_t count, Piece&& piece) {

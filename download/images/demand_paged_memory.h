@@ -10,6 +10,9 @@
 
 namespace kral::images {
 
+// What erased flash reads as.
+inline constexpr uint8_t kErased = 0xFF;
+
 // The callers check offset + count against reserved().
 class CDemandPagedMemory {
  public:

@@ -10,7 +10,7 @@
 namespace kral::images {
 namespace {
 
-constexpr uint32_t kPiece = 64 * 1024;
+constexpr uint32_t kWrittenPiece = 64 * 1024;
 // Offsets in a HEX file count from the base, of which the file has the upper half only.
 constexpr uint32_t kBaseUnit = 0x10000;
 
@@ -20,7 +20,7 @@ class AtomicTextSink final : public TextSink {
   bool Open(const std::string& path) { return Good(file_.Open(path)); }
   bool Write(std::string_view text) override {
     pending_ += text;
-    return pending_.size() < kPiece || Flush();
+    return pending_.size() < kWrittenPiece || Flush();
   }
   bool Commit() { return Flush() && Good(file_.Commit()); }
   const std::error_code& error() const { return error_; }
@@ -92,9 +92,9 @@ uint32_t HexToBinary(const std::string& input, const std::string& output, uint32
   if (const auto error = file.Open(output)) return NotWritten(output, error);
   const uint32_t size = hex.image().GetSize(0);
   const uint32_t first = hex.image().GetBaseAddress(0);
-  std::vector<uint8_t> piece(kPiece);
+  std::vector<uint8_t> piece(kWrittenPiece);
   for (uint32_t done = 0; done < size;) {
-    const uint32_t count = std::min(kPiece, size - done);
+    const uint32_t count = std::min(kWrittenPiece, size - done);
     hex.image().Read(first + done, piece.data(), count, 0);
     if (const auto error = file.Write(std::span(piece).first(count))) return NotWritten(output, error);
     done += count;

@@ -15,8 +15,7 @@ namespace {
 
 // Address space only, which a 32-bit process has to spare; what is not written takes no memory.
 constexpr uint32_t kMaximumKib = 128 * 1024;
-constexpr uint32_t kPiece = 64 * 1024;
-constexpr uint8_t kErased = 0xFF;
+constexpr uint32_t kCountedPiece = 64 * 1024;
 
 uint32_t FormatByContent(const std::string& path) {
   TextFile file;
@@ -26,12 +25,12 @@ uint32_t FormatByContent(const std::string& path) {
 }
 
 uint32_t CountPayload(const PhoneImage& image, uint32_t region) {
-  std::vector<uint8_t> piece(kPiece);
+  std::vector<uint8_t> piece(kCountedPiece);
   const uint32_t base = image.GetBaseAddress(region);
   const uint32_t size = image.GetSize(region);
   uint32_t payload = 0;
   for (uint32_t done = 0; done < size;) {
-    const uint32_t count = std::min(kPiece, size - done);
+    const uint32_t count = std::min(kCountedPiece, size - done);
     image.Read(base + done, piece.data(), count, region);
     const auto read = std::span(piece).first(count);
     payload += count - static_cast<uint32_t>(std::ranges::count(read, kErased));

@@ -7,7 +7,7 @@ namespace {
 constexpr uint8_t kAcknowledged = 0x02;
 constexpr uint8_t kRefused = 0x03;
 constexpr uint8_t kSoftwareVersion = 0x21;
-constexpr size_t kWriteHeaderSize = 7;
+constexpr size_t kKovaHeaderSize = 7;
 constexpr size_t kMostData = 4089;
 
 uint32_t GetBe(ByteView bytes, size_t offset, size_t size) {
@@ -59,8 +59,8 @@ bool KovaLoader::OnPacket(ByteView packet, Wire& wire) {
 }
 
 bool KovaLoader::Load(ByteView packet) {
-  if (packet.size() < kWriteHeaderSize) return false;
-  const ByteView data = packet.subspan(kWriteHeaderSize);
+  if (packet.size() < kKovaHeaderSize) return false;
+  const ByteView data = packet.subspan(kKovaHeaderSize);
   if (data.empty() || data.size() > kMostData || data.size() != GetBe(packet, 5, 2)) return false;
   const uint32_t address = GetBe(packet, 1, 4);
   if (!first_address_) first_address_ = address;

@@ -13,7 +13,6 @@ constexpr uint32_t kAccessMode = 3;  // of the open flags: 0 read, 1 write, 2 bo
 constexpr uint32_t kCreate = 0x40;
 constexpr uint32_t kTruncate = 0x200;
 constexpr uint32_t kOwnerReads = 0400;
-constexpr uint32_t kOwnerWrites = 0200;
 constexpr size_t kItemSize = 1024;
 
 template <class Map>

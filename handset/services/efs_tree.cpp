@@ -7,7 +7,6 @@
 namespace kral::handset {
 namespace {
 
-constexpr uint32_t kOwnerWrites = 0200;
 constexpr int kMostLinks = 8;  // followed on the way to one node
 
 uint64_t BlocksOf(uint64_t size) {

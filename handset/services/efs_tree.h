@@ -35,6 +35,9 @@ enum class EfsError : uint32_t {
 // The high bits of a mode.
 enum class EfsKind : uint32_t { kDirectory = 0x4000, kFile = 0x8000, kLink = 0xA000, kItemFile = 0xE000 };
 
+// Of the permissions.
+inline constexpr uint32_t kOwnerWrites = 0200;
+
 class EfsNode {
  public:
   EfsNode(EfsKind node_kind, uint32_t node_permissions, std::shared_ptr<uint64_t> used_blocks);

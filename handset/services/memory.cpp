@@ -6,7 +6,7 @@ namespace {
 
 constexpr uint8_t kPeekBytes = 2;
 constexpr uint8_t kPokeBytes = 5;
-constexpr size_t kHeaderSize = 7;  // code, address, count
+constexpr size_t kMemoryHeaderSize = 7;  // code, address, count
 // What a reply can hold besides its header.
 constexpr size_t kMostBytes = 4000;
 constexpr uint8_t kStored = 0;
@@ -16,9 +16,9 @@ constexpr uint8_t kStored = 0;
 void Memory::Register(RequestTable& table) {
   for (uint8_t width = 0; width < 3; ++width) {
     const size_t element_size = size_t{1} << width;
-    table.On(static_cast<uint8_t>(kPeekBytes + width), Length::Exactly(kHeaderSize),
+    table.On(static_cast<uint8_t>(kPeekBytes + width), Length::Exactly(kMemoryHeaderSize),
              [this, element_size](ByteView request, Wire& wire) { Peek(request, element_size, wire); });
-    table.On(static_cast<uint8_t>(kPokeBytes + width), Length::AtLeast(kHeaderSize),
+    table.On(static_cast<uint8_t>(kPokeBytes + width), Length::AtLeast(kMemoryHeaderSize),
              [this, element_size](ByteView request, Wire& wire) { Poke(request, element_size, wire); });
   }
 }
@@ -52,10 +52,10 @@ void Memory::Peek(ByteView request, size_t element_size, Wire& wire) const {
 }
 
 void Memory::Poke(ByteView request, size_t element_size, Wire& wire) {
-  const ByteView data = request.subspan(kHeaderSize);
+  const ByteView data = request.subspan(kMemoryHeaderSize);
   if (data.size() != GetU16(request, 5) * element_size) return Refuse(Refusal::kBadLength, request, wire);
   Store(GetU32(request, 1), data);
-  wire.Send(ByteWriter().Raw(request.first(kHeaderSize)).U8(kStored).Take());
+  wire.Send(ByteWriter().Raw(request.first(kMemoryHeaderSize)).U8(kStored).Take());
 }
 
 }  // namespace kral::handset

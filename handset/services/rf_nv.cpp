@@ -9,8 +9,8 @@
 namespace kral::handset {
 namespace {
 
-constexpr uint16_t kRead = 0;
-constexpr uint16_t kWrite = 1;
+constexpr uint16_t kReadCommand = 0;
+constexpr uint16_t kWriteCommand = 1;
 
 Bytes Status(ByteView payload, NvStatus status) {
   return ByteWriter().U16(GetU16(payload, 0)).U16(static_cast<uint32_t>(status)).Take();
@@ -27,7 +27,7 @@ std::string RfNvPath(uint16_t item) {
 Bytes CarryOutRfNv(EfsService& efs, uint16_t command, ByteView payload) {
   const std::string path = RfNvPath(GetU16(payload, 0));
   switch (command) {
-    case kRead:
+    case kReadCommand:
       if (const auto data = efs.File(path)) {
         return ByteWriter()
             .Raw(Status(payload, NvStatus::kDone))
@@ -36,7 +36,7 @@ Bytes CarryOutRfNv(EfsService& efs, uint16_t command, ByteView payload) {
             .Take();
       }
       return Status(payload, NvStatus::kInactive);
-    case kWrite:
+    case kWriteCommand:
       if (payload.size() < 4 || payload.size() - 4 != GetU16(payload, 2)) return Status(payload, NvStatus::kFailed);
       efs.AddItemFile(path, payload.subspan(4));
       return Status(payload, NvStatus::kDone);

@@ -21,7 +21,7 @@ constexpr LteRow Tdd(uint16_t band, int32_t low, int32_t first) {
   return {band, low, first, low, first};
 }
 
-constexpr auto kRows = std::to_array<LteRow>({
+constexpr auto kLteRows = std::to_array<LteRow>({
     {900, 19200, 18000, 21100, 0},     // band 1
     {901, 18500, 18600, 19300, 600},   // 2
     {902, 17100, 19200, 18050, 1200},  // 3
@@ -64,13 +64,13 @@ constexpr auto kRows = std::to_array<LteRow>({
     Tdd(940, 24960, 39650),            // 41
 });
 
-static_assert(std::ranges::is_sorted(kRows, std::ranges::less_equal{}, &LteRow::band));
+static_assert(std::ranges::is_sorted(kLteRows, std::ranges::less_equal{}, &LteRow::band));
 
 }  // namespace
 
 std::optional<double> LteCarrier(uint16_t band, int32_t channel, LinkDirection direction) {
-  const auto* row = std::ranges::lower_bound(kRows, band, {}, &LteRow::band);
-  if (row == kRows.end() || row->band != band) return std::nullopt;
+  const auto* row = std::ranges::lower_bound(kLteRows, band, {}, &LteRow::band);
+  if (row == kLteRows.end() || row->band != band) return std::nullopt;
   const bool up = direction == LinkDirection::kUplink;
   const int64_t steps = int64_t{channel} - (up ? row->uplink_first : row->downlink_first);
   // One division of whole numbers: the double nearest to the decimal fraction, on every machine.

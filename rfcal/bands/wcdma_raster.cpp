@@ -15,7 +15,7 @@ struct WcdmaRow {
   int16_t downlink_offset;
 };
 
-constexpr auto kRows = std::to_array<WcdmaRow>({
+constexpr auto kWcdmaRows = std::to_array<WcdmaRow>({
     {100, 0, 0},        // I, duplex 190 MHz
     {101, 0, 0},        // II, 80
     {102, 1525, 1575},  // III, 95
@@ -30,13 +30,13 @@ constexpr auto kRows = std::to_array<WcdmaRow>({
     {118, 770, 735},    // XIX, 45
 });
 
-static_assert(std::ranges::is_sorted(kRows, std::ranges::less_equal{}, &WcdmaRow::band));
+static_assert(std::ranges::is_sorted(kWcdmaRows, std::ranges::less_equal{}, &WcdmaRow::band));
 
 }  // namespace
 
 std::optional<double> WcdmaCarrier(uint16_t band, int32_t channel, LinkDirection direction) {
-  const auto* row = std::ranges::lower_bound(kRows, band, {}, &WcdmaRow::band);
-  if (row == kRows.end() || row->band != band) return std::nullopt;
+  const auto* row = std::ranges::lower_bound(kWcdmaRows, band, {}, &WcdmaRow::band);
+  if (row == kWcdmaRows.end() || row->band != band) return std::nullopt;
   const int64_t offset = direction == LinkDirection::kUplink ? row->uplink_offset : row->downlink_offset;
   // One division of whole numbers: the double nearest to the decimal fraction, on every machine.
   return static_cast<double>(channel + 5 * offset) / 5.0;

@@ -10,14 +10,14 @@
 #include "storage/pkv/nv_storage.h"
 
 namespace kral::pkv {
-namespace {
-
 struct ItemPlace {
   uint32_t id;                      // as the names of the streams tell it
   std::span<const uint8_t> record;  // up to the end of its stream
   bool numbered;
   uint16_t subscription;
 };
+
+namespace {
 
 // In the order of subscriptions: the array in the order of its records, then the numbered items by id.
 void AppendArray(CompoundStorage& configuration, uint16_t subscription, std::vector<ItemPlace>& places) {

@@ -12,7 +12,6 @@
 namespace kral {
 namespace {
 
-using handset::Bytes;
 using handset::LogGenerator;
 using std::chrono::steady_clock;
 
@@ -23,7 +22,7 @@ KRAL_TRAFFIC_COUNTERS CountersOf(KRAL_HANDLE handle) {
 }
 
 // The next packet without its FCS; empty when none came.
-Bytes NextLog(KRAL_HANDLE handle, uint32_t time_out_ms = 0) {
+handset::Bytes NextLog(KRAL_HANDLE handle, uint32_t time_out_ms = 0) {
   std::array<uint8_t, KRAL_LONGEST_PACKET> buffer{};
   uint16_t size = 0;
   const uint8_t taken = time_out_ms == 0 ? KRAL_DIAG_GetNextPhoneLog(handle, &size, buffer.data())
@@ -75,10 +74,10 @@ TEST_F(Collection, WhatComesWhileItIsOffIsDroppedAndCounted) {
   std::array<uint8_t, KRAL_LONGEST_PACKET> buffer{};
   uint16_t size = 0;
   ASSERT_EQ(KRAL_DIAG_GetNextPhoneLog(handle(), &size, buffer.data()), 1);
-  const Bytes sent = LogGenerator::MakeLog(0x1001, 10, 20);
+  const handset::Bytes sent = LogGenerator::MakeLog(0x1001, 10, 20);
   const uint16_t check = handset::FrameCheck(sent);
   ASSERT_EQ(size, 22);
-  EXPECT_EQ(Bytes(buffer.begin(), buffer.begin() + 20), sent);
+  EXPECT_EQ(handset::Bytes(buffer.begin(), buffer.begin() + 20), sent);
   EXPECT_EQ(buffer[20] | buffer[21] << 8, check) << "the two FCS bytes of its frame";
   EXPECT_EQ(KRAL_DIAG_ClearPhoneLogQueue(handle()), 1);
   EXPECT_EQ(KRAL_DIAG_SetPhoneLoggingState(handle(), 2), 1) << "every other value: off";
@@ -187,7 +186,7 @@ TEST_F(Collection, CapturedTrafficPlaysBackAsItCame) {
   for (int i = 0; i < 5; ++i) generator.Advance(1000);
   const auto sent = generator.sent();
   ASSERT_GE(sent.packets(), 14900u);
-  std::vector<Bytes> live;
+  std::vector<handset::Bytes> live;
   while (live.size() < sent.packets()) {
     live.push_back(NextLog(handle(), 5000));
     ASSERT_FALSE(live.back().empty()) << live.size() << " of " << sent.packets() << ", dropped "
@@ -204,7 +203,7 @@ TEST_F(Collection, CapturedTrafficPlaysBackAsItCame) {
   // An analysis needs no handset: port 65534 has nothing behind it.
   const KRAL_HANDLE offline = KRAL_ConnectServer(65534);
   ASSERT_EQ(KRAL_StartPlayback(offline, file.c_str(), KRAL_PLAY_FOR_LOG_READER), 1);
-  std::vector<Bytes> played;
+  std::vector<handset::Bytes> played;
   while (played.size() < sent.packets()) {
     played.push_back(NextLog(offline, 5000));
     ASSERT_FALSE(played.back().empty()) << played.size();

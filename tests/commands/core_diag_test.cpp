@@ -68,7 +68,7 @@ const std::string kVersionTexts =
     "56 45 52 53 49 4F 4E 31 ";
 const std::string kVersionReply = "00 " + kVersionTexts + "2A 06 91 05 01 02 03 04";
 
-struct Row {
+struct CallRow {
   const char* name;
   Call call;
   std::string request;
@@ -78,7 +78,7 @@ struct Row {
   std::string entry = "";  // the line of flag 2; empty: the name with empty parentheses
 };
 
-const Row kRows[] = {
+const CallRow kCallRows[] = {
     {"KRAL_DIAG_VERNO_F", kReadVersion, "00", kVersionReply, kVersionTexts + "2A 06 91 05 01 02 03 04"},
     {"KRAL_DIAG_MEMORY_PEEK_F", Calling(KRAL_DIAG_MEMORY_PEEK_F, 0x11223344, 4, Room(4)), "02 44 33 22 11 04 00",
      "02 44 33 22 11 04 00 DE AD BE EF", "DE AD BE EF", "02 DE AD BE"},
@@ -122,7 +122,7 @@ class CoreDiag : public HandsetTest {
 };
 
 TEST_F(CoreDiag, EveryFunctionSendsItsRequestAndUnpacksTheReplyOrLeavesItsOutputs) {
-  for (const Row& row : kRows) {
+  for (const CallRow& row : kCallRows) {
     SCOPED_TRACE(row.name);
     ClearLog();
     handset().Expect(row.request).Reply(row.reply);
@@ -290,8 +290,8 @@ TEST_F(CoreDiag, ApplicationProcessorTargetHasNoSerialNumber) {
 
 // --- Rows that do not compile ---------------------------------------------------------------------------------------
 
-template <class Row, class... Fields>
-concept Sendable = requires(Diag_FTM& phone, const Row& row, Fields... fields) {
+template <class CallRow, class... Fields>
+concept Sendable = requires(Diag_FTM& phone, const CallRow& row, Fields... fields) {
   Send(phone, row, fields...);
 };
 

@@ -11,7 +11,6 @@
 namespace kral {
 namespace {
 
-using handset::Bytes;
 using handset::NvStatus;
 
 std::string Repeat(const char* byte, size_t count) {
@@ -253,8 +252,8 @@ TEST_F(Nv, SubscriptionsAndElementsAreKeptApart) {
 
 TEST_F(Nv, RfItemsNeedFactoryTestMode) {
   const auto phone = Kral_ResourceManager::GetPhone(handle());
-  const Bytes value{1, 2, 3};
-  Bytes read;
+  const handset::Bytes value{1, 2, 3};
+  handset::Bytes read;
   EXPECT_FALSE(nv::WriteRf(*phone, 20001, value, status_));
   handset().mode().SetState(handset::ModeState::kFactoryTest);
   handset().Expect("4B 0B 24 00 01 00 21 4E 03 00 01 02 03").Reply("4B 0B 24 00 01 00 21 4E 00 00");

@@ -16,13 +16,13 @@ using handset::Bytes;
 
 enum class Harm { kPasses, kFails, kEither };
 
-struct Row {
+struct FaultRow {
   const char* name;
   Fault fault;
   Harm harm;
 };
 
-const Row kRows[] = {
+const FaultRow kFaultRows[] = {
     {"split", handset::Split(3, 2), Harm::kPasses},
     {"delay", handset::Delay(4000), Harm::kPasses},
     {"late", handset::Delay(5100), Harm::kFails},
@@ -70,7 +70,7 @@ class KivratFaults : public testing::Test {
 TEST_F(KivratFaults, StrikeEveryPacket) {
   // Hello, ready, execute response, identity, hello; header, three pieces, end, done response.
   constexpr size_t kPackets = 11;
-  for (const Row& row : kRows) {
+  for (const FaultRow& row : kFaultRows) {
     for (size_t packet = 1; packet <= kPackets; ++packet) {
       SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
       handset_.faults().Add(row.fault, handset::When::Nth(packet));

@@ -16,7 +16,7 @@ std::string HexOf(std::string_view text) {
   return HexText(handset::Bytes(text.begin(), text.end())) + " ";
 }
 
-const std::string kHello = "01 " + HexOf("VRMO fast download protocol host") + "02 02 01";
+const std::string kHelloRequest = "01 " + HexOf("VRMO fast download protocol host") + "02 02 01";
 const std::string kTarget = "02 " + HexOf("VRMO fast download protocol targ");
 
 class StreamWire : public DownloadTest {
@@ -31,7 +31,7 @@ class StreamWire : public DownloadTest {
 
 TEST_F(StreamWire, HelloTellsTheLimitsAndEveryFrameBeginsWithAFlag) {
   ExpectNops();
-  handset().Expect(kHello).Reply(kTarget + "02 02 00 10 00 00 00 00 00 08 02 AA BB 20 00");
+  handset().Expect(kHelloRequest).Reply(kTarget + "02 02 00 10 00 00 00 00 00 08 02 AA BB 20 00");
   handset().ClearTrace();
   EXPECT_EQ(Hello(), 1) << LogText();
   EXPECT_EQ(block_size_, 0x1000u);
@@ -77,8 +77,8 @@ TEST(StreamHelloReply, IsCheckedToItsLastField) {
 
 TEST_F(StreamWire, HelloIsRepeatedAndThenGivenUp) {
   ExpectNops();
-  handset().Expect(kHello).Reply("02 00");
-  handset().Expect(kHello).Reply("13 01");
+  handset().Expect(kHelloRequest).Reply("02 00");
+  handset().Expect(kHelloRequest).Reply("13 01");
   EXPECT_EQ(Hello(), 0);
   EXPECT_TRUE(HasLine(KRAL_LOG_RET, "Sending HELLO to flash programmer, 2"));
   EXPECT_TRUE(HasLine(KRAL_LOG_ERR, "HELLO command failed, block size 0, window size 0"));

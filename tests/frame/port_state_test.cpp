@@ -15,7 +15,7 @@
 namespace kral {
 namespace {
 
-constexpr uint16_t kPort = 12;
+constexpr uint16_t kWatchedPort = 12;
 constexpr uint32_t kTooLong = 20000;  // of a wait that shall end long before
 
 int32_t StateOf(KRAL_HANDLE handle) {
@@ -29,7 +29,7 @@ class PortStates : public testing::Test {
   ~PortStates() override { KRAL_DisconnectAllServers(); }
 
   test::HandsetPorts ports_;
-  handset::VirtualHandset& handset_ = ports_.Add(kPort);
+  handset::VirtualHandset& handset_ = ports_.Add(kWatchedPort);
 };
 
 TEST_F(PortStates, EachReasonHasItsState) {
@@ -41,7 +41,7 @@ TEST_F(PortStates, EachReasonHasItsState) {
       result = {error, 1, "refused"};
       return std::unique_ptr<SerialDevice>();
     });
-    const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+    const KRAL_HANDLE handle = KRAL_ConnectServer(kWatchedPort);
     EXPECT_EQ(StateOf(handle), state);
     KRAL_DisconnectServer(handle);
   }
@@ -59,11 +59,11 @@ TEST_F(PortStates, FunctionsOfTheCallerAreOpenWhenTheyAreComplete) {
 
 TEST_F(PortStates, UnplugInIdleClosesThePortAndTheNextRequestOpensItAgain) {
   for (const uint8_t receive_mode : {0, 1}) {
-    const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+    const KRAL_HANDLE handle = KRAL_ConnectServer(kWatchedPort);
     KRAL_SetReceiveMode(handle, receive_mode);
     ASSERT_EQ(KRAL_IsPhoneConnected(handle), 1);
     handset_.HangUp();
-    EXPECT_TRUE(test::Eventually([this] { return !ports_.IsOpen(kPort); })) << "held until the next request";
+    EXPECT_TRUE(test::Eventually([this] { return !ports_.IsOpen(kWatchedPort); })) << "held until the next request";
     EXPECT_EQ(StateOf(handle), KRAL_PORT_GONE);
     EXPECT_EQ(KRAL_SetDTR_State(handle, 1), 0) << "it counts as closed";
     handset_.PlugIn();
@@ -95,7 +95,7 @@ TEST_F(PortStates, UnplugEndsEveryWaitAtOnce) {
     KRAL_EVENT event{};
     return KRAL_DIAG_WaitNextEvent(handle, &event, kTooLong);
   };
-  const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kWatchedPort);
   for (const auto request : {+send_sync, +send_raw}) {
     ASSERT_EQ(KRAL_IsPhoneConnected(handle), 1);
     handset_.faults().Add(handset::HangUp(), handset::When::Nth(1));
@@ -107,14 +107,14 @@ TEST_F(PortStates, UnplugEndsEveryWaitAtOnce) {
     EXPECT_EQ(event.get(), 0);
     EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(kTooLong / 2));
     EXPECT_EQ(StateOf(handle), KRAL_PORT_GONE) << "and not closed by a time-out";
-    EXPECT_FALSE(ports_.IsOpen(kPort));
+    EXPECT_FALSE(ports_.IsOpen(kWatchedPort));
     handset_.faults().Clear();
     handset_.PlugIn();
   }
 }
 
 TEST_F(PortStates, MissingOutputGivesZero) {
-  EXPECT_EQ(KRAL_GetPortState(KRAL_ConnectServer(kPort), nullptr), 0);
+  EXPECT_EQ(KRAL_GetPortState(KRAL_ConnectServer(kWatchedPort), nullptr), 0);
 }
 
 // --- A port that another protocol has for itself, and how the connection gets it back -------------------------------

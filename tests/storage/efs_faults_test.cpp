@@ -16,14 +16,14 @@ using handset::Bytes;
 // Passes: the host never notices. Again: one try is spoilt; requests that are sent once fail. Gone: nothing works.
 enum class Harm { kPasses, kAgain, kGone };
 
-struct Row {
+struct FaultRow {
   const char* name;
   Fault fault;
   Harm harm;
   bool hides_handle = false;  // the answer to an opening request is spoilt for good, though it was carried out
 };
 
-const Row kRows[] = {
+const FaultRow kFaultRows[] = {
     {"split", handset::Split(3), Harm::kPasses},
     {"duplicate", handset::Duplicate(), Harm::kPasses},
     {"leading noise", handset::LeadingNoise(40), Harm::kPasses},
@@ -46,7 +46,7 @@ class EfsFaults : public test::EfsTest {
   // fault before. `commands` are the operation's own, in order; `outcome` is empty when it is as `passed` says.
   void Strike(const std::vector<uint8_t>& commands, const std::function<uint8_t()>& run,
               const std::function<std::string(bool passed)>& outcome) {
-    for (const Row& row : kRows) {
+    for (const FaultRow& row : kFaultRows) {
       for (size_t packet = 1; packet <= commands.size(); ++packet) {
         SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
         handset().Restart();  // nothing is open, or under way, of the run before
@@ -71,7 +71,7 @@ class EfsFaults : public test::EfsTest {
       }
     }
     handset().Restart();
-    EXPECT_EQ(run_, std::size(kRows) * commands.size());
+    EXPECT_EQ(run_, std::size(kFaultRows) * commands.size());
   }
 
   static bool Survives(Harm harm, uint8_t command, const std::vector<uint8_t>& commands) {

@@ -73,8 +73,8 @@ class Traffic(ToolTest):
     def test_interrupt_is_the_ordinary_end_of_a_capture_and_a_lost_handset_is_not(self):
         file = self.path("capture")
         for end, code in ((lambda sim, process: process.send_signal(signal.SIGINT), 0),
-                          (lambda sim, process: sim.kill(), 9)):
-            with self.subTest(code=code), self.handset(*self.RATES) as sim:
+                          (lambda sim, process: self.unplug(sim), 9)):
+            with self.subTest(code=code), self.plugged_handset(*self.RATES) as sim:
                 process = start("-p", "7", "--json", "log", "capture", file, "--on", "0x1001", ports=self.ports)
                 wait_until(lambda: os.path.exists(file) and os.path.getsize(file) > 1000)
                 end(sim, process)

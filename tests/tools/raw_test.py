@@ -77,8 +77,8 @@ class Failures(ToolTest):
                     self.assertEqual(error["function"], function)
 
     def test_handset_that_vanishes_is_lost(self):
-        with self.handset("--fault", "lose,of=7C") as sim, self.tool_waiting_for_an_answer() as process:
-            sim.kill()
+        with self.plugged_handset("--fault", "lose,of=7C") as sim, self.tool_waiting_for_an_answer() as process:
+            self.unplug(sim)
             _, err = process.communicate(timeout=PATIENCE)
             self.assertEqual(process.returncode, 9, err)
 

@@ -108,6 +108,18 @@ class ToolTest(unittest.TestCase):
             self.ports = {7: sim.device}
             yield sim
 
+    @contextlib.contextmanager
+    def plugged_handset(self, *options):
+        """One that can be unplugged, under a name that goes with it: the device's own is given to the next terminal."""
+        link = self.path("plug")
+        with handset(*options, "--link", link) as sim:
+            self.ports = {7: link}
+            yield sim
+
+    def unplug(self, sim):
+        os.remove(self.path("plug"))
+        sim.kill()
+
     def expect(self, code, *words):
         """Runs the tool and checks its exit code."""
         done = run(*words, ports=self.ports)

@@ -12,7 +12,7 @@ using handset::Bytes;
 using test::Packets;
 using Lines = test::LogLines::Lines;
 
-struct Collector : PacketListener {
+struct PacketCollector : PacketListener {
   void OnPacket(std::span<const uint8_t> packet) override { packets.emplace_back(packet.begin(), packet.end()); }
   Packets packets;
 };
@@ -32,7 +32,7 @@ class HdlcDeframerTest : public testing::Test {
   }
 
   test::LogLines lines_;
-  Collector sink_;
+  PacketCollector sink_;
   HdlcDeframer deframer_{sink_, *lines_.log()};
 };
 

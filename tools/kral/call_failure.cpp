@@ -82,7 +82,7 @@ bool IsOfRequest(const KRAL_ERROR& record) {
          record.status_kind == KRAL_ERROR_STATUS_REFUSAL;
 }
 
-bool Names(std::string_view text, std::uint16_t port) {
+bool Mentions(std::string_view text, std::uint16_t port) {
   const std::string name = Format("COM{}", port);
   const auto at = text.find(name);
   const auto end = at + name.size();
@@ -93,7 +93,7 @@ std::string SentenceOf(const KRAL_ERROR& record, std::string_view what, std::uin
   constexpr std::string_view kHandset = "the handset ";
   std::string text = record.text;
   if (IsLocal(record)) return text;
-  const std::string where = Names(text, port) ? "" : " on " + DescribePort(port);
+  const std::string where = Mentions(text, port) ? "" : " on " + DescribePort(port);
   if (IsOfRequest(record)) return Format("{}{}: {}", what, where, text);
   if (where.empty() || !text.starts_with(kHandset)) return text + where;
   return Format("the handset{} {}", where, text.substr(kHandset.size()));

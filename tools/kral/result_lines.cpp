@@ -14,7 +14,7 @@ constexpr std::size_t kTextOffset = 8;  // of a record of the callback
 constexpr std::array kBeginnings{kDiffCounts, kTransferStatus, kLogFileTrouble};
 
 std::mutex mutex;
-std::map<std::string_view, std::string> last;  // by beginning
+std::map<std::string_view, std::string> results;  // by beginning
 
 void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   if (record == nullptr || size <= kTextOffset) return;
@@ -25,7 +25,7 @@ void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   for (const auto beginning : kBeginnings) {
     if (!text.starts_with(beginning)) continue;
     const std::lock_guard lock(mutex);
-    last[beginning] = text.substr(beginning.size());
+    results[beginning] = text.substr(beginning.size());
   }
 }
 
@@ -37,8 +37,8 @@ void CollectResultLines(KRAL_HANDLE handle) {
 
 std::optional<std::string> ResultLine(std::string_view beginning) {
   const std::lock_guard lock(mutex);
-  const auto found = last.find(beginning);
-  return found == last.end() ? std::nullopt : std::optional(found->second);
+  const auto found = results.find(beginning);
+  return found == results.end() ? std::nullopt : std::optional(found->second);
 }
 
 }  // namespace kral::tool

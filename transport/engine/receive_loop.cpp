@@ -18,7 +18,7 @@ namespace {
 constexpr uint32_t kUntilSomethingHappens = UINT32_MAX;
 
 // Between two looks at a caller's transport that tells of nothing.
-constexpr uint32_t kLookEveryMs = 1;
+constexpr uint32_t kPollEveryMs = 1;
 
 }  // namespace
 
@@ -87,7 +87,7 @@ void ReceiveLoop::ReadFromCaller(uint32_t changes_seen) {
   const bool has_waited = longest_wait > 0 && clock_.TickMs() - start > 0;
   if (has_waited) return;
   const bool is_told = caller_notifies_ && longest_wait == 0;
-  control_.WaitForChange(changes_seen, is_told ? kUntilSomethingHappens : kLookEveryMs);
+  control_.WaitForChange(changes_seen, is_told ? kUntilSomethingHappens : kPollEveryMs);
 }
 
 void ReceiveLoop::ForgetCaller() {

@@ -6,7 +6,6 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint8_t kReport = 96;
 constexpr std::size_t kHeader = 3;  // the code, and the length of the events (u16)
 constexpr std::size_t kFcs = 2;
 
@@ -17,7 +16,7 @@ unsigned Word(std::span<const std::uint8_t> bytes) {
 }  // namespace
 
 EventReport::EventReport(std::span<const std::uint8_t> packet) {
-  if (packet.size() < kHeader + kFcs || packet.front() != kReport) return;
+  if (packet.size() < kHeader + kFcs || packet.front() != kEventReport) return;
   const auto events = packet.subspan(kHeader, packet.size() - kHeader - kFcs);
   rest_ = events.first(std::min<std::size_t>(events.size(), Word(packet.subspan(1))));
 }

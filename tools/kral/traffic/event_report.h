@@ -10,6 +10,8 @@
 
 namespace kral::tool {
 
+inline constexpr std::uint8_t kEventReport = 96;  // the code of its packets
+
 struct ReportedEvent {
   std::uint16_t id = 0;
   std::span<const std::uint8_t> time_stamp;  // 8 bytes, or 2 of a truncated one; inside the packet, as is the payload

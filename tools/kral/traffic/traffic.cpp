@@ -11,12 +11,12 @@
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/session.h"
+#include "tools/kral/traffic/event_report.h"
 
 namespace kral::tool {
 namespace {
 
 constexpr std::uint8_t kLog = 16;
-constexpr std::uint8_t kReport = 96;
 constexpr std::uint8_t kMessage = 121;
 constexpr std::size_t kLogCodeOffset = 6;
 constexpr std::size_t kCategoryOffset = 14;
@@ -24,7 +24,7 @@ constexpr std::size_t kCategoryOffset = 14;
 constexpr std::uint32_t kWaitMs = 50;
 constexpr std::uint32_t kLookMs = 200;
 
-std::optional<std::uint16_t> Word(std::span<const std::uint8_t> packet, std::size_t offset) {
+std::optional<std::uint16_t> WordAt(std::span<const std::uint8_t> packet, std::size_t offset) {
   if (packet.size() < offset + 2) return std::nullopt;
   return static_cast<std::uint16_t>(packet[offset] | packet[offset + 1] << 8);
 }
@@ -68,12 +68,12 @@ std::string DescribePacket(std::span<const std::uint8_t> packet) {
   if (packet.empty()) return "nothing";
   switch (packet.front()) {
     case kLog:
-      if (const auto code = Word(packet, kLogCodeOffset)) return Format("log 0x{:04X}", *code);
+      if (const auto code = WordAt(packet, kLogCodeOffset)) return Format("log 0x{:04X}", *code);
       return "log";
-    case kReport:
+    case kEventReport:
       return "events";
     case kMessage:
-      if (const auto category = Word(packet, kCategoryOffset)) return Format("message {}", *category);
+      if (const auto category = WordAt(packet, kCategoryOffset)) return Format("message {}", *category);
       return "message";
     default:
       return Format("packet {}", packet.front());
@@ -82,7 +82,7 @@ std::string DescribePacket(std::span<const std::uint8_t> packet) {
 
 void TrafficTable::Add(std::span<const std::uint8_t> packet) {
   Row& row = rows_[DescribePacket(packet)];
-  if (row.packets == 0 && !packet.empty() && packet.front() == kLog) row.log_code = Word(packet, kLogCodeOffset);
+  if (row.packets == 0 && !packet.empty() && packet.front() == kLog) row.log_code = WordAt(packet, kLogCodeOffset);
   ++row.packets;
   row.bytes += packet.size();
 }
