@@ -4,7 +4,7 @@
 #   KRAL_LAYERS           those of the library
 #   KRAL_HANDSET_LAYERS   those of the virtual handset
 if(WIN32)
-  set(KRAL_LIBRARIES_platform ole32 oleaut32 advapi32 uuid winmm)
+  set(KRAL_LIBRARIES_platform ole32 oleaut32 advapi32 setupapi uuid winmm)
 else()
   find_package(PkgConfig REQUIRED)
   pkg_check_modules(xml2 REQUIRED IMPORTED_TARGET GLOBAL libxml-2.0)

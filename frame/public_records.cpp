@@ -8,6 +8,7 @@ static_assert(sizeof(KRAL_EFS_STATFS) == 36);
 static_assert(sizeof(KRAL_EFS_DEVICE_INFO) == 92);
 static_assert(sizeof(KRAL_EVENT) == 268);
 static_assert(sizeof(KRAL_IMAGE_INFO) == 28);
+static_assert(sizeof(KRAL_PORT_INFO) == 596);
 static_assert(sizeof(KRAL_PKV_COUNTS) == 28);
 static_assert(sizeof(KRAL_PKV_ITEM) == 16);
 static_assert(sizeof(KRAL_TRAFFIC_COUNTERS) == 120);

@@ -249,6 +249,47 @@ KRAL_API uint8_t KRAL_CALL KRAL_IsPhoneConnected(KRAL_HANDLE handle);
  */
 KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state);
 
+/** Who answers on a port, as KRAL_GetPortInfo finds out. */
+#define KRAL_ANSWERS_NOT_ASKED 0        /* not asked, or the port could not be opened */
+#define KRAL_ANSWERS_NOTHING 1          /* nothing came */
+#define KRAL_ANSWERS_DIAGNOSTICS 2      /* the software of a handset */
+#define KRAL_ANSWERS_LOADER 3           /* the loader, which takes a flash programmer */
+#define KRAL_ANSWERS_FLASH_PROGRAMMER 4 /* a flash programmer, which writes images */
+#define KRAL_ANSWERS_BOOT_LOADER 5      /* the primary boot loader, in its hello */
+
+/** What is known of a port: 596 bytes without padding, the same on all platforms. Texts are UTF-8 and terminated. */
+typedef struct KRAL_PORT_INFO {
+  uint32_t state;         /**< one of KRAL_PORT_: closed when it may be opened, open when this process has it */
+  uint32_t answers;       /**< one of KRAL_ANSWERS_ */
+  uint32_t process;       /**< which process has it open, where the system tells; 0 when not known */
+  uint16_t vendor;        /**< of a USB device, otherwise 0 */
+  uint16_t product;       /**< of a USB device, otherwise 0 */
+  uint32_t usb_interface; /**< of a USB device: tells its ports apart */
+  char device[256];       /**< what is opened: "/dev/ttyUSB0", "\\\\.\\COM7" */
+  char description[128];  /**< what it calls itself; may be empty */
+  char usb_path[64]; /**< the socket that it is plugged into, such as "1-4.2": stays the same for whatever is there */
+  char serial[64];   /**< serial number of the USB device; may be empty */
+  char process_name[64]; /**< of that process; may be empty */
+} KRAL_PORT_INFO;
+
+/**
+ * Tells what is known of a port, and who answers on it. For a port that does not exist, is in use or is not permitted
+ * the state says so. Without `ask` nothing is opened, and a program that holds the port is found as far as the system
+ * tells: on Linux users of this library always, other programs where this user may look into them; on Windows none.
+ *
+ * With `ask` a port that is free is opened and asked; one that this process has connected is asked on that connection.
+ * A boot loader says its hello once, and loses it by this: power the handset off and on then. An addition to the given
+ * interface.
+ *
+ * @param      port  COM number
+ * @param      ask   1: find out who answers; other values: open nothing
+ * @param[out] info  the record
+ * @return 1 on success; 0 in server mode and for KRAL_PORT_ANY and KRAL_PORT_NULL
+ *
+ * Wait: with `ask` 50 ms, and up to 1,700 ms where nothing answers.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetPortInfo(uint16_t port, uint8_t ask, KRAL_PORT_INFO* info);
+
 /* --- Settings of a handset ---------------------------------------------------------------------------------------- */
 
 /** Time-outs that have a name. */

@@ -107,6 +107,7 @@ PortSources CurrentPortSources() {
   }
   sources.link_folders = LinkFolders();
   sources.tty_class = "/sys/class/tty";
+  sources.processes = "/proc";
   return sources;
 }
 

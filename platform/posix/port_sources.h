@@ -8,12 +8,15 @@
 #include <string>
 #include <vector>
 
+#include "platform/port_info.h"
+
 namespace kral {
 
 struct PortSources {
   std::map<int, std::string> variables;             // KRAL_COM<n>
   std::vector<std::filesystem::path> link_folders;  // with links com<n>, in the order they are searched
   std::filesystem::path tty_class;                  // one entry per tty of the system
+  std::filesystem::path processes;                  // one folder per process, and the table of locks
 };
 
 // What the environment of this process and the system say.
@@ -21,6 +24,7 @@ PortSources CurrentPortSources();
 
 bool ListComPorts(const PortSources& sources, std::vector<uint16_t>& ports);
 std::string ComPortDevice(const PortSources& sources, int number);
+PortInfo DescribeComPort(const PortSources& sources, int number);
 
 }  // namespace kral
 

@@ -1,8 +1,14 @@
 // COM numbers from folders and names of the test's own.
 #include "platform/port_list.h"
 
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+#include <unistd.h>
+
 #include "platform/environment.h"
 #include "platform/posix/port_sources.h"
+#include "platform/pseudo_terminal.h"
+#include "platform/serial_device.h"
 #include "tests/support/temp_folder.h"
 #include "tests/support/test.h"
 
@@ -91,6 +97,80 @@ TEST_F(PortListTest, TheFirstNameOfANumberWins) {
   EXPECT_EQ(ComPortDevice(sources_, 1), folder_.Path("first/com1"));
   sources_.variables = {{1, "/dev/pts/7"}};
   EXPECT_EQ(ComPortDevice(sources_, 1), "/dev/pts/7");
+}
+
+// --- What is known of a port -----------------------------------------------------------------------------------------
+
+TEST_F(PortListTest, AUsbDeviceIsNamedByItsSocketAndItsPortsByTheirInterface) {
+  const std::string device = "devices/usb1/1-4/1-4.2";
+  fs::create_directories(folder_.Path(device + "/1-4.2:1.3/ttyUSB1"));
+  fs::create_directories(folder_.Path("tty/ttyUSB1"));
+  fs::create_symlink(folder_.Path(device + "/1-4.2:1.3/ttyUSB1"), folder_.Path("tty/ttyUSB1/device"));
+  for (const auto& [name, text] : {std::pair{"idVendor", "1d6b"},
+                                   {"idProduct", "00a2"},
+                                   {"serial", "80C0FFEE"},
+                                   {"manufacturer", "Acme"},
+                                   {"product", "Handset"},
+                                   {"1-4.2:1.3/bInterfaceNumber", "03"},
+                                   {"1-4.2:1.3/interface", "Diagnostics"}}) {
+    folder_.Add(device + "/" + name, std::string(text) + "\n");
+  }
+  folder_.Add("devices/usb1/1-4/idVendor", "ffff\n");  // the hub, which is further up
+  sources_.variables = {{7, "/dev/ttyUSB1"}};
+  for (const int number : {7, 66}) {
+    const PortInfo info = DescribeComPort(sources_, number);
+    EXPECT_EQ(info.device, "/dev/ttyUSB1");
+    EXPECT_EQ(info.usb_path, "1-4.2");
+    EXPECT_EQ(info.usb_interface, 3);
+    EXPECT_EQ(info.vendor, 0x1D6B);
+    EXPECT_EQ(info.product, 0xA2);
+    EXPECT_EQ(info.serial, "80C0FFEE");
+    EXPECT_EQ(info.description, "Acme Handset Diagnostics");
+  }
+  EXPECT_EQ(DescribeComPort(sources_, 1).usb_path, "");
+}
+
+TEST_F(PortListTest, WhatStandsInTheWayOfAPortIsToldWithoutOpeningIt) {
+  const auto obstacle = [this](const std::string& device) {
+    sources_.variables = {{7, device}};
+    return DescribeComPort(sources_, 7).obstacle;
+  };
+  sources_.processes = folder_.Path("processes");
+  fs::create_directories(folder_.Path("processes/41/fd"));
+  EXPECT_EQ(obstacle("/dev/null"), PortObstacle::kNone);
+  EXPECT_EQ(obstacle("/nonexistent"), PortObstacle::kNotFound);
+  EXPECT_EQ(obstacle(folder_.Add("file", "")), PortObstacle::kNotFound);
+  EXPECT_EQ(obstacle(""), PortObstacle::kNotFound);
+
+  // Another program, by what it has open.
+  fs::create_directories(folder_.Path("processes/42/fd"));
+  fs::create_symlink("/dev/null", folder_.Path("processes/42/fd/3"));
+  folder_.Add("processes/42/comm", "prober\n");
+  EXPECT_EQ(obstacle("/dev/null"), PortObstacle::kInUse);
+  EXPECT_EQ(DescribeComPort(sources_, 7).process_name, "prober");
+}
+
+// Another program, by its lock: on a pseudo terminal the simulating side has a descriptor, too.
+TEST_F(PortListTest, OfAPseudoTerminalTheHolderOfTheLockIsTold) {
+  std::string error;
+  const auto terminal = OpenPseudoTerminal(error);
+  ASSERT_TRUE(terminal) << error;
+  sources_.variables = {{7, terminal->device_path()}};
+  sources_.processes = "/proc";
+  EXPECT_EQ(DescribeComPort(sources_, 7).obstacle, PortObstacle::kNone);
+  struct stat status {};
+  ASSERT_EQ(::stat(terminal->device_path().c_str(), &status), 0);
+  std::array<char, 64> line{};
+  std::snprintf(line.data(), line.size(), "7: FLOCK  ADVISORY  WRITE 42 %02x:%02x:%lu 0 EOF\n", major(status.st_dev),
+                minor(status.st_dev), static_cast<unsigned long>(status.st_ino));
+  fs::create_directories(folder_.Path("processes/42"));
+  folder_.Add("processes/locks", line.data());
+  folder_.Add("processes/42/comm", "prober\n");
+  sources_.processes = folder_.Path("processes");
+  const PortInfo info = DescribeComPort(sources_, 7);
+  EXPECT_EQ(info.obstacle, PortObstacle::kInUse);
+  EXPECT_EQ(info.process, 42u);
+  EXPECT_EQ(info.process_name, "prober");
 }
 
 // Puts variables back as they were.
