@@ -3,8 +3,10 @@ import fcntl
 import json
 import os
 import termios
+import unittest.mock
 
-from tool import ToolTest, handset, run
+import tool
+from tool import ToolTest, command, fixture, handset, run, start
 
 
 def without_override():
@@ -51,9 +53,53 @@ class Ports(ToolTest):
             listed = {row["port"]: row for row in self.expect_json(0, "ports")["ports"]}
             probed = {row["port"]: row for row in self.expect_json(0, "ports", "--probe")["ports"]}
             self.assertEqual(self.expect_json(0, "info")["port"], 7)
-        self.assertEqual(listed[7]["device"], sim.device)
+        self.assertEqual((listed[7]["device"], listed[7]["state"]), (sim.device, "free"))
         self.assertNotIn("handset", listed[7])
-        self.assertEqual([probed[number]["handset"] for number in (7, 9)], [True, False])
+        self.assertEqual([(probed[number]["handset"], probed[number]["state"], probed[number]["answers"])
+                          for number in (7, 9)], [(True, "handset", "diagnostics"), (False, "silent", "nothing")])
+
+    def test_ports_are_found_by_device_serial_number_and_slot(self):
+        slots = {"KRAL_SLOTS": self.path("slots")}
+        with unittest.mock.patch.dict(tool.EXTRA_ENVIRONMENT, slots), handset() as unnumbered, \
+                fixture(4, self.path("ports"), "--esn", "0x10", "--fault-at", "4:ignore") as (_, self.ports):
+            for words in (("1", "esn:11"), ("2", "/dev/../" + os.path.realpath(self.ports[3])), ("30", "3"), ("4", "1")):
+                self.expect(0, "ports", "assign", *words)
+            for name, ports in (("esn:00000012", [3]), (os.path.realpath(self.ports[1]), [1]), ("slot:1", [2]),
+                                ("slot:1-2", [2, 3]), ("1,slot:1,esn:12", [1, 2, 3])):
+                with self.subTest(name=name):
+                    answer = self.expect_json(0, "-p", name, "info")
+                    self.assertEqual([row["port"] for row in answer.get("handsets", [answer])], ports)
+            answer = self.expect_json(0, "-p", unnumbered.device, "info")
+            self.assertEqual(answer["esn"], "80C0FFEE")
+            self.expect(0, "-p", "slot:2", "nv", "backup", self.path("{slot}.pkv"), "--items", "0-1")
+            self.expect(0, "-p", "slot:1-2", "nv", "backup", self.path("many{slot}.pkv"), "--items", "0-1")
+            self.assertLess({"2.pkv", "many1.pkv", "many2.pkv"}, set(os.listdir(self.folder)))
+            for code, text, name in ((3, "no port esn:00000099", "esn:00000099"), (3, "no port usb:9-9", "usb:9-9"),
+                                     (3, "no port /dev/nothing", "/dev/nothing"), (2, "slot 7 is not", "slot:7"),
+                                     (2, "slot:2 and slot:30 are both COM3", "slot:2,slot:30"),
+                                     (2, "slot:1 and esn:11 are both COM2", "slot:1,esn:11"),
+                                     (2, "is no serial number", "esn:xyz"), (2, "is no slot", "slot:2-1")):
+                with self.subTest(name=name):
+                    self.assertIn(text, self.expect_json(code, "-p", name, "info")["error"]["text"])
+            for words in (("5", "esn:11"), ("5", "slot:1"), ("5", "7,8"), ("5",), ("0", "7"), ("5", "x")):
+                self.expect_json(2, "ports", "assign", *words)
+            self.expect(0, "ports", "assign", "1", "--remove")
+            slots = self.expect_json(0, "ports", "assign")["slots"]
+            self.assertEqual([row["slot"] for row in slots], [2, 4, 30])
+            self.add("slots", b"1 7\n1 8\n")
+            self.assertIn("line 2", self.expect_json(10, "-p", "slot:1", "info")["error"]["text"])
+
+    def test_a_verb_waits_for_a_handset_that_comes(self):
+        with fixture(1, self.path("ports"), "--esn", "0x10") as (sim, self.ports):
+            command(sim, "unplug 1")
+            for name, code in (("1", 3), ("esn:10", 3)):
+                self.expect_json(code, "-p", name, "--wait=0", "info")
+                waiting = start("-p", name, "info", "--wait", ports=self.ports)
+                command(sim, "plug 1")
+                out, err = waiting.communicate(timeout=tool.PATIENCE)
+                self.assertEqual(waiting.returncode, 0, err)
+                self.assertIn("00000010", out)
+                command(sim, "unplug 1")
 
     def test_several_handsets_are_listed_and_none_is_chosen(self):
         with handset() as one, handset() as two:
@@ -80,11 +126,17 @@ class Ports(ToolTest):
             try:
                 fcntl.flock(taken, fcntl.LOCK_EX | fcntl.LOCK_NB)
                 fcntl.ioctl(taken, termios.TIOCEXCL)
-                self.assertIn("in use", self.ask(4, "info")["error"]["text"])
+                self.assertIn(f"process {os.getpid()})", self.ask(4, "info")["error"]["text"])
+                for words in (("ports",), ("ports", "--probe")):
+                    row = next(row for row in self.expect_json(0, *words)["ports"] if row["port"] == 7)
+                    self.assertEqual((row["state"], row["process"]["id"]), ("in-use", os.getpid()))
+                self.assertIn("in use by", self.expect_json(3, "info")["error"]["text"])
                 fcntl.ioctl(taken, termios.TIOCNXCL)
             finally:
                 os.close(taken)
             os.chmod(sim.device, 0)
+            listed = run("ports", ports=self.ports, before=without_override())
+            self.assertRegex(listed.out, r"(?m)^COM7 .*  not permitted$")
             done = run("-p", "7", "info", "--json", ports=self.ports, before=without_override())
         self.assertEqual(done.returncode, 4, done.err)
         self.assertIn("may not be opened", json.loads(done.out)["error"]["text"])

@@ -9,12 +9,14 @@ import unittest
 
 KRAL = None  # the tool; set before any test runs
 PATIENCE = 30  # seconds; far more than anything here takes
+EXTRA_ENVIRONMENT = {}  # of every process that a test starts
 
 
 def clean_environment(ports):
     """An environment in which exactly these COM numbers have devices of ours."""
     env = {name: value for name, value in os.environ.items() if not name.startswith("KRAL_")}
     env["KRAL_PORT_DIR"] = "/nonexistent"
+    env.update(EXTRA_ENVIRONMENT)
     env.update({f"KRAL_COM{number}": device for number, device in ports.items()})
     return env
 

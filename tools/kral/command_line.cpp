@@ -137,6 +137,10 @@ std::vector<std::string> VerbsOf(const CLI::App& app) {
   return names;
 }
 
+bool NeedsVerb(const CLI::App& app) {
+  return app.get_require_subcommand_min() > 0;
+}
+
 std::vector<std::string> OptionsOf(const CLI::App* app) {
   std::vector<std::string> names;
   for (; app != nullptr; app = app->get_parent()) {
@@ -205,7 +209,7 @@ ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const C
   const auto title = TitleOf(*place.app);
   const auto hint = Format("{} --help tells what it takes", title);
   if (!place.unknown.empty()) return {ExitCode::kUsage, DescribeUnknown(place), hint};
-  if (const auto verbs = VerbsOf(*place.app); !verbs.empty()) {
+  if (const auto verbs = VerbsOf(*place.app); !verbs.empty() && NeedsVerb(*place.app)) {
     return {ExitCode::kUsage, Format("{} needs a verb: {}", title, Joined(verbs, ", ")), hint};
   }
   if (const auto rest = root.remaining(true); !rest.empty()) {
@@ -364,6 +368,7 @@ template Option Command::Add(const char*, std::uint32_t&, std::string_view) cons
 template Option Command::Add(const char*, std::uint64_t&, std::string_view) const;
 template Option Command::Add(const char*, std::int32_t&, std::string_view) const;
 template Option Command::Add(const char*, double&, std::string_view) const;
+template Option Command::Add(const char*, std::optional<double>&, std::string_view) const;
 template Option Command::Add(const char*, std::optional<std::uint8_t>&, std::string_view) const;
 template Option Command::Add(const char*, std::optional<std::uint16_t>&, std::string_view) const;
 template Option Command::Add(const char*, std::optional<std::uint32_t>&, std::string_view) const;
@@ -384,6 +389,7 @@ void Command::Flag(const char* names, std::function<void()> given, std::string_v
 
 void Command::Run(std::function<void()> act) const {
   app_->callback([chosen = chosen_, app = app_, act = std::move(act)] {
+    if (!app->get_subcommands().empty()) return;  // one of its own verbs was given
     chosen->act = act;
     chosen->verb = app;
   });
@@ -432,7 +438,7 @@ void CommandLine::Example(const std::string& words) {
   auto list = CLI::detail::split(words, ' ');
   list.erase(list.begin());
   const auto place = Follow(parser_->app, list);
-  if (!place.unknown.empty() || !VerbsOf(*place.app).empty()) throw std::logic_error("no example: " + words);
+  if (!place.unknown.empty() || NeedsVerb(*place.app)) throw std::logic_error("no example: " + words);
   auto& text = parser_->examples[place.app];
   text += Format("{}  {}\n", text.empty() ? "Examples:\n" : "", words);
   place.app->footer(text);

@@ -12,6 +12,7 @@
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/many_handsets.h"
+#include "tools/kral/port_names.h"
 #include "tools/kral/result_lines.h"
 #include "tools/kral/verbs.h"
 
@@ -20,6 +21,8 @@ namespace {
 
 constexpr std::uint32_t kLongestTimeOutMs = 3600 * 1000;
 constexpr std::uint16_t kMostJobs = 48;
+constexpr const char* kUsualWait = "--wait=30";
+constexpr double kLongestWaitS = 24 * 3600;
 
 std::string VersionText() {
   std::array<char, 64> text{};
@@ -29,9 +32,11 @@ std::string VersionText() {
 
 void AddCommonOptions(const Command& root, Context& context) {
   root.Add("-p,--port", context.session.port,
-           "COM port numbers, such as 7 or 7,8,20-27; default: the only one with a "
-           "handset");
+           "Ports, such as 7, 20-27, /dev/ttyUSB0, esn:80C0FFEE, usb:1-4.2, slot:3, or several with commas; default: "
+           "the only one with a handset");
   root.Flag("--all", context.all, "Every port on which a handset answers");
+  root.Add("--wait", context.wait_s, "Wait so long until the ports are there and handsets answer; --wait alone: 30 s")
+      .Between(0, kLongestWaitS, "s");
   root.Add("--jobs", context.jobs, "How many handsets are worked on at once; default: all").Between(1, kMostJobs);
   root.Flag(
       "--json", [&context] { context.out.UseJson(); }, "Print one JSON object");
@@ -92,21 +97,45 @@ std::unique_ptr<ParsedCommand> ParseAgain(const std::vector<std::string>& argume
   return command;
 }
 
+// --wait without a value: the parser would take the word behind it, whatever that is.
+std::vector<std::string> WithUsualWait(std::vector<std::string> arguments) {
+  for (std::size_t i = 0; i < arguments.size() && arguments[i] != "--"; ++i) {
+    if (arguments[i] != "--wait") continue;
+    const bool has_value = i + 1 < arguments.size() && !arguments[i + 1].empty() &&
+                           arguments[i + 1].find_first_not_of("0123456789.") == std::string::npos;
+    if (!has_value) arguments[i] = kUsualWait;
+  }
+  return arguments;
+}
+
+// From here on ports are numbers.
+void FindPorts(Context& context, const std::string& verb) {
+  auto& session = context.session;
+  if (!context.wait_s) return ResolvePortNames(session);
+  session.wait_ms = static_cast<std::uint32_t>(*context.wait_s * 1000);
+  AwaitHandsets(session, context.all, verb.starts_with("boot ") || verb == "flash all");
+}
+
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
+  FindPorts(command->context, command->line->verb());
   const auto parse_for = [&](std::uint16_t port, const Names& names) {
     auto own = ParseAgain(arguments, *command->line, names);
     own->context.session.port = std::to_string(port);
+    own->context.session.slots = command->context.session.slots;
     own->context.all = false;
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
   if (!command->line->asked().empty()) {
-    command = ParseAgain(arguments, *command->line, NamesOf(*command->line, command->context.session));
+    const auto found = command->context.session;
+    command = ParseAgain(arguments, *command->line, NamesOf(*command->line, found));
+    command->context.session.port = found.port;
   }
   command->act();
 }
 
-int Run(const std::vector<std::string>& arguments) {
+int Run(const std::vector<std::string>& words) {
+  const auto arguments = WithUsualWait(words);
   auto command = Declared("");
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.
   if (std::ranges::find(arguments, "--json") != arguments.end()) command->context.out.UseJson();

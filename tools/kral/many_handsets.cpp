@@ -198,10 +198,13 @@ void ManyHandsets::Prepare() {
   for (std::size_t number = 0; number < handsets_.size(); ++number) {
     auto& handset = *handsets_[number];
     if (!handset.verdict.passed()) continue;
-    handset.command = parse_(handset.verdict.port, {{"port", std::to_string(handset.verdict.port)},
-                                                    {"slot", std::to_string(number + 1)},
-                                                    {"serial", AsFileName(handset.verdict.serial)},
-                                                    {"model", AsFileName(handset.verdict.model)}});
+    const auto& slots = context().session.slots;
+    const auto slot = slots.find(handset.verdict.port);
+    handset.command =
+        parse_(handset.verdict.port, {{"port", std::to_string(handset.verdict.port)},
+                                      {"slot", std::to_string(slot == slots.end() ? number + 1 : slot->second)},
+                                      {"serial", AsFileName(handset.verdict.serial)},
+                                      {"model", AsFileName(handset.verdict.model)}});
   }
   RefuseSameFiles();
 }
@@ -364,10 +367,11 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text) {
 
 Names NamesOf(const CommandLine& line, const SessionOptions& options) {
   const bool asks = Asks(line, "serial") || Asks(line, "model");
+  const auto slot = std::to_string(options.slots.empty() ? 1 : options.slots.begin()->second);
   // Not for a mere number: a boot loader says hello once.
-  if (!asks && !options.port.empty()) return {{"port", std::to_string(ParsePort(options.port))}, {"slot", "1"}};
+  if (!asks && !options.port.empty()) return {{"port", std::to_string(ParsePort(options.port))}, {"slot", slot}};
   Session session(ForIdentity(options));
-  Names names{{"port", std::to_string(session.port())}, {"slot", "1"}};
+  Names names{{"port", std::to_string(session.port())}, {"slot", slot}};
   if (Asks(line, "serial")) names["serial"] = AsFileName(SerialOf(session));
   if (Asks(line, "model")) names["model"] = AsFileName(ModelOf(session));
   return names;

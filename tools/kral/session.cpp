@@ -13,6 +13,7 @@
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/port_report.h"
 #include "tools/kral/result_lines.h"
 
 namespace kral::tool {
@@ -25,6 +26,23 @@ std::string Describe(const std::vector<std::uint16_t>& ports) {
   std::string text;
   for (const auto port : ports) text += (text.empty() ? "" : ", ") + DescribePort(port);
   return text;
+}
+
+// With what stands in the way of each.
+std::string DescribeWithState(const std::vector<std::uint16_t>& ports) {
+  std::vector<std::string> names;
+  for (const auto& report : ReportPorts(ports, false)) {
+    const auto state = StateText(report);
+    names.push_back(state.empty() ? DescribePort(report.port) : Format("{}: {}", DescribePort(report.port), state));
+  }
+  return Joined(names, ", ");
+}
+
+// Who has it, where the system tells.
+std::string OtherProgram(std::uint16_t port) {
+  KRAL_PORT_INFO info{};
+  if (KRAL_GetPortInfo(port, 0, &info) == 0 || info.process == 0) return "another program";
+  return HolderText(info);
 }
 
 // Nothing is asked: it would cost a boot loader its hello.
@@ -50,7 +68,7 @@ std::uint16_t TheOnlyPort(Expected expected) {
                     "plug the handset in, or name its port with -p N");
   }
   if (expected == Expected::kMayBeInDownload && ports.size() == 1) return ports.front();
-  throw ToolError(ExitCode::kNoPort, Format("no handset answers on {}", Describe(ports)),
+  throw ToolError(ExitCode::kNoPort, Format("no handset answers on {}", DescribeWithState(ports)),
                   "check cable and power of the handset and that no other program uses its port, or name it with -p N");
 }
 
@@ -75,7 +93,7 @@ ToolError PortError(std::uint16_t port, std::int32_t state, bool was_connected,
   const auto name = DescribePort(port);
   switch (state) {
     case KRAL_PORT_BUSY:
-      return {ExitCode::kPortInUse, Format("{} is in use by another program", name),
+      return {ExitCode::kPortInUse, Format("{} is in use by {}", name, OtherProgram(port)),
               "close the program that holds the port, then run the command again", record};
     case KRAL_PORT_NOT_PERMITTED:
       return {ExitCode::kPortInUse, Format("{} may not be opened by this user", name),

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <cstdio>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -16,7 +17,9 @@
 namespace kral::tool {
 
 struct SessionOptions {
-  std::string port;  // empty: the only port on which a handset answers
+  std::string port;                              // empty: the only port on which a handset answers
+  std::map<std::uint16_t, std::uint16_t> slots;  // of those ports that were named by their slot
+  std::uint32_t wait_ms = 0;                     // for a port and its handset to appear
   std::string log_file;
   std::optional<std::uint32_t> log_flags;
   std::optional<std::uint32_t> time_out_ms;  // of every request

@@ -2,6 +2,9 @@
 #ifndef KRAL_TOOLS_VERBS_H
 #define KRAL_TOOLS_VERBS_H
 
+#include <cstdint>
+#include <optional>
+
 #include "tools/kral/command_line.h"
 #include "tools/kral/output.h"
 #include "tools/kral/session.h"
@@ -10,7 +13,8 @@ namespace kral::tool {
 
 struct Context {
   SessionOptions session;
-  bool all = false;        // every port on which a handset answers
+  bool all = false;  // every port on which a handset answers
+  std::optional<double> wait_s;
   std::uint16_t jobs = 0;  // handsets that are worked on at once; 0: as many as there are
   Output out;
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure

@@ -1,37 +1,88 @@
-// kral ports: which serial ports there are, and on which a handset answers.
-#include <algorithm>
+// kral ports: which serial ports there are, what is plugged into them, and who has them or answers there. Which slots
+// of a fixture they are.
+#include <map>
 #include <memory>
+#include <optional>
+#include <string>
 
-#include "platform/port_list.h"
 #include "tools/kral/format.h"
+#include "tools/kral/port_names.h"
+#include "tools/kral/port_report.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
 namespace {
 
+struct PortOptions {
+  bool probe = false;
+  std::optional<std::uint16_t> slot;
+  std::string name;
+  bool remove = false;
+};
+
 void ShowPorts(const Context& context, bool probe) {
-  const auto ports = ListPorts();
-  const auto answering = probe ? ListPortsWithHandset() : std::vector<std::uint16_t>{};
+  const auto reports = ReportPorts(ListPorts(), probe);
   Json list = Json::array();
   std::string text;
-  for (const auto port : ports) {
-    const bool answers = std::ranges::find(answering, port) != answering.end();
-    Json row{{"port", port}, {"device", ComPortDevice(port)}};
-    if (probe) row["handset"] = answers;
-    list.push_back(row);
-    text += Format("{}{}\n", DescribePort(port), answers ? "  handset" : "");
+  for (const auto& report : reports) {
+    list.push_back(PortJson(report));
+    text += DescribePort(report.port);
+    for (const auto& part : {StateText(report), UsbText(report.info)}) {
+      if (!part.empty()) text += "  " + part;
+    }
+    text += "\n";
   }
-  if (ports.empty()) context.out.Note("this machine has no serial port");
+  if (reports.empty()) context.out.Note("this machine has no serial port");
   context.out.Result({{"ports", list}}, text);
+}
+
+void ShowSlots(const Context& context, const std::map<std::uint16_t, std::string>& slots) {
+  Json list = Json::array();
+  std::string text;
+  for (const auto& [slot, name] : slots) {
+    list.push_back({{"slot", slot}, {"name", name}});
+    text += Format("slot:{}  {}\n", slot, name);
+  }
+  if (slots.empty()) context.out.Note(Format("no slot is assigned in {}", SlotFile()));
+  context.out.Result({{"slots", list}, {"file", SlotFile()}}, text);
+}
+
+void Assign(const Context& context, const PortOptions& options) {
+  auto slots = ReadSlots();
+  if (!options.slot) return ShowSlots(context, slots);
+  if (options.name.empty() != options.remove) {
+    throw ToolError(ExitCode::kUsage, "a slot is assigned to a port, or removed",
+                    "kral ports assign 3 usb:1-4.2, or kral ports assign 3 --remove");
+  }
+  slots.erase(*options.slot);
+  if (!options.remove) {
+    CheckPortName(options.name);
+    for (const auto& [slot, name] : slots) {
+      if (name == options.name) {
+        throw ToolError(ExitCode::kUsage, Format("{} is slot {} already", name, slot),
+                        Format("kral ports assign {} --remove takes it away from there", slot));
+      }
+    }
+    slots[*options.slot] = options.name;
+  }
+  WriteSlots(slots);
+  ShowSlots(context, slots);
 }
 
 }  // namespace
 
 void AddPortVerbs(const Command& root, Context& context) {
-  const auto probe = std::make_shared<bool>(false);
+  constexpr double kLastSlot = 999;
+  const auto options = std::make_shared<PortOptions>();
   const auto ports = root.Verb("ports", "List the serial ports without opening them");
-  ports.Flag("--probe", *probe, "Open each port that is free and ask whether a handset answers");
-  ports.Run([&context, probe] { ShowPorts(context, *probe); });
+  ports.Flag("--probe", options->probe, "Open each port that is free and find out who answers");
+  ports.Run([&context, options] { ShowPorts(context, options->probe); });
+
+  const auto assign = ports.Verb("assign", "Tell which port a slot of the fixture is, for -p slot:N; alone: list them");
+  assign.Add("slot", options->slot, "Number of the slot").Between(1, kLastSlot);
+  assign.Add("name", options->name, "Its port: usb:1-4.2, esn:80C0FFEE, /dev/ttyUSB0, 7");
+  assign.Flag("--remove", options->remove, "Forget the slot");
+  assign.Run([&context, options] { Assign(context, *options); });
 }
 
 }  // namespace kral::tool
