@@ -89,6 +89,33 @@ class Ports(ToolTest):
             self.add("slots", b"1 7\n1 8\n")
             self.assertIn("line 2", self.expect_json(10, "-p", "slot:1", "info")["error"]["text"])
 
+    def test_the_doctor_names_what_is_wrong_and_what_mends_it(self):
+        def findings(code, *words):
+            answer = self.expect_json(code, *words, "doctor", "--seconds", "0.2")
+            return answer, {row["level"]: row["text"] + " | " + row["mend"] for row in answer["findings"]
+                            if "ModemManager" not in row["text"]}
+        with fixture(4, self.path("ports"), "--fault-at", "2:corrupt,every=20,of=7B", "--fault-at", "3:ignore",
+                     "--fault-at", "4:delay=30,of=7B") as (_, self.ports):
+            answer, found = findings(0, "-p", "1")
+            self.assertEqual(found, {})
+            trips = answer["ports"][0]["round_trips"]
+            self.assertGreater(trips["count"], 10)
+            self.assertGreater(trips["p99_us"], 0)
+            self.assertLessEqual(trips["p50_us"], trips["p99_us"])
+            self.assertEqual((trips["lost"], trips["garbled"]), (0, 0))
+            answer, found = findings(6, "-p", "1-2")
+            self.assertRegex(found["problem"], r"loopbacks on COM2 .* were lost and .*try another cable")
+            self.assertIn("nothing answers on COM3", findings(5, "-p", "3")[1]["problem"])
+            self.assertIn("round trips on COM4", findings(0, "-p", "4")[1]["warning"])
+            self.assertIn("no port COM99", findings(3, "-p", "99")[1]["problem"])
+            text = self.expect(6, "-p", "2", "doctor", "--seconds", "0.2")
+            self.assertRegex(text.out, r"COM2 .* round trips: p50 .*\nproblem: ")
+            os.chmod(self.ports[1], 0)
+            words = ("-p", "1", "doctor", "--seconds", "0", "--json")
+            done = run(*words, ports=self.ports, before=without_override())
+            self.assertEqual(done.returncode, 4)
+            self.assertIn("sudo ", json.loads(done.out)["findings"][-1]["mend"])
+
     def test_a_verb_waits_for_a_handset_that_comes(self):
         with fixture(1, self.path("ports"), "--esn", "0x10") as (sim, self.ports):
             command(sim, "unplug 1")

@@ -25,6 +25,7 @@ struct Chosen {
   std::function<void()> act;
   const CLI::App* verb = nullptr;
   std::set<const CLI::App*> for_many;
+  std::set<const CLI::App*> takes_ports;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
   Names names;
   std::set<std::string> asked;
@@ -399,6 +400,10 @@ void Command::ForMany() const {
   chosen_->for_many.insert(app_);
 }
 
+void Command::TakesPorts() const {
+  chosen_->takes_ports.insert(app_);
+}
+
 void Command::Writes(std::function<std::vector<std::string>()> files) const {
   chosen_->writes[app_] = std::move(files);
 }
@@ -468,6 +473,10 @@ std::string CommandLine::verb() const {
 
 bool CommandLine::for_many() const {
   return parser_->chosen.for_many.count(parser_->chosen.verb) != 0;
+}
+
+bool CommandLine::takes_ports() const {
+  return parser_->chosen.takes_ports.count(parser_->chosen.verb) != 0;
 }
 
 std::vector<std::string> CommandLine::Written() const {

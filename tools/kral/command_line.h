@@ -82,6 +82,8 @@ class Command {
   void Run(std::function<void()> act) const;
   // The verb may be given several handsets: it runs for each of them, with a command line of its own.
   void ForMany() const;
+  // The verb takes the ports, however many, as they are: it runs once.
+  void TakesPorts() const;
   // Which local files it writes, asked behind the parsing: no two handsets may write the same.
   void Writes(std::function<std::vector<std::string>()> files) const;
   // Below the options in the help.
@@ -122,6 +124,7 @@ class CommandLine {
   // --- Of the verb that was chosen ---
   std::string verb() const;  // "nv backup"
   bool for_many() const;
+  bool takes_ports() const;
   std::vector<std::string> Written() const;    // local files, as far as it has said so
   const std::set<std::string>& asked() const;  // which names were asked for: "serial"
 

@@ -8,6 +8,10 @@ namespace {
 
 constexpr const char* kExamples[] = {
     "kral ports --probe",
+    "kral ports assign 3 usb:1-4.2",
+    "kral doctor",
+    "kral -p 7 doctor --seconds 10",
+    "kral -p slot:1-8 info --wait",
     "kral -p 7 info",
     "kral -p 7 --json info",
     "kral --all info",

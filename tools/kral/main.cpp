@@ -52,10 +52,10 @@ struct VerbsOf {
 };
 
 constexpr VerbsOf kVerbs[] = {
-    {"ports", AddPortVerbs},  {"info", AddInfoVerbs},   {"mode", AddModeVerbs},       {"fs", AddFsVerbs},
-    {"ftm", AddFtmVerbs},     {"log", AddLogVerbs},     {"event", AddEventVerbs},     {"nv", AddNvVerbs},
-    {"flash", AddFlashVerbs}, {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs}, {"band", AddBandVerbs},
-    {"raw", AddRawVerbs},     {"sim", AddSimVerbs},
+    {"ports", AddPortVerbs}, {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
+    {"fs", AddFsVerbs},      {"ftm", AddFtmVerbs},       {"log", AddLogVerbs},     {"event", AddEventVerbs},
+    {"nv", AddNvVerbs},      {"flash", AddFlashVerbs},   {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
+    {"band", AddBandVerbs},  {"raw", AddRawVerbs},       {"sim", AddSimVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.

@@ -382,6 +382,7 @@ bool IsForMany(const ParsedCommand& command) {
   if (context.all && !context.session.port.empty()) {
     throw ToolError(ExitCode::kUsage, "--all and --port say different things", "give one of them");
   }
+  if (command.line->takes_ports()) return false;
   const bool many = context.all || context.session.port.find_first_of(",-") != std::string::npos;
   if (!many || command.line->for_many()) return many;
   throw ToolError(ExitCode::kUsage, Format("kral {} is for one handset at a time", command.line->verb()),
