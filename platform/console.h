@@ -3,6 +3,8 @@
 #define KRAL_PLATFORM_CONSOLE_H
 
 #include <atomic>
+#include <cstddef>
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -33,6 +35,8 @@ class Utf8Terminal {
 
 // Bytes written to the standard output come out as they are, line ends included.
 void UseBinaryOutput();
+// All that comes on the standard input, until its end; false where it is more than so many bytes.
+bool ReadStandardInput(size_t limit, std::vector<uint8_t>& bytes);
 
 // From now on Ctrl-C, a polite request to end and the closing of the terminal set `flag` instead of ending the program;
 // a second Ctrl-C or request ends it with exit code 130. (A closed terminal says so more than once. One that a program

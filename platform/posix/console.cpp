@@ -6,6 +6,8 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
+#include <cstdio>
 #include <cstdlib>
 #include <string_view>
 
@@ -70,6 +72,15 @@ Utf8Terminal::Utf8Terminal() = default;
 Utf8Terminal::~Utf8Terminal() = default;
 
 void UseBinaryOutput() {}  // they always do
+
+bool ReadStandardInput(size_t limit, std::vector<uint8_t>& bytes) {
+  std::array<uint8_t, 65536> piece{};
+  while (const size_t count = std::fread(piece.data(), 1, piece.size(), stdin)) {
+    if (count > limit - bytes.size()) return false;
+    bytes.insert(bytes.end(), piece.begin(), piece.begin() + static_cast<std::ptrdiff_t>(count));
+  }
+  return std::ferror(stdin) == 0;
+}
 
 void CatchInterrupts(std::atomic<bool>* flag) {
   interrupt_flag = flag;

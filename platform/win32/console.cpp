@@ -6,6 +6,9 @@
 #include <unistd.h>
 #include <windows.h>
 
+#include <array>
+#include <cstdio>
+
 #include "platform/win32/wide_text.h"
 
 // Of the C runtime, declared in no header: what the start of a program with wide arguments calls.
@@ -92,6 +95,16 @@ Utf8Terminal::~Utf8Terminal() {
 
 void UseBinaryOutput() {
   ::_setmode(STDOUT_FILENO, _O_BINARY);
+}
+
+bool ReadStandardInput(size_t limit, std::vector<uint8_t>& bytes) {
+  ::_setmode(STDIN_FILENO, _O_BINARY);
+  std::array<uint8_t, 65536> piece{};
+  while (const size_t count = std::fread(piece.data(), 1, piece.size(), stdin)) {
+    if (count > limit - bytes.size()) return false;
+    bytes.insert(bytes.end(), piece.begin(), piece.begin() + static_cast<std::ptrdiff_t>(count));
+  }
+  return std::ferror(stdin) == 0;
 }
 
 void CatchInterrupts(std::atomic<bool>* flag) {

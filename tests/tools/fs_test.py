@@ -75,6 +75,11 @@ class Files(ToolTest):
             self.assertEqual(sorted(answer["done"]),
                              ["/tree", "/tree/link", "/tree/sub", "/tree/sub/deep", "/tree/sub/f"])
             self.fs(2, "rm", "-r", "/")
+            for code, target in ((0, ":/piped"), (7, ":/d")):
+                process = start("-p", "7", "fs", "put", "-", target, ports=self.ports, stdin=subprocess.PIPE)
+                err = process.communicate("from a pipe", timeout=PATIENCE)[1]
+                self.assertEqual(process.returncode, code, err)
+            self.assertEqual(self.text("fs", "cat", ":/piped"), "from a pipe")
             self.assertEqual(self.text("fs", "get", ":/d/stays", "-"), "x" * 700)
             self.fs(0, "put", local, ":/file")
             for words in (("cat", ":/nope"), ("stat", "/nope"), ("get", ":/nope"), ("ls", "/nope"), ("rm", "/nope")):

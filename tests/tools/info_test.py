@@ -158,6 +158,7 @@ class Ports(ToolTest):
                     row = next(row for row in self.expect_json(0, *words)["ports"] if row["port"] == 7)
                     self.assertEqual((row["state"], row["process"]["id"]), ("in-use", os.getpid()))
                 self.assertIn("in use by", self.expect_json(3, "info")["error"]["text"])
+                self.assertEqual(self.ask(4, "info")["port"], 7)
                 fcntl.ioctl(taken, termios.TIOCNXCL)
             finally:
                 os.close(taken)

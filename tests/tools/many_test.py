@@ -126,4 +126,5 @@ class ManyHandsets(ToolTest):
             self.assertLessEqual(len(lines), 5)
             self.assertLessEqual(max(map(len, lines), default=0), 39)
         self.assertIn("6 in all: 6 working", frames[0] + frames[1])
+        self.assertRegex("".join(frames), r"(?m)^COM\d 000000\d\d.* \d+ %  .*0:\d\d left\r?$", "of 40 columns, these are kept")
         self.assertIn("6 handsets passed", frames[-1])

@@ -134,7 +134,7 @@ class ToolTest(unittest.TestCase):
         answer = json.loads(done.out)
         self.assertEqual(done.out.count("\n"), 1)
         self.assertNotRegex(done.out, "[\x00-\x09\x0b-\x1f\x7f-\x9f]", "a terminal may obey it")
-        self.assertEqual(answer["ok"], code == 0)
+        self.assertEqual((answer["ok"], answer["schema"]), (code == 0, 1))
         if code != 0:
             self.assertEqual(answer["error"]["code"], code)
             for member in ("name", "text", "hint"):

@@ -81,7 +81,11 @@ void TellLogFileTrouble(const Context& context) {
 int End(const Context& context, const ToolError& error) {
   try {
     TellLogFileTrouble(context);
-    context.out.Failure(error, context.found);
+    Json members = Json::object();
+    const bool is_of_one = !context.all && context.session.port.find_first_of(",-") == std::string::npos;
+    if (is_of_one && LatestPort() != 0) members["port"] = LatestPort();
+    members.update(context.found);
+    context.out.Failure(error, members);
   } catch (const std::exception&) {  // nobody is left to be told
   }
   return static_cast<int>(error.code());

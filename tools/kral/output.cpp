@@ -12,6 +12,7 @@ namespace kral::tool {
 namespace {
 
 constexpr std::size_t kDumpWidth = 16;
+constexpr int kSchema = 1;  // of the objects; grows when a member changes its meaning or goes
 
 bool IsPrintable(char character) {
   return character >= ' ' && character <= '~';
@@ -82,7 +83,7 @@ void Output::Failure(const ToolError& error, const Json& members) const {
 }
 
 void Output::WriteObject(bool ok, const Json& members) const {
-  Json object{{"ok", ok}};
+  Json object{{"ok", ok}, {"schema", kSchema}};
   object.update(members);
   WriteData(JsonLine(object));
 }

@@ -26,6 +26,13 @@ std::string Shortened(const std::string& text, std::size_t room) {
   return "..." + text.substr(text.size() - (room - 3));
 }
 
+// "45 %  1.2 MiB/s  0:07 left" without what is in the middle: how long it still takes is worth more than the rate.
+std::string WithoutRate(const std::string& figures) {
+  const auto first = figures.find("  ");
+  const auto last = figures.rfind("  ");
+  return first == last ? figures : figures.substr(0, first) + figures.substr(last);
+}
+
 }  // namespace
 
 std::string SizeText(std::uint64_t bytes) {
@@ -40,7 +47,9 @@ std::string SizeText(std::uint64_t bytes) {
 std::string BarLine(const std::string& title, const WorkShown& shown, std::size_t width) {
   const auto text = shown.subject.empty() ? shown.work : shown.work + " " + shown.subject;
   std::string bar;
-  const auto taken = title.size() + shown.figures.size() + 2;
+  auto figures = shown.figures;
+  if (title.size() + figures.size() + 2 > width) figures = WithoutRate(figures);
+  const auto taken = title.size() + figures.size() + 2;
   auto room = width - std::min(width, taken);
   if (shown.total > 0 && room > text.size() + kNarrowestBar + 4) {
     const auto cells = std::min(room - text.size() - 4, kWidestBar);
@@ -49,7 +58,7 @@ std::string BarLine(const std::string& title, const WorkShown& shown, std::size_
     bar = Format("  [{}{}]", std::string(full, '#'), std::string(cells - full, '-'));
     room -= bar.size();
   }
-  return (title + Shortened(text, room) + bar + "  " + shown.figures).substr(0, width);
+  return (title + Shortened(text, room) + bar + "  " + figures).substr(0, width);
 }
 
 std::string DurationText(std::uint64_t seconds) {

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <charconv>
 #include <cstdio>
 #include <memory>
@@ -110,6 +111,8 @@ ToolError PortError(std::uint16_t port, std::int32_t state, bool was_connected,
           "check the cable; a handset that restarts comes back on its port after a while", record};
 }
 
+std::atomic<std::uint16_t> latest_port{0};
+
 constexpr const char* kLivenessCheck = "the question whether a handset is there";
 
 // Something answers, if not what was asked for.
@@ -137,6 +140,10 @@ std::string DescribePort(std::uint16_t port) {
   return device.empty() || device.find(name) != std::string::npos ? name : Format("{} ({})", name, device);
 }
 
+std::uint16_t LatestPort() {
+  return latest_port;
+}
+
 std::vector<std::uint16_t> ListPorts() {
   std::vector<std::uint16_t> ports(kMostPorts);
   std::uint16_t count = kMostPorts;
@@ -161,6 +168,7 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
   if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
+  latest_port = port_;
   ThrowIfInterrupted();
   handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
   if (handle_ == 0) {

@@ -33,6 +33,9 @@ std::string DescribePort(std::uint16_t port);
 std::vector<std::uint16_t> ListPorts();
 std::vector<std::uint16_t> ListPortsWithHandset();
 
+// On which the latest session of this process began; 0 for none.
+std::uint16_t LatestPort();
+
 // A handset that is being downloaded to does not answer diagnostic requests.
 // One in its boot loader says hello once: its port is not even opened.
 enum class Expected { kAnswers, kMayBeInDownload, kInBootLoader };

@@ -7,6 +7,7 @@
 #include <set>
 #include <utility>
 
+#include "platform/console.h"
 #include "platform/file_util.h"
 #include "platform/folder.h"
 #include "tools/kral/format.h"
@@ -17,7 +18,19 @@ namespace {
 
 constexpr std::uint64_t kLargestFile = 256u << 20;  // more than handsets hold; what is compared is kept in memory
 
+// Read once, for as many handsets as there are.
+const Bytes& StandardInput() {
+  static const Bytes all = [] {
+    Bytes bytes;
+    if (ReadStandardInput(kLargestFile, bytes)) return bytes;
+    throw ToolError(ExitCode::kBadFile, "the standard input cannot be read whole",
+                    Format("it may have {}", SizeText(kLargestFile)));
+  }();
+  return all;
+}
+
 Bytes ReadLocal(const std::string& path) {
+  if (path == kStandardInput) return StandardInput();
   Bytes bytes;
   if (LookAt(path).kind == LocalKind::kOther) {
     throw ToolError(ExitCode::kBadFile, Format("{} is no ordinary file", path),
@@ -140,9 +153,10 @@ const char* Copier::GetOne(const Job& job) {
 // --- To the handset -------------------------------------------------------------------------------------------------
 
 void Copier::Put(const std::string& source, const std::string& target) {
-  const auto local = LookAt(source);
+  auto local = LookAt(source);
+  if (source == kStandardInput) local = {LocalKind::kFile, StandardInput().size()};
   const auto there = files_.Find(target);
-  const bool into = there && there->is_directory() && IsName(LastName(source));
+  const bool into = source != kStandardInput && there && there->is_directory() && IsName(LastName(source));
   const auto to = into ? JoinEfs(target, LastName(source)) : target;
   if (local.kind == LocalKind::kFolder && !options_.recursive) throw NeedsRecursion(source);
   const auto plan = [&] {

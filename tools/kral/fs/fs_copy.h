@@ -20,6 +20,8 @@ struct CopyOptions {
   bool item = false;    // put as item files
 };
 
+inline constexpr const char* kStandardInput = "-";  // in place of a local file to put
+
 // For one Get or Put. A target that is a folder takes the source in under its name; anything else is the new name.
 class Copier {
  public:

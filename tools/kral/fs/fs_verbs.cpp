@@ -379,6 +379,7 @@ void Get(Context& context, RemoteFiles& files, const FsOptions& options) {
 
 void CheckPut(const FsOptions& options) {
   CheckSides(options.paths[1], options.paths[0]);
+  if (options.paths[0] == kStandardInput) return;
   if (LookAt(options.paths[0]).kind == LocalKind::kMissing) {
     throw ToolError(ExitCode::kBadFile, Format("there is no {}", options.paths[0]), "check the name");
   }
@@ -412,7 +413,7 @@ constexpr Verb kVerbs[] = {
     {"ls", "List a directory", "path", 0, 1, List},
     {"mkdir", "Make directories", "paths", 1, kMany, MakeDirectories},
     {"mv", "Rename or move: mv OLD NEW", "paths", 2, 2, Move},
-    {"put", "Copy to the handset, and compare: put LOCAL :PATH", "paths", 2, 2, Put, CheckPut},
+    {"put", "Copy to the handset, and compare: put LOCAL :PATH; - is the standard input", "paths", 2, 2, Put, CheckPut},
     {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles, CheckRemove},
     {"rmdir", "Remove empty directories", "paths", 1, kMany, RemoveDirectories},
     {"stat", "Print what there is to know about a path", "path", 1, 1, Stat},

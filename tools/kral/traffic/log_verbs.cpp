@@ -288,6 +288,7 @@ void AddLogVerbs(const Command& root, Context& context) {
 
   const auto list = log.Verb("list", "Print which log codes are on");
   list.Add("--names", options->names, "Table of log names");
+  list.ForMany();
   run(list, List);
 
   for (const bool on : {true, false}) {
@@ -295,13 +296,16 @@ void AddLogVerbs(const Command& root, Context& context) {
     AddCodes(verb, options, "codes");
     verb.Add("--category", options->categories, "Message categories, as well");
     verb.Flag("--all", options->all, "Every log code that the handset has");
+    verb.ForMany();
     run(verb, [on](const Context& c, LogOptions& o) { Switch(c, o, on); });
   }
 
   const auto capture = log.Verb("capture", "Write what comes to a file, until Ctrl-C");
-  capture.Add("file", options->file, "The capture file; it is emptied when the codes are on").Required();
+  capture.Add("file", options->file, "The capture file; it is emptied when the codes are on").Required().File();
   AddCodes(capture, options, "--on");
   options->limit.AddTo(capture, "packets");
+  capture.ForMany();
+  capture.Writes([options] { return std::vector<std::string>{options->file}; });
   run(capture, Capture);
 
   const auto play = log.Verb("play", "Print the packets of a capture file; needs no handset");
