@@ -7,7 +7,7 @@ import signal
 import termios
 import time
 
-from tool import PATIENCE, ToolTest, start, wait_until
+from tool import PATIENCE, ToolTest, run, start, wait_until
 
 
 class Traffic(ToolTest):
@@ -85,6 +85,14 @@ class Traffic(ToolTest):
                 if code == 0:
                     self.assertEqual(packets, json.loads(out)["packets"])
             os.remove(file)
+
+    def test_a_handset_whose_answers_stand_behind_its_logs_is_told_as_such(self):
+        with self.handset("--logs", "2000", "--rate", "20k"):
+            run("-p", "7", "log", "on", "0x1001-0x1008", "--time-out", "300", ports=self.ports)
+            wait_until(lambda: run("-p", "7", "info", "--time-out", "300", ports=self.ports).returncode != 0)
+            error = self.ask(5, "info", "--time-out", "300")["error"]
+            self.assertRegex(error["text"], r"^COM7 .* sends [0-9]+ packets/s and answers late$")
+            self.assertIn("kral log off --all", error["hint"])
 
     def test_reader_may_be_slow_and_may_leave(self):
         def waiting(stream):

@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <memory>
 
+#include "platform/clock.h"
 #include "platform/file_util.h"
 #include "platform/port_list.h"
 #include "tools/kral/call_failure.h"
@@ -22,6 +23,8 @@ namespace {
 
 constexpr std::uint16_t kMostPorts = 256;
 constexpr int kMostAskings = 3;
+constexpr std::int32_t kTrafficMs = 200;
+constexpr double kLeastTraffic = 10;  // packets a second that are no answers to earlier requests
 
 std::string Describe(const std::vector<std::uint16_t>& ports) {
   std::string text;
@@ -217,6 +220,30 @@ bool Session::AnswersInTheEnd() const {
   return answers;
 }
 
+// What it sends by itself stands in front of its answer: while such packets come it is asked once more, for as long as
+// any answer may take. The rate is 0 when none come.
+bool Session::AnswersBehindTraffic(double& packets_per_second) const {
+  const auto received = [this] {
+    KRAL_TRAFFIC_COUNTERS counters{};
+    return KRAL_GetTrafficCounters(handle_, &counters) == 0 ? std::uint64_t{0} : counters.packets_received;
+  };
+  Clock& clock = SystemClock();
+  const auto packets = received();
+  const auto start = clock.TickMs();
+  const std::int32_t before = KRAL_GetTimeOut(handle_, KRAL_TIME_OUT_LIVENESS);
+  // First for a moment only, which tells whether anything comes at all.
+  for (const std::int32_t wait : {kTrafficMs, KRAL_GetTimeOut(handle_, KRAL_TIME_OUT_COMMAND)}) {
+    KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_LIVENESS, std::max(before, wait));
+    const bool answers = KRAL_IsPhoneConnected(handle_) != 0;
+    KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_LIVENESS, before);
+    const auto elapsed = std::max<std::uint32_t>(clock.TickMs() - start, 1);
+    packets_per_second = static_cast<double>(received() - packets) * 1000 / elapsed;
+    if (answers) return true;
+    if (packets_per_second < kLeastTraffic || TroubleOf(handle_) || Interrupted()) return false;
+  }
+  return false;
+}
+
 // What has the line of a handset that is being downloaded to, in words; null for anything else. A no-operation of
 // either tells; handsets in diagnostic mode refuse both.
 const char* Session::DownloadState() const {
@@ -248,6 +275,15 @@ void Session::CheckAnswers(Expected expected) {
   // What came to the first question may be in the way of the later ones.
   if (!IsOtherThanSilence(record)) record = LastError(handle_);
   if (const auto trouble = TroubleOf(handle_)) throw PortError(port_, *trouble, false, record);
+  double rate = 0;
+  answers_ = AnswersBehindTraffic(rate);
+  if (answers_) return;
+  ThrowIfInterrupted();
+  if (rate >= kLeastTraffic) {
+    throw ToolError(ExitCode::kNoAnswer,
+                    Format("{} sends {:.0f} packets/s and answers late", DescribePort(port_), rate),
+                    "kral log off --all, with --time-out 60000 where its answer has to wait as well", record);
+  }
   if (may_be_in_download) return;
   if (const auto* const state = DownloadState()) {
     throw ToolError(ExitCode::kRefused, Format("{} runs {}, and no diagnostics", DescribePort(port_), state),

@@ -72,6 +72,7 @@ class Session {
   void StartLog(const SessionOptions& options) const;
   void CheckAnswers(Expected expected);
   bool AnswersInTheEnd() const;
+  bool AnswersBehindTraffic(double& packets_per_second) const;
   const char* DownloadState() const;
 
   std::uint16_t port_;
