@@ -10,7 +10,7 @@ else()
   pkg_check_modules(xml2 REQUIRED IMPORTED_TARGET GLOBAL libxml-2.0)
   set(KRAL_LIBRARIES_platform PkgConfig::xml2)
 endif()
-set(KRAL_LIBRARIES_storage_nv z)
+set(KRAL_LIBRARIES_base z)
 
 if(KRAL_PRECOMPILE)
   file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/generated/precompiled.cpp CONTENT "")

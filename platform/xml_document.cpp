@@ -72,6 +72,13 @@ std::optional<size_t> EndOfTag(const Markup& markup, size_t begin) {
   return markup.size();
 }
 
+// False when the element is not among these.
+bool CountInFront(const XmlElement& at, const XmlElement& element, size_t& count) {
+  if (&at == &element) return true;
+  ++count;
+  return std::ranges::any_of(at.children, [&](const XmlElement& child) { return CountInFront(child, element, count); });
+}
+
 }  // namespace
 
 bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem) {
@@ -93,6 +100,35 @@ bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem) {
     }
   }
   return true;
+}
+
+uint32_t LineOf(std::span<const uint8_t> document, const XmlElement& root, const XmlElement& element) {
+  size_t in_front = 0;  // elements that begin before this one
+  if (!CountInFront(root, element, in_front)) return 0;
+  const Markup markup(document);
+  uint32_t line = 1;
+  size_t seen = 0;  // the character up to which lines are counted
+  const auto count_to = [&](size_t end) {
+    for (; seen < end; ++seen) {
+      if (markup[seen] == '\n') ++line;
+    }
+  };
+  for (size_t at = 0; at < markup.size(); ++at) {
+    if (markup[at] != '<') continue;
+    count_to(at);
+    if (markup.StartsAt(at, "<!--")) {
+      at = markup.EndOf("-->", at + 4);
+    } else if (markup.StartsAt(at, "<![CDATA[")) {
+      at = markup.EndOf("]]>", at);
+    } else if (markup.StartsAt(at, "<?")) {
+      at = markup.EndOf("?>", at);
+    } else if (!markup.StartsAt(at, "</") && in_front-- == 0) {
+      return line;
+    } else {
+      at = EndOfTag(markup, at).value_or(markup.size());
+    }
+  }
+  return 0;
 }
 
 const std::string* XmlElement::Attribute(std::string_view wanted) const {

@@ -43,6 +43,10 @@ XmlResult LoadXml(const std::string& path, XmlElement& root, std::string& proble
 // beyond its limits.
 bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem);
 
+// The line, from 1, on which an element of the parsed document begins. Parsers need not tell it, so the document is
+// looked through: for messages.
+uint32_t LineOf(std::span<const uint8_t> document, const XmlElement& root, const XmlElement& element);
+
 // For text and attribute values: & < > " ' become entities.
 std::string EscapeXml(std::string_view text);
 

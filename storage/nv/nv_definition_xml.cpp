@@ -9,9 +9,9 @@
 #include <unordered_map>
 #include <utility>
 
+#include "base/xml_attributes.h"
 #include "commands/ftm/rf_nv.h"
 #include "commands/nv/nv_item.h"
-#include "storage/nv/nv_xml.h"
 
 namespace kral::nv {
 namespace {

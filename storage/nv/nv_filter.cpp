@@ -6,8 +6,8 @@
 #include <string_view>
 #include <utility>
 
+#include "base/xml_attributes.h"
 #include "platform/file_util.h"
-#include "storage/nv/nv_xml.h"
 #include "storage/pkv/pkv_format.h"
 
 namespace kral::nv {

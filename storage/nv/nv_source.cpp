@@ -5,8 +5,8 @@
 #include <charconv>
 #include <utility>
 
+#include "base/xml_attributes.h"
 #include "platform/file_util.h"
-#include "storage/nv/nv_xml.h"
 
 namespace kral::nv {
 namespace {

@@ -4,8 +4,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/deflate.h"
 #include "commands/nv/nv_item.h"
-#include "storage/nv/nv_compression.h"
 
 namespace kral::nv {
 namespace {

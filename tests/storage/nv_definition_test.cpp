@@ -1,5 +1,5 @@
 // The NV tool's definitions and values: what the files may say, how values turn into numbers and back.
-#include "storage/nv/nv_compression.h"
+#include "base/deflate.h"
 #include "storage/nv/nv_data_type.h"
 #include "storage/nv/nv_value.h"
 #include "tests/support/nv_fixture.h"
@@ -82,17 +82,17 @@ TEST(NvDataTypeTest, HexTextsAreStrict) {
 
 TEST(NvCompression, StreamsEndWhereTheySay) {
   std::vector<uint8_t> plain(5000, 7);
-  auto stream = nv::Compress(plain);
+  auto stream = Compress(plain);
   EXPECT_LT(stream.size(), 128u);
   auto padded = stream;
   padded.resize(128);
-  EXPECT_EQ(nv::Decompress(padded, 5000), plain);
-  EXPECT_FALSE(nv::Decompress(padded, 4999)) << "more than it may hold";
+  EXPECT_EQ(Decompress(padded, 5000), plain);
+  EXPECT_FALSE(Decompress(padded, 4999)) << "more than it may hold";
   stream.pop_back();
-  EXPECT_FALSE(nv::Decompress(stream, 5000)) << "cut";
+  EXPECT_FALSE(Decompress(stream, 5000)) << "cut";
   padded[4] ^= 0x55;
-  EXPECT_FALSE(nv::Decompress(padded, 5000)) << "damaged";
-  EXPECT_FALSE(nv::Decompress({}, 5000));
+  EXPECT_FALSE(Decompress(padded, 5000)) << "damaged";
+  EXPECT_FALSE(Decompress({}, 5000));
 }
 
 // --- Definition files ------------------------------------------------------------------------------------------------

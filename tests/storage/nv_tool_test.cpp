@@ -1,6 +1,6 @@
 // The NV tool and the handset: sets, single items, subscriptions, arrays, and what goes wrong.
+#include "base/deflate.h"
 #include "kral/pkv.h"
-#include "storage/nv/nv_compression.h"
 #include "storage/nv/nv_definitions.h"
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/nv_fixture.h"
@@ -40,7 +40,7 @@ TEST_F(NvTool, EveryKindOfItemSurvivesEveryWay) {
   EXPECT_EQ(HexText(ByteView(*handset().nv().Element(3101, 3)).first(4)), "2C 01 04 00");
   EXPECT_EQ(HexText(*handset().efs().File(name)), "01 4B 72");
   EXPECT_EQ(HexText(*handset().efs().File("/nv/item_files/rfnv/00020002")), "B3 FF");
-  EXPECT_EQ(nv::Decompress(*handset().nv().Value(3300), 512)->size(), 512u);
+  EXPECT_EQ(Decompress(*handset().nv().Value(3300), 512)->size(), 512u);
   EXPECT_TRUE(HasLine(KRAL_LOG_RET, "DIAG_NV_WRITE_F NV Id:453 Status:0"));
 
   const std::string pkv = Pkv();

@@ -1,9 +1,9 @@
 // Reads attributes; what they mean is left to the readers of definitions, sources and filters.
-#include "storage/nv/nv_xml.h"
+#include "base/xml_attributes.h"
 
 #include <charconv>
 
-namespace kral::nv {
+namespace kral {
 namespace {
 
 [[noreturn]] void Reject(const XmlElement& element, std::string_view name, const std::string& value) {
@@ -49,4 +49,4 @@ std::string AttributeText(std::string_view name, std::string_view value) {
   return std::string(" ").append(name).append("=\"").append(EscapeXml(value)).append("\"");
 }
 
-}  // namespace kral::nv
+}  // namespace kral

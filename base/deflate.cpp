@@ -1,11 +1,11 @@
-// Item data through zlib's deflate and inflate streams.
-#include "storage/nv/nv_compression.h"
+// Data through zlib's deflate and inflate streams.
+#include "base/deflate.h"
 
 #include <zlib.h>
 
 #include <new>
 
-namespace kral::nv {
+namespace kral {
 namespace {
 
 // zlib takes its input through a pointer that is not const and does not write through it.
@@ -45,4 +45,4 @@ std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> bytes, s
   return plain;
 }
 
-}  // namespace kral::nv
+}  // namespace kral

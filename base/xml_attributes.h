@@ -1,6 +1,6 @@
-// Attributes of the NV tool's XML files, checked.
-#ifndef KRAL_STORAGE_NV_NV_XML_H
-#define KRAL_STORAGE_NV_NV_XML_H
+// Attributes of definition, source and filter files, checked.
+#ifndef KRAL_BASE_XML_ATTRIBUTES_H
+#define KRAL_BASE_XML_ATTRIBUTES_H
 
 #include <cstdint>
 #include <optional>
@@ -10,7 +10,7 @@
 
 #include "platform/xml_document.h"
 
-namespace kral::nv {
+namespace kral {
 
 // A document that is well-formed and still cannot be used. The text tells where and why.
 class BadXml : public std::runtime_error {
@@ -32,6 +32,6 @@ std::string TextAttribute(const XmlElement& element, std::string_view name);
 // As it is written: a blank, the name, and the value in quotation marks.
 std::string AttributeText(std::string_view name, std::string_view value);
 
-}  // namespace kral::nv
+}  // namespace kral
 
 #endif

@@ -1,6 +1,6 @@
-// Item data that a handset keeps as a zlib stream.
-#ifndef KRAL_STORAGE_NV_NV_COMPRESSION_H
-#define KRAL_STORAGE_NV_NV_COMPRESSION_H
+// Data that handsets keep or send as zlib streams.
+#ifndef KRAL_BASE_DEFLATE_H
+#define KRAL_BASE_DEFLATE_H
 
 #include <cstddef>
 #include <cstdint>
@@ -8,7 +8,7 @@
 #include <span>
 #include <vector>
 
-namespace kral::nv {
+namespace kral {
 
 std::vector<uint8_t> Compress(std::span<const uint8_t> bytes);
 
@@ -16,6 +16,6 @@ std::vector<uint8_t> Compress(std::span<const uint8_t> bytes);
 // unfinished, or holds more than `limit` bytes.
 std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> stream, size_t limit);
 
-}  // namespace kral::nv
+}  // namespace kral
 
 #endif
