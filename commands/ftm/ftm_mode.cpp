@@ -80,8 +80,7 @@ bool GetCommandCode(Diag_FTM& phone, uint16_t* code) {
   return true;
 }
 
-bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
-  phone.packet().Reset();
+bool ChooseModeId(Diag_FTM& phone, uint16_t rf_mode) {
   Settings& settings = phone.state<Settings>();
   settings.last_rf_mode = rf_mode;  // also when the mode is refused below
   const auto mode_id = ModeIdForRfMode(rf_mode, settings.mode_id);
@@ -90,8 +89,18 @@ bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the RF mode %d is not one of the listed modes, 2 to 92", rf_mode));
   }
   settings.mode_id = *mode_id;
-  const bool sent = static_cast<bool>(Send(phone, kSetMode, rf_mode));
+  return true;
+}
+
+void WaitAfterMode(Diag_FTM& phone, uint16_t rf_mode) {
   if (IsGsmMode(rf_mode)) WaitAfterGsmMode(phone);
+}
+
+bool SetMode(Diag_FTM& phone, uint16_t rf_mode) {
+  phone.packet().Reset();
+  if (!ChooseModeId(phone, rf_mode)) return false;
+  const bool sent = static_cast<bool>(Send(phone, kSetMode, rf_mode));
+  WaitAfterMode(phone, rf_mode);
   return sent;
 }
 

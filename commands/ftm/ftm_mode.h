@@ -41,6 +41,10 @@ bool SetCommandCode(Diag_FTM& phone, uint16_t code);
 bool GetCommandCode(Diag_FTM& phone, uint16_t* code);
 
 bool SetMode(Diag_FTM& phone, uint16_t rf_mode);
+// What stands around its request: the mode id that the RF mode needs becomes the current one (false for an RF mode that
+// has none), and a handset needs a while after some of them.
+bool ChooseModeId(Diag_FTM& phone, uint16_t rf_mode);
+void WaitAfterMode(Diag_FTM& phone, uint16_t rf_mode);
 Reply SetChannel(Diag_FTM& phone, uint16_t channel);
 Reply SetTxOn(Diag_FTM& phone);
 Reply SetTxOff(Diag_FTM& phone);

@@ -55,6 +55,7 @@
 #include "kral/types.h"
 
 #include "kral/band.h"
+#include "kral/cmd.h"
 #include "kral/connection.h"
 #include "kral/diag.h"
 #include "kral/download.h"
