@@ -36,6 +36,7 @@ add_custom_target(kral_bindings ALL DEPENDS ${KRAL_BINDINGS_DIR}/Kral.cs ${KRAL_
 
 install(FILES ${KRAL_BINDINGS_DIR}/Kral.cs ${KRAL_BINDINGS_DIR}/kral_labview.h
   DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
+install(DIRECTORY ${PROJECT_SOURCE_DIR}/share/kral/commands DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
 if(WIN32)
   set(python_folder python)
 else()

@@ -28,9 +28,12 @@ using defined::Field;
 using defined::Kind;
 
 static_assert(sizeof(KRAL_CMD_FIELD) == 448);
+static_assert(sizeof(KRAL_CMD_COMMAND) == 256);
+static_assert(KRAL_CMD_FRAME_SUBSYSTEM == static_cast<uint32_t>(defined::Frame::kSubsystem));
 static_assert(KRAL_CMD_KIND_ZLIB == static_cast<uint32_t>(Kind::kPacked));
 static_assert(KRAL_CMD_NO_INDEX == defined::kNoSlot);
 
+constexpr const char* kNoRecord = "there is no record, or its size is too small";
 constexpr const char* kNoOutput = "there is no place for the result";
 
 bool Refused(const char* what) {
@@ -104,8 +107,7 @@ bool GiveBytes(std::span<const uint8_t> bytes, uint8_t* output, uint32_t* size) 
   return true;
 }
 
-// --- Fields as records
-// ------------------------------------------------------------------------------------------------
+// --- Fields as records ----------------------------------------------------------------------------------------------
 
 // Field `number` of a tree, groups in front of their fields.
 const Field* FieldAt(const std::vector<Field>& fields, uint32_t& number) {
@@ -137,6 +139,7 @@ uint32_t FlagsOf(const Field& field) {
   if (field.is_status()) flags |= KRAL_CMD_FIELD_STATUS;
   if (field.preset || field.preset_bytes) flags |= KRAL_CMD_FIELD_DEFAULT;
   if (field.enumeration) flags |= KRAL_CMD_FIELD_WORDS;
+  if (field.counts) flags |= KRAL_CMD_FIELD_COUNTS;
   return flags;
 }
 
@@ -162,8 +165,28 @@ void FillRecord(const Field& field, KRAL_CMD_FIELD& record) {
   CopyText(field.documentation, record.documentation);
 }
 
-// --- Values
-// ------------------------------------------------------------------------------------------------------------
+uint32_t CountFields(const std::vector<Field>& fields) {
+  auto count = static_cast<uint32_t>(fields.size());
+  for (const Field& field : fields) count += CountFields(field.members);
+  return count;
+}
+
+void FillRecord(const defined::Command& command, KRAL_CMD_COMMAND& record) {
+  const defined::Framing& framing = command.framing;
+  record = {};
+  record.size = sizeof record;
+  record.id = command.id;
+  record.frame = static_cast<uint32_t>(framing.frame);
+  record.mode_id = framing.mode_id;
+  if (framing.mode_rule == defined::ModeRule::kCurrent) record.mode_id = KRAL_CMD_MODE_CURRENT;
+  if (framing.mode_rule == defined::ModeRule::kByRfMode) record.mode_id = KRAL_CMD_MODE_BY_RF_MODE;
+  record.subsystem = framing.subsystem;
+  record.request_fields = CountFields(command.request.fields);
+  record.reply_fields = CountFields(command.reply.fields);
+  CopyText(command.documentation, record.documentation);
+}
+
+// --- Values ---------------------------------------------------------------------------------------------------------
 
 // A real number for a field of whole ones.
 Bits WholeBits(const Field& field, double value) {
@@ -272,10 +295,20 @@ uint8_t KRAL_CALL KRAL_CMD_DescribeLength(KRAL_HANDLE handle, const char* comman
   });
 }
 
+uint8_t KRAL_CALL KRAL_CMD_GetCommand(KRAL_HANDLE handle, const char* command, KRAL_CMD_COMMAND* record) {
+  return ExportCall(handle, __func__)
+      .Require(record != nullptr && record->size >= sizeof *record, kNoRecord)
+      .Run([=](Diag_FTM& phone) {
+        const auto found = defined::FindCommand(phone, TextOrEmpty(command));
+        if (found) FillRecord(*found, *record);
+        return found != nullptr;
+      });
+}
+
 uint8_t KRAL_CALL KRAL_CMD_GetField(KRAL_HANDLE handle, const char* command, uint8_t of_reply, uint32_t number,
                                     KRAL_CMD_FIELD* field) {
   return ExportCall(handle, __func__)
-      .Require(field != nullptr && field->size >= sizeof *field, "there is no record, or its size is too small")
+      .Require(field != nullptr && field->size >= sizeof *field, kNoRecord)
       .Run([=](Diag_FTM& phone) {
         const auto found = defined::FindCommand(phone, TextOrEmpty(command));
         if (!found) return false;
@@ -285,6 +318,20 @@ uint8_t KRAL_CALL KRAL_CMD_GetField(KRAL_HANDLE handle, const char* command, uin
         FillRecord(*at, *field);
         return true;
       });
+}
+
+uint8_t KRAL_CALL KRAL_CMD_GetWord(KRAL_HANDLE handle, const char* command, uint8_t of_reply, uint32_t index,
+                                   uint32_t number, char* word, uint32_t size, int64_t* value) {
+  return ExportCall(handle, __func__).Require(value != nullptr, kNoOutput).Run([=](Diag_FTM& phone) {
+    const auto found = defined::FindCommand(phone, TextOrEmpty(command));
+    if (!found) return false;
+    const auto& slots = of_reply != 0 ? found->reply.slots : found->request.slots;
+    const auto* const words = index < slots.size() ? slots[index]->enumeration.get() : nullptr;
+    if (words == nullptr || number >= words->values.size()) return Refused("there is no such word");
+    if (!GiveText(words->values[number].first, word, size)) return false;
+    *value = static_cast<int64_t>(words->values[number].second);
+    return true;
+  });
 }
 
 uint8_t KRAL_CALL KRAL_CMD_Call(KRAL_HANDLE handle, const char* command, const char* fields, char* reply,

@@ -80,6 +80,7 @@ struct Field {
   uint8_t first_bit = 0;  // of a member of a word
   uint8_t bit_count = 0;
   bool is_array = false;
+  bool counts = false;  // the elements or bytes of a later field
   Extent count;
   Extent size;  // of texts, blocks and streams
   std::optional<Bits> least;
@@ -137,7 +138,7 @@ struct Command {
 
 using CommandPtr = std::shared_ptr<const Command>;
 
-// --- Numbers of a field ----------------------------------------------------------------------------------------------
+// --- Numbers of a field ---------------------------------------------------------------------------------------------
 
 unsigned BitCount(const Field& field);
 // What is read as a signed number of so many bits.

@@ -49,8 +49,7 @@ class Reader {
     }
   }
 
-  // --- What families share
-  // ---------------------------------------------------------------------------------------------
+  // --- What families share ------------------------------------------------------------------------------------------
 
   void ReadEnumeration(const XmlElement& element) {
     const std::string name = RequiredText(element, "name");
@@ -101,7 +100,7 @@ class Reader {
     file_.at = &element;
   }
 
-  // --- Families ------------------------------------------------------------------------------------------------------
+  // --- Families -----------------------------------------------------------------------------------------------------
 
   void ReadFamily(const XmlElement& element) {
     const std::string family = RequiredText(element, "name");

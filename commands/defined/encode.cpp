@@ -26,8 +26,7 @@ class Encoder {
     Bits value;
   };
 
-  // --- Numbers
-  // ---------------------------------------------------------------------------------------------------------
+  // --- Numbers ------------------------------------------------------------------------------------------------------
 
   // The value of a number: set, following from what it counts, or by default.
   const Bits* Find(uint32_t slot, uint32_t element) const {
@@ -53,8 +52,7 @@ class Encoder {
     return listed != condition.is_not;
   }
 
-  // --- What a count or size counts
-  // -------------------------------------------------------------------------------------
+  // --- What a count or size counts ----------------------------------------------------------------------------------
 
   // Counts need not be given where what they count is: they stand in front of it.
   void DeriveCounts(const std::vector<Field>& fields, uint32_t depth) {
@@ -95,8 +93,7 @@ class Encoder {
     return static_cast<uint32_t>(bytes != nullptr ? bytes->size() : field.preset_bytes.value_or("").size());
   }
 
-  // --- Fields
-  // ----------------------------------------------------------------------------------------------------------
+  // --- Fields -------------------------------------------------------------------------------------------------------
 
   void Group(const std::vector<Field>& fields, uint32_t depth, std::vector<uint8_t>& bytes) {
     DeriveCounts(fields, depth);
@@ -198,8 +195,7 @@ class Encoder {
     }
   }
 
-  // --- Values without a place
-  // ------------------------------------------------------------------------------------------
+  // --- Values without a place ---------------------------------------------------------------------------------------
 
   void Use(const Field& field, uint32_t element) {
     ++used_;

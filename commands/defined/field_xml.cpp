@@ -65,13 +65,6 @@ bool IsOpen(const Field& field) {
          (field.kind == Kind::kRecord && IsOpen(field.members.back()));
 }
 
-void CollectSlots(const std::vector<Field>& fields, std::vector<const Field*>& slots) {
-  for (const Field& field : fields) {
-    if (field.slot != kNoSlot) slots.push_back(&field);
-    CollectSlots(field.members, slots);
-  }
-}
-
 }  // namespace
 
 void RequireName(const XmlElement& element, const std::string& name, bool may_begin_with_digit) {
@@ -109,9 +102,18 @@ void FieldReader::Read(const XmlElement& element) {
   message_.is_open = FlagAttribute(element, "longer");
   ReadFields(element.children, {message_.fields, nullptr, 0, 1, ""});
   file_.at = &element;
-  CollectSlots(message_.fields, message_.slots);
+  Complete(message_.fields);
   for (const Field& field : message_.fields) message_.shortest += ShortestOf(field);
   if (message_.shortest > kLongestMessage) throw BadXml("<" + element.name + "> is longer than 64 KiB");
+}
+
+// When all fields are where they stay.
+void FieldReader::Complete(std::vector<Field>& fields) {
+  for (Field& field : fields) {
+    field.counts = field.slot != kNoSlot && std::ranges::find(counters_, field.slot) != counters_.end();
+    if (field.slot != kNoSlot) message_.slots.push_back(&field);
+    Complete(field.members);
+  }
 }
 
 void FieldReader::ReadFields(const std::vector<XmlElement>& elements, const Scope& scope) {
@@ -258,7 +260,7 @@ void FieldReader::ReadExtents(const XmlElement& element, const Scope& scope, Fie
 }
 
 Extent FieldReader::ReadExtent(const XmlElement& element, const char* name, const char* most_name, uint64_t limit,
-                               const Scope& scope) const {
+                               const Scope& scope) {
   const std::string& text = *element.Attribute(name);
   const std::string where = TextAttribute(element, "name") + ": " + name + "=\"" + text + "\"";
   const auto most = NumberAttribute(element, most_name, limit);
@@ -277,6 +279,7 @@ Extent FieldReader::ReadExtent(const XmlElement& element, const char* name, cons
   }
   extent.rule = Extent::Rule::kCounted;
   const Field& counter = Resolve(text, scope, extent.counted_by);
+  counters_.push_back(counter.slot);
   if (counter.kind == Kind::kSigned && (!counter.least || static_cast<int64_t>(*counter.least) < 0)) {
     throw BadXml(where + " may be negative");
   }

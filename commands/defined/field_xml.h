@@ -44,7 +44,7 @@ class FieldReader {
   void ReadNumber(const XmlElement& element, Field& field);
   void ReadExtents(const XmlElement& element, const Scope& scope, Field& field);
   Extent ReadExtent(const XmlElement& element, const char* name, const char* most_name, uint64_t limit,
-                    const Scope& scope) const;
+                    const Scope& scope);
   void ReadMembers(const XmlElement& element, const Scope& scope, Field& field);
   void ReadBits(const XmlElement& element, const Scope& scope, Field& word);
   void ReadRecord(const std::string& name, const Scope& scope, Field& field);
@@ -52,12 +52,14 @@ class FieldReader {
   const Field& Resolve(const std::string& name, const Scope& scope, Reference& reference) const;
   void NameField(const XmlElement& element, const Scope& scope, Field& field);
   void GiveSlot(Field& field);
+  void Complete(std::vector<Field>& fields);
   void CheckEnds(const std::vector<XmlElement>& elements, const std::vector<Field>& fields);
 
   FileContext& file_;
   Message& message_;
   std::vector<std::string> expanding_;  // records
   uint32_t next_slot_ = 0;
+  std::vector<uint32_t> counters_;  // slots
 };
 
 // Letters, digits and underscores, not too many.

@@ -82,8 +82,7 @@ class ReplyWriter {
   JsonText json_;
 };
 
-// --- Definitions
-// -------------------------------------------------------------------------------------------------------
+// --- Definitions ----------------------------------------------------------------------------------------------------
 
 void WriteExtent(JsonText& json, const char* name, const char* most_name, const Extent& extent) {
   json.Name(name);

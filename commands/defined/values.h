@@ -76,8 +76,7 @@ void Assign(std::string_view text, Values& values);
 // The slot of a path without element numbers; null for no field that has a value.
 const Field* FindSlot(const Message& message, std::string_view path);
 
-// --- Bytes
-// -------------------------------------------------------------------------------------------------------------
+// --- Bytes ----------------------------------------------------------------------------------------------------------
 
 // The bytes of the message. BadCall for a value that is missing, or that has no place in it.
 std::vector<uint8_t> Encode(const Values& values);

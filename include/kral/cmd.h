@@ -92,6 +92,42 @@ KRAL_API uint8_t KRAL_CALL KRAL_CMD_Describe(KRAL_HANDLE handle, const char* com
  */
 KRAL_API uint8_t KRAL_CALL KRAL_CMD_DescribeLength(KRAL_HANDLE handle, const char* command, uint32_t* length);
 
+/** @name Frames of a family */
+/**@{*/
+#define KRAL_CMD_FRAME_FTM 0u       /**< 75, 11, mode id, command id; or command code 59 where that is in force */
+#define KRAL_CMD_FRAME_FTM59 1u     /**< command code 59 always */
+#define KRAL_CMD_FRAME_DIAG 2u      /**< the id is the command code */
+#define KRAL_CMD_FRAME_SUBSYSTEM 3u /**< 75, subsystem, id */
+/**@}*/
+
+/** @name KRAL_CMD_COMMAND::mode_id of commands without one of their own */
+/**@{*/
+#define KRAL_CMD_MODE_CURRENT 0xFFFFFFFFu    /**< the current one */
+#define KRAL_CMD_MODE_BY_RF_MODE 0xFFFFFFFEu /**< the one of the RF mode that the first field is */
+/**@}*/
+
+/** One command: 256 bytes without padding. Its text is UTF-8, terminated, and cut where it is too long. */
+typedef struct KRAL_CMD_COMMAND {
+  uint32_t size;           /**< sizeof(KRAL_CMD_COMMAND), filled in by the caller */
+  uint32_t id;             /**< of the command */
+  uint32_t frame;          /**< KRAL_CMD_FRAME_... */
+  uint32_t mode_id;        /**< with KRAL_CMD_FRAME_FTM: the dispatcher, or KRAL_CMD_MODE_... */
+  uint32_t subsystem;      /**< with KRAL_CMD_FRAME_SUBSYSTEM */
+  uint32_t request_fields; /**< fields of the request for KRAL_CMD_GetField, groups included */
+  uint32_t reply_fields;   /**< fields of the reply */
+  uint32_t reserved;       /**< 0 */
+  char documentation[224]; /**< what the file says of it */
+} KRAL_CMD_COMMAND;
+
+/**
+ * Gets what is defined of a command, beside its fields.
+ *
+ * @param         handle  from a connect function
+ * @param         command "FAMILY.NAME"
+ * @param[in,out] record  `size` filled in by the caller
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_CMD_GetCommand(KRAL_HANDLE handle, const char* command, KRAL_CMD_COMMAND* record);
+
 /** @name Kinds of fields */
 /**@{*/
 #define KRAL_CMD_KIND_UNSIGNED 0u
@@ -112,6 +148,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_CMD_DescribeLength(KRAL_HANDLE handle, const cha
 #define KRAL_CMD_FIELD_STATUS 8u      /**< tells whether the handset did what it was asked */
 #define KRAL_CMD_FIELD_DEFAULT 16u    /**< may be left out */
 #define KRAL_CMD_FIELD_WORDS 32u      /**< has an enumeration */
+#define KRAL_CMD_FIELD_COUNTS 64u     /**< counts another field, and follows from it where it is not set */
 /**@}*/
 
 /** Index of a group, which has no value of its own. */
@@ -147,6 +184,21 @@ typedef struct KRAL_CMD_FIELD {
  */
 KRAL_API uint8_t KRAL_CALL KRAL_CMD_GetField(KRAL_HANDLE handle, const char* command, uint8_t of_reply, uint32_t number,
                                              KRAL_CMD_FIELD* field);
+
+/**
+ * Gets a word of a field's enumeration.
+ *
+ * @param      handle   from a connect function
+ * @param      command  "FAMILY.NAME"
+ * @param      of_reply 1: of the reply; 0: of the request
+ * @param      index    of the field, KRAL_CMD_FIELD::index
+ * @param      number   from 0; the first that fails is behind the last word
+ * @param[out] word     [size] terminated
+ * @param      size     bytes of word
+ * @param[out] value    the number that it stands for
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_CMD_GetWord(KRAL_HANDLE handle, const char* command, uint8_t of_reply, uint32_t index,
+                                            uint32_t number, char* word, uint32_t size, int64_t* value);
 
 /**@}*/
 /** @name Calls */

@@ -139,6 +139,12 @@ TEST_F(DefinedCommands, AreAddedListedDescribedAndCleared) {
                R"({"name":"power","type":"s16","unit":"0.01 dBm","range":"-4000 to 3000 0.01 dBm","min":-4000,)"
                R"("max":3000,"index":2}]},{"name":"label","type":"text","size":8,"default":"","index":3}],)"
                R"("reply":[{"name":"status","type":"u16","range":"0 to 65535","success":[0],"index":0}]})");
+  KRAL_CMD_COMMAND command{};
+  command.size = sizeof command;
+  ASSERT_EQ(KRAL_CMD_GetCommand(handle(), "WLAN.SET_TABLE", &command), 1);
+  EXPECT_EQ(command.id, 6u);
+  EXPECT_EQ(command.mode_id, 22u);
+  EXPECT_EQ(command.request_fields, 5u);
   KRAL_CMD_FIELD field{};
   field.size = sizeof field;
   ASSERT_EQ(KRAL_CMD_GetField(handle(), "WLAN.SET_TABLE", 0, 3, &field), 1);

@@ -78,6 +78,24 @@ void Json::update(const Json& object) {
 }
 
 struct Json::Writer {
+  static Json Value(const nlohmann::ordered_json& tree) {
+    if (tree.is_object()) {
+      Json object = Json::object();
+      for (const auto& [name, value] : tree.items()) object[name] = Value(value);
+      return object;
+    }
+    if (tree.is_array()) {
+      Json array = Json::array();
+      for (const auto& value : tree) array.push_back(Value(value));
+      return array;
+    }
+    if (tree.is_string()) return Json(tree.get<std::string>());
+    if (tree.is_boolean()) return Json(tree.get<bool>());
+    if (tree.is_number_unsigned()) return Json(static_cast<unsigned long long>(tree.get<std::uint64_t>()));
+    if (tree.is_number_integer()) return Json(static_cast<long long>(tree.get<std::int64_t>()));
+    return tree.is_number() ? Json(tree.get<double>()) : Json();
+  }
+
   static nlohmann::ordered_json Tree(const Json& json) {
     switch (json.kind_) {
       case Kind::kNull:
@@ -106,6 +124,10 @@ struct Json::Writer {
     return nullptr;
   }
 };
+
+Json Json::parsed(std::string_view text) {
+  return Writer::Value(nlohmann::ordered_json::parse(text));
+}
 
 std::string Json::dump() const {
   return Writer::Tree(*this).dump(-1, ' ', false, nlohmann::ordered_json::error_handler_t::replace);

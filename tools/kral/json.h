@@ -37,6 +37,8 @@ class Json {
   Json& operator=(Json&& other) noexcept;
   ~Json();
 
+  // What the library gives as JSON.
+  static Json parsed(std::string_view text);
   static Json array();
   static Json object();
 

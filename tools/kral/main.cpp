@@ -55,7 +55,7 @@ constexpr VerbsOf kVerbs[] = {
     {"ports", AddPortVerbs}, {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
     {"fs", AddFsVerbs},      {"ftm", AddFtmVerbs},       {"log", AddLogVerbs},     {"event", AddEventVerbs},
     {"nv", AddNvVerbs},      {"flash", AddFlashVerbs},   {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
-    {"band", AddBandVerbs},  {"raw", AddRawVerbs},       {"sim", AddSimVerbs},
+    {"band", AddBandVerbs},  {"raw", AddRawVerbs},       {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.

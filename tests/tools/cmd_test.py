@@ -1,0 +1,58 @@
+"""Commands that a definition file describes."""
+import json
+import os
+import subprocess
+
+from tool import ToolTest
+
+TREE = os.path.dirname(os.path.dirname(os.path.dirname(os.path.abspath(__file__))))
+EXAMPLE = os.path.join(TREE, "examples", "commands.xml")
+RF = os.path.join(TREE, "share", "kral", "commands", "rf.xml")
+
+# Calls each kind of function that a header has.
+PROGRAM = """#include "made.h"
+int main(void) {
+  WLAN_TX_START_REPLY reply;
+  const uint8_t channels[2] = {1, 2};
+  const int16_t powers[2] = {-5, 5};
+  return WLAN_TX_START(0, 6, (uint8_t)WLAN_TX_START_RATE_11M, 1, 0, &reply) != 0 ||
+         WLAN_SET_TABLE(0, channels, 2, powers, NULL, NULL) != 0 || RF_SET_TX_ON(0) != 0 || reply.status != 0;
+}
+"""
+
+
+class DefinedCommands(ToolTest):
+    def test_commands_are_listed_and_shown_without_a_handset(self):
+        listed = self.expect_json(0, "cmd", "list", "--defs", EXAMPLE, "--defs", RF)["commands"]
+        self.assertEqual(len(listed), 4 + 104)
+        self.assertEqual(listed[0], {"name": "WLAN.TX_START", "id": 5, "doc": "Starts to transmit"})
+        shown = self.expect_json(0, "cmd", "show", "WLAN.TX_START", "--defs", EXAMPLE)["command"]
+        self.assertEqual([field["name"] for field in shown["request"]], ["channel", "rate", "flags"])
+        self.assertEqual(shown["request"][1]["enum"], {"1M": 0, "11M": 3, "54M": 12})
+        text = self.text("cmd", "show", "WLAN.SET_TABLE", "--defs", EXAMPLE)
+        self.assertIn("    power  s16  -4000 to 3000 0.01 dBm\n", text)
+        self.assertIn("did you mean WLAN.TX_START?", self.expect(2, "cmd", "show", "WLAN.TX_STRT", "--defs", EXAMPLE).err)
+        error = self.expect_json(10, "cmd", "list", "--defs", self.add("bad.xml", b"<CommandDefinition>\n<Familie/>"
+                                                                      b"</CommandDefinition>"))["error"]
+        self.assertIn("<Familie> is not expected", error["text"])
+
+    def test_a_call_sends_its_fields_and_prints_the_reply(self):
+        with self.handset():
+            self.expect(0, "-p", "7", "mode", "ftm")
+            answer = self.ask(0, "cmd", "call", "RF.SET_LNA_RANGE", "payload=A1 B2", "--mode-id", "2", "--defs", RF)
+            self.assertEqual(answer["reply"], {"response": "A1B2"})
+            text = self.text("cmd", "call", "RF.GET_RX_AGC", "--defs", RF)
+            self.assertEqual(len(json.loads(text)["response"]), 4)
+            error = self.ask(2, "cmd", "call", "WLAN.TX_START", "channel=15", "--defs", EXAMPLE)["error"]
+            self.assertIn("channel=15 is out of range: 1 to 14", error["text"])
+
+    def test_the_header_compiles_as_c89_and_as_cpp(self):
+        made = self.expect_json(0, "cmd", "header", EXAMPLE, RF, "--output", self.path("made.h"))
+        self.assertEqual(made["left_out"], ["SENSOR.READ"])
+        self.add("program.c", PROGRAM.encode())
+        for compiler, standard in (("gcc", "c89"), ("gcc", "c11"), ("g++", "c++98"), ("g++", "c++20")):
+            language = "c++" if compiler == "g++" else "c"
+            built = subprocess.run([compiler, "-x", language, f"-std={standard}", "-Wall", "-Wextra", "-Werror",
+                                    "-pedantic", "-Wno-long-long", "-fsyntax-only", "-I", os.path.join(TREE, "include"),
+                                    self.path("program.c")], capture_output=True, text=True, check=False)
+            self.assertEqual((standard, built.returncode, built.stderr), (standard, 0, ""))
