@@ -1,8 +1,7 @@
 // Capture files: what the writer keeps when the disk does not, what the reader makes of damaged files, and the paces of
 // a playback.
-#include <condition_variable>
-
 #include "base/little_endian.h"
+#include "tests/support/disk.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/temp_folder.h"
 #include "tests/support/test.h"
@@ -16,49 +15,7 @@ namespace {
 
 using Outcome = CaptureReader::Outcome;
 
-// Takes bytes until it is full, and holds the writer up while it is told to.
-class Disk {
- public:
-  explicit Disk(size_t capacity = SIZE_MAX) : capacity_(capacity) {}
-
-  std::function<CaptureSink()> Opener() {
-    return [this] {
-      ++opened_;
-      return CaptureSink([this](std::span<const uint8_t> bytes) { return Write(bytes); });
-    };
-  }
-  size_t Write(std::span<const uint8_t> bytes) {
-    std::unique_lock lock(mutex_);
-    ++writes_;
-    held_.wait(lock, [this] { return !hold_; });
-    const size_t taken = std::min(bytes.size(), capacity_ - content_.size());
-    content_.insert(content_.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(taken));
-    return taken;
-  }
-  void Hold(bool hold) {
-    const std::lock_guard lock(mutex_);
-    hold_ = hold;
-    held_.notify_all();
-  }
-  int opened() const { return opened_; }
-  int writes() {
-    const std::lock_guard lock(mutex_);
-    return writes_;
-  }
-  Packet content() {
-    const std::lock_guard lock(mutex_);
-    return content_;
-  }
-
- private:
-  const size_t capacity_;
-  std::mutex mutex_;
-  std::condition_variable held_;
-  bool hold_ = false;
-  int opened_ = 0;
-  int writes_ = 0;
-  Packet content_;
-};
+using test::Disk;
 
 CaptureSource SourceOf(Packet bytes) {
   return [bytes = std::move(bytes), at = size_t{0}](std::span<uint8_t> buffer) mutable {
