@@ -35,6 +35,7 @@ bool IsTransportTimeOut(uint32_t id) {
 Diag_FTM::Diag_FTM(uint16_t port, Clock& clock, DeviceOpener opener)
     : clock_(clock), port_(port), parts_(std::make_shared<Parts>(clock)) {
   parts_->transport.emplace(parts_->log, clock, std::move(opener));
+  parts_->transport->port().SetTap(&parts_->trace);
   // The dispatcher's thread shares the parts: only a stop ends it, and so it must be, should the rest of this fail.
   dispatching_.reset(&parts_->dispatcher);
   // Without a thread for it no port is opened (OpenDirect), and the next opening tries again.

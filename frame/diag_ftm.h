@@ -29,6 +29,7 @@ inline constexpr uint8_t kTargetApplication = KRAL_TARGET_APPLICATION;  // ... o
 class CaptureWriter;
 class NameTables;
 class OrbtServer;
+class TraceWriter;
 
 struct OpenArguments {
   uint32_t port = 0;  // as given by the caller; the object's own port number is what is opened
@@ -126,6 +127,11 @@ class Diag_FTM {
   bool StopCapture();  // true when everything collected is in the file
   // A file's packets come as if the handset had sent them.
   bool StartPlayback(const char* file_name, PlayPace pace);
+  // From now on every byte of the port goes to this file, or the latest are kept for SaveTrace.
+  bool StartTrace(const char* file_name);
+  bool StopTrace();  // true when everything that passed is in the file
+  bool KeepTrace(uint32_t bytes);
+  bool SaveTrace(const char* file_name);
 
   // --- Time-outs --------------------------------------------------------------------------------------------------
   bool ConfigureTimeOut(uint32_t id, int32_t milliseconds);  // logged
@@ -143,6 +149,7 @@ class Diag_FTM {
   NameTables& names();
   CaptureWriter& capture();
   CapturePlayer& player();
+  TraceWriter& trace();
   Clock& clock() { return clock_; }
   // Keeps log, queues and transport: for a family's thread that may outlive its operation.
   std::shared_ptr<void> KeepParts();

@@ -67,6 +67,7 @@ void Diag_FTM::EndCollection() {
   events().Close();
   const KeepFailure keep;
   StopCapture();
+  trace().Stop();
 }
 
 NameTables& Diag_FTM::names() {
@@ -77,6 +78,9 @@ CaptureWriter& Diag_FTM::capture() {
 }
 CapturePlayer& Diag_FTM::player() {
   return parts_->player;
+}
+TraceWriter& Diag_FTM::trace() {
+  return parts_->trace;
 }
 
 }  // namespace kral

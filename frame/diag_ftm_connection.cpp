@@ -88,10 +88,12 @@ CSerialPort* Diag_FTM::BorrowPort() {
   connected_ = false;
   if (!transport().StopThread()) return nullptr;
   transport().SetOpenFlags(false, true);
+  port.SetContent(PortContent::kBytes);
   const bool opened = user_.send != nullptr ? port.SetUserDefinedTransport(user_.context, user_.handle, user_.send,
                                                                            user_.receive, user_.flush) == 1
                                             : port.Open(port_) == 1;
   port_borrowed_ = opened;
+  if (!opened) transport().TellContent();
   return opened ? &port : nullptr;
 }
 
@@ -99,6 +101,7 @@ void Diag_FTM::GiveBackPort() {
   if (!port_borrowed_) return;
   port_borrowed_ = false;
   transport().port().Close();
+  transport().TellContent();
 }
 
 bool Diag_FTM::ClosePort() {

@@ -10,6 +10,7 @@
 #include "transport/collection/capture_writer.h"
 #include "transport/collection/name_table.h"
 #include "transport/engine/kral_events.h"
+#include "transport/trace/trace_writer.h"
 
 namespace kral {
 
@@ -28,6 +29,7 @@ struct Diag_FTM::Parts {
   CKralEventListener sorter{responses, asynchronous, events, log};
   CKralEvents dispatcher;
   CapturePlayer player;
+  TraceWriter trace{log};
   std::optional<CKralThreadInterface> transport;  // direct mode
 };
 

@@ -12,6 +12,7 @@ static_assert(sizeof(KRAL_PORT_INFO) == 596);
 static_assert(sizeof(KRAL_PKV_COUNTS) == 28);
 static_assert(sizeof(KRAL_PKV_ITEM) == 16);
 static_assert(sizeof(KRAL_TRAFFIC_COUNTERS) == 120);
+static_assert(sizeof(KRAL_TRACE_COUNTERS) == 48);
 static_assert(sizeof(KRAL_VENTRIMS_OPTIONS) == 32);
 static_assert(sizeof(KRAL_VENTRIMS_STATE) == 56);
 static_assert(sizeof(KRAL_VENTRIMS_PROGRESS) == 264);

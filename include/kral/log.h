@@ -451,6 +451,72 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_GetPlaybackState(KRAL_HANDLE handle, int32_t* state, uint64_t* packets,
                                                  uint64_t* skipped);
 
+/* --- Traces (additions) ------------------------------------------------------------------------------------------- */
+
+/**
+ * Writes every frame of the connection to a pcapng file from now on, sent and received, requests, answers and what
+ * comes unasked, with its time, direction and port; bytes that are no frame as well, and marked as such. It goes on
+ * while the port is closed and opened again. The disk never holds up the connection, and what it is too slow for is
+ * counted. docs/traffic.md describes the file and what reads it.
+ *
+ * @param handle     from a connect function
+ * @param file_name  an ordinary file, emptied first
+ * @return 1; 0 when the file cannot be written, and, with no file touched, while another trace of the handle runs or
+ *         has not written its rest, while another trace or capture writes the file, and through a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StartTrace(KRAL_HANDLE handle, const char* file_name);
+
+/**
+ * Ends the trace and closes its file, or throws away what KRAL_KeepTrace keeps. While the disk is too slow for the rest
+ * (pending of the counters is not 0) another call waits for it again. The disconnect that releases the handle ends a
+ * trace as well.
+ *
+ * @return 1 when everything that passed is in the file; 0 when some was lost, when the rest has not been written in
+ *         time, and when no trace runs
+ *
+ * Wait: until the rest is written, at most 1,000 ms; longer after another thread's call that starts or ends a trace.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StopTrace(KRAL_HANDLE handle);
+
+/**
+ * Keeps the latest traffic in memory, for KRAL_SaveTrace: no file is written unless something has gone wrong.
+ *
+ * @param handle  from a connect function
+ * @param bytes   of traffic at most, at some 20 more for each read and write; it begins anew when it is called again
+ * @return 1; 0 while a trace is written, and through a phone server
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_KeepTrace(KRAL_HANDLE handle, uint32_t bytes);
+
+/**
+ * Writes what is kept, as KRAL_StartTrace would have. It goes on being kept.
+ *
+ * @param handle     from a connect function
+ * @param file_name  an ordinary file, emptied first
+ * @return 1; 0 when the file cannot be written, and when nothing is being kept
+ *
+ * Wait: the writing of the file.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SaveTrace(KRAL_HANDLE handle, const char* file_name);
+
+/** What became of the traces of a handle, those of KRAL_SaveTrace not included. */
+typedef struct KRAL_TRACE_COUNTERS {
+  uint64_t frames;     /**< written to files, bad ones included */
+  uint64_t bad;        /**< of these; whose FCS does not fit */
+  uint64_t others;     /**< runs of bytes that are no frame, written to files */
+  uint64_t lost;       /**< frames, and reads and writes without frames, that a full or slow disk has cost a file */
+  uint64_t lost_bytes; /**< of those that the disk was too slow for */
+  uint64_t pending;    /**< reads and writes that are taken for a file and not in it yet */
+} KRAL_TRACE_COUNTERS;
+
+/**
+ * Reads the counters of traces.
+ *
+ * @param      handle    from a connect function
+ * @param[out] counters  each is exact; what passes meanwhile may be in one of them and not yet in another
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_GetTraceCounters(KRAL_HANDLE handle, KRAL_TRACE_COUNTERS* counters);
+
 #ifdef __cplusplus
 }
 #endif

@@ -93,7 +93,7 @@ bool CKralThreadInterface::OpenPort(uint32_t port_number, const UserTransport& u
 // A second connect with the same functions leaves the thread alone: it may sit in the caller's receive function.
 bool CKralThreadInterface::BindUserTransport(const UserTransport& user) {
   if (port_.IsOpen() != 0 && port_.user_defined() && IsSame(bound_, user)) {
-    splitter_.DropPartialPacket();
+    DropPartial();
     return true;
   }
   if (!QuietThread()) return false;
@@ -143,7 +143,7 @@ void CKralThreadInterface::EndWaits() {
 }
 
 void CKralThreadInterface::BeginTraffic() {
-  splitter_.DropPartialPacket();  // its rest will not come through another opening
+  DropPartial();  // its rest will not come through another opening
   waits_ended_ = false;
   if (responses_ == nullptr) return;
   responses_->Reopen();
@@ -226,6 +226,15 @@ void CKralThreadInterface::SetReceiveMode(ReceiveMode mode) {
 void CKralThreadInterface::WakeReceiver() {
   control_.Notify();
   port_.Wake();
+}
+
+void CKralThreadInterface::DropPartial() {
+  splitter_.DropPartialPacket();
+  port_.GiveUpPartial();
+}
+
+void CKralThreadInterface::TellContent() {
+  port_.SetContent(packet_mode() == PacketMode::kFramed ? PortContent::kFrames : PortContent::kBytes);
 }
 
 TrafficCounters CKralThreadInterface::counters() const {

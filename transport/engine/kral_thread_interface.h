@@ -101,6 +101,7 @@ class CKralThreadInterface {
   // Whether that change is the handset's as well as ours.
   bool NeedsPhoneFor(uint32_t mode) const;
   PacketMode packet_mode() const { return splitter_.mode(); }
+  void TellContent();  // to the port's tap: what comes by the packet mode
   bool FlushRxBuffer();
   // The liveness check asks with code 4 whether the connection counts as alive without an answer: it does not, 0.
   uint32_t QueryState(uint32_t code) const;
@@ -134,6 +135,7 @@ class CKralThreadInterface {
   void WakeReceiver();
   void BeginTraffic();  // nothing reads
   void EndWaits();
+  void DropPartial();
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
   std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);

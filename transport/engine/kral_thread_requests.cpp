@@ -142,7 +142,7 @@ void CKralThreadInterface::TimedOut(std::span<const uint8_t> request) {
   log_.WriteLine(kLogErr, "Request timed out");
   Close();
   // A caller's transport stays open: what broke off belongs to what has ended all the same.
-  splitter_.DropPartialPacket();
+  DropPartial();
 }
 
 Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
@@ -218,6 +218,7 @@ Reply CKralThreadInterface::SetPacketMode(uint32_t mode) {
   }
   framer_.SetRawDataFlag(mode);
   splitter_.SetMode(static_cast<PacketMode>(mode));
+  TellContent();
   log_.WriteLine(kLogRet, "RAW_DATA_FLAG = %s", mode != 0 ? "ON" : "OFF");
   return ReplyKind::kExpected;
 }
@@ -254,7 +255,7 @@ bool CKralThreadInterface::FlushRxBuffer() {
   // The purge's own result tells nothing: a caller's transport reports 0 for every flush it made.
   if (!null_port_) port_.FlushPCBuffer();
   loop_.WaitForChunk(kSettleMs);
-  splitter_.DropPartialPacket();
+  DropPartial();
   return true;
 }
 

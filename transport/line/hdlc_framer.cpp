@@ -6,6 +6,7 @@
 #include <array>
 #include <string_view>
 
+#include "base/at_exit.h"
 #include "transport/line/hdlc_frame.h"
 #include "transport/line/serial_port.h"
 
@@ -119,6 +120,8 @@ uint32_t CProtAHDLC::Data2DM(uint8_t baud_rate_mask) {
   log_->WriteLine(kLogFnAhdlc, "CProtAHDLC::Data2DM(baudrate_mask=%d)", int{baud_rate_mask});
   if (port_ == nullptr) return 0;
 
+  const PortContent content = port_->SetContent(PortContent::kBytes);
+  const AtExit restored([&] { port_->SetContent(content); });
   const bool restore_rate = raw_data_flag_ == 0;
   uint32_t former_rate = 0;
   if (restore_rate) port_->GetBaudRate(former_rate);

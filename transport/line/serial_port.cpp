@@ -100,11 +100,15 @@ std::unique_ptr<SerialDevice> CSerialPort::OpenDevice(int32_t number) {
 
 // The lines' refusals don't matter here: a pseudo terminal has none.
 void CSerialPort::Prepare(SerialDevice& device) const {
+  if (tap_ != nullptr) tap_->OnOpened();
   device.SetRts(true);
   device.SetDtr(false);
   if (!keep_buffers_) device.PurgeBoth();
   if (!send_loopback_) return;
-  for (int i = 0; i < 2; ++i) device.Write(kLoopbackFrame, write_timeout_);
+  for (int i = 0; i < 2; ++i) {
+    Tell(PortDirection::kSent, kLoopbackFrame);
+    device.Write(kLoopbackFrame, write_timeout_);
+  }
 }
 
 uint32_t CSerialPort::SetUserDefinedTransport(uintptr_t context, uintptr_t handle, UserSendFunction send,
@@ -117,6 +121,7 @@ uint32_t CSerialPort::SetUserDefinedTransport(uintptr_t context, uintptr_t handl
   if (complete) fine_timer_.emplace();
   gone_ = false;
   open_ = complete;
+  if (complete && tap_ != nullptr) tap_->OnOpened();
   return complete ? 1 : 0;
 }
 

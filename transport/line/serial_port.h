@@ -7,11 +7,13 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <span>
 
 #include "base/mutex.h"
 #include "base/text_log.h"
 #include "platform/clock.h"
 #include "platform/serial_device.h"
+#include "transport/line/port_tap.h"
 
 namespace kral {
 
@@ -82,6 +84,14 @@ class CSerialPort {
   // device that comes back is the same one again only where nobody holds the old one any more.
   bool CloseIfGone();
 
+  // Before the first Open; it outlives the port. Null: none.
+  void SetTap(PortTap* tap) { tap_ = tap; }
+  // For the tap.
+  PortContent SetContent(PortContent content) { return content_.exchange(content); }  // the former one
+  void GiveUpPartial() const {
+    if (tap_ != nullptr) tap_->OnGivenUp();
+  }
+
   // Wake-on-data receiving: true when bytes may be read; false after the time-out, a Wake, or when there is no
   // device that can be waited on (a caller's transport).
   bool CanWait() const;
@@ -96,6 +106,8 @@ class CSerialPort {
   UserTransport User() const;
   std::unique_ptr<SerialDevice> OpenDevice(int32_t number);
   void Prepare(SerialDevice& device) const;
+  uint32_t SendTapped(const uint8_t* bytes, uint32_t count, uint32_t& sent);
+  void Tell(PortDirection direction, std::span<const uint8_t> bytes) const;
   uint32_t SendToDevice(const uint8_t* bytes, uint32_t count, uint32_t& sent);
   uint32_t SendToUser(const uint8_t* bytes, uint32_t count, uint32_t& sent);
   uint32_t ReceiveFromDevice(uint8_t* buffer, uint32_t count, uint32_t& received);
@@ -106,6 +118,8 @@ class CSerialPort {
   Clock& clock_;
   DeviceOpener opener_;
   DataLogFileHandler* log_ = &NullLog();
+  PortTap* tap_ = nullptr;
+  std::atomic<PortContent> content_{PortContent::kFrames};
   std::atomic<bool> open_{false};
   std::atomic<bool> user_defined_{false};
   std::atomic<int32_t> last_error_{kPortOk};

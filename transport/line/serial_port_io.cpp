@@ -2,6 +2,7 @@
 // checked before anybody believes them.
 #include <algorithm>
 
+#include "base/at_exit.h"
 #include "base/guarded_call.h"
 #include "platform/forced_unwind.h"
 #include "transport/line/serial_port.h"
@@ -34,7 +35,7 @@ uint32_t CSerialPort::Send(const uint8_t* bytes, uint32_t count) {
   log_->WriteLine(kLogFnDev, "CSerialPort::Send(nbyte=%d)", count);
   uint32_t sent = 0;
   try {
-    const uint32_t result = user_defined_ ? SendToUser(bytes, count, sent) : SendToDevice(bytes, count, sent);
+    const uint32_t result = SendTapped(bytes, count, sent);
     log_->WriteLine(kLogRetDev, "CSerialPort::Send(bytes_sent=%d) ... OK", result);
     return result;
   } catch (...) {
@@ -42,6 +43,18 @@ uint32_t CSerialPort::Send(const uint8_t* bytes, uint32_t count) {
     log_->WriteLine(kLogErr, "CSerialPort::Send(bytes_sent=%d)--exception occurred", sent);
     return 0;
   }
+}
+
+uint32_t CSerialPort::SendTapped(const uint8_t* bytes, uint32_t count, uint32_t& sent) {
+  Tell(PortDirection::kSent, {bytes, count});
+  const AtExit told([&] {
+    if (tap_ != nullptr && sent < count) tap_->OnShortWrite(sent, count);
+  });
+  return user_defined_ ? SendToUser(bytes, count, sent) : SendToDevice(bytes, count, sent);
+}
+
+void CSerialPort::Tell(PortDirection direction, std::span<const uint8_t> bytes) const {
+  if (tap_ != nullptr) tap_->OnBytes(direction, content_, bytes);
 }
 
 uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_t& sent) {
@@ -84,6 +97,7 @@ uint32_t CSerialPort::Receive(uint8_t* buffer, uint32_t count) {
   try {
     const uint32_t result =
         user_defined_ ? ReceiveFromUser(buffer, count, received) : ReceiveFromDevice(buffer, count, received);
+    Tell(PortDirection::kReceived, {buffer, received});
     if (received > 0) log_->WriteLine(kLogRetDev, "CSerialPort::Receive(wRec=%d) ... OK", received);
     return result;
   } catch (...) {
