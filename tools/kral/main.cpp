@@ -42,6 +42,10 @@ void AddCommonOptions(const Command& root, Context& context) {
       "--json", [&context] { context.out.UseJson(); }, "Print one JSON object");
   root.Add("--log", context.session.log_file, "Write the text log of the connection to this file").File();
   root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F");
+  root.Add("--trace", context.session.trace.file, "Write what passes over the port to this file, as pcapng").File();
+  root.Add("--trace-on-failure", context.session.trace.file_on_failure,
+           "Write the last of it to this file, if the command fails")
+      .File();
   root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
       .Between(1, kLongestTimeOutMs, "ms");
 }

@@ -71,9 +71,10 @@ bool Asks(const CommandLine& line, const char* name) {
   return line.asked().count(name) != 0;
 }
 
-// Without its log: the verb begins that anew.
+// Without its log and trace: the verb begins them anew.
 SessionOptions ForIdentity(SessionOptions options) {
   options.log_file.clear();
+  options.trace = {};
   return options;
 }
 
@@ -214,7 +215,10 @@ void ManyHandsets::RefuseSameFiles() const {
   for (const auto& handset : handsets_) {
     if (!handset->command) continue;
     auto files = handset->command->line->Written();
-    if (!context().session.log_file.empty()) files.push_back(handset->command->context.session.log_file);
+    const auto& session = handset->command->context.session;
+    for (const auto& file : {session.log_file, session.trace.file, session.trace.file_on_failure}) {
+      if (!file.empty()) files.push_back(file);
+    }
     for (const auto& file : files) {
       const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
       if (is_new) continue;

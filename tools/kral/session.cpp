@@ -6,6 +6,7 @@
 #include <atomic>
 #include <charconv>
 #include <cstdio>
+#include <exception>
 #include <memory>
 
 #include "platform/clock.h"
@@ -167,7 +168,8 @@ std::vector<std::uint16_t> ListPortsWithHandset() {
   return ports;
 }
 
-Session::Session(const SessionOptions& options, Expected expected) : port_(0), handle_(0) {
+Session::Session(const SessionOptions& options, Expected expected)
+    : port_(0), handle_(0), exceptions_(std::uncaught_exceptions()) {
   if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
@@ -180,6 +182,7 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
   }
   try {
     StartLog(options);
+    trace_.emplace(handle_, options.trace);
     if (options.time_out_ms) {
       const auto milliseconds = static_cast<std::int32_t>(*options.time_out_ms);
       KRAL_ConfigureTimeOut(handle_, KRAL_TIME_OUT_COMMAND, milliseconds);
@@ -189,12 +192,15 @@ Session::Session(const SessionOptions& options, Expected expected) : port_(0), h
     KRAL_SetResynchronise(handle_, 1);
     CheckAnswers(expected);
   } catch (...) {
+    if (trace_) trace_->End(true);
     KRAL_DisconnectServer(handle_);
     throw;
   }
 }
 
+// A verb fails by an exception.
 Session::~Session() {
+  trace_->End(std::uncaught_exceptions() > exceptions_);
   KRAL_ConfigureLibraryTextLogCallBack(handle_, nullptr);
   KRAL_DisconnectServer(handle_);
 }

@@ -13,6 +13,7 @@
 
 #include "kral/kral.h"
 #include "tools/kral/exit_codes.h"
+#include "tools/kral/session_trace.h"
 
 namespace kral::tool {
 
@@ -22,6 +23,7 @@ struct SessionOptions {
   std::uint32_t wait_ms = 0;                     // for a port and its handset to appear
   std::string log_file;
   std::optional<std::uint32_t> log_flags;
+  TraceOptions trace;
   std::optional<std::uint32_t> time_out_ms;  // of every request
 };
 
@@ -78,6 +80,8 @@ class Session {
   std::uint16_t port_;
   KRAL_HANDLE handle_;
   bool answers_ = false;
+  const int exceptions_;  // under way when the session began
+  std::optional<SessionTrace> trace_;
   std::shared_ptr<std::FILE> log_file_;  // the library has its own; the reader of a pipe must not see its end before
 };
 

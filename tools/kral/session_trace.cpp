@@ -1,0 +1,56 @@
+// Starts a trace, and brings it to its file.
+#include "tools/kral/session_trace.h"
+
+#include <exception>
+
+#include "tools/kral/call_failure.h"
+#include "tools/kral/exit_codes.h"
+#include "tools/kral/format.h"
+#include "tools/kral/output.h"
+
+namespace kral::tool {
+namespace {
+
+// Of the traffic in front of a failure: minutes of commands, or seconds of a flood.
+constexpr std::uint32_t kKeptBytes = 8u << 20;
+// Each waits for a second; a disk that takes nothing for so long has gone.
+constexpr int kMostWaits = 30;
+
+bool Stop(KRAL_HANDLE handle) {
+  KRAL_TRACE_COUNTERS counters{};
+  for (int i = 0; i < kMostWaits; ++i) {
+    if (KRAL_StopTrace(handle) != 0) return true;
+    if (KRAL_GetTraceCounters(handle, &counters) == 0 || counters.pending == 0) break;
+  }
+  return false;
+}
+
+}  // namespace
+
+SessionTrace::SessionTrace(KRAL_HANDLE handle, const TraceOptions& options) : handle_(handle), options_(options) {
+  if (!options.file.empty() && !options.file_on_failure.empty()) {
+    throw ToolError(ExitCode::kUsage, "--trace and --trace-on-failure exclude each other",
+                    "--trace has everything, whatever the end");
+  }
+  if (!options.file_on_failure.empty()) KRAL_KeepTrace(handle, kKeptBytes);
+  if (options.file.empty() || KRAL_StartTrace(handle, options.file.c_str()) != 0) return;
+  throw ToolError(ExitCode::kBadFile, Format("the trace file {} cannot be written", options.file),
+                  "check folder and permissions of the file named by --trace, and that nothing else writes it",
+                  LastError(handle));
+}
+
+void SessionTrace::End(bool failed) noexcept {
+  try {
+    if (!options_.file.empty() && !Stop(handle_)) {
+      WriteAside(Format("the trace file {} does not hold everything: its disk is full, slow or gone\n", options_.file));
+    }
+    if (options_.file_on_failure.empty() || !failed) return;
+    const auto& file = options_.file_on_failure;
+    const bool saved = KRAL_SaveTrace(handle_, file.c_str()) != 0;
+    WriteAside(saved ? Format("the traffic in front of the failure is in {}\n", file)
+                     : Format("the trace file {} cannot be written\n", file));
+  } catch (const std::exception&) {  // nobody is left to be told
+  }
+}
+
+}  // namespace kral::tool

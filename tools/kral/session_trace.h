@@ -1,0 +1,31 @@
+// The trace of a connection for the length of a verb: all of it, or, once the verb has failed, the end of it.
+#ifndef KRAL_TOOLS_SESSION_TRACE_H
+#define KRAL_TOOLS_SESSION_TRACE_H
+
+#include <string>
+
+#include "kral/kral.h"
+
+namespace kral::tool {
+
+struct TraceOptions {
+  std::string file;
+  std::string file_on_failure;
+};
+
+class SessionTrace {
+ public:
+  // ToolError when the file cannot be written, and when both are asked for.
+  SessionTrace(KRAL_HANDLE handle, const TraceOptions& options);
+
+  // In front of the disconnect. What goes wrong is told: the verb has done its work, or failed, all the same.
+  void End(bool failed) noexcept;
+
+ private:
+  const KRAL_HANDLE handle_;
+  const TraceOptions options_;
+};
+
+}  // namespace kral::tool
+
+#endif
