@@ -12,6 +12,7 @@ if(TARGET kral_tool)
   install(TARGETS kral_tool RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
 endif()
 install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h*")
+install(DIRECTORY share/kral/wireshark DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
 
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/kral)
 install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder})

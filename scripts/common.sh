@@ -50,5 +50,7 @@ tidy_packages=(clang clang-tidy)
 # What tries the library from other languages.
 language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy python3-build python3-cffi python3-pytest
   python3-setuptools python3-venv python3-wheel)
+# What reads traces.
+trace_packages=(tshark)
 windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)

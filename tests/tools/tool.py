@@ -3,6 +3,7 @@ import contextlib
 import json
 import os
 import subprocess
+import sys
 import tempfile
 import time
 import unittest
@@ -148,3 +149,20 @@ class ToolTest(unittest.TestCase):
     def ask(self, code, *words):
         """The object that it prints of the handset on COM7."""
         return self.expect_json(code, "-p", "7", *words)
+
+
+class Counting(unittest.TextTestResult):
+    passed = 0
+
+    def addSuccess(self, test):
+        super().addSuccess(test)
+        self.passed += 1
+
+
+def run_tests(name, arguments, module="__main__"):
+    """Those of a module, or those that the arguments name. The last line is "NAME: N passed, M failed"; a run that executed nothing fails."""
+    suite = unittest.main(module=module, argv=[sys.argv[0], *arguments], exit=False,
+                          testRunner=unittest.TextTestRunner(resultclass=Counting, verbosity=1))
+    bad = len(suite.result.failures) + len(suite.result.errors)
+    print(f"{name}: {suite.result.passed} passed, {bad} failed")
+    sys.exit(0 if suite.result.passed > 0 and bad == 0 else 1)
