@@ -1,0 +1,1 @@
+"""One module for a promise; docs/promises.md says what each means."""

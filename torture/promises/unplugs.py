@@ -1,0 +1,152 @@
+"""An unplug is reported within 500 ms, and the next request works once the port is back."""
+from __future__ import annotations
+
+import ctypes
+import os
+import threading
+import time
+from typing import Any, Callable, Dict, List
+
+import kral
+from kral import _api
+from torture import calls
+from torture.bench import MODES, Bench, Broken, check, connected, last_error
+from torture.peer.line import WORKS, Line, PtyLine
+from torture.peer.phone import Phone
+
+NUMBER = 2
+TITLE = "An unplug is reported within 500 ms; the next request works once the port is back"
+SHORT = 40
+AT_ONCE = 4
+_ALLOWED_MS = 500
+_TIME_OUT_MS = 5000
+_LOST = 9
+# The requests that are answered before the handset goes away in the middle of an operation.
+_ANSWERED = {"write": 5, "read": 5, "list": 3, "back-up": 20}
+_BYTES = bytes(range(256)) * 40
+
+
+def _back_up(handle: int) -> calls.Outcome:
+    status = ctypes.c_uint32()
+    name = f"{threading.get_ident()}.pkv".encode()
+    kral.api().KRAL_PKV_ConfigureBackup(handle, 0, 40, 1)
+    return kral.api().KRAL_BackupNVFromMobileToPKV(handle, name, ctypes.byref(status)), None
+
+
+def _wait_log(handle: int) -> calls.Outcome:
+    size, area = ctypes.c_uint16(), (ctypes.c_uint8 * 4096)()
+    result = kral.api().KRAL_DIAG_WaitNextPhoneLog(handle, ctypes.byref(size), ctypes.cast(area, ctypes.c_void_p),
+                                                   _TIME_OUT_MS)
+    return result, None
+
+
+_OPERATIONS: Dict[str, Callable[[int], calls.Outcome]] = {
+    **{name: calls.CALLS[name].run for name in ("get-switches", "version", "serial", "peek", "read-item", "write-item",
+                                                "channel", "file-status")},
+    "send": calls.send("KRAL_SendSync", b"\x7b12345", _TIME_OUT_MS),
+    "write": lambda handle: calls.write_file(handle, _BYTES),
+    "read": lambda handle: calls.read_file(handle, "/data/large", 20000),
+    "list": lambda handle: calls.list_folder(handle, b"/many"),
+    "back-up": _back_up,
+}
+
+
+def cases(bench: Bench) -> List[str]:
+    busy = [f"{name}/{mode}/{where}" for name in _OPERATIONS for mode in MODES for where in ("same", "other")]
+    return busy + [f"{name}/{mode}/{where}" for name in ("idle", "wait-log") for mode in MODES
+                   for where in ("same", "other")]
+
+
+def _state(handle: int) -> int:
+    state = ctypes.c_int32(-1)
+    kral.api().KRAL_GetPortState(handle, ctypes.byref(state))
+    return state.value
+
+
+def _phone() -> Phone:
+    phone = calls.prepare(Phone(calls.SERIAL))
+    phone.files.put("/data/large", _BYTES)
+    for i in range(20):
+        phone.files.put(f"/many/{i}", b"x")
+    return phone
+
+
+def _in_flight(bench: Bench, line: PtyLine, name: str) -> None:
+    """The cable is pulled while a request has no answer yet."""
+    left = [_ANSWERED.get(name, 0)]
+    asked = threading.Event()
+
+    def behaviour(request: bytes, _: Line) -> None:
+        if left[0] > 0:
+            left[0] -= 1
+            line.reply(request)
+        else:
+            asked.set()
+
+    line.behaviour = behaviour
+    since: List[float] = []
+
+    def pull() -> None:
+        if asked.wait(5):
+            time.sleep(0.02)
+            since.append(time.monotonic())
+            line.unplug()
+
+    puller = threading.Thread(target=pull)
+    puller.start()
+    result, _ = _OPERATIONS[name](line.handle)
+    end = time.monotonic()
+    code, text = last_error(line.handle)
+    puller.join()
+    check(bool(since), f"{name} ended with {result} before anything was pulled")
+    _judge(bench, since[0], end)
+    check(result == 0, f"{name} succeeded without a handset")
+    check(code == _LOST, f"the failure has code {code} ({text})")
+
+
+def _judge(bench: Bench, since: float, end: float) -> None:
+    took, late = (end - since) * 1000, bench.lateness.between(since, end) * 1000
+    bench.note("slowest report, ms", took)
+    check(took - late <= _ALLOWED_MS, f"reported after {took:.0f} ms; the machine was {late:.0f} ms late")
+
+
+def _idle(bench: Bench, line: PtyLine, waits: bool) -> None:
+    """Nothing is asked when the cable is pulled; a thread may be waiting for logs."""
+    since: List[float] = []
+    ended: List[Any] = []
+    waiter = threading.Thread(target=lambda: ended.append((_wait_log(line.handle), time.monotonic())))
+    if waits:
+        waiter.start()
+        time.sleep(0.05)
+    since.append(time.monotonic())
+    line.unplug()
+    if waits:
+        waiter.join(10)
+        check(bool(ended), "the wait for logs goes on")
+        _judge(bench, since[0], ended[0][1])
+    while _state(line.handle) != _api.KRAL_PORT_GONE:
+        if time.monotonic() > since[0] + 5:
+            raise Broken(f"the port's state is {_state(line.handle)}")
+        time.sleep(0.005)
+    _judge(bench, since[0], time.monotonic())
+
+
+def run(bench: Bench, case: str) -> None:
+    name, mode, where = case.split("/")
+    with bench.com_port() as port:
+        line = PtyLine(_phone(), bench.ports, port)
+        with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
+            kral.api().KRAL_DIAG_SetPhoneLoggingState(handle, 1)
+            result, value = calls.CALLS["serial"].run(handle)
+            check(result == 1 and value == calls.SERIAL, f"a handset that works gave {result}, {value!r}")
+            # Made while the port's own name is still taken, so it gets another.
+            pair = os.openpty() if where == "other" else None
+            if name in _OPERATIONS:
+                _in_flight(bench, line, name)
+            else:
+                _idle(bench, line, name == "wait-log")
+            line.behaviour = WORKS
+            line.drop_pieces()
+            line.plug(pair)
+            result, value = calls.CALLS["serial"].run(handle)
+            check(result == 1 and value == calls.SERIAL, f"after the port came back: {result}, {last_error(handle)}")
