@@ -13,6 +13,7 @@
 #include "download/stream/stream_format.h"
 #include "download/stream/stream_hello.h"
 #include "download/stream/write_image.h"
+#include "frame/export_call.h"
 
 namespace kral::download {
 namespace {
@@ -97,8 +98,6 @@ bool IsNull(const CallersBytes& bytes) {
   return bytes.data == nullptr && bytes.size != 0;
 }
 
-constexpr const char* kNoFile = "there is no file name";
-
 }  // namespace
 
 bool SetCallback(Diag_FTM& phone, KRAL_DOWNLOAD_PROGRESS_CALLBACK callback, uintptr_t value) {
@@ -124,7 +123,7 @@ bool LoadFlashProgrammer(Diag_FTM& phone, const char* file, uint32_t maximum_pac
   if (IsRefused(phone, "KRAL_KOVA_LoadFlashProgrammer")) return Give(KRAL_KOVA_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
-  if (file == nullptr) return Give(BadArgument(KRAL_KOVA_FILE_NOT_OPENED, kNoFile), result);
+  if (file == nullptr) return Give(BadArgument(KRAL_KOVA_FILE_NOT_OPENED, kNoFileName), result);
   // What throws is the image, for which there is no address space.
   return GiveResultOf(phone, KRAL_KOVA_FILE_NOT_DECODED, result, [&] {
     kova::ProgrammerFile programmer;
@@ -183,7 +182,7 @@ bool SecurityMode(Diag_FTM& phone, uint8_t mode) {
 
 bool PartitionTable(Diag_FTM& phone, const char* file, uint8_t override_table, uint8_t* status) {
   if (IsRefused(phone, "KRAL_STREAM_PARTITION_TABLE")) return false;
-  if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, kNoFile));
+  if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, kNoFileName));
   std::vector<uint8_t> table;
   if (!stream::ReadPartitionTable(phone.log(), file, table)) return false;
   return SendPartitionTable(phone, table, override_table, status);
@@ -212,7 +211,7 @@ bool WriteImageFile(Diag_FTM& phone, const char* file, uint32_t format, const ch
   if (IsRefused(phone, "KRAL_STREAM_WriteImageFile")) return Give(KRAL_STREAM_WRITE_FAILED, result);
   DownloadConnection connection(phone);
   connection.BeginWork();
-  if (file == nullptr) return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, kNoFile), result);
+  if (file == nullptr) return Give(BadArgument(KRAL_STREAM_BAD_ARGUMENT, kNoFileName), result);
   return GiveResultOf(phone, KRAL_STREAM_WRITE_FAILED, result, [&]() -> uint32_t {
     images::ImageFile image;
     images::ImageFile header;

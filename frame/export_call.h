@@ -23,6 +23,9 @@
 
 namespace kral {
 
+// The reason of every function that misses one.
+inline constexpr const char* kNoFileName = "there is no file name";
+
 class ExportCall {
  public:
   // A function without a handle: its failures are found under handle 0, and nothing is logged.

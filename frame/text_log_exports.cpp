@@ -12,6 +12,7 @@ namespace {
 
 using kral::Diag_FTM;
 using kral::ExportCall;
+using kral::kNoFileName;
 
 bool StartLog(Diag_FTM& phone, const char* file_name) {
   phone.log().Start(file_name);
@@ -59,9 +60,7 @@ bool AddAsynchronous(Diag_FTM& phone, uint32_t flag, std::span<const uint8_t> me
 extern "C" {
 
 uint8_t KRAL_CALL KRAL_StartLogging(KRAL_HANDLE handle, const char* file_name) {
-  return ExportCall(handle, __func__)
-      .Require(file_name != nullptr, "there is no file name")
-      .RunAtOnce(StartLog, file_name);
+  return ExportCall(handle, __func__).Require(file_name != nullptr, kNoFileName).RunAtOnce(StartLog, file_name);
 }
 
 uint8_t KRAL_CALL KRAL_StopLogging(KRAL_HANDLE handle) {

@@ -17,13 +17,13 @@ namespace {
 using kral::ExportCall;
 using kral::Fail;
 using kral::Failure;
+using kral::kNoFileName;
 using kral::station::Job;
 using kral::station::JobHandset;
 using kral::station::Step;
 using kral::station::StepKind;
 namespace table = kral::station::JobTable;
 
-constexpr const char* kNoFile = "there is no file name";
 constexpr const char* kNoRecord = "there is no record, or its size is too small";
 
 // operation(job) on the job of that handle.
@@ -55,7 +55,7 @@ bool GiveRecord(Record* output, const Record& record) {
 }
 
 bool AddFileStep(Job& job, StepKind kind, const char* file, uint32_t number = 0) {
-  if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s", kNoFile));
+  if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s", kNoFileName));
   return job.AddStep({.kind = kind, .file = file, .number = number});
 }
 
@@ -111,7 +111,7 @@ uint8_t KRAL_CALL KRAL_VENTRIMS_AddPartitionTable(KRAL_VENTRIMS_JOB job, const c
 uint8_t KRAL_CALL KRAL_VENTRIMS_AddImage(KRAL_VENTRIMS_JOB job, const char* file, uint32_t format, uint8_t image_type,
                                          const char* header_file, uint8_t method) {
   return OnJob(__func__, job, [=](Job& found) {
-    if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s", kNoFile));
+    if (file == nullptr) return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s", kNoFileName));
     if (const char* const wrong = WhatIsWrongWithImage(format, method))
       return Fail(Failure(KRAL_ERROR_ARGUMENT, "%s", wrong));
     Step step{.kind = StepKind::kImage, .file = file, .number = format, .image_type = image_type, .method = method};

@@ -19,6 +19,7 @@ using kral::Diag_FTM;
 using kral::ExportCall;
 using kral::Fail;
 using kral::Failure;
+using kral::kNoFileName;
 using kral::Put;
 using kral::TextOrEmpty;
 namespace defined = kral::defined;
@@ -250,7 +251,7 @@ extern "C" {
 uint8_t KRAL_CALL KRAL_CMD_LoadDefinitions(KRAL_HANDLE handle, const char* file, uint32_t* commands) {
   return ExportCall(handle, __func__)
       .Logged("( %s )", TextOrEmpty(file))
-      .Require(file != nullptr, "there is no file name")
+      .Require(file != nullptr, kNoFileName)
       .Run([=](Diag_FTM& phone) {
         uint32_t count = 0;
         if (!defined::LoadDefinitions(phone, file, count)) return false;

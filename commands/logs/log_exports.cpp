@@ -16,12 +16,11 @@ using kral::Diag_FTM;
 using kral::ExportCall;
 using kral::Fail;
 using kral::Failure;
+using kral::kNoFileName;
 using kral::Put;
 using std::chrono::milliseconds;
 
 static_assert(KRAL_LONGEST_PACKET == kral::kMaximumPacket);
-
-constexpr const char* kNoFileName = "there is no file name";
 
 bool SetCollection(Diag_FTM& phone, bool on) {
   phone.sorter().SetCollection(on);

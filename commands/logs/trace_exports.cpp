@@ -7,10 +7,9 @@ namespace {
 
 using kral::Diag_FTM;
 using kral::ExportCall;
+using kral::kNoFileName;
 
-constexpr const char* kNoFileName = "there is no file name";
-
-bool ReadCounters(Diag_FTM& phone, KRAL_TRACE_COUNTERS* counters) {
+bool ReadTraceCounters(Diag_FTM& phone, KRAL_TRACE_COUNTERS* counters) {
   const kral::TraceCounters c = phone.trace().counters();
   *counters = {c.frames, c.bad, c.others, c.lost, c.lost_bytes, phone.trace().pending()};
   return true;
@@ -44,7 +43,7 @@ uint8_t KRAL_CALL KRAL_GetTraceCounters(KRAL_HANDLE handle, KRAL_TRACE_COUNTERS*
   return ExportCall(handle, __func__)
       .Require(counters != nullptr, "there is no room for the counters")
       .Unlogged()
-      .RunAtOnce(ReadCounters, counters);
+      .RunAtOnce(ReadTraceCounters, counters);
 }
 
 }  // extern "C"

@@ -40,7 +40,7 @@ std::string Line(const test::PcapngPacket& packet) {
   return line + (packet.comment.empty() ? "" : " (" + packet.comment + ")");
 }
 
-std::vector<std::string> Lines(const PcapngReading& reading) {
+std::vector<std::string> LinesOf(const PcapngReading& reading) {
   std::vector<std::string> lines;
   for (const auto& packet : reading.packets) lines.push_back(Line(packet));
   return lines;
@@ -129,13 +129,13 @@ TEST_F(Trace, TellsFramesFromWhatIsNone) {
     EXPECT_TRUE(writer_->Stop());
     const PcapngReading reading(disk.content());
     EXPECT_TRUE(reading.whole);
-    EXPECT_EQ(Lines(reading), each.lines);
+    EXPECT_EQ(LinesOf(reading), each.lines);
     // The latest traffic, kept, makes the same file.
     ASSERT_TRUE(writer_->KeepLatest(1 << 20));
     each.pass(*writer_);
     Disk saved;
     EXPECT_TRUE(writer_->Save({"test", "COM7", "a port"}, saved.Opener()));
-    EXPECT_EQ(Lines(PcapngReading(saved.content())), each.lines);
+    EXPECT_EQ(LinesOf(PcapngReading(saved.content())), each.lines);
     EXPECT_TRUE(writer_->Stop());
   }
 }
@@ -196,7 +196,7 @@ TEST_F(Trace, FullDiskCostsWhatIsBehindItAndNothingElse) {
   EXPECT_EQ(writer_->counters().frames, 1u);
   EXPECT_EQ(writer_->counters().lost, 3u);
   const PcapngReading reading(disk.content());
-  EXPECT_EQ(Lines(reading), std::vector<std::string>{"received 10 01"});
+  EXPECT_EQ(LinesOf(reading), std::vector<std::string>{"received 10 01"});
   EXPECT_FALSE(reading.whole);
   EXPECT_EQ(log_.Take().back(), "16 Trace file: frames are lost, the file cannot be written any more");
   Disk none(10);
@@ -215,7 +215,7 @@ TEST_F(Trace, KeepsTheLatestAndSaysThatItIsNotAll) {
   for (int i = 0; i < 2; ++i) {
     Disk disk;
     EXPECT_TRUE(writer_->Save({"test", "COM7", "a port"}, disk.Opener())) << "it goes on being kept";
-    const auto lines = Lines(PcapngReading(disk.content()));
+    const auto lines = LinesOf(PcapngReading(disk.content()));
     ASSERT_GE(lines.size(), 5u);
     EXPECT_LE(lines.size(), 10u);
     EXPECT_TRUE(lines.front().ends_with("(earlier traffic is not kept)")) << lines.front();

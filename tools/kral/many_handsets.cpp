@@ -25,7 +25,6 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint16_t kLastPort = 255;
 constexpr std::size_t kMostAtOnce = 48;  // the library keeps 50 connections
 constexpr std::chrono::milliseconds kDrawEvery{100};
 

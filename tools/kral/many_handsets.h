@@ -15,6 +15,8 @@
 
 namespace kral::tool {
 
+inline constexpr std::uint16_t kLastPort = 255;
+
 // A command line, parsed. `act` is empty when help was asked for.
 struct ParsedCommand {
   Context context;

@@ -23,7 +23,6 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::uint16_t kLastPort = 255;
 constexpr std::uint16_t kLastSlot = 999;
 constexpr std::size_t kLargestSlotFile = 1 << 20;
 constexpr std::string_view kEsn = "esn:", kUsb = "usb:", kSlot = "slot:";

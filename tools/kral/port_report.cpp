@@ -12,7 +12,7 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::size_t kMostAtOnce = 40;  // the library keeps 50 connections
+constexpr std::size_t kMostAsked = 40;  // the library keeps 50 connections
 
 constexpr std::array<const char*, 6> kAnswers{"not asked", "nothing",          "diagnostics",
                                               "loader",    "flash programmer", "boot loader"};
@@ -46,7 +46,7 @@ const char* StateWord(const PortReport& report) {
 void InParallel(std::size_t count, const std::function<void(std::size_t number)>& work) {
   std::atomic<std::size_t> next{0};
   std::vector<std::jthread> threads;
-  for (std::size_t i = 0; i < std::min(count, kMostAtOnce); ++i) {
+  for (std::size_t i = 0; i < std::min(count, kMostAsked); ++i) {
     threads.emplace_back([&] {
       for (auto number = next++; number < count && !Interrupted(); number = next++) work(number);
     });

@@ -89,7 +89,7 @@ struct Leaf {
   std::uint32_t elements = 1;
 };
 
-class Names {
+class Identifiers {
  public:
   // Not one of the language, of the function itself, or given before.
   std::string Take(std::string name) {
@@ -118,7 +118,7 @@ class Names {
 std::vector<Leaf> LeavesOf(const std::vector<KRAL_CMD_FIELD>& fields) {
   std::vector<Leaf> leaves;
   std::vector<Leaf> groups;  // around the field, the outermost first
-  Names names;
+  Identifiers names;
   for (const KRAL_CMD_FIELD& field : fields) {
     groups.resize(std::min<std::size_t>(groups.size(), field.depth));
     Leaf leaf = groups.empty() ? Leaf{} : groups.back();
