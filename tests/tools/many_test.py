@@ -10,6 +10,7 @@ import subprocess
 import termios
 
 import tool
+from flash_test import BootLoader
 from tool import PATIENCE, ToolTest, clean_environment, command, fixture, start, wait_until
 
 
@@ -86,6 +87,27 @@ class ManyHandsets(ToolTest):
                 held.kill()
                 held.communicate()
             self.expect(7, "-p", "1", "fs", "stat", ":/made")
+
+    def test_a_download_is_one_job_for_all_handsets(self):
+        programmer = self.add("programmer", BootLoader.PROGRAMMER)
+        image = self.add("software", BootLoader.SOFTWARE)
+        with self.fixture(3, "--loader", "boot", "--fault-at", "2:wrong=13,of=08") as (_, self.ports):
+            self.expect_json(2, "--all", "flash", "all", programmer, image)
+            self.expect_json(2, "-p", "1,2", "boot", "info", "--log", self.path("{serial}"))
+            self.expect_json(10, "-p", "1-3", "flash", "all", programmer, "/nonexistent/image")
+            flash = ("flash", "all", "--enter", "--wait", "1", programmer, image)
+            self.assertEqual(self.verdicts(0, "-p", "1,3", *flash, "--log", self.path("log{port}")), {1: 0, 3: 0})
+            self.assertGreater(len(self.content("log3")), 0)
+            self.assertEqual({row["state"] for row in self.expect_json(0, "-p", "1,3", "flash", "info")["handsets"]},
+                             {"programmer"})
+            answer = self.expect_json(0, "--all", "flash", "write", image, "--reset")
+            self.assertEqual([(row["port"], row["bytes"], row["attempts"]) for row in answer["handsets"]],
+                             [(port, len(BootLoader.SOFTWARE), 1) for port in (1, 3)])
+            self.assertEqual({row["build"]["software_revision"]
+                              for row in self.expect_json(0, "-p", "1,3", "info")["handsets"]}, {"VHS-2.0.1"})
+            answer = self.expect_json(12, "-p", "1,2", *flash)
+            self.assertEqual([row["ok"] for row in answer["handsets"]], [True, False])
+            self.assertEqual(answer["handsets"][1]["error"]["name"], "link")
 
     def test_an_interrupt_ends_all_of_them(self):
         with self.fixture(3, "--rate", "20k") as (_, self.ports):

@@ -26,6 +26,7 @@ struct Chosen {
   const CLI::App* verb = nullptr;
   std::set<const CLI::App*> for_many;
   std::set<const CLI::App*> takes_ports;
+  std::map<const CLI::App*, Command::InDownload> in_download;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
   Names names;
   std::set<std::string> asked;
@@ -400,6 +401,11 @@ void Command::ForMany() const {
   chosen_->for_many.insert(app_);
 }
 
+void Command::ForMany(InDownload who) const {
+  ForMany();
+  chosen_->in_download.emplace(app_, who);
+}
+
 void Command::TakesPorts() const {
   chosen_->takes_ports.insert(app_);
 }
@@ -477,6 +483,15 @@ bool CommandLine::for_many() const {
 
 bool CommandLine::takes_ports() const {
   return parser_->chosen.takes_ports.count(parser_->chosen.verb) != 0;
+}
+
+bool CommandLine::asks_identity() const {
+  return parser_->chosen.in_download.count(parser_->chosen.verb) == 0;
+}
+
+bool CommandLine::may_ask_all() const {
+  const auto found = parser_->chosen.in_download.find(parser_->chosen.verb);
+  return found == parser_->chosen.in_download.end() || found->second != Command::InDownload::kBootLoader;
 }
 
 std::vector<std::string> CommandLine::Written() const {

@@ -82,6 +82,9 @@ class Command {
   void Run(std::function<void()> act) const;
   // The verb may be given several handsets: it runs for each of them, with a command line of its own.
   void ForMany() const;
+  // The same for handsets in download, which are not asked who they are. A boot loader is not asked at all.
+  enum class InDownload { kMayBeAsked, kBootLoader };
+  void ForMany(InDownload who) const;
   // The verb takes the ports, however many, as they are: it runs once.
   void TakesPorts() const;
   // Which local files it writes, asked behind the parsing: no two handsets may write the same.
@@ -125,6 +128,8 @@ class CommandLine {
   std::string verb() const;  // "nv backup"
   bool for_many() const;
   bool takes_ports() const;
+  bool asks_identity() const;
+  bool may_ask_all() const;
   std::vector<std::string> Written() const;    // local files, as far as it has said so
   const std::set<std::string>& asked() const;  // which names were asked for: "serial"
 

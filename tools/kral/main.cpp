@@ -66,7 +66,8 @@ constexpr VerbsOf kVerbs[] = {
 std::unique_ptr<ParsedCommand> Declared(std::string_view noun) {
   auto command = std::make_unique<ParsedCommand>();
   const auto version = [context = &command->context] {
-    return context->out.json() ? Json{{"ok", true}, {"version", VersionText()}}.dump() : VersionText();
+    return context->out.json() ? Json{{"ok", true}, {"schema", kSchema}, {"version", VersionText()}}.dump()
+                               : VersionText();
   };
   command->line = std::make_unique<CommandLine>("kral", "Talks to mobile handsets in production and test.", version);
   const auto root = command->line->root();
@@ -134,7 +135,9 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
-  if (!command->line->asked().empty()) {
+  // A verb that takes several ports as they are names their files itself.
+  const bool several = command->context.all || command->context.session.port.find_first_of(",-") != std::string::npos;
+  if (!command->line->asked().empty() && !several) {
     const auto found = command->context.session;
     command = ParseAgain(arguments, *command->line, NamesOf(*command->line, found));
     command->context.session.port = found.port;

@@ -6,13 +6,11 @@
 #include <atomic>
 #include <cctype>
 #include <chrono>
-#include <cmath>
 #include <condition_variable>
 #include <filesystem>
 #include <map>
 #include <mutex>
 #include <optional>
-#include <set>
 #include <thread>
 #include <utility>
 
@@ -21,6 +19,8 @@
 #include "tools/kral/format.h"
 #include "tools/kral/handset_identity.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/port_report.h"
+#include "tools/kral/verdicts.h"
 
 namespace kral::tool {
 namespace {
@@ -47,25 +47,6 @@ std::string Ask(Session& session, bool needed, std::string (*question)(Session&)
   return needed ? question(session) : IfTold(session, question);
 }
 
-// Without those that lead to the same device as one in front of them: a link of a port folder has a number beside that
-// of its target.
-std::vector<std::uint16_t> WithoutTwins(const std::vector<std::uint16_t>& ports, bool are_named) {
-  std::vector<std::uint16_t> different;
-  std::map<std::filesystem::path, std::uint16_t> devices;
-  for (const auto port : ports) {
-    std::error_code ignored;
-    const auto device = std::filesystem::canonical(ComPortDevice(port), ignored);
-    const auto [first, is_new] = devices.emplace(device, port);
-    if (is_new || device.empty()) {
-      different.push_back(port);
-    } else if (are_named) {
-      throw ToolError(ExitCode::kUsage, Format("{} and COM{} are the same device", DescribePort(port), first->second),
-                      "name one of them");
-    }
-  }
-  return different;
-}
-
 bool Asks(const CommandLine& line, const char* name) {
   return line.asked().count(name) != 0;
 }
@@ -80,18 +61,6 @@ SessionOptions ForIdentity(SessionOptions options) {
 SessionOptions ForIdentity(SessionOptions options, std::uint16_t port) {
   options.port = std::to_string(port);
   return ForIdentity(std::move(options));
-}
-
-// So that it is seen whose it is: "COM7: online".
-std::string Labelled(const Verdict& verdict) {
-  std::string text;
-  std::string_view rest = verdict.data;
-  while (!rest.empty()) {
-    const auto line = rest.substr(0, rest.find('\n'));
-    rest.remove_prefix(std::min(rest.size(), line.size() + 1));
-    text += Format("COM{}: {}\n", verdict.port, line);
-  }
-  return text;
 }
 
 // --- The work -------------------------------------------------------------------------------------------------------
@@ -115,14 +84,14 @@ class ManyHandsets {
   // `work` on all handsets without a failure, so many at once. A failure of it is that of the handset.
   void OnEach(const std::function<void(std::size_t number)>& work);
   void Identify(const std::vector<std::uint16_t>& ports);
+  void TakePorts(const std::vector<std::uint16_t>& ports);
+  void RefuseNone() const;
   void RefuseTrouble() const;
   void Prepare();
   void RefuseSameFiles() const;
   void Work();
   void WorkOn(std::size_t number, Board& board);
   void Conclude();
-  Json Rows() const;
-  std::string Table() const;
 
   ParsedCommand& command_;
   const ParseFor& parse_;
@@ -166,6 +135,7 @@ void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
     handsets_.push_back(std::make_unique<OneHandset>());
     handsets_.back()->verdict.port = port;
   }
+  if (!command_.line->asks_identity()) return TakePorts(ports);
   OnEach([this](std::size_t number) {
     auto& verdict = handsets_[number]->verdict;
     Session session(ForIdentity(context().session, verdict.port));
@@ -178,10 +148,30 @@ void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
   if (!context().all) return RefuseTrouble();
   // Those that nobody named and that do not answer are none of the handsets.
   std::erase_if(handsets_, [](const auto& handset) { return !handset->verdict.passed(); });
-  if (handsets_.empty()) {
-    throw ToolError(ExitCode::kNoPort, "no handset answers on any port",
-                    "check cables and power of the handsets and that no other program uses their ports");
+  RefuseNone();
+}
+
+// Whoever has the line: only diagnostics would tell more.
+void ManyHandsets::TakePorts(const std::vector<std::uint16_t>& ports) {
+  for (const char* name : {"serial", "model"}) {
+    if (!Asks(*command_.line, name)) continue;
+    throw ToolError(ExitCode::kUsage, Format("kral {} does not ask for {}", command_.line->verb(), name),
+                    "put {port} or {slot} into the name");
   }
+  if (!context().all) return;
+  const auto reports = ReportPorts(ports, true);
+  std::erase_if(handsets_, [&](const auto& handset) {
+    return std::ranges::none_of(reports, [&](const PortReport& report) {
+      return report.port == handset->verdict.port && report.has_handset();
+    });
+  });
+  RefuseNone();
+}
+
+void ManyHandsets::RefuseNone() const {
+  if (!handsets_.empty()) return;
+  throw ToolError(ExitCode::kNoPort, "no handset answers on any port",
+                  "check cables and power of the handsets and that no other program uses their ports");
 }
 
 // A port that was named and cannot be had is told before anything is done to the others.
@@ -279,62 +269,15 @@ void ManyHandsets::Work() {
   }
 }
 
-// --- The verdict ----------------------------------------------------------------------------------------------------
-
-Json ManyHandsets::Rows() const {
-  Json rows = Json::array();
-  for (const auto& handset : handsets_) {
-    const auto& verdict = handset->verdict;
-    Json row{{"port", verdict.port},
-             {"ok", verdict.passed()},
-             {"serial", verdict.serial},
-             {"model", verdict.model},
-             {"seconds", std::round(verdict.seconds * 1000) / 1000}};
-    row.update(verdict.members);
-    if (!verdict.passed()) row["error"] = ErrorJson(*verdict.failure);
-    rows.push_back(std::move(row));
-  }
-  return rows;
-}
-
-std::string ManyHandsets::Table() const {
-  std::string text;
-  for (const auto& handset : handsets_) {
-    const auto& verdict = handset->verdict;
-    text += Format("{:<7} {:<8} {:>8.1f} s  {}\n", Format("COM{}", verdict.port), verdict.serial, verdict.seconds,
-                   verdict.passed() ? "passed" : Format("FAILED: {}", verdict.failure->what()));
-  }
-  return text;
-}
-
 void ManyHandsets::Conclude() {
-  std::vector<std::string> failed;
-  std::set<ExitCode> codes;
-  const ToolError* first = nullptr;
-  for (const auto& handset : handsets_) {
-    if (handset->verdict.passed()) continue;
-    failed.push_back(Format("COM{}", handset->verdict.port));
-    codes.insert(handset->verdict.failure->code());
-    if (first == nullptr) first = &*handset->verdict.failure;
-  }
-  if (!out().json()) WriteAside(Table());
-  command_.context.found = {{"handsets", Rows()}};
-  const auto all = Counted(handsets_.size(), "handset");
-  if (first == nullptr) {
-    out().Result(command_.context.found, "");
-    if (!out().json()) out().Note(Format("{} passed", all));
-    return;
-  }
-  if (Interrupted()) throw InterruptedError();
-  const bool alike = failed.size() == handsets_.size() && codes.size() == 1;
-  throw ToolError(alike ? first->code() : ExitCode::kSomeFailed,
-                  alike ? Format("none of {} passed: {}", all, first->what())
-                        : Format("{} of {} failed: {}", failed.size(), all, Joined(failed, ", ")),
-                  first->hint());
+  std::vector<const Verdict*> verdicts;
+  for (const auto& handset : handsets_) verdicts.push_back(&handset->verdict);
+  ConcludeVerdicts(command_.context, verdicts);
 }
 
 void ManyHandsets::Run() {
   const bool all = command_.context.all;
+  if (all && !command_.line->may_ask_all()) throw MustNameBootLoaders();
   Identify(WithoutTwins(all ? ListPorts() : ParsePorts(command_.context.session.port), !all));
   Prepare();
   Work();
@@ -368,6 +311,23 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text) {
   return ports;
 }
 
+std::vector<std::uint16_t> WithoutTwins(const std::vector<std::uint16_t>& ports, bool are_named) {
+  std::vector<std::uint16_t> different;
+  std::map<std::filesystem::path, std::uint16_t> devices;
+  for (const auto port : ports) {
+    std::error_code ignored;
+    const auto device = std::filesystem::canonical(ComPortDevice(port), ignored);
+    const auto [first, is_new] = devices.emplace(device, port);
+    if (is_new || device.empty()) {
+      different.push_back(port);
+    } else if (are_named) {
+      throw ToolError(ExitCode::kUsage, Format("{} and COM{} are the same device", DescribePort(port), first->second),
+                      "name one of them");
+    }
+  }
+  return different;
+}
+
 Names NamesOf(const CommandLine& line, const SessionOptions& options) {
   const bool asks = Asks(line, "serial") || Asks(line, "model");
   const auto slot = std::to_string(options.slots.empty() ? 1 : options.slots.begin()->second);
@@ -378,6 +338,10 @@ Names NamesOf(const CommandLine& line, const SessionOptions& options) {
   if (Asks(line, "serial")) names["serial"] = AsFileName(SerialOf(session));
   if (Asks(line, "model")) names["model"] = AsFileName(ModelOf(session));
   return names;
+}
+
+ToolError MustNameBootLoaders() {
+  return {ExitCode::kUsage, "to ask all ports would cost boot loaders their hello", "name the ports: -p 7-14"};
 }
 
 bool IsForMany(const ParsedCommand& command) {

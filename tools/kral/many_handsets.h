@@ -29,6 +29,13 @@ using ParseFor = std::function<std::unique_ptr<ParsedCommand>(std::uint16_t port
 // "7", "COM7", "7,8,20-27": in this order. ToolError kUsage for what is no list of ports, and for a port named twice.
 std::vector<std::uint16_t> ParsePorts(std::string_view text);
 
+// Without those that lead to the same device as one in front of them: a link of a port folder has a number beside that
+// of its target. ToolError for such as were named.
+std::vector<std::uint16_t> WithoutTwins(const std::vector<std::uint16_t>& ports, bool are_named);
+
+// Of --all where boot loaders may be.
+ToolError MustNameBootLoaders();
+
 // What the names in its files stand for. Asks the handset only for what was asked for.
 Names NamesOf(const CommandLine& line, const SessionOptions& session);
 

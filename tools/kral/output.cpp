@@ -12,7 +12,6 @@ namespace kral::tool {
 namespace {
 
 constexpr std::size_t kDumpWidth = 16;
-constexpr int kSchema = 1;  // of the objects; grows when a member changes its meaning or goes
 
 bool IsPrintable(char character) {
   return character >= ' ' && character <= '~';

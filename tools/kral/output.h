@@ -13,6 +13,8 @@
 
 namespace kral::tool {
 
+inline constexpr int kSchema = 1;  // of the objects; grows when a member changes its meaning or goes
+
 class Output {
  public:
   void UseJson() { json_ = true; }

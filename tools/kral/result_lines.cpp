@@ -14,9 +14,9 @@ constexpr std::size_t kTextOffset = 8;  // of a record of the callback
 constexpr std::array kBeginnings{kDiffCounts, kTransferStatus, kLogFileTrouble};
 
 std::mutex mutex;
-std::map<std::string_view, std::string> results;  // by beginning
+std::map<std::pair<KRAL_HANDLE, std::string_view>, std::string> results;  // by beginning; 0: of any handle
 
-void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
+void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t handle) {
   if (record == nullptr || size <= kTextOffset) return;
   const char* const begin = static_cast<const char*>(record) + kTextOffset;
   const void* const end = std::memchr(begin, 0, size - kTextOffset);
@@ -25,7 +25,8 @@ void KRAL_CALL OnLine(std::uint32_t size, const void* record, std::uint32_t) {
   for (const auto beginning : kBeginnings) {
     if (!text.starts_with(beginning)) continue;
     const std::lock_guard lock(mutex);
-    results[beginning] = text.substr(beginning.size());
+    for (const KRAL_HANDLE whose : {handle, KRAL_HANDLE{0}})
+      results[{whose, beginning}] = text.substr(beginning.size());
   }
 }
 
@@ -35,9 +36,9 @@ void CollectResultLines(KRAL_HANDLE handle) {
   KRAL_ConfigureLibraryTextLogCallBack(handle, OnLine);
 }
 
-std::optional<std::string> ResultLine(std::string_view beginning) {
+std::optional<std::string> ResultLine(std::string_view beginning, KRAL_HANDLE handle) {
   const std::lock_guard lock(mutex);
-  const auto found = results.find(beginning);
+  const auto found = results.find({handle, beginning});
   return found == results.end() ? std::nullopt : std::optional(found->second);
 }
 

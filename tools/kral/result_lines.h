@@ -20,8 +20,8 @@ inline constexpr std::string_view kTransferStatus = "Kivrat: image transfer stat
 inline constexpr std::string_view kLogFileTrouble = "Text log: ";  // the file does not hold all lines
 
 void CollectResultLines(KRAL_HANDLE handle);  // from now on, through the text-log callback of the handle
-// The rest of the last line with this beginning.
-std::optional<std::string> ResultLine(std::string_view beginning);
+// The rest of the last line with this beginning, of a handle or of all.
+std::optional<std::string> ResultLine(std::string_view beginning, KRAL_HANDLE handle = 0);
 
 }  // namespace kral::tool
 

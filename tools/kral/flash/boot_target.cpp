@@ -74,7 +74,7 @@ void BootTarget::Load(const std::string& programmer) {
   progress_ = nullptr;
   if (!loaded) throw Explain();
   // The protocol goes on whatever the target says; a person wants to know.
-  const auto status = ResultLine(kTransferStatus);
+  const auto status = ResultLine(kTransferStatus, session_.handle());
   if (status && *status != "0") {
     throw ToolError(
         ExitCode::kRefused,

@@ -5,6 +5,7 @@
 
 #include "tools/kral/flash/boot_target.h"
 #include "tools/kral/flash/flash_images.h"
+#include "tools/kral/flash/flash_many.h"
 #include "tools/kral/format.h"
 #include "tools/kral/verbs.h"
 
@@ -48,6 +49,15 @@ struct FlashAllArguments {
 void FlashAll(Context& context, const FlashAllArguments& arguments) {
   std::vector<FlashImage> images;
   for (const auto& image : arguments.images) images.push_back(ReadFlashImage(image, KRAL_IMAGE_FORMAT_BY_CONTENT));
+  if (HasSeveralPorts(context)) {
+    FlashPlan plan;
+    plan.programmer = arguments.programmer;
+    plan.enter = arguments.options.enter;
+    plan.return_s = arguments.options.wait_s;
+    plan.images = images;
+    plan.reset = arguments.reset;
+    return FlashMany(context, plan);
+  }
   BootTarget target(context, arguments.options);
   target.FlashAll(arguments.programmer, images);
   Json written = Json::array();
@@ -81,11 +91,13 @@ void AddBootVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<BootOptions>();
   const auto info = boot.Verb("info", "Tell version and chip identity; the boot loader then waits for an image");
   AddBootOptions(info, *options);
+  info.ForMany(Command::InDownload::kBootLoader);
   info.Run([&context, options] { ShowInfo(context, *options); });
 
   const auto programmer = std::make_shared<std::string>();
   const auto load = boot.Verb("load", "Transfer a flash programmer, which starts at once");
   AddLoadOptions(load, *options, *programmer);
+  load.ForMany(Command::InDownload::kBootLoader);
   load.Run([&context, options, programmer] { Load(context, *options, *programmer); });
 
   const auto arguments = std::make_shared<FlashAllArguments>();
@@ -94,6 +106,7 @@ void AddBootVerbs(const Command& root, Context& context) {
   AddLoadOptions(all, arguments->options, arguments->programmer);
   all.Add("images", arguments->images, "Image files, each as FILE or TYPE:FILE").Required();
   all.Flag("--reset", arguments->reset, "Restart the handset at the end, if its programmer knows how");
+  all.TakesPorts();
   all.Run([&context, arguments] { FlashAll(context, *arguments); });
 }
 

@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "tools/kral/flash/flash_images.h"
+#include "tools/kral/flash/flash_many.h"
 #include "tools/kral/flash/flash_target.h"
 #include "tools/kral/format.h"
 #include "tools/kral/verbs.h"
@@ -106,6 +107,19 @@ void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uin
       {{"dry_run", true}, {"images", rows}, {"bytes", bytes}, {"blocks", blocks}, {"block_size", block_size}}, text);
 }
 
+void WriteToMany(Context& context, const WriteArguments& arguments, const std::vector<FlashImage>& images) {
+  if (arguments.security_mode) {
+    throw ToolError(ExitCode::kUsage, "a security mode is set on one handset at a time", "name one port: -p 7");
+  }
+  FlashPlan plan;
+  plan.partition_table = arguments.partition_table;
+  plan.override_table = arguments.override_table;
+  plan.images = images;
+  plan.options = arguments.options;
+  plan.reset = arguments.reset;
+  FlashMany(context, plan);
+}
+
 // Every file is looked at before the first byte goes out.
 void WriteImages(Context& context, WriteArguments arguments) {
   auto& options = arguments.options;
@@ -116,6 +130,7 @@ void WriteImages(Context& context, WriteArguments arguments) {
   if (!arguments.partition_table.empty()) CheckFile(arguments.partition_table, kLargestOpening);
   if (arguments.dry_run)
     return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
+  if (HasSeveralPorts(context)) return WriteToMany(context, arguments, images);
 
   FlashTarget target(context);
   const auto limits = target.Hello();
@@ -213,6 +228,7 @@ void AddLoadVerb(const Command& flash, Context& context) {
       .Between(2, 65535, "bytes")
       .ShowDefault();
   load.Flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
+  load.ForMany();
   load.Run([&context, arguments] { LoadProgrammer(context, *arguments); });
 }
 
@@ -231,6 +247,7 @@ void AddWriteVerb(const Command& flash, Context& context) {
   write.Flag("--override", arguments->override_table, "Let the partition table replace a different one");
   write.Flag("--reset", arguments->reset, "Restart the handset afterwards");
   write.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
+  write.TakesPorts();
   write.Run([&context, arguments] { WriteImages(context, *arguments); });
 }
 
@@ -238,15 +255,15 @@ void AddWriteVerb(const Command& flash, Context& context) {
 
 void AddFlashVerbs(const Command& root, Context& context) {
   const auto flash = root.Noun("flash", "Software download: flash programmers and images");
-  flash.Verb("info", "Tell what has the line: diagnostics, loader or flash programmer").Run([&context] {
-    ShowInfo(context);
-  });
+  const auto info = flash.Verb("info", "Tell what has the line: diagnostics, loader or flash programmer");
+  info.ForMany(Command::InDownload::kMayBeAsked);
+  info.Run([&context] { ShowInfo(context); });
   AddLoadVerb(flash, context);
   AddWriteVerb(flash, context);
 
-  flash.Verb("reset", "Restart a handset out of its loader or flash programmer").Run([&context] {
-    RestartHandset(context);
-  });
+  const auto reset = flash.Verb("reset", "Restart a handset out of its loader or flash programmer");
+  reset.ForMany(Command::InDownload::kMayBeAsked);
+  reset.Run([&context] { RestartHandset(context); });
 
   const auto files = std::make_shared<std::vector<std::string>>();
   const auto format = std::make_shared<std::string>("auto");
