@@ -173,7 +173,7 @@ Session::Session(const SessionOptions& options, Expected expected)
   if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);
-  latest_port = port_;
+  if (port_ != KRAL_PORT_NULL) latest_port = port_;
   ThrowIfInterrupted();
   handle_ = expected == Expected::kInBootLoader ? KRAL_Kivrat_ConnectServer(port_) : KRAL_ConnectServer(port_);
   if (handle_ == 0) {

@@ -79,6 +79,10 @@ std::vector<std::uint16_t> FlashJob::Ports() const {
 }
 
 void FlashJob::SetUp() {
+  const auto& trace = context_.session.trace;
+  if (!trace.file.empty() || !trace.file_on_failure.empty()) {
+    throw ToolError(ExitCode::kUsage, "downloads to several handsets are not traced", "name one port: -p 7");
+  }
   auto options = Empty<KRAL_VENTRIMS_OPTIONS>();
   Do(KRAL_VENTRIMS_GetOptions(job_, &options), "the job");
   options.flags = (plan_.enter ? KRAL_VENTRIMS_ENTER_LOADER : 0) | (plan_.reset ? KRAL_VENTRIMS_RESET : 0);
