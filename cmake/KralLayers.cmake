@@ -11,6 +11,7 @@ else()
   set(KRAL_LIBRARIES_platform PkgConfig::xml2)
 endif()
 set(KRAL_LIBRARIES_base z)
+set(KRAL_LIBRARIES_handset_services z)
 
 if(KRAL_PRECOMPILE)
   file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/generated/precompiled.cpp CONTENT "")

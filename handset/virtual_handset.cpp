@@ -151,6 +151,11 @@ void VirtualHandset::OnSubsystem(uint8_t subsystem, uint16_t command, Length len
   table_.OnSubsystem(subsystem, command, length, std::move(handler));
 }
 
+void VirtualHandset::LoadCommands(const std::string& path) {
+  defined_->Load(path, *ftm_);
+  AddService(defined_);
+}
+
 void VirtualHandset::AddService(std::shared_ptr<Service> service) {
   const std::lock_guard lock(mutex_);
   AddServiceLocked(std::move(service));

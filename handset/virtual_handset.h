@@ -29,6 +29,7 @@
 #include "handset/loaders/flash_memory.h"
 #include "handset/loaders/flash_programmer.h"
 #include "handset/loaders/kova_loader.h"
+#include "handset/services/defined_service.h"
 #include "handset/services/efs_service.h"
 #include "handset/services/ftm_service.h"
 #include "handset/services/identity.h"
@@ -87,6 +88,10 @@ class VirtualHandset {
   IdentityService& identity() { return *identity_; }
   OperatingMode& mode() { return *mode_service_; }
   FtmService& ftm() { return *ftm_; }
+  DefinedService& defined() { return *defined_; }
+  // Answers the commands of a definition file. Before it is connected; std::invalid_argument for a file of another
+  // kind.
+  void LoadCommands(const std::string& path);
   Memory& memory() { return *memory_; }
   Maintenance& maintenance() { return *maintenance_; }
   NvStore& nv() { return *nv_; }
@@ -160,6 +165,7 @@ class VirtualHandset {
   std::shared_ptr<LogService> logs_;
   std::shared_ptr<OperatingMode> mode_service_;
   std::shared_ptr<FtmService> ftm_;
+  const std::shared_ptr<DefinedService> defined_ = std::make_shared<DefinedService>();
   std::shared_ptr<Memory> memory_;
   std::shared_ptr<Maintenance> maintenance_;
   FlashMemory flash_;

@@ -83,18 +83,20 @@ std::vector<FtmCommand> FtmService::commands() const {
 
 void FtmService::OnRequest(ByteView request, Wire& wire) {
   if (!InFtm()) return Refuse(Refusal::kBadMode, request, wire);
-  const Bytes result = Carry(GetU16(request, 2), GetU16(request, 4), request.subspan(kHeaderSize));
-  wire.Send(ByteWriter().Raw(request.first(kHeaderSize)).Raw(result).Take());
+  const auto result = Carry(GetU16(request, 2), GetU16(request, 4), request.subspan(kHeaderSize));
+  if (!result) return Refuse(Refusal::kBadParameter, request, wire);
+  wire.Send(ByteWriter().Raw(request.first(kHeaderSize)).Raw(*result).Take());
 }
 
 void FtmService::OnLegacyRequest(ByteView request, Wire& wire) {
   if (GetU16(request, 1) != kLegacySelector) return Refuse(Refusal::kBadParameter, request, wire);
   if (!InFtm()) return Refuse(Refusal::kBadMode, request, wire);
-  const Bytes result = Carry(0, GetU16(request, 5), request.subspan(kLegacyHeaderSize));
-  wire.Send(ByteWriter().Raw(request.first(kLegacyHeaderSize)).Raw(result).Take());
+  const auto result = Carry(0, GetU16(request, 5), request.subspan(kLegacyHeaderSize));
+  if (!result) return Refuse(Refusal::kBadParameter, request, wire);
+  wire.Send(ByteWriter().Raw(request.first(kLegacyHeaderSize)).Raw(*result).Take());
 }
 
-Bytes FtmService::Carry(uint16_t mode_id, uint16_t command, ByteView payload) {
+std::optional<Bytes> FtmService::Carry(uint16_t mode_id, uint16_t command, ByteView payload) {
   const std::lock_guard lock(mutex_);
   if (commands_.size() == kRememberedCommands) commands_.erase(commands_.begin());
   commands_.push_back({mode_id, command, Bytes(payload.begin(), payload.end())});

@@ -15,6 +15,7 @@
 #include <functional>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <vector>
 
 #include "handset/line/bytes.h"
@@ -51,8 +52,8 @@ class FtmService final : public Service {
   void OnReset() override;
 
   // Gives the commands of a mode id to something else than a transceiver: it returns what stands in the reply behind
-  // the command id. To be called before the handset is connected.
-  using Dispatcher = std::function<Bytes(uint16_t command, ByteView payload)>;
+  // the command id, or nothing to refuse it. To be called before the handset is connected.
+  using Dispatcher = std::function<std::optional<Bytes>(uint16_t command, ByteView payload)>;
   void SetDispatcher(uint16_t mode_id, Dispatcher dispatcher) { dispatchers_[mode_id] = std::move(dispatcher); }
 
   void SetInputLevel(uint16_t mode_id, int16_t hundredths_of_dbm);
@@ -61,8 +62,8 @@ class FtmService final : public Service {
  private:
   void OnRequest(ByteView request, Wire& wire);
   void OnLegacyRequest(ByteView request, Wire& wire);
-  // What stands in the reply behind the command id.
-  Bytes Carry(uint16_t mode_id, uint16_t command, ByteView payload);
+  // What stands in the reply behind the command id; nothing for what is refused.
+  std::optional<Bytes> Carry(uint16_t mode_id, uint16_t command, ByteView payload);
 
   bool InFtm() const { return mode_.state() == ModeState::kFactoryTest; }
 

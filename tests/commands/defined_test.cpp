@@ -298,6 +298,23 @@ TEST_F(DefinedCommands, EveryKindOfFieldComesBackAsItWasSent) {
       << sent;
 }
 
+TEST_F(DefinedCommands, TheVirtualHandsetRemembersWhatIsSet) {
+  LoadExample();
+  handset().LoadCommands(KRAL_EXAMPLES "/commands.xml");
+  handset().defined().Set("WLAN.version", "2");
+  handset().defined().Set("WLAN.packed.points[0].channel", "14");
+  handset().defined().Set("SENSOR.value", "-1");
+  handset().defined().Set("SENSOR.name", "T1");
+  handset().defined().Set("SENSOR.raw", "ab");
+  EXPECT_EQ(Call("WLAN.TX_START", "channel=14 flags.antenna=2"), R"({"status":0,"power":0})");
+  EXPECT_EQ(handset().defined().Value("WLAN.flags.antenna"), "2");
+  EXPECT_EQ(Call("WLAN.GET_TABLE", ""), R"({"status":0,"version":2,"packed":{"points":[{"channel":14,"power":0}]}})");
+  EXPECT_EQ(Call("SENSOR.READ", "sensor=7 kind=54M limit=-7"), R"({"value":-1,"name":"T1","raw_size":2,"raw":"6162"})");
+  EXPECT_EQ(handset().defined().Value("SENSOR.limit"), "-7");
+  handset().defined().Set("WLAN.status", "3");
+  EXPECT_EQ(Call("WLAN.SET_TABLE", ""), "the handset refused WLAN.SET_TABLE: status is 3");
+}
+
 TEST_F(DefinedCommands, PreparedCallsAreSetByIndexAndSentOften) {
   LoadExample();
   uint32_t call = 0;

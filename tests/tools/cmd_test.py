@@ -22,6 +22,11 @@ int main(void) {
 
 
 class DefinedCommands(ToolTest):
+    @staticmethod
+    def read(path):
+        with open(path, "rb") as file:
+            return file.read()
+
     def test_commands_are_listed_and_shown_without_a_handset(self):
         listed = self.expect_json(0, "cmd", "list", "--defs", EXAMPLE, "--defs", RF)["commands"]
         self.assertEqual(len(listed), 4 + 104)
@@ -45,6 +50,23 @@ class DefinedCommands(ToolTest):
             self.assertEqual(len(json.loads(text)["response"]), 4)
             error = self.ask(2, "cmd", "call", "WLAN.TX_START", "channel=15", "--defs", EXAMPLE)["error"]
             self.assertIn("channel=15 is out of range: 1 to 14", error["text"])
+
+    def test_a_simulated_handset_answers_defined_commands(self):
+        script = self.add("script", b"set 1 WLAN.version=1\nset 1 WLAN.power=-12.5 # dBm\n")
+        with self.handset("--commands", EXAMPLE, "--script", script):
+            self.expect(0, "-p", "7", "mode", "ftm")
+            def call(*words, code=0):
+                return self.ask(code, "cmd", "call", *words, "--defs", EXAMPLE)
+            self.assertEqual(call("WLAN.TX_START", "channel=6")["reply"], {"status": 0, "power": -12.5})
+            call("WLAN.SET_TABLE", "points[0].channel=3", "points[0].power=-5", "label=a b")
+            self.assertEqual(call("WLAN.GET_TABLE")["reply"]["points"], [{"channel": 3, "power": -5}])
+            self.assertEqual(call("SENSOR.READ", "sensor=1")["reply"],
+                             {"value": 0, "name": "", "raw_size": 0, "raw": ""})
+            narrow = self.add("wide.xml", self.read(EXAMPLE).replace(b'name="sensor" type="u8" max="7"',
+                                                                     b'name="sensor" type="u8"'))
+            error = self.ask(7, "cmd", "call", "SENSOR.READ", "sensor=8", "--defs", narrow)["error"]
+            self.assertIn("with 20: a parameter is wrong", error["text"])
+        self.expect(10, "sim", "--commands", self.add("none.xml", b"<x"))
 
     def test_the_header_compiles_as_c89_and_as_cpp(self):
         made = self.expect_json(0, "cmd", "header", EXAMPLE, RF, "--output", self.path("made.h"))

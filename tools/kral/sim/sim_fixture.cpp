@@ -2,6 +2,7 @@
 #include "tools/kral/sim/sim_fixture.h"
 
 #include <charconv>
+#include <stdexcept>
 
 #include "handset/caller_transport.h"
 #include "kral/kral.h"
@@ -41,7 +42,15 @@ void RestorePkv(handset::VirtualHandset& handset, const std::string& file) {
       "kral sim --pkv takes a file of kral nv backup", record);
 }
 
+void AnswerCommands(handset::VirtualHandset& handset, const std::string& file) try {
+  handset.LoadCommands(file);
+} catch (const std::invalid_argument& error) {
+  throw ToolError(ExitCode::kBadFile, Format("{} cannot be used: {}", file, error.what()),
+                  "kral cmd list --defs says more of what is wrong with a file");
+}
+
 void SetUp(handset::VirtualHandset& handset, const SimOptions& options) {
+  for (const auto& file : options.commands) AnswerCommands(handset, file);
   if (options.switches) handset.maintenance().SetSwitches(*options.switches);
   handset.mode().SetSwitchingDelay(options.switching_delay_ms);
   handset.mode().SetResetTime(options.reset_time_ms);

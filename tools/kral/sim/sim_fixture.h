@@ -19,8 +19,9 @@ namespace kral::tool {
 struct SimOptions {
   handset::Identity identity;  // of the first one; the others have the serial numbers behind it
   std::uint16_t count = 1;
-  std::string pkv;    // restored to each of them before it is connected
-  std::string ports;  // folder for links com1, com2, ...
+  std::vector<std::string> commands;  // definition files, whose families are answered
+  std::string pkv;                    // restored to each of them before it is connected
+  std::string ports;                  // folder for links com1, com2, ...
   std::string script;
   std::string rate;
   std::optional<std::uint16_t> switches;

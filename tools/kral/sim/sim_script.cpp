@@ -21,16 +21,33 @@ using handset::VirtualHandset;
 // What is done to one handset, or to all.
 struct Deed {
   std::string_view name;
-  bool takes_fault;
-  void (*act)(VirtualHandset& handset, const std::string& fault);
+  void (*check)(const std::string& words);  // of the words that it takes; null: it takes none
+  void (*act)(VirtualHandset& handset, const std::string& words);
 };
 
-constexpr std::array<Deed, 5> kDeeds{{
-    {"fault", true, [](VirtualHandset& handset, const std::string& fault) { AddFault(handset.faults(), fault); }},
-    {"heal", false, [](VirtualHandset& handset, const std::string&) { handset.faults().Clear(); }},
-    {"plug", false, [](VirtualHandset& handset, const std::string&) { handset.PlugIn(); }},
-    {"restart", false, [](VirtualHandset& handset, const std::string&) { handset.Restart(); }},
-    {"unplug", false, [](VirtualHandset& handset, const std::string&) { handset.HangUp(); }},
+void CheckFault(const std::string& words) {
+  handset::FaultPlan unused;
+  AddFault(unused, words);
+}
+
+void CheckAssignment(const std::string& words) {
+  const auto dot = words.find('.');
+  if (dot == 0 || dot > words.find('=') || words.find('=') == std::string::npos) {
+    throw ToolError(ExitCode::kUsage, Format("'{}' is not of the form FAMILY.FIELD=VALUE", words),
+                    "for example WLAN.power=-12.5");
+  }
+}
+
+constexpr std::array<Deed, 6> kDeeds{{
+    {"fault", CheckFault, [](VirtualHandset& handset, const std::string& fault) { AddFault(handset.faults(), fault); }},
+    {"heal", nullptr, [](VirtualHandset& handset, const std::string&) { handset.faults().Clear(); }},
+    {"plug", nullptr, [](VirtualHandset& handset, const std::string&) { handset.PlugIn(); }},
+    {"restart", nullptr, [](VirtualHandset& handset, const std::string&) { handset.Restart(); }},
+    {"set", CheckAssignment,
+     [](VirtualHandset& handset, const std::string& words) {
+       handset.defined().Set(words.substr(0, words.find('=')), words.substr(words.find('=') + 1));
+     }},
+    {"unplug", nullptr, [](VirtualHandset& handset, const std::string&) { handset.HangUp(); }},
 }};
 
 // Words with one blank between them, without a comment.
@@ -64,7 +81,7 @@ struct SimCommand {
   const Deed* deed = nullptr;  // null: wait, quit
   bool quits = false;
   std::uint32_t number = 0;  // of the handset, 0 for all; or milliseconds
-  std::string fault;
+  std::string words;         // that the deed takes
 };
 
 [[noreturn]] void Reject(const std::string& line) {
@@ -77,7 +94,7 @@ SimCommand ParseCommand(const std::string& line, std::size_t count) {
   auto rest = line;
   const auto name = TakeWord(rest);
   const auto where = TakeWord(rest);
-  command.fault = rest;
+  command.words = rest;
   if (name == "quit") {
     command.quits = true;
     return command;
@@ -89,11 +106,10 @@ SimCommand ParseCommand(const std::string& line, std::size_t count) {
   for (const auto& deed : kDeeds) {
     if (deed.name == name) command.deed = &deed;
   }
-  if (command.deed == nullptr || command.deed->takes_fault == rest.empty() ||
+  if (command.deed == nullptr || (command.deed->check != nullptr) == rest.empty() ||
       (number && (*number == 0 || *number > count)))
     Reject(line);
-  handset::FaultPlan unused;
-  if (command.deed->takes_fault) AddFault(unused, rest);
+  if (command.deed->check != nullptr) command.deed->check(rest);
   return command;
 }
 
@@ -148,7 +164,7 @@ bool SimScript::Do(const std::string& line) try {
     wait_ms_ = command.number;
   } else {
     for (auto& socket : fixture_.sockets()) {
-      if (command.number == 0 || command.number == socket.number()) command.deed->act(socket.handset(), command.fault);
+      if (command.number == 0 || command.number == socket.number()) command.deed->act(socket.handset(), command.words);
     }
   }
   out_.Stream({{"event", "done"}, {"command", line}}, line + "\n");
@@ -163,6 +179,7 @@ std::string SimScript::Describe() {
          "  unplug N, plug N    the device vanishes, and comes back\n"
          "  restart N           power off and on\n"
          "  fault N KIND...     misbehaviour as above; heal N takes all of it away\n"
+         "  set N FAMILY.FIELD=VALUE  what replies to commands of --commands hold from now on\n"
          "  wait MS, quit       # and what follows it is a comment\n";
 }
 

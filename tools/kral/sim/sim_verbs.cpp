@@ -61,6 +61,7 @@ void AddOptions(const Command& sim, SimOptions& options) {
       .Between(1, kMostHandsets)
       .ShowDefault();
   sim.Add("--ports", options.ports, "Keep links com1, com2, ... in this folder, for KRAL_PORT_DIR");
+  sim.Add("--commands", options.commands, "Definition file, whose commands are answered (docs/commands.md)").OneEach();
   sim.Add("--pkv", options.pkv, "Items and files of each handset, from a backup");
   sim.Add("--rate", options.rate, "Bytes per second in each direction: 250k, 1M").Check([](const std::string& text) {
     return ParseRate(text) ? "" : "a rate is a number such as 250000, 250k or 1M";
