@@ -451,6 +451,37 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopPlayback(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_GetPlaybackState(KRAL_HANDLE handle, int32_t* state, uint64_t* packets,
                                                  uint64_t* skipped);
 
+/**
+ * Makes a pcapng file of a capture file, for other tools to read: the packets with their times, FCS included, under
+ * link type 147. docs/traffic.md describes it.
+ *
+ * @param      capture  written by KRAL_StartCapture
+ * @param      pcapng   the new file; what was there stays until it is whole
+ * @param[out] packets  packets in it; may be null
+ * @param[out] cut      1 when the capture file is cut or damaged: what is in front is in the new file; may be null
+ * @return 1; 0 when one of the files cannot be read or written, and when the first is no capture file
+ *
+ * Wait: the reading and writing of the files.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ExportCapture(const char* capture, const char* pcapng, uint64_t* packets,
+                                              uint32_t* cut);
+
+/**
+ * Makes a capture file of a pcapng file: one of KRAL_ExportCapture, also when other tools have taken packets out of it,
+ * or a trace. What is no packet that a handset sends unasked is left out. An exported and imported capture is the same.
+ *
+ * @param      pcapng   little-endian
+ * @param      capture  the new file; what was there stays until it is whole
+ * @param[out] packets  packets in it; may be null
+ * @param[out] skipped  packets that were left out; may be null
+ * @param[out] cut      1 when the pcapng file is cut or damaged: what is in front is in the new file; may be null
+ * @return 1; 0 when one of the files cannot be read or written, and when the first is no pcapng file
+ *
+ * Wait: the reading and writing of the files.
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_ImportCapture(const char* pcapng, const char* capture, uint64_t* packets,
+                                              uint64_t* skipped, uint32_t* cut);
+
 /* --- Traces (additions) ------------------------------------------------------------------------------------------- */
 
 /**

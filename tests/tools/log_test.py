@@ -7,6 +7,7 @@ import signal
 import termios
 import time
 
+import pcapng
 from tool import PATIENCE, ToolTest, run, start, wait_until
 
 
@@ -52,6 +53,31 @@ class Traffic(ToolTest):
         os.truncate(file, os.path.getsize(file) - 1)
         cut = self.stream("log", "play", file)
         self.assertEqual((len(cut) - 1, cut[-1]["cut"]), (done["packets"] - 1, True))
+
+    def test_captures_become_pcapng_files_and_captures_again(self):
+        capture, file, again = self.path("capture"), self.path("capture.pcapng"), self.path("again")
+        with self.handset(*self.RATES):
+            packets = self.ask(0, "log", "capture", capture, "--on", "0x1001", "--count", "50")["packets"]
+            self.expect(0, "-p", "7", "--trace", self.path("trace"), "log", "capture", self.path("x"), "--count", "20")
+        self.assertEqual(self.expect_json(0, "log", "export", capture, file)["packets"], packets)
+        self.assertEqual(len(pcapng.packets(self.content(file))), packets)
+        done = self.expect_json(0, "log", "import", file, again)
+        self.assertEqual((done["packets"], done["skipped"], done["cut"]), (packets, 0, False))
+        self.assertEqual(self.content(again), self.content(capture))
+        # What a trace has of logs is a capture, too.
+        done = self.expect_json(0, "log", "import", self.path("trace"), again)
+        self.assertGreaterEqual(done["packets"], 20)
+        self.assertGreaterEqual(done["skipped"], 2)
+        os.truncate(capture, os.path.getsize(capture) - 1)
+        cut = self.expect(0, "log", "export", capture, file)
+        self.assertIn("is cut or damaged", cut.err)
+        self.assertEqual(len(pcapng.packets(self.content(file))), packets - 1)
+        # Foreign files and places that cannot be written leave what was there.
+        before = self.content(file)
+        self.expect_json(10, "log", "export", self.add("foreign", b"nothing"), file)
+        self.expect_json(10, "log", "import", capture, file)
+        self.expect_json(10, "log", "export", capture, self.path("no", "folder"))
+        self.assertEqual(self.content(file), before)
 
     def test_events_are_shown_as_they_come_and_from_a_file(self):
         file, names = self.path("capture"), self.add("names", b"291,Band change\n")

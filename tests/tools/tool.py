@@ -160,7 +160,8 @@ class Counting(unittest.TextTestResult):
 
 
 def run_tests(name, arguments, module="__main__"):
-    """Those of a module, or those that the arguments name. The last line is "NAME: N passed, M failed"; a run that executed nothing fails."""
+    """Those of the module, or those that the arguments name. The last line is "NAME: N passed, M failed"; a run that
+    executed nothing fails."""
     suite = unittest.main(module=module, argv=[sys.argv[0], *arguments], exit=False,
                           testRunner=unittest.TextTestRunner(resultclass=Counting, verbosity=1))
     bad = len(suite.result.failures) + len(suite.result.errors)

@@ -66,6 +66,8 @@ constexpr const char* kExamples[] = {
     "kral -p 7 log off --all",
     "kral -p 7 log capture traffic.cap --on 0x1001 --seconds 10",
     "kral log play traffic.cap",
+    "kral log export traffic.cap traffic.pcapng",
+    "kral log import traffic.pcapng traffic.cap",
     "kral -p 7 log stats --seconds 10",
     "kral log stats traffic.cap",
     "kral -p 7 event on 290-299",

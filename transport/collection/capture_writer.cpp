@@ -2,32 +2,13 @@
 #include "transport/collection/capture_writer.h"
 
 #include <algorithm>
-#include <array>
 
 #include "base/little_endian.h"
 #include "base/text_log.h"
-#include "transport/collection/capture_format.h"
 #include "transport/engine/bounded_queue.h"
 
 namespace kral {
 namespace {
-
-std::array<uint8_t, capture_head::kSize> MakeHead() {
-  std::array<uint8_t, capture_head::kSize> head{};
-  std::ranges::copy(capture_head::kMagic, head.begin());
-  StoreLe(std::span<uint8_t>(head), capture_head::kVersion, capture_head::kThisVersion);
-  StoreLe(std::span<uint8_t>(head), capture_head::kHeadSize, static_cast<uint16_t>(capture_head::kSize));
-  return head;
-}
-
-std::array<uint8_t, capture_record::kSize> MakeRecordHead(size_t length) {
-  std::array<uint8_t, capture_record::kSize> head{};
-  const auto length16 = static_cast<uint16_t>(length);
-  StoreLe(std::span<uint8_t>(head), capture_record::kMicroseconds, MicrosecondsNow());
-  StoreLe(std::span<uint8_t>(head), capture_record::kLength, length16);
-  StoreLe(std::span<uint8_t>(head), capture_record::kLengthComplement, static_cast<uint16_t>(~length16));
-  return head;
-}
 
 // Of records that may be cut at the end.
 uint64_t CountWholeRecords(std::span<const uint8_t> bytes) {
@@ -43,6 +24,23 @@ uint64_t CountWholeRecords(std::span<const uint8_t> bytes) {
 
 }  // namespace
 
+std::array<uint8_t, capture_head::kSize> CaptureHead() {
+  std::array<uint8_t, capture_head::kSize> head{};
+  std::ranges::copy(capture_head::kMagic, head.begin());
+  StoreLe(std::span<uint8_t>(head), capture_head::kVersion, capture_head::kThisVersion);
+  StoreLe(std::span<uint8_t>(head), capture_head::kHeadSize, static_cast<uint16_t>(capture_head::kSize));
+  return head;
+}
+
+std::array<uint8_t, capture_record::kSize> CaptureRecordHead(uint64_t microseconds, size_t length) {
+  std::array<uint8_t, capture_record::kSize> head{};
+  const auto length16 = static_cast<uint16_t>(length);
+  StoreLe(std::span<uint8_t>(head), capture_record::kMicroseconds, microseconds);
+  StoreLe(std::span<uint8_t>(head), capture_record::kLength, length16);
+  StoreLe(std::span<uint8_t>(head), capture_record::kLengthComplement, static_cast<uint16_t>(~length16));
+  return head;
+}
+
 CaptureWriter::~CaptureWriter() {
   Stop();
 }
@@ -51,7 +49,7 @@ bool CaptureWriter::OnBegin() {
   lost_before_ = lost();
   loss_told_ = false;
   failed_ = false;
-  const auto head = MakeHead();
+  const auto head = CaptureHead();
   return Write(head) == head.size();
 }
 
@@ -60,7 +58,8 @@ void CaptureWriter::Append(std::span<const uint8_t> packet) {
       packet.size() > kMaximumPacket) {
     return;
   }
-  if (Add(MakeRecordHead(packet.size()), packet) == Added::kNoRoom) Lose(1, "the disk is too slow");
+  if (Add(CaptureRecordHead(MicrosecondsNow(), packet.size()), packet) == Added::kNoRoom)
+    Lose(1, "the disk is too slow");
 }
 
 bool CaptureWriter::Stop(uint32_t time_out_ms) {

@@ -2,16 +2,22 @@
 #ifndef KRAL_TRANSPORT_COLLECTION_CAPTURE_WRITER_H
 #define KRAL_TRANSPORT_COLLECTION_CAPTURE_WRITER_H
 
+#include <array>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <span>
 
 #include "transport/collection/batch_writer.h"
+#include "transport/collection/capture_format.h"
 
 namespace kral {
 
 class DataLogFileHandler;
+
+// The beginning of a capture file, and of a record in it.
+std::array<uint8_t, capture_head::kSize> CaptureHead();
+std::array<uint8_t, capture_record::kSize> CaptureRecordHead(uint64_t microseconds, size_t length);
 
 // Packets that find no room while the disk is busy are lost, and counted.
 class CaptureWriter final : public BatchWriter {

@@ -26,6 +26,7 @@ struct LogOptions {
   bool all = false;
   std::string names;
   std::string file;
+  std::string target;
   bool as_recorded = false;
   Limit limit;
 };
@@ -273,6 +274,32 @@ void Statistics(const Context& context, LogOptions& options) {
                                 counters.collected, counters.dropped_logs, counters.oversized));
 }
 
+// Gives what the conversion has found.
+void Convert(const Context& context, const LogOptions& options, bool is_export) {
+  std::uint64_t packets = 0;
+  std::uint64_t skipped = 0;
+  std::uint32_t cut = 0;
+  const char* const from = options.file.c_str();
+  const char* const to = options.target.c_str();
+  const bool done = is_export ? KRAL_ExportCapture(from, to, &packets, &cut) != 0
+                              : KRAL_ImportCapture(from, to, &packets, &skipped, &cut) != 0;
+  if (!done) {
+    const auto record = LastError(0);
+    throw ToolError(
+        ExitCode::kBadFile, record ? record->text : "the files cannot be converted",
+        is_export ? "give a capture file, and a place to write to" : "give a pcapng file, and a place to write to",
+        record);
+  }
+  if (cut != 0) NoteCut(context, options.file);
+  Json members{{"file", options.file}, {"target", options.target}, {"packets", packets}, {"cut", cut != 0}};
+  auto text = Format("{} in {}\n", Counted(packets, "packet"), options.target);
+  if (!is_export) {
+    members["skipped"] = skipped;
+    if (skipped != 0) text += Format("{} left out: no handset sends them by itself\n", Counted(skipped, "packet"));
+  }
+  context.out.Result(members, text);
+}
+
 void AddCodes(const Command& verb, const std::shared_ptr<LogOptions>& options, const char* name) {
   verb.Add(name, options->codes, "Log codes, such as 0x1001 or 0x1000-0x100F");
 }
@@ -312,6 +339,14 @@ void AddLogVerbs(const Command& root, Context& context) {
   play.Add("file", options->file, "The capture file").Required();
   play.Flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
   run(play, Play);
+
+  for (const bool is_export : {true, false}) {
+    const auto verb = is_export ? log.Verb("export", "Make a pcapng file of a capture file; needs no handset")
+                                : log.Verb("import", "Make a capture file of a pcapng file; needs no handset");
+    verb.Add("file", options->file, is_export ? "The capture file" : "The pcapng file").Required();
+    verb.Add("target", options->target, "The file to write").Required();
+    run(verb, [is_export](const Context& c, const LogOptions& o) { Convert(c, o, is_export); });
+  }
 
   const auto stats = log.Verb("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
   stats.Add("file", options->file, "A capture file; default: the handset");
