@@ -126,7 +126,7 @@ class Diag_FTM {
   bool StartCapture(const char* file_name);
   bool StopCapture();  // true when everything collected is in the file
   // A file's packets come as if the handset had sent them.
-  bool StartPlayback(const char* file_name, PlayPace pace);
+  bool StartPlayback(const char* file_name, PlayPace pace, const CaptureStretch& stretch);
   // From now on every byte of the port goes to this file, or the latest are kept for SaveTrace.
   bool StartTrace(const char* file_name);
   bool StopTrace();  // true when everything that passed is in the file

@@ -3,6 +3,7 @@
 #include "frame/diag_ftm.h"
 #include "frame/diag_ftm_parts.h"
 #include "platform/file_util.h"
+#include "transport/collection/capture_seek.h"
 
 namespace kral {
 
@@ -48,9 +49,12 @@ bool Diag_FTM::StopCapture() {
                       : Failure(KRAL_ERROR_ARGUMENT, "no capture is running"));
 }
 
-bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace) {
+bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace, const CaptureStretch& stretch) {
   // Through a phone server there is no dispatcher to play into.
-  if (!server_mode() && player().Start(OpenCaptureSource(file_name), pace, dispatcher(), sorter(), parts_)) return true;
+  if (!server_mode() &&
+      player().Start(OpenCaptureSourceAt(file_name, stretch.from), pace, dispatcher(), sorter(), parts_, stretch.to)) {
+    return true;
+  }
   log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",
                   file_name);
   if (server_mode()) return Fail(Failure(KRAL_ERROR_ARGUMENT, "nothing can be played through a phone server"));

@@ -94,9 +94,9 @@ bool StartCapture(Diag_FTM& phone, const char* file_name) {
   return phone.StartCapture(file_name);
 }
 
-bool StartPlayback(Diag_FTM& phone, const char* file_name, uint32_t pace) {
+bool StartPlayback(Diag_FTM& phone, const char* file_name, uint32_t pace, const kral::CaptureStretch& stretch) {
   if (pace >= kral::kPlayPaceCount) return Fail(Failure(KRAL_ERROR_ARGUMENT, "the pace %u is not a listed one", pace));
-  return phone.StartPlayback(file_name, static_cast<kral::PlayPace>(pace));
+  return phone.StartPlayback(file_name, static_cast<kral::PlayPace>(pace), stretch);
 }
 
 bool SetPlaybackCallback(Diag_FTM& phone, KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {
@@ -179,7 +179,15 @@ uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, 
   return ExportCall(handle, __func__)
       .Logged("( iPace = %u )", pace)
       .Require(file_name != nullptr, kNoFileName)
-      .RunAtOnce(StartPlayback, file_name, pace);
+      .RunAtOnce(StartPlayback, file_name, pace, kral::CaptureStretch());
+}
+
+uint8_t KRAL_CALL KRAL_StartPlaybackBetween(KRAL_HANDLE handle, const char* file_name, uint32_t pace, uint64_t from,
+                                            uint64_t to) {
+  return ExportCall(handle, __func__)
+      .Logged("( iPace = %u )", pace)
+      .Require(file_name != nullptr, kNoFileName)
+      .RunAtOnce(StartPlayback, file_name, pace, kral::CaptureStretch{from, to});
 }
 
 uint8_t KRAL_CALL KRAL_ConfigurePlaybackCallBack(KRAL_HANDLE handle, KRAL_PLAYBACK_CALLBACK callback, uintptr_t value) {

@@ -408,6 +408,21 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace);
 
 /**
+ * Plays a part of a capture file: from the first packet that came at a time or behind it, to the last one in front of
+ * the first that came after another. What is in front is not read: it begins at once in a file of any length. Where the
+ * clock of the PC was set back while the file was written, it may begin at another packet of that time.
+ *
+ * @param handle     from a connect function
+ * @param file_name  as for KRAL_StartPlayback
+ * @param pace       KRAL_PLAY_...
+ * @param from       microseconds since 1970-01-01 UTC; 0: from the beginning
+ * @param to         the same; UINT64_MAX: to the end
+ * @return 1; 0 as for KRAL_StartPlayback
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StartPlaybackBetween(KRAL_HANDLE handle, const char* file_name, uint32_t pace,
+                                                     uint64_t from, uint64_t to);
+
+/**
  * Sees a packet of a file just before it is played, with the time at which it was collected. It comes on the thread of
  * the playback, which waits while it runs, and must not call functions that send requests. Packets that are left out
  * are not seen.

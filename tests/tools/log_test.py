@@ -4,6 +4,7 @@ import fcntl
 import json
 import os
 import signal
+import struct
 import termios
 import time
 
@@ -53,6 +54,20 @@ class Traffic(ToolTest):
         os.truncate(file, os.path.getsize(file) - 1)
         cut = self.stream("log", "play", file)
         self.assertEqual((len(cut) - 1, cut[-1]["cut"]), (done["packets"] - 1, True))
+
+    def test_part_of_a_capture_is_played(self):
+        # Two packets on each side of a midnight, ten seconds apart.
+        midnight = 20000 * 86400
+        file = self.add("capture", b"KRALCAP\x1A" + struct.pack("<2HI", 1, 16, 0) + b"".join(
+            struct.pack("<Q2H2B", (midnight + at) * 1000000, 2, 0xFFFD, 16, at & 0xFF) for at in (-20, -10, 0, 10)))
+        day = time.strftime("%Y-%m-%d", time.gmtime(midnight))
+        for words, packets in (((), 4), (("--from", "23:59:50"), 3), (("--from", "23:59:45", "--to", "00:00:05"), 2),
+                               (("--to", "23:59:50"), 2), (("--to", "00:00"), 3), (("--from", f"{day}T00:00:00.5Z"), 1),
+                               (("--from", "12:00"), 4), (("--from", f"{day} 01:00"), 0)):
+            with self.subTest(words=words):
+                self.assertEqual(self.stream("log", "play", file, *words)[-1]["packets"], packets)
+        for wrong in ("24:00", "1:2", "12:60", "12:00:0", "2026-02-30T01:00", "noon", "12:00x"):
+            self.expect_json(2, "log", "play", file, "--from", wrong)
 
     def test_captures_become_pcapng_files_and_captures_again(self):
         capture, file, again = self.path("capture"), self.path("capture.pcapng"), self.path("again")

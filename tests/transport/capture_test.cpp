@@ -8,6 +8,7 @@
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_player.h"
 #include "transport/collection/capture_reader.h"
+#include "transport/collection/capture_seek.h"
 #include "transport/collection/capture_writer.h"
 
 namespace kral {
@@ -206,6 +207,91 @@ TEST(CaptureFile, IsWrittenByOneAloneAndNeverUnderAPlayback) {
   EXPECT_EQ(std::filesystem::file_size(path), 30u);
   players.clear();
   EXPECT_TRUE(second.Start(open, nullptr));
+}
+
+// --- Times ----------------------------------------------------------------------------------------------------------
+
+class CaptureTimes : public testing::Test {
+ protected:
+  // Packets whose content looks like records, a second apart or some of them at once.
+  Packet Make(size_t packets) {
+    std::mt19937 random(7);
+    const auto head = CaptureHead();
+    Packet file(head.begin(), head.end());
+    uint64_t time = 1000;
+    for (size_t i = 0; i < packets; ++i) {
+      time += random() % 3 == 0 ? 0 : random() % 2000;
+      Packet packet(2 + random() % 900, 16);
+      if (random() % 2 == 0) {
+        const auto lure = CaptureRecordHead(random(), 2 + random() % 300);
+        for (size_t at = 0; at + lure.size() <= packet.size(); at += lure.size()) {
+          std::ranges::copy(lure, packet.begin() + static_cast<std::ptrdiff_t>(at));
+        }
+      }
+      times_.push_back(time);
+      offsets_.push_back(file.size());
+      const auto record = CaptureRecordHead(time, packet.size());
+      file.insert(file.end(), record.begin(), record.end());
+      file.insert(file.end(), packet.begin(), packet.end());
+    }
+    return file;
+  }
+  uint64_t Find(const Packet& file, uint64_t time) {
+    const CaptureBytes bytes = [&](uint64_t offset, std::span<uint8_t> buffer) -> std::optional<size_t> {
+      ++reads_;
+      const size_t at = std::min<size_t>(offset, file.size());
+      const size_t count = std::min(buffer.size(), file.size() - at);
+      std::copy_n(file.begin() + static_cast<std::ptrdiff_t>(at), count, buffer.begin());
+      return count;
+    };
+    return FindCaptureTime(bytes, capture_head::kSize, file.size(), time);
+  }
+  uint64_t Expected(const Packet& file, uint64_t time) {
+    const auto found = std::ranges::lower_bound(times_, time);
+    return found == times_.end() ? file.size() : offsets_[static_cast<size_t>(found - times_.begin())];
+  }
+
+  std::vector<uint64_t> times_;
+  std::vector<uint64_t> offsets_;
+  size_t reads_ = 0;
+};
+
+TEST_F(CaptureTimes, AreFoundWithoutReadingTheFile) {
+  const Packet file = Make(20000);
+  std::mt19937 random(8);
+  for (int i = 0; i < 200; ++i) {
+    const uint64_t time = i == 0 ? 0 : i == 1 ? UINT64_MAX : 900 + random() % (times_.back() + 200);
+    reads_ = 0;
+    EXPECT_EQ(Find(file, time), Expected(file, time)) << time;
+    EXPECT_LT(reads_, times_.size() / 3) << "most of it is passed over";
+  }
+}
+
+TEST_F(CaptureTimes, AreFoundInACutFileAndInADamagedOneUpToTheDamage) {
+  Packet file = Make(20000);
+  file.resize(file.size() - 3);
+  EXPECT_EQ(Find(file, times_[19000]), Expected(file, times_[19000]));
+  EXPECT_EQ(Find(file, UINT64_MAX), offsets_.back()) << "the record that is cut";
+  std::fill(file.begin() + static_cast<std::ptrdiff_t>(offsets_[12000]), file.end(), uint8_t{0});
+  EXPECT_EQ(Find(file, times_[11000]), Expected(file, times_[11000]));
+  EXPECT_EQ(Find(file, UINT64_MAX), offsets_[12000]);
+}
+
+TEST_F(CaptureTimes, StretchOfAFileIsReadFromItsFirstPacketToItsLast) {
+  const test::TempFolder folder;
+  const Packet file = Make(5000);
+  const std::string path = folder.Add("capture", {reinterpret_cast<const char*>(file.data()), file.size()});
+  const uint64_t from = times_[4000];
+  const uint64_t to = times_[4100];
+  CaptureReader reader(OpenCaptureSourceAt(path, from), to);
+  CaptureRecord record;
+  std::vector<uint64_t> read;
+  while (reader.Next(record) == Outcome::kRecord) read.push_back(record.microseconds);
+  const std::vector<uint64_t> wanted(std::ranges::lower_bound(times_, from), std::ranges::upper_bound(times_, to));
+  EXPECT_EQ(read, wanted);
+  EXPECT_EQ(reader.Next(record), Outcome::kEnd);
+  CaptureReader foreign(OpenCaptureSourceAt(folder.Add("foreign", "no capture at all, but long enough"), 1));
+  EXPECT_EQ(foreign.Next(record), Outcome::kForeign);
 }
 
 // --- Playback -------------------------------------------------------------------------------------------------------

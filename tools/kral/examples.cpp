@@ -66,6 +66,7 @@ constexpr const char* kExamples[] = {
     "kral -p 7 log off --all",
     "kral -p 7 log capture traffic.cap --on 0x1001 --seconds 10",
     "kral log play traffic.cap",
+    "kral log play traffic.cap --from 14:02:10 --to 14:03",
     "kral log export traffic.cap traffic.pcapng",
     "kral log import traffic.pcapng traffic.cap",
     "kral -p 7 log stats --seconds 10",

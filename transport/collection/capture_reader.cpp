@@ -55,6 +55,7 @@ CaptureReader::Outcome CaptureReader::ReadRecord(CaptureRecord& record) {
   if (length != complement || length < capture_record::kShortestPacket || length > kMaximumPacket) {
     return Outcome::kCut;
   }
+  if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) > to_) return Outcome::kEnd;
   std::vector<uint8_t> packet(length);
   if (source_(packet) != packet.size()) return Outcome::kCut;
   record.microseconds = *LoadLe<uint64_t>(head, capture_record::kMicroseconds);

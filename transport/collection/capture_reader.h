@@ -24,6 +24,12 @@ struct CaptureRecord {
   std::vector<uint8_t> packet;
 };
 
+// From the first record at or behind a time to the last one in front of the first that is later than another.
+struct CaptureStretch {
+  uint64_t from = 0;
+  uint64_t to = UINT64_MAX;
+};
+
 class CaptureReader {
  public:
   enum class Outcome : uint8_t {
@@ -33,7 +39,8 @@ class CaptureReader {
     kForeign,  // not a capture file, or one of a later version
   };
 
-  explicit CaptureReader(CaptureSource source) : source_(std::move(source)) {}
+  // It ends in front of the first record that is later than `to`.
+  explicit CaptureReader(CaptureSource source, uint64_t to = UINT64_MAX) : source_(std::move(source)), to_(to) {}
 
   // Once it has given anything but kRecord it goes on giving that.
   Outcome Next(CaptureRecord& record);
@@ -43,6 +50,7 @@ class CaptureReader {
   Outcome ReadRecord(CaptureRecord& record);
 
   CaptureSource source_;
+  uint64_t to_;
   bool begun_ = false;
   Outcome last_ = Outcome::kRecord;
 };

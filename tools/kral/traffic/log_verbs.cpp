@@ -11,6 +11,7 @@
 #include "tools/kral/interrupt.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/traffic/playback.h"
+#include "tools/kral/traffic/time_of_packet.h"
 #include "tools/kral/traffic/traffic.h"
 #include "tools/kral/verbs.h"
 
@@ -27,6 +28,8 @@ struct LogOptions {
   std::string names;
   std::string file;
   std::string target;
+  std::string from;
+  std::string to;
   bool as_recorded = false;
   Limit limit;
 };
@@ -200,20 +203,33 @@ void NoteCut(const Context& context, const std::string& file) {
   context.out.Note(Format("{} is cut or damaged behind its last whole packet", file));
 }
 
+Stretch StretchOf(KRAL_HANDLE handle, const LogOptions& options) {
+  Stretch stretch;
+  if (options.from.empty() && options.to.empty()) return stretch;
+  const auto begin = BeginOf(handle, options.file);
+  if (!begin) return stretch;
+  if (!options.from.empty()) stretch.from = ParseTime(options.from, *begin, 0);
+  if (!options.to.empty()) stretch.to = ParseTime(options.to, *begin, std::max(*begin, stretch.from));
+  return stretch;
+}
+
 void Play(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   std::uint64_t packets = 0;
-  const bool whole = PlayFile(handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
-                              [&](const PlayedPacket& packet) {
-                                ++packets;
-                                const auto what = DescribePacket(packet.bytes);
-                                context.out.Stream({{"event", "packet"},
-                                                    {"microseconds", packet.microseconds},
-                                                    {"what", what},
-                                                    {"bytes", HexText(packet.bytes)}},
-                                                   Format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what,
-                                                          packet.bytes.size(), HexDump(packet.bytes)));
-                              });
+  const auto stretch = StretchOf(handle.get(), options);
+  const bool whole = PlayFile(
+      handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
+      [&](const PlayedPacket& packet) {
+        ++packets;
+        const auto what = DescribePacket(packet.bytes);
+        context.out.Stream({{"event", "packet"},
+                            {"microseconds", packet.microseconds},
+                            {"what", what},
+                            {"bytes", HexText(packet.bytes)}},
+                           Format("{}  {}  {} bytes\n{}", TimeText(packet.microseconds), what, packet.bytes.size(),
+                                  HexDump(packet.bytes)));
+      },
+      stretch);
   if (!whole) NoteCut(context, options.file);
   context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
 }
@@ -338,6 +354,9 @@ void AddLogVerbs(const Command& root, Context& context) {
   const auto play = log.Verb("play", "Print the packets of a capture file; needs no handset");
   play.Add("file", options->file, "The capture file").Required();
   play.Flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
+  play.Add("--from", options->from,
+           "Only what came then or later: 14:02:10 of the first day, or 2026-03-01T14:02:10; UTC");
+  play.Add("--to", options->to, "Only what came then or earlier");
   run(play, Play);
 
   for (const bool is_export : {true, false}) {

@@ -21,10 +21,10 @@ constexpr std::chrono::milliseconds kWait{50};
 // playback waits for whoever takes them here, at its recorded pace as well.
 class Playback {
  public:
-  Playback(KRAL_HANDLE handle, const std::string& file, Pace pace) : handle_(handle) {
+  Playback(KRAL_HANDLE handle, const std::string& file, Pace pace, const Stretch& stretch) : handle_(handle) {
     KRAL_ConfigurePlaybackCallBack(handle_, Take, reinterpret_cast<std::uintptr_t>(this));
     const auto library_pace = pace == Pace::kAsRecorded ? KRAL_PLAY_AS_RECORDED : KRAL_PLAY_AT_ONCE;
-    started_ = KRAL_StartPlayback(handle_, file.c_str(), library_pace) != 0;
+    started_ = KRAL_StartPlaybackBetween(handle_, file.c_str(), library_pace, stretch.from, stretch.to) != 0;
   }
   ~Playback() {
     {
@@ -90,9 +90,12 @@ OfflineHandle::~OfflineHandle() {
   KRAL_DisconnectServer(handle_);
 }
 
-bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
-              const std::function<void(const PlayedPacket&)>& sink) {
-  Playback playback(handle, file, pace);
+namespace {
+
+// Until the sink has had enough. Whether the file was whole.
+bool Play(KRAL_HANDLE handle, const std::string& file, Pace pace, const Stretch& stretch,
+          const std::function<bool(const PlayedPacket&)>& goes_on) {
+  Playback playback(handle, file, pace, stretch);
   if (!playback.started()) {
     throw ExplainRecord(LastError(handle), "the playback", KRAL_PORT_NULL, "check the name and the permissions");
   }
@@ -102,7 +105,7 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
     const auto packet = playback.Next(state == KRAL_PLAYBACK_RUNNING ? kWait : kWait * 0);
     ThrowIfInterrupted();
     if (packet) {
-      sink(*packet);
+      if (!goes_on(*packet)) return true;
     } else if (state == KRAL_PLAYBACK_FOREIGN) {
       throw ToolError(ExitCode::kBadFile, Format("{} is not a capture file", file),
                       "kral log capture writes such files");
@@ -110,6 +113,25 @@ bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
       return state == KRAL_PLAYBACK_DONE;
     }
   }
+}
+
+}  // namespace
+
+bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
+              const std::function<void(const PlayedPacket&)>& sink, const Stretch& stretch) {
+  return Play(handle, file, pace, stretch, [&](const PlayedPacket& packet) {
+    sink(packet);
+    return true;
+  });
+}
+
+std::optional<std::uint64_t> BeginOf(KRAL_HANDLE handle, const std::string& file) {
+  std::optional<std::uint64_t> begin;
+  Play(handle, file, Pace::kAtOnce, {}, [&](const PlayedPacket& packet) {
+    begin = packet.microseconds;
+    return false;
+  });
+  return begin;
 }
 
 std::string TimeText(std::uint64_t microseconds) {

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -31,9 +32,18 @@ struct PlayedPacket {
 
 enum class Pace { kAtOnce, kAsRecorded };
 
-// The whole file, packet by packet. ToolError kBadFile; one that is cut gives what it has, and false.
+// Microseconds since 1970 UTC, both ends included.
+struct Stretch {
+  std::uint64_t from = 0;
+  std::uint64_t to = UINT64_MAX;
+};
+
+// The whole file, or a part, packet by packet. ToolError kBadFile; one that is cut gives what it has, and false.
 bool PlayFile(KRAL_HANDLE handle, const std::string& file, Pace pace,
-              const std::function<void(const PlayedPacket&)>& sink);
+              const std::function<void(const PlayedPacket&)>& sink, const Stretch& stretch = {});
+
+// When its first packet came; nothing when it has none.
+std::optional<std::uint64_t> BeginOf(KRAL_HANDLE handle, const std::string& file);
 
 // "2026-03-01T09:30:00.250000Z"; a number that is no time of this era as it stands.
 std::string TimeText(std::uint64_t microseconds);

@@ -1,0 +1,29 @@
+// Finds a time in a capture file without reading what is in front of it: in ten gigabytes as soon as in ten kilobytes.
+#ifndef KRAL_TRANSPORT_COLLECTION_CAPTURE_SEEK_H
+#define KRAL_TRANSPORT_COLLECTION_CAPTURE_SEEK_H
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <span>
+#include <string>
+
+#include "transport/collection/capture_reader.h"
+
+namespace kral {
+
+// Fills the buffer from that place on as far as there are bytes, and gives their number; nothing where the file cannot
+// be read.
+using CaptureBytes = std::function<std::optional<size_t>(uint64_t offset, std::span<uint8_t> buffer)>;
+
+// Where the first record stands whose time is not before this one: between `begin`, where a record begins, and the end.
+// Times are taken to grow; where the clock was set back, it is one of the places that fit.
+uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds);
+
+// As OpenCaptureSource: the head of the file, and behind it its records from that time on.
+CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds);
+
+}  // namespace kral
+
+#endif
