@@ -73,6 +73,8 @@ def run_here(number: int, seed: int, short: bool, only: Optional[str], folder: p
                 print(f"FAILED: promise {number}, {runs[done]} (seed {seed}): {wrong}\n"
                       f"    again: {_repeat(number, seed, runs[done])}", file=sys.stderr, flush=True)
     bench.close()
+    if getattr(module, "SANITIZED", False):
+        bench.count("cases under ASan" if "libasan" in os.environ.get("LD_PRELOAD", "") else "cases without ASan", ran)
     return {"cases": len(chosen), "ran": ran, "failed": len(failures), "figures": dict(bench.figures),
             "worst": dict(bench.worst)}
 
@@ -88,13 +90,28 @@ def _child(arguments: argparse.Namespace) -> int:
     os._exit(1 if result["failed"] or result["ran"] != result["cases"] else 0)
 
 
+def _environment(module: Any) -> Dict[str, str]:
+    """Where a sanitized library is at hand, the promises that say so run on it."""
+    environment = dict(os.environ)
+    library = environment.get("KRAL_SANITIZED_LIBRARY")
+    if getattr(module, "SANITIZED", False) and library:
+        # The run time of C++ as well: the sanitizer looks for what throws exceptions when it is loaded, and only then.
+        run_times = [subprocess.run(["gcc", f"-print-file-name={name}"], stdout=subprocess.PIPE, text=True,
+                                    check=True).stdout.strip() for name in ("libasan.so", "libstdc++.so.6")]
+        # Leaks are not for a Python process to be searched for.
+        environment.update(KRAL_LIBRARY=library, LD_PRELOAD=" ".join(run_times),
+                           ASAN_OPTIONS="detect_leaks=0:halt_on_error=1", UBSAN_OPTIONS="print_stacktrace=1")
+    return environment
+
+
 def _run_child(number: int, seed: int, arguments: argparse.Namespace) -> Dict[str, Any]:
     command = [sys.executable, "-m", "torture", "--child", str(number), "--seed", str(seed)]
     command += ["--short"] if arguments.short else []
     command += ["--case", arguments.case] if arguments.case is not None else []
     limit = _LONGEST_SHORT_S if arguments.short else _LONGEST_S
     try:
-        done = subprocess.run(command, stdout=subprocess.PIPE, timeout=limit, check=False)
+        done = subprocess.run(command, stdout=subprocess.PIPE, timeout=limit, check=False,
+                              env=_environment(promises()[number]))
         how = f"exit code {done.returncode}"
         if done.stdout.strip():
             result: Dict[str, Any] = json.loads(done.stdout.splitlines()[-1])

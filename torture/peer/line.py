@@ -36,12 +36,13 @@ class Line:
         self.handle = 0
         self.requests: List[bytes] = []
         self.came = threading.Event()
-        # Called when there is nothing else to send; gives more, or nothing.
+        # Gives what comes in front of every piece, and when there is none; or nothing.
         self.source: Optional[Callable[[], bytes]] = None
         self._deframer = Deframer()
         self._lock = threading.Lock()
         self._pieces: List[Tuple[float, int, bytes]] = []
         self._count = 0
+        self._rest = b""
 
     def send(self, data: bytes, after: float = 0) -> None:
         with self._lock:
@@ -58,11 +59,8 @@ class Line:
         """What has not been given to the library yet is lost."""
         with self._lock:
             self._pieces.clear()
+            self._rest = b""
             self.source = None
-
-    @property
-    def is_drained(self) -> bool:
-        return not self._pieces
 
     def _receive(self, data: bytes) -> None:
         for request in self._deframer.feed(data):
@@ -71,14 +69,14 @@ class Line:
             self.came.set()
 
     def _due(self, room: int) -> bytes:
-        """The next piece, cut at the room; the rest of it stays in front."""
+        """The next piece, behind what the source has; what is beyond the room comes first the next time."""
         with self._lock:
-            if not self._pieces or self._pieces[0][0] > time.monotonic():
-                data, when, number = self.source() if self.source else b"", 0.0, 0
-            else:
-                when, number, data = heapq.heappop(self._pieces)
-            if len(data) > room:
-                heapq.heappush(self._pieces, (when, number, data[room:]))
+            data = self._rest
+            if not data:
+                data = self.source() if self.source else b""
+                if self._pieces and self._pieces[0][0] <= time.monotonic():
+                    data += heapq.heappop(self._pieces)[2]
+            self._rest = data[room:]
             return data[:room]
 
     def _wake(self) -> None:
@@ -247,7 +245,7 @@ class PtyLine(Line):
 
     def _pause(self) -> float:
         with self._lock:
-            if self.source:
+            if self._rest or self.source:
                 return 0.001
             if not self._pieces:
                 return 0.5

@@ -22,7 +22,7 @@ AT_ONCE = 1
 _TIME_OUT_MS = 4000
 _LOGS = 70000
 _LOGS_SHORT = 12000
-_AT_A_TIME = 20
+_AT_A_TIME = 50
 _COMMANDS = ("serial", "read-item", "peek", "file-status", "channel")
 
 

@@ -1,0 +1,148 @@
+"""No silent corruption at bit error rates of 1e-6 and 1e-5 in both directions.
+
+What a call says has been read or written must be so; calls may fail, and do. (An NV item that the handset was given
+wrong is not a matter of the line: the frame check sequence guards both ways.)
+"""
+from __future__ import annotations
+
+import ctypes
+import os
+import pathlib
+import random
+from typing import Any, Callable, Dict, List
+
+import kral
+from torture import calls
+from torture.bench import MODES, Bench, check, connected
+from torture.peer.line import CallerLine
+from torture.peer.phone import Phone
+
+NUMBER = 5
+TITLE = "No silent corruption at bit error rates 1e-6 and 1e-5"
+SHORT = 8
+AT_ONCE = 4
+_TIME_OUT_MS = 150
+_RATES = {"1e-6": 1e-6, "1e-5": 1e-5}
+_BYTES = 24 << 20
+_BYTES_SHORT = 1 << 20
+_FILE = 200000
+_READ_SIZE, _WRITE_SIZE = 4091, 4091
+_ITEMS = range(300, 340)
+
+
+class NoisyLine(CallerLine):
+    """Flips bits in both directions, at random distances."""
+
+    def __init__(self, phone: Phone, port: int, rate: float, numbers: random.Random) -> None:
+        super().__init__(phone, port)
+        self.bytes = 0
+        self.flipped = 0
+        self._rate, self._numbers = rate, numbers
+        self._next = self._distance()
+
+    def set_rate(self, rate: float) -> None:
+        self._rate = rate
+        self._next = self._distance()
+
+    def _distance(self) -> int:
+        return int(self._numbers.expovariate(self._rate))
+
+    def _spoil(self, data: bytes) -> bytes:
+        self.bytes += len(data)
+        spoiled = bytearray(data)
+        while self._next < 8 * len(data):
+            spoiled[self._next // 8] ^= 1 << self._next % 8
+            self.flipped += 1
+            self._next += 1 + self._distance()
+        self._next -= 8 * len(data)
+        return bytes(spoiled)
+
+    def _receive(self, data: bytes) -> None:
+        super()._receive(self._spoil(data))
+
+    def _due(self, room: int) -> bytes:
+        return self._spoil(super()._due(room))
+
+
+class _Files:
+    def __init__(self, line: NoisyLine, numbers: random.Random) -> None:
+        self._line, self._numbers = line, numbers
+
+    def write(self) -> bool:
+        data = self._numbers.randbytes(_FILE)
+        result, _ = calls.write_file(self._line.handle, data)
+        check(not result or self._line.phone.files.files["/data/new"] == data, "a file was written wrongly")
+        return bool(result)
+
+    def read(self) -> bool:
+        data = self._numbers.randbytes(_FILE)
+        self._line.phone.files.put("/data/new", data)
+        result, value = calls.read_file(self._line.handle, "/data/new", _FILE)
+        check(not result or value == data, "a file was read wrongly")
+        return bool(result)
+
+
+class _Items:
+    def __init__(self, line: NoisyLine, numbers: random.Random) -> None:
+        self._line, self._numbers = line, numbers
+        self.reference = b""
+
+    def one(self) -> bool:
+        item, data = self._numbers.choice(_ITEMS), self._numbers.randbytes(128)
+        result, status = calls.write_item(self._line.handle, item, data)
+        good = bool(result) and status == 0
+        check(not good or self._line.phone.item(item)[0] == data, f"item {item} was written wrongly")
+        held = self._line.phone.item(item)
+        result, value = calls.read_item(self._line.handle, item)
+        check(not result or value[1] != 0 or value == held, f"item {item} was read wrongly")
+        return good
+
+    def back_up(self) -> bool:
+        file = pathlib.Path(f"bits{self._line.port}.pkv")
+        status = ctypes.c_uint32()
+        kral.api().KRAL_PKV_ConfigureBackup(self._line.handle, _ITEMS[0], _ITEMS[-1], 1)
+        result = kral.api().KRAL_BackupNVFromMobileToPKV(self._line.handle, os.fsencode(file), ctypes.byref(status))
+        if not self.reference:
+            check(result == 1, "no backup over a good line")
+            self.reference = file.read_bytes()
+        check(not result or file.read_bytes() == self.reference, "a backup is not what the handset holds")
+        return bool(result)
+
+
+def _operation(what: str, line: NoisyLine, numbers: random.Random) -> Callable[[], bool]:
+    files, items = _Files(line, numbers), _Items(line, numbers)
+    operations: Dict[str, Callable[[], bool]] = {"write": files.write, "read": files.read, "items": items.one,
+                                                 "back-up": items.back_up}
+    return operations[what]
+
+
+def cases(bench: Bench) -> List[str]:
+    return [f"{what}/{rate}/{mode}" for what in ("write", "read", "items", "back-up") for rate in _RATES
+            for mode in MODES]
+
+
+def _phone() -> Phone:
+    phone = calls.prepare(Phone(calls.SERIAL))
+    for item in _ITEMS:
+        phone.set_item(item, bytes((item + i) & 0xFF for i in range(128)))
+    for folder in ("/nv/item_files/rfnv", "/nv/item_files/conf"):
+        for i in range(3):
+            phone.files.put(f"{folder}/{i:08}", bytes([i]) * 100, item=True)
+    return phone
+
+
+def run(bench: Bench, case: str) -> None:
+    what, rate, mode = case.split("/")
+    numbers = bench.random(case)
+    line = NoisyLine(_phone(), bench.caller_port(), 1e-12, numbers)
+    with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
+        kral.api().KRAL_SetEfsReadAndWritePacketSize(handle, _READ_SIZE, _WRITE_SIZE)
+        operation: Any = _operation(what, line, numbers)
+        operation()  # over a good line: what is compared later
+        line.set_rate(_RATES[rate])
+        # Items go in small packets, a millisecond or more each.
+        goal = (_BYTES_SHORT if bench.short else _BYTES) // (1 if what in ("read", "write") else 20)
+        while line.bytes < goal:
+            bench.count("good" if operation() else "failed")
+        bench.count("bytes", line.bytes)
+        bench.count("bits flipped", line.flipped)
