@@ -36,6 +36,7 @@ class Call:
 def prepare(phone: Phone) -> Phone:
     phone.set_item(_ITEM, _ITEM_BYTES)
     phone.set_item(_ITEM, _ITEM_BYTES[::-1], 1)
+    phone.set_item(300, _ITEM_BYTES)
     phone.files.put(FILE, FILE_BYTES)
     phone.files.put(ITEM_FILE, b"item file", item=True)
     return phone

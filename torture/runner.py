@@ -90,9 +90,11 @@ def _child(arguments: argparse.Namespace) -> int:
     os._exit(1 if result["failed"] or result["ran"] != result["cases"] else 0)
 
 
-def _environment(module: Any) -> Dict[str, str]:
-    """Where a sanitized library is at hand, the promises that say so run on it."""
+def _environment(module: Any, folder: pathlib.Path) -> Dict[str, str]:
+    """What a promise has preloaded; where a sanitized library is at hand, the promises that say so run on it."""
     environment = dict(os.environ)
+    if hasattr(module, "preload"):
+        environment["LD_PRELOAD"] = module.preload(folder)
     library = environment.get("KRAL_SANITIZED_LIBRARY")
     if getattr(module, "SANITIZED", False) and library:
         # The run time of C++ as well: the sanitizer looks for what throws exceptions when it is loaded, and only then.
@@ -110,8 +112,9 @@ def _run_child(number: int, seed: int, arguments: argparse.Namespace) -> Dict[st
     command += ["--case", arguments.case] if arguments.case is not None else []
     limit = _LONGEST_SHORT_S if arguments.short else _LONGEST_S
     try:
-        done = subprocess.run(command, stdout=subprocess.PIPE, timeout=limit, check=False,
-                              env=_environment(promises()[number]))
+        with tempfile.TemporaryDirectory(prefix="torture") as folder:
+            environment = _environment(promises()[number], pathlib.Path(folder))
+            done = subprocess.run(command, stdout=subprocess.PIPE, timeout=limit, check=False, env=environment)
         how = f"exit code {done.returncode}"
         if done.stdout.strip():
             result: Dict[str, Any] = json.loads(done.stdout.splitlines()[-1])

@@ -29,6 +29,8 @@ class FileSystem:
         self.files: Dict[str, bytes] = {}
         self.items: Set[str] = set()
         self.folders: Set[str] = {"/"}
+        # Names that a listing shows instead of the files' own.
+        self.shown: Dict[str, str] = {}
         self.open_files: Dict[int, str] = {}
         self._open_folders: Dict[int, List[str]] = {}
         self._next = 1
@@ -121,7 +123,7 @@ class FileSystem:
         if entries is None or not 0 < sequence <= len(entries):
             return _words(number, sequence, _BAD_DESCRIPTOR if entries is None else _OK) + bytes(24) + b"\0"
         path = entries[sequence - 1]
-        name = path.rpartition("/")[2].encode("latin-1")
+        name = self.shown.get(path, path.rpartition("/")[2]).encode("latin-1")
         return b"".join((_words(number, sequence, _OK, *self._kind(path), 1, 2, 3), name, b"\0"))
 
     def _close_folder(self, request: bytes) -> bytes:

@@ -74,6 +74,8 @@ class Phone:
         subsystem, command = struct.unpack_from("<BH", request, 1)
         if subsystem == _FILES:
             return self.files.answer(request, command)
+        if subsystem == _NV and command == 0:
+            return self._write_items(request)
         if subsystem == _NV and command in (1, 2):
             number, context = struct.unpack_from("<HH", request, 4)
             if command == 2:
@@ -110,6 +112,16 @@ class Phone:
         number, = struct.unpack_from("<H", request, 1)
         self.set_item(number, request[3:3 + _ITEM_SIZE])
         return request[:3 + _ITEM_SIZE] + struct.pack("<H", _DONE)
+
+    def _write_items(self, request: bytes) -> bytes:
+        results, at = b"", 10
+        while at + 4 <= len(request):
+            size, number, _ = struct.unpack_from("<BHB", request, at)
+            value = request[at + 4:at + 4 + size]
+            self.set_item(number, value)
+            results += struct.pack("<BHB", size, number, _DONE) + value
+            at += 4 + size
+        return request[:8] + struct.pack("<H", _DONE) + results
 
     def _set_switches(self, request: bytes) -> bytes:
         self.switches, = struct.unpack_from("<H", request, 1)

@@ -33,7 +33,7 @@ def _back_up(handle: int) -> calls.Outcome:
     kral.api().KRAL_PKV_ConfigureBackup(handle, 300, 306, 1)
     name = f"liar{handle}.pkv".encode()
     result = kral.api().KRAL_BackupNVFromMobileToPKV(handle, name, ctypes.byref(status))
-    return kral.api().KRAL_PKV_Verify(handle, name, ctypes.byref(status)), result
+    return kral.api().KRAL_PKV_Verify(handle, name, ctypes.byref(status)) and result, None
 
 
 def _write_many(handle: int) -> calls.Outcome:
@@ -44,7 +44,8 @@ def _write_many(handle: int) -> calls.Outcome:
     return kral.api().KRAL_DIAG_NV_WRITE_FlushBatchQueue(handle, *map(ctypes.byref, outputs)), None
 
 
-_MORE: Dict[str, Callable[[int], calls.Outcome]] = {
+# Beside those of calls.py.
+MORE: Dict[str, Callable[[int], calls.Outcome]] = {
     "back-up": _back_up,
     "write-file": calls.write_file,
     "list": calls.list_folder,
@@ -60,7 +61,7 @@ _MORE: Dict[str, Callable[[int], calls.Outcome]] = {
     "device": calls.plain("KRAL_EFS2_DIAG_DEV_INFO", None, None),
     "sync": calls.plain("KRAL_EFS2_SyncWithWait", b"/", 20),
 }
-_OPERATIONS = {**{name: call.run for name, call in calls.CALLS.items() if name not in ("send", "send-raw")}, **_MORE}
+_OPERATIONS = {**{name: call.run for name, call in calls.CALLS.items() if name not in ("send", "send-raw")}, **MORE}
 
 
 def cases(bench: Bench) -> List[str]:
@@ -87,9 +88,7 @@ def run(bench: Bench, case: str) -> None:
             line.send(frame(mutate(numbers.choice((b"\x60", b"\x10", b"\x79")) + numbers.randbytes(40), numbers)))
         line.send(frame(answer))
 
-    phone = calls.prepare(Phone(calls.SERIAL))
-    phone.set_item(300, bytes(128))
-    line = CallerLine(phone, bench.caller_port(), behaviour)
+    line = CallerLine(calls.prepare(Phone(calls.SERIAL)), bench.caller_port(), behaviour)
     with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
         kral.api().KRAL_DIAG_SetPhoneLoggingState(handle, 1)
         kral.api().KRAL_STREAM_ConfigureHello(handle, 1, 5)
