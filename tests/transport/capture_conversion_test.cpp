@@ -13,7 +13,7 @@ namespace {
 using Bytes = std::vector<uint8_t>;
 using End = Conversion::End;
 
-CaptureSource SourceOf(Bytes bytes) {
+CaptureSource CaptureOf(Bytes bytes) {
   return [bytes = std::move(bytes), at = size_t{0}](std::span<uint8_t> buffer) mutable {
     const size_t count = std::min(buffer.size(), bytes.size() - at);
     std::copy_n(bytes.begin() + static_cast<std::ptrdiff_t>(at), count, buffer.begin());
@@ -36,13 +36,13 @@ ConversionSink Into(Bytes& bytes) {
 
 Converted Export(const Bytes& capture) {
   Converted result;
-  result.conversion = CaptureToPcapng(SourceOf(capture), "test", Into(result.bytes));
+  result.conversion = CaptureToPcapng(CaptureOf(capture), "test", Into(result.bytes));
   return result;
 }
 
 Converted Import(const Bytes& pcapng) {
   Converted result;
-  result.conversion = PcapngToCapture(SourceOf(pcapng), Into(result.bytes));
+  result.conversion = PcapngToCapture(CaptureOf(pcapng), Into(result.bytes));
   return result;
 }
 
@@ -60,20 +60,20 @@ Bytes CaptureOf(const std::vector<std::pair<uint64_t, Bytes>>& packets) {
   return file;
 }
 
-const std::vector<std::pair<uint64_t, Bytes>> kPackets = {
+const std::vector<std::pair<uint64_t, Bytes>> kTimedPackets = {
     {1'700'000'000'000'001, {16, 1}}, {1'700'000'000'000'000, Bytes(4096, 121)}, {UINT64_MAX, {96, 0, 0, 1, 2}}};
 
 TEST(CaptureConversion, GoesThereAndBack) {
-  const Bytes capture = CaptureOf(kPackets);
+  const Bytes capture = CaptureOf(kTimedPackets);
   const auto exported = Export(capture);
   EXPECT_EQ(exported.conversion.packets, 3u);
   EXPECT_FALSE(exported.conversion.cut);
   const test::PcapngReading reading(exported.bytes);
   EXPECT_TRUE(reading.whole);
-  ASSERT_EQ(reading.packets.size(), kPackets.size());
-  for (size_t i = 0; i < kPackets.size(); ++i) {
-    EXPECT_EQ(reading.packets[i].microseconds, kPackets[i].first);
-    EXPECT_EQ(reading.packets[i].data, kPackets[i].second);
+  ASSERT_EQ(reading.packets.size(), kTimedPackets.size());
+  for (size_t i = 0; i < kTimedPackets.size(); ++i) {
+    EXPECT_EQ(reading.packets[i].microseconds, kTimedPackets[i].first);
+    EXPECT_EQ(reading.packets[i].data, kTimedPackets[i].second);
     EXPECT_FALSE(reading.packets[i].sent());
   }
   const auto imported = Import(exported.bytes);
@@ -183,7 +183,7 @@ TEST(CaptureConversion, TakesWhatOthersHaveWritten) {
       {"endless block", file({section, {6, 0, 0, 0, 0xFC, 0xFF, 0xFF, 0xFF}}), {}, {}, 0, true},
       {"other byte order", big_endian, End::kForeign, {}, 0, false},
       {"no section", interface(147, {}), End::kForeign, {}, 0, false},
-      {"a capture", CaptureOf(kPackets), End::kForeign, {}, 0, false},
+      {"a capture", CaptureOf(kTimedPackets), End::kForeign, {}, 0, false},
   };
   for (const auto& each : cases) {
     SCOPED_TRACE(each.name);
@@ -200,8 +200,8 @@ TEST(CaptureConversion, TakesWhatOthersHaveWritten) {
 
 TEST(CaptureConversion, FullDiskEndsIt) {
   const auto full = [](std::span<const uint8_t>) { return false; };
-  EXPECT_EQ(CaptureToPcapng(SourceOf(CaptureOf(kPackets)), "", full).end, End::kNotWritten);
-  EXPECT_EQ(PcapngToCapture(SourceOf(Export(CaptureOf(kPackets)).bytes), full).end, End::kNotWritten);
+  EXPECT_EQ(CaptureToPcapng(CaptureOf(CaptureOf(kTimedPackets)), "", full).end, End::kNotWritten);
+  EXPECT_EQ(PcapngToCapture(CaptureOf(Export(CaptureOf(kTimedPackets)).bytes), full).end, End::kNotWritten);
 }
 
 }  // namespace

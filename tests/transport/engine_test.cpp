@@ -266,21 +266,21 @@ TEST_F(Engine, WhatBrokeOffBelongsToTheConnectionThatHasEnded) {
   engine_->sorter.SetCollection(true);
   const auto open = [this](bool callers) { callers ? OpenUser() : Open(); };
   // A caller's transport stays open after a time-out.
-  enum class End { kTimeOut, kStop, kTimeOutOfCallers };
-  for (const End end : {End::kTimeOut, End::kStop, End::kTimeOutOfCallers}) {
-    const bool callers = end != End::kTimeOut;
+  enum class Ending { kTimeOut, kStop, kTimeOutOfCallers };
+  for (const Ending end : {Ending::kTimeOut, Ending::kStop, Ending::kTimeOutOfCallers}) {
+    const bool callers = end != Ending::kTimeOut;
     for (const Bytes& frame : {PlainFrame({75, 1, 2}), PlainFrame({16, 1, 2, 3}), Bytes{0x7D, 0x7D}}) {
       open(callers);
       wire_.OnWrite({});
       const uint64_t before = engine_->transport.counters().bytes_received;
       wire_.ToHost(Bytes(frame.begin(), frame.end() - 1));
       ASSERT_TRUE(Eventually([&] { return engine_->transport.counters().bytes_received > before; }));
-      if (end == End::kStop) {
+      if (end == Ending::kStop) {
         ASSERT_TRUE(engine_->transport.StopThread());
       } else {
         ASSERT_FALSE(Ask({75}, 16, kShort).succeeded);
       }
-      if (end != End::kTimeOutOfCallers) open(callers);
+      if (end != Ending::kTimeOutOfCallers) open(callers);
       AnswerWith({75, 1});
       EXPECT_TRUE(Ask({75}, 16, kBusy).succeeded) << HexDump(frame);
       EXPECT_EQ(engine_->asynchronous.size(), 0u) << "half a packet, and a reply for its other half";
