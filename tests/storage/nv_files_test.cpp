@@ -1,5 +1,6 @@
 // The NV tool's files: source files, PKV files, filters and reports.
 #include "storage/nv/nv_filter.h"
+#include "storage/nv/nv_report_cells.h"
 #include "storage/pkv/pkv_set.h"
 #include "tests/support/nv_fixture.h"
 #include "tests/support/test.h"
@@ -215,6 +216,25 @@ TEST(NvFilterTest, PassesWhatOneOfManyEntriesHolds) {
 
 // --- Reports ---------------------------------------------------------------------------------------------------------
 
+TEST(NvReportCells, DifferingBytesAreMarkedAndEqualLinesFolded) {
+  std::vector<uint8_t> first(70, 0x11), second(68, 0x11);
+  second[17] = 0x22;
+  const nv::ReportSide one{true, first, {}}, two{true, second, {}}, none;
+  EXPECT_EQ(nv::ReportDifference(one, two), "3 of 70 bytes, from 0x11 on; 70 bytes to 68");
+  EXPECT_EQ(nv::ReportDifference(one, one), "");
+  const std::string line = "11 11 11 11 11 11 11 11 11 11 11 11 11 11 11 11";
+  EXPECT_EQ(nv::ReportCell(two, one), "<div><i>0000</i> " + line + "</div><div><i>0010</i> 11 <mark>22</mark>" +
+                                          line.substr(5) + "</div><div><i>0020</i> " + line +
+                                          "</div><details><summary>20 equal bytes</summary><div><i>0030</i> " + line +
+                                          "</div><div><i>0040</i> 11 11 11 11</div></details>");
+  const std::string marked = nv::ReportCell(one, two);
+  EXPECT_NE(marked.find("<i>0040</i> 11 11 11 11 <mark>11</mark> <mark>11</mark>"), std::string::npos) << marked;
+  EXPECT_EQ(nv::ReportCell(none, one), "");
+  const std::string alone = nv::ReportCell(one, none);
+  EXPECT_EQ(alone.find("mark"), std::string::npos);
+  EXPECT_NE(alone.find("<summary>54 more bytes</summary>"), std::string::npos) << alone;
+}
+
 TEST_F(NvFiles, ComparisonShowsWhatDiffers) {
   ASSERT_EQ(Load(Item(1, "SAME") + Item(2, "A&amp;B") + Item(3, "LEFT") + Item(4, "RIGHT")), 0u);
   for (const uint16_t id : {1, 2, 3}) Set(id, "1,2");
@@ -229,8 +249,9 @@ TEST_F(NvFiles, ComparisonShowsWhatDiffers) {
   for (const char* part : {
            "1 items differ, 1 are only in the first, 1 only in the second, 1 are the same.",
            "first &amp; only.pkv",
-           "<tr class=\"changed\"><td>2</td><td>A&amp;B</td><td>0</td><td>0</td><td class=\"value\">1, 2</td>"
-           "<td class=\"value\">1, 77</td><td>b: 2 to 77</td></tr>",
+           "<tr class=\"changed\"><td>2</td><td>A&amp;B</td><td>0</td><td>0</td>"
+           "<td class=\"value\"><div><i>a</i> 1</div><div><i>b</i> <mark>2</mark></div></td>"
+           "<td class=\"value\"><div><i>a</i> 1</div><div><i>b</i> <mark>77</mark></div></td><td>b: 2 to 77</td></tr>",
            "<tr class=\"first\"><td>3</td><td>LEFT</td>",
            "<tr class=\"second\"><td>4</td><td>RIGHT</td>",
        }) {
