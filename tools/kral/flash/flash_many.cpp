@@ -2,12 +2,10 @@
 #include "tools/kral/flash/flash_many.h"
 
 #include <algorithm>
-#include <chrono>
 #include <deque>
-#include <memory>
 #include <optional>
 #include <string>
-#include <thread>
+#include <utility>
 #include <vector>
 
 #include "tools/kral/call_failure.h"
@@ -20,7 +18,7 @@
 namespace kral::tool {
 namespace {
 
-constexpr std::chrono::milliseconds kLookAround{100};
+constexpr std::uint32_t kDrawEveryMs = 100;
 
 template <class Record>
 Record Empty() {
@@ -171,7 +169,7 @@ void FlashJob::Watch(Board& board) {
       if (!context_.out.json()) board.Print(Labelled(handsets_[printed].verdict));
     }
     board.Draw();
-    if (printed < handsets_.size()) KRAL_VENTRIMS_Wait(job_, static_cast<std::uint32_t>(kLookAround.count()));
+    if (printed < handsets_.size()) KRAL_VENTRIMS_Wait(job_, kDrawEveryMs);
   }
 }
 
