@@ -11,6 +11,7 @@ from typing import Any, Callable, Iterable, Iterator, Optional, Type
 from kral import _api, pkv, traffic
 from kral._connection import Connection
 from kral._library import load
+from kral.commands import Commands
 from kral.errors import KralError, LinkError, NoAnswer, NoPort, PortBusy, fail
 from kral.files import Files, LocalPath
 from kral.ftm import Ftm
@@ -43,6 +44,7 @@ class Phone:
     def __init__(self, connection: Connection, port: int) -> None:
         self.port = port
         self._connection = connection
+        self.cmd = Commands(connection)
         self.ftm = Ftm(connection)
         self.nv = Nv(connection)
         self.files = Files(connection)

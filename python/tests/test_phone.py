@@ -19,6 +19,18 @@ DEFINITIONS = """<NvDefinition version="1.0">
 </NvDefinition>"""
 
 
+# A radio that knows no such command acknowledges it as it came.
+COMMANDS = """<CommandDefinition><Enumeration name="Rate"><Value name="11M" value="3"/></Enumeration>
+  <Family name="WLAN" frame="ftm" mode="22"><Command name="TX_START" id="900" doc="Starts to transmit">
+    <Request><Field name="channel" type="u8" min="1" max="14" doc="Channel"/><Field name="rate" type="u8" enum="Rate"/>
+      <Field name="points" type="record" count="2"><Field name="power" type="s16"/></Field>
+      <Field name="label" type="text" size="6"/><Field name="data" type="bytes" size="*"/></Request>
+    <Reply><Field name="channel" type="u8"/><Field name="rate" type="u8" enum="Rate"/>
+      <Field name="points" type="record" count="2"><Field name="power" type="s16"/></Field>
+      <Field name="label" type="text" size="6"/><Field name="data" type="bytes" size="*"/></Reply>
+  </Command></Family></CommandDefinition>"""
+
+
 @pytest.fixture
 def defined(phone, tmp_path):
     """A phone whose NV items are defined."""
@@ -48,6 +60,24 @@ def test_factory_test_commands(phone):
         with pytest.raises(kral.BadArgument):
             phone.ftm.send("SET_CHAN", b"")
     assert phone.mode == kral.Mode.ONLINE
+
+
+def test_commands_by_definition(phone, tmp_path):
+    file = tmp_path / "commands.xml"
+    file.write_text(COMMANDS)
+    assert phone.cmd.load(file) == 1 and phone.cmd.names() == ["WLAN.TX_START"]
+    start = phone.cmd.WLAN.TX_START
+    assert "Starts to transmit" in start.__doc__ and "channel: u8 1 to 14  Channel" in start.__doc__
+    assert "WLAN" in dir(phone.cmd) and dir(phone.cmd.WLAN) == ["TX_START"]
+    with phone.ftm.active():
+        reply = start(channel=6, rate="11M", points=[{"power": -5}, {"power": 7}], label='a "b', data=b"\x01\xff")
+        assert (reply.channel, reply.rate, reply["label"], reply.data) == (6, "11M", 'a "b', b"\x01\xff")
+        assert [point.power for point in reply.points] == [-5, 7]
+        with pytest.raises(kral.BadArgument, match="channel=15 is out of range: 1 to 14"):
+            start(channel=15)
+    assert not hasattr(phone.cmd.WLAN, "TX_STOP")
+    phone.cmd.clear()
+    assert not hasattr(phone.cmd, "WLAN")
 
 
 def test_nv_items_as_bytes_and_by_name(defined):
