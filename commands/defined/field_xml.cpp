@@ -118,6 +118,7 @@ void FieldReader::Complete(std::vector<Field>& fields) {
 
 void FieldReader::ReadFields(const std::vector<XmlElement>& elements, const Scope& scope) {
   if (scope.depth > kDeepest) throw BadXml("groups are nested too deeply");
+  scope.fields.reserve(elements.size());
   for (const XmlElement& element : elements) {
     file_.at = &element;
     if (element.name != "Field") throw BadXml("<" + element.name + "> is not expected in the place of a <Field>");
