@@ -65,6 +65,7 @@ std::optional<Place> FindRecord(const CaptureBytes& bytes, uint64_t offset) {
 }  // namespace
 
 uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
+  const uint64_t whole = end;
   while (end - begin > kShortStretch) {
     const uint64_t middle = begin + (end - begin) / 2;
     const auto place = FindRecord(bytes, middle);
@@ -74,11 +75,12 @@ uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end
       end = middle;
     }
   }
-  // The last record in front of the end may reach beyond it, and the next one be the one that is sought.
+  // The one that is sought may be the next behind the end.
   for (std::array<uint8_t, capture_record::kSize> head{};;) {
     if (bytes(begin, head) != head.size()) return begin;
     const auto size = SizeOfRecord(head);
-    if (!size || *LoadLe<uint64_t>(head, capture_record::kMicroseconds) >= microseconds) return begin;
+    if (!size || begin + *size > whole) return begin;  // what is cut or damaged is the reader's to tell
+    if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) >= microseconds) return begin;
     begin += *size;
   }
 }
