@@ -1,5 +1,5 @@
 // A flood of log packets from a port into a capture file while a reader drains the queue, the same bytes read and
-// thrown away, and what a command's round trip costs under the flood.
+// thrown away, and what a command's round trip costs under the flood and under a trace.
 #include <benchmark/benchmark.h>
 
 #include <algorithm>
@@ -277,5 +277,68 @@ void CommandUnderFlood(benchmark::State& state) {
   std::filesystem::remove(file);
 }
 BENCHMARK(CommandUnderFlood)->ArgName("mode")->Arg(0)->Arg(1)->Iterations(1)->UseRealTime();
+
+// 100,000 packets a second into a trace: each is in the file, or counted as lost.
+void PortToTrace(benchmark::State& state) {
+  const auto packets = static_cast<uint64_t>(kFloodRate);
+  const auto file = std::filesystem::temp_directory_path() / "kral-bench-trace";
+  Station station(static_cast<uint8_t>(state.range(0)));
+  KRAL_TRACE_COUNTERS traced{};
+  for (auto _ : state) {
+    const uint64_t before = station.counters().collected;
+    KRAL_StartTrace(station.handle(), file.string().c_str());
+    station.line().Release(packets, kFloodRate);
+    const auto start = steady_clock::now();
+    while (station.counters().collected < before + packets && SecondsSince(start) < kPatienceSeconds) {
+      std::this_thread::sleep_for(microseconds(200));
+    }
+    do {
+      KRAL_StopTrace(station.handle());
+    } while (KRAL_GetTraceCounters(station.handle(), &traced) != 0 && traced.pending != 0);
+  }
+  const uint64_t total = packets * static_cast<uint64_t>(state.iterations());
+  state.counters["lost"] = static_cast<double>(traced.lost);
+  state.counters["in_file"] = static_cast<double>(traced.frames) / static_cast<double>(total);
+  if (traced.frames + traced.lost != total) state.SkipWithError("packets are lost uncounted");
+  state.SetItemsProcessed(static_cast<int64_t>(total));
+  std::filesystem::remove(file);
+}
+BENCHMARK(PortToTrace)->ArgName("mode")->Arg(0)->Arg(1)->Iterations(3)->UseRealTime();
+
+// The same commands with and without a trace and a capture, turn by turn, so that both have the same machine.
+void CommandUnderTrace(benchmark::State& state) {
+  constexpr size_t kTurns = 20;
+  constexpr size_t kCommands = 200;
+  const auto folder = std::filesystem::temp_directory_path();
+  const auto trace = folder / "kral-bench-trace";
+  const auto capture = folder / "kral-bench-capture";
+  Station station(static_cast<uint8_t>(state.range(0)));
+  for (auto _ : state) {
+    std::vector<double> plain;
+    std::vector<double> traced;
+    for (size_t turn = 0; turn < kTurns; ++turn) {
+      const auto without = RoundTrips(station.handle(), kCommands);
+      KRAL_StartTrace(station.handle(), trace.string().c_str());
+      KRAL_StartCapture(station.handle(), capture.string().c_str());
+      const auto with = RoundTrips(station.handle(), kCommands);
+      KRAL_StopCapture(station.handle());
+      KRAL_StopTrace(station.handle());
+      if (without.empty() || with.empty()) {
+        state.SkipWithError("no answer");
+        return;
+      }
+      plain.push_back(Percentile(without, 0.5));
+      traced.push_back(Percentile(with, 0.5));
+    }
+    std::ranges::sort(plain);
+    std::ranges::sort(traced);
+    state.counters["plain_p50_us"] = Percentile(plain, 0.5);
+    state.counters["traced_p50_us"] = Percentile(traced, 0.5);
+    state.counters["p50_ratio"] = Percentile(traced, 0.5) / Percentile(plain, 0.5);
+  }
+  std::filesystem::remove(trace);
+  std::filesystem::remove(capture);
+}
+BENCHMARK(CommandUnderTrace)->ArgName("mode")->Arg(0)->Arg(1)->Iterations(1)->UseRealTime();
 
 }  // namespace
