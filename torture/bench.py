@@ -41,9 +41,11 @@ class Lateness:
     _SLEEP = 0.004
     # What a sleep is always late by: the timer's own.
     _SLACK = 0.001
+    # More than the longest time that is asked for, and no more: it would look as if the library grew.
+    _KEPT = 10000
 
     def __init__(self) -> None:
-        self._late: Deque[Tuple[float, float]] = collections.deque(maxlen=200000)
+        self._late: Deque[Tuple[float, float]] = collections.deque(maxlen=self._KEPT)
         self._stop = False
         self._thread = threading.Thread(target=self._run, daemon=True)
         self._thread.start()

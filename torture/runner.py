@@ -73,8 +73,10 @@ def run_here(number: int, seed: int, short: bool, only: Optional[str], folder: p
                 print(f"FAILED: promise {number}, {runs[done]} (seed {seed}): {wrong}\n"
                       f"    again: {_repeat(number, seed, runs[done])}", file=sys.stderr, flush=True)
     bench.close()
-    if getattr(module, "SANITIZED", False):
-        bench.count("cases under ASan" if "libasan" in os.environ.get("LD_PRELOAD", "") else "cases without ASan", ran)
+    sanitizer = getattr(module, "SANITIZER", "")
+    if sanitizer:
+        with_it = f"lib{sanitizer}" in os.environ.get("LD_PRELOAD", "")
+        bench.count(f"cases {'with' if with_it else 'without'} {sanitizer}", ran)
     return {"cases": len(chosen), "ran": ran, "failed": len(failures), "figures": dict(bench.figures),
             "worst": dict(bench.worst)}
 
@@ -95,13 +97,14 @@ def _environment(module: Any, folder: pathlib.Path) -> Dict[str, str]:
     environment = dict(os.environ)
     if hasattr(module, "preload"):
         environment["LD_PRELOAD"] = module.preload(folder)
-    library = environment.get("KRAL_SANITIZED_LIBRARY")
-    if getattr(module, "SANITIZED", False) and library:
+    sanitizer = getattr(module, "SANITIZER", "")
+    library = environment.get(f"KRAL_{sanitizer.upper()}_LIBRARY") if sanitizer else None
+    if library:
         # The run time of C++ as well: the sanitizer looks for what throws exceptions when it is loaded, and only then.
         run_times = [subprocess.run(["gcc", f"-print-file-name={name}"], stdout=subprocess.PIPE, text=True,
-                                    check=True).stdout.strip() for name in ("libasan.so", "libstdc++.so.6")]
+                                    check=True).stdout.strip() for name in (f"lib{sanitizer}.so", "libstdc++.so.6")]
         # Leaks are not for a Python process to be searched for.
-        environment.update(KRAL_LIBRARY=library, LD_PRELOAD=" ".join(run_times),
+        environment.update(KRAL_LIBRARY=library, LD_PRELOAD=" ".join(run_times), TSAN_OPTIONS="halt_on_error=1",
                            ASAN_OPTIONS="detect_leaks=0:halt_on_error=1", UBSAN_OPTIONS="print_stacktrace=1")
     return environment
 
