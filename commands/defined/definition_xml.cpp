@@ -69,7 +69,7 @@ class Reader {
       const auto bits = ParseNumber(widest, number);
       if (!bits) throw BadXml("<Value>: value=\"" + number + "\" is no whole number");
       if (ParseNumber(widest, word)) throw BadXml("<Value>: name=\"" + word + "\" is a number");
-      if (enumeration->Find(word) != nullptr) throw BadXml(name + " has two values of the name " + word);
+      if (enumeration->Find(word) != nullptr) throw Twice(name, "values", word);
       enumeration->values.emplace_back(word, *bits);
     }
     if (!file_.enumerations.emplace(name, std::move(enumeration)).second) {
@@ -118,11 +118,16 @@ class Reader {
       if (child.name != "Command") throw BadXml("<" + child.name + "> is not expected in <Family>");
       const std::string name = RequiredText(child, "name");
       RequireName(child, name, true);
-      if (!names.insert(name).second) throw BadXml(family + " has two commands of the name " + name);
+      if (!names.insert(name).second) throw Twice(family, "commands", name);
       if (commands_.size() == kMostCommands) throw BadXml("too many commands");
-      commands_.push_back(ReadCommand(child, family + "." + name, framing));
+      commands_.push_back(ReadCommand(child, FullName(family, name), framing));
     }
   }
+
+  static BadXml Twice(const std::string& owner, const char* things, const std::string& name) {
+    return BadXml(owner + " has two " + things + " of the name " + name);
+  }
+  static std::string FullName(const std::string& family, const std::string& name) { return family + "." + name; }
 
   static Framing ReadFraming(const XmlElement& element, const std::string& family) {
     const std::string frame = RequiredText(element, "frame");
