@@ -54,6 +54,7 @@ std::uint16_t TheOne(std::string_view name, const std::vector<std::uint16_t>& fo
   if (found.size() == 1) return found.front();
   if (found.empty()) throw NoPort(name, hint);
   std::vector<std::string> names;
+  names.reserve(found.size());
   for (const auto port : found) names.push_back(DescribePort(port));
   throw ToolError(ExitCode::kUsage, Format("{} is not one port but {}", name, Joined(names, ", ")),
                   name.starts_with(kUsb) ? "add the interface: kral ports shows it, as in usb:1-4.2:1"
