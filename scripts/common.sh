@@ -41,8 +41,8 @@ machine_sources() {
 }
 
 # What every build needs, and what the 32-bit Windows platform needs beside it.
-build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev python3
-  python3-pycparser libxml2-utils srecord libgsf-bin python3-olefile)
+build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev
+  libtomlplusplus-dev python3 python3-pycparser libxml2-utils srecord libgsf-bin python3-olefile)
 # What the checks of the sources need.
 check_packages=(clang-format)
 # What reads them as clang does; only the whole scripts/test needs it.

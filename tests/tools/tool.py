@@ -17,6 +17,7 @@ def clean_environment(ports):
     """An environment in which exactly these COM numbers have devices of ours."""
     env = {name: value for name, value in os.environ.items() if not name.startswith("KRAL_")}
     env["KRAL_PORT_DIR"] = "/nonexistent"
+    env["XDG_CONFIG_HOME"] = "/nonexistent"  # no settings of whoever runs the tests
     env.update(EXTRA_ENVIRONMENT)
     env.update({f"KRAL_COM{number}": device for number, device in ports.items()})
     return env

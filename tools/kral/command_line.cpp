@@ -18,6 +18,7 @@
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
 #include "tools/kral/nearest_word.h"
+#include "tools/kral/settings.h"
 
 namespace kral::tool {
 
@@ -28,6 +29,15 @@ struct Chosen {
   std::set<const CLI::App*> takes_ports;
   std::map<const CLI::App*, Command::InDownload> in_download;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
+  std::map<const CLI::App*, std::function<bool()>> without_handset;
+  struct SettledOption {
+    const CLI::App* app;
+    CLI::Option* option;
+    const char* name;
+    const CLI::Option* unless;
+    bool in_use = false;  // for the latest command line
+  };
+  std::vector<SettledOption> settled;
   Names names;
   std::set<std::string> asked;
 };
@@ -222,6 +232,36 @@ ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const C
   return {ExitCode::kUsage, Format("{}: {}", title, problem), hint};
 }
 
+// --- What is settled elsewhere --------------------------------------------------------------------------------------
+
+bool NeedsNoHandset(const Chosen& chosen) {
+  const auto found = chosen.without_handset.find(chosen.verb);
+  return found != chosen.without_handset.end() && (!found->second || found->second());
+}
+
+// The options of the root are about handsets, those of a verb are its own.
+bool IsForVerb(const Chosen& chosen, const Chosen::SettledOption& settled) {
+  const bool is_common = settled.app->get_parent() == nullptr;
+  if (is_common ? NeedsNoHandset(chosen) : settled.app != chosen.verb) return false;
+  return settled.option->count() == 0 && (settled.unless == nullptr || settled.unless->count() == 0);
+}
+
+// As if its words were on the command line; a fault names where they are.
+void TakeSettled(Chosen& chosen) {
+  for (auto& settled : chosen.settled) {
+    // Verbs for which nothing can be settled do not mind a file that is wrong, help above all.
+    const auto value = IsForVerb(chosen, settled) ? SettledFor(settled.name) : std::nullopt;
+    settled.in_use = value.has_value();
+    if (!value) continue;
+    try {
+      settled.option->add_result(value->words);
+      settled.option->run_callback();
+    } catch (const ToolError& error) {
+      throw ToolError(value->fault, Format("{}: {}", value->source, error.what()), error.hint());
+    }
+  }
+}
+
 void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
   const auto place = Follow(root, words);
   if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
@@ -278,6 +318,11 @@ Option& Option::File() {
   return *this;
 }
 
+Option& Option::Settled(const char* name, const char* unless) {
+  chosen_->settled.push_back({app_, option_, name, unless == nullptr ? nullptr : app_->get_option(unless)});
+  return *this;
+}
+
 Option& Option::Check(std::function<std::string(const std::string&)> fault) {
   const auto name = option_->get_name();
   option_->check([name, fault = std::move(fault)](const std::string& text) {
@@ -316,7 +361,7 @@ Option Command::AddWords(const char* names, Sink sink, std::string_view help, st
       },
       std::string(help));
   option->type_name("TEXT");
-  return {option, std::move(default_text), is_file};
+  return {app_, chosen_, option, std::move(default_text), is_file};
 }
 
 Option Command::Add(const char* names, std::string& target, std::string_view help) const {
@@ -410,6 +455,19 @@ void Command::TakesPorts() const {
   chosen_->takes_ports.insert(app_);
 }
 
+void Command::NeedsNoHandset(std::function<bool()> is_so) const {
+  chosen_->without_handset[app_] = std::move(is_so);
+}
+
+std::vector<std::string> Command::Given(const char* option) const {
+  const auto* const found = app_->get_option(option);
+  const auto is_settled = [found](const Chosen::SettledOption& settled) {
+    return settled.option == found && settled.in_use;
+  };
+  if (std::ranges::any_of(chosen_->settled, is_settled)) return {};
+  return found->results();
+}
+
 void Command::Writes(std::function<std::vector<std::string>()> files) const {
   chosen_->writes[app_] = std::move(files);
 }
@@ -435,6 +493,7 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
   parser_->app.require_subcommand(1);
   const auto words = std::make_shared<std::vector<std::string>>();
   const auto help = root().Verb("help", "Print the help of a verb");
+  help.NeedsNoHandset();
   help.Add("verb", *words, "Noun and verb");
   help.Run([parser = parser_.get(), words] { PrintHelp(parser->app, *words); });
 }
@@ -465,6 +524,7 @@ std::function<void()> CommandLine::Parse(const std::vector<std::string>& argumen
     parser_->app.exit(error);  // --help, --version
     return {};
   }
+  if (parser_->chosen.act) TakeSettled(parser_->chosen);
   return parser_->chosen.act;
 }
 

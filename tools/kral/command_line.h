@@ -45,13 +45,22 @@ class Option {
   // Of a text, or a list of them: names of files, in which {port}, {serial}, {model} and {slot} stand for the
   // handset's.
   Option& File();
+  // What is settled of that name (settings.h), where the option is not given. `unless`: nor that other one.
+  Option& Settled(const char* name, const char* unless = nullptr);
   // Gives what is wrong with a text; nothing when it is right.
   Option& Check(std::function<std::string(const std::string&)> fault);
 
  private:
   friend class Command;
-  Option(CLI::Option* option, std::string default_text, std::shared_ptr<bool> is_file)
-      : option_(option), default_text_(std::move(default_text)), is_file_(std::move(is_file)) {}
+  Option(CLI::App* app, Chosen* chosen, CLI::Option* option, std::string default_text, std::shared_ptr<bool> is_file)
+      : app_(app),
+        chosen_(chosen),
+        option_(option),
+        default_text_(std::move(default_text)),
+        is_file_(std::move(is_file)) {}
+
+  CLI::App* app_;
+  Chosen* chosen_;
 
   CLI::Option* option_;
   std::shared_ptr<NumberRange> range_;
@@ -87,6 +96,10 @@ class Command {
   void ForMany(InDownload who) const;
   // The verb takes the ports, however many, as they are: it runs once.
   void TakesPorts() const;
+  // It needs none, always or when that is true: what is settled for handsets is not for it.
+  void NeedsNoHandset(std::function<bool()> is_so = {}) const;
+  // The words behind that option of its own, as they were on the command line.
+  std::vector<std::string> Given(const char* option) const;
   // Which local files it writes, asked behind the parsing: no two handsets may write the same.
   void Writes(std::function<std::vector<std::string>()> files) const;
   // Below the options in the help.

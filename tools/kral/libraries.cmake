@@ -21,8 +21,9 @@ function(kral_tool_library package target folder)
   target_include_directories(kral_tool_libraries SYSTEM INTERFACE ${headers})
 endfunction()
 
-# Only format.cpp, command_line.cpp and json.cpp call them: in every file of the tool they cost more time to build than
+# Only format.cpp, command_line.cpp, json.cpp and settings.cpp call them: in every file of the tool they cost more time to build than
 # the library takes.
 kral_tool_library(fmt fmt::fmt fmt)
 kral_tool_library(CLI11 CLI11::CLI11 CLI)
 kral_tool_library(nlohmann_json nlohmann_json::nlohmann_json nlohmann)
+kral_tool_library(tomlplusplus tomlplusplus::tomlplusplus toml++)

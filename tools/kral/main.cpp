@@ -31,23 +31,27 @@ std::string VersionText() {
 }
 
 void AddCommonOptions(const Command& root, Context& context) {
+  root.Flag("--all", context.all, "Every port on which a handset answers");
   root.Add("-p,--port", context.session.port,
            "Ports, such as 7, 20-27, /dev/ttyUSB0, esn:80C0FFEE, usb:1-4.2, slot:3, or several with commas; default: "
-           "the only one with a handset");
-  root.Flag("--all", context.all, "Every port on which a handset answers");
+           "the only one with a handset")
+      .Settled("port", "--all");
   root.Add("--wait", context.wait_s, "Wait so long until the ports are there and handsets answer; --wait alone: 30 s")
       .Between(0, kLongestWaitS, "s");
   root.Add("--jobs", context.jobs, "How many handsets are worked on at once; default: all").Between(1, kMostJobs);
   root.Flag(
       "--json", [&context] { context.out.UseJson(); }, "Print one JSON object");
-  root.Add("--log", context.session.log_file, "Write the text log of the connection to this file").File();
-  root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F");
+  root.Add("--log", context.session.log_file, "Write the text log of the connection to this file")
+      .File()
+      .Settled("log");
+  root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F").Settled("log_flags");
   root.Add("--trace", context.session.trace.file, "Write what passes over the port to this file, as pcapng").File();
   root.Add("--trace-on-failure", context.session.trace.file_on_failure,
            "Write the last of it to this file, if the command fails")
       .File();
   root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
-      .Between(1, kLongestTimeOutMs, "ms");
+      .Between(1, kLongestTimeOutMs, "ms")
+      .Settled("time_out");
 }
 
 struct VerbsOf {
@@ -56,10 +60,11 @@ struct VerbsOf {
 };
 
 constexpr VerbsOf kVerbs[] = {
-    {"ports", AddPortVerbs}, {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
-    {"fs", AddFsVerbs},      {"ftm", AddFtmVerbs},       {"log", AddLogVerbs},     {"event", AddEventVerbs},
-    {"nv", AddNvVerbs},      {"flash", AddFlashVerbs},   {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
-    {"band", AddBandVerbs},  {"raw", AddRawVerbs},       {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
+    {"ports", AddPortVerbs},    {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
+    {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},       {"log", AddLogVerbs},     {"event", AddEventVerbs},
+    {"nv", AddNvVerbs},         {"flash", AddFlashVerbs},   {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
+    {"band", AddBandVerbs},     {"raw", AddRawVerbs},       {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
+    {"config", AddConfigVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.
@@ -126,6 +131,7 @@ void FindPorts(Context& context, const std::string& verb) {
 }
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
+  if (command->line->verb() == "config") return command->act();  // shows the names as they are
   FindPorts(command->context, command->line->verb());
   const auto parse_for = [&](std::uint16_t port, const Names& names) {
     auto own = ParseAgain(arguments, *command->line, names);

@@ -23,6 +23,7 @@ struct Context {
 void AddBootVerbs(const Command& root, Context& context);  // behind AddFlashVerbs
 void AddBandVerbs(const Command& root, Context& context);
 void AddCmdVerbs(const Command& root, Context& context);
+void AddConfigVerbs(const Command& root, Context& context);
 void AddDoctorVerbs(const Command& root, Context& context);
 void AddFsVerbs(const Command& root, Context& context);
 void AddEventVerbs(const Command& root, Context& context);

@@ -83,6 +83,7 @@ void AddConversion(const Command& parent, Context& context, const char* verb, co
   const auto band = std::make_shared<std::uint16_t>();
   const auto channel = std::make_shared<std::int32_t>();
   const auto conversion = parent.Verb(verb, Format("Print the {} carrier of a channel", direction.name));
+  conversion.NeedsNoHandset();
   conversion.Add("band", *band, "Band id, as in the list").Required();
   conversion.Add("channel", *channel, "Channel number").Required();
   conversion.Run([&context, &direction, band, channel] { Convert(context, direction, *band, *channel); });
@@ -92,7 +93,9 @@ void AddConversion(const Command& parent, Context& context, const char* verb, co
 
 void AddBandVerbs(const Command& root, Context& context) {
   const auto band = root.Noun("band", "Convert bands and channels to carrier frequencies");
-  band.Verb("list", "Print every band with its channel ranges and edge frequencies").Run([&context] { List(context); });
+  const auto list = band.Verb("list", "Print every band with its channel ranges and edge frequencies");
+  list.NeedsNoHandset();
+  list.Run([&context] { List(context); });
   AddConversion(band, context, "ul", kDirections[1]);
   AddConversion(band, context, "dl", kDirections[2]);
 }

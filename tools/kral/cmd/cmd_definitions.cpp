@@ -3,7 +3,6 @@
 
 #include <array>
 
-#include "platform/environment.h"
 #include "tools/kral/format.h"
 #include "tools/kral/nearest_word.h"
 
@@ -16,15 +15,12 @@ SessionOptions WithoutHandset(const SessionOptions& options) {
 }
 
 void LoadCommands(Session& session, const std::vector<std::string>& files) {
-  std::vector<std::string> all = files;
-  if (all.empty()) {
-    if (const auto file = EnvironmentValue("KRAL_COMMANDS"); file && !file->empty()) all.push_back(*file);
-  }
-  if (all.empty()) {
+  if (files.empty()) {
     throw ToolError(ExitCode::kUsage, "no commands are defined",
-                    "name a definition file with --defs, or in the environment variable KRAL_COMMANDS");
+                    "name a definition file with --defs, in the environment variable KRAL_COMMANDS, or in the "
+                    "settings: kral config");
   }
-  for (const auto& file : all) {
+  for (const auto& file : files) {
     session.Run(Format("loading {}", file),
                 [&] { return KRAL_CMD_LoadDefinitions(session.handle(), file.c_str(), nullptr); });
   }

@@ -12,7 +12,7 @@ namespace kral::tool {
 // Definitions need no handset: the null port answers for one.
 SessionOptions WithoutHandset(const SessionOptions& options);
 
-// Into the connection, in their order; without any the file that the environment variable KRAL_COMMANDS names.
+// Into the connection, in their order; ToolError where there are none.
 void LoadCommands(Session& session, const std::vector<std::string>& files);
 
 struct DefinedCommand {

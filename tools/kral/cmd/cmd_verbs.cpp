@@ -144,6 +144,7 @@ void WriteHeader(const Context& context, const HeaderOptions& options) {
 void AddHeaderVerb(const Command& cmd, Context& context) {
   const auto options = std::make_shared<HeaderOptions>();
   const auto header = cmd.Verb("header", "Write a C header with a typed function for each command");
+  header.NeedsNoHandset();
   header.Add("files", options->files, "Definition files").Required();
   header.Add("--output", options->output, "The header; default: the standard output").File();
   header.Run([&context, options] { WriteHeader(context, *options); });
@@ -156,13 +157,16 @@ void AddCmdVerbs(const Command& root, Context& context) {
   const auto cmd = root.Noun("cmd", "Call commands that a definition file describes (docs/commands.md)");
   const auto add_files = [&](const Command& verb) {
     verb.Add("--defs", options->files, "Definition file; may be given several times. Default: KRAL_COMMANDS names it")
-        .OneEach();
+        .OneEach()
+        .Settled("commands");
   };
   const auto list = cmd.Verb("list", "List the commands");
+  list.NeedsNoHandset();
   add_files(list);
   list.Run([&context, options] { List(context, *options); });
 
   const auto show = cmd.Verb("show", "Show the fields of a command and of its reply");
+  show.NeedsNoHandset();
   show.Add("command", options->command, "FAMILY.NAME").Required();
   add_files(show);
   show.Run([&context, options] { Show(context, *options); });

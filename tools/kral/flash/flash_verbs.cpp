@@ -268,12 +268,14 @@ void AddFlashVerbs(const Command& root, Context& context) {
   const auto files = std::make_shared<std::vector<std::string>>();
   const auto format = std::make_shared<std::string>("auto");
   const auto verify = flash.Verb("verify-image", "Check image files and tell what is in them; needs no handset");
+  verify.NeedsNoHandset();
   verify.Add("images", *files, "Image files").Required();
   AddFormat(verify, *format);
   verify.Run([&context, files, format] { VerifyImages(context, *files, *format); });
 
   const auto arguments = std::make_shared<HexArguments>();
   const auto hex = flash.Verb("hex", "Convert Intel HEX to binary, or a binary to Intel HEX; needs no handset");
+  hex.NeedsNoHandset();
   hex.Add("input", arguments->input, "File to read: the other format is written").Required();
   hex.Add("output", arguments->output, "File to write").Required();
   hex.Add("--base", arguments->base, "First address of a binary; a multiple of 0x10000");

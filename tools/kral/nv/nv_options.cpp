@@ -10,12 +10,14 @@
 namespace kral::tool {
 
 void AddDefinitionOptions(const Command& verb, NvOptions& options) {
-  verb.Add("--defs", options.definitions, "Definition file; may be given several times").OneEach();
+  verb.Add("--defs", options.definitions, "Definition file; may be given several times")
+      .OneEach()
+      .Settled("definitions");
   AddDictionaryOption(verb, options);
 }
 
 void AddDictionaryOption(const Command& verb, NvOptions& options) {
-  verb.Add("--types", options.dictionaries, "Data-type dictionary that the definitions use").OneEach();
+  verb.Add("--types", options.dictionaries, "Data-type dictionary that the definitions use").OneEach().Settled("types");
 }
 
 std::pair<std::uint16_t, std::uint16_t> ParseIdRange(const std::string& text) {

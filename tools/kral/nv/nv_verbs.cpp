@@ -243,10 +243,12 @@ void AddNvVerbs(const Command& root, Context& context) {
   dump.Add("--source", arguments->source_file, "Write the values to this source file (XML), too").File();
   dump.Add("--pkv", arguments->pkv_file, "... to this PKV file").File();
   const auto diff = add("diff", "Compare two PKV files in a page of HTML; needs no handset", Compare);
+  diff.NeedsNoHandset();
   diff.Add("first", arguments->first, "PKV file").Required();
   diff.Add("second", arguments->second, "PKV file").Required();
   diff.Add("page", arguments->page, "HTML file to be written").Required();
   const auto definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
+  definitions.NeedsNoHandset();
   definitions.Add("file", arguments->items, "Definition file").Required();
   AddDictionaryOption(definitions, arguments->options);
   dump.Writes([arguments] {

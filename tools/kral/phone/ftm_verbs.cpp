@@ -177,7 +177,9 @@ void AddFtmVerbs(const Command& root, Context& context) {
 
   for (const auto& verb : {mode, channel, tx, command}) verb.ForMany();
 
-  ftm.Verb("list", "Print the table of RF commands").Run([&context] { PrintList(context); });
+  const auto list = ftm.Verb("list", "Print the table of RF commands");
+  list.NeedsNoHandset();
+  list.Run([&context] { PrintList(context); });
 }
 
 }  // namespace kral::tool

@@ -76,9 +76,11 @@ void AddPortVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<PortOptions>();
   const auto ports = root.Verb("ports", "List the serial ports without opening them");
   ports.Flag("--probe", options->probe, "Open each port that is free and find out who answers");
+  ports.NeedsNoHandset();
   ports.Run([&context, options] { ShowPorts(context, options->probe); });
 
   const auto assign = ports.Verb("assign", "Tell which port a slot of the fixture is, for -p slot:N; alone: list them");
+  assign.NeedsNoHandset();
   assign.Add("slot", options->slot, "Number of the slot").Between(1, kLastSlot);
   assign.Add("name", options->name, "Its port: usb:1-4.2, esn:80C0FFEE, /dev/ttyUSB0, 7");
   assign.Flag("--remove", options->remove, "Forget the slot");

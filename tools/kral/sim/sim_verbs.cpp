@@ -104,6 +104,7 @@ void AddOptions(const Command& sim, SimOptions& options) {
 void AddSimVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<SimOptions>();
   const auto sim = root.Verb("sim", "Simulate a handset, or many; the first lines of the output are their devices");
+  sim.NeedsNoHandset();
   AddOptions(sim, *options);
   sim.Explain([] { return DescribeFaults() + SimScript::Describe(); });
   sim.Run([&context, options] { Simulate(context, *options); });

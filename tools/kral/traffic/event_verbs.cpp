@@ -124,6 +124,7 @@ void AddEventVerbs(const Command& root, Context& context) {
   }
 
   const auto tail = event.Verb("tail", "Print events as they come, until Ctrl-C; or those of a capture file");
+  tail.NeedsNoHandset([options] { return !options->file.empty(); });
   tail.Add("--on", options->ids, "Switch these events on first");
   tail.Flag("--all", options->all, "Switch all events on first");
   tail.Add("--names", options->names, "Table of event texts");

@@ -352,6 +352,7 @@ void AddLogVerbs(const Command& root, Context& context) {
   run(capture, Capture);
 
   const auto play = log.Verb("play", "Print the packets of a capture file; needs no handset");
+  play.NeedsNoHandset();
   play.Add("file", options->file, "The capture file").Required();
   play.Flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
   play.Add("--from", options->from,
@@ -362,12 +363,14 @@ void AddLogVerbs(const Command& root, Context& context) {
   for (const bool is_export : {true, false}) {
     const auto verb = is_export ? log.Verb("export", "Make a pcapng file of a capture file; needs no handset")
                                 : log.Verb("import", "Make a capture file of a pcapng file; needs no handset");
+    verb.NeedsNoHandset();
     verb.Add("file", options->file, is_export ? "The capture file" : "The pcapng file").Required();
     verb.Add("target", options->target, "The file to write").Required();
     run(verb, [is_export](const Context& c, const LogOptions& o) { Convert(c, o, is_export); });
   }
 
   const auto stats = log.Verb("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
+  stats.NeedsNoHandset([options] { return !options->file.empty(); });
   stats.Add("file", options->file, "A capture file; default: the handset");
   stats.Add("--names", options->names, "Table of log names");
   options->limit.AddTo(stats, "packets");
