@@ -34,6 +34,24 @@ class BootLoader(ToolTest):
             self.assertEqual(answer["bytes"], len(self.SOFTWARE))
             self.assertEqual(self.revision(), "VHS-2.0.1")
 
+    def test_a_plan_looks_at_all_files_and_touches_no_handset(self):
+        programmer, image = self.add("programmer", self.PROGRAMMER), self.add("software", self.SOFTWARE)
+        flash = ("flash", "all", "--dry-run", "--reset", programmer)
+        with self.handset("--boot-loader"):
+            self.ports[8] = "/nonexistent/tty"
+            for ports, files, code in (("7-8", ("2:" + image,), 0), ("esn:1", (image,), 0), ("7,7", (image,), 2),
+                                       ("7", (image, "/nonexistent/image"), 10), ("slot:999", (image,), 2)):
+                with self.subTest(ports=ports, files=files):
+                    plan = self.expect_json(code, "-p", ports, "--wait=0", *flash, *files)
+                    if ports == "7-8":
+                        self.assertEqual((plan["dry_run"], plan["bytes"], plan["enter"], plan["reset"], len(plan["ports"]),
+                                          plan["images"][0]["type"]), (True, len(self.SOFTWARE), False, True, 2, 2))
+            self.expect_json(2, "--all", *flash, image)
+            self.assertIn("nothing was written", self.text(*flash, image))
+            for bad in ("/nonexistent/programmer", self.add("empty", b"")):
+                self.ask(10, "flash", "all", "--dry-run", bad, image)
+            self.ask(0, "flash", "all", programmer, image)  # the hello is still there
+
     def test_failures_say_what_is_wrong(self):
         programmer = self.add("programmer", self.PROGRAMMER)
         nothing = self.add("nothing", b"no programmer")

@@ -30,6 +30,7 @@ struct Chosen {
   std::map<const CLI::App*, Command::InDownload> in_download;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
   std::map<const CLI::App*, std::function<bool()>> without_handset;
+  std::map<const CLI::App*, std::function<bool()>> asks_nobody;
   struct SettledOption {
     const CLI::App* app;
     CLI::Option* option;
@@ -234,15 +235,17 @@ ToolError Explain(CLI::App& root, const std::vector<std::string>& words, const C
 
 // --- What is settled elsewhere --------------------------------------------------------------------------------------
 
-bool NeedsNoHandset(const Chosen& chosen) {
-  const auto found = chosen.without_handset.find(chosen.verb);
-  return found != chosen.without_handset.end() && (!found->second || found->second());
+using SometimesSo = std::map<const CLI::App*, std::function<bool()>>;
+
+bool IsSo(const SometimesSo& verbs, const CLI::App* verb) {
+  const auto found = verbs.find(verb);
+  return found != verbs.end() && (!found->second || found->second());
 }
 
 // The options of the root are about handsets, those of a verb are its own.
 bool IsForVerb(const Chosen& chosen, const Chosen::SettledOption& settled) {
   const bool is_common = settled.app->get_parent() == nullptr;
-  if (is_common ? NeedsNoHandset(chosen) : settled.app != chosen.verb) return false;
+  if (is_common ? IsSo(chosen.without_handset, chosen.verb) : settled.app != chosen.verb) return false;
   return settled.option->count() == 0 && (settled.unless == nullptr || settled.unless->count() == 0);
 }
 
@@ -459,6 +462,10 @@ void Command::NeedsNoHandset(std::function<bool()> is_so) const {
   chosen_->without_handset[app_] = std::move(is_so);
 }
 
+void Command::AsksNobody(std::function<bool()> is_so) const {
+  chosen_->asks_nobody[app_] = std::move(is_so);
+}
+
 std::vector<std::string> Command::Given(const char* option) const {
   const auto* const found = app_->get_option(option);
   const auto is_settled = [found](const Chosen::SettledOption& settled) {
@@ -543,6 +550,10 @@ bool CommandLine::for_many() const {
 
 bool CommandLine::takes_ports() const {
   return parser_->chosen.takes_ports.count(parser_->chosen.verb) != 0;
+}
+
+bool CommandLine::asks_nobody() const {
+  return IsSo(parser_->chosen.asks_nobody, parser_->chosen.verb);
 }
 
 bool CommandLine::asks_identity() const {

@@ -98,6 +98,8 @@ class Command {
   void TakesPorts() const;
   // It needs none, always or when that is true: what is settled for handsets is not for it.
   void NeedsNoHandset(std::function<bool()> is_so = {}) const;
+  // It looks for no port, always or when that is true: the ports stay as they were named, and it runs once.
+  void AsksNobody(std::function<bool()> is_so = {}) const;
   // The words behind that option of its own, as they were on the command line.
   std::vector<std::string> Given(const char* option) const;
   // Which local files it writes, asked behind the parsing: no two handsets may write the same.
@@ -141,6 +143,7 @@ class CommandLine {
   std::string verb() const;  // "nv backup"
   bool for_many() const;
   bool takes_ports() const;
+  bool asks_nobody() const;
   bool asks_identity() const;
   bool may_ask_all() const;
   std::vector<std::string> Written() const;    // local files, as far as it has said so

@@ -70,6 +70,8 @@ std::string ExampleFile() {
 void AddConfigVerbs(const Command& root, Context& context) {
   const auto config =
       root.Verb("config", "Print what is settled for all verbs, and where: file, environment or command line");
+  config.AsksNobody();
+  config.TakesPorts();
   config.Explain(ExampleFile);
   config.Run([&context, root] { ShowSettings(root, context); });
 }

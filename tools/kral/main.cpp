@@ -131,7 +131,10 @@ void FindPorts(Context& context, const std::string& verb) {
 }
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
-  if (command->line->verb() == "config") return command->act();  // shows the names as they are
+  if (command->line->asks_nobody()) {
+    IsForMany(*command);  // which may refuse
+    return command->act();
+  }
   FindPorts(command->context, command->line->verb());
   const auto parse_for = [&](std::uint16_t port, const Names& names) {
     auto own = ParseAgain(arguments, *command->line, names);

@@ -7,6 +7,8 @@
 #include "tools/kral/flash/flash_images.h"
 #include "tools/kral/flash/flash_many.h"
 #include "tools/kral/format.h"
+#include "tools/kral/many_handsets.h"
+#include "tools/kral/port_names.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -44,11 +46,56 @@ struct FlashAllArguments {
   std::string programmer;
   std::vector<std::string> images;
   bool reset = false;
+  bool dry_run = false;
 };
+
+// The ports as they can be told without asking any handset.
+std::vector<std::string> PortsToBe(const Context& context, const FlashAllArguments& arguments) {
+  auto session = context.session;
+  if (context.all) {
+    if (!arguments.options.enter) throw MustNameBootLoaders();
+    return {"every port on which a handset answers"};
+  }
+  if (session.port.empty()) return {"the only port"};
+  if (session.port.find("esn:") != std::string::npos) return {session.port};
+  ResolvePortNames(session);
+  std::vector<std::string> names;
+  for (const auto port : WithoutTwins(ParsePorts(session.port), true)) names.push_back(DescribePort(port));
+  return names;
+}
+
+void PrintFlashPlan(const Context& context, const FlashAllArguments& arguments, const std::vector<FlashImage>& images) {
+  const auto ports = PortsToBe(context, arguments);
+  Json port_names = Json::array();
+  for (const auto& name : ports) port_names.push_back(name);
+  Json rows = Json::array();
+  auto text = Format("on {}:\n", Joined(ports, ", "));
+  if (arguments.options.enter) text += "into the boot loader\n";
+  text += Format("{}: by the boot transfer, and started\n", arguments.programmer);
+  for (const auto& image : images) {
+    rows.push_back(ImageObject(image));
+    text += DescribeImage(image);
+  }
+  if (arguments.reset) text += "restart\n";
+  const auto bytes = TotalBytes(images);
+  text += Format("in all {} in {}; nothing was written\n", Counted(bytes, "byte"), Counted(images.size(), "image"));
+  context.out.Result({{"dry_run", true},
+                      {"ports", port_names},
+                      {"enter", arguments.options.enter},
+                      {"programmer", arguments.programmer},
+                      {"images", rows},
+                      {"bytes", bytes},
+                      {"reset", arguments.reset}},
+                     text);
+}
 
 void FlashAll(Context& context, const FlashAllArguments& arguments) {
   std::vector<FlashImage> images;
   for (const auto& image : arguments.images) images.push_back(ReadFlashImage(image, KRAL_IMAGE_FORMAT_BY_CONTENT));
+  if (arguments.dry_run) {
+    CheckFile(arguments.programmer);
+    return PrintFlashPlan(context, arguments, images);
+  }
   if (HasSeveralPorts(context)) {
     FlashPlan plan;
     plan.programmer = arguments.programmer;
@@ -106,6 +153,8 @@ void AddBootVerbs(const Command& root, Context& context) {
   AddLoadOptions(all, arguments->options, arguments->programmer);
   all.Add("images", arguments->images, "Image files, each as FILE or TYPE:FILE").Required();
   all.Flag("--reset", arguments->reset, "Restart the handset at the end, if its programmer knows how");
+  all.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan; no handset is touched");
+  all.AsksNobody([arguments] { return arguments->dry_run; });
   all.TakesPorts();
   all.Run([&context, arguments] { FlashAll(context, *arguments); });
 }

@@ -228,6 +228,7 @@ void AddLoadVerb(const Command& flash, Context& context) {
       .Between(2, 65535, "bytes")
       .ShowDefault();
   load.Flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
+  load.AsksNobody([arguments] { return arguments->dry_run; });
   load.ForMany();
   load.Run([&context, arguments] { LoadProgrammer(context, *arguments); });
 }
@@ -246,6 +247,7 @@ void AddWriteVerb(const Command& flash, Context& context) {
   write.Add("--partition", arguments->partition_table, "Send this partition table first");
   write.Flag("--override", arguments->override_table, "Let the partition table replace a different one");
   write.Flag("--reset", arguments->reset, "Restart the handset afterwards");
+  write.AsksNobody([arguments] { return arguments->dry_run; });
   write.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
   write.TakesPorts();
   write.Run([&context, arguments] { WriteImages(context, *arguments); });
