@@ -3,6 +3,7 @@ import array
 import fcntl
 import json
 import os
+import re
 import signal
 import struct
 import termios
@@ -13,6 +14,7 @@ from tool import PATIENCE, ToolTest, run, start, wait_until
 
 
 class Traffic(ToolTest):
+    PAGE_ROW = re.compile(r"<tr><td>([^<]*)</td><td>[^<]*</td><td class=\"count\">(\d+)</td>")
     RATES = ("--logs", "2000", "--events", "200", "--messages", "200", "--burst", "5")
 
     def stream(self, *words):
@@ -44,7 +46,17 @@ class Traffic(ToolTest):
             self.assertEqual(sum(row["packets"] for row in rows), done["packets"])
             self.assertIn("Paging", [row.get("name") for row in rows])
             self.assertIn("Paging", self.expect(0, "log", "stats", file, "--names", names).out)
-            live = self.ask(0, "log", "stats", "--count", "100")
+            page = self.path("page.html")
+            self.expect_json(0, "log", "stats", file, "--names", self.add("evil", b"0x1001 <b>Paging\n"), "--html", page)
+            drawn = self.content(page).decode()
+            self.assertEqual([(what, int(count)) for what, count in self.PAGE_ROW.findall(drawn)],
+                             [(row["what"], row["packets"]) for row in rows])
+            self.assertIn("&lt;b>Paging", drawn)
+            self.assertNotRegex(drawn, r"<b>|https?:|NaN|class=\"dropped\"")
+            self.assertGreaterEqual(len(re.findall(r"M\d+ 28v-28(?!\d)", drawn)), len(rows))  # the fullest column of each row
+            self.expect_json(10, "log", "stats", file, "--html", "/nonexistent/page")
+            live = self.ask(0, "log", "stats", "--count", "100", "--html", page)
+            self.assertIn("(" + self.ports[7] + ")", self.content(page).decode())
             self.assertGreaterEqual(live["counters"]["collected"], 100)
             self.assertGreaterEqual(live["counters"]["most_waiting"], 1)
             self.assertGreater(live["rows"][0]["per_second"], 0)

@@ -71,6 +71,7 @@ constexpr const char* kExamples[] = {
     "kral log export traffic.cap traffic.pcapng",
     "kral log import traffic.pcapng traffic.cap",
     "kral -p 7 log stats --seconds 10",
+    "kral log stats capture.bin --html traffic.html",
     "kral log stats traffic.cap",
     "kral -p 7 event on 290-299",
     "kral -p 7 event off --all",

@@ -6,12 +6,14 @@
 #include <string>
 #include <vector>
 
+#include "platform/file_util.h"
 #include "tools/kral/call_failure.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/traffic/playback.h"
 #include "tools/kral/traffic/time_of_packet.h"
+#include "tools/kral/traffic/timeline.h"
 #include "tools/kral/traffic/traffic.h"
 #include "tools/kral/verbs.h"
 
@@ -28,6 +30,7 @@ struct LogOptions {
   std::string names;
   std::string file;
   std::string target;
+  std::string page;
   std::string from;
   std::string to;
   bool as_recorded = false;
@@ -249,14 +252,27 @@ Json JsonOf(const KRAL_TRAFFIC_COUNTERS& c) {
           {"most_waiting", c.most_waiting}};
 }
 
+void WritePage(const Timeline& timeline, const std::string& title, const std::string& file) {
+  if (file.empty()) return;
+  const auto page = timeline.Page(title);
+  if (const auto error = ReplaceWholeFile(file, {reinterpret_cast<const std::uint8_t*>(page.data()), page.size()})) {
+    throw ToolError(ExitCode::kBadFile, Format("the page {} cannot be written: {}", file, error.message()),
+                    "check folder and permissions of the file named by --html");
+  }
+}
+
 void FileStatistics(const Context& context, const LogOptions& options) {
   options.limit.Reject("a capture file");
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
-  const bool whole =
-      PlayFile(handle.get(), options.file, Pace::kAtOnce, [&](const PlayedPacket& packet) { table.Add(packet.bytes); });
+  Timeline timeline(handle.get());
+  const bool whole = PlayFile(handle.get(), options.file, Pace::kAtOnce, [&](const PlayedPacket& packet) {
+    table.Add(packet.bytes);
+    if (!options.page.empty()) timeline.Add(packet.microseconds, packet.bytes);
+  });
   if (!whole) NoteCut(context, options.file);
+  WritePage(timeline, options.file, options.page);
   context.out.Result({{"file", options.file}, {"cut", !whole}, {"rows", table.Rows(handle.get(), 0)}},
                      table.Text(handle.get(), 0));
 }
@@ -266,21 +282,29 @@ void Statistics(const Context& context, LogOptions& options) {
   Session session(context.session);
   LoadTable(session.handle(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
+  Timeline timeline(session.handle());
   KRAL_DIAG_SetPhoneLoggingState(session.handle(), 1);
   options.limit.Begin();
   std::uint64_t packets = 0;
+  const auto tell_dropped = [&] { timeline.SetDropped(MicrosecondsNow(), CountersOf(session.handle()).dropped_logs); };
   {
     Progress progress(context.out, "stats", options.limit.count(), Progress::Unit::kItems);
     CollectPackets(
         session, options.limit, packets,
         [&](std::span<const std::uint8_t> packet) {
           table.Add(packet);
+          if (!options.page.empty()) timeline.Add(MicrosecondsNow(), packet);
           ++packets;
         },
-        [&] { progress.Update(packets); });
+        [&] {
+          progress.Update(packets);
+          tell_dropped();
+        });
   }
   const double seconds = options.limit.seconds();
   const auto counters = CountersOf(session.handle());
+  tell_dropped();
+  WritePage(timeline, DescribePort(session.port()), options.page);
   context.out.Result({{"port", session.port()},
                       {"seconds", seconds},
                       {"counters", JsonOf(counters)},
@@ -372,6 +396,7 @@ void AddLogVerbs(const Command& root, Context& context) {
   const auto stats = log.Verb("stats", "Count what comes, by code, until Ctrl-C; or what a capture file holds");
   stats.NeedsNoHandset([options] { return !options->file.empty(); });
   stats.Add("file", options->file, "A capture file; default: the handset");
+  stats.Add("--html", options->page, "Write a page with a timeline of packets by code to this file").File();
   stats.Add("--names", options->names, "Table of log names");
   options->limit.AddTo(stats, "packets");
   run(stats, Statistics);

@@ -104,6 +104,11 @@ std::string NameOf(KRAL_HANDLE handle, std::optional<std::uint16_t> log_code) {
 
 }  // namespace
 
+std::string NameOfPacket(KRAL_HANDLE handle, std::span<const std::uint8_t> packet) {
+  if (packet.empty() || packet.front() != kLog) return {};
+  return NameOf(handle, WordAt(packet, kLogCodeOffset));
+}
+
 Json TrafficTable::Rows(KRAL_HANDLE handle, double seconds) const {
   Json rows = Json::array();
   for (const auto& [what, row] : Sorted()) {

@@ -27,6 +27,9 @@ std::vector<std::uint16_t> ParseIds(const std::vector<std::string>& words, std::
 // "log 0x1001", "message 5", "events", "packet 31".
 std::string DescribePacket(std::span<const std::uint8_t> packet);
 
+// Of a log packet, from the table of log names of the handle; empty for none.
+std::string NameOfPacket(KRAL_HANDLE handle, std::span<const std::uint8_t> packet);
+
 // Packets and bytes by DescribePacket.
 class TrafficTable {
  public:

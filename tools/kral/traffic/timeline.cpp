@@ -1,0 +1,163 @@
+// Sorts packets into columns of time and draws these.
+#include "tools/kral/traffic/timeline.h"
+
+#include <algorithm>
+#include <chrono>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "tools/kral/format.h"
+#include "tools/kral/traffic/playback.h"
+#include "tools/kral/traffic/traffic.h"
+
+namespace kral::tool {
+namespace {
+
+constexpr unsigned kColumnWidth = 4;  // in units of the drawing
+constexpr unsigned kRowHeight = 28;
+
+constexpr std::string_view kTimelineHead = R"(<!DOCTYPE html>
+<html lang="en"><head><meta charset="utf-8"><meta name="viewport" content="width=device-width">
+<style>
+:root { color-scheme: light dark; --text: #1f2328; --dim: #667; --line: #d0d7de; --head: #f3f4f6; --page: #fff;
+  --bar: #2f6fb2; --drop: #d1242f; }
+@media (prefers-color-scheme: dark) {
+  :root { --text: #e6edf3; --dim: #9aa4b2; --line: #30363d; --head: #161b22; --page: #0d1117; --bar: #6cb0f5;
+    --drop: #ff6b66; }
+}
+body { font: 14px/1.45 system-ui, sans-serif; margin: 2em; color: var(--text); background: var(--page); }
+h1 { font-size: 1.3em; overflow-wrap: anywhere; } p { color: var(--dim); }
+table { border-collapse: collapse; width: 100%; }
+th { position: sticky; top: 0; background: var(--head); text-align: left; white-space: nowrap; }
+th, td { border-bottom: 1px solid var(--line); padding: 2px 10px 2px 0; } td { white-space: nowrap; }
+.count { text-align: right; font-variant-numeric: tabular-nums; } .time { width: 70%; }
+.span { display: flex; justify-content: space-between; font-weight: normal; color: var(--dim); }
+svg { display: block; width: 100%; height: 28px; }
+path { stroke: var(--bar); stroke-width: 4; fill: none; } .drops { stroke: var(--drop); }
+#drops .drops { opacity: .5; } tr.dropped td { color: var(--drop); }
+</style>
+)";
+
+// Text of files and handsets, which may hold anything.
+std::string PageText(std::string_view text) {
+  std::string safe;
+  for (const char character : text) {
+    switch (character) {
+      case '&':
+        safe += "&amp;";
+        break;
+      case '<':
+        safe += "&lt;";
+        break;
+      case '"':
+        safe += "&quot;";
+        break;
+      default:
+        safe += character;
+    }
+  }
+  return safe;
+}
+
+// A line upwards for each column that holds something; the fullest is as high as the row. With `whole` each is.
+template <class Columns>
+std::string Lines(const Columns& columns, bool whole) {
+  const std::uint64_t most = std::max<std::uint64_t>(1, *std::ranges::max_element(columns));
+  std::string lines;
+  for (std::size_t i = 0; i < columns.size(); ++i) {
+    if (columns[i] == 0) continue;
+    const auto height = whole ? kRowHeight : std::max<std::uint64_t>(1, columns[i] * kRowHeight / most);
+    lines += Format("M{} {}v-{}", i * kColumnWidth + kColumnWidth / 2, kRowHeight, height);
+  }
+  return lines;
+}
+
+std::string Drawing(std::size_t columns, std::string_view content) {
+  return Format(R"(<svg viewBox="0 0 {} {}" preserveAspectRatio="none">{}</svg>)", columns * kColumnWidth, kRowHeight,
+                content);
+}
+
+}  // namespace
+
+std::uint64_t MicrosecondsNow() {
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  return static_cast<std::uint64_t>(std::chrono::duration_cast<std::chrono::microseconds>(now).count());
+}
+
+std::size_t Timeline::ColumnAt(std::uint64_t microseconds) {
+  if (!has_begun_) {
+    has_begun_ = true;
+    begin_ = end_ = microseconds;
+  }
+  end_ = std::max(end_, microseconds);
+  const auto since = microseconds < begin_ ? 0 : microseconds - begin_;
+  const auto fold = [](Columns& columns) {
+    for (std::size_t i = 0; i < kColumns; ++i) {
+      columns[i] = i < kColumns / 2 ? columns[2 * i] + columns[2 * i + 1] : 0;
+    }
+  };
+  for (; since / width_ >= kColumns; width_ *= 2) {
+    for (auto& [what, row] : rows_) fold(row.columns);
+    fold(drops_);
+  }
+  return static_cast<std::size_t>(since / width_);
+}
+
+std::size_t Timeline::UsedColumns() const {
+  return static_cast<std::size_t>((end_ - begin_) / width_) + 1;
+}
+
+void Timeline::Add(std::uint64_t microseconds, std::span<const std::uint8_t> packet) {
+  const auto column = ColumnAt(microseconds);
+  auto& row = rows_[DescribePacket(packet)];
+  if (row.packets == 0) row.name = NameOfPacket(handle_, packet);
+  ++row.packets;
+  ++row.columns[column];
+}
+
+void Timeline::SetDropped(std::uint64_t microseconds, std::uint64_t count) {
+  if (count <= dropped_) return;
+  drops_[ColumnAt(microseconds)] += static_cast<std::uint32_t>(count - dropped_);
+  dropped_ = count;
+}
+
+std::string Timeline::PageRow(const std::string& what, const Row& row) const {
+  const auto drops = dropped_ == 0 ? "" : R"(<use href="#drops"/>)";
+  return Format("<tr><td>{}</td><td>{}</td><td class=\"count\">{}</td><td>{}</td></tr>\n", PageText(what),
+                PageText(row.name), row.packets,
+                Drawing(UsedColumns(), Format(R"(<path d="{}"/>{})", Lines(row.columns, false), drops)));
+}
+
+std::string Timeline::Page(const std::string& title) const {
+  std::vector<std::pair<std::string, const Row*>> rows;
+  std::uint64_t packets = 0;
+  for (const auto& [what, row] : rows_) {
+    rows.emplace_back(what, &row);
+    packets += row.packets;
+  }
+  std::ranges::stable_sort(
+      rows, [](const auto& left, const auto& right) { return left.second->packets > right.second->packets; });
+  auto page = std::string(kTimelineHead);
+  page += Format(
+      "<title>{0}</title></head><body>\n<h1>{0}</h1>\n<p>{1} of {2}, {3} dropped, in {4:.3f} s. A column is "
+      "{5} ms; each row is as high as its fullest column.</p>\n",
+      PageText(title), Counted(packets, "packet"), Counted(rows.size(), "kind"), dropped_,
+      static_cast<double>(end_ - begin_) / 1e6, width_ / 1000);
+  if (dropped_ != 0) {
+    page += Format("<svg style=\"height: 0\"><symbol id=\"drops\"><path class=\"drops\" d=\"{}\"/></symbol></svg>\n",
+                   Lines(drops_, true));
+  }
+  page += Format(
+      "<table><thead><tr><th>What</th><th>Name</th><th class=\"count\">Packets</th><th class=\"time\"><div "
+      "class=\"span\"><span>{}</span><span>{}</span></div></th></tr></thead>\n<tbody>\n",
+      has_begun_ ? TimeText(begin_) : "", has_begun_ ? TimeText(end_) : "");
+  if (dropped_ != 0) {
+    page += Format("<tr class=\"dropped\"><td>dropped</td><td></td><td class=\"count\">{}</td><td>{}</td></tr>\n",
+                   dropped_, Drawing(UsedColumns(), Format(R"(<path class="drops" d="{}"/>)", Lines(drops_, false))));
+  }
+  for (const auto& [what, row] : rows) page += PageRow(what, *row);
+  return page + "</tbody></table>\n</body></html>\n";
+}
+
+}  // namespace kral::tool
