@@ -29,7 +29,7 @@ std::vector<uint8_t> Compress(std::span<const uint8_t> bytes) {
   return compressed;
 }
 
-std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> bytes, size_t limit) {
+std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> bytes, size_t limit, size_t* used) {
   z_stream stream{};
   if (inflateInit(&stream) != Z_OK) throw std::bad_alloc();
   std::vector<uint8_t> plain(limit + 1);  // one more tells "too much" from "just enough"
@@ -39,6 +39,7 @@ std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> bytes, s
   stream.avail_out = static_cast<uInt>(plain.size());
   const bool ended = inflate(&stream, Z_FINISH) == Z_STREAM_END;
   const size_t size = stream.total_out;
+  if (used != nullptr) *used = stream.total_in;
   inflateEnd(&stream);
   if (!ended || size > limit) return std::nullopt;
   plain.resize(size);

@@ -38,10 +38,10 @@ class WithCommandCode {
 template <class Transmit>
 bool Exchange(Diag_FTM& phone, const Command& command, std::span<const uint8_t> request, size_t header,
               std::span<const uint8_t>& reply, const Transmit& transmit) {
-  const size_t before = phone.packet().request_length();
-  if (request.size() > CDiagPacket::kCapacity - before) {
+  const size_t most = CDiagPacket::kCapacity - 1 - phone.packet().request_length();
+  if (request.size() > most) {
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "the request of %s has %zu bytes and takes at most %zu",
-                        command.name.c_str(), request.size(), CDiagPacket::kCapacity - before));
+                        command.name.c_str(), request.size(), most));
   }
   phone.packet().AppendBlock(request);
   if (!transmit()) return false;

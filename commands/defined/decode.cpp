@@ -120,7 +120,10 @@ class Decoder {
     if (field.size.rule != Extent::Rule::kTerminated) return Counted(field, field.size, "bytes");
     const auto end = std::ranges::find(rest_, uint8_t{0});
     if (end == rest_.end()) throw BadCall(field.path + " is not terminated");
-    return static_cast<size_t>(end - rest_.begin());
+    const auto size = static_cast<size_t>(end - rest_.begin());
+    if (size > field.size.most)
+      throw BadCall(field.path + " takes at most " + std::to_string(field.size.most) + " bytes");
+    return size;
   }
 
   void Block(const Field& field, uint32_t element) {
@@ -133,8 +136,11 @@ class Decoder {
   }
 
   void Packed(const Field& field, uint32_t element) {
-    const auto plain = Decompress(Take(field, SizeOf(field)), kLongestMessage);
+    const auto bytes = Take(field, SizeOf(field));
+    size_t used = 0;
+    const auto plain = Decompress(bytes, kLongestMessage, &used);
     if (!plain) throw BadCall(field.path + " is no whole zlib stream, or holds more than 64 KiB");
+    if (used != bytes.size()) throw BadCall(field.path + " is longer than its stream");
     unpacked_ += plain->size();
     if (unpacked_ > kMostUnpacked) throw BadCall("its zlib streams hold more than 1 MiB");
     const auto outer = rest_;

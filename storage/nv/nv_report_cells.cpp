@@ -76,12 +76,13 @@ std::string Folded(const std::vector<Part>& parts, size_t least, const std::stri
     const size_t count = last - first;
     for (; first < last; ++first) {
       units += parts[first].units;
-      inside += "<div>" + parts[first].html + "</div>";
+      inside.append("<div>").append(parts[first].html).append("</div>");
     }
     if (count < least) {
       html += inside;
     } else {
-      html += "<details><summary>" + std::to_string(units) + " " + what + "</summary>" + inside + "</details>";
+      html.append("<details><summary>").append(std::to_string(units)).append(" ").append(what);
+      html.append("</summary>").append(inside).append("</details>");
     }
   }
   return html;
@@ -107,8 +108,8 @@ std::string ReportDifference(const ReportSide& first, const ReportSide& second) 
   for (size_t i = 0; i < std::min(first.members.size(), second.members.size()); ++i) {
     if (first.members[i] == second.members[i]) continue;
     const auto& [name, numbers] = first.members[i];
-    text +=
-        (text.empty() ? "" : "; ") + (name.empty() ? "" : name + ": ") + numbers + " to " + second.members[i].second;
+    text.append(text.empty() ? "" : "; ").append(name).append(name.empty() ? "" : ": ");
+    text.append(numbers).append(" to ").append(second.members[i].second);
   }
   if (!text.empty() || std::ranges::equal(first.bytes, second.bytes)) return text;
   if (ShowsMembers(first) && ShowsMembers(second)) return "in bytes that the definition does not tell";

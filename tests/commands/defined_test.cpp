@@ -1,6 +1,7 @@
 // Commands by definition: what files may say, the bytes that calls send, and what becomes of the replies.
 #include <cmath>
 
+#include "base/diag_packet.h"
 #include "kral/cmd.h"
 #include "kral/error.h"
 #include "tests/support/failures.h"
@@ -39,6 +40,12 @@ class DefinedCommands : public test::FtmTest {
  private:
   test::TempFolder folder_;
 };
+
+std::string Repeated(const std::string& text, size_t times) {
+  std::string all;
+  for (size_t i = 0; i < times; ++i) all += text;
+  return all;
+}
 
 // A file with these lines as the request of a command; they begin on line 2.
 std::string WithRequest(const std::string& fields, const std::string& shared = "") {
@@ -249,7 +256,11 @@ TEST_F(DefinedCommands, RepliesThatAreNotAsDefinedAreNoReplies) {
       {"WLAN.GET_TABLE", get + " 00 00 01 01 FB", KRAL_ERROR_LINK,
        "too short: points.power takes 2 bytes, and there are 1"},
       {"WLAN.GET_TABLE", get + " 00 00 02 78 9C 01", KRAL_ERROR_LINK, "packed is no whole zlib stream"},
+      {"WLAN.GET_TABLE", get + " 00 00 02 78 9C 03 00 00 00 00 01 00", KRAL_ERROR_LINK,
+       "packed is longer than its stream"},
       {"SENSOR.READ", "4B FA 03 00 00 00 00 01 41 41", KRAL_ERROR_LINK, "name is not terminated"},
+      {"SENSOR.READ", "4B FA 03 00 00 00 00 01 " + Repeated("6E ", 33) + "00 01 02", KRAL_ERROR_LINK,
+       "name takes at most 32 bytes"},
       {"SENSOR.READ", "4B FA 03 00 00 00 00 01 00 FF 41", KRAL_ERROR_LINK, "raw takes 255 bytes, and there are 1"},
       {"SENSOR.READ", "14 4B FA 03 00", KRAL_ERROR_REFUSED, "with 20"},
   };
@@ -391,6 +402,16 @@ TEST_F(DefinedCommands, BytesAreHeldToTheDefinitionAndNothingIsSentTwiceForRoom)
   EXPECT_EQ(text[0], '\0');
   EXPECT_EQ(KRAL_CMD_GetReply(handle(), text.data(), text.size()), 1);
   EXPECT_STREQ(text.data(), R"({"status":0,"power":12.5})");
+
+  ASSERT_EQ(Load(WithRequest("<Field name='b' type='bytes' size='*'/>")), 1) << Error().text;
+  const std::vector<uint8_t> too_long(CDiagPacket::kCapacity - 1);  // and the code in front of it
+  const size_t before = Traffic();
+  size = reply.size();
+  EXPECT_EQ(
+      KRAL_CMD_CallBytes(handle(), "F.C", too_long.data(), static_cast<uint32_t>(too_long.size()), reply.data(), &size),
+      0);
+  EXPECT_EQ(Error().code, uint32_t{KRAL_ERROR_ARGUMENT});
+  EXPECT_EQ(Traffic(), before);
 }
 
 TEST_F(DefinedCommands, TheRfFileSendsWhatTheExportedFunctionsSend) {

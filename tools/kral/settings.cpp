@@ -68,6 +68,7 @@ Settled TakeSetting(const toml::node& node, const Setting& setting, const std::s
 
 [[noreturn]] void RejectKey(const toml::key& key, const std::string& file) {
   std::vector<std::string> names;
+  names.reserve(std::size(kSettings));
   for (const auto& setting : kSettings) names.emplace_back(setting.name);
   const auto near = NearestWord(std::string(key.str()), names);
   throw ToolError(ExitCode::kBadFile,
@@ -80,8 +81,7 @@ SettingsRead ParseSettings(std::string_view text, const std::string& file) {
   SettingsRead settings;
   try {
     for (const auto table = toml::parse(text); const auto& [key, node] : table) {
-      const auto known =
-          std::ranges::find_if(kSettings, [&](const Setting& setting) { return key.str() == setting.name; });
+      const auto known = std::ranges::find(kSettings, key.str(), &Setting::name);
       if (known == kSettings.end()) RejectKey(key, file);
       settings.emplace(known->name, TakeSetting(node, *known, file));
     }
