@@ -62,7 +62,7 @@ class Simulation(ToolTest):
 
     def test_sim_ends_cleanly_on_request(self):
         for number in (signal.SIGINT, signal.SIGTERM):
-            with self.subTest(signal=number), self.handset() as sim:
+            with self.subTest(signal=number), self.plugged_handset() as sim:
                 sim.send_signal(number)
                 self.assertEqual(sim.wait(timeout=PATIENCE), 0)
-                self.assertFalse(os.path.exists(sim.device))
+                self.assertFalse(os.path.lexists(self.path("plug")))
