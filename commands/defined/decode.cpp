@@ -56,7 +56,8 @@ class Decoder {
     if (extent.rule != Extent::Rule::kCounted) return extent.most;
     const Bits* const count = values_.Number(extent.counted_by.slot, elements_[extent.counted_by.depth]);
     if (count == nullptr || *count > extent.most) {
-      throw BadCall(extent.counted_by.name + "=" + (count == nullptr ? "?" : std::to_string(*count)) + ": " +
+      const Field& counter = *values_.message().slots[extent.counted_by.slot];
+      throw BadCall(extent.counted_by.name + "=" + (count == nullptr ? "?" : NumberText(counter, *count)) + ": " +
                     field.path + " has at most " + std::to_string(extent.most) + " " + what);
     }
     return static_cast<uint32_t>(*count);
@@ -163,7 +164,12 @@ class Decoder {
 
 void Decode(std::span<const uint8_t> bytes, Values& values, bool padded) {
   values.Clear();
-  Decoder(values, padded).Run(bytes);
+  try {
+    Decoder(values, padded).Run(bytes);
+  } catch (...) {
+    values.Clear();  // what came before the fault is no reply
+    throw;
+  }
 }
 
 }  // namespace kral::defined

@@ -26,8 +26,8 @@ std::optional<T> ParseWhole(std::string_view text, Form... form) {
 std::optional<Bits> ParseReal(const Field& field, std::string_view text) {
   const auto value = ParseWhole<double>(text);
   if (!value || !std::isfinite(*value)) return std::nullopt;
-  if (field.width == 4 && std::abs(*value) > std::numeric_limits<float>::max()) return std::nullopt;
-  return std::bit_cast<Bits>(*value);
+  const auto bits = std::bit_cast<Bits>(*value);
+  return FitsType(field, bits) ? std::optional(Rounded(field, bits)) : std::nullopt;
 }
 
 std::optional<Bits> ParseInteger(const Field& field, std::string_view text) {
@@ -84,6 +84,11 @@ bool FitsType(const Field& field, Bits value) {
     default:
       return field.width == 8 || !(std::abs(std::bit_cast<double>(value)) > std::numeric_limits<float>::max());
   }
+}
+
+Bits Rounded(const Field& field, Bits value) {
+  if (field.kind != Kind::kReal || field.width != 4 || !FitsType(field, value)) return value;
+  return std::bit_cast<Bits>(static_cast<double>(static_cast<float>(std::bit_cast<double>(value))));
 }
 
 bool IsInRange(const Field& field, Bits value) {

@@ -23,6 +23,7 @@ namespace kral::defined {
 
 inline constexpr size_t kLongestMessage = size_t{64} << 10;  // also of what a zlib stream holds
 inline constexpr uint32_t kMostElements = 64 << 10;          // of a slot, through all arrays
+inline constexpr uint32_t kMostInAll = 1 << 20;              // elements of all slots of a message
 inline constexpr size_t kMostSlots = 4096;                   // of a message
 inline constexpr uint32_t kNoSlot = UINT32_MAX;
 
@@ -146,6 +147,8 @@ Bits SignExtended(Bits value, unsigned bits);
 // Whether the field's type can hold it, and whether it may be sent.
 bool FitsType(const Field& field, Bits value);
 bool IsInRange(const Field& field, Bits value);
+// What the field makes of it: of a real number the nearest that its width has. What is beyond its type stays.
+Bits Rounded(const Field& field, Bits value);
 // What it may be at least and at most; of a real one without limits its infinities.
 std::pair<Bits, Bits> RangeOf(const Field& field);
 // A word of the enumeration, a decimal number, or a hexadecimal one behind 0x; nothing for what the type cannot hold.

@@ -3,9 +3,16 @@
 
 #include <algorithm>
 #include <charconv>
+#include <iterator>
+#include <map>
 #include <utility>
 
 namespace kral::defined {
+namespace {
+
+constexpr uint32_t kKept = 64 << 10;  // elements for the next reply
+
+}  // namespace
 
 const Bits* Values::Number(uint32_t slot, uint32_t element) const {
   return IsSet(slot, element) ? &slots_[slot].numbers[element] : nullptr;
@@ -23,14 +30,27 @@ uint32_t Values::Reach(uint32_t slot, uint32_t from, uint32_t to) const {
   return 0;
 }
 
+// A few bytes of a reply make elements of thousands of fields, as far behind as its arrays are long.
+void Values::Reserve(uint32_t slot, uint32_t element) {
+  auto& is_set = slots_[slot].is_set;
+  if (element < is_set.size()) return;
+  const auto more = static_cast<uint32_t>(element + 1 - is_set.size());
+  if (more > kMostInAll - room_) {
+    throw BadCall(message_->slots[slot]->path + " (element " + std::to_string(element) +
+                  ") makes more than 1,048,576 elements of all fields");
+  }
+  is_set.resize(element + 1);
+  room_ += more;
+}
+
 void Values::Mark(uint32_t slot, uint32_t element) {
   auto& is_set = slots_[slot].is_set;
-  if (element >= is_set.size()) is_set.resize(element + 1);
   if (!is_set[element]) ++set_count_;
   is_set[element] = true;
 }
 
 void Values::SetNumber(uint32_t slot, uint32_t element, Bits value) {
+  Reserve(slot, element);
   auto& numbers = slots_[slot].numbers;
   if (element >= numbers.size()) numbers.resize(element + 1);
   numbers[element] = value;
@@ -38,6 +58,7 @@ void Values::SetNumber(uint32_t slot, uint32_t element, Bits value) {
 }
 
 void Values::SetBytes(uint32_t slot, uint32_t element, std::string value) {
+  Reserve(slot, element);
   auto& bytes = slots_[slot].bytes;
   if (element >= bytes.size()) bytes.resize(element + 1);
   bytes[element] = std::move(value);
@@ -48,9 +69,19 @@ void Values::Clear(uint32_t slot) {
   auto& is_set = slots_[slot].is_set;
   set_count_ -= static_cast<uint32_t>(std::ranges::count(is_set, true));
   is_set.assign(is_set.size(), false);
+  slots_[slot].bytes.clear();
+}
+
+void Values::Clear(uint32_t slot, uint32_t from, uint32_t to) {
+  for (uint32_t element = from; element < to; ++element) {
+    if (!IsSet(slot, element)) continue;
+    slots_[slot].is_set[element] = false;
+    --set_count_;
+  }
 }
 
 void Values::Clear() {
+  if (room_ > kKept) *this = Values(*message_);
   for (uint32_t slot = 0; slot < slots_.size(); ++slot) Clear(slot);
 }
 
@@ -71,6 +102,7 @@ void CheckRange(const Field& field, Bits value) {
 }
 
 void SetChecked(Values& values, const Field& field, uint32_t element, Bits value) {
+  value = Rounded(field, value);  // limits are rounded as well
   CheckRange(field, value);
   values.SetNumber(field.slot, element, value);
 }
@@ -170,6 +202,7 @@ void SetElement(Values& values, const Field& field, uint32_t element, std::strin
 
 void SetPlace(Values& values, const Place& place, std::string_view text) {
   if (!place.whole) return SetElement(values, *place.field, place.element, text);
+  values.Clear(place.field->slot, place.element, place.element + place.field->count.most);
   uint32_t index = 0;
   for (std::string_view rest = text; !rest.empty(); ++index) {
     if (index >= place.field->count.most) {
@@ -181,6 +214,27 @@ void SetPlace(Values& values, const Place& place, std::string_view text) {
     rest.remove_prefix(std::min(end + 1, rest.size()));
   }
 }
+
+// The elements that a text has set, to see those that it sets twice.
+class Given {
+ public:
+  // False where some of them are given already.
+  bool Add(const Place& place) {
+    const std::pair begin(place.field->slot, place.element);
+    const uint32_t end = place.element + (place.whole ? place.field->count.most : 1);
+    const auto next = ends_.lower_bound(begin);
+    if (next != ends_.end() && next->first < std::pair(begin.first, end)) return false;
+    if (next != ends_.begin()) {
+      const auto before = std::prev(next);
+      if (before->first.first == begin.first && before->second > place.element) return false;
+    }
+    ends_.emplace_hint(next, begin, end);
+    return true;
+  }
+
+ private:
+  std::map<std::pair<uint32_t, uint32_t>, uint32_t> ends_;  // by slot and first element
+};
 
 // Takes a value from the text: up to a blank, or between quotation marks, where a backslash stands in front of those
 // and of itself.
@@ -212,7 +266,7 @@ const Field* FindSlot(const Message& message, std::string_view path) {
 }
 
 void Assign(std::string_view text, Values& values) {
-  std::vector<Place> seen;
+  Given given;
   for (;;) {
     text.remove_prefix(std::min(text.find_first_not_of(" \t\r\n"), text.size()));
     if (text.empty()) return;
@@ -223,9 +277,7 @@ void Assign(std::string_view text, Values& values) {
     }
     const std::string_view path = text.substr(0, equals);
     const Place place = FindPlace(values.message(), path);
-    const auto same = [&](const Place& other) { return other.field == place.field && other.element == place.element; };
-    if (std::ranges::any_of(seen, same)) throw BadCall(std::string(path) + " is given twice");
-    seen.push_back(place);
+    if (!given.Add(place)) throw BadCall(std::string(path) + " is given twice");
     text.remove_prefix(equals + 1);
     SetPlace(values, place, TakeValue(text, path));
     if (!text.empty() && text.find_first_of(" \t\r\n") != 0)

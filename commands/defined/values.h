@@ -33,10 +33,12 @@ class Values {
   uint32_t Reach(uint32_t slot, uint32_t from, uint32_t to) const;
   uint32_t set_count() const { return set_count_; }
 
-  // The element must be below the slot's capacity.
+  // The element must be below the slot's capacity. BadCall for more elements in all than are kept.
   void SetNumber(uint32_t slot, uint32_t element, Bits value);
   void SetBytes(uint32_t slot, uint32_t element, std::string value);
   void Clear(uint32_t slot);
+  void Clear(uint32_t slot, uint32_t from, uint32_t to);
+  // What many elements took is given back.
   void Clear();
 
  private:
@@ -49,11 +51,13 @@ class Values {
   bool IsSet(uint32_t slot, uint32_t element) const {
     return slot < slots_.size() && element < slots_[slot].is_set.size() && slots_[slot].is_set[element];
   }
+  void Reserve(uint32_t slot, uint32_t element);
   void Mark(uint32_t slot, uint32_t element);
 
   const Message* message_;
   std::vector<Slot> slots_;
   uint32_t set_count_ = 0;
+  uint32_t room_ = 0;  // elements that there is memory for, those without a value included
 };
 
 // How many of a field's elements have values, or of a group's have some within, up to the last that has: of `elements`

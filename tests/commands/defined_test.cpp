@@ -309,6 +309,43 @@ TEST_F(DefinedCommands, EveryKindOfFieldComesBackAsItWasSent) {
       << sent;
 }
 
+TEST_F(DefinedCommands, AnArrayGivenAsAWholeLeavesNothingOfTheOneBefore) {
+  handset().On(200, handset::Length::AtLeast(1), [](ByteView request, handset::Wire& wire) { wire.Send(request); });
+  ASSERT_EQ(Load(WithRequest("<Field name='n' type='u8'/><Field name='l' type='u8' count='n'/>")), 1) << Error().text;
+  uint32_t call = 0;
+  ASSERT_EQ(KRAL_CMD_Prepare(handle(), "F.C", &call), 1);
+  const std::pair<const char*, const char*> kRows[] = {
+      {"l=1,2,3", "C8 03 01 02 03"}, {"l=9", "C8 01 09"}, {"l[1]=8", "C8 02 09 08"}, {"l=", "C8 00"}};
+  for (const auto& [fields, request] : kRows) {
+    ASSERT_EQ(KRAL_CMD_SetFields(handle(), call, fields), 1);
+    ASSERT_EQ(KRAL_CMD_Send(handle(), call), 1) << Error().text;
+    EXPECT_EQ(LastRequest(), request);
+  }
+  EXPECT_EQ(Call("F.C", "l=1,2,3 l[1]=9"), "F.C: l[1] is given twice");
+  EXPECT_EQ(Call("F.C", "l[1]=9 l[0]=2 l=1"), "F.C: l is given twice");
+  EXPECT_EQ(KRAL_CMD_Call(handle(), "F.C", "l[1]=9 l[0]=2", nullptr, 0), 1) << Error().text;
+}
+
+// 0.1 and 0.3 are a little more in 32 bits than in 64.
+TEST_F(DefinedCommands, LimitsOfShortRealsAreAsShort) {
+  handset().On(200, handset::Length::AtLeast(1), [](ByteView request, handset::Wire& wire) { wire.Send(request); });
+  ASSERT_EQ(Load("<CommandDefinition xmlns:xsi='http://www.w3.org/2001/XMLSchema-instance' "
+                 "xsi:noNamespaceSchemaLocation='CommandDefinition.xsd'><Family name='F' frame='diag'>"
+                 "<Command name='C' id='200'><Request><Field name='f' type='f32' min='0.1' max='0.3'/></Request>"
+                 "</Command></Family></CommandDefinition>"),
+            1)
+      << Error().text;
+  uint32_t call = 0;
+  ASSERT_EQ(KRAL_CMD_Prepare(handle(), "F.C", &call), 1);
+  for (const double value : {0.1, double{0.1F}, 0.3, double{0.3F}}) {
+    EXPECT_EQ(KRAL_CMD_SetReal(handle(), call, 0, 0, value), 1) << Error().text;
+    EXPECT_EQ(KRAL_CMD_Send(handle(), call), 1) << Error().text;
+    EXPECT_EQ(LastRequest(), value < 0.2 ? "C8 CD CC CC 3D" : "C8 9A 99 99 3E");
+  }
+  EXPECT_EQ(KRAL_CMD_SetReal(handle(), call, 0, 0, 0.30000004), 0);
+  EXPECT_EQ(Call("F.C", "f=0.31"), "F.C: f=0.31 is out of range: 0.1 to 0.3");
+}
+
 TEST_F(DefinedCommands, TheVirtualHandsetRemembersWhatIsSet) {
   LoadExample();
   handset().LoadCommands(KRAL_EXAMPLES "/commands.xml");
