@@ -81,7 +81,8 @@ struct Field {
   uint8_t first_bit = 0;  // of a member of a word
   uint8_t bit_count = 0;
   bool is_array = false;
-  bool counts = false;  // the elements or bytes of a later field
+  bool counts = false;      // the elements or bytes of a later field
+  bool is_counted = false;  // by an earlier field: it, or one inside
   Extent count;
   Extent size;  // of texts, blocks and streams
   std::optional<Bits> least;

@@ -1,6 +1,8 @@
 // Makes the bytes of a message from its values.
 #include <algorithm>
 #include <bit>
+#include <map>
+#include <utility>
 
 #include "base/deflate.h"
 #include "commands/defined/values.h"
@@ -13,27 +15,30 @@ class Encoder {
   explicit Encoder(const Values& values) : values_(values) {}
 
   std::vector<uint8_t> Run() {
-    std::vector<uint8_t> bytes;
-    Group(values_.message().fields, 0, bytes);
+    std::vector<uint8_t> bytes = Make();
     if (used_ != values_.set_count()) NameUnused();
     return bytes;
   }
 
  private:
-  struct Derived {
-    uint32_t slot;
-    uint32_t element;
-    Bits value;
-  };
+  enum class Sized : uint8_t { kOthers, kStreams };
+
+  // What a stream takes is known when all that is in it is: numbers that count elements as well.
+  std::vector<uint8_t> Make() {
+    const auto& fields = values_.message().fields;
+    DeriveCounts(fields, 0, Sized::kOthers);
+    DeriveCounts(fields, 0, Sized::kStreams);
+    std::vector<uint8_t> bytes;
+    Group(fields, 0, bytes);
+    return bytes;
+  }
 
   // --- Numbers ------------------------------------------------------------------------------------------------------
 
   // The value of a number: set, following from what it counts, or by default.
   const Bits* Find(uint32_t slot, uint32_t element) const {
     if (const Bits* const value = values_.Number(slot, element)) return value;
-    for (const Derived& derived : derived_) {
-      if (derived.slot == slot && derived.element == element) return &derived.value;
-    }
+    if (const auto derived = derived_.find({slot, element}); derived != derived_.end()) return &derived->second;
     const Field& field = *values_.message().slots[slot];
     return field.preset ? &*field.preset : nullptr;
   }
@@ -54,28 +59,50 @@ class Encoder {
 
   // --- What a count or size counts ----------------------------------------------------------------------------------
 
-  // Counts need not be given where what they count is: they stand in front of it.
-  void DeriveCounts(const std::vector<Field>& fields, uint32_t depth) {
+  // Counts need not be given where what they count is. It stands behind them, in the same group or in one inside.
+  void DeriveCounts(const std::vector<Field>& fields, uint32_t depth, Sized what) {
     for (const Field& field : fields) {
-      const bool counted = field.count.rule == Extent::Rule::kCounted && field.count.counted_by.depth == depth;
-      const bool sized =
-          IsSized(field) && field.size.rule == Extent::Rule::kCounted && field.size.counted_by.depth == depth;
-      if ((!counted && !sized) || (field.condition && !Holds(*field.condition))) continue;
+      if (!field.is_counted || (field.condition && !Holds(*field.condition))) continue;
       const uint32_t first = elements_[depth] * field.count.most;
-      if (counted) Derive(field, field.count.counted_by, Reach(values_, field, first, field.count.most));
-      if (sized && !field.is_array) Derive(field, field.size.counted_by, SizeOf(field, first));
+      const uint32_t elements = CountElements(field, first, what);
+      for (uint32_t i = 0; field.is_group() && i < elements; ++i) {
+        elements_[depth + 1] = first + i;
+        DeriveCounts(field.members, depth + 1, what);
+      }
+      const bool in_turn = (field.kind == Kind::kPacked) == (what == Sized::kStreams);
+      if (!IsSized(field) || field.size.rule != Extent::Rule::kCounted || !in_turn) continue;
+      for (uint32_t i = 0; i < elements; ++i) {
+        Derive(field, field.size.counted_by, SizeOf(field, first + i), " bytes: ");
+      }
     }
   }
 
-  void Derive(const Field& field, const Reference& reference, uint32_t count) {
+  // The elements to look into, and what counts them.
+  uint32_t CountElements(const Field& field, uint32_t first, Sized what) {
+    if (field.count.rule == Extent::Rule::kFixed) return field.count.most;
+    const uint32_t reach = Reach(values_, field, first, field.count.most);
+    if (field.count.rule != Extent::Rule::kCounted) return reach;
+    const Reference& reference = field.count.counted_by;
+    if (what == Sized::kOthers) Derive(field, reference, reach, " elements: ");
+    const Bits* const count = Find(reference.slot, elements_[reference.depth]);
+    return count != nullptr ? static_cast<uint32_t>(std::min<Bits>(*count, field.count.most)) : reach;
+  }
+
+  // What counts several things is what the most of them have: those that have less are then refused.
+  void Derive(const Field& field, const Reference& reference, uint32_t count, const char* of_what) {
     const uint32_t element = elements_[reference.depth];
     const Field& counter = *values_.message().slots[reference.slot];
     if (values_.Number(reference.slot, element) != nullptr || (count == 0 && counter.preset)) return;
     if (!IsInRange(counter, count)) {
-      throw BadCall(field.path + " has " + std::to_string(count) + (field.is_array ? " elements: " : " bytes: ") +
-                    counter.path + " takes " + RangeText(counter));
+      throw BadCall(field.path + " has " + std::to_string(count) + of_what + counter.path + " takes " +
+                    RangeText(counter));
     }
-    derived_.push_back({reference.slot, element, count});
+    Bits& derived = derived_[{reference.slot, element}];
+    derived = std::max<Bits>(derived, count);
+  }
+
+  std::string CountText(const Reference& reference, Bits count) const {
+    return reference.name + "=" + NumberText(*values_.message().slots[reference.slot], count);
   }
 
   static bool IsSized(const Field& field) {
@@ -96,7 +123,6 @@ class Encoder {
   // --- Fields -------------------------------------------------------------------------------------------------------
 
   void Group(const std::vector<Field>& fields, uint32_t depth, std::vector<uint8_t>& bytes) {
-    DeriveCounts(fields, depth);
     for (const Field& field : fields) {
       if (field.condition && !Holds(*field.condition)) continue;
       const uint32_t first = elements_[depth] * field.count.most;
@@ -112,8 +138,8 @@ class Encoder {
         const Bits* const count = Find(reference.slot, elements_[reference.depth]);
         if (count == nullptr) throw BadCall(reference.name + " is missing: it counts " + field.path);
         if (*count > field.count.most) {
-          throw BadCall(reference.name + "=" + std::to_string(*count) + " is out of range: " + field.path +
-                        " has at most " + std::to_string(field.count.most) + " elements");
+          throw BadCall(CountText(reference, *count) + " is out of range: " + field.path + " has at most " +
+                        std::to_string(field.count.most) + " elements");
         }
         return static_cast<uint32_t>(*count);
       }
@@ -178,7 +204,7 @@ class Encoder {
       const Reference& reference = field.size.counted_by;
       const Bits* const size = Find(reference.slot, elements_[reference.depth]);
       if (size == nullptr || *size != block.size()) {
-        throw BadCall(reference.name + (size == nullptr ? " is missing" : "=" + std::to_string(*size)) + ": " +
+        throw BadCall((size == nullptr ? reference.name + " is missing" : CountText(reference, *size)) + ": " +
                       field.path + " has " + std::to_string(block.size()) + " bytes");
       }
     }
@@ -206,8 +232,7 @@ class Encoder {
   [[noreturn]] void NameUnused() {
     Encoder again(values_);
     again.naming_ = true;
-    std::vector<uint8_t> bytes;
-    again.Group(values_.message().fields, 0, bytes);
+    again.Make();
     for (const Field* const field : values_.message().slots) {
       const uint32_t end = values_.Reach(field->slot, 0, field->capacity);
       for (uint32_t element = 0; element < end; ++element) {
@@ -222,7 +247,7 @@ class Encoder {
 
   const Values& values_;
   Elements elements_{};
-  std::vector<Derived> derived_;
+  std::map<std::pair<uint32_t, uint32_t>, Bits> derived_;  // by slot and element
   uint32_t used_ = 0;
   bool naming_ = false;
   std::vector<std::pair<uint32_t, uint32_t>> places_;

@@ -113,6 +113,9 @@ void FieldReader::Complete(std::vector<Field>& fields) {
     field.counts = field.slot != kNoSlot && std::ranges::find(counters_, field.slot) != counters_.end();
     if (field.slot != kNoSlot) message_.slots.push_back(&field);
     Complete(field.members);
+    const bool sized = !field.is_number() && field.size.rule == Extent::Rule::kCounted;
+    field.is_counted = sized || field.count.rule == Extent::Rule::kCounted ||
+                       std::ranges::any_of(field.members, [](const Field& member) { return member.is_counted; });
   }
 }
 

@@ -309,6 +309,40 @@ TEST_F(DefinedCommands, EveryKindOfFieldComesBackAsItWasSent) {
       << sent;
 }
 
+// What counts stands in the same group as what it counts, or in one around it.
+TEST_F(DefinedCommands, CountsFollowFromWhatTheyCountWhereverItIs) {
+  handset().On(200, handset::Length::AtLeast(1), [](ByteView request, handset::Wire& wire) { wire.Send(request); });
+  const struct {
+    const char* definition;
+    const char* fields;
+    const char* request;
+  } kRows[] = {
+      {"<Field name='g' type='record'><Field name='l' type='u8' count='n'/></Field>", "g.l=1,2", "C8 02 01 02"},
+      {"<Field name='g' type='record'><Field name='l' type='text' size='n'/></Field>", "g.l=ab", "C8 02 61 62"},
+      {"<Field name='l' type='bytes' size='n' count='2'/>", "l=AABB,CCDD", "C8 02 AA BB CC DD"},
+      {"<Field name='g' type='record' count='2'><Field name='l' type='u8' count='n'/></Field>", "g[0].l=1,2 g[1].l=3,4",
+       "C8 02 01 02 03 04"},
+      {"<Field name='m' type='u8'/><Field name='z' type='zlib' size='m'><Field name='g' type='record'>"
+       "<Field name='k' type='u8'/><Field name='l' type='u8' count='n'/><Field name='t' type='text' size='k'/></Field>"
+       "</Field>",
+       "z.g.l=1,2 z.g.t=abc", "C8 02 0E 78 DA"},
+      {"<Field name='m' type='u8'/><Field name='g' type='record' count='n' max_count='3'>"
+       "<Field name='t' type='text' size='m' default='abc'/></Field>",
+       "n=1", "C8 01 03 61 62 63"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.definition);
+    KRAL_CMD_ClearDefinitions(handle());
+    ASSERT_EQ(Load(WithRequest(std::string("<Field name='n' type='u8' max='9'/>") + row.definition)), 1)
+        << Error().text;
+    EXPECT_EQ(KRAL_CMD_Call(handle(), "F.C", row.fields, nullptr, 0), 1) << Error().text;
+    EXPECT_EQ(LastRequest().substr(0, std::strlen(row.request)), row.request);
+  }
+  KRAL_CMD_ClearDefinitions(handle());
+  ASSERT_EQ(Load(WithRequest(std::string("<Field name='n' type='u8'/>") + kRows[3].definition)), 1) << Error().text;
+  EXPECT_EQ(Call("F.C", "g[0].l=1 g[1].l=3,4"), "F.C is not sent: g.l is missing: 0 to 255");
+}
+
 TEST_F(DefinedCommands, AnArrayGivenAsAWholeLeavesNothingOfTheOneBefore) {
   handset().On(200, handset::Length::AtLeast(1), [](ByteView request, handset::Wire& wire) { wire.Send(request); });
   ASSERT_EQ(Load(WithRequest("<Field name='n' type='u8'/><Field name='l' type='u8' count='n'/>")), 1) << Error().text;
