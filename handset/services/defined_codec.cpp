@@ -86,6 +86,10 @@ class Taker {
     return taken;
   }
 
+  static void Limit(size_t size, const std::optional<size_t>& most) {
+    if (most && size > *most) throw Refused{Refusal::kBadParameter};
+  }
+
   size_t NumberOf(const std::string& text, const std::string& prefix) const {
     if (text[0] >= '0' && text[0] <= '9') return std::strtoul(text.c_str(), nullptr, 10);
     const std::string* const value = Find(values_, prefix, text);
@@ -101,6 +105,7 @@ class Taker {
       }
       const size_t count = field.count == "*" ? SIZE_MAX : NumberOf(field.count, prefix);
       for (size_t i = 0; i < count && !(field.count == "*" && rest_.empty()); ++i) {
+        Limit(i + 1, field.most_elements);
         const size_t before = rest_.size();
         One(field, prefix + field.name + "[" + std::to_string(i) + "]", prefix);
         if (rest_.size() == before) throw Refused{Refusal::kBadLength};  // or it would never end
@@ -144,11 +149,13 @@ class Taker {
     if (field.size == "terminated") {
       const auto end = std::ranges::find(rest_, uint8_t{0});
       const ByteView text = Take(static_cast<size_t>(end - rest_.begin()));
+      Limit(text.size(), field.most_bytes);
       Take(1);
       values_[path].assign(text.begin(), text.end());
       return;
     }
     const ByteView bytes = Take(field.size == "*" ? rest_.size() : NumberOf(field.size, prefix));
+    Limit(bytes.size(), field.most_bytes);
     if (field.type == "zlib") return Unpack(field, path, bytes);
     std::string text(bytes.begin(), bytes.end());
     if (field.type == "text") text.resize(std::min(text.find('\0'), text.size()));

@@ -62,6 +62,8 @@ class Reader {
     field.type = Text(element, "type");
     field.count = Text(element, "count");
     field.size = Text(element, "size");
+    if (element.Attribute("max_count") != nullptr) field.most_elements = Number(element, "max_count");
+    if (element.Attribute("max_size") != nullptr) field.most_bytes = Number(element, "max_size");
     field.when = Text(element, "when");
     field.big = element.Attribute("order") != nullptr ? Text(element, "order") == "big" : big;
     if (element.name == "Bit") field.type = Text(element, "signed") == "1" ? "s" : "u";

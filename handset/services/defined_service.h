@@ -29,6 +29,8 @@ struct DefinedField {
   std::string success;
   std::string count;
   std::string size;
+  std::optional<size_t> most_elements;  // where the count is not fixed
+  std::optional<size_t> most_bytes;     // where the size is not
   std::string when;
   std::map<std::string, std::string> words;  // of an enumeration, with their numbers
   std::vector<DefinedField> fields;

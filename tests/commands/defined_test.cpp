@@ -380,6 +380,24 @@ TEST_F(DefinedCommands, LimitsOfShortRealsAreAsShort) {
   EXPECT_EQ(Call("F.C", "f=0.31"), "F.C: f=0.31 is out of range: 0.1 to 0.3");
 }
 
+// The handset has a stricter file than the library.
+TEST_F(DefinedCommands, TheVirtualHandsetRefusesWhatIsLongerThanItsFileSays) {
+  const auto definitions = [](const char* most_bytes, const char* most_elements) {
+    return std::string(
+               "<CommandDefinition><Family name='F' frame='subsystem' subsystem='250'><Command name='C' id='1'>"
+               "<Request><Field name='t' type='text' size='terminated' max_size='") +
+           most_bytes + "'/><Field name='l' type='u8' count='*' max_count='" + most_elements +
+           "'/></Request></Command></Family></CommandDefinition>";
+  };
+  test::TempFolder folder;
+  handset().LoadCommands(folder.Add("handset.xml", definitions("4", "2")));
+  ASSERT_EQ(Load(definitions("9", "9")), 1) << Error().text;
+  EXPECT_EQ(KRAL_CMD_Call(handle(), "F.C", "t=abcd l=1,2", nullptr, 0), 1) << Error().text;
+  EXPECT_EQ(KRAL_CMD_Call(handle(), "F.C", "t=abcde l=1,2", nullptr, 0), 0);
+  EXPECT_EQ(KRAL_CMD_Call(handle(), "F.C", "t=abcd l=1,2,3", nullptr, 0), 0);
+  EXPECT_EQ(Error().code, uint32_t{KRAL_ERROR_REFUSED}) << Error().text;
+}
+
 TEST_F(DefinedCommands, TheVirtualHandsetRemembersWhatIsSet) {
   LoadExample();
   handset().LoadCommands(KRAL_EXAMPLES "/commands.xml");
