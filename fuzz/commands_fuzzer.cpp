@@ -71,7 +71,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   std::vector<CommandPtr> commands;
   Problem problem;
-  if (!ReadDefinitions(document, commands, problem)) {
+  if (!ReadDefinitions(document, {}, commands, problem)) {
     Check(!problem.text.empty());
     return 0;
   }

@@ -94,13 +94,19 @@ bool MayBePadded(Diag_FTM& phone, const Framing& framing) {
   return framing.frame == Frame::kFtm && phone.state<ftm::Settings>().command_code == ftm::kCommandCode59;
 }
 
+// The text has a status whole; one of more than 32 bits must not look like success here.
+uint32_t StatusOf(Bits status) {
+  const bool fits = status <= UINT32_MAX || SignExtended(status, 32) == status;
+  return fits ? static_cast<uint32_t>(status) : UINT32_MAX;
+}
+
 bool TakeReply(Diag_FTM& phone, const std::shared_ptr<Call>& call, std::span<const uint8_t> reply) {
   const Command& command = *call->command;
   try {
     Decode(reply, call->reply, MayBePadded(phone, command.framing));
   } catch (const RefusedByStatus& refused) {
     return Fail(Failure(KRAL_ERROR_REFUSED, "the handset refused %s: %s", command.name.c_str(), refused.what())
-                    .Status(KRAL_ERROR_STATUS_COMMAND, static_cast<uint32_t>(refused.status()))
+                    .Status(KRAL_ERROR_STATUS_COMMAND, StatusOf(refused.status()))
                     .Command(phone.packet().request()));
   } catch (const BadCall& bad) {
     return Fail(Failure(KRAL_ERROR_LINK, "the reply of %s, %zu bytes, is not as defined: %s", command.name.c_str(),
@@ -133,14 +139,14 @@ bool LoadDefinitions(Diag_FTM& phone, const std::string& file, uint32_t& count) 
   }
   std::vector<CommandPtr> commands;
   Problem problem;
-  if (!ReadDefinitions(document, commands, problem)) {
+  Definitions& definitions = phone.state<Session>().definitions;
+  if (!ReadDefinitions(document, definitions, commands, problem)) {
     Failure failure = FileFailure(file, ("cannot be used: " + problem.text).c_str());
     return Fail(problem.line != 0 ? failure.Line(problem.line) : failure);
   }
   count = static_cast<uint32_t>(commands.size());
-  std::string twice;
-  if (phone.state<Session>().definitions.Add(std::move(commands), twice)) return true;
-  return Fail(FileFailure(file, ("cannot be used: " + twice + " is defined already").c_str()));
+  definitions.Add(std::move(commands));
+  return true;
 }
 
 CommandPtr FindCommand(Diag_FTM& phone, std::string_view name) {

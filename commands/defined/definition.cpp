@@ -172,18 +172,11 @@ CommandPtr Definitions::Find(std::string_view name) const {
   return found == by_name_.end() ? nullptr : commands_[found->second];
 }
 
-bool Definitions::Add(std::vector<CommandPtr> commands, std::string& twice) {
-  for (const CommandPtr& command : commands) {
-    if (by_name_.contains(command->name)) {
-      twice = command->name;
-      return false;
-    }
-  }
+void Definitions::Add(std::vector<CommandPtr> commands) {
   for (CommandPtr& command : commands) {
     by_name_.emplace(command->name, commands_.size());
     commands_.push_back(std::move(command));
   }
-  return true;
 }
 
 void Definitions::Clear() {

@@ -166,8 +166,8 @@ class Definitions {
   size_t count() const { return commands_.size(); }
   CommandPtr At(size_t index) const { return index < commands_.size() ? commands_[index] : nullptr; }
   CommandPtr Find(std::string_view name) const;
-  // False, with nothing added, for a name that is there already: `twice` is it.
-  bool Add(std::vector<CommandPtr> commands, std::string& twice);
+  // Of names that are not there yet.
+  void Add(std::vector<CommandPtr> commands);
   void Clear();
 
  private:

@@ -3,6 +3,9 @@
 #include "commands/defined/definition_xml.h"
 
 #include <algorithm>
+#include <array>
+#include <charconv>
+#include <iterator>
 #include <set>
 #include <utility>
 
@@ -13,7 +16,8 @@ namespace kral::defined {
 namespace {
 
 constexpr size_t kMostCommands = 65536;
-constexpr size_t kLongestHeader = 16;  // more than any frame puts in front of the fields
+constexpr size_t kLongestHeader = 16;   // more than any frame puts in front of the fields
+constexpr size_t kLongestReply = 4091;  // with what the frame puts in front: longer ones are dropped when they come
 
 std::string RequiredText(const XmlElement& element, const char* name) {
   const std::string* const text = element.Attribute(name);
@@ -23,11 +27,13 @@ std::string RequiredText(const XmlElement& element, const char* name) {
 
 class Reader {
  public:
-  Reader(FileContext& file, std::vector<CommandPtr>& commands) : file_(file), commands_(commands) {}
+  Reader(FileContext& file, const Definitions& known, std::vector<CommandPtr>& commands)
+      : file_(file), known_(known), commands_(commands) {}
 
   void Read(const XmlElement& root) {
     file_.at = &root;
     if (root.name != "CommandDefinition") throw BadXml("the root element is <" + root.name + ">");
+    RefuseForm(root);
     ForEach(root, "Enumeration", [&](const XmlElement& element) { ReadEnumeration(element); });
     ForEach(root, "Record", [&](const XmlElement& element) { NameRecord(element); });
     ForEach(root, "Record", [&](const XmlElement& element) { TryRecord(element); });
@@ -41,6 +47,17 @@ class Reader {
   }
 
  private:
+  // The root may name a schema.
+  static void RefuseForm(const XmlElement& root) {
+    XmlElement form;
+    form.name = root.name;
+    form.text = root.text;
+    std::ranges::copy_if(root.attributes, std::back_inserter(form.attributes), [](const auto& attribute) {
+      return !attribute.first.starts_with("xmlns") && !attribute.first.starts_with("xsi:");
+    });
+    RefuseOthers(form, {});
+  }
+
   template <class Visit>
   void ForEach(const XmlElement& parent, std::string_view name, Visit visit) {
     for (const XmlElement& element : parent.children) {
@@ -52,6 +69,7 @@ class Reader {
   // --- What families share ------------------------------------------------------------------------------------------
 
   void ReadEnumeration(const XmlElement& element) {
+    RefuseOthers(element, {"name"});
     const std::string name = RequiredText(element, "name");
     RequireName(element, name, false);
     auto enumeration = std::make_shared<Enumeration>();
@@ -60,8 +78,10 @@ class Reader {
     for (const XmlElement& value : element.children) {
       file_.at = &value;
       if (value.name != "Value") throw BadXml("<" + value.name + "> is not expected in <Enumeration>");
+      RefuseOthers(value, {"name", "value"});
+      RefuseInside(value);
       const std::string word = RequiredText(value, "name");
-      if (word.empty() || word.find_first_of(" ,=\"") != std::string::npos) {
+      if (word.empty() || word.find_first_of(" \t\r\n,=\"") != std::string::npos) {
         throw BadXml("<Value>: name=\"" + word + "\" is empty, or has a blank, comma, quotation mark or =");
       }
       const std::string number = RequiredText(value, "value");
@@ -78,8 +98,10 @@ class Reader {
   }
 
   void NameRecord(const XmlElement& element) {
+    RefuseOthers(element, {"name"});
     const std::string name = RequiredText(element, "name");
     RequireName(element, name, false);
+    if (IsType(name)) throw BadXml("<Record>: " + name + " is a type");
     if (!file_.records.emplace(name, &element).second) throw BadXml("there are two records of the name " + name);
   }
 
@@ -103,6 +125,7 @@ class Reader {
   // --- Families -----------------------------------------------------------------------------------------------------
 
   void ReadFamily(const XmlElement& element) {
+    RefuseOthers(element, {"name", "frame", "mode", "header", "subsystem", "order"});
     const std::string family = RequiredText(element, "name");
     RequireName(element, family, false);
     if (!families_.insert(family).second) throw BadXml("there are two families of the name " + family);
@@ -116,11 +139,14 @@ class Reader {
       file_.at = &child;
       file_.big_endian = order == "big";
       if (child.name != "Command") throw BadXml("<" + child.name + "> is not expected in <Family>");
+      RefuseOthers(child, {"name", "id", "mode", "doc"});
       const std::string name = RequiredText(child, "name");
       RequireName(child, name, true);
       if (!names.insert(name).second) throw Twice(family, "commands", name);
+      const std::string full_name = FullName(family, name);
+      if (known_.Find(full_name)) throw BadXml(full_name + " is defined already");
       if (commands_.size() == kMostCommands) throw BadXml("too many commands");
-      commands_.push_back(ReadCommand(child, FullName(family, name), framing));
+      commands_.push_back(ReadCommand(child, full_name, framing));
     }
   }
 
@@ -206,10 +232,21 @@ class Reader {
     command.reply.is_open = command.reply.is_open || !has_reply;
   }
 
+  // What stands in front of the fields of a reply, at least.
+  static size_t HeaderSize(const Framing& framing) {
+    constexpr std::array<size_t, 4> kSizes = {6, 7, 1, 4};
+    return kSizes[static_cast<size_t>(framing.frame)];
+  }
+
   static void CheckMessages(const Command& command) {
     constexpr size_t kRoom = CDiagPacket::kCapacity - kLongestHeader;
-    if (command.request.shortest > kRoom || command.reply.shortest > kRoom) {
-      throw BadXml(command.name + " has a request or reply of more than " + std::to_string(kRoom) + " bytes");
+    if (command.request.shortest > kRoom) {
+      throw BadXml(command.name + " has a request of more than " + std::to_string(kRoom) + " bytes");
+    }
+    const size_t reply = HeaderSize(command.framing) + command.reply.shortest;
+    if (reply > kLongestReply) {
+      throw BadXml(command.name + " has a reply of " + std::to_string(reply) + " bytes: none of more than " +
+                   std::to_string(kLongestReply) + " is received");
     }
     const auto is_status = [](const Field* field) { return field->is_status(); };
     if (std::ranges::any_of(command.request.slots, is_status))
@@ -224,19 +261,32 @@ class Reader {
   }
 
   FileContext& file_;
+  const Definitions& known_;
   std::vector<CommandPtr>& commands_;
   std::set<std::string> families_;
 };
 
+// Parsers begin with the line where they know it.
+uint32_t LineOfFault(std::string_view text) {
+  constexpr std::string_view kLine = "line ";
+  uint32_t line = 0;
+  if (text.starts_with(kLine)) std::from_chars(text.data() + kLine.size(), text.data() + text.size(), line);
+  return line;
+}
+
 }  // namespace
 
-bool ReadDefinitions(std::span<const uint8_t> document, std::vector<CommandPtr>& commands, Problem& problem) {
+bool ReadDefinitions(std::span<const uint8_t> document, const Definitions& known, std::vector<CommandPtr>& commands,
+                     Problem& problem) {
   XmlElement root;
-  if (ParseXml(document, root, problem.text) != XmlResult::kOk) return false;
+  if (ParseXml(document, root, problem.text) != XmlResult::kOk) {
+    problem.line = LineOfFault(problem.text);
+    return false;
+  }
   FileContext file;
   try {
     std::vector<CommandPtr> read;
-    Reader(file, read).Read(root);
+    Reader(file, known, read).Read(root);
     commands = std::move(read);
     return true;
   } catch (const BadXml& bad) {

@@ -17,8 +17,9 @@ struct Problem {
   uint32_t line = 0;
 };
 
-// False, with the problem told, for a file that cannot be used.
-bool ReadDefinitions(std::span<const uint8_t> document, std::vector<CommandPtr>& commands, Problem& problem);
+// False, with the problem told, for a file that cannot be used, beside the known definitions.
+bool ReadDefinitions(std::span<const uint8_t> document, const Definitions& known, std::vector<CommandPtr>& commands,
+                     Problem& problem);
 
 }  // namespace kral::defined
 

@@ -32,14 +32,6 @@ constexpr NumberType kNumberTypes[] = {
   throw BadXml(field.path + ": " + why);
 }
 
-void RefuseOthers(const XmlElement& element, std::initializer_list<std::string_view> known) {
-  for (const auto& attribute : element.attributes) {
-    if (std::ranges::find(known, attribute.first) == known.end()) {
-      throw BadXml("<" + element.name + "> has no attribute " + attribute.first);
-    }
-  }
-}
-
 std::vector<std::string_view> Split(std::string_view text, char by) {
   std::vector<std::string_view> parts;
   for (;;) {
@@ -62,10 +54,51 @@ bool IsOpen(const Field& field) {
   const bool open_size = !field.is_number() && field.kind != Kind::kRecord && field.kind != Kind::kBits &&
                          field.size.rule == Extent::Rule::kToEnd;
   return open_size || field.count.rule == Extent::Rule::kToEnd ||
-         (field.kind == Kind::kRecord && IsOpen(field.members.back()));
+         (field.kind == Kind::kRecord && std::ranges::any_of(field.members, IsOpen));
+}
+
+// Whether two fields may be there at a time. Conditions that look at different fields are trusted to exclude each
+// other.
+bool MayMeet(const Field& left, const Field& right) {
+  if (!left.condition || !right.condition) return true;
+  const Condition& one = *left.condition;
+  const Condition& other = *right.condition;
+  if (one.on.slot != other.on.slot) return false;
+  if (one.is_not && other.is_not) return true;
+  const auto holds = [&](Bits value) {
+    const auto listed = [&](const Condition& condition) {
+      return (std::ranges::find(condition.values, value) != condition.values.end()) != condition.is_not;
+    };
+    return listed(one) && listed(other);
+  };
+  return std::ranges::any_of(one.is_not ? other.values : one.values, holds);
 }
 
 }  // namespace
+
+void RefuseOthers(const XmlElement& element, std::initializer_list<std::string_view> known) {
+  for (const auto& attribute : element.attributes) {
+    if (std::ranges::find(known, attribute.first) == known.end()) {
+      throw BadXml("<" + element.name + "> has no attribute " + attribute.first);
+    }
+  }
+  const size_t text = element.text.find_first_not_of(" \t\r\n");
+  if (text != std::string::npos) {
+    throw BadXml("<" + element.name + "> has text: \"" + element.text.substr(text, 20) + "\"");
+  }
+}
+
+void RefuseInside(const XmlElement& element) {
+  if (!element.children.empty()) {
+    throw BadXml("<" + element.children[0].name + "> is not expected in <" + element.name + ">");
+  }
+}
+
+bool IsType(std::string_view name) {
+  constexpr std::string_view kOthers[] = {"text", "bytes", "record", "zlib"};
+  return std::ranges::find(kNumberTypes, name, &NumberType::name) != std::end(kNumberTypes) ||
+         std::ranges::find(kOthers, name) != std::end(kOthers);
+}
 
 void RequireName(const XmlElement& element, const std::string& name, bool may_begin_with_digit) {
   const auto is_letter = [](char c) { return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || c == '_'; };
@@ -98,7 +131,11 @@ size_t ShortestOf(const Field& field) {
 }
 
 void FieldReader::Read(const XmlElement& element) {
-  RefuseOthers(element, {"longer"});
+  if (element.name == "Reply") {
+    RefuseOthers(element, {"longer"});
+  } else {
+    RefuseOthers(element, {});
+  }
   message_.is_open = FlagAttribute(element, "longer");
   ReadFields(element.children, {message_.fields, nullptr, 0, 1, ""});
   file_.at = &element;
@@ -232,6 +269,7 @@ void FieldReader::ReadNumber(const XmlElement& element, Field& field) {
     for (const std::string_view word : Split(*success, ',')) {
       const auto value = ParseNumber(field, word);
       if (!value) Reject(field, "success=\"" + *success + "\" is no value of " + TypeText(field));
+      if (!IsInRange(field, *value)) Reject(field, "success=\"" + *success + "\" is out of range: " + RangeText(field));
       field.success.push_back(*value);
     }
   }
@@ -293,6 +331,12 @@ Extent FieldReader::ReadExtent(const XmlElement& element, const char* name, cons
     throw BadXml(where + " may be more than 64 KiB: there is no " + most_name);
   if (counted > limit || counted == 0) throw BadXml(where + " is out of range: 1 to " + std::to_string(limit));
   extent.most = static_cast<uint32_t>(counted);
+  for (const auto& [number, when] : {std::pair(counter.least, "at least"), std::pair(counter.preset, "by default")}) {
+    if (number && *number > counted) {
+      throw BadXml(where + ": " + counter.name + " is " + when + " " + std::to_string(*number) +
+                   ", and it takes at most " + std::to_string(counted));
+    }
+  }
   return extent;
 }
 
@@ -310,7 +354,7 @@ void FieldReader::ReadMembers(const XmlElement& element, const Scope& scope, Fie
   }
   file_.at = &element;
   if (field.members.empty()) Reject(field, "a group without fields");
-  if (field.is_array && field.kind == Kind::kRecord && IsOpen(field.members.back())) {
+  if (field.is_array && field.kind == Kind::kRecord && std::ranges::any_of(field.members, IsOpen)) {
     Reject(field, "its last field takes all the rest, and there is more than one");
   }
 }
@@ -330,6 +374,7 @@ void FieldReader::ReadBits(const XmlElement& element, const Scope& scope, Field&
     file_.at = &child;
     if (child.name != "Bit") throw BadXml("<" + child.name + "> is not expected in the place of a <Bit>");
     RefuseOthers(child, {"name", "doc", "unit", "bits", "signed", "min", "max", "default", "enum", "success"});
+    RefuseInside(child);
     Field field;
     NameField(child, inner, field);
     field.kind = FlagAttribute(child, "signed") ? Kind::kSigned : Kind::kUnsigned;
@@ -362,7 +407,8 @@ Condition FieldReader::ReadCondition(const std::string& text, const Scope& scope
   const Field& field = Resolve(text.substr(0, equals - (condition.is_not ? 1 : 0)), scope, condition.on);
   for (const std::string_view word : Split(std::string_view(text).substr(equals + 1), ',')) {
     const auto value = ParseNumber(field, word);
-    if (!value) throw BadXml("when=\"" + text + "\": " + field.name + " never is " + std::string(word));
+    if (!value || !IsInRange(field, *value))
+      throw BadXml("when=\"" + text + "\": " + field.name + " never is " + std::string(word));
     condition.values.push_back(*value);
   }
   return condition;
@@ -396,10 +442,11 @@ void FieldReader::GiveSlot(Field& field) {
 // Fields that take all the rest may follow each other where only one of them is there at a time.
 void FieldReader::CheckEnds(const std::vector<XmlElement>& elements, const std::vector<Field>& fields) {
   for (size_t i = 0; i + 1 < fields.size(); ++i) {
-    const bool alone =
-        std::ranges::all_of(std::span(fields).subspan(i), [](const Field& f) { return f.condition.has_value(); });
+    if (!IsOpen(fields[i])) continue;
     file_.at = &elements[i];
-    if (IsOpen(fields[i]) && !alone) Reject(fields[i], "it takes all the rest, and is not the last");
+    const auto meets = [&](const Field& later) { return MayMeet(fields[i], later); };
+    if (std::ranges::any_of(std::span(fields).subspan(i + 1), meets))
+      Reject(fields[i], "it takes all the rest, and is not the last");
   }
 }
 

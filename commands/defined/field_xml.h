@@ -2,9 +2,11 @@
 #ifndef KRAL_COMMANDS_DEFINED_FIELD_XML_H
 #define KRAL_COMMANDS_DEFINED_FIELD_XML_H
 
+#include <initializer_list>
 #include <map>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "base/xml_attributes.h"
@@ -62,6 +64,12 @@ class FieldReader {
   std::vector<uint32_t> counters_;  // slots
 };
 
+// Refuses attributes that are not among these, and text, which no element has.
+void RefuseOthers(const XmlElement& element, std::initializer_list<std::string_view> known);
+// Refuses elements inside as well.
+void RefuseInside(const XmlElement& element);
+// Whether the name is a type without being a record's.
+bool IsType(std::string_view name);
 // Letters, digits and underscores, not too many.
 void RequireName(const XmlElement& element, const std::string& name, bool may_begin_with_digit);
 // The fewest bytes that a field takes when it is there.
