@@ -20,6 +20,8 @@ std::FILE* OpenToRead(const std::string& path);
 std::FILE* OpenToWrite(const std::string& path);  // emptied, or made
 // Closes what these two have opened; false when not everything reached the file.
 bool CloseStream(std::FILE* stream);
+// Whether one of these two has the file open, by whatever name.
+bool IsInUse(const std::string& path);
 
 // For lines, which end as the system ends them. Terminals, the null device and their like, and pipes that somebody
 // reads are welcome too; writing to these waits for whoever reads.

@@ -21,6 +21,8 @@ template <class Convert>
 bool ConvertFile(const char* from, const char* to, const char* foreign, Conversion& conversion, Convert convert) {
   auto source = kral::OpenCaptureSource(from);
   if (!source) return Fail(FileFailure(from, "cannot be read, or is being written"));
+  // The source itself, by whatever name, and what a capture or trace writes at the time.
+  if (kral::IsInUse(to)) return Fail(FileFailure(to, "is being read or written"));
   AtomicFile file;
   std::error_code error = file.Open(to);
   if (!error) {

@@ -98,6 +98,14 @@ std::FILE* OpenToWrite(const std::string& path) {
   return MakeStream(std::move(file), "wb");
 }
 
+bool IsInUse(const std::string& path) {
+  FileDescriptor file;
+  if (OpenIf(IsOrdinary, path, O_RDONLY, file)) return false;
+  const bool is_held = IsHeldByAnother(file.get(), LOCK_EX);
+  ::flock(file.get(), LOCK_UN);
+  return is_held;
+}
+
 // A child process made meanwhile has the file open, too, and would keep it locked as long as it lives.
 bool CloseStream(std::FILE* stream) {
   const bool flushed = std::fflush(stream) == 0;

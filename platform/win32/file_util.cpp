@@ -120,6 +120,13 @@ std::FILE* OpenToWrite(const std::string& path) {
   return OpenEmptied(IsOrdinary, path, FILE_SHARE_READ, _O_BINARY, "wb");
 }
 
+// Neither shares a file with others that write.
+bool IsInUse(const std::string& path) {
+  WinHandle file;
+  return OpenIf(IsOrdinary, path, {GENERIC_WRITE, kShareAll, OPEN_EXISTING}, file) ==
+         std::errc::device_or_resource_busy;
+}
+
 bool CloseStream(std::FILE* stream) {
   return std::fclose(stream) == 0;
 }

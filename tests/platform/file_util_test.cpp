@@ -66,8 +66,10 @@ TEST(OpenToWriteTextTest, EmptiesNothingThatIsBeingWrittenOrRead) {
     if (!reads) std::fputs("abc", held.get());
     std::fflush(held.get());
     EXPECT_EQ(OpenToWriteText(path), nullptr);
+    EXPECT_TRUE(IsInUse(path));
     EXPECT_EQ(std::filesystem::file_size(path), 3u);
   }
+  EXPECT_FALSE(IsInUse(path));
   const Stream one(OpenToWriteText(path), close);
   const Stream two(OpenToWriteText(path), close);
   EXPECT_TRUE(one && two) << "text logs may share a file";

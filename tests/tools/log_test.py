@@ -105,6 +105,15 @@ class Traffic(ToolTest):
         self.expect_json(10, "log", "import", capture, file)
         self.expect_json(10, "log", "export", capture, self.path("no", "folder"))
         self.assertEqual(self.content(file), before)
+        # A file is not made of itself, by whatever name.
+        for verb, source in (("export", capture), ("import", file)):
+            before = self.content(source)
+            for link, make in (("symbolic", os.symlink), ("hard", os.link)):
+                make(source, self.path(verb + link))
+            for target in (source, self.path(verb + "symbolic"), self.path(verb + "hard")):
+                with self.subTest(target=target):
+                    self.assertIn("is being read", self.expect_json(10, "log", verb, source, target)["error"]["text"])
+                    self.assertEqual(self.content(source), before)
 
     def test_events_are_shown_as_they_come_and_from_a_file(self):
         file, names = self.path("capture"), self.add("names", b"291,Band change\n")
