@@ -39,8 +39,24 @@ class Traces(ToolTest):
         with self.handset():
             self.expect_json(10, "-p", "7", "--trace", self.path("no", "folder"), "info")
             self.expect(2, "-p", "7", "--trace", self.path("a"), "--trace-on-failure", self.path("b"), "info")
+            for option in ("--trace", "--trace-on-failure"):
+                self.expect(2, "-p", "7", option, "", "info")
             failed = self.expect(7, "-p", "7", "--trace-on-failure", self.path("no", "folder"), "ftm", "chan", "1")
             self.assertIn("cannot be written", failed.err)
+
+    def test_nothing_shares_a_file_with_the_text_log(self):
+        kept = self.add("kept", b"kept")
+        os.symlink(kept, self.path("link"))
+        os.link(kept, self.path("other"))
+        os.mkdir(self.path("folder"))
+        with self.handset():
+            for words in (("--trace", "{}", "info"), ("--trace-on-failure", "{}", "info"), ("log", "capture", "{}")):
+                for log, file in ((kept, kept), (kept, self.path("link")), (kept, self.path("other")),
+                                  (self.path("new"), self.path("folder", "..", "new"))):
+                    with self.subTest(words=words, file=file):
+                        self.expect(2, "-p", "7", "--log", log, *(word.format(file) for word in words))
+        self.assertEqual(self.content("kept"), b"kept")
+        self.assertFalse(os.path.exists(self.path("new")))
 
     def test_many_handsets_have_a_trace_each(self):
         with fixture(2, self.folder) as (_, self.ports):

@@ -30,6 +30,10 @@ std::string VersionText() {
   return text.data();
 }
 
+std::string FaultOfTraceFile(const std::string& file) {
+  return file.empty() ? "a trace has a file" : "";
+}
+
 void AddCommonOptions(const Command& root, Context& context) {
   root.Flag("--all", context.all, "Every port on which a handset answers");
   root.Add("-p,--port", context.session.port,
@@ -45,10 +49,13 @@ void AddCommonOptions(const Command& root, Context& context) {
       .File()
       .Settled("log");
   root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F").Settled("log_flags");
-  root.Add("--trace", context.session.trace.file, "Write what passes over the port to this file, as pcapng").File();
+  root.Add("--trace", context.session.trace.file, "Write what passes over the port to this file, as pcapng")
+      .File()
+      .Check(FaultOfTraceFile);
   root.Add("--trace-on-failure", context.session.trace.file_on_failure,
            "Write the last of it to this file, if the command fails")
-      .File();
+      .File()
+      .Check(FaultOfTraceFile);
   root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
       .Between(1, kLongestTimeOutMs, "ms")
       .Settled("time_out");

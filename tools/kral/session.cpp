@@ -170,6 +170,8 @@ std::vector<std::uint16_t> ListPortsWithHandset() {
 
 Session::Session(const SessionOptions& options, Expected expected)
     : port_(0), handle_(0), exceptions_(std::uncaught_exceptions()) {
+  RefuseLogFile(options.log_file, options.trace.file, "the trace");
+  RefuseLogFile(options.log_file, options.trace.file_on_failure, "the trace");
   if (!options.log_file.empty()) log_file_ = OpenLogFile(options.log_file);
   KRAL_SetDefaultReceiveMode(KRAL_RECEIVE_MODE_WAKE);
   port_ = options.port.empty() ? TheOnlyPort(expected) : ParsePort(options.port);

@@ -2,6 +2,8 @@
 #include "tools/kral/session_trace.h"
 
 #include <exception>
+#include <filesystem>
+#include <system_error>
 
 #include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
@@ -16,6 +18,17 @@ constexpr std::uint32_t kKeptBytes = 8u << 20;
 // Each waits for a second; a disk that takes nothing for so long has gone.
 constexpr int kMostWaits = 30;
 
+// Also by way of links, and of a file that is yet to be made.
+bool IsOneFile(const std::string& one, const std::string& other) {
+  namespace fs = std::filesystem;
+  const auto path = [](const std::string& name) { return fs::absolute(std::u8string(name.begin(), name.end())); };
+  std::error_code error;
+  if (fs::equivalent(path(one), path(other), error)) return true;
+  std::error_code other_error;
+  const auto whole = fs::weakly_canonical(path(one), error);
+  return whole == fs::weakly_canonical(path(other), other_error) && !error && !other_error;
+}
+
 bool Stop(KRAL_HANDLE handle) {
   KRAL_TRACE_COUNTERS counters{};
   for (int i = 0; i < kMostWaits; ++i) {
@@ -26,6 +39,12 @@ bool Stop(KRAL_HANDLE handle) {
 }
 
 }  // namespace
+
+void RefuseLogFile(const std::string& log_file, const std::string& file, const char* what) {
+  if (log_file.empty() || file.empty() || !IsOneFile(log_file, file)) return;
+  throw ToolError(ExitCode::kUsage, Format("{} cannot be in the file of the text log, {}", what, file),
+                  "name another file than that of --log");
+}
 
 SessionTrace::SessionTrace(KRAL_HANDLE handle, const TraceOptions& options) : handle_(handle), options_(options) {
   if (!options.file.empty() && !options.file_on_failure.empty()) {

@@ -13,6 +13,9 @@ struct TraceOptions {
   std::string file_on_failure;
 };
 
+// ToolError when something else would be written to the file of the text log: each would destroy the other.
+void RefuseLogFile(const std::string& log_file, const std::string& file, const char* what);
+
 class SessionTrace {
  public:
   // ToolError when the file cannot be written, and when both are asked for.

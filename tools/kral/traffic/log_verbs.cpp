@@ -11,6 +11,7 @@
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/progress.h"
+#include "tools/kral/session_trace.h"
 #include "tools/kral/traffic/playback.h"
 #include "tools/kral/traffic/time_of_packet.h"
 #include "tools/kral/traffic/timeline.h"
@@ -171,6 +172,7 @@ KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
 
 void Capture(Context& context, LogOptions& options) {
   const auto codes = ParseIds(options.codes);
+  RefuseLogFile(context.session.log_file, options.file, "the capture");
   Session session(context.session);
   // First: the old recording stays as it is where a code is refused.
   SwitchCodes(session, codes, true);
