@@ -6,6 +6,7 @@
 #include <stdexcept>
 #include <utility>
 
+#include "handset/services/defined_check.h"
 #include "handset/services/defined_codec.h"
 #include "platform/file_util.h"
 #include "platform/xml_document.h"
@@ -185,8 +186,29 @@ void DefinedService::OnReset() {
 }
 
 void DefinedService::Set(const std::string& path, const std::string& value) {
+  std::string kept = Checked(path, value);
   const std::lock_guard lock(mutex_);
-  fixed_[path] = value;
+  fixed_[path] = std::move(kept);
+}
+
+std::string DefinedService::Checked(const std::string& path, const std::string& value) const {
+  const std::lock_guard lock(mutex_);
+  std::vector<std::shared_ptr<DefinedCommand>> commands;
+  for (const auto& known : plain_) commands.push_back(known.second);
+  for (const auto& mode : ftm_) {
+    for (const auto& known : mode.second) commands.push_back(known.second);
+  }
+  const std::string family = FamilyOf(path);
+  std::string fault = "no command of the family has a reply with this field";
+  for (const auto& command : commands) {
+    if (command->family + "." != family) continue;
+    try {
+      if (const auto kept = CheckedValue(command->reply, path.substr(family.size()), value)) return *kept;
+    } catch (const std::invalid_argument& error) {  // another command may have a field of the same name
+      fault = error.what();
+    }
+  }
+  throw std::invalid_argument(fault);
 }
 
 std::optional<std::string> DefinedService::Value(const std::string& path) const {

@@ -55,8 +55,11 @@ class DefinedService final : public Service {
   void Register(RequestTable& table) override;
   void OnReset() override;  // forgets what was set by requests
 
-  // "WLAN.power", "WLAN.points[0].power": for the replies to come, whatever requests say.
+  // "WLAN.power", "WLAN.points[0].power": for the replies to come, whatever requests say. Throws std::invalid_argument
+  // with the reason for what no reply of the family can hold.
   void Set(const std::string& path, const std::string& value);
+  // The same, but for the setting; gives the value as it would be kept.
+  std::string Checked(const std::string& path, const std::string& value) const;
   // What a request has set; nothing for none.
   std::optional<std::string> Value(const std::string& path) const;
 

@@ -52,7 +52,7 @@ class DefinedCommands(ToolTest):
             self.assertIn("channel=15 is out of range: 1 to 14", error["text"])
 
     def test_a_simulated_handset_answers_defined_commands(self):
-        script = self.add("script", b"set 1 WLAN.version=1\nset 1 WLAN.power=-12.5 # dBm\n")
+        script = self.add("script", b"set 1 WLAN.version=0x1\nset 1 WLAN.power=-12.5 # dBm\n")
         with self.handset("--commands", EXAMPLE, "--script", script):
             self.expect(0, "-p", "7", "mode", "ftm")
             def call(*words, code=0):
@@ -67,6 +67,12 @@ class DefinedCommands(ToolTest):
             error = self.ask(7, "cmd", "call", "SENSOR.READ", "sensor=8", "--defs", narrow)["error"]
             self.assertIn("with 20: a parameter is wrong", error["text"])
         self.expect(10, "sim", "--commands", self.add("none.xml", b"<x"))
+        for wrong in ("WLAM.power=1", "WLAN.powr=1", "WLAN.version=256", "WLAN.version=-1", "WLAN.version=1x",
+                      "WLAN.power=1e39", "WLAN.version[0]=1", "WLAN.points=1", "WLAN.points[0]=1",
+                      "WLAN.points[1a].power=1", "WLAN.points[0].power=32768", "SENSOR.name=" + "x" * 33):
+            with self.subTest(wrong=wrong):
+                script = self.add("script", f"set 1 {wrong}\nquit\n".encode())
+                self.assertIn(wrong, self.expect(2, "sim", "--commands", EXAMPLE, "--script", script).err)
 
     def test_the_header_compiles_as_c89_and_as_cpp(self):
         made = self.expect_json(0, "cmd", "header", EXAMPLE, RF, "--output", self.path("made.h"))

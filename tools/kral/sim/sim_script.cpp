@@ -6,6 +6,7 @@
 #include <fstream>
 #include <iostream>
 #include <mutex>
+#include <stdexcept>
 #include <thread>
 #include <utility>
 
@@ -21,21 +22,31 @@ using handset::VirtualHandset;
 // What is done to one handset, or to all.
 struct Deed {
   std::string_view name;
-  void (*check)(const std::string& words);  // of the words that it takes; null: it takes none
+  void (*check)(VirtualHandset& handset, const std::string& words);  // what it takes; null: nothing
   void (*act)(VirtualHandset& handset, const std::string& words);
 };
 
-void CheckFault(const std::string& words) {
+void CheckFault(VirtualHandset&, const std::string& words) {
   handset::FaultPlan unused;
   AddFault(unused, words);
 }
 
-void CheckAssignment(const std::string& words) {
+std::pair<std::string, std::string> AssignmentOf(const std::string& words) {
+  const auto equals = words.find('=');
+  return {words.substr(0, equals), equals == std::string::npos ? "" : words.substr(equals + 1)};
+}
+
+void CheckAssignment(VirtualHandset& handset, const std::string& words) try {
   const auto dot = words.find('.');
   if (dot == 0 || dot > words.find('=') || words.find('=') == std::string::npos) {
     throw ToolError(ExitCode::kUsage, Format("'{}' is not of the form FAMILY.FIELD=VALUE", words),
                     "for example WLAN.power=-12.5");
   }
+  const auto [path, value] = AssignmentOf(words);
+  handset.defined().Checked(path, value);
+} catch (const std::invalid_argument& error) {
+  throw ToolError(ExitCode::kUsage, Format("'{}': {}", words, error.what()),
+                  "kral cmd show tells the fields of a reply; --commands names the definition file");
 }
 
 constexpr std::array<Deed, 6> kDeeds{{
@@ -45,7 +56,8 @@ constexpr std::array<Deed, 6> kDeeds{{
     {"restart", nullptr, [](VirtualHandset& handset, const std::string&) { handset.Restart(); }},
     {"set", CheckAssignment,
      [](VirtualHandset& handset, const std::string& words) {
-       handset.defined().Set(words.substr(0, words.find('=')), words.substr(words.find('=') + 1));
+       const auto [path, value] = AssignmentOf(words);
+       handset.defined().Set(path, value);
      }},
     {"unplug", nullptr, [](VirtualHandset& handset, const std::string&) { handset.HangUp(); }},
 }};
@@ -89,7 +101,7 @@ struct SimCommand {
                   "kral sim --help lists the commands of --script");
 }
 
-SimCommand ParseCommand(const std::string& line, std::size_t count) {
+SimCommand ParseCommand(const std::string& line, SimFixture& fixture) {
   SimCommand command;
   auto rest = line;
   const auto name = TakeWord(rest);
@@ -107,9 +119,10 @@ SimCommand ParseCommand(const std::string& line, std::size_t count) {
     if (deed.name == name) command.deed = &deed;
   }
   if (command.deed == nullptr || (command.deed->check != nullptr) == rest.empty() ||
-      (number && (*number == 0 || *number > count)))
+      (number && (*number == 0 || *number > fixture.sockets().size())))
     Reject(line);
-  if (command.deed->check != nullptr) command.deed->check(rest);
+  // They all answer the same commands.
+  if (command.deed->check != nullptr) command.deed->check(fixture.sockets().front().handset(), rest);
   return command;
 }
 
@@ -135,7 +148,7 @@ SimScript::SimScript(const Output& out, SimFixture& fixture, const std::string& 
     if (!text) throw ToolError(ExitCode::kBadFile, Format("the script {} cannot be read", file), "check its name");
     for (std::string line; std::getline(text, line);) {
       lines_.push_back(Cleaned(line));
-      if (!lines_.back().empty()) ParseCommand(lines_.back(), fixture_.sockets().size());
+      if (!lines_.back().empty()) ParseCommand(lines_.back(), fixture_);
     }
   }
 }
@@ -157,7 +170,7 @@ bool SimScript::Run() {
 }
 
 bool SimScript::Do(const std::string& line) try {
-  const auto command = ParseCommand(line, fixture_.sockets().size());
+  const auto command = ParseCommand(line, fixture_);
   if (command.quits) return false;
   if (command.deed == nullptr) {
     wait_since_ = SystemClock().TickMs();
