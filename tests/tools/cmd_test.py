@@ -20,6 +20,15 @@ int main(void) {
 }
 """
 
+# Names that mean something to a compiler, to headers or to the text of a made header.
+WORDS = """and_eq or_eq xor_eq not_eq char8_t char16_t char32_t const_cast static_cast dynamic_cast reinterpret_cast
+thread_local co_await co_return co_yield consteval constinit asm typeof _Bool __func__ __LINE__ NULL uint8_t uint32_t
+int64_t size_t memset strlen INT8_MAX errno linux unix KRAL_API KRAL_HANDLE KRAL_CMD_Send kral_cmd_integer F_WORDS
+F_WORDS_REPLY F_CHOICE_F_W call done handle i reply a A _ __ done_""".split()
+ENUMERATIONS = """<Enumeration name="One"><Value name="w" value="1"/></Enumeration>
+<Enumeration name="Two"><Value name="a-b" value="1"/><Value name="a_b" value="2"/></Enumeration>"""
+LONG = "n" * 60
+
 
 class DefinedCommands(ToolTest):
     @staticmethod
@@ -77,10 +86,55 @@ class DefinedCommands(ToolTest):
     def test_the_header_compiles_as_c89_and_as_cpp(self):
         made = self.expect_json(0, "cmd", "header", EXAMPLE, RF, "--output", self.path("made.h"))
         self.assertEqual(made["left_out"], ["SENSOR.READ"])
-        self.add("program.c", PROGRAM.encode())
-        for compiler, standard in (("gcc", "c89"), ("gcc", "c11"), ("g++", "c++98"), ("g++", "c++20")):
+        self.check_compiles(PROGRAM)
+
+    def check_compiles(self, program):
+        self.add("program.c", program.encode())
+        for compiler, standard in (("gcc", "c89"), ("gcc", "gnu89"), ("gcc", "c11"), ("g++", "c++98"),
+                                   ("g++", "c++20")):
             language = "c++" if compiler == "g++" else "c"
             built = subprocess.run([compiler, "-x", language, f"-std={standard}", "-Wall", "-Wextra", "-Werror",
                                     "-pedantic", "-Wno-long-long", "-fsyntax-only", "-I", os.path.join(TREE, "include"),
                                     self.path("program.c")], capture_output=True, text=True, check=False)
             self.assertEqual((standard, built.returncode, built.stderr), (standard, 0, ""))
+
+    def test_names_in_the_header_meet_nothing_and_nothing_is_cut(self):
+        ids = iter(range(1000))
+
+        def fields(*names):
+            return "".join(f'<Field name="{name}" type="u8"/>' for name in names)
+
+        def group(name, kind, *inner, more=""):
+            return f'<Field name="{name}" type="{kind}" {more}>{"".join(inner)}</Field>'
+
+        def command(name, request="", reply=""):
+            return (f'<Command name="{name}" id="{next(ids)}"><Request>{request}</Request><Reply>{reply}</Reply>'
+                    "</Command>")
+
+        def family(name, *commands):
+            return f'<Family name="{name}" frame="subsystem" subsystem="250">{"".join(commands)}</Family>'
+
+        def choice(enumeration):
+            return f'<Field name="f" type="u8" enum="{enumeration}"/>'
+
+        deep = group(LONG + "a", "record", group(LONG + "b", "record", fields(LONG + "c1", LONG + "c2")))
+        packed = group("z", "zlib", '<Field name="b" type="bytes" size="20000"/>',
+                       '<Field name="l" type="u16" count="8000"/>', more='size="*"')
+        blocks = "".join(f'<Field name="b{i}" type="bytes" size="n"/>' for i in range(5))
+        definitions = ENUMERATIONS + family(
+            "F", command("WORDS", fields(*WORDS), fields(*WORDS)),
+            command("COUNTS", fields("points_count") + group("points", "record", fields("a", "count"),
+                                                             more='count="*" max_count="4"')),
+            command("X", "", fields("a")), command("X_REPLY"), command("CHOICE", choice("One")), command("CHOICE_F_W"),
+            command("TWO", choice("Two")), command("DEEP", deep, deep), command("PACKED", "", packed),
+            command("HUGE", "", group("z", "zlib", '<Field name="n" type="u16"/>', blocks, more='size="*"')),
+        ) + "".join(family(name, command(only)) for name, only in (
+            ("A_B", "C"), ("A", "B_C"), ("KRAL", "ConnectServer"), ("static", "cast"), ("int8", "t")))
+        file = self.add("names.xml", f"<CommandDefinition>{definitions}</CommandDefinition>".encode())
+        made = self.expect_json(0, "cmd", "header", file)
+        self.assertEqual(made["left_out"], ["F.X_REPLY", "F.CHOICE_F_W", "F.TWO", "F.HUGE", "A.B_C",
+                                            "KRAL.ConnectServer", "static.cast", "int8.t"])
+        for part in ("uint8_t z_b[20000];", "uint16_t z_l[8000];", f'"{LONG}a.{LONG}b.{LONG}c2"'):
+            self.assertIn(part, made["header"])
+        self.add("made.h", made["header"].encode())
+        self.check_compiles('#include "made.h"\nint main(void) { return 0; }\n')

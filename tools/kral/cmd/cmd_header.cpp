@@ -3,15 +3,22 @@
 
 #include <algorithm>
 #include <array>
-#include <cctype>
+#include <cstdint>
+#include <map>
+#include <set>
 #include <string_view>
+#include <utility>
 
+#include "tools/kral/cmd/c_names.h"
 #include "tools/kral/format.h"
 
 namespace kral::tool {
 namespace {
 
-constexpr std::uint32_t kMostInStruct = 6144;  // no reply is longer
+constexpr std::uint32_t kLongestReply = 6144;
+constexpr std::uint32_t kLongestContent = 64 << 10;  // of a zlib stream
+constexpr std::size_t kLargestStruct = 256 << 10;    // it may have to find room on a stack
+constexpr std::size_t kLongestPath = 509;            // what C89 promises to take as a text
 
 constexpr std::string_view kHelpers = R"(#include <kral/kral.h>
 #include <string.h>
@@ -81,61 +88,41 @@ KRAL_CMD_INLINE uint32_t kral_cmd_bytes(KRAL_HANDLE handle, uint32_t call, const
 // A field with a value, and what the groups around it make of it.
 struct Leaf {
   KRAL_CMD_FIELD field;
+  std::string path;   // whole: a record cuts it
+  std::string array;  // the path of the innermost array
   std::string name;   // of its parameter or member
-  std::string array;  // what the number of its elements is called after
+  std::string count;  // of the parameter that says how many elements there are
   unsigned arrays = 0;
   bool variable = false;  // the innermost array may have fewer elements
   bool conditional = false;
+  bool packed = false;  // in a zlib stream
   std::uint32_t elements = 1;
 };
 
-class Identifiers {
- public:
-  // Not one of the language, of the function itself, or given before.
-  std::string Take(std::string name) {
-    std::ranges::replace(name, '.', '_');
-    const auto is_taken = [this](const std::string& text) { return taken_.contains(text); };
-    while (is_taken(name) || is_taken(name + "_count") || is_taken(name + "_size")) name += '_';
-    taken_.insert({name, name + "_count", name + "_size"});
-    return name;
-  }
-
- private:
-  std::set<std::string> taken_ = {
-      "alignas",   "alignof",      "and",       "asm",       "auto",     "bitand",  "bitor",    "bool",
-      "break",     "call",         "case",      "catch",     "char",     "class",   "compl",    "concept",
-      "const",     "continue",     "count",     "decltype",  "default",  "delete",  "do",       "done",
-      "double",    "else",         "enum",      "explicit",  "export",   "extern",  "false",    "float",
-      "for",       "friend",       "goto",      "handle",    "i",        "if",      "inline",   "int",
-      "long",      "mutable",      "namespace", "new",       "noexcept", "not",     "nullptr",  "operator",
-      "or",        "private",      "public",    "protected", "register", "reply",   "requires", "restrict",
-      "return",    "short",        "signed",    "sizeof",    "static",   "struct",  "switch",   "template",
-      "this",      "throw",        "true",      "try",       "typedef",  "typeid",  "typename", "union",
-      "unsigned",  "using",        "virtual",   "void",      "volatile", "wchar_t", "while",    "xor",
-      "constexpr", "static_assert"};
+// A word of an enumeration.
+struct WordMacro {
+  std::string name;
+  std::int64_t value;
 };
 
 std::vector<Leaf> LeavesOf(const std::vector<KRAL_CMD_FIELD>& fields) {
   std::vector<Leaf> leaves;
   std::vector<Leaf> groups;  // around the field, the outermost first
-  Identifiers names;
   for (const KRAL_CMD_FIELD& field : fields) {
     groups.resize(std::min<std::size_t>(groups.size(), field.depth));
     Leaf leaf = groups.empty() ? Leaf{} : groups.back();
     leaf.field = field;
+    if (!leaf.path.empty()) leaf.path += '.';
+    leaf.path += field.name;
     if ((field.flags & KRAL_CMD_FIELD_ARRAY) != 0) {
       ++leaf.arrays;
-      leaf.array = field.path;
+      leaf.array = leaf.path;
       leaf.variable = (field.flags & KRAL_CMD_FIELD_VARIABLE) != 0;
       leaf.elements *= field.count;
     }
     leaf.conditional = leaf.conditional || (field.flags & KRAL_CMD_FIELD_CONDITIONAL) != 0;
-    if (field.index == KRAL_CMD_NO_INDEX) {
-      groups.push_back(leaf);
-      continue;
-    }
-    leaf.name = names.Take(field.path);
-    leaves.push_back(std::move(leaf));
+    leaf.packed = leaf.packed || field.kind == KRAL_CMD_KIND_ZLIB;
+    (field.index == KRAL_CMD_NO_INDEX ? groups : leaves).push_back(std::move(leaf));
   }
   return leaves;
 }
@@ -144,11 +131,23 @@ bool IsNumber(const Leaf& leaf) {
   return leaf.field.kind <= KRAL_CMD_KIND_REAL;
 }
 
-std::string TypeOf(const KRAL_CMD_FIELD& field) {
-  if (field.kind == KRAL_CMD_KIND_REAL) return field.bits == 32 ? "float" : "double";
+unsigned BitsInC(const KRAL_CMD_FIELD& field) {
   unsigned bits = 8;
   while (bits < field.bits) bits *= 2;
-  return Format("{}int{}_t", field.kind == KRAL_CMD_KIND_SIGNED ? "" : "u", bits);
+  return bits;
+}
+
+std::string TypeOf(const KRAL_CMD_FIELD& field) {
+  if (field.kind == KRAL_CMD_KIND_REAL) return field.bits == 32 ? "float" : "double";
+  return Format("{}int{}_t", field.kind == KRAL_CMD_KIND_SIGNED ? "" : "u", BitsInC(field));
+}
+
+// Elements of an array, or bytes of a text or block: all that a reply may hold, and no more than it has room for.
+std::uint32_t RoomOf(const Leaf& leaf) {
+  const std::uint32_t most = IsNumber(leaf) ? leaf.elements : leaf.field.room;
+  if (!leaf.packed) return std::min(most, kLongestReply);
+  const unsigned bytes = IsNumber(leaf) ? std::max(leaf.field.bits / 8, 1U) : 1;
+  return leaf.arrays > 1 ? most : std::min(most, kLongestContent / bytes);
 }
 
 // Of C: neither ends nor begins a comment.
@@ -158,39 +157,35 @@ std::string CommentText(std::string text) {
   return text;
 }
 
-std::string Macro(std::string text) {
-  for (char& character : text) {
-    const bool plain = std::isalnum(static_cast<unsigned char>(character)) != 0;
-    character = plain ? static_cast<char>(std::toupper(static_cast<unsigned char>(character))) : '_';
-  }
-  return text;
-}
-
 class FunctionWriter {
  public:
-  FunctionWriter(const Session& session, const DefinedCommand& command, std::set<std::string>& macros)
-      : session_(session),
-        command_(command),
-        macros_(macros),
+  FunctionWriter(const Session& session, const DefinedCommand& command)
+      : command_(command),
         request_(LeavesOf(FieldsOf(session, command, false))),
-        reply_(LeavesOf(FieldsOf(session, command, true))) {
+        reply_(LeavesOf(FieldsOf(session, command, true))),
+        name_(command.name) {
+    std::ranges::replace(name_, '.', '_');
     std::erase_if(request_, [](const Leaf& leaf) { return (leaf.field.flags & KRAL_CMD_FIELD_COUNTS) != 0; });
     // Texts in arrays have no place in a struct; KRAL_CMD_GetReply still gives them.
     std::erase_if(reply_, [](const Leaf& leaf) { return !IsNumber(leaf) && leaf.arrays > 0; });
-    name_ = command.name;
-    std::ranges::replace(name_, '.', '_');
+    FindWords(session, request_, false);
+    FindWords(session, reply_, true);
   }
 
-  // A parameter is always there, and has at most one dimension.
-  bool IsPossible() const {
-    return std::ranges::none_of(request_, [](const Leaf& leaf) {
-      return leaf.conditional || leaf.arrays > 1 || (leaf.arrays == 1 && !IsNumber(leaf));
-    });
+  // Takes the names that the command needs in the header; else why there is no function for it.
+  std::string Claim(HeaderNames& names) {
+    if (auto fault = Fault(names); !fault.empty()) return fault;
+    for (const auto& name : Things()) names.Add(name);
+    std::erase_if(words_, [&names](const WordMacro& word) { return !names.Add(word.name, word.value); });
+    return {};
   }
 
-  std::string Run() {
-    WriteWords(request_, false);
-    WriteWords(reply_, true);
+  // When all commands have their names.
+  std::string Run(const HeaderNames& names) {
+    NameParameters(names);
+    LocalNames members(names, {name_, ReplyName()});
+    for (Leaf& leaf : reply_) leaf.name = members.Take(leaf.path);
+    for (const auto& [name, value] : words_) text_ += Format("#define {} ((int64_t){})\n", name, Number(value));
     WriteStruct();
     WriteComment();
     WriteHead();
@@ -199,16 +194,64 @@ class FunctionWriter {
   }
 
  private:
-  void WriteWords(const std::vector<Leaf>& leaves, bool of_reply) {
+  std::string ReplyName() const { return name_ + "_REPLY"; }
+  // The function and the struct.
+  std::vector<std::string> Things() const {
+    return reply_.empty() ? std::vector{name_} : std::vector{name_, ReplyName()};
+  }
+
+  void FindWords(const Session& session, const std::vector<Leaf>& leaves, bool of_reply) {
     std::array<char, 256> word{};
     for (const Leaf& leaf : leaves) {
       std::int64_t value = 0;
-      for (std::uint32_t i = 0; KRAL_CMD_GetWord(session_.handle(), command_.name.c_str(), of_reply ? 1 : 0,
+      for (std::uint32_t i = 0; KRAL_CMD_GetWord(session.handle(), command_.name.c_str(), of_reply ? 1 : 0,
                                                  leaf.field.index, i, word.data(), word.size(), &value) != 0;
            ++i) {
-        const auto name = Macro(Format("{}_{}{}_{}", name_, of_reply ? "REPLY_" : "", leaf.field.path, word.data()));
-        if (macros_.insert(name).second) text_ += Format("#define {} ((int64_t){})\n", name, Number(value));
+        words_.push_back(
+            {MacroName(Format("{}_{}{}_{}", name_, of_reply ? "REPLY_" : "", leaf.path, word.data())), value});
       }
+    }
+  }
+
+  std::string Fault(const HeaderNames& names) const {
+    // A parameter is always there, and has at most one dimension.
+    const auto is_no_parameter = [](const Leaf& leaf) {
+      return leaf.conditional || leaf.arrays > 1 || (leaf.arrays == 1 && !IsNumber(leaf));
+    };
+    if (std::ranges::any_of(request_, is_no_parameter)) return "no parameters can stand for its fields";
+    const auto is_long = [](const Leaf& leaf) { return leaf.path.size() > kLongestPath; };
+    if (std::ranges::any_of(request_, is_long) || std::ranges::any_of(reply_, is_long)) {
+      return Format("a field has a path of more than {} characters", kLongestPath);
+    }
+    std::size_t size = 0;
+    for (const Leaf& leaf : reply_) {
+      size += IsNumber(leaf) ? std::size_t{BitsInC(leaf.field) / 8} * std::max(RoomOf(leaf), 1U) : RoomOf(leaf);
+    }
+    if (size > kLargestStruct) return Format("its reply may take {} bytes, which max_count or max_size limit", size);
+    return FaultOfNames(names);
+  }
+
+  std::string FaultOfNames(const HeaderNames& names) const {
+    HeaderNames own;
+    for (const auto& name : Things()) {
+      if (!names.MayAdd(name)) return Format("{} has a meaning already", name);
+      own.Add(name);
+    }
+    for (const auto& [name, value] : words_) {
+      if (!own.MayAdd(name, value) || !names.MayAdd(name, value)) return Format("{} would mean two things", name);
+      own.Add(name, value);
+    }
+    return {};
+  }
+
+  void NameParameters(const HeaderNames& header) {
+    LocalNames names(header, {name_, ReplyName()});
+    std::map<std::string, std::string> records;  // those that are arrays
+    for (Leaf& leaf : request_) {
+      const bool in_records = leaf.variable && leaf.array != leaf.path;
+      if (in_records && !records.contains(leaf.array)) records.emplace(leaf.array, names.Take(leaf.array));
+      leaf.name = names.Take(leaf.path);
+      if (leaf.variable) leaf.count = Format("{}_count", in_records ? records[leaf.array] : leaf.name);
     }
   }
 
@@ -220,26 +263,24 @@ class FunctionWriter {
 
   void WriteStruct() {
     if (reply_.empty()) return;
-    text_ += Format("typedef struct {}_REPLY {{\n", name_);
+    text_ += Format("typedef struct {} {{\n", ReplyName());
     for (const Leaf& leaf : reply_) {
       const auto& name = leaf.name;
       if (!IsNumber(leaf)) {
         const bool is_text = leaf.field.kind == KRAL_CMD_KIND_TEXT;
-        const auto room = std::min(leaf.field.room, kMostInStruct) + (is_text ? 1 : 0);
+        const auto room = RoomOf(leaf) + (is_text ? 1 : 0);
         text_ += Format("  {} {}[{}];", is_text ? "char" : "uint8_t", name, room);
         if (!is_text) text_ += Format("\n  uint32_t {}_size;", name);
       } else if (leaf.arrays > 0) {
-        text_ += Format("  {} {}[{}];\n  uint32_t {}_count;", TypeOf(leaf.field), name, Room(leaf), name);
+        text_ += Format("  {} {}[{}];\n  uint32_t {}_count;", TypeOf(leaf.field), name, RoomOf(leaf), name);
       } else {
         text_ += Format("  {} {};", TypeOf(leaf.field), name);
         if (leaf.conditional) text_ += Format("\n  uint32_t {}_count;", name);
       }
       text_ += leaf.field.unit[0] != '\0' ? Format(" /* {} */\n", CommentText(leaf.field.unit)) : "\n";
     }
-    text_ += Format("}} {}_REPLY;\n\n", name_);
+    text_ += Format("}} {};\n\n", ReplyName());
   }
-
-  static std::uint32_t Room(const Leaf& leaf) { return std::min(leaf.elements, kMostInStruct); }
 
   void WriteComment() {
     text_ += Format("/* {}{}{}\n", command_.name, command_.record.documentation[0] != '\0' ? ": " : "",
@@ -268,18 +309,14 @@ class FunctionWriter {
         text_ += Format(", {} {}", TypeOf(leaf.field), leaf.name);
       } else {
         text_ += Format(", const {}* {}", TypeOf(leaf.field), leaf.name);
-        if (leaf.variable && counts.insert(leaf.array).second) text_ += Format(", uint32_t {}", CountOf(leaf));
+        if (leaf.variable && counts.insert(leaf.count).second) text_ += Format(", uint32_t {}", leaf.count);
       }
     }
-    if (!reply_.empty()) text_ += Format(", {}_REPLY* reply", name_);
+    if (!reply_.empty()) text_ += Format(", {}* reply", ReplyName());
     text_ += ") {\n";
   }
 
-  static std::string CountOf(const Leaf& leaf) {
-    std::string name = leaf.array;
-    std::ranges::replace(name, '.', '_');
-    return leaf.variable ? name + "_count" : Format("{}", leaf.elements);
-  }
+  static std::string CountOf(const Leaf& leaf) { return leaf.variable ? leaf.count : Format("{}", leaf.elements); }
 
   void WriteBody() {
     const auto is_array = [](const Leaf& leaf) { return leaf.arrays > 0; };
@@ -298,7 +335,7 @@ class FunctionWriter {
   }
 
   void WriteSet(const Leaf& leaf) {
-    const std::string_view path = leaf.field.path;
+    const auto& path = leaf.path;
     const auto& name = leaf.name;
     if (leaf.field.kind == KRAL_CMD_KIND_TEXT) {
       text_ += Format(
@@ -319,7 +356,7 @@ class FunctionWriter {
   }
 
   void WriteGet(const Leaf& leaf) {
-    const std::string_view path = leaf.field.path;
+    const auto& path = leaf.path;
     const auto& name = leaf.name;
     if (leaf.field.kind == KRAL_CMD_KIND_TEXT) {
       text_ += Format("    kral_cmd_bytes(handle, call, \"{}\", reply->{}, sizeof reply->{} - 1);\n", path, name, name);
@@ -336,7 +373,7 @@ class FunctionWriter {
                     element);
     };
     if (leaf.arrays > 0 || leaf.conditional) {
-      text_ += Format("    reply->{}_count = kral_cmd_elements(handle, call, \"{}\", {});\n", name, path, Room(leaf));
+      text_ += Format("    reply->{}_count = kral_cmd_elements(handle, call, \"{}\", {});\n", name, path, RoomOf(leaf));
     }
     if (leaf.arrays > 0) {
       text_ += Format("    for (i = 0; i < reply->{}_count; ++i) reply->{}[i] = {}", name, name, value("i"));
@@ -345,12 +382,11 @@ class FunctionWriter {
     }
   }
 
-  const Session& session_;
   const DefinedCommand& command_;
-  std::set<std::string>& macros_;
   std::vector<Leaf> request_;
   std::vector<Leaf> reply_;
   std::string name_;
+  std::vector<WordMacro> words_;
   std::string text_;
 };
 
@@ -358,24 +394,26 @@ class FunctionWriter {
 
 CmdHeader MakeCmdHeader(const Session& session, const std::string& name) {
   CmdHeader header;
-  const auto guard = "KRAL_COMMANDS_" + Macro(name);
+  const auto guard = MacroName("KRAL_COMMANDS_" + name);
   header.text = Format(
       "/* Made by kral cmd header. The definition file must be loaded (KRAL_CMD_LoadDefinitions). */\n"
       "#ifndef {}\n#define {}\n\n",
       guard, guard);
   header.text += kHelpers;
   header.text += '\n';
-  std::set<std::string> macros;
-  for (const auto& command : ListCommands(session)) {
-    FunctionWriter writer(session, command, macros);
-    if (writer.IsPossible()) {
-      header.text += writer.Run();
+  const auto commands = ListCommands(session);
+  HeaderNames names;
+  std::vector<FunctionWriter> writers;
+  for (const auto& command : commands) {
+    FunctionWriter writer(session, command);
+    if (const auto fault = writer.Claim(names); fault.empty()) {
+      writers.push_back(std::move(writer));
     } else {
-      header.left_out.push_back(command.name);
-      header.text += Format(
-          "/* {} is left out: no parameters can stand for its fields. KRAL_CMD_Call takes them. */\n\n", command.name);
+      header.left_out.push_back({command.name, fault});
+      header.text += Format("/* {} is left out: {}. KRAL_CMD_Call takes it. */\n\n", command.name, fault);
     }
   }
+  for (auto& writer : writers) header.text += writer.Run(names);
   header.text += "#endif\n";
   return header;
 }

@@ -2,7 +2,6 @@
 #ifndef KRAL_TOOLS_CMD_CMD_HEADER_H
 #define KRAL_TOOLS_CMD_CMD_HEADER_H
 
-#include <set>
 #include <string>
 #include <vector>
 
@@ -10,9 +9,15 @@
 
 namespace kral::tool {
 
+// A command for which there is no function.
+struct LeftOut {
+  std::string command;
+  std::string why;
+};
+
 struct CmdHeader {
   std::string text;
-  std::vector<std::string> left_out;  // commands whose fields no parameters can stand for
+  std::vector<LeftOut> left_out;
 };
 
 // For all commands of the connection. `name` is the header's, without folders.

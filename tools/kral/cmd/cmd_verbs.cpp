@@ -128,9 +128,9 @@ void WriteHeader(const Context& context, const HeaderOptions& options) {
   const auto& name = options.output.empty() ? options.files.front() : options.output;
   const auto header = MakeCmdHeader(session, name.substr(name.find_last_of("/\\") + 1));
   Json left_out = Json::array();
-  for (const auto& command : header.left_out) {
+  for (const auto& [command, why] : header.left_out) {
     left_out.push_back(command);
-    context.out.Note(Format("{} is left out: no parameters can stand for its fields", command));
+    context.out.Note(Format("{} is left out: {}", command, why));
   }
   if (options.output.empty()) return context.out.Result({{"header", header.text}, {"left_out", left_out}}, header.text);
   const std::vector<std::uint8_t> bytes(header.text.begin(), header.text.end());
