@@ -16,9 +16,9 @@ namespace {
 
 using namespace kral;
 using bench::Cable;
+using bench::Microseconds;
 using bench::Percentile;
 using bench::Station;
-using std::chrono::steady_clock;
 
 constexpr int kPort = 230;
 constexpr int kTurns = 40;
@@ -34,13 +34,6 @@ bool LoadInto(KRAL_HANDLE handle) {
   const bool loaded = KRAL_CMD_LoadDefinitions(handle, path.c_str(), nullptr) != 0;
   std::filesystem::remove(path);
   return loaded;
-}
-
-template <class Call>
-double Microseconds(const Call& call) {
-  const auto start = steady_clock::now();
-  if (!call()) return -1;
-  return std::chrono::duration<double, std::micro>(steady_clock::now() - start).count();
 }
 
 // By turns with the written function, so that what else the machine does falls on both.

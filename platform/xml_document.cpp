@@ -79,18 +79,22 @@ bool CountInFront(const XmlElement& at, const XmlElement& element, size_t& count
   return std::ranges::any_of(at.children, [&](const XmlElement& child) { return CountInFront(child, element, count); });
 }
 
+// Where a comment, a section of plain characters or an instruction ends; nothing where none begins.
+std::optional<size_t> EndOfAside(const Markup& markup, size_t at) {
+  if (markup.StartsAt(at, "<!--")) return markup.EndOf("-->", at + 4);
+  if (markup.StartsAt(at, "<![CDATA[")) return markup.EndOf("]]>", at);
+  if (markup.StartsAt(at, "<?")) return markup.EndOf("?>", at);
+  return std::nullopt;
+}
+
 }  // namespace
 
 bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem) {
   const Markup markup(document);
   for (size_t at = 0; at < markup.size(); ++at) {
     if (markup[at] != '<') continue;
-    if (markup.StartsAt(at, "<!--")) {
-      at = markup.EndOf("-->", at + 4);
-    } else if (markup.StartsAt(at, "<![CDATA[")) {
-      at = markup.EndOf("]]>", at);
-    } else if (markup.StartsAt(at, "<?")) {
-      at = markup.EndOf("?>", at);
+    if (const auto aside = EndOfAside(markup, at)) {
+      at = *aside;
     } else if (const auto end = EndOfTag(markup, at)) {
       at = *end;
     } else {
@@ -116,12 +120,8 @@ uint32_t LineOf(std::span<const uint8_t> document, const XmlElement& root, const
   for (size_t at = 0; at < markup.size(); ++at) {
     if (markup[at] != '<') continue;
     count_to(at);
-    if (markup.StartsAt(at, "<!--")) {
-      at = markup.EndOf("-->", at + 4);
-    } else if (markup.StartsAt(at, "<![CDATA[")) {
-      at = markup.EndOf("]]>", at);
-    } else if (markup.StartsAt(at, "<?")) {
-      at = markup.EndOf("?>", at);
+    if (const auto aside = EndOfAside(markup, at)) {
+      at = *aside;
     } else if (!markup.StartsAt(at, "</") && in_front-- == 0) {
       return line;
     } else {

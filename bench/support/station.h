@@ -20,6 +20,14 @@ namespace kral::bench {
 
 enum class Cable { kPty, kPolled, kNotifying, kWaiting };
 
+// Of one call, which says whether it succeeded; negative when it did not.
+template <class Call>
+double Microseconds(const Call& call) {
+  const auto start = std::chrono::steady_clock::now();
+  if (!call()) return -1;
+  return std::chrono::duration<double, std::micro>(std::chrono::steady_clock::now() - start).count();
+}
+
 class Station {
  public:
   Station(int port, Cable cable, uint8_t receive_mode) : port_(port), is_notifying_(cable == Cable::kNotifying) {
@@ -50,14 +58,12 @@ class Station {
   KRAL_HANDLE handle() const { return handle_; }
   handset::VirtualHandset& phone() { return phone_; }
 
-  // Microseconds of one request and its reply; negative without one.
+  // One request and its reply, in microseconds; negative without one.
   double RoundTrip() const {
     const uint8_t request = 0;
     std::array<uint8_t, 256> response;
     uint16_t size = response.size();
-    const auto start = std::chrono::steady_clock::now();
-    if (KRAL_SendSync(handle_, 1, &request, &size, response.data(), 1000) == 0) return -1;
-    return std::chrono::duration<double, std::micro>(std::chrono::steady_clock::now() - start).count();
+    return Microseconds([&] { return KRAL_SendSync(handle_, 1, &request, &size, response.data(), 1000) != 0; });
   }
 
  private:

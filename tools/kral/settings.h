@@ -34,7 +34,7 @@ inline constexpr std::array<Setting, 7> kSettings{{
 
 struct Settled {
   std::vector<std::string> words;  // as on a command line
-  std::string source;              // "KRAL_PORT", "/home/me/.config/kral/config.toml, line 3"
+  std::string source;              // "KRAL_PORT", "~/.config/kral/config.toml, line 3"
   ExitCode fault;                  // what a value is that cannot be used
 };
 
