@@ -1,4 +1,4 @@
-# How every target is compiled: language level, warnings, sanitizers, and the 32-bit Windows baseline.
+# How every target is compiled: language level, warnings, sanitizers, and the baseline of each machine.
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
 set(CMAKE_CXX_EXTENSIONS OFF)
@@ -42,9 +42,11 @@ endif()
 
 if(WIN32)
   set(KRAL_PLATFORM win32)
-  # SSE2 is the baseline, and SSE arithmetic gives the same doubles as on 64-bit Linux. Callers may keep
-  # only 4-byte stack alignment, hence -mstackrealign.
-  add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
+  if(CMAKE_SIZEOF_VOID_P EQUAL 4)
+    # SSE2 is the baseline, and SSE arithmetic gives the same doubles as with 64 bits, where both are the rule. Callers
+    # may keep only 4-byte stack alignment, hence -mstackrealign.
+    add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
+  endif()
   add_compile_definitions(_WIN32_WINNT=0x0601 WIN32_LEAN_AND_MEAN NOMINMAX __USE_MINGW_ANSI_STDIO=1)
   # The runtimes are linked in: every program and the DLL are one file.
   add_link_options(-static)

@@ -14,8 +14,16 @@ if(WIN32)
   enable_language(RC)
   configure_file(cmake/kral.rc.in ${CMAKE_CURRENT_BINARY_DIR}/kral.rc @ONLY)
   target_sources(kral PRIVATE ${CMAKE_CURRENT_BINARY_DIR}/kral.rc)
+  if(CMAKE_SIZEOF_VOID_P EQUAL 4)
+    set(base 0x63000000)
+    set(machine i386)
+  else()
+    # Above 4 GiB, so that a pointer that was cut to 32 bits leads nowhere.
+    set(base 0x263000000)
+    set(machine i386:x86-64)
+  endif()
   # A fixed base and no time stamp: two builds of one tree give the same bytes.
-  target_link_options(kral PRIVATE -Wl,--image-base=0x63000000 -Wl,--no-insert-timestamp
+  target_link_options(kral PRIVATE -Wl,--image-base=${base} -Wl,--no-insert-timestamp
     -Wl,--output-def=${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def)
 
   # Visual C++ links through a short-form import library of its own. The ordinals are left out of it: they change
@@ -25,7 +33,7 @@ if(WIN32)
   add_custom_command(TARGET kral POST_BUILD
     COMMAND ${CMAKE_COMMAND} -DINPUT=${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def
       -DOUTPUT=${CMAKE_CURRENT_BINARY_DIR}/kral.def -P ${PROJECT_SOURCE_DIR}/cmake/StripOrdinals.cmake
-    COMMAND ${KRAL_DLLTOOL} -m i386 -k -d kral.def -l ${KRAL_MSVC_IMPORT_LIBRARY}
+    COMMAND ${KRAL_DLLTOOL} -m ${machine} -k -d kral.def -l ${KRAL_MSVC_IMPORT_LIBRARY}
     WORKING_DIRECTORY ${CMAKE_CURRENT_BINARY_DIR}
     BYPRODUCTS ${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def ${CMAKE_CURRENT_BINARY_DIR}/kral.def
       ${KRAL_MSVC_IMPORT_LIBRARY}

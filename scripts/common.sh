@@ -40,7 +40,7 @@ machine_sources() {
       print type, $2, $3, $4 }'
 }
 
-# What every build needs, and what the 32-bit Windows platform needs beside it.
+# What every build needs.
 build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev
   libtomlplusplus-dev python3 python3-pycparser libxml2-utils srecord libgsf-bin python3-olefile)
 # What the checks of the sources need.
@@ -52,5 +52,6 @@ language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy 
   python3-setuptools python3-venv python3-wheel)
 # What reads traces.
 trace_packages=(tshark)
-windows_packages=(g++-mingw-w64-i686-posix libz-mingw-w64-dev llvm)
+# What the Windows platform needs beside it, of 32 and of 64 bits.
+windows_packages=(g++-mingw-w64-i686-posix g++-mingw-w64-x86-64-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)
