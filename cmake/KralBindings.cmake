@@ -35,11 +35,11 @@ add_custom_command(OUTPUT ${KRAL_BINDINGS_DIR}/Kral.cs ${KRAL_PYTHON_PACKAGE_DIR
 add_custom_target(kral_bindings ALL DEPENDS ${KRAL_BINDINGS_DIR}/Kral.cs ${KRAL_PYTHON_PACKAGE_DIR}/kral/_api.py)
 
 install(FILES ${KRAL_BINDINGS_DIR}/Kral.cs ${KRAL_BINDINGS_DIR}/kral_labview.h
-  DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
-install(DIRECTORY ${PROJECT_SOURCE_DIR}/share/kral/commands DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/kral COMPONENT development)
 if(WIN32)
   set(python_folder python)
 else()
   set(python_folder lib/python3/dist-packages)
 endif()
-install(DIRECTORY ${KRAL_PYTHON_PACKAGE_DIR}/kral DESTINATION ${python_folder} PATTERN __pycache__ EXCLUDE)
+install(DIRECTORY ${KRAL_PYTHON_PACKAGE_DIR}/kral DESTINATION ${python_folder} COMPONENT python
+  PATTERN __pycache__ EXCLUDE)

@@ -1,32 +1,45 @@
-# Installation and packages: headers, library, tool, CMake package and pkg-config file; a .deb and a Windows zip.
+# Installation and packages: headers, library, tool, CMake package and pkg-config file; the .debs and a Windows zip.
+# Each file belongs to a component, which on Linux is a package of its own (KralDebian.cmake).
 include(CMakePackageConfigHelpers)
 
 install(TARGETS kral EXPORT kralTargets
-  RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR}
-  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
-  ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
+  RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT library
+  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT library NAMELINK_COMPONENT development
+  ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development)
 if(WIN32)
-  install(FILES ${KRAL_MSVC_IMPORT_LIBRARY} DESTINATION ${CMAKE_INSTALL_LIBDIR})
+  install(FILES ${KRAL_MSVC_IMPORT_LIBRARY} DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development)
 endif()
 if(TARGET kral_tool)
-  install(TARGETS kral_tool RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+  install(TARGETS kral_tool RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT tool)
+  if(NOT WIN32)
+    # There the loader finds the library by itself, in whatever folder the system has it.
+    install(CODE [[
+      if(CMAKE_INSTALL_PREFIX MATCHES "(^|/)usr/?$")
+        file(RPATH_REMOVE FILE "$ENV{DESTDIR}${CMAKE_INSTALL_PREFIX}/bin/kral")
+      endif()]] COMPONENT tool)
+    install(FILES packaging/60-kral.rules DESTINATION lib/udev/rules.d COMPONENT tool)
+  endif()
 endif()
-install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h*")
-install(DIRECTORY share/kral/wireshark DESTINATION ${CMAKE_INSTALL_DATADIR}/kral)
+install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT development
+  FILES_MATCHING PATTERN "*.h*")
+install(DIRECTORY share/kral/wireshark share/kral/commands DESTINATION ${CMAKE_INSTALL_DATADIR}/kral COMPONENT tool)
 
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/kral)
-install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder})
+install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder} COMPONENT development)
 configure_package_config_file(cmake/kralConfig.cmake.in ${PROJECT_BINARY_DIR}/package/kralConfig.cmake
   INSTALL_DESTINATION ${package_folder} PATH_VARS CMAKE_INSTALL_LIBDIR)
 write_basic_package_version_file(${PROJECT_BINARY_DIR}/package/kralConfigVersion.cmake
   COMPATIBILITY SameMajorVersion)
+# The package may be moved as a whole: all is found from where the file itself is.
+file(RELATIVE_PATH KRAL_PC_PREFIX /prefix/${CMAKE_INSTALL_LIBDIR}/pkgconfig /prefix)
 configure_file(cmake/kral.pc.in ${PROJECT_BINARY_DIR}/package/kral.pc @ONLY)
 install(FILES ${PROJECT_BINARY_DIR}/package/kralConfig.cmake ${PROJECT_BINARY_DIR}/package/kralConfigVersion.cmake
-  DESTINATION ${package_folder})
-install(FILES ${PROJECT_BINARY_DIR}/package/kral.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+  DESTINATION ${package_folder} COMPONENT development)
+install(FILES ${PROJECT_BINARY_DIR}/package/kral.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig
+  COMPONENT development)
 
 set(CPACK_PACKAGE_NAME kral)
-set(CPACK_PACKAGE_CONTACT "The kral developers <kral@localhost>")
+set(CPACK_PACKAGE_CONTACT "The kral developers <developers@kral.invalid>")
 set(CPACK_PACKAGE_VENDOR kral)
 set(CPACK_STRIP_FILES ON)
 set(CPACK_VERBATIM_VARIABLES ON)
@@ -38,13 +51,6 @@ if(WIN32)
   endif()
   set(CPACK_PACKAGE_FILE_NAME kral-${PROJECT_VERSION}-windows-${machine})
 else()
-  set(CPACK_GENERATOR DEB)
-  set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
-  set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
-  set(CPACK_DEBIAN_PACKAGE_SECTION libdevel)
-  set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-  # The dynamic loader learns of the library when it is installed.
-  file(WRITE ${PROJECT_BINARY_DIR}/package/triggers "activate-noawait ldconfig\n")
-  set(CPACK_DEBIAN_PACKAGE_CONTROL_EXTRA ${PROJECT_BINARY_DIR}/package/triggers)
+  include(KralDebian)
 endif()
 include(CPack)

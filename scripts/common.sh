@@ -52,6 +52,8 @@ language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy 
   python3-setuptools python3-venv python3-wheel)
 # What reads traces.
 trace_packages=(tshark)
+# What makes the packages whole (man pages, reference), and tries them.
+package_packages=(lintian man-db mmdebstrap util-linux)
 # What the Windows platform needs beside it, of 32 and of 64 bits.
 windows_packages=(g++-mingw-w64-i686-posix g++-mingw-w64-x86-64-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)
