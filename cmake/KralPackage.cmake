@@ -18,6 +18,20 @@ if(TARGET kral_tool)
         file(RPATH_REMOVE FILE "$ENV{DESTDIR}${CMAKE_INSTALL_PREFIX}/bin/kral")
       endif()]] COMPONENT tool)
     install(FILES packaging/60-kral.rules DESTINATION lib/udev/rules.d COMPONENT tool)
+    # The tool itself writes its manual pages.
+    set(man_folder ${PROJECT_BINARY_DIR}/package/man1)
+    add_custom_command(OUTPUT ${man_folder}/kral.1.gz
+      COMMAND ${CMAKE_COMMAND} -E rm -rf ${man_folder}
+      COMMAND ${CMAKE_COMMAND} -E make_directory ${man_folder}
+      # With folders of whoever reads them, not of whoever builds.
+      COMMAND ${CMAKE_COMMAND} -E env --unset=KRAL_CONFIG --unset=XDG_CONFIG_HOME HOME=~
+        ${CMAKE_CROSSCOMPILING_EMULATOR} $<TARGET_FILE:kral_tool> help --man ${man_folder}
+      COMMAND gzip --best --no-name --recursive ${man_folder}
+      DEPENDS kral_tool
+      COMMENT "Writing the manual pages"
+      VERBATIM)
+    add_custom_target(kral_man ALL DEPENDS ${man_folder}/kral.1.gz)
+    install(DIRECTORY ${man_folder} DESTINATION ${CMAKE_INSTALL_MANDIR} COMPONENT tool)
   endif()
 endif()
 install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT development

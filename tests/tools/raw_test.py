@@ -130,6 +130,14 @@ class Failures(ToolTest):
             with self.subTest(words=words):
                 self.assertRegex(page, rf"\n  kral (-\S+ (\d+ )?)*{' '.join(words)}\b")
                 self.assertNotRegex(page, r" in \[|INT|FLOAT|:\{")
+        self.expect(0, "help", "--man", self.path("."))
+        for words, page in pages.items():
+            with self.subTest(manual=words), open(self.path(f"kral-{words[0]}.1"), encoding="utf-8") as file:
+                manual = file.read().replace("\\-", "-").replace("\\&", "")
+                options = page.partition("Options:")[2].partition("\n\n")[0]
+                for about in re.findall(r"(?m)^(?:  -[^h].*| +)  (\S.*)$", options):
+                    self.assertIn(f"\n{about.rstrip('.')}.\n", manual)
+        self.expect(10, "help", "--man", self.path("nowhere"))
         self.assertIn("--time-out 1-3600000 ms", self.expect(0, "help").out)
         self.assertEqual(self.expect_json(0, "--version")["version"] + "\n", self.expect(0, "--version").out)
 

@@ -17,6 +17,7 @@
 
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/man_pages.h"
 #include "tools/kral/nearest_word.h"
 #include "tools/kral/settings.h"
 
@@ -272,6 +273,38 @@ void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
   std::cout << place.app->get_formatter()->make_help(place.app, TitleOf(*place.app), CLI::AppFormatMode::Normal);
 }
 
+// --- As text --------------------------------------------------------------------------------------------------------
+
+using Examples = std::map<const CLI::App*, std::vector<std::string>>;
+
+std::string FooterOf(const std::vector<std::string>& examples) {
+  return examples.empty() ? "" : Format("Examples:\n  {}\n", Joined(examples, "\n  "));
+}
+
+ParameterText TextOf(const CLI::Option& option) {
+  const bool has_value = option.get_items_expected_max() > 0;
+  const auto& standard = option.get_default_str();
+  return {option.get_name(option.get_positional(), true),
+          has_value ? option.get_type_name() + (standard.empty() ? "" : "=" + standard) : "", option.get_description(),
+          option.get_required(), option.get_items_expected_max() > 1};
+}
+
+CommandText TextOf(const CLI::App& app, const Examples& examples) {
+  CommandText text{app.get_name(), app.get_description(), NeedsVerb(app), {}, {}, app.get_footer(), {}, {}};
+  if (const auto found = examples.find(&app); found != examples.end()) {
+    text.examples = found->second;
+    text.explanation.resize(text.explanation.size() - FooterOf(text.examples).size());
+  }
+  for (const auto* option : app.get_options()) {
+    if (option == app.get_help_ptr() && app.get_parent() != nullptr) continue;  // the same everywhere
+    (option->nonpositional() ? text.options : text.arguments).push_back(TextOf(*option));
+  }
+  for (const auto* verb : app.get_subcommands([](const CLI::App*) { return true; })) {
+    text.verbs.push_back(TextOf(*verb, examples));
+  }
+  return text;
+}
+
 }  // namespace
 
 // --- Options --------------------------------------------------------------------------------------------------------
@@ -490,7 +523,7 @@ struct CommandLine::Parser {
 
   CLI::App app;
   Chosen chosen;
-  std::map<CLI::App*, std::string> examples;
+  Examples examples;
 };
 
 CommandLine::CommandLine(const std::string& program, const std::string& description,
@@ -499,10 +532,15 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
   parser_->app.set_version_flag("--version", std::move(version));
   parser_->app.require_subcommand(1);
   const auto words = std::make_shared<std::vector<std::string>>();
+  const auto man = std::make_shared<std::string>();
   const auto help = root().Verb("help", "Print the help of a verb");
   help.NeedsNoHandset();
   help.Add("verb", *words, "Noun and verb");
-  help.Run([parser = parser_.get(), words] { PrintHelp(parser->app, *words); });
+  help.Add("--man", *man, "Write manual pages of the same text into this folder");
+  help.Run([parser = parser_.get(), words, man] {
+    if (man->empty()) return PrintHelp(parser->app, *words);
+    WriteManPages(TextOf(parser->app, parser->examples), *man);
+  });
 }
 
 CommandLine::~CommandLine() = default;
@@ -516,9 +554,9 @@ void CommandLine::Example(const std::string& words) {
   list.erase(list.begin());
   const auto place = Follow(parser_->app, list);
   if (!place.unknown.empty() || NeedsVerb(*place.app)) throw std::logic_error("no example: " + words);
-  auto& text = parser_->examples[place.app];
-  text += Format("{}  {}\n", text.empty() ? "Examples:\n" : "", words);
-  place.app->footer(text);
+  auto& examples = parser_->examples[place.app];
+  examples.push_back(words);
+  place.app->footer(FooterOf(examples));
 }
 
 std::function<void()> CommandLine::Parse(const std::vector<std::string>& arguments) {
