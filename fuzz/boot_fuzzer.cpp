@@ -7,14 +7,13 @@
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <cstdlib>
 #include <deque>
 #include <memory>
 #include <span>
 #include <string>
-#include <vector>
 
 #include "download/boot/kivrat.h"
+#include "fuzz/support.h"
 #include "tests/support/fake_clock.h"
 #include "tests/support/fake_device.h"
 #include "tests/support/temp_folder.h"
@@ -22,17 +21,13 @@
 namespace {
 
 using namespace kral;
-
-using Bytes = std::vector<uint8_t>;
+using fuzz::Bytes;
+using fuzz::Require;
 
 constexpr size_t kFileSize = 5000;
 constexpr uint8_t kLate = 0x40;
 constexpr uint8_t kWithNext = 0x80;
 constexpr uint8_t kDone[] = {5, 0, 0, 0, 8, 0, 0, 0};
-
-void Require(bool held) {
-  if (!held) std::abort();
-}
 
 class LyingLoader {
  public:

@@ -3,20 +3,36 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
-#include <cstdlib>
+#include <optional>
 
 #include "base/little_endian.h"
 #include "base/text_log.h"
+#include "fuzz/support.h"
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_reader.h"
+#include "transport/collection/capture_seek.h"
 #include "transport/collection/kral_event_listener.h"
 
 namespace {
 
 using namespace kral;
+using fuzz::Require;
 
-void Require(bool held) {
-  if (!held) std::abort();
+constexpr uint64_t kLength = uint64_t{3} << 20;
+
+// In a file of that length, which goes round.
+void Seek(std::span<const uint8_t> file) {
+  if (file.size() < capture_head::kSize + sizeof(uint64_t)) return;
+  const CaptureBytes bytes = [file](uint64_t offset, std::span<uint8_t> buffer) {
+    const auto count = static_cast<size_t>(std::min<uint64_t>(buffer.size(), kLength - std::min(kLength, offset)));
+    for (size_t i = 0; i < count; ++i) buffer[i] = file[static_cast<size_t>((offset + i) % file.size())];
+    return std::optional(count);
+  };
+  const uint64_t sought = *LoadLe<uint64_t>(file, capture_head::kSize);
+  for (const uint64_t begin : {uint64_t{capture_head::kSize}, kLength / 2, kLength - 1, kLength}) {
+    const uint64_t found = FindCaptureTime(bytes, begin, kLength, sought);
+    Require(found >= begin && found <= kLength);
+  }
 }
 
 }  // namespace
@@ -57,5 +73,6 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const auto counters = sorter.counters();
   Require(counters.collected + responses.size() + responses.dropped() == packets && counters.oversized == 0);
   while (const auto event = events.Pop()) Require(*LoadLe<uint16_t>(event->bytes, EventRecord::kEventId) <= 0xFFF);
+  Seek(file);
   return 0;
 }

@@ -2,17 +2,18 @@
 // be read can be sent again, and then says the same.
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "commands/defined/definition_xml.h"
 #include "commands/defined/reply_text.h"
+#include "fuzz/support.h"
 
 namespace {
 
 using namespace kral;
+using fuzz::Require;
 using namespace kral::defined;
 
 constexpr size_t kMostCommands = 32;  // are looked at
@@ -28,10 +29,6 @@ constexpr std::string_view kEveryKind = R"(<CommandDefinition>
     <Field name="rows" type="R" count="n"/><Field name="label" type="text" size="4"/>
     <Field name="packed" type="zlib" size="m"><Field name="rows" type="R" count="*"/></Field>
     <Field name="rest" type="bytes" size="*"/></Reply></Command></Family></CommandDefinition>)";
-
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
 
 bool Read(const Message& message, std::span<const uint8_t> bytes, Values& values) {
   try {
@@ -55,8 +52,8 @@ void TakeReply(const Message& message, std::span<const uint8_t> bytes) {
     return;  // a stream of zlib's comes back with another length
   }
   Values read(message);
-  Check(Read(message, again, read));
-  Check(ReplyText(read) == text);
+  Require(Read(message, again, read));
+  Require(ReplyText(read) == text);
 }
 
 }  // namespace
@@ -72,11 +69,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   std::vector<CommandPtr> commands;
   Problem problem;
   if (!ReadDefinitions(document, {}, commands, problem)) {
-    Check(!problem.text.empty());
+    Require(!problem.text.empty());
     return 0;
   }
   for (size_t i = 0; i < commands.size() && i < kMostCommands; ++i) {
-    Check(!DescriptionText(*commands[i]).empty());
+    Require(!DescriptionText(*commands[i]).empty());
     TakeReply(commands[i]->reply, reply);
     TakeReply(commands[i]->request, reply);
   }

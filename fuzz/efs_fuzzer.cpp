@@ -1,49 +1,37 @@
 // A handset that answers the file-system requests with whatever it likes. Outputs stay within their room, and change on
 // success only; every descriptor and directory handle that was given away is asked to be closed.
 //
-// Byte 0 chooses the operation. Each answer begins with a byte: bit 0 repeats the request's header, bit 1 the fields by
-// which an answer is recognised behind it, bit 2 counts in sixteens; then a count, and so many bytes. Requests beyond
-// the last answer are refused.
+// Byte 0 chooses the operation, the answers are the parts behind it: bit 0 repeats the request's header, bit 1 the
+// fields by which an answer is recognised behind it. Requests beyond the last answer are refused.
 #include <algorithm>
-#include <cstdlib>
 #include <cstring>
-#include <map>
 #include <set>
 #include <string>
 #include <utility>
 #include <vector>
 
-#include "frame/diag_ftm.h"
-#include "frame/resource_manager.h"
-#include "handset/caller_transport.h"
-#include "handset/virtual_handset.h"
-#include "kral/connection.h"
+#include "fuzz/lying_handset.h"
+#include "fuzz/support.h"
 #include "kral/efs.h"
-#include "kral/transport.h"
 #include "storage/efs/efs_settings.h"
 
 namespace {
 
 using namespace kral;
-using handset::Bytes;
-using handset::ByteView;
+using fuzz::Bytes;
+using fuzz::ByteView;
+using fuzz::Require;
 
 constexpr uint8_t kSubsystem = 19;
 constexpr uint16_t kLastCommand = 53;
 constexpr uint8_t kRefusal = 19;
-constexpr int kMostAnswers = 300;     // of one input
 constexpr int32_t kTimeOutMs = 2000;  // every request is answered
 
-void Require(bool held) {
-  if (!held) std::abort();
-}
-
-class LyingHandset {
+class LyingFiles {
  public:
-  explicit LyingHandset(ByteView answers) : rest_(answers) {
-    phone_.KeepTrace(false);
+  explicit LyingFiles(ByteView answers) : answers_(answers) {
     for (uint16_t command = 0; command <= kLastCommand; ++command) {
-      phone_.OnSubsystem(kSubsystem, command, {}, [this](ByteView request, handset::Wire& wire) {
+      lying_.phone().OnSubsystem(kSubsystem, command, {}, [this](ByteView request, handset::Wire& wire) {
         const Bytes answer = Answer(request);
         Note(request, answer);
         wire.Send(answer);
@@ -51,18 +39,11 @@ class LyingHandset {
         if (answer.front() != kRefusal && !IsOwn(request, answer)) wire.Send(Bytes{kRefusal});
       });
     }
-    handle_ = KRAL_ConnectServer_UserDefinedTransport(
-        1, transport_.handle_value(), transport_.context(), &handset::CallerTransport::Send,
-        &handset::CallerTransport::Receive, &handset::CallerTransport::Flush);
-    KRAL_SetReceiveMode(handle_, 1);
-    KRAL_ConfigureTimeOut(handle_, 0, kTimeOutMs);
-    Kral_ResourceManager::GetPhone(handle_)->state<efs::Settings>().packet_time_out_ms = kTimeOutMs;
+    KRAL_ConfigureTimeOut(handle(), KRAL_TIME_OUT_COMMAND, kTimeOutMs);
+    lying_.state<efs::Settings>().packet_time_out_ms = kTimeOutMs;
   }
-  ~LyingHandset() { KRAL_DisconnectServer(handle_); }
-  LyingHandset(const LyingHandset&) = delete;
-  LyingHandset& operator=(const LyingHandset&) = delete;
 
-  KRAL_HANDLE handle() const { return handle_; }
+  KRAL_HANDLE handle() const { return lying_.handle(); }
   bool HasOpenHandles() const { return !open_.empty(); }
 
  private:
@@ -80,19 +61,16 @@ class LyingHandset {
   }
 
   Bytes Answer(ByteView request) {
-    if (rest_.size() < 2 || ++answers_ > kMostAnswers) return {kRefusal};
-    const uint8_t control = rest_[0];
-    const size_t count = std::min<size_t>(rest_[1] * ((control & 4) != 0 ? 16u : 1u), rest_.size() - 2);
+    const auto said = answers_.Next();
+    if (!said) return {kRefusal};
     handset::ByteWriter answer;
-    if ((control & 1) != 0) {
+    if ((said->control & 1) != 0) {
       answer.Raw(request.first(4));
     } else {
       answer.U8(75);  // anything else would be waited behind, or fail at once
     }
-    if ((control & 2) != 0) answer.Raw(Recognised(request, request[2]));
-    answer.Raw(rest_.subspan(2, count));
-    rest_ = rest_.subspan(2 + count);
-    return answer.Take();
+    if ((said->control & 2) != 0) answer.Raw(Recognised(request, request[2]));
+    return answer.Raw(said->bytes).Take();
   }
 
   void Note(ByteView request, const Bytes& answer) {
@@ -104,12 +82,9 @@ class LyingHandset {
     }
   }
 
-  ByteView rest_;
-  int answers_ = 0;
+  fuzz::Parts answers_;
   std::set<std::pair<int, uint32_t>> open_;  // with the command that closes
-  handset::VirtualHandset phone_;
-  handset::CallerTransport transport_{phone_};
-  KRAL_HANDLE handle_ = 0;
+  fuzz::LyingHandset lying_;
 };
 
 void ReadFile(KRAL_HANDLE handle) {
@@ -172,7 +147,7 @@ constexpr void (*kOperations[])(KRAL_HANDLE) = {ReadFile, WriteFile, List, AskOn
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 1) return 0;
-  LyingHandset handset({data + 1, size - 1});
+  LyingFiles handset({data + 1, size - 1});
   kOperations[data[0] % std::size(kOperations)](handset.handle());
   Require(!handset.HasOpenHandles());
   return 0;

@@ -1,23 +1,20 @@
 // Any text as Intel HEX. What was accepted, and starts where the writer's records can express it, must come out of the
 // writer and in again as the same image.
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <string>
 #include <vector>
 
 #include "download/images/hex_phone_image_decoder.h"
 #include "download/images/phone_image_dpaged.h"
+#include "fuzz/support.h"
 
 namespace {
 
 using namespace kral;
+using fuzz::Require;
 
 constexpr uint32_t kMaximumKib = 256;
-
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
 
 std::vector<uint8_t> BytesOf(images::PhoneImage& image) {
   std::vector<uint8_t> bytes(image.GetSize(0));
@@ -42,16 +39,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   images::HexPhoneImageDecoder decoder;
   images::PhoneImageDPaged image(kMaximumKib, &decoder);
   if (!decoder.Decode(image, file)) return 0;
-  Check(image.GetSize(0) <= image.GetTotalSize());
+  Require(image.GetSize(0) <= image.GetTotalSize());
 
   images::TextMemory encoded;
   if (!decoder.Encode(image, encoded) || !IsExpressible(image, decoder.linear_addressing())) return 0;
   images::HexPhoneImageDecoder again;
   images::PhoneImageDPaged copy(kMaximumKib, &again);
-  Check(again.Decode(copy, encoded));
+  Require(again.Decode(copy, encoded));
   // The size of the copy may differ: that of the first write counts from nowhere. Its bytes may not.
   copy.SetSize(image.GetSize(0), 0);
-  if (copy.GetBaseAddress(0) == image.GetBaseAddress(0)) Check(BytesOf(copy) == BytesOf(image));
-  Check(copy.GetStartAddress() == image.GetStartAddress());
+  if (copy.GetBaseAddress(0) == image.GetBaseAddress(0)) Require(BytesOf(copy) == BytesOf(image));
+  Require(copy.GetStartAddress() == image.GetStartAddress());
   return 0;
 }

@@ -1,30 +1,18 @@
 // Anything as a pcapng file, made into a capture: what comes out is one, with as many packets as are told, and goes
 // there and back.
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
-#include <cstdlib>
-#include <vector>
 
+#include "fuzz/support.h"
 #include "transport/trace/capture_conversion.h"
 
 namespace {
 
 using namespace kral;
-using Bytes = std::vector<uint8_t>;
-
-void Require(bool held) {
-  if (!held) std::abort();
-}
-
-CaptureSource SourceOf(std::span<const uint8_t> bytes) {
-  return [bytes](std::span<uint8_t> buffer) mutable {
-    const size_t count = std::min(buffer.size(), bytes.size());
-    std::copy_n(bytes.begin(), count, buffer.begin());
-    bytes = bytes.subspan(count);
-    return std::optional(count);
-  };
-}
+using fuzz::Bytes;
+using fuzz::ByteView;
+using fuzz::Require;
+using fuzz::SourceOf;
 
 ConversionSink Into(Bytes& bytes) {
   return [&bytes](std::span<const uint8_t> more) {
@@ -37,7 +25,7 @@ ConversionSink Into(Bytes& bytes) {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Bytes capture;
-  const Conversion first = PcapngToCapture(SourceOf({data, size}), Into(capture));
+  const Conversion first = PcapngToCapture(SourceOf(ByteView(data, size)), Into(capture));
   if (first.end != Conversion::End::kDone) return 0;
   Bytes pcapng;
   const Conversion there = CaptureToPcapng(SourceOf(capture), "", Into(pcapng));

@@ -2,22 +2,19 @@
 // them. What was accepted must come out of either writer, and in again, the same.
 #include <cstdint>
 #include <cstdio>
-#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <random>
 #include <string>
 
+#include "fuzz/support.h"
 #include "storage/pkv/pkv_set.h"
 #include "storage/pkv/varn_pkv_file.h"
 
 namespace {
 
 using namespace kral;
-
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
+using fuzz::Require;
 
 // A file of this process alone.
 std::string FileName(const char* name) {
@@ -40,7 +37,7 @@ void Walk(const std::string& path) {
     file.open(path);
     for (auto item = file.begin(); item != file.end(); item++) {
       const pkv::VARN_PkvFile::NvItem copy = *item;  // reads every byte of it
-      Check(copy == *item);
+      Require(copy == *item);
     }
   } catch (const pkv::VARN_PkvFile::Exception&) {
   }
@@ -55,16 +52,16 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Walk(input.path);
   pkv::PkvSet set;
   const pkv::PkvOutcome outcome = pkv::ReadPkv(input.path, set);
-  Check(outcome.done() == outcome.text.empty());
+  Require(outcome.done() == outcome.text.empty());
   if (!outcome.done()) return 0;
   for (const pkv::PkvWriter writer : {pkv::PkvWriter::kStorageClasses, pkv::PkvWriter::kVarnPkvFile}) {
     if (set.items.empty() && writer == pkv::PkvWriter::kVarnPkvFile) continue;  // which refuses sets without items
     const Removed copy{FileName("-copy.pkv")};
     const pkv::PkvOutcome written = pkv::WritePkv(copy.path, set, nullptr, writer);
     pkv::PkvSet again;
-    Check(written.done() && pkv::ReadPkv(copy.path, again).done());
-    Check(again.items == set.items);
-    Check(again.files == set.files);
+    Require(written.done() && pkv::ReadPkv(copy.path, again).done());
+    Require(again.items == set.items);
+    Require(again.files == set.files);
   }
   return 0;
 }

@@ -6,22 +6,19 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
-#include <cstdlib>
 
 #include "base/little_endian.h"
 #include "base/text_log.h"
+#include "fuzz/support.h"
 #include "transport/collection/kral_event_listener.h"
 #include "transport/line/chunk_splitter.h"
 
 namespace {
 
 using namespace kral;
+using fuzz::Require;
 
 constexpr size_t kChunkSizes[] = {1, 2, 3, 5, 16, 200, 4095, 4096, 4097, 40960};
-
-void Require(bool held) {
-  if (!held) std::abort();
-}
 
 class Counter final : public PacketListener {
  public:

@@ -2,25 +2,22 @@
 // agent stay whole: acknowledged bytes never exceed those sent, and blocks are neither lost nor doubled.
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
 #include <span>
 
 #include "download/stream/image_write_rsp.h"
 #include "download/stream/reply_receiver.h"
 #include "download/stream/stream_hello.h"
 #include "frame/diag_ftm.h"
+#include "fuzz/support.h"
 
 namespace {
 
 using namespace kral;
+using fuzz::Require;
 
 constexpr uint32_t kWindow = 4;
 constexpr uint32_t kBlock = 16;
 constexpr uint32_t kImage = 256;
-
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
 
 // What the response thread does with a frame, without the thread.
 class Replies final : public stream::CImageWriteRspFramed {
@@ -37,7 +34,7 @@ class Replies final : public stream::CImageWriteRspFramed {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const std::span bytes(data, size);
-  if (const auto hello = stream::ParseHelloReply(bytes)) Check(size >= 48);
+  if (const auto hello = stream::ParseHelloReply(bytes)) Require(size >= 48);
 
   static Diag_FTM phone(1);
   download::DownloadConnection connection(phone);
@@ -53,8 +50,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const size_t length = std::min(wanted, size - at);
     replies.OnFrame(bytes.subspan(at, length));
     at += length;
-    Check(agent.bytes_acknowledged() <= kImage);
-    Check(!agent.done() || agent.bytes_acknowledged() == kImage);
+    Require(agent.bytes_acknowledged() <= kImage);
+    Require(!agent.done() || agent.bytes_acknowledged() == kImage);
   }
   return 0;
 }
