@@ -46,10 +46,13 @@ class LyingLoader {
  private:
   void Answer(ByteView request, handset::Wire& wire) {
     if (request[0] == kWrite) ++writes_;
-    auto said = answers_.Next();
-    if (!said) return wire.Send(Bytes{kAnswersNothing});
-    wire.Send(said->bytes);
-    while ((said->control & 1) != 0 && (said = answers_.Next())) wire.Send(said->bytes);
+    const Bytes nothing = {kAnswersNothing};
+    for (bool more = true; more;) {
+      const auto said = answers_.Next();
+      more = said && (said->control & 1) != 0;
+      // Always something: silence would be waited for.
+      wire.Send(said && !said->bytes.empty() ? said->bytes : ByteView(nothing));
+    }
   }
 
   fuzz::Parts answers_;
