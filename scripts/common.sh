@@ -47,6 +47,8 @@ build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googlete
 check_packages=(clang-format)
 # What reads them as clang does; only the whole scripts/test needs it.
 tidy_packages=(clang clang-tidy)
+# What looks for inputs that break it.
+fuzz_packages=(clang llvm)
 # What tries the library from other languages.
 language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy python3-build python3-cffi python3-pytest
   python3-setuptools python3-venv python3-wheel)
