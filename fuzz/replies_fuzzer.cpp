@@ -9,6 +9,7 @@
 #include <iterator>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "commands/core/core_diag.h"
 #include "frame/orbt_server.h"
@@ -16,6 +17,7 @@
 #include "fuzz/support.h"
 #include "kral/connection.h"
 #include "kral/diag.h"
+#include "kral/efs.h"
 #include "kral/ftm.h"
 #include "kral/log.h"
 #include "kral/nv.h"
@@ -235,8 +237,26 @@ void Restore(KRAL_HANDLE handle) {
   }
 }
 
-constexpr void (*kOperations[])(KRAL_HANDLE) = {Identify,      ReachMemory, Serve,       MoveItems,
-                                                ChooseTraffic, TestRadio,   ReadDefined, Restore};
+// What efs_fuzzer.cpp asks over a line, where answers of others are waited behind: here every answer is the request's.
+void MoveFiles(KRAL_HANDLE handle) {
+  constexpr uint32_t kRoom = 700;
+  Bytes data(kRoom);
+  uint32_t size = kRoom;
+  const bool read = KRAL_EfsReadMem(handle, "/f", data.data(), &size) == 1;
+  Require(read ? size <= kRoom : size == kRoom);
+  KRAL_EfsWriteMem(handle, data.data(), kRoom, "/f");
+  KRAL_EfsPutItemFromMem(handle, "/i", data.data(), 100);
+  constexpr uint32_t kEntries = 3;
+  std::vector<KRAL_EFS_ENTRY> entries(kEntries);
+  uint32_t count = kEntries;
+  if (KRAL_EfsDirectory(handle, "/d", KRAL_EFS_FILTER_ALL, entries.data(), &count) == 0)
+    return Require(count == kEntries);
+  entries.resize(std::min(count, kEntries));
+  for (const KRAL_EFS_ENTRY& entry : entries) Require(std::memchr(entry.name, 0, KRAL_EFS_NAME_SIZE) != nullptr);
+}
+
+constexpr void (*kOperations[])(KRAL_HANDLE) = {Identify,  ReachMemory, Serve,   MoveItems, ChooseTraffic,
+                                                TestRadio, ReadDefined, Restore, MoveFiles};
 
 }  // namespace
 
