@@ -23,18 +23,18 @@ SEED = 20
 SECTIONS = 1000
 
 
-def tshark(file, *words):
+def tshark(file, *words, definitions=""):
     """What tshark writes; an error of the dissector is one of the test."""
     script = os.path.join(TREE, "share", "kral", "wireshark", "kral.lua")
-    done = subprocess.run(["tshark", "-X", f"lua_script:{script}", "-r", file, *words], capture_output=True, text=True,
-                          errors="replace", timeout=600)
+    done = subprocess.run(["tshark", "-X", f"lua_script:{script}", "-o", f"kral.definitions:{definitions}", "-r", file,
+                           *words], capture_output=True, text=True, errors="replace", timeout=600)
     if done.returncode != 0 or re.search(r"lua.?error|stack traceback", done.stdout + done.stderr, re.IGNORECASE):
         raise AssertionError(f"tshark {words}: {done.returncode}\n{done.stderr[-2000:]}"
                              f"{[line for line in done.stdout.splitlines() if 'rror' in line][:5]}")
     return done.stdout
 
 
-def dissected(file):
+def dissected(file, definitions=""):
     """Of each packet its fields below kral and kral_bytes by name, each with the list of its values."""
     fields = []
 
@@ -49,11 +49,26 @@ def dissected(file):
                     if isinstance(each, dict):
                         gather(each, into)
 
-    for packet in json.loads(tshark(file, "-2", "-T", "json", "--no-duplicate-keys")):
+    shown = tshark(file, "-2", "-T", "json", "--no-duplicate-keys", definitions=definitions)
+    for packet in json.loads(shown):
         into = {}
         gather(packet["_source"]["layers"], into)
         fields.append(into)
     return fields
+
+
+KINDS = b"""<CommandDefinition><Family name="KINDS" frame="subsystem" subsystem="251" order="big">
+<Command name="ALL" id="1"><Request><Field name="u64" type="u64"/><Field name="s40" type="s40" order="little"/>
+<Field name="f64" type="f64"/><Field name="w" type="u40"><Bit name="low" bits="0-3" signed="1"/>
+<Bit name="high" bits="36-39"/></Field><Field name="n" type="u16"/><Field name="z" type="zlib" size="n">
+<Field name="t" type="text" size="2"/></Field></Request>
+<Reply><Field name="status" type="u8" success="0"/></Reply></Command>
+<Command name="STATUS" id="2"><Request><Field name="status" type="u8"/></Request>
+<Reply><Field name="status" type="u8" success="0"/><Field name="more" type="u32"/></Reply></Command>
+</Family></CommandDefinition>"""
+# A flash programmer of 32 bytes for the loader, as text records.
+HEX = (b":020000040002F8\n:10000000000102030405060708090A0B0C0D0E0F78\n"
+       b":10001000101112131415161718191A1B1C1D1E1F68\n:0400000500020000F5\n:00000001FF\n")
 
 
 class Dissector(ToolTest):
@@ -172,6 +187,107 @@ class Dissector(ToolTest):
                               ("channel", "FTM FTM_MODE_ID_WCDMA SET_MODE"), ("legacy", "FTM SET_CHAN"),
                               ("get", "EFS Read"), ("read", "NV read 10"), ("logs", "Log 0x1001")):
             self.assertIn(command, commands[name])
+
+    def traced(self, name, *words, code=0):
+        file = self.path(name + ".pcapng")
+        done = tool.run("-p", "7", "--trace", file, *words, ports=self.ports)
+        self.assertEqual(done.returncode, code, f"{words}: {done.err}")
+        return file
+
+    def defined_calls(self):
+        """Traces of commands by definition, with what tshark is to show of request and answer."""
+        example = os.path.join(TREE, "examples", "commands.xml")
+        kinds = self.add("kinds.xml", KINDS)
+        script = self.add("script", b"set 1 WLAN.version=2\nset 1 WLAN.packed.points[0].channel=14\n"
+                                    b"set 1 SENSOR.name=T1\nset 1 SENSOR.raw=ab\nset 1 SENSOR.value=-70000\n")
+        calls = (
+            (["WLAN.TX_START", "channel=6", "rate=54M", "flags.antenna=2"], 0,
+             ["channel=6", "rate=54M", "flags.preamble=1", "flags.antenna=2"], ["status=0", "power=0"]),
+            (["WLAN.SET_TABLE", "points[1].channel=3", "points[1].power=-5", "points[0].channel=1", "points[0].power=7",
+              "label=a b"], 0,
+             ["count=2", "points[0].channel=1", "points[0].power=7", "points[1].channel=3", "points[1].power=-5",
+              "label=a b"], ["status=0"]),
+            (["SENSOR.READ", "sensor=1", "kind=11M", "limit=-2"], 0, ["sensor=1", "kind=11M", "limit=-2"],
+             ["value=-70000", "name=T1", "raw_size=2", "raw=6162"]),
+            (["KINDS.ALL", "u64=18446744073709551615", "s40=-2", "f64=0.1", "w.low=-3", "w.high=9", "z.t=ab"], 0,
+             ["u64=18446744073709551615", "s40=-2", "f64=0.1", "w.low=-3", "w.high=9", "n=*", "z.t=ab"], ["status=0"]),
+            (["KINDS.STATUS", "status=3"], 7, ["status=3"], ["status=3"]),
+        )
+        with self.handset("--commands", example, "--commands", kinds, "--script", script):
+            tool.run("-p", "7", "mode", "ftm", ports=self.ports)
+            return f"{example};{kinds}", [
+                (self.traced(f"call{number}", "cmd", "call", *words, "--defs", example, "--defs", kinds, code=code),
+                 words[0], request, reply) for number, (words, code, request, reply) in enumerate(calls)]
+
+    def test_commands_by_definition_are_shown_with_their_fields(self):
+        definitions, calls = self.defined_calls()
+        for file, name, request, reply in calls:
+            shown = [fields for fields in dissected(file, definitions) if "kral.defined" in fields]
+            with self.subTest(name=name):
+                self.assertEqual([fields["kral.defined"] for fields in shown], [[name], [name]])
+                for fields, wanted in zip(shown, (request, reply)):
+                    listed = [re.sub("^n=[0-9]+$", "n=*", field) for field in fields["kral.defined.field"]]
+                    self.assertEqual(listed, wanted)
+                    self.assertNotIn("kral.defined.wrong", str(fields))
+        self.assertIn("KINDS.STATUS, status=3", [fields["kral.command"][0] for fields in shown])
+        self.assertFalse([fields for fields in dissected(calls[0][0]) if "kral.defined" in fields])
+        many = []
+        chance = random.Random(SEED)
+        seeds = [packet for file, *_ in calls for packet in pcapng.packets(self.content(file))]
+        with open(calls[0][0], "rb") as file:
+            many += [pcapng.block(kind, body) for kind, body in pcapng.blocks(file.read())
+                     if kind in (pcapng.SECTION, pcapng.INTERFACE)]
+        many += [pcapng.packet_block(packet, self.damaged(chance, packet.data))
+                 for packet in chance.choices(seeds, k=4000)]
+        damaged = self.add("damaged.pcapng", b"".join(many))
+        self.assertEqual(tshark(damaged, "-V", definitions=definitions).count("\nFrame ") + 1, 4000)
+
+    def test_hostile_definitions_cost_the_view_nothing_else(self):
+        definitions, calls = self.defined_calls()
+        example = definitions.split(";")[0]
+        head = (b"<CommandDefinition><Family name='F' frame='subsystem' subsystem='250'>"
+                b"<Command name='C' id='3'><Request>")
+        tail = b"</Request></Command></Family></CommandDefinition>"
+        for text in (b"", b"<", b"\xFF" * 100, b"<!DOCTYPE a [<!ENTITY b 'c'>]><CommandDefinition/>", b"<a>" * 100000,
+                     b"<CommandDefinition>" + b"<a/>" * 300000, b"<CommandDefinition a='", b"<a></b>", head,
+                     b"<CommandDefinition/>text", b"<CommandDefinition a='&b;'/>", b"<Other/>",
+                     head + b"<Field/>" + tail, head + b"<Field name='a' type='u99'/>" + tail,
+                     head + b"<Field type='R'/>" + tail.replace(
+                         b"</CommandDefinition>", b"<Record name='R'><Field type='R'/></Record></CommandDefinition>"),
+                     head + b"<Field name='a' type='u8' count='65536'/>" + tail,
+                     head + b"<Field name='a' type='record' count='*'><Field name='b' type='u8' when='c=1'/></Field>" +
+                     tail,
+                     head + b"<Field name='a' type='u8'><Bit name='b' bits='7-3'/><Bit bits='99'/></Field>" + tail):
+            with self.subTest(text=text[:200]):
+                hostile = self.add("hostile.xml", text)
+                self.assertIn("kral.code", str(dissected(calls[2][0], f"{hostile};/nonexistent")))
+        shown = dissected(calls[2][0], f"{hostile};/nonexistent;{example}")
+        self.assertIn("kral.defined", str(shown), "what is wrong with one file is no matter of another's")
+
+    def test_loader_programmer_and_boot_packets_are_named(self):
+        programmer = self.add("programmer", b"VHFP" + struct.pack("<I", 9000) + bytes(8992))
+        software = self.add("software", b"VHSW" + b"VHS-2.0.1\0" + bytes(5000))
+        with self.handset("--boot-loader"):
+            boot = dissected(self.traced("boot", "boot", "load", programmer))
+        with self.plugged_handset("--loader", "boot"):
+            stream = dissected(self.traced("stream", "flash", "all", "--enter", programmer, software))
+        loader = self.add("programmer.hex", HEX)
+        with self.handset():
+            load = dissected(self.traced("load", "flash", "load", loader))
+        commands = [[fields["kral.command"][0] for fields in shown if "kral.command" in fields]
+                    for shown in (boot, stream, load)]
+        for wanted in ("Boot hello", "Boot hello response", "Boot read data", "Boot end of transfer", "Boot done"):
+            self.assertIn(wanted, commands[0])
+        self.assertEqual(sum(int(size) for fields in boot for size in fields.get("kral.boot.size", ())), 9000)
+        for wanted in ("Programmer no operation", "Programmer hello", "Programmer open image",
+                       "Programmer image opened", "Programmer write 0x00000000", "Programmer wrote 0x00000000",
+                       "Programmer closed"):
+            self.assertIn(wanted, commands[1])
+        for wanted in ("Loader write", "Loader go", "Loader acknowledged"):
+            self.assertIn(wanted, commands[2])
+        for number, fields in enumerate(stream, 1):
+            if fields.get("kral.protocol") == ["programmer"] and fields["kral.direction"] == ["sent"]:
+                self.assertIn("kral.reply_in", fields, number)
 
     def test_damaged_packets_are_shown_as_far_as_they_go(self):
         with self.handset("--logs", "500", "--events", "100", "--messages", "100"):

@@ -3,6 +3,9 @@
 --
 --   tshark -X lua_script:kral.lua -r trace.pcapng -V
 --
+-- Commands of definition files are shown with their fields: the preference kral.definitions, or KRAL_COMMANDS in the
+-- environment, names the files, with semicolons between them.
+--
 -- docs/traffic.md lists the fields. Nothing is read before it is known to be there: files may be cut and hostile.
 
 local kral = Proto("kral", "Handset diagnostics")
@@ -116,6 +119,32 @@ local efs_operations = {
   [53] = { "Make golden copy", { "path", "path" }, { "u32", "errno" } },
 }
 
+-- The loader, which a handset in download runs first (its numbers are big-endian), and the flash programmer that it is
+-- given.
+local loader_commands = {
+  [2] = "Loader acknowledged", [3] = "Loader refused", [5] = "Loader go", [6] = "Loader no operation",
+  [10] = "Loader reset", [12] = "Loader version", [13] = "Loader version", [15] = "Loader write",
+}
+local stream_commands = {
+  [1] = "Programmer hello", [2] = "Programmer hello", [7] = "Programmer write", [8] = "Programmer wrote",
+  [9] = "Programmer no operation", [10] = "Programmer no operation",
+  [21] = "Programmer close", [22] = "Programmer closed", [23] = "Programmer security mode",
+  [24] = "Programmer security mode set", [25] = "Programmer partition table", [26] = "Programmer partition table taken",
+  [27] = "Programmer open image", [28] = "Programmer image opened",
+}
+local hello_magic = "fast download protocol"
+-- The boot loader's packets, which have no frame: the names of the words behind command and length.
+local boot_commands = {
+  [1] = { "Boot hello", { "version", "compatible", "most", "mode" } },
+  [2] = { "Boot hello response", { "version", "compatible", "status", "mode" } },
+  [3] = { "Boot read data", { "image", "offset", "size" } },
+  [4] = { "Boot end of transfer", { "image", "status" } },
+  [5] = { "Boot done", {} }, [6] = { "Boot done response", { "status" } },
+  [11] = { "Boot command ready", {} }, [12] = { "Boot switch mode", { "mode" } },
+  [13] = { "Boot execute", { "client_command" } }, [14] = { "Boot execute response", { "client_command", "size" } },
+  [15] = { "Boot execute data", { "client_command" } },
+}
+
 -- --- Fields -------------------------------------------------------------------------------------------------------
 
 local f = {
@@ -162,7 +191,21 @@ local f = {
   count = ProtoField.uint16("kral.count", "Count"),
   mode = ProtoField.uint16("kral.mode", "Mode"),
   switches = ProtoField.uint16("kral.switches", "Switches", base.HEX),
+  protocol = ProtoField.string("kral.protocol", "Protocol"),
+  download_status = ProtoField.uint8("kral.download.status", "Status"),
+  download_data = ProtoField.bytes("kral.download.data", "Data"),
+  download_block = ProtoField.uint32("kral.download.block_size", "Block size"),
+  download_id = ProtoField.string("kral.download.flash_id", "Flash id"),
+  download_type = ProtoField.uint8("kral.download.type", "Type"),
+  boot_command = ProtoField.uint32("kral.boot.command", "Boot command"),
+  boot_length = ProtoField.uint32("kral.boot.length", "Length"),
+  defined = ProtoField.string("kral.defined", "Command by definition"),
+  defined_field = ProtoField.string("kral.defined.field", "Field"),
 }
+for _, name in ipairs({ "version", "compatible", "most", "mode", "status", "image", "offset", "size",
+  "client_command" }) do
+  f["boot_" .. name] = ProtoField.uint32("kral.boot." .. name, "Boot " .. name)
+end
 for _, name in ipairs({ "fd", "flags", "mode", "count", "offset", "errno", "sequence", "type", "size", "atime", "mtime",
   "ctime", "query", "path_size", "state" }) do
   f["efs_" .. name] = ProtoField.uint32("kral.efs." .. name, "EFS " .. name)
@@ -175,7 +218,10 @@ kral.fields = f
 local bad_fcs = ProtoExpert.new("kral.fcs.bad", "The FCS does not fit", expert.group.CHECKSUM, expert.severity.WARN)
 local cut = ProtoExpert.new("kral.cut", "Shorter than its header says", expert.group.MALFORMED, expert.severity.WARN)
 local refused = ProtoExpert.new("kral.refused.by_handset", "Refused", expert.group.RESPONSE_CODE, expert.severity.NOTE)
-kral.experts = { bad_fcs, cut, refused }
+local not_as_defined = ProtoExpert.new("kral.defined.wrong", "Not as the definition has it", expert.group.MALFORMED,
+  expert.severity.WARN)
+kral.experts = { bad_fcs, cut, refused, not_as_defined }
+kral.prefs.definitions = Pref.string("Definition files", "", "Of commands, with semicolons between them")
 
 -- --- Reading ------------------------------------------------------------------------------------------------------
 
@@ -228,6 +274,363 @@ function Reader:text(field)
   return text
 end
 
+-- --- Definition files ---------------------------------------------------------------------------------------------
+-- They are read as far as it takes to show fields; whether one contradicts itself is the library's to say. Like packets
+-- they may be hostile: every loop and every depth has a bound.
+
+local MOST_XML, MOST_ELEMENTS, DEEPEST = 16 * 1024 * 1024, 200000, 32
+
+local entities = { lt = "<", gt = ">", amp = "&", quot = '"', apos = "'" }
+local function unescaped(text)
+  return (text:gsub("&(#?%w+);", function(name)
+    if entities[name] then return entities[name] end
+    local code = name:match("^#(%d+)$") and tonumber(name:sub(2)) or name:match("^#x%x+$") and tonumber(name:sub(3), 16)
+    if not code or code > 127 then error("the character &" .. name .. "; is not taken", 0) end
+    return string.char(code)
+  end))
+end
+
+-- Elements with `name`, `attributes` and their children; raises the fault as a text.
+local function parse_xml(text)
+  local root = { name = "", attributes = {} }
+  local stack, at, elements = { root }, text:sub(1, 3) == "\239\187\191" and 4 or 1, 0
+  while true do
+    local open = text:find("<", at, true)
+    if text:find("%S", at) ~= open then error("text between elements", 0) end
+    if not open then break end
+    local skipped = text:sub(open, open + 3) == "<!--" and "-->" or text:sub(open, open + 1) == "<?" and "?>"
+    if skipped then
+      local _, last = text:find(skipped, open, true)
+      if not last then error("a comment without end", 0) end
+      at = last + 1
+    elseif text:sub(open + 1, open + 1) == "/" then
+      local name, last = text:match("^</([%w_:.-]+)%s*>()", open)
+      if #stack == 1 or stack[#stack].name ~= name then error("elements that do not nest", 0) end
+      stack[#stack] = nil
+      at = last
+    else
+      local name, next_at = text:match("^<([%a_][%w_:.-]*)()", open)
+      if not name then error("no element of a definition file", 0) end
+      elements = elements + 1
+      if elements > MOST_ELEMENTS or #stack > DEEPEST then error("too many elements", 0) end
+      local element = { name = name, attributes = {} }
+      while true do
+        local key, quote, value_at = text:match("^%s+([%w_:.-]+)%s*=%s*([\"'])()", next_at)
+        if not key then break end
+        local value_end = text:find(quote, value_at, true)
+        if not value_end then error("an attribute without end", 0) end
+        element.attributes[key] = unescaped(text:sub(value_at, value_end - 1))
+        next_at = value_end + 1
+      end
+      local slash, last = text:match("^%s*(/?)>()", next_at)
+      if not slash then error("no element of a definition file", 0) end
+      table.insert(stack[#stack], element)
+      if slash == "" then stack[#stack + 1] = element end
+      at = last
+    end
+  end
+  if #stack > 1 or #root ~= 1 then error("not one whole element", 0) end
+  return root[1]
+end
+
+-- Commands by what stands in front of their fields.
+local function no_definitions()
+  return { subsystem = {}, diag = {}, ftm = {}, ftm_any = {}, ftm59 = {} }
+end
+local defined, defined_from = no_definitions(), ""
+
+local function child_of(element, name)
+  for _, child in ipairs(element) do
+    if child.name == name then return child end
+  end
+end
+
+local function add_family(family, file)
+  local a = family.attributes
+  for _, element in ipairs(family) do
+    local id = tonumber(element.attributes.id)
+    if element.name == "Command" and id then
+      local command = { name = (a.name or "?") .. "." .. (element.attributes.name or "?"), file = file,
+        big = a.order == "big", request = child_of(element, "Request"), reply = child_of(element, "Reply"),
+        skipped = (a.header == "extended" or a.header == "pmic") and 4 or 0 }
+      local place = defined.diag
+      if a.frame == "subsystem" then
+        place, id = defined.subsystem, (tonumber(a.subsystem) or -1) * 65536 + id
+      elseif a.frame == "ftm59" then
+        place = defined.ftm59
+      elseif a.frame == "ftm" then
+        local mode = tonumber(a.mode)
+        local any = not mode or element.attributes.mode == "by_rf_mode"
+        place, id = any and defined.ftm_any or defined.ftm, any and id or mode * 65536 + id
+      end
+      place[id] = place[id] or command
+    end
+  end
+end
+
+local function read_definitions(path)
+  local stream, problem = io.open(path, "rb")
+  if not stream then error(problem, 0) end
+  local text = stream:read(MOST_XML + 1) or ""
+  stream:close()
+  if #text > MOST_XML then error("longer than a definition file", 0) end
+  local root = parse_xml(text)
+  if root.name ~= "CommandDefinition" then error("no definition file", 0) end
+  local file = { words = {}, records = {} }
+  for _, element in ipairs(root) do
+    local name = element.attributes.name
+    if element.name == "Enumeration" and name then
+      local words = { number = {}, word = {} }
+      for _, value in ipairs(element) do
+        local number = tonumber(value.attributes.value)
+        if number and value.attributes.name then
+          words.number[value.attributes.name] = number
+          words.word[number] = words.word[number] or value.attributes.name
+        end
+      end
+      file.words[name] = words
+    elseif element.name == "Record" and name then
+      file.records[name] = element
+    end
+  end
+  for _, element in ipairs(root) do
+    if element.name == "Family" then add_family(element, file) end
+  end
+end
+
+-- Once for each setting. A file that cannot be used is told, and what others define is shown.
+local function load_definitions()
+  local files = kral.prefs.definitions
+  if files == nil or files == "" then files = os.getenv("KRAL_COMMANDS") or "" end
+  if files == defined_from then return end
+  defined, defined_from = no_definitions(), files
+  for path in files:gmatch("[^;]+") do
+    local done, fault = pcall(read_definitions, path)
+    if not done then io.stderr:write("kral.lua: " .. path .. ": " .. tostring(fault) .. "\n") end
+  end
+end
+
+local kinds = { u = "unsigned", s = "signed", f = "real" }
+
+-- A <Field> or <Bit>, made ready once.
+local function compiled(element, file, big)
+  if element.field then return element.field end
+  local a = element.attributes
+  local kind, bits = (a.type or ""):match("^([usf])(%d+)$")
+  bits = tonumber(bits)
+  local field = { name = a.name or "?", count = a.count, size = a.size, unit = a.unit, words = file.words[a.enum or ""],
+    big = a.order == "big" or (a.order == nil and big) }
+  if element.name == "Bit" then
+    local first, last = (a.bits or ""):match("^(%d+)-?(%d*)$")
+    field.kind, field.first = a.signed == "1" and "signed" or "unsigned", tonumber(first) or 0
+    field.bits = (tonumber(last) or field.first) - field.first + 1
+  elseif bits and bits >= 8 and bits <= 64 and bits % 8 == 0 then
+    field.kind, field.bits = element[1] and "bits" or kinds[kind], bits
+  elseif a.type == "text" or a.type == "bytes" or a.type == "zlib" then
+    field.kind = a.type
+  else
+    field.kind, field.inside = "record", file.records[a.type or ""] or element
+  end
+  field.inside = field.inside or element
+  local number = function(word)
+    return field.words and field.words.number[word] or tonumber(word)
+  end
+  if a.success then
+    field.success = {}
+    for word in a.success:gmatch("[^,]+") do field.success[number(word) or word] = true end
+  end
+  if a.when then
+    local name, is_not, values = a.when:match("^([^=!]+)(!?)=(.*)$")
+    field.when = name and { name = name, is_not = is_not == "!", values = values }
+  end
+  element.field = field
+  return field
+end
+
+local Fields = {} -- one message on its way through a definition
+Fields.__index = Fields
+
+local MOST_SHOWN = 1000
+
+-- What an earlier field has, here or in a group around.
+local function value_of(scope, name)
+  while scope do
+    if scope.values[name] ~= nil then return scope.values[name], scope.fields[name] end
+    scope = scope.outer
+  end
+end
+
+function Fields:applies(when, scope)
+  local value, field = value_of(scope, when.name)
+  local among = false
+  for word in when.values:gmatch("[^,]+") do
+    local number = field and field.words and field.words.number[word] or tonumber(word)
+    among = among or (number ~= nil and number == value)
+  end
+  return among ~= when.is_not
+end
+
+function Fields:amount(text, scope)
+  return tonumber(text) or tonumber(value_of(scope, text) or "")
+end
+
+function Fields:stop(fault)
+  error({ fault = fault }, 0)
+end
+
+function Fields:take(count)
+  local reader = self.reader
+  if not count or count < 0 or not reader:has(count) then self:stop("bytes are missing") end
+  reader.at = reader.at + count
+  return count > 0 and reader.tvb(reader.at - count, count) or nil
+end
+
+function Fields:show(field, path, value, range)
+  self.shown = self.shown + 1
+  if self.shown > MOST_SHOWN then self:stop() end
+  local text = path .. "=" .. value
+  local tree = self.reader.tree
+  local item = range and tree:add(f.defined_field, range, text) or tree:add(f.defined_field, text)
+  if field.unit then item:append_text(" " .. field.unit) end
+end
+
+-- Of a number the value to show, and as a number to look at.
+local function number_in(field, range)
+  local size = field.bits / 8
+  if field.kind == "real" then
+    local value = field.big and range:float() or range:le_float()
+    return string.format(size == 4 and "%.7g" or "%.15g", value), value
+  end
+  local signed = field.kind == "signed"
+  if size <= 4 then
+    local value
+    if signed then value = field.big and range:int() or range:le_int() end
+    if not signed then value = field.big and range:uint() or range:le_uint() end
+    return tostring(value), value
+  end
+  local value
+  if signed then value = field.big and range:int64() or range:le_int64() end
+  if not signed then value = field.big and range:uint64() or range:le_uint64() end
+  return tostring(value), value:tonumber()
+end
+
+local function bits_in(part, word)
+  local value = word:rshift(part.first):band(UInt64.new(0xFFFFFFFF, 0xFFFFFFFF):rshift(64 - part.bits))
+  local number = value:tonumber()
+  if part.kind == "signed" and number >= 2 ^ (part.bits - 1) then
+    number = number - 2 ^ part.bits
+    return string.format("%.0f", number), number
+  end
+  return tostring(value), number
+end
+
+function Fields:keep(field, name, path, text, number, range, scope)
+  scope.values[name], scope.fields[name] = number, field
+  self:show(field, path, field.words and field.words.word[number] or text, range)
+  if field.success and not field.success[number] then
+    self.refused = name .. "=" .. text
+    self:stop()
+  end
+end
+
+function Fields:word(field, path, scope)
+  local range = self:take(field.bits / 8)
+  local word = field.big and range:uint64() or range:le_uint64()
+  for _, element in ipairs(field.inside) do
+    local part = compiled(element, self.file, self.big)
+    if part.first + part.bits > field.bits or part.bits < 1 then self:stop("bits beyond their word") end
+    local text, number = bits_in(part, word)
+    self:keep(part, field.name .. "." .. part.name, path .. "." .. part.name, text, number, range, scope)
+  end
+end
+
+function Fields:block(field, path, scope, depth)
+  local reader = self.reader
+  if field.size == "terminated" then
+    local size = 0
+    while reader:has(size + 1) and reader.tvb(reader.at + size, 1):uint() ~= 0 do size = size + 1 end
+    local range = self:take(size)
+    self:show(field, path, range and range:string() or "", range)
+    self:take(1)
+    return
+  end
+  local range = self:take(field.size == "*" and reader.size - reader.at or self:amount(field.size or "", scope))
+  if field.kind == "zlib" then
+    local done, plain = pcall(function() return range:uncompress("Unpacked " .. field.name) end)
+    if not range or not done or not plain then self:stop("no zlib stream") end
+    local tvb = plain:tvb()
+    self.reader = Reader.new(tvb, tvb:len(), reader.tree)
+    self:group(field.inside, path .. ".", { values = {}, fields = {}, outer = scope }, depth + 1)
+    self.reader = reader
+  elseif field.kind == "text" then
+    self:show(field, path, range and range:string():match("^[^%z]*") or "", range)
+  else
+    self:show(field, path, range and range:bytes():tohex(true) or "", range)
+  end
+end
+
+function Fields:one(field, path, scope, depth)
+  if field.kind == "bits" then
+    self:word(field, path, scope)
+  elseif field.kind == "record" then
+    local inner = { values = {}, fields = {}, outer = scope }
+    self:group(field.inside, path .. ".", inner, depth + 1)
+    for name, value in pairs(inner.values) do
+      scope.values[field.name .. "." .. name], scope.fields[field.name .. "." .. name] = value, inner.fields[name]
+    end
+  elseif field.kind == "text" or field.kind == "bytes" or field.kind == "zlib" then
+    self:block(field, path, scope, depth)
+  else
+    local range = self:take(field.bits / 8)
+    local text, number = number_in(field, range)
+    self:keep(field, field.name, path, text, number, range, scope)
+  end
+end
+
+function Fields:group(elements, prefix, scope, depth)
+  if depth > DEEPEST then self:stop("groups within groups without end") end
+  for _, element in ipairs(elements) do
+    local field = compiled(element, self.file, self.big)
+    if not field.when or self:applies(field.when, scope) then
+      if not field.count then
+        self:one(field, prefix .. field.name, scope, depth)
+      else
+        local count = field.count == "*" and math.huge or self:amount(field.count, scope)
+        if not count then self:stop("nothing counts " .. field.name) end
+        local i = 0
+        while i < count and not (field.count == "*" and self.reader.at >= self.reader.size) do
+          local before = self.reader.at
+          self:one(field, prefix .. field.name .. "[" .. i .. "]", scope, depth)
+          if self.reader.at == before then self:stop("elements without bytes") end
+          i = i + 1
+        end
+      end
+    end
+  end
+end
+
+-- Shows the fields of a command; gives its name, and what a status says that is none of success.
+local function show_defined(reader, command, is_reply)
+  if not command then return nil end
+  local tree = reader.tree
+  reader.tree = tree:add(f.defined, reader.tvb(0, reader.size), command.name)
+  if not is_reply then reader.at = math.min(reader.at + command.skipped, reader.size) end
+  local message = is_reply and command.reply or command.request
+  local fields = setmetatable({ reader = reader, file = command.file, big = command.big, shown = 0 }, Fields)
+  local done, why = true, nil
+  if message then
+    done, why = pcall(fields.group, fields, message, "", { values = {}, fields = {} }, 0)
+  end
+  if not done and (type(why) ~= "table" or why.fault) then
+    reader.tree:add_proto_expert_info(not_as_defined, type(why) == "table" and why.fault or tostring(why))
+  elseif done and not is_reply and reader.at < reader.size then
+    reader.tree:add_proto_expert_info(not_as_defined, "longer than defined")
+  end
+  reader.tree = tree
+  if fields.refused then tree:add_proto_expert_info(refused, fields.refused) end
+  return command.name .. (fields.refused and (", " .. fields.refused) or "")
+end
+
 -- --- Commands -----------------------------------------------------------------------------------------------------
 -- Each adds its fields behind the code, and gives what the list of packets shows.
 
@@ -256,9 +659,12 @@ local function read_efs(reader, operation, is_reply)
   return info
 end
 
-local function read_ftm(reader, head)
+local function read_ftm(reader, head, is_reply)
   local mode = head == 75 and reader:number("u16", f.ftm_mode) or nil
   local command = reader:number("u16", f.ftm_command)
+  local known = mode and command and defined.ftm[mode * 65536 + command] or not mode and defined.ftm59[command]
+  local name = show_defined(reader, known or defined.ftm_any[command], is_reply)
+  if name and known then return "FTM " .. name end
   local info = "FTM"
   if mode then info = info .. " " .. (ftm_modes[mode] or ("mode " .. mode)) end
   if command then info = info .. " " .. (ftm_commands[command] or ("command " .. command)) end
@@ -283,13 +689,15 @@ local function read_nv_subsystem(reader, command, is_reply)
   return is_reply and info .. nv_status_at_end(reader) or info
 end
 
-local function read_subsystem(reader, is_reply)
+local function read_subsystem(reader, is_reply, code)
   local subsystem = reader:number("u8", f.subsystem)
   if not subsystem then return "Subsystem" end
-  if subsystem == FTM then return read_ftm(reader, 75) end
+  if subsystem == FTM then return read_ftm(reader, 75, is_reply) end
   local command = reader:number("u16", f.subsystem_command)
   local name = subsystems[subsystem] or ("Subsystem " .. subsystem)
   if not command then return name end
+  local known = code == 75 and show_defined(reader, defined.subsystem[subsystem * 65536 + command], is_reply)
+  if known then return known end
   if subsystem == EFS then return read_efs(reader, command, is_reply) end
   if subsystem == NV and command <= 2 then return read_nv_subsystem(reader, command, is_reply) end
   local names = subsystem_commands[subsystem]
@@ -380,12 +788,12 @@ local readers = {
     return is_reply and read_number(f.switches)(reader, code) or commands[code]
   end,
   [48] = read_number(f.switches),
-  [59] = function(reader)
+  [59] = function(reader, _, is_reply)
     reader.at = 5
-    return read_ftm(reader, 59)
+    return read_ftm(reader, 59, is_reply)
   end,
-  [75] = function(reader, _, is_reply) return read_subsystem(reader, is_reply) end,
-  [128] = function(reader, _, is_reply) return read_subsystem(reader, is_reply) end,
+  [75] = function(reader, code, is_reply) return read_subsystem(reader, is_reply, code) end,
+  [128] = function(reader, code, is_reply) return read_subsystem(reader, is_reply, code) end,
   [115] = function(reader)
     reader.at = 4
     local operation = reader:number("u32", f.log_operation)
@@ -394,32 +802,112 @@ local readers = {
 }
 for code = 2, 7 do readers[code] = read_memory end
 
+-- --- Loader and flash programmer ----------------------------------------------------------------------------------
+-- Their frames look like those of diagnostics: what was said before tells which they are.
+
+local protocols = {} -- by packet
+local speaks = "diagnostics" -- so far
+local boot_bodies, boot_awaited = {}, nil -- by packet, the command that it is the rest of; what the next one may be
+
+local function contains(tvb, size, text)
+  return size >= 33 and tvb:raw(1, 32):find(text, 1, true) ~= nil
+end
+
+-- Codes that say so by themselves, of a length that no command of diagnostics has.
+local function protocol_said_by(tvb, size, is_reply, code)
+  if (code == 1 or code == 2) and contains(tvb, size, hello_magic) then return "programmer" end
+  if is_reply then return nil end
+  if code == 9 and size == 5 and tvb:raw(1, 3) == "NOP" then return "programmer" end
+  if size == 1 and (code == 6 or code == 10 or code == 12) then return "loader" end
+  if code == 15 and size >= 7 and tvb(5, 2):uint() == size - 7 then return "loader" end
+end
+
+local function protocol_of(tvb, size, pinfo, is_reply, code)
+  if pinfo.visited then return protocols[pinfo.number] or "diagnostics" end
+  local said = protocol_said_by(tvb, size, is_reply, code)
+  if said then
+    speaks = said
+  elseif speaks ~= "diagnostics" then
+    local names = speaks == "loader" and loader_commands or stream_commands
+    if not names[code] or (is_reply and unasked[code] and speaks == "loader") then speaks = "diagnostics" end
+  end
+  protocols[pinfo.number] = speaks
+  return speaks
+end
+
+local function read_loader(reader, code, is_reply)
+  if code == 5 or code == 15 then
+    if reader:has(4) then reader.tree:add(f.address, reader.tvb(reader.at, 4)) end
+    reader:bytes(4)
+    if code == 15 and reader:has(2) then
+      reader.tree:add(f.count, reader.tvb(reader.at, 2))
+      reader.at = reader.at + 2
+      reader:rest(f.download_data)
+    end
+  elseif is_reply and code == 13 and reader:has(1) then
+    reader:number("u8", f.download_type)
+  end
+  return loader_commands[code] or ("Loader command " .. code)
+end
+
+local function read_programmer(reader, code)
+  if code == 7 or code == 8 then
+    local address = reader:number("u32", f.address)
+    reader:rest(f.download_data)
+    return stream_commands[code] .. (address and string.format(" 0x%08X", address) or "")
+  elseif code == 2 and reader:has(44) then
+    reader.at = 35
+    reader:number("u32", f.download_block)
+    reader:number("u32", f.address)
+    local length = reader:number("u8")
+    reader:bytes(length or 0, f.download_id)
+  elseif code == 23 or code == 27 then
+    reader:number("u8", f.download_type)
+  elseif code == 24 or code == 26 or code == 28 then
+    local status = reader:number("u8", f.download_status)
+    return stream_commands[code] .. (status and status ~= 0 and (", status " .. status) or "")
+  end
+  return stream_commands[code] or ("Programmer command " .. code)
+end
+
+local download_readers = { loader = read_loader, programmer = read_programmer }
+
 -- --- Which answer belongs to which request ------------------------------------------------------------------------
 
 local requests = {} -- those without an answer so far, by what an answer repeats of them; of each the last one
 local pairs_of = {} -- by the number of either packet
 local function forget()
   requests, pairs_of = {}, {}
+  protocols, speaks = {}, "diagnostics"
+  boot_bodies, boot_awaited = {}, nil
+  load_definitions()
 end
 kral.init = forget
 
--- What an answer repeats of its request: the code, and below 75 and 128 subsystem and command.
-local function key_of(tvb, at, size)
+-- What an answer repeats of its request: the code, and below 75 and 128 subsystem and command. A loader's answer
+-- repeats nothing, a programmer's the address of a write.
+local function key_of(tvb, at, size, protocol, is_reply)
   if size < 1 then return nil end
+  if protocol == "loader" then return protocol end
+  if protocol == "programmer" then
+    local code = tvb(0, 1):uint() - (is_reply and 1 or 0)
+    return protocol .. code .. (code == 7 and size >= 5 and tvb(1, 4):bytes():tohex() or "")
+  end
   local code = tvb(at, 1):uint()
   local more = (code == 75 or code == 128) and math.min(size - 1, 3) or 0
   return tvb(at, 1 + more):bytes():tohex()
 end
 
-local function pair(tvb, size, pinfo, is_reply, code)
+local function pair(tvb, size, pinfo, is_reply, code, protocol)
   if pinfo.visited then return pairs_of[pinfo.number] end
   if not is_reply then
-    local key = key_of(tvb, 0, size)
+    local key = key_of(tvb, 0, size, protocol, false)
     if key then requests[key] = { number = pinfo.number, time = pinfo.rel_ts } end
     return nil
   end
-  local at = refusals[code] and 1 or 0 -- a refusal has the request behind its code
-  local key = key_of(tvb, at, size - at)
+  -- A refusal has the request behind its code.
+  local at = protocol == "diagnostics" and refusals[code] and 1 or 0
+  local key = key_of(tvb, at, size - at, protocol, true)
   local request = key and requests[key]
   if not request then return nil end
   requests[key] = nil
@@ -509,9 +997,15 @@ function kral.dissector(tvb, pinfo, tree)
   local is_reply = direction ~= "sent"
   local reader = Reader.new(tvb, size, top)
   reader:number("u8", f.code)
+  local protocol = good and protocol_of(tvb, size, pinfo, is_reply, code) or "diagnostics"
   local read = readers[code]
   local name
-  if refusals[code] and is_reply then
+  if protocol ~= "diagnostics" then
+    top:add(f.protocol, protocol):set_generated()
+    name = download_readers[protocol](reader, code, is_reply)
+  elseif defined.diag[code] and not (refusals[code] and is_reply) then
+    name = show_defined(reader, defined.diag[code], is_reply)
+  elseif refusals[code] and is_reply then
     name = read_refusal(reader, code, pinfo)
   else
     name = read and read(reader, code, is_reply) or commands[code] or ("Command " .. code)
@@ -520,7 +1014,9 @@ function kral.dissector(tvb, pinfo, tree)
   top:add(f.command, tvb(0, 1), name):set_generated()
   top:add_le(f.fcs, tvb(size, 2))
   top:add(f.fcs_good, tvb(size, 2), good):set_generated()
-  if good and not unasked[code] then add_pair(pair(tvb, size, pinfo, is_reply, code), pinfo, top) end
+  if good and not (protocol == "diagnostics" and unasked[code]) then
+    add_pair(pair(tvb, size, pinfo, is_reply, code, protocol), pinfo, top)
+  end
   if not good then
     top:add_proto_expert_info(bad_fcs)
     name = name .. " (bad FCS)"
@@ -530,13 +1026,51 @@ function kral.dissector(tvb, pinfo, tree)
   return length
 end
 
+-- Packets of the boot loader's tell their own length. The library reads command and length first, and then the rest:
+-- of such a packet there are two runs of bytes.
+
+local function boot_part(tvb, pinfo, direction)
+  if pinfo.visited then return boot_bodies[pinfo.number] end
+  local awaited = boot_awaited
+  boot_awaited = nil
+  if awaited and direction == awaited.direction and tvb:len() == awaited.size then
+    boot_bodies[pinfo.number] = awaited.command
+    return awaited.command
+  end
+  if tvb:len() == 8 and tvb(4, 4):le_uint() > 8 and tvb(4, 4):le_uint() <= 128 then
+    boot_awaited = { command = tvb(0, 4):le_uint(), size = tvb(4, 4):le_uint() - 8, direction = direction }
+  end
+end
+
+local function read_boot(tvb, tree, pinfo, direction)
+  local command = boot_part(tvb, pinfo, direction)
+  local reader = Reader.new(tvb, tvb:len(), tree)
+  if not command then
+    if tvb:len() < 8 then return nil end
+    command = tvb(0, 4):le_uint()
+    local length = tvb(4, 4):le_uint()
+    if not boot_commands[command] or (length ~= tvb:len() and (tvb:len() ~= 8 or length > 128)) then return nil end
+    reader:number("u32", f.boot_command)
+    reader:number("u32", f.boot_length)
+  end
+  local known = boot_commands[command]
+  if not known then return nil end
+  local info = known[1]
+  for _, name in ipairs(known[2]) do
+    local value = reader:has(4) and reader:number("u32", f["boot_" .. name])
+    if name == "status" and value and value ~= 0 then info = info .. ", status " .. value end
+  end
+  tree:add(f.command, tvb(), info):set_generated()
+  return info
+end
+
 function kral_bytes.dissector(tvb, pinfo, tree)
   pinfo.cols.protocol = "KRAL bytes"
   show_direction(pinfo, direction_of(pinfo))
   local top = tree:add(kral_bytes, tvb())
   top:add(f.direction, direction_of(pinfo)):set_generated()
   if tvb:len() > 0 then top:add(f.noise, tvb()) end
-  pinfo.cols.info = tvb:len() .. " bytes without a frame"
+  pinfo.cols.info = read_boot(tvb, top, pinfo, direction_of(pinfo)) or (tvb:len() .. " bytes without a frame")
   return tvb:len()
 end
 
