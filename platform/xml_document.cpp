@@ -2,6 +2,7 @@
 #include "platform/xml_document.h"
 
 #include <algorithm>
+#include <cstring>
 #include <optional>
 
 #include "platform/file_util.h"
@@ -27,11 +28,22 @@ class Markup {
 
   size_t size() const { return bytes_.size() / unit_; }
   char operator[](size_t index) const {
+    if (unit_ == 1) return static_cast<char>(bytes_[index]);
     const auto unit = bytes_.subspan(index * unit_, unit_);
     for (size_t i = 0; i < unit_; ++i) {
       if (i != place_ && unit[i] != 0) return '\0';
     }
     return static_cast<char>(unit[place_]);
+  }
+  // Its next place, or the end.
+  size_t Find(char character, size_t from) const {
+    if (unit_ == 1) {
+      const auto rest = bytes_.subspan(std::min(from, size()));
+      const void* const found = rest.empty() ? nullptr : std::memchr(rest.data(), character, rest.size());
+      return found != nullptr ? static_cast<size_t>(static_cast<const uint8_t*>(found) - bytes_.data()) : size();
+    }
+    while (from < size() && (*this)[from] != character) ++from;
+    return from;
   }
   bool StartsAt(size_t index, std::string_view text) const {
     if (index + text.size() > size()) return false;
@@ -54,16 +66,13 @@ class Markup {
 
 // From its '<'. Gives the place of its '>', or the end; nothing for a tag beyond the limits.
 std::optional<size_t> EndOfTag(const Markup& markup, size_t begin) {
-  char quote = '\0';
   size_t attributes = 0;
   for (size_t at = begin; at < markup.size(); ++at) {
     const char character = markup[at];
-    if (quote != '\0') {
-      if (character == quote) quote = '\0';
-    } else if (character == '>') {
+    if (character == '>') {
       return at;
     } else if (character == '"' || character == '\'') {
-      quote = character;
+      at = markup.Find(character, at + 1);
     } else if (character == '=') {
       ++attributes;
     }
@@ -91,8 +100,7 @@ std::optional<size_t> EndOfAside(const Markup& markup, size_t at) {
 
 bool HasBoundedTags(std::span<const uint8_t> document, std::string& problem) {
   const Markup markup(document);
-  for (size_t at = 0; at < markup.size(); ++at) {
-    if (markup[at] != '<') continue;
+  for (size_t at = markup.Find('<', 0); at < markup.size(); at = markup.Find('<', at + 1)) {
     if (const auto aside = EndOfAside(markup, at)) {
       at = *aside;
     } else if (const auto end = EndOfTag(markup, at)) {
