@@ -325,8 +325,9 @@ Extent FieldReader::ReadExtent(const XmlElement& element, const char* name, cons
   if (counter.kind == Kind::kSigned && (!counter.least || static_cast<int64_t>(*counter.least) < 0)) {
     throw BadXml(where + " may be negative");
   }
-  const Bits type_most = BitCount(counter) >= 64 ? UINT64_MAX : (Bits{1} << BitCount(counter)) - 1;
-  const Bits counted = most.value_or(counter.most.value_or(std::min<Bits>(type_most, 0xFFFF)));
+  const unsigned bits = BitCount(counter) - (counter.kind == Kind::kSigned ? 1 : 0);
+  const Bits type_most = bits >= 64 ? UINT64_MAX : (Bits{1} << bits) - 1;
+  const Bits counted = std::min(type_most, most.value_or(counter.most.value_or(std::min<Bits>(type_most, 0xFFFF))));
   if (!most && !counter.most && type_most > 0xFFFF)
     throw BadXml(where + " may be more than 64 KiB: there is no " + most_name);
   if (counted > limit || counted == 0) throw BadXml(where + " is out of range: 1 to " + std::to_string(limit));

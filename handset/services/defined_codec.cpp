@@ -209,16 +209,38 @@ class Maker {
   // Before a group is made: what counts, and what conditions look at, must have a value.
   void Count(const std::vector<DefinedField>& fields, const DefinedField& field, const std::string& prefix) {
     if (!IsNumber(field) || !field.count.empty()) return;
-    std::string value = Preset(field, prefix + field.name);
-    for (const DefinedField& other : fields) {
-      if (other.count == field.name) value = std::to_string(Remembered(other, prefix));
-      if (other.size == field.name) {
-        Bytes block;
-        Block(other, prefix + other.name, block);
-        value = std::to_string(block.size());
-      }
+    if (field.type == "bits") {
+      for (const DefinedField& part : field.fields) CountAs(fields, part, field.name + "." + part.name, prefix);
+    } else {
+      CountAs(fields, field, field.name, prefix);
     }
-    values_[prefix + field.name] = value;
+  }
+
+  void CountAs(const std::vector<DefinedField>& fields, const DefinedField& field, const std::string& name,
+               const std::string& prefix) {
+    const auto counted = Counted(fields, name, prefix);
+    values_[prefix + name] = counted ? std::to_string(*counted) : Preset(field, prefix + name);
+  }
+
+  // Of what that name counts, in this group and in those inside it: elements, or bytes. One inside that has a field of
+  // the name means its own.
+  std::optional<size_t> Counted(const std::vector<DefinedField>& fields, const std::string& name,
+                                const std::string& prefix) {
+    for (const DefinedField& other : fields) {
+      const std::string path = prefix + other.name + (other.count.empty() ? "" : "[0]");
+      if (other.count == name) return Remembered(other, prefix);
+      if (other.size == name) {
+        Bytes block;
+        Block(other, path, block);
+        return block.size();
+      }
+      if (other.type != "record" && other.type != "zlib") continue;
+      const bool has_its_own =
+          std::ranges::find(other.fields, name.substr(0, name.find('.')), &DefinedField::name) != other.fields.end();
+      if (has_its_own) continue;
+      if (const auto inside = Counted(other.fields, name, path + ".")) return inside;
+    }
+    return std::nullopt;
   }
 
   // Elements that there are values of.
