@@ -4,6 +4,7 @@ from __future__ import annotations
 import ctypes
 import json
 import os
+import threading
 from typing import Any, Dict, Iterator, List, Mapping, Tuple, Union
 
 from kral._connection import Connection
@@ -83,8 +84,9 @@ def _field_line(field: Dict[str, Any], indent: str = "    ") -> Iterator[str]:
 class Command:
     """One command of a family; its fields are the keywords of a call."""
 
-    def __init__(self, connection: Connection, name: str) -> None:
+    def __init__(self, connection: Connection, lock: threading.Lock, name: str) -> None:
         self._connection = connection
+        self._lock = lock
         length = connection.number("KRAL_CMD_DescribeLength", ctypes.c_uint32, name.encode())
         text = ctypes.create_string_buffer(length)
         connection.check("KRAL_CMD_Describe", name.encode(), text, length)
@@ -104,10 +106,11 @@ class Command:
     def __call__(self, **fields: Any) -> Reply:
         parts = [pair for name, value in fields.items() for pair in _assignments(name, value)]
         text = " ".join(f"{path}={_quoted(value)}" for path, value in parts)
-        self._connection.check("KRAL_CMD_Call", self.name.encode(), text.encode(), None, 0)
-        length = self._connection.number("KRAL_CMD_GetReplyLength", ctypes.c_uint32)
-        reply = ctypes.create_string_buffer(length)
-        self._connection.check("KRAL_CMD_GetReply", reply, length)
+        with self._lock:  # the library keeps one reply for a handset, until the next call
+            self._connection.check("KRAL_CMD_Call", self.name.encode(), text.encode(), None, 0)
+            length = self._connection.number("KRAL_CMD_GetReplyLength", ctypes.c_uint32)
+            reply = ctypes.create_string_buffer(length)
+            self._connection.check("KRAL_CMD_GetReply", reply, length)
         result: Reply = _reply(json.loads(reply.value), self._reply_fields)
         return result
 
@@ -137,6 +140,7 @@ class Commands:
 
     def __init__(self, connection: Connection) -> None:
         self._connection = connection
+        self._lock = threading.Lock()
         self._known: Dict[str, Command] = {}
 
     def load(self, file: Union[str, "os.PathLike[str]"]) -> int:
@@ -159,7 +163,7 @@ class Commands:
 
     def __getitem__(self, name: str) -> Command:
         if name not in self._known:
-            self._known[name] = Command(self._connection, name)
+            self._known[name] = Command(self._connection, self._lock, name)
         return self._known[name]
 
     def __getattr__(self, name: str) -> Family:

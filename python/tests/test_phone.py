@@ -4,6 +4,7 @@ import pathlib
 import struct
 import threading
 import time
+from concurrent.futures import ThreadPoolExecutor
 
 import pytest
 
@@ -75,6 +76,10 @@ def test_commands_by_definition(phone, tmp_path):
         assert [point.power for point in reply.points] == [-5, 7]
         with pytest.raises(kral.BadArgument, match="channel=15 is out of range: 1 to 14"):
             start(channel=15)
+        with ThreadPoolExecutor(2) as threads:  # nobody gets the other's reply
+            fields = {"rate": "11M", "points": [{"power": 1}, {"power": 2}], "label": "", "data": b""}
+            replies = list(threads.map(lambda i: start(channel=1 + i % 2, **fields).channel, range(400)))
+        assert replies == [1, 2] * 200
     assert not hasattr(phone.cmd.WLAN, "TX_STOP")
     phone.cmd.clear()
     assert not hasattr(phone.cmd, "WLAN")
