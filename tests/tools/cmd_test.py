@@ -98,6 +98,11 @@ class DefinedCommands(ToolTest):
                                     self.path("program.c")], capture_output=True, text=True, check=False)
             self.assertEqual((standard, built.returncode, built.stderr), (standard, 0, ""))
 
+    def test_the_header_never_replaces_its_definitions(self):
+        file = self.add("own.xml", self.read(EXAMPLE))
+        self.expect_json(2, "cmd", "header", RF, file, "--output", os.path.join(self.folder, ".", "own.xml"))
+        self.assertEqual(self.content("own.xml"), self.read(EXAMPLE))
+
     def test_names_in_the_header_meet_nothing_and_nothing_is_cut(self):
         ids = iter(range(1000))
 

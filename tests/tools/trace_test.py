@@ -61,6 +61,8 @@ class Traces(ToolTest):
     def test_many_handsets_have_a_trace_each(self):
         with fixture(2, self.folder) as (_, self.ports):
             self.expect(2, "-p", "1,2", "--trace", self.path("both"), "info")
+            one = self.path("{port}")
+            self.assertIn("twice for COM1", self.expect(2, "-p", "1,2", "--trace", one, "--log", one, "info").err)
             done = run("-p", "1,2", "--trace", self.path("{port}.pcapng"), "info", ports=self.ports)
             self.assertEqual(done.returncode, 0, done.err)
             for port in (1, 2):

@@ -215,6 +215,12 @@ void ManyHandsets::RefuseSameFiles() const {
         throw ToolError(ExitCode::kUsage, Format("kral {} writes to the standard output", command_.line->verb()),
                         "name a file with {port}, {serial}, {model} or {slot}");
       }
+      if (first->second == handset->verdict.port) {
+        throw ToolError(
+            ExitCode::kUsage,
+            Format("kral {} would write {} twice for COM{}", command_.line->verb(), file, first->second),
+            "give the files of one handset names that differ, such as log-{port}.txt and trace-{port}.pcapng");
+      }
       throw ToolError(ExitCode::kUsage,
                       Format("kral {} would write {} for both COM{} and COM{}", command_.line->verb(), file,
                              first->second, handset->verdict.port),

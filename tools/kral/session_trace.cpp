@@ -2,12 +2,11 @@
 #include "tools/kral/session_trace.h"
 
 #include <exception>
-#include <filesystem>
-#include <system_error>
 
 #include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/one_file.h"
 #include "tools/kral/output.h"
 
 namespace kral::tool {
@@ -17,17 +16,6 @@ namespace {
 constexpr std::uint32_t kKeptBytes = 8u << 20;
 // Each waits for a second; a disk that takes nothing for so long has gone.
 constexpr int kMostWaits = 30;
-
-// Also by way of links, and of a file that is yet to be made.
-bool IsOneFile(const std::string& one, const std::string& other) {
-  namespace fs = std::filesystem;
-  const auto path = [](const std::string& name) { return fs::absolute(std::u8string(name.begin(), name.end())); };
-  std::error_code error;
-  if (fs::equivalent(path(one), path(other), error)) return true;
-  std::error_code other_error;
-  const auto whole = fs::weakly_canonical(path(one), error);
-  return whole == fs::weakly_canonical(path(other), other_error) && !error && !other_error;
-}
 
 bool Stop(KRAL_HANDLE handle) {
   KRAL_TRACE_COUNTERS counters{};

@@ -8,6 +8,7 @@
 #include "tools/kral/cmd/cmd_definitions.h"
 #include "tools/kral/cmd/cmd_header.h"
 #include "tools/kral/format.h"
+#include "tools/kral/one_file.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -123,6 +124,7 @@ struct HeaderOptions {
 };
 
 void WriteHeader(const Context& context, const HeaderOptions& options) {
+  for (const auto& file : options.files) RefuseSource(file, options.output, "--output");
   Session session(WithoutHandset(context.session));
   LoadCommands(session, options.files);
   const auto& name = options.output.empty() ? options.files.front() : options.output;
