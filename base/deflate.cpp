@@ -15,9 +15,9 @@ Bytef* Input(std::span<const uint8_t> bytes) {
 
 }  // namespace
 
-std::vector<uint8_t> Compress(std::span<const uint8_t> bytes) {
+std::vector<uint8_t> Compress(std::span<const uint8_t> bytes, Effort effort) {
   z_stream stream{};
-  if (deflateInit(&stream, Z_BEST_COMPRESSION) != Z_OK) throw std::bad_alloc();
+  if (deflateInit(&stream, effort == Effort::kFast ? Z_BEST_SPEED : Z_BEST_COMPRESSION) != Z_OK) throw std::bad_alloc();
   std::vector<uint8_t> compressed(deflateBound(&stream, static_cast<uLong>(bytes.size())));
   stream.next_in = Input(bytes);
   stream.avail_in = static_cast<uInt>(bytes.size());
@@ -43,6 +43,20 @@ std::optional<std::vector<uint8_t>> Decompress(std::span<const uint8_t> bytes, s
   inflateEnd(&stream);
   if (!ended || size > limit) return std::nullopt;
   plain.resize(size);
+  return plain;
+}
+
+std::vector<uint8_t> DecompressBeginning(std::span<const uint8_t> bytes, size_t limit) {
+  z_stream stream{};
+  if (inflateInit(&stream) != Z_OK) throw std::bad_alloc();
+  std::vector<uint8_t> plain(limit);
+  stream.next_in = Input(bytes);
+  stream.avail_in = static_cast<uInt>(bytes.size());
+  stream.next_out = plain.data();
+  stream.avail_out = static_cast<uInt>(plain.size());
+  inflate(&stream, Z_SYNC_FLUSH);
+  plain.resize(stream.total_out);
+  inflateEnd(&stream);
   return plain;
 }
 

@@ -27,6 +27,7 @@ inline constexpr uint8_t kTargetModem = KRAL_TARGET_MODEM;              // the d
 inline constexpr uint8_t kTargetApplication = KRAL_TARGET_APPLICATION;  // ... on an application processor
 
 class CaptureWriter;
+struct CaptureLayout;
 class NameTables;
 class OrbtServer;
 class TraceWriter;
@@ -123,7 +124,7 @@ class Diag_FTM {
   // --- Collection (diag_ftm_collection.cpp) -----------------------------------------------------------------------
   TrafficCounters counters();
   // From now on collected packets go to this file as well.
-  bool StartCapture(const char* file_name);
+  bool StartCapture(const char* file_name, const CaptureLayout& layout, uint32_t keep);
   bool StopCapture();  // true when everything collected is in the file
   // A file's packets come as if the handset had sent them.
   bool StartPlayback(const char* file_name, PlayPace pace, const CaptureStretch& stretch);

@@ -4,6 +4,7 @@
 #include "frame/diag_ftm_parts.h"
 #include "platform/file_util.h"
 #include "transport/collection/capture_seek.h"
+#include "transport/collection/capture_series.h"
 
 namespace kral {
 
@@ -20,9 +21,12 @@ TrafficCounters Diag_FTM::counters() {
   return counters;
 }
 
-bool Diag_FTM::StartCapture(const char* file_name) {
+bool Diag_FTM::StartCapture(const char* file_name, const CaptureLayout& layout, uint32_t keep) {
   const bool running = capture().state() != CaptureState::kNone;
-  if (capture().Start([file_name] { return OpenCaptureFile(file_name); }, parts_)) return true;
+  const std::string path = file_name;
+  std::function<CaptureSink()> open = [path] { return OpenCaptureFile(path); };
+  if (layout.file_bytes != 0 || layout.file_seconds != 0) open = CaptureSeries(path, keep);
+  if (capture().Start(open, parts_, layout)) return true;
   log().WriteLine(kLogErr, "Capture file: %s cannot be written or is in use, or a capture runs already", file_name);
   // One that was running and has ended meanwhile was none in the way.
   return Fail(running && capture().state() != CaptureState::kNone
@@ -52,7 +56,7 @@ bool Diag_FTM::StopCapture() {
 bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace, const CaptureStretch& stretch) {
   // Through a phone server there is no dispatcher to play into.
   if (!server_mode() &&
-      player().Start(OpenCaptureSourceAt(file_name, stretch.from), pace, dispatcher(), sorter(), parts_, stretch.to)) {
+      player().Start(OpenCaptureSourceAt(file_name, stretch.from), pace, dispatcher(), sorter(), parts_, stretch)) {
     return true;
   }
   log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",

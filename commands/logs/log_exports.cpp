@@ -90,8 +90,15 @@ bool SetCollectionCallbacks(Diag_FTM& phone, const kral::CollectionCallbacks& ca
   return true;
 }
 
-bool StartCapture(Diag_FTM& phone, const char* file_name) {
-  return phone.StartCapture(file_name);
+bool StartCapture(Diag_FTM& phone, const char* file_name, const kral::CaptureLayout& layout, uint32_t keep) {
+  constexpr uint64_t kSmallestFile = uint64_t{64} << 10;
+  if (layout.file_bytes != 0 && layout.file_bytes < kSmallestFile) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "files of a capture have 65536 bytes at least"));
+  }
+  if (keep != 0 && layout.file_bytes == 0 && layout.file_seconds == 0) {
+    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a capture in one file has none to remove"));
+  }
+  return phone.StartCapture(file_name, layout, keep);
 }
 
 bool StartPlayback(Diag_FTM& phone, const char* file_name, uint32_t pace, const kral::CaptureStretch& stretch) {
@@ -168,7 +175,19 @@ uint8_t KRAL_CALL KRAL_GetTrafficCounters(KRAL_HANDLE handle, KRAL_TRAFFIC_COUNT
 }
 
 uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name) {
-  return ExportCall(handle, __func__).Require(file_name != nullptr, kNoFileName).RunAtOnce(StartCapture, file_name);
+  return ExportCall(handle, __func__)
+      .Require(file_name != nullptr, kNoFileName)
+      .RunAtOnce(StartCapture, file_name, kral::CaptureLayout(), 0U);
+}
+
+uint8_t KRAL_CALL KRAL_StartCaptureWith(KRAL_HANDLE handle, const char* file_name, uint64_t file_bytes,
+                                        uint32_t file_seconds, uint32_t keep, uint32_t compress) {
+  return ExportCall(handle, __func__)
+      .Require(file_name != nullptr, kNoFileName)
+      .RunAtOnce(
+          StartCapture, file_name,
+          kral::CaptureLayout{.compressed = compress != 0, .file_bytes = file_bytes, .file_seconds = file_seconds},
+          keep);
 }
 
 uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle) {

@@ -369,6 +369,24 @@ KRAL_API uint8_t KRAL_CALL KRAL_ExtendedTextMessage_SetCategoryEnable(KRAL_HANDL
 KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* file_name);
 
 /**
+ * The same, compressed, or in several files. Of those each begins where the one before ends, and each can be played by
+ * itself: for "night.cap" they are "night-00001.cap", "night-00002.cap" and so on, behind the last that is there. When
+ * the next cannot be opened, what comes is lost and counted. A compressed file can be played, exported and entered at a
+ * time as others; a crash loses the last second of it.
+ *
+ * @param handle        from a connect function
+ * @param file_name     an ordinary file, emptied first; of several files this name without a number
+ * @param file_bytes    the next file begins with the packet that would make this one longer: 65536 and more; 0: never
+ * @param file_seconds  the next file begins with the first packet that comes so long after the first of this; 0: never
+ * @param keep          when a file begins, the oldest are removed until so many are left with it, those of former
+ *                      captures of that name too; 0: none are
+ * @param compress      1: with zlib
+ * @return 1; 0 as for KRAL_StartCapture, and with a number that is refused
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_StartCaptureWith(KRAL_HANDLE handle, const char* file_name, uint64_t file_bytes,
+                                                 uint32_t file_seconds, uint32_t keep, uint32_t compress);
+
+/**
  * Ends the capture and closes its file. What was collected until then is written still, and while the disk is too slow
  * for that (capture_pending of the counters is not 0) another call waits for it again. The disconnect that releases the
  * handle ends a capture as well; one that leaves it to another connect does not.

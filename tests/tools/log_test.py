@@ -55,6 +55,10 @@ class Traffic(ToolTest):
             self.assertNotRegex(drawn, r"<b>|https?:|NaN|class=\"dropped\"")
             self.assertGreaterEqual(len(re.findall(r"M\d+ 28v-28(?!\d)", drawn)), len(rows))  # the fullest column of each row
             self.expect_json(10, "log", "stats", file, "--html", "/nonexistent/page")
+            before = self.content(file)
+            os.symlink(file, self.path("link"))
+            self.expect_json(2, "log", "stats", file, "--html", self.path("link"))
+            self.assertEqual(self.content(file), before)
             live = self.ask(0, "log", "stats", "--count", "100", "--html", page)
             self.assertIn("(" + self.ports[7] + ")", self.content(page).decode())
             self.assertGreaterEqual(live["counters"]["collected"], 100)
@@ -66,6 +70,46 @@ class Traffic(ToolTest):
         os.truncate(file, os.path.getsize(file) - 1)
         cut = self.stream("log", "play", file)
         self.assertEqual((len(cut) - 1, cut[-1]["cut"]), (done["packets"] - 1, True))
+
+    def test_a_capture_goes_on_in_file_after_file_and_may_be_compressed(self):
+        plain, small = self.path("plain"), self.path("small")
+        with self.handset("--logs", "20000"):
+            self.ask(0, "log", "on", "0x1001")
+            self.ask(0, "log", "capture", plain, "--count", "3000")
+            packets = self.ask(0, "log", "capture", small, "--count", "3000", "--compress")["packets"]
+            done = self.ask(0, "log", "capture", self.path("night.cap"), "--count", "9000", "--rotate", "64K,1h")
+            kept = self.ask(0, "log", "capture", self.path("last.cap"), "--count", "9000", "--rotate", "64K", "--keep",
+                            "2", "--compress")
+            for wrong in (("--rotate", "100m"), ("--rotate", "0K"), ("--rotate", "1h,2h"), ("--rotate", "K"),
+                          ("--rotate", "10"), ("--rotate", "1K"), ("--keep", "3")):
+                self.ask(2, "log", "capture", self.path("wrong"), "--count", "1", *wrong)
+            self.assertFalse(os.path.exists(self.path("wrong")))
+        parts = sorted(name for name in os.listdir(self.folder) if name.startswith("night-"))
+        self.assertEqual(parts, [f"night-{number + 1:05}.cap" for number in range(len(parts))])
+        self.assertGreater(len(parts), 3)
+        self.assertEqual(sum(self.stream("log", "play", self.path(part))[-1]["packets"] for part in parts),
+                         done["packets"])
+        self.assertLessEqual(max(os.path.getsize(self.path(part)) for part in parts), 65536)
+        self.assertLessEqual(len([name for name in os.listdir(self.folder) if name.startswith("last-")]), 2)
+        self.assertGreaterEqual(kept["packets"], 9000)
+
+        self.assertLess(os.path.getsize(small), os.path.getsize(plain) / 2)
+        played = self.stream("log", "play", small)
+        self.assertEqual(len(played) - 1, packets)
+        since = time.strftime("%Y-%m-%dT%H:%M:%S", time.gmtime(played[1000]["microseconds"] // 1000000))
+        since += f".{played[1000]['microseconds'] % 1000000:06}Z"
+        later = [each for each in played[:-1] if each["microseconds"] >= played[1000]["microseconds"]]
+        self.assertEqual(self.stream("log", "play", small, "--from", since)[:-1], later)
+        again = self.path("again")
+        self.assertEqual(self.expect_json(0, "log", "export", small, self.path("small.pcapng"))["packets"], packets)
+        self.assertEqual(self.expect_json(0, "log", "import", self.path("small.pcapng"), again)["packets"], packets)
+        self.assertEqual(self.stream("log", "play", again)[:-1], played[:-1])
+        os.truncate(small, os.path.getsize(small) * 3 // 4)
+        cut = self.expect(0, "log", "stats", small)
+        self.assertIn("is cut or damaged behind its last whole packet", cut.err)
+        rest = self.expect_json(0, "log", "stats", small)
+        self.assertTrue(rest["cut"])
+        self.assertGreater(sum(row["packets"] for row in rest["rows"]), packets // 10)
 
     def test_part_of_a_capture_is_played(self):
         # Two packets on each side of a midnight, ten seconds apart.

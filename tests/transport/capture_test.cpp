@@ -1,14 +1,17 @@
 // Capture files: what the writer keeps when the disk does not, what the reader makes of damaged files, and the paces of
 // a playback.
 #include "base/little_endian.h"
+#include "platform/folder.h"
 #include "tests/support/disk.h"
 #include "tests/support/engine_bundle.h"
 #include "tests/support/temp_folder.h"
 #include "tests/support/test.h"
+#include "transport/collection/capture_blocks.h"
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_player.h"
 #include "transport/collection/capture_reader.h"
 #include "transport/collection/capture_seek.h"
+#include "transport/collection/capture_series.h"
 #include "transport/collection/capture_writer.h"
 
 namespace kral {
@@ -41,10 +44,10 @@ Reading ReadAll(const Packet& bytes) {
   return reading;
 }
 
-Packet Capture(const std::vector<Packet>& packets) {
+Packet Capture(const std::vector<Packet>& packets, CaptureLayout layout = {}) {
   Disk disk;
   CaptureWriter writer(NullLog());
-  EXPECT_TRUE(writer.Start(disk.Opener(), nullptr));
+  EXPECT_TRUE(writer.Start(disk.Opener(), nullptr, layout));
   for (const Packet& packet : packets) writer.Append(packet);
   EXPECT_TRUE(writer.Stop());
   return disk.content();
@@ -90,7 +93,7 @@ TEST(CaptureFile, DamageEndsTheReadingAndForeignFilesAreRefused) {
     Outcome end;
   } cases[] = {
       {"magic", 3, {'X'}, 0, Outcome::kForeign},
-      {"later version", 8, {2}, 0, Outcome::kForeign},
+      {"later version", 8, {3}, 0, Outcome::kForeign},
       {"head too short", 10, {15}, 0, Outcome::kForeign},
       {"head beyond the end", 10, {0, 1}, 0, Outcome::kCut},
       {"longer head", 10, {30}, 1, Outcome::kEnd},
@@ -214,7 +217,7 @@ TEST(CaptureFile, IsWrittenByOneAloneAndNeverUnderAPlayback) {
 class CaptureTimes : public testing::Test {
  protected:
   // Packets whose content looks like records, a second apart or some of them at once.
-  Packet Make(size_t packets) {
+  Packet Make(size_t packets, bool noise = false) {
     std::mt19937 random(7);
     const auto head = CaptureHead();
     Packet file(head.begin(), head.end());
@@ -222,6 +225,7 @@ class CaptureTimes : public testing::Test {
     for (size_t i = 0; i < packets; ++i) {
       time += random() % 3 == 0 ? 0 : random() % 2000;
       Packet packet(2 + random() % 900, 16);
+      if (noise) std::ranges::generate(packet, [&random] { return static_cast<uint8_t>(random()); });
       if (random() % 2 == 0) {
         const auto lure = CaptureRecordHead(random(), 2 + random() % 300);
         for (size_t at = 0; at + lure.size() <= packet.size(); at += lure.size()) {
@@ -283,7 +287,7 @@ TEST_F(CaptureTimes, StretchOfAFileIsReadFromItsFirstPacketToItsLast) {
   const std::string path = folder.Add("capture", {reinterpret_cast<const char*>(file.data()), file.size()});
   const uint64_t from = times_[4000];
   const uint64_t to = times_[4100];
-  CaptureReader reader(OpenCaptureSourceAt(path, from), to);
+  CaptureReader reader(OpenCaptureSourceAt(path, from), {from, to});
   CaptureRecord record;
   std::vector<uint64_t> read;
   while (reader.Next(record) == Outcome::kRecord) read.push_back(record.microseconds);
@@ -292,6 +296,171 @@ TEST_F(CaptureTimes, StretchOfAFileIsReadFromItsFirstPacketToItsLast) {
   EXPECT_EQ(reader.Next(record), Outcome::kEnd);
   CaptureReader foreign(OpenCaptureSourceAt(folder.Add("foreign", "no capture at all, but long enough"), 1));
   EXPECT_EQ(foreign.Next(record), Outcome::kForeign);
+}
+
+// --- Compressed, and in several files --------------------------------------------------------------------------------
+
+const CaptureLayout kCompressed{.compressed = true};
+
+// Every cut of the file is read up to its last whole record, which is never one that was not written.
+TEST(CompressedCapture, CutOrDamagedIsReadAsFarAsItIsWhole) {
+  std::vector<Packet> packets;
+  std::mt19937 random(9);
+  for (size_t i = 0; i < 400; ++i) {
+    packets.emplace_back(2 + random() % 2000, 16);
+    for (auto& byte : packets.back()) byte = i % 2 == 0 ? static_cast<uint8_t>(random()) : byte;
+    packets.back()[0] = 16;
+  }
+  const Packet file = Capture(packets, kCompressed);
+  EXPECT_LT(file.size(), 300'000u);
+  EXPECT_EQ(ReadAll(file).packets, packets);
+  EXPECT_EQ(ReadAll(file).end, Outcome::kEnd);
+
+  std::set<size_t> ends = {capture_head::kSize};
+  while (const auto head = ReadCaptureBlockHead(std::span(file).subspan(*ends.rbegin()))) {
+    ends.insert(*ends.rbegin() + capture_block::kSize + head->stream_size);
+  }
+  ASSERT_TRUE(ends.contains(file.size()));
+  size_t growths = 0;
+  size_t most = 0;
+  for (size_t size = capture_head::kSize; size < file.size(); size += 1 + size % 997) {
+    const Packet cut(file.begin(), file.begin() + static_cast<std::ptrdiff_t>(size));
+    const Reading reading = ReadAll(cut);
+    ASSERT_LE(reading.packets.size(), packets.size());
+    ASSERT_TRUE(std::equal(reading.packets.begin(), reading.packets.end(), packets.begin())) << size;
+    ASSERT_GE(reading.packets.size(), most) << "more of the file is never less of the packets";
+    growths += reading.packets.size() > most ? 1 : 0;
+    most = reading.packets.size();
+    ASSERT_EQ(reading.end, ends.contains(size) ? Outcome::kEnd : Outcome::kCut) << size;
+  }
+  EXPECT_GT(growths, 100u) << "packets of a block that is cut are there";
+  EXPECT_GT(most, packets.size() - 20);
+
+  for (int i = 0; i < 300; ++i) {
+    Packet damaged = file;
+    damaged[capture_head::kSize + random() % (file.size() - capture_head::kSize)] ^= static_cast<uint8_t>(1 << i % 8);
+    const Reading reading = ReadAll(damaged);
+    if (reading.packets.size() == packets.size()) continue;  // the time in the head of a block
+    ASSERT_EQ(reading.end, Outcome::kCut);
+    ASSERT_TRUE(std::equal(reading.packets.begin(), reading.packets.end(), packets.begin()));
+  }
+}
+
+TEST_F(CaptureTimes, AreFoundInACompressedFile) {
+  const test::TempFolder folder;
+  const Packet plain = Make(8000, true);
+  Packet file(capture_head::kSize);
+  std::ranges::copy(CaptureHead(capture_head::kBlocks), file.begin());
+  for (size_t first = 0; first < offsets_.size(); first += 100) {
+    const size_t end = first + 100 < offsets_.size() ? offsets_[first + 100] : plain.size();
+    const auto block = MakeCaptureBlock(std::span(plain).subspan(offsets_[first], end - offsets_[first]));
+    file.insert(file.end(), block.begin(), block.end());
+  }
+  const std::string path = folder.Add("capture", {reinterpret_cast<const char*>(file.data()), file.size()});
+  for (const size_t at : {size_t{0}, size_t{1}, size_t{99}, size_t{100}, size_t{4321}, size_t{7999}}) {
+    const uint64_t from = times_[at];
+    CaptureReader reader(OpenCaptureSourceAt(path, from), {from, from + 50'000});
+    CaptureRecord record;
+    std::vector<uint64_t> read;
+    while (reader.Next(record) == Outcome::kRecord) read.push_back(record.microseconds);
+    EXPECT_EQ(reader.Next(record), Outcome::kEnd);
+    const std::vector<uint64_t> wanted(std::ranges::lower_bound(times_, from),
+                                       std::ranges::upper_bound(times_, from + 50'000));
+    EXPECT_EQ(read, wanted) << at;
+  }
+  size_t bytes_read = 0;
+  const CaptureBytes bytes = [&](uint64_t offset, std::span<uint8_t> buffer) -> std::optional<size_t> {
+    const size_t begin = std::min<size_t>(offset, file.size());
+    const size_t count = std::min(buffer.size(), file.size() - begin);
+    std::copy_n(file.begin() + static_cast<std::ptrdiff_t>(begin), count, buffer.begin());
+    bytes_read += count;
+    return count;
+  };
+  EXPECT_GT(FindCaptureBlock(bytes, capture_head::kSize, file.size(), times_[7900]), file.size() / 10 * 9);
+  EXPECT_LT(bytes_read, file.size() / 2);
+}
+
+TEST(CaptureSeriesTest, FilesEndBySizeAndTimeAndNothingIsMissing) {
+  const struct {
+    const char* name;
+    CaptureLayout layout;
+    uint64_t step;  // between packets
+    size_t least_files;
+  } cases[] = {
+      {"size", {.file_bytes = 70'000}, 10, 14},
+      {"time", {.file_seconds = 2}, 100'000, 50},
+      {"compressed, size", {.compressed = true, .file_bytes = 200'000}, 10, 5},
+      {"compressed, time", {.compressed = true, .file_seconds = 2}, 100'000, 50},
+      {"both", {.file_bytes = 70'000, .file_seconds = 5}, 100'000, 20},
+  };
+  for (const auto& c : cases) {
+    std::vector<Packet> files;
+    const auto open = [&] {
+      files.emplace_back();
+      return CaptureSink([&files](std::span<const uint8_t> bytes) {
+        files.back().insert(files.back().end(), bytes.begin(), bytes.end());
+        return bytes.size();
+      });
+    };
+    std::vector<Packet> packets;
+    std::mt19937 random(11);
+    CaptureWriter writer(NullLog());
+    ASSERT_TRUE(writer.Start(open, nullptr, c.layout));
+    for (size_t i = 0; i < 1000; ++i) {
+      packets.emplace_back(2 + random() % 2000);
+      for (auto& byte : packets.back()) byte = static_cast<uint8_t>(random());
+      writer.Append(packets.back(), 1'000'000'000 + i * c.step);
+    }
+    ASSERT_TRUE(writer.Stop(10'000)) << c.name;
+    EXPECT_EQ(writer.written(), packets.size()) << c.name;
+    EXPECT_EQ(writer.pending(), 0u);
+    EXPECT_GE(files.size(), c.least_files) << c.name;
+    std::vector<Packet> read;
+    for (const Packet& file : files) {
+      EXPECT_LE(file.size(), c.layout.file_bytes != 0 ? c.layout.file_bytes : SIZE_MAX) << c.name;
+      const Reading reading = ReadAll(file);
+      EXPECT_EQ(reading.end, Outcome::kEnd) << c.name;
+      EXPECT_FALSE(reading.packets.empty()) << c.name;
+      read.insert(read.end(), reading.packets.begin(), reading.packets.end());
+    }
+    EXPECT_EQ(read, packets) << c.name;
+  }
+}
+
+TEST(CaptureSeriesTest, NextFileThatCannotBeOpenedIsCountedAsLoss) {
+  for (const bool compressed : {false, true}) {
+    Disk disk;
+    const auto open = [&] { return disk.opened() == 0 ? disk.Opener()() : CaptureSink(); };
+    CaptureWriter writer(NullLog());
+    ASSERT_TRUE(writer.Start(open, nullptr, {.compressed = compressed, .file_seconds = 1}));
+    for (uint64_t i = 0; i < 10; ++i) writer.Append(kPackets[0], i / 5 * 1'000'000 + 1);
+    EXPECT_FALSE(writer.Stop(10'000));
+    EXPECT_EQ(writer.written(), 5u);
+    EXPECT_EQ(writer.lost(), 5u);
+    EXPECT_EQ(ReadAll(disk.content()).packets.size(), 5u);
+  }
+}
+
+TEST(CaptureSeriesTest, NamesAreNumberedAndOnlyTheLatestKept) {
+  const test::TempFolder folder;
+  folder.Add("night-00007.cap", "of a former capture");
+  folder.Add("night-7.cap", "another's");
+  folder.Add("night-00008.txt", "another's");
+  const auto open = CaptureSeries(folder.Path("night.cap"), 2);
+  const auto names = [&] {
+    std::vector<FolderEntry> entries;
+    EXPECT_FALSE(ListFolder(folder.Path(""), entries));
+    std::string all;
+    for (const auto& entry : entries) all += entry.name + " ";
+    return all;
+  };
+  { const auto sink = open(); }
+  EXPECT_EQ(names(), "night-00007.cap night-00008.cap night-00008.txt night-7.cap ");
+  { const auto sink = open(); }
+  EXPECT_EQ(names(), "night-00008.cap night-00008.txt night-00009.cap night-7.cap ");
+  EXPECT_FALSE(CaptureSeries(folder.Path("none/night.cap"), 2)());
+  folder.Add("night-99999.cap", "the last number");
+  EXPECT_FALSE(open()) << "none is written over";
 }
 
 // --- Playback -------------------------------------------------------------------------------------------------------

@@ -100,6 +100,12 @@ BatchWriter::Ended BatchWriter::End(uint32_t time_out_ms) {
   return Ended::kDone;
 }
 
+bool BatchWriter::GoOnIn(const std::function<CaptureSink()>& open) {
+  sink_ = {};
+  sink_ = open();
+  return static_cast<bool>(sink_);
+}
+
 void BatchWriter::Run() {
   const AtExit ended([this] {
     sink_ = {};

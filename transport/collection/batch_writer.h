@@ -75,6 +75,8 @@ class BatchWriter {
 
   // For these three. Gives the number of bytes taken.
   size_t Write(std::span<const uint8_t> bytes);
+  // Closes the file, and goes on in another. False when that cannot be opened: then nothing more may be written.
+  bool GoOnIn(const std::function<CaptureSink()>& open);
 
  private:
   void Run();

@@ -14,7 +14,8 @@ inline constexpr std::array<uint8_t, 8> kMagic = {'K', 'R', 'A', 'L', 'C', 'A', 
 inline constexpr size_t kVersion = 8;    // u16
 inline constexpr size_t kHeadSize = 10;  // u16: where the first record begins; later versions may have longer heads
 inline constexpr size_t kSize = 16;      // the rest is zero
-inline constexpr uint16_t kThisVersion = 1;
+inline constexpr uint16_t kRecords = 1;  // versions: behind the head are records,
+inline constexpr uint16_t kBlocks = 2;   // or blocks of them, each a zlib stream
 }  // namespace capture_head
 
 // A record: this head, then the packet as it was de-framed, FCS bytes included.
@@ -25,6 +26,18 @@ inline constexpr size_t kLengthComplement = 10;  // u16: tells a record from wha
 inline constexpr size_t kSize = 12;
 inline constexpr size_t kShortestPacket = 2;
 }  // namespace capture_record
+
+// A block: this head, then a zlib stream of whole records. Each can be read without those in front of it.
+namespace capture_block {
+inline constexpr std::array<uint8_t, 4> kMark = {'K', 'B', 'L', 'K'};
+inline constexpr size_t kStreamSize = 4;            // u32
+inline constexpr size_t kStreamSizeComplement = 8;  // u32
+inline constexpr size_t kRecordsSize = 12;          // u32: what the stream holds
+inline constexpr size_t kMicroseconds = 16;         // u64: of the first record
+inline constexpr size_t kSize = 24;
+inline constexpr size_t kMostRecords = size_t{128} << 10;
+inline constexpr size_t kLongestStream = kMostRecords + 1024;  // what does not shrink grows a little
+}  // namespace capture_block
 
 }  // namespace kral
 

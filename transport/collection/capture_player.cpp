@@ -31,7 +31,7 @@ CapturePlayer::~CapturePlayer() {
 }
 
 bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& dispatcher, CKralEventListener& sorter,
-                          std::shared_ptr<void> owner, uint64_t to) {
+                          std::shared_ptr<void> owner, CaptureStretch stretch) {
   const MutexLock control(control_mutex_);
   if (!source || state_ == PlayState::kPlaying) return false;
   // Its end is told a moment before the thread has left.
@@ -45,7 +45,7 @@ bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& disp
   skipped_ = 0;
   ended_.Reset();
   sorter.SetCollection(true);
-  std::function<void()> body = [this, reader = CaptureReader(std::move(source), to),
+  std::function<void()> body = [this, reader = CaptureReader(std::move(source), stretch),
                                 line = Line{pace, dispatcher, sorter}]() mutable { Play(reader, line); };
   state_ = PlayState::kPlaying;
   if (thread_.Start(std::move(body), std::move(owner))) return true;

@@ -45,10 +45,9 @@ class CapturePlayer {
   CapturePlayer& operator=(const CapturePlayer&) = delete;
 
   // Turns collection on and plays on a thread of its own, which keeps `owner` alive: it holds this object, the
-  // dispatcher and the sorter. It ends in front of the first packet later than `to`. False without a source, and while
-  // another file is played.
+  // dispatcher and the sorter. False without a source, and while another file is played.
   bool Start(CaptureSource source, PlayPace pace, CKralEvents& dispatcher, CKralEventListener& sorter,
-             std::shared_ptr<void> owner, uint64_t to = UINT64_MAX);
+             std::shared_ptr<void> owner, CaptureStretch stretch = {});
   // False when the thread, held up in a listener, did not end in time. Called by the callback, it waits for nothing:
   // the playback ends in front of the packet that the callback was shown.
   bool Stop(uint32_t time_out_ms = 1000);

@@ -8,6 +8,7 @@
 
 #include "base/little_endian.h"
 #include "platform/file_util.h"
+#include "transport/collection/capture_blocks.h"
 #include "transport/collection/capture_format.h"
 #include "transport/engine/bounded_queue.h"
 
@@ -31,18 +32,25 @@ CaptureReader::Outcome CaptureReader::Next(CaptureRecord& record) {
     last_ = ReadHead();
     if (last_ != Outcome::kRecord) return last_;
   }
-  return last_ = ReadRecord(record);
+  do {
+    last_ = ReadRecord(record);
+  } while (last_ == Outcome::kRecord && record.microseconds < stretch_.from);
+  stretch_.from = 0;
+  return last_;
 }
 
 CaptureReader::Outcome CaptureReader::ReadHead() {
   std::array<uint8_t, capture_head::kSize> head{};
   if (!source_ || source_(head) != head.size()) return Outcome::kForeign;
   if (!std::equal(capture_head::kMagic.begin(), capture_head::kMagic.end(), head.begin())) return Outcome::kForeign;
-  if (*LoadLe<uint16_t>(head, capture_head::kVersion) != capture_head::kThisVersion) return Outcome::kForeign;
+  const auto version = *LoadLe<uint16_t>(head, capture_head::kVersion);
+  if (version != capture_head::kRecords && version != capture_head::kBlocks) return Outcome::kForeign;
   const size_t size = *LoadLe<uint16_t>(head, capture_head::kHeadSize);
   if (size < head.size()) return Outcome::kForeign;
   std::vector<uint8_t> skipped(size - head.size());
-  return source_(skipped) == skipped.size() ? Outcome::kRecord : Outcome::kCut;
+  if (source_(skipped) != skipped.size()) return Outcome::kCut;
+  if (version == capture_head::kBlocks) source_ = UnpackCaptureBlocks(std::move(source_));
+  return Outcome::kRecord;
 }
 
 CaptureReader::Outcome CaptureReader::ReadRecord(CaptureRecord& record) {
@@ -55,7 +63,7 @@ CaptureReader::Outcome CaptureReader::ReadRecord(CaptureRecord& record) {
   if (length != complement || length < capture_record::kShortestPacket || length > kMaximumPacket) {
     return Outcome::kCut;
   }
-  if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) > to_) return Outcome::kEnd;
+  if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) > stretch_.to) return Outcome::kEnd;
   std::vector<uint8_t> packet(length);
   if (source_(packet) != packet.size()) return Outcome::kCut;
   record.microseconds = *LoadLe<uint64_t>(head, capture_record::kMicroseconds);

@@ -39,8 +39,8 @@ class CaptureReader {
     kForeign,  // not a capture file, or one of a later version
   };
 
-  // It ends in front of the first record that is later than `to`.
-  explicit CaptureReader(CaptureSource source, uint64_t to = UINT64_MAX) : source_(std::move(source)), to_(to) {}
+  explicit CaptureReader(CaptureSource source, CaptureStretch stretch = {})
+      : source_(std::move(source)), stretch_(stretch) {}
 
   // Once it has given anything but kRecord it goes on giving that.
   Outcome Next(CaptureRecord& record);
@@ -50,7 +50,7 @@ class CaptureReader {
   Outcome ReadRecord(CaptureRecord& record);
 
   CaptureSource source_;
-  uint64_t to_;
+  CaptureStretch stretch_;
   bool begun_ = false;
   Outcome last_ = Outcome::kRecord;
 };

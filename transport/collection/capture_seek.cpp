@@ -1,5 +1,5 @@
 // Halves the file again and again. Records have no mark in front of them: one is recognized by its length, which stands
-// there twice, and by those that follow it.
+// there twice, and by those that follow it. Blocks of compressed records have a mark.
 #include "transport/collection/capture_seek.h"
 
 #include <algorithm>
@@ -11,6 +11,7 @@
 
 #include "base/little_endian.h"
 #include "platform/file_util.h"
+#include "transport/collection/capture_blocks.h"
 #include "transport/collection/capture_format.h"
 #include "transport/engine/bounded_queue.h"
 
@@ -62,19 +63,38 @@ std::optional<Place> FindRecord(const CaptureBytes& bytes, uint64_t offset) {
   return std::nullopt;
 }
 
-}  // namespace
+// The first block at or behind an offset.
+std::optional<Place> FindBlock(const CaptureBytes& bytes, uint64_t offset) {
+  constexpr size_t kLongestBlock = capture_block::kSize + capture_block::kLongestStream;
+  std::vector<uint8_t> window(kLongestBlock + capture_block::kSize);
+  const size_t count = bytes(offset, window).value_or(0);
+  const std::span<const uint8_t> read = std::span(window).first(count);
+  for (size_t at = 0; at + capture_block::kSize <= count; ++at) {
+    if (const auto head = ReadCaptureBlockHead(read.subspan(at))) return Place{offset + at, head->microseconds};
+  }
+  return std::nullopt;
+}
 
-uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
-  const uint64_t whole = end;
+// A place in front of which all is earlier, and which is not far from the one that is sought.
+template <class Find>
+uint64_t Halve(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds, Find find) {
   while (end - begin > kShortStretch) {
     const uint64_t middle = begin + (end - begin) / 2;
-    const auto place = FindRecord(bytes, middle);
+    const std::optional<Place> place = find(bytes, middle);
     if (place && place->offset < end && place->microseconds < microseconds) {
       begin = place->offset;
     } else {
       end = middle;
     }
   }
+  return begin;
+}
+
+}  // namespace
+
+uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
+  const uint64_t whole = end;
+  begin = Halve(bytes, begin, end, microseconds, FindRecord);
   // The one that is sought may be the next behind the end.
   for (std::array<uint8_t, capture_record::kSize> head{};;) {
     if (bytes(begin, head) != head.size()) return begin;
@@ -83,6 +103,21 @@ uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end
     if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) >= microseconds) return begin;
     begin += *size;
   }
+}
+
+uint64_t FindCaptureBlock(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
+  begin = Halve(bytes, begin, end, microseconds, FindBlock);
+  std::array<uint8_t, capture_block::kSize> bytes_of_head{};
+  const auto head_at = [&](uint64_t offset) {
+    return bytes(offset, bytes_of_head) == bytes_of_head.size() ? ReadCaptureBlockHead(bytes_of_head) : std::nullopt;
+  };
+  for (auto head = head_at(begin); head;) {
+    const uint64_t next = begin + capture_block::kSize + head->stream_size;
+    head = head_at(next);
+    if (!head || head->microseconds >= microseconds) return begin;
+    begin = next;
+  }
+  return begin;
 }
 
 CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds) {
@@ -102,7 +137,9 @@ CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds
   if (bytes(0, head) == head.size()) records = *LoadLe<uint16_t>(head, capture_head::kHeadSize);
   // What is no capture is the reader's to tell.
   const bool is_capture = records >= head.size() && std::ranges::equal(capture_head::kMagic, std::span(head).first(8));
-  const uint64_t begin = is_capture ? FindCaptureTime(bytes, records, file->size(), microseconds) : records;
+  const auto find =
+      *LoadLe<uint16_t>(head, capture_head::kVersion) == capture_head::kBlocks ? FindCaptureBlock : FindCaptureTime;
+  const uint64_t begin = is_capture ? find(bytes, records, file->size(), microseconds) : records;
   return [lock, bytes, records, begin, at = uint64_t{0}](std::span<uint8_t> buffer) mutable -> std::optional<size_t> {
     const auto from_head = static_cast<size_t>(std::min<uint64_t>(buffer.size(), at < records ? records - at : 0));
     const auto head_bytes = from_head == 0 ? std::optional(size_t{0}) : bytes(at, buffer.first(from_head));

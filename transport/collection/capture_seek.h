@@ -21,7 +21,11 @@ using CaptureBytes = std::function<std::optional<size_t>(uint64_t offset, std::s
 // Times are taken to grow; where the clock was set back, it is one of the places that fit.
 uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds);
 
-// As OpenCaptureSource: the head of the file, and behind it its records from that time on.
+// The same for a file of blocks: the last of those that begin before this time, which may hold the record.
+uint64_t FindCaptureBlock(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds);
+
+// As OpenCaptureSource: the head of the file, and behind it its records from that time on, or, in a file of blocks,
+// from a little before it.
 CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds);
 
 }  // namespace kral

@@ -1,15 +1,18 @@
 // kral log: which logs a handset sends, and what becomes of them.
 #include <algorithm>
 #include <array>
+#include <charconv>
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/file_util.h"
 #include "tools/kral/call_failure.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/one_file.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/session_trace.h"
 #include "tools/kral/traffic/playback.h"
@@ -35,6 +38,9 @@ struct LogOptions {
   std::string from;
   std::string to;
   bool as_recorded = false;
+  std::vector<std::string> rotate;
+  std::uint32_t keep = 0;
+  bool compress = false;
   Limit limit;
 };
 
@@ -160,6 +166,44 @@ KRAL_TRAFFIC_COUNTERS CountersOf(KRAL_HANDLE handle) {
   return counters;
 }
 
+// When the next file begins.
+struct Rotation {
+  std::uint64_t bytes = 0;
+  std::uint32_t seconds = 0;
+};
+
+Rotation ParseRotation(const std::vector<std::string>& words) {
+  struct Unit {
+    std::string_view name;
+    bool is_time;
+    std::uint64_t factor;
+  };
+  constexpr std::array<Unit, 6> kUnits = {{{"K", false, 1ULL << 10},
+                                           {"M", false, 1ULL << 20},
+                                           {"G", false, 1ULL << 30},
+                                           {"s", true, 1},
+                                           {"min", true, 60},
+                                           {"h", true, 3600}}};
+  constexpr std::uint64_t kMost = 1'000'000;
+  Rotation rotation;
+  for (const auto& word : words) {
+    const std::size_t digits = std::min(word.find_first_not_of("0123456789"), word.size());
+    const auto unit = std::ranges::find(kUnits, std::string_view(word).substr(digits), &Unit::name);
+    std::uint64_t number = 0;
+    std::from_chars(word.data(), word.data() + digits, number);
+    const bool twice = unit != kUnits.end() && (unit->is_time ? rotation.seconds != 0 : rotation.bytes != 0);
+    if (unit == kUnits.end() || number == 0 || number > kMost || twice) {
+      throw ToolError(ExitCode::kUsage, Format("--rotate {} is no size and no time", word),
+                      "write 100M for files of that size (K, M, G), 30min for files of that time (s, min, h), or both: "
+                      "100M,1h");
+    }
+    if (unit->is_time)
+      rotation.seconds = static_cast<std::uint32_t>(std::min<std::uint64_t>(number * unit->factor, UINT32_MAX));
+    if (!unit->is_time) rotation.bytes = number * unit->factor;
+  }
+  return rotation;
+}
+
 // However slow the disk is, until Ctrl-C; one that has ended the capture does not end this.
 KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
   const bool interrupted_before = Interrupted();
@@ -172,11 +216,16 @@ KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
 
 void Capture(Context& context, LogOptions& options) {
   const auto codes = ParseIds(options.codes);
+  const auto rotation = ParseRotation(options.rotate);
+  if (options.keep != 0 && options.rotate.empty()) {
+    throw ToolError(ExitCode::kUsage, "--keep without --rotate: there is one file", "say when the next file begins");
+  }
   RefuseLogFile(context.session.log_file, options.file, "the capture");
   Session session(context.session);
   // First: the old recording stays as it is where a code is refused.
   SwitchCodes(session, codes, true);
-  if (KRAL_StartCapture(session.handle(), options.file.c_str()) == 0) {
+  if (KRAL_StartCaptureWith(session.handle(), options.file.c_str(), rotation.bytes, rotation.seconds, options.keep,
+                            options.compress ? 1 : 0) == 0) {
     throw ExplainRecord(LastError(session.handle()), "the capture", session.port(),
                         "check folder, permissions and room on the disk");
   }
@@ -201,7 +250,8 @@ void Capture(Context& context, LogOptions& options) {
     throw ToolError(ExitCode::kBadFile, Format("{} of the packets are not in {}", missing, options.file),
                     "check the room on the disk and its speed; what is in the file can be played");
   }
-  context.out.Result(members, Format("{} in {}\n", Counted(counters.captured, "packet"), options.file));
+  const auto where = options.rotate.empty() ? options.file : Format("files named after {}", options.file);
+  context.out.Result(members, Format("{} in {}\n", Counted(counters.captured, "packet"), where));
 }
 
 void NoteCut(const Context& context, const std::string& file) {
@@ -265,6 +315,7 @@ void WritePage(const Timeline& timeline, const std::string& title, const std::st
 
 void FileStatistics(const Context& context, const LogOptions& options) {
   options.limit.Reject("a capture file");
+  RefuseSource(options.file, options.page, "--html");
   const OfflineHandle handle;
   LoadTable(handle.get(), KRAL_TABLE_LOG_NAMES, options.names);
   TrafficTable table;
@@ -372,6 +423,10 @@ void AddLogVerbs(const Command& root, Context& context) {
   const auto capture = log.Verb("capture", "Write what comes to a file, until Ctrl-C");
   capture.Add("file", options->file, "The capture file; it is emptied when the codes are on").Required().File();
   AddCodes(capture, options, "--on");
+  capture.Add("--rotate", options->rotate, "A new file each 100M (K, M, G), 1h (s, min, h), or both: 100M,1h")
+      .Separated(',');
+  capture.Add("--keep", options->keep, "With --rotate: how many files are left, the latest; default: all");
+  capture.Flag("--compress", options->compress, "With zlib; everything reads it that reads captures");
   options->limit.AddTo(capture, "packets");
   capture.ForMany();
   capture.Writes([options] { return std::vector<std::string>{options->file}; });

@@ -1,0 +1,82 @@
+// Numbers in the names of files.
+#include "transport/collection/capture_series.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cstdio>
+#include <optional>
+#include <string_view>
+#include <vector>
+
+#include "platform/file_util.h"
+#include "platform/folder.h"
+
+namespace kral {
+namespace {
+
+constexpr size_t kDigits = 5;
+constexpr uint32_t kMostFiles = 99999;
+
+struct SeriesName {
+  explicit SeriesName(const std::string& path) {
+    const size_t slash = path.find_last_of("/\\");
+    const size_t name = slash == std::string::npos ? 0 : slash + 1;
+    const size_t dot = path.find_last_of('.');
+    // A name that begins with its only dot has no ending.
+    const size_t end = dot == std::string::npos || dot <= name ? path.size() : dot;
+    folder = name == 0 ? "." : path.substr(0, name);
+    stem = path.substr(name, end - name) + "-";
+    begin = path.substr(0, end) + "-";
+    ending = path.substr(end);
+  }
+
+  std::string Path(uint32_t number) const {
+    std::array<char, kDigits + 1> digits{};
+    std::snprintf(digits.data(), digits.size(), "%05u", static_cast<unsigned>(number));
+    return begin + digits.data() + ending;
+  }
+
+  std::optional<uint32_t> NumberOf(std::string_view name) const {
+    if (name.size() != stem.size() + kDigits + ending.size() || !name.starts_with(stem) || !name.ends_with(ending)) {
+      return std::nullopt;
+    }
+    const auto digits = name.substr(stem.size(), kDigits);
+    uint32_t number = 0;
+    const auto end = digits.data() + digits.size();
+    const auto result = std::from_chars(digits.data(), end, number);
+    return result.ec == std::errc() && result.ptr == end ? std::optional(number) : std::nullopt;
+  }
+
+  std::string folder;
+  std::string stem;
+  std::string begin;
+  std::string ending;
+};
+
+CaptureSink OpenNext(const SeriesName& name, uint32_t keep) {
+  std::vector<FolderEntry> entries;
+  if (ListFolder(name.folder, entries)) return {};
+  std::vector<uint32_t> numbers;
+  for (const auto& entry : entries) {
+    const auto number = name.NumberOf(entry.name);
+    if (number && entry.file.kind == LocalKind::kFile) numbers.push_back(*number);
+  }
+  std::ranges::sort(numbers);
+  const uint32_t last = numbers.empty() ? 0 : numbers.back();
+  if (last >= kMostFiles) return {};
+  const size_t left = keep == 0 ? numbers.size() : std::min<size_t>(numbers.size(), keep - 1);
+  for (size_t i = 0; i < numbers.size() - left; ++i) {
+    const auto path = name.Path(numbers[i]);
+    if (!IsInUse(path)) std::remove(path.c_str());  // one that is being played goes another time
+  }
+  return OpenCaptureFile(name.Path(last + 1));
+}
+
+}  // namespace
+
+std::function<CaptureSink()> CaptureSeries(const std::string& path, uint32_t keep) {
+  return [name = SeriesName(path), keep] { return OpenNext(name, keep); };
+}
+
+}  // namespace kral
