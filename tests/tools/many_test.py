@@ -74,6 +74,10 @@ class ManyHandsets(ToolTest):
                     (2, "x.pkv for both COM1 and COM2", ("-p", "1,2", "nv", "backup", self.path("x.pkv"))),
                     (2, "both COM1 and COM2", ("--all", "fs", "get", ":/x")),
                     (2, "both COM1 and COM3", ("-p", "1,3", "info", "--log", log)),
+                    (2, "named", ("info", "--report", log)),
+                    (2, "does nothing to handsets", ("-p", "1", "band", "list", "--report", log)),
+                    (2, "beside the report", ("-p", "1", "nv", "backup", log, "--report", log)),
+                    (10, "cannot be written", ("-p", "1", "fs", "mkdir", ":/made", "--report", "/nonexistent/page")),
                     (3, "nothing was done", ("-p", "1-3,5", "fs", "mkdir", ":/made"))):
                 with self.subTest(words=words):
                     self.assertIn(text, self.expect_json(code, *words)["error"]["text"])
@@ -90,7 +94,8 @@ class ManyHandsets(ToolTest):
 
     def test_a_download_is_one_job_for_all_handsets(self):
         programmer = self.add("programmer", BootLoader.PROGRAMMER)
-        image = self.add("software", BootLoader.SOFTWARE)
+        image = self.add("<b>software", BootLoader.SOFTWARE)
+        page = self.path("page.html")
         with self.fixture(3, "--loader", "boot", "--fault-at", "2:wrong=13,of=08") as (_, self.ports):
             self.expect_json(2, "--all", "flash", "all", programmer, image)
             self.expect_json(2, "-p", "1,2", "boot", "info", "--log", self.path("{serial}"))
@@ -105,8 +110,19 @@ class ManyHandsets(ToolTest):
                              [(port, len(BootLoader.SOFTWARE), 1) for port in (1, 3)])
             self.assertEqual({row["build"]["software_revision"]
                               for row in self.expect_json(0, "-p", "1,3", "info")["handsets"]}, {"VHS-2.0.1"})
-            answer = self.expect_json(12, "-p", "1,2", *flash)
+            answer = self.expect_json(12, "-p", "1,2", "--report", page, *flash)
             self.assertEqual([row["ok"] for row in answer["handsets"]], [True, False])
+            # How long each step took is told, without a gap in between.
+            steps = answer["handsets"][0]["steps"]
+            self.assertEqual([step["step"] for step in steps], ["identity", "enter loader", "flash programmer (programmer)",
+                                                                "image 1 (<b>software)"])
+            for step, following in zip(steps, steps[1:]):
+                self.assertAlmostEqual(step["begin"] + step["seconds"], following["begin"], delta=0.003)
+            rows = re.findall(r'<tr class="(\w+)"><td>COM(\d)</td><td>(\w+)</td>.*"verdict">(.*)</td></tr>',
+                              self.content("page.html").decode())
+            self.assertEqual([row[:3] for row in rows], [("passed", "1", "00000010"), ("failed", "2", "00000011")])
+            self.assertIn(answer["handsets"][1]["error"]["hint"], rows[1][3])
+            self.assertIn(b"image 1 (&lt;b>software) ", self.content("page.html"))
             self.assertEqual(answer["handsets"][1]["error"]["name"], "link")
 
     def test_an_interrupt_ends_all_of_them(self):

@@ -38,6 +38,7 @@ class Board::RowLane final : public Lane {
     const std::lock_guard lock(board_.mutex_);
     const bool is_new = row().shown.work != shown.work;
     row().shown = shown;
+    if (is_new) verdict_.steps.Enter(shown.work, board_.seconds());
     if (board_.style_ == Style::kLines && is_new) board_.Say(row(), shown.work);
     if (board_.style_ != Style::kJson) return;
     Json event{{"event", "progress"}, {"port", row().port}};
@@ -90,6 +91,10 @@ void Board::End(std::size_t row, const Verdict& verdict) {
   if (style_ != Style::kJson) return;
   const Json event{{"event", "verdict"}, {"port", verdict.port}, {"ok", verdict.passed()}};
   WriteAside(JsonLine(event));
+}
+
+double Board::seconds() const {
+  return std::chrono::duration<double>(std::chrono::steady_clock::now() - begin_).count();
 }
 
 void Board::Say(const Row& row, std::string_view text) {

@@ -3,6 +3,7 @@
 #ifndef KRAL_TOOLS_BOARD_H
 #define KRAL_TOOLS_BOARD_H
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
@@ -14,6 +15,7 @@
 
 #include "tools/kral/lane.h"
 #include "tools/kral/output.h"
+#include "tools/kral/step_times.h"
 
 namespace kral::tool {
 
@@ -26,6 +28,7 @@ struct Verdict {
   std::optional<ToolError> failure;
   std::string data;               // text of its result
   Json members = Json::object();  // the same with --json
+  StepTimes steps;
 
   bool passed() const { return !failure; }
 };
@@ -43,7 +46,8 @@ class Board {
 
   void Begin(std::size_t row, const Verdict& verdict);
   void End(std::size_t row, const Verdict& verdict);
-  void Draw();  // about ten times a second
+  void Draw();             // about ten times a second
+  double seconds() const;  // since it was made
   // Data on stdout that do not get in the way of the lines.
   void Print(std::string_view text);
 
@@ -66,6 +70,7 @@ class Board {
 
   const Output& out_;
   const Style style_;
+  const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
   std::mutex mutex_;
   std::vector<Row> rows_;
   std::deque<RowLane> lanes_;

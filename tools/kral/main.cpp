@@ -12,8 +12,10 @@
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/many_handsets.h"
+#include "tools/kral/page.h"
 #include "tools/kral/port_names.h"
 #include "tools/kral/result_lines.h"
+#include "tools/kral/session_trace.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -56,6 +58,7 @@ void AddCommonOptions(const Command& root, Context& context) {
            "Write the last of it to this file, if the command fails")
       .File()
       .Check(FaultOfTraceFile);
+  root.Add("--report", context.report, "Write a page with steps, times and verdict of each handset to this file");
   root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
       .Between(1, kLongestTimeOutMs, "ms")
       .Settled("time_out");
@@ -99,8 +102,7 @@ int End(const Context& context, const ToolError& error) {
   try {
     TellLogFileTrouble(context);
     Json members = Json::object();
-    const bool is_of_one = !context.all && context.session.port.find_first_of(",-") == std::string::npos;
-    if (is_of_one && LatestPort() != 0) members["port"] = LatestPort();
+    if (!context.for_several() && LatestPort() != 0) members["port"] = LatestPort();
     members.update(context.found);
     context.out.Failure(error, members);
   } catch (const std::exception&) {  // nobody is left to be told
@@ -129,6 +131,21 @@ std::vector<std::string> WithUsualWait(std::vector<std::string> arguments) {
   return arguments;
 }
 
+// Before anything is done: the page comes at the end of work that may take long.
+void CheckReport(Context& context, const CommandLine& line) {
+  if (context.report.empty()) return;
+  context.title = "kral " + line.verb();
+  if (line.asks_nobody() || !line.for_many()) {
+    throw ToolError(ExitCode::kUsage, Format("{} does nothing to handsets that could be reported", context.title),
+                    "leave --report out");
+  }
+  if (!context.all && context.session.port.empty()) {
+    throw ToolError(ExitCode::kUsage, "a report is of ports that are named", "-p 7, -p 7-14 or --all");
+  }
+  RefuseLogFile(context.session.log_file, context.report, "the report");
+  CheckPage(context.report, "--report");
+}
+
 // From here on ports are numbers.
 void FindPorts(Context& context, const std::string& verb) {
   auto& session = context.session;
@@ -138,6 +155,7 @@ void FindPorts(Context& context, const std::string& verb) {
 }
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
+  CheckReport(command->context, *command->line);
   if (command->line->asks_nobody()) {
     IsForMany(*command);  // which may refuse
     return command->act();
@@ -148,12 +166,12 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     own->context.session.port = std::to_string(port);
     own->context.session.slots = command->context.session.slots;
     own->context.all = false;
+    own->context.report.clear();
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
   // A verb that takes several ports as they are names their files itself.
-  const bool several = command->context.all || command->context.session.port.find_first_of(",-") != std::string::npos;
-  if (!command->line->asked().empty() && !several) {
+  if (!command->line->asked().empty() && !command->context.for_several()) {
     const auto found = command->context.session;
     command = ParseAgain(arguments, *command->line, NamesOf(*command->line, found));
     command->context.session.port = found.port;

@@ -201,6 +201,7 @@ void ManyHandsets::Prepare() {
 
 void ManyHandsets::RefuseSameFiles() const {
   std::map<std::string, std::uint16_t> writers;
+  const auto& report = context().report;
   for (const auto& handset : handsets_) {
     if (!handset->command) continue;
     auto files = handset->command->line->Written();
@@ -209,6 +210,11 @@ void ManyHandsets::RefuseSameFiles() const {
       if (!file.empty()) files.push_back(file);
     }
     for (const auto& file : files) {
+      if (file == report) {
+        throw ToolError(ExitCode::kUsage,
+                        Format("kral {} would write {} beside the report", command_.line->verb(), file),
+                        "give the report a file of its own");
+      }
       const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
       if (is_new) continue;
       if (file == "-") {
@@ -232,11 +238,15 @@ void ManyHandsets::RefuseSameFiles() const {
 void ManyHandsets::WorkOn(std::size_t number, Board& board) {
   const auto& command = handsets_[number]->command;
   auto& verdict = handsets_[number]->verdict;
-  const auto begin = std::chrono::steady_clock::now();
+  const auto begin = board.seconds();
   board.Begin(number, verdict);
   command->context.out.UseLane(board.LaneOf(number, verdict));
+  verdict.steps.Enter("connect", begin);
   const auto stop_clock = [&] {
-    verdict.seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
+    const auto end = board.seconds();
+    verdict.seconds = end - begin;
+    verdict.steps.End(end);
+    verdict.steps.NameTheOnly(command_.line->verb());
   };
   try {
     command->act();
@@ -356,7 +366,7 @@ bool IsForMany(const ParsedCommand& command) {
     throw ToolError(ExitCode::kUsage, "--all and --port say different things", "give one of them");
   }
   if (command.line->takes_ports()) return false;
-  const bool many = context.all || context.session.port.find_first_of(",-") != std::string::npos;
+  const bool many = context.for_several();
   if (!many || command.line->for_many()) return many;
   throw ToolError(ExitCode::kUsage, Format("kral {} is for one handset at a time", command.line->verb()),
                   "name one port: -p 7");

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <string>
 
 #include "tools/kral/command_line.h"
 #include "tools/kral/output.h"
@@ -16,8 +17,13 @@ struct Context {
   bool all = false;  // every port on which a handset answers
   std::optional<double> wait_s;
   std::uint16_t jobs = 0;  // handsets that are worked on at once; 0: as many as there are
+  std::string report;      // file of the page on all handsets
+  std::string title;       // "kral flash all"
   Output out;
   Json found = Json::object();  // what a verb found out before it failed, for the JSON object of the failure
+
+  // Each handset has a row and a verdict of its own, also when it is the only one.
+  bool for_several() const { return all || session.port.find_first_of(",-") != std::string::npos || !report.empty(); }
 };
 
 void AddBootVerbs(const Command& root, Context& context);  // behind AddFlashVerbs

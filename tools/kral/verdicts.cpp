@@ -3,15 +3,31 @@
 
 #include <algorithm>
 #include <cmath>
+#include <optional>
 #include <set>
 
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/page.h"
+#include "tools/kral/run_report.h"
 
 namespace kral::tool {
 namespace {
 
 using Verdicts = std::vector<const Verdict*>;
+
+double InMilliseconds(double seconds) {
+  return std::round(seconds * 1000) / 1000;
+}
+
+Json StepsOf(const Verdict& verdict) {
+  Json steps = Json::array();
+  for (const auto& step : verdict.steps.all()) {
+    steps.push_back(
+        {{"step", step.name}, {"begin", InMilliseconds(step.begin)}, {"seconds", InMilliseconds(step.seconds())}});
+  }
+  return steps;
+}
 
 Json RowsOf(const Verdicts& verdicts) {
   Json rows = Json::array();
@@ -20,7 +36,8 @@ Json RowsOf(const Verdicts& verdicts) {
              {"ok", verdict->passed()},
              {"serial", verdict->serial},
              {"model", verdict->model},
-             {"seconds", std::round(verdict->seconds * 1000) / 1000}};
+             {"seconds", InMilliseconds(verdict->seconds)}};
+    if (!verdict->steps.all().empty()) row["steps"] = StepsOf(*verdict);
     row.update(verdict->members);
     if (!verdict->passed()) row["error"] = ErrorJson(*verdict->failure);
     rows.push_back(std::move(row));
@@ -35,6 +52,17 @@ std::string TableOf(const Verdicts& verdicts) {
                    verdict->passed() ? "passed" : Format("FAILED: {}", verdict->failure->what()));
   }
   return text;
+}
+
+// What became of the handsets is told all the same when it cannot be written.
+std::optional<ToolError> WriteReport(const Context& context, const Verdicts& verdicts) {
+  if (context.report.empty()) return {};
+  try {
+    WritePage(context.report, RunPage({context.title, TimeNow(), context.session.slots}, verdicts), "--report");
+    return {};
+  } catch (const ToolError& error) {
+    return error;
+  }
 }
 
 }  // namespace
@@ -62,8 +90,11 @@ void ConcludeVerdicts(Context& context, const Verdicts& verdicts) {
   }
   if (!context.out.json()) WriteAside(TableOf(verdicts));
   context.found = {{"handsets", RowsOf(verdicts)}};
+  const auto unwritten = WriteReport(context, verdicts);
+  if (unwritten && first != nullptr) context.out.Note(unwritten->what());
   const auto all = Counted(verdicts.size(), "handset");
   if (first == nullptr) {
+    if (unwritten) throw ToolError(*unwritten);
     context.out.Result(context.found, "");
     if (!context.out.json()) context.out.Note(Format("{} passed", all));
     return;
@@ -71,8 +102,9 @@ void ConcludeVerdicts(Context& context, const Verdicts& verdicts) {
   if (Interrupted()) throw InterruptedError();
   const bool alike = failed.size() == verdicts.size() && codes.size() == 1;
   throw ToolError(alike ? first->code() : ExitCode::kSomeFailed,
-                  alike ? Format("none of {} passed: {}", all, first->what())
-                        : Format("{} of {} failed: {}", failed.size(), all, Joined(failed, ", ")),
+                  verdicts.size() == 1 ? std::string(first->what())
+                  : alike              ? Format("none of {} passed: {}", all, first->what())
+                                       : Format("{} of {} failed: {}", failed.size(), all, Joined(failed, ", ")),
                   first->hint());
 }
 

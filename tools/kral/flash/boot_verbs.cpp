@@ -96,7 +96,7 @@ void FlashAll(Context& context, const FlashAllArguments& arguments) {
     CheckFile(arguments.programmer);
     return PrintFlashPlan(context, arguments, images);
   }
-  if (HasSeveralPorts(context)) {
+  if (context.for_several()) {
     FlashPlan plan;
     plan.programmer = arguments.programmer;
     plan.enter = arguments.options.enter;
@@ -155,6 +155,7 @@ void AddBootVerbs(const Command& root, Context& context) {
   all.Flag("--reset", arguments->reset, "Restart the handset at the end, if its programmer knows how");
   all.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan; no handset is touched");
   all.AsksNobody([arguments] { return arguments->dry_run; });
+  all.ForMany();
   all.TakesPorts();
   all.Run([&context, arguments] { FlashAll(context, *arguments); });
 }

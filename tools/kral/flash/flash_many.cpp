@@ -2,7 +2,9 @@
 #include "tools/kral/flash/flash_many.h"
 
 #include <algorithm>
+#include <chrono>
 #include <deque>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <utility>
@@ -19,6 +21,7 @@ namespace kral::tool {
 namespace {
 
 constexpr std::uint32_t kDrawEveryMs = 100;
+constexpr std::uint32_t kEndOfThreadsMs = 1000;
 
 template <class Record>
 Record Empty() {
@@ -42,6 +45,7 @@ class FlashJob {
     Output out;  // of its own line
     std::optional<Progress> progress;
     bool ended = false;
+    StepTimes steps;
   };
 
   void Do(std::uint8_t result, const char* what) const;
@@ -50,12 +54,17 @@ class FlashJob {
   void AddHandset(std::uint16_t port);
   void Watch(Board& board);
   void Look(std::uint32_t number, Board& board);
+  double SecondsNow() const;
   void Judge(std::uint32_t number);
+  // On a thread of the job.
+  void NoteStep(std::uint32_t number);
 
   Context& context_;
   const FlashPlan& plan_;
   const KRAL_VENTRIMS_JOB job_;
+  const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
   std::deque<OneHandset> handsets_;
+  std::mutex steps_mutex_;  // of all of them
 };
 
 void FlashJob::Do(std::uint8_t result, const char* what) const {
@@ -160,6 +169,19 @@ void FlashJob::Judge(std::uint32_t number) {
   }
 }
 
+double FlashJob::SecondsNow() const {
+  return std::chrono::duration<double>(std::chrono::steady_clock::now() - begin_).count();
+}
+
+void FlashJob::NoteStep(std::uint32_t number) {
+  auto now = Empty<KRAL_VENTRIMS_PROGRESS>();
+  if (KRAL_VENTRIMS_GetProgress(job_, number, &now) == 0) return;
+  const std::lock_guard lock(steps_mutex_);
+  auto& steps = handsets_[number].steps;
+  if (now.state >= KRAL_VENTRIMS_PASSED) return steps.End(SecondsNow());
+  steps.Enter(now.state == KRAL_VENTRIMS_RETURNING ? kLostStep : now.step_name, SecondsNow());
+}
+
 void FlashJob::Watch(Board& board) {
   bool aborted = false;
   for (std::size_t printed = 0; printed < handsets_.size();) {
@@ -178,6 +200,11 @@ void FlashJob::Run() {
   const auto ports = Ports();
   SetUp();
   for (const auto port : ports) AddHandset(port);
+  // Short steps would be missed by looking now and then.
+  const auto note_step = [](KRAL_VENTRIMS_JOB, std::uint32_t number, std::uintptr_t job) {
+    reinterpret_cast<FlashJob*>(job)->NoteStep(number);
+  };
+  Do(KRAL_VENTRIMS_SetCallback(job_, note_step, reinterpret_cast<std::uintptr_t>(this)), "the job");
   Do(KRAL_VENTRIMS_Start(job_), "the start of the download");
   {
     Board board(context_.out, ports);
@@ -189,16 +216,17 @@ void FlashJob::Run() {
     Watch(board);
     for (auto& handset : handsets_) handset.progress.reset();
   }
+  KRAL_VENTRIMS_Wait(job_, kEndOfThreadsMs);  // which note the ends of the last steps
+  {
+    const std::lock_guard lock(steps_mutex_);
+    for (auto& handset : handsets_) handset.verdict.steps = handset.steps;
+  }
   std::vector<const Verdict*> verdicts;
   for (const auto& handset : handsets_) verdicts.push_back(&handset.verdict);
   ConcludeVerdicts(context_, verdicts);
 }
 
 }  // namespace
-
-bool HasSeveralPorts(const Context& context) {
-  return context.all || context.session.port.find_first_of(",-") != std::string::npos;
-}
 
 void FlashMany(Context& context, const FlashPlan& plan) {
   FlashJob(context, plan).Run();

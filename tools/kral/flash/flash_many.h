@@ -20,8 +20,6 @@ struct FlashPlan {
   bool reset = false;
 };
 
-bool HasSeveralPorts(const Context& context);
-
 // Each file is read once, whatever the number of handsets.
 void FlashMany(Context& context, const FlashPlan& plan);
 

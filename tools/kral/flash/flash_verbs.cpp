@@ -130,7 +130,7 @@ void WriteImages(Context& context, WriteArguments arguments) {
   if (!arguments.partition_table.empty()) CheckFile(arguments.partition_table, kLargestOpening);
   if (arguments.dry_run)
     return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
-  if (HasSeveralPorts(context)) return WriteToMany(context, arguments, images);
+  if (context.for_several()) return WriteToMany(context, arguments, images);
 
   FlashTarget target(context);
   const auto limits = target.Hello();
@@ -249,6 +249,7 @@ void AddWriteVerb(const Command& flash, Context& context) {
   write.Flag("--reset", arguments->reset, "Restart the handset afterwards");
   write.AsksNobody([arguments] { return arguments->dry_run; });
   write.Flag("--dry-run", arguments->dry_run, "Check the files and print the plan, without a handset");
+  write.ForMany();
   write.TakesPorts();
   write.Run([&context, arguments] { WriteImages(context, *arguments); });
 }

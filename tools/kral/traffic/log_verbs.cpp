@@ -8,11 +8,11 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/file_util.h"
 #include "tools/kral/call_failure.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/one_file.h"
+#include "tools/kral/page.h"
 #include "tools/kral/progress.h"
 #include "tools/kral/session_trace.h"
 #include "tools/kral/traffic/playback.h"
@@ -304,13 +304,8 @@ Json JsonOf(const KRAL_TRAFFIC_COUNTERS& c) {
           {"most_waiting", c.most_waiting}};
 }
 
-void WritePage(const Timeline& timeline, const std::string& title, const std::string& file) {
-  if (file.empty()) return;
-  const auto page = timeline.Page(title);
-  if (const auto error = ReplaceWholeFile(file, {reinterpret_cast<const std::uint8_t*>(page.data()), page.size()})) {
-    throw ToolError(ExitCode::kBadFile, Format("the page {} cannot be written: {}", file, error.message()),
-                    "check folder and permissions of the file named by --html");
-  }
+void WriteTimeline(const Timeline& timeline, const std::string& title, const std::string& file) {
+  if (!file.empty()) WritePage(file, timeline.Page(title), "--html");
 }
 
 void FileStatistics(const Context& context, const LogOptions& options) {
@@ -325,7 +320,7 @@ void FileStatistics(const Context& context, const LogOptions& options) {
     if (!options.page.empty()) timeline.Add(packet.microseconds, packet.bytes);
   });
   if (!whole) NoteCut(context, options.file);
-  WritePage(timeline, options.file, options.page);
+  WriteTimeline(timeline, options.file, options.page);
   context.out.Result({{"file", options.file}, {"cut", !whole}, {"rows", table.Rows(handle.get(), 0)}},
                      table.Text(handle.get(), 0));
 }
@@ -357,7 +352,7 @@ void Statistics(const Context& context, LogOptions& options) {
   const double seconds = options.limit.seconds();
   const auto counters = CountersOf(session.handle());
   tell_dropped();
-  WritePage(timeline, DescribePort(session.port()), options.page);
+  WriteTimeline(timeline, DescribePort(session.port()), options.page);
   context.out.Result({{"port", session.port()},
                       {"seconds", seconds},
                       {"counters", JsonOf(counters)},

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "tools/kral/format.h"
+#include "tools/kral/page.h"
 #include "tools/kral/traffic/playback.h"
 #include "tools/kral/traffic/traffic.h"
 
@@ -17,48 +18,12 @@ namespace {
 constexpr unsigned kColumnWidth = 4;  // in units of the drawing
 constexpr unsigned kRowHeight = 28;
 
-constexpr std::string_view kTimelineHead = R"(<!DOCTYPE html>
-<html lang="en"><head><meta charset="utf-8"><meta name="viewport" content="width=device-width">
-<style>
-:root { color-scheme: light dark; --text: #1f2328; --dim: #667; --line: #d0d7de; --head: #f3f4f6; --page: #fff;
-  --bar: #2f6fb2; --drop: #d1242f; }
-@media (prefers-color-scheme: dark) {
-  :root { --text: #e6edf3; --dim: #9aa4b2; --line: #30363d; --head: #161b22; --page: #0d1117; --bar: #6cb0f5;
-    --drop: #ff6b66; }
-}
-body { font: 14px/1.45 system-ui, sans-serif; margin: 2em; color: var(--text); background: var(--page); }
-h1 { font-size: 1.3em; overflow-wrap: anywhere; } p { color: var(--dim); }
-table { border-collapse: collapse; width: 100%; }
-th { position: sticky; top: 0; background: var(--head); text-align: left; white-space: nowrap; }
-th, td { border-bottom: 1px solid var(--line); padding: 2px 10px 2px 0; } td { white-space: nowrap; }
-.count { text-align: right; font-variant-numeric: tabular-nums; } .time { width: 70%; }
-.span { display: flex; justify-content: space-between; font-weight: normal; color: var(--dim); }
-svg { display: block; width: 100%; height: 28px; }
-path { stroke: var(--bar); stroke-width: 4; fill: none; } .drops { stroke: var(--drop); }
-#drops .drops { opacity: .5; } tr.dropped td { color: var(--drop); }
-</style>
+constexpr std::string_view kTimelineStyle = R"(:root { --bar: #2f6fb2; }
+@media (prefers-color-scheme: dark) { :root { --bar: #6cb0f5; } }
+.time { width: 70%; } svg { height: 28px; }
+path { stroke: var(--bar); stroke-width: 4; fill: none; } .drops { stroke: var(--bad); }
+#drops .drops { opacity: .5; } tr.dropped td { color: var(--bad); }
 )";
-
-// Text of files and handsets, which may hold anything.
-std::string PageText(std::string_view text) {
-  std::string safe;
-  for (const char character : text) {
-    switch (character) {
-      case '&':
-        safe += "&amp;";
-        break;
-      case '<':
-        safe += "&lt;";
-        break;
-      case '"':
-        safe += "&quot;";
-        break;
-      default:
-        safe += character;
-    }
-  }
-  return safe;
-}
 
 // A line upwards for each column that holds something; the fullest is as high as the row. With `whole` each is.
 template <class Columns>
@@ -138,12 +103,11 @@ std::string Timeline::Page(const std::string& title) const {
   }
   std::ranges::stable_sort(
       rows, [](const auto& left, const auto& right) { return left.second->packets > right.second->packets; });
-  auto page = std::string(kTimelineHead);
+  auto page = PageHead(title, kTimelineStyle);
   page += Format(
-      "<title>{0}</title></head><body>\n<h1>{0}</h1>\n<p>{1} of {2}, {3} dropped, in {4:.3f} s. A column is "
-      "{5} ms; each row is as high as its fullest column.</p>\n",
-      PageText(title), Counted(packets, "packet"), Counted(rows.size(), "kind"), dropped_,
-      static_cast<double>(end_ - begin_) / 1e6, width_ / 1000);
+      "<p>{} of {}, {} dropped, in {:.3f} s. A column is {} ms; each row is as high as its fullest column.</p>\n",
+      Counted(packets, "packet"), Counted(rows.size(), "kind"), dropped_, static_cast<double>(end_ - begin_) / 1e6,
+      width_ / 1000);
   if (dropped_ != 0) {
     page += Format("<svg style=\"height: 0\"><symbol id=\"drops\"><path class=\"drops\" d=\"{}\"/></symbol></svg>\n",
                    Lines(drops_, true));
@@ -157,7 +121,7 @@ std::string Timeline::Page(const std::string& title) const {
                    dropped_, Drawing(UsedColumns(), Format(R"(<path class="drops" d="{}"/>)", Lines(drops_, false))));
   }
   for (const auto& [what, row] : rows) page += PageRow(what, *row);
-  return page + "</tbody></table>\n</body></html>\n";
+  return page.append("</tbody></table>\n").append(kPageEnd);
 }
 
 }  // namespace kral::tool
