@@ -81,7 +81,10 @@ class Ports(ToolTest):
                                      (2, "is no serial number", "esn:xyz"), (2, "is no slot", "slot:2-1")):
                 with self.subTest(name=name):
                     self.assertIn(text, self.expect_json(code, "-p", name, "info")["error"]["text"])
-            for words in (("5", "esn:11"), ("5", "slot:1"), ("5", "7,8"), ("5",), ("0", "7"), ("5", "x")):
+            self.assertIn(r"no port /dev/\x1b[1mü", self.expect(3, "-p", "/dev/\x1b[1mü", "info").err.replace("1B", "1b"))
+            for words in (("5", "esn:11"), ("5", "esn:00000011"), ("5", "COM3"), ("5", "003"), ("5", "65535"), ("5", "usb:"),
+                          ("5", "esn:zz"), ("5", "/dev/\x1b[1m"), ("5", "slot:1"), ("5", "7,8"), ("5",), ("0", "7"),
+                          ("5", "x"), ("5", "--remove"), ("--remove",)):
                 self.expect_json(2, "ports", "assign", *words)
             self.expect(0, "ports", "assign", "1", "--remove")
             slots = self.expect_json(0, "ports", "assign")["slots"]
@@ -143,7 +146,7 @@ class Ports(ToolTest):
 
     def test_missing_and_impossible_ports_are_no_port(self):
         self.ports = {7: "/nonexistent/tty"}
-        for number in ("7", "0", "300"):
+        for number in ("7", "0", "256", "65534", "65535"):
             with self.subTest(port=number):
                 self.assertIn(f"COM{number}", self.expect_json(3, "-p", number, "info")["error"]["text"])
 

@@ -194,10 +194,11 @@ class Traffic(ToolTest):
 
     def test_a_handset_whose_answers_stand_behind_its_logs_is_told_as_such(self):
         with self.handset("--logs", "2000", "--rate", "20k"):
-            run("-p", "7", "log", "on", "0x1001-0x1008", "--time-out", "300", ports=self.ports)
-            wait_until(lambda: run("-p", "7", "info", "--time-out", "300", ports=self.ports).returncode != 0)
+            late = r"COM7 .* sends [0-9]+ packets/s and answers late"
+            error = self.ask(5, "log", "on", "--all", "--time-out", "300")["error"]
+            self.assertRegex(error["hint"], late)
             error = self.ask(5, "info", "--time-out", "300")["error"]
-            self.assertRegex(error["text"], r"^COM7 .* sends [0-9]+ packets/s and answers late$")
+            self.assertRegex(error["text"], f"^{late}$")
             self.assertIn("kral log off --all", error["hint"])
 
     def test_reader_may_be_slow_and_may_leave(self):

@@ -24,7 +24,7 @@ class ManyHandsets(ToolTest):
         return {row["port"]: 0 if row["ok"] else row["error"]["code"] for row in answer["handsets"]}
 
     def test_each_handset_has_a_verdict_and_all_have_one(self):
-        with self.fixture(4, "--fault-at", "3:refuse=24,of=4B 0F", "--fault-at", "4:ignore") as (_, self.ports):
+        with self.fixture(4, "--fault-at", "3:refuse=24,of=4B 0F", "--fault-at", "4:ignore") as (sim, self.ports):
             answer = self.expect_json(0, "-p", "2,1", "info")
             self.assertEqual([[row[name] for name in ("port", "serial", "model", "esn", "mode")]
                               for row in answer["handsets"]],
@@ -37,6 +37,9 @@ class ManyHandsets(ToolTest):
             self.assertRegex(done.err, r"(?m)^COM1 +00000010 .* passed$")
             self.assertRegex(done.err, r"(?m)^COM3 +00000012 .* FAILED: .*not in the present operating mode$")
             self.assertIn("1 of 3 handsets failed: COM3", done.err)
+            # One that answers, but not who it is, is none of those that passed.
+            command(sim, "fault 2 lose,of=26")
+            self.assertEqual(self.verdicts(12, "--all", "--time-out", "200", "raw", "7C"), {1: 0, 2: 5, 3: 0})
 
     def test_those_that_fail_alike_end_with_their_code(self):
         with self.fixture(2, "--fault", "refuse=24,of=4B 0F") as (_, self.ports):
@@ -66,7 +69,7 @@ class ManyHandsets(ToolTest):
                     (2, "COM2 is named twice", ("-p", "1,2,2", "info")),
                     (2, "COM2 is named twice", ("-p", "1-2,2-3", "info")),
                     (2, "is no list of ports", ("-p", "3-1", "info")),
-                    (2, "is no list of ports", ("-p", "1,0", "info")),
+                    (2, "0 is not a port number in 1,0", ("-p", "1,0", "info")),
                     (2, "is not a port number", ("-p", "1,", "info")),
                     (2, "are the same device", ("-p", "1,9", "info")),
                     (2, "different things", ("-p", "1", "--all", "info")),
@@ -124,6 +127,19 @@ class ManyHandsets(ToolTest):
             self.assertIn(answer["handsets"][1]["error"]["hint"], rows[1][3])
             self.assertIn(b"image 1 (&lt;b>software) ", self.content("page.html"))
             self.assertEqual(answer["handsets"][1]["error"]["name"], "link")
+
+    def test_another_handset_on_the_port_is_not_worked_on(self):
+        with self.fixture(3, "--rate", "20k") as (_, self.ports):
+            process = start("-p", "1,2", "--jobs", "1", "--json", "fs", "put", self.add("big", bytes(8000)), ":/big",
+                            ports=self.ports)
+            process.stderr.readline()  # work on the first has begun
+            os.remove(self.ports[2])
+            os.symlink(os.path.realpath(self.ports[3]), self.ports[2])
+            out, _ = process.communicate(timeout=PATIENCE)
+            rows = json.loads(out)["handsets"]
+            self.assertEqual([row.get("error", {}).get("name") for row in rows], [None, "safety-stop"])
+            self.assertIn("00000012 in place of 00000011", rows[1]["error"]["text"])
+            self.expect(7, "-p", "3", "fs", "stat", ":/big")
 
     def test_an_interrupt_ends_all_of_them(self):
         with self.fixture(3, "--rate", "20k") as (_, self.ports):

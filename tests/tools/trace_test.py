@@ -55,6 +55,11 @@ class Traces(ToolTest):
                                   (self.path("new"), self.path("folder", "..", "new"))):
                     with self.subTest(words=words, file=file):
                         self.expect(2, "-p", "7", "--log", log, *(word.format(file) for word in words))
+            for words in (("nv", "verify", kept), ("nv", "backup", kept), ("fs", "put", kept, ":/x"),
+                          ("flash", "write", "2:" + kept), ("-p", "8,9", "nv", "restore", kept)):
+                for option in ("--log", "--trace", "--trace-on-failure"):
+                    with self.subTest(words=words, option=option):
+                        self.expect_json(2, *(() if "-p" in words else ("-p", "7")), option, self.path("link"), *words)
         self.assertEqual(self.content("kept"), b"kept")
         self.assertFalse(os.path.exists(self.path("new")))
 

@@ -85,8 +85,8 @@ void Board::End(std::size_t row, const Verdict& verdict) {
   Row& ended = rows_[row];
   ended.state = verdict.passed() ? State::kPassed : State::kFailed;
   ended.serial = verdict.serial;
-  ended.verdict =
-      verdict.passed() ? Format("passed in {:.1f} s", verdict.seconds) : Format("FAILED: {}", verdict.failure->what());
+  ended.verdict = verdict.passed() ? Format("passed in {:.1f} s", verdict.seconds)
+                                   : Format("FAILED: {}", NameText(verdict.failure->what()));
   if (style_ == Style::kLines && !ended.shown.work.empty()) Say(ended, ended.verdict);
   if (style_ != Style::kJson) return;
   const Json event{{"event", "verdict"}, {"port", verdict.port}, {"ok", verdict.passed()}};
@@ -103,7 +103,7 @@ void Board::Say(const Row& row, std::string_view text) {
     const Json event{{"event", "note"}, {"port", row.port}, {"text", text}};
     WriteAside(JsonLine(event));
   } else {
-    WriteAside(Format("kral: {}: {}\n", TitleOf(row.port, row.serial), text));
+    WriteAside(Format("kral: {}: {}\n", TitleOf(row.port, row.serial), SafeText(text)));
   }
 }
 

@@ -42,6 +42,7 @@ struct Chosen {
   std::vector<SettledOption> settled;
   Names names;
   std::set<std::string> asked;
+  std::vector<std::string> words;
 };
 
 namespace {
@@ -391,8 +392,11 @@ Option Command::AddWords(const char* names, Sink sink, std::string_view help, st
   const auto is_file = std::make_shared<bool>(false);
   auto* const option = app_->add_option(
       names,
-      [sink = std::move(sink), is_file, chosen = chosen_](const std::vector<std::string>& words) {
-        sink(*is_file ? Expanded(words, *chosen) : words);
+      [sink = std::move(sink), is_file, chosen = chosen_,
+       is_common = app_->get_parent() == nullptr](const std::vector<std::string>& words) {
+        const auto taken = *is_file ? Expanded(words, *chosen) : words;
+        if (!is_common) chosen->words.insert(chosen->words.end(), taken.begin(), taken.end());
+        sink(taken);
         return true;
       },
       std::string(help));
@@ -561,6 +565,7 @@ void CommandLine::Example(const std::string& words) {
 
 std::function<void()> CommandLine::Parse(const std::vector<std::string>& arguments) {
   parser_->chosen.act = {};
+  parser_->chosen.words.clear();
   try {
     // The parser wants them from the last to the first.
     parser_->app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
@@ -601,6 +606,10 @@ bool CommandLine::asks_identity() const {
 bool CommandLine::may_ask_all() const {
   const auto found = parser_->chosen.in_download.find(parser_->chosen.verb);
   return found == parser_->chosen.in_download.end() || found->second != Command::InDownload::kBootLoader;
+}
+
+const std::vector<std::string>& CommandLine::words() const {
+  return parser_->chosen.words;
 }
 
 std::vector<std::string> CommandLine::Written() const {

@@ -146,8 +146,9 @@ class CommandLine {
   bool asks_nobody() const;
   bool asks_identity() const;
   bool may_ask_all() const;
-  std::vector<std::string> Written() const;    // local files, as far as it has said so
-  const std::set<std::string>& asked() const;  // which names were asked for: "serial"
+  const std::vector<std::string>& words() const;  // of its own texts, names of files as they are now
+  std::vector<std::string> Written() const;       // local files, as far as it has said so
+  const std::set<std::string>& asked() const;     // which names were asked for: "serial"
 
  private:
   struct Parser;

@@ -146,16 +146,31 @@ void CheckReport(Context& context, const CommandLine& line) {
   CheckPage(context.report, "--report");
 }
 
+void RefuseFilesOfVerb(const ParsedCommand& command) {
+  RefuseFilesOfVerb(command.context.session.log_file, command.context.session.trace, command.line->words());
+}
+
 // From here on ports are numbers.
 void FindPorts(Context& context, const std::string& verb) {
   auto& session = context.session;
-  if (!context.wait_s) return ResolvePortNames(session);
-  session.wait_ms = static_cast<std::uint32_t>(*context.wait_s * 1000);
-  AwaitHandsets(session, context.all, verb.starts_with("boot ") || verb == "flash all");
+  if (!context.wait_s) {
+    ResolvePortNames(session);
+  } else {
+    session.wait_ms = static_cast<std::uint32_t>(*context.wait_s * 1000);
+    AwaitHandsets(session, context.all, verb.starts_with("boot ") || verb == "flash all");
+  }
+  if (session.port.empty()) return;
+  if (session.port.find_first_of(",-") != std::string::npos) {
+    ParsePorts(session.port);
+  } else if (const auto port = ParsePort(session.port); port == 0 || port > kLastPort) {
+    throw ToolError(ExitCode::kNoPort, Format("there is no port COM{}", port),
+                    Format("ports have the numbers 1 to {}", kLastPort));
+  }
 }
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
   CheckReport(command->context, *command->line);
+  RefuseFilesOfVerb(*command);
   if (command->line->asks_nobody()) {
     IsForMany(*command);  // which may refuse
     return command->act();
@@ -167,6 +182,7 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     own->context.session.slots = command->context.session.slots;
     own->context.all = false;
     own->context.report.clear();
+    RefuseFilesOfVerb(*own);
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
@@ -175,6 +191,7 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     const auto found = command->context.session;
     command = ParseAgain(arguments, *command->line, NamesOf(*command->line, found));
     command->context.session.port = found.port;
+    RefuseFilesOfVerb(*command);
   }
   command->act();
 }

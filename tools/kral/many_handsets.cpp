@@ -68,6 +68,7 @@ SessionOptions ForIdentity(SessionOptions options, std::uint16_t port) {
 struct OneHandset {
   std::unique_ptr<ParsedCommand> command;
   Verdict verdict;
+  bool answers = false;  // whatever it may be
   std::atomic<bool> ended{false};
 };
 
@@ -84,6 +85,7 @@ class ManyHandsets {
   // `work` on all handsets without a failure, so many at once. A failure of it is that of the handset.
   void OnEach(const std::function<void(std::size_t number)>& work);
   void Identify(const std::vector<std::uint16_t>& ports);
+  void AskIdentity(OneHandset& handset) const;
   void TakePorts(const std::vector<std::uint16_t>& ports);
   void RefuseNone() const;
   void RefuseTrouble() const;
@@ -137,18 +139,35 @@ void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
   }
   if (!command_.line->asks_identity()) return TakePorts(ports);
   OnEach([this](std::size_t number) {
-    auto& verdict = handsets_[number]->verdict;
-    Session session(ForIdentity(context().session, verdict.port));
-    verdict.serial = Ask(session, Asks(*command_.line, "serial"), SerialOf);
-    if (Asks(*command_.line, "model") || out().json()) {
-      verdict.model = Ask(session, Asks(*command_.line, "model"), ModelOf);
+    const auto begin = std::chrono::steady_clock::now();
+    try {
+      AskIdentity(*handsets_[number]);
+    } catch (...) {
+      handsets_[number]->verdict.seconds =
+          std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
+      throw;
     }
   });
   ThrowIfInterrupted();
   if (!context().all) return RefuseTrouble();
   // Those that nobody named and that do not answer are none of the handsets.
-  std::erase_if(handsets_, [](const auto& handset) { return !handset->verdict.passed(); });
+  std::erase_if(handsets_, [](const auto& handset) { return !handset->answers; });
   RefuseNone();
+}
+
+void ManyHandsets::AskIdentity(OneHandset& handset) const {
+  auto& verdict = handset.verdict;
+  try {
+    Session session(ForIdentity(context().session, verdict.port));
+    handset.answers = true;
+    verdict.serial = Ask(session, Asks(*command_.line, "serial"), SerialOf);
+    if (Asks(*command_.line, "model") || out().json()) {
+      verdict.model = Ask(session, Asks(*command_.line, "model"), ModelOf);
+    }
+  } catch (const NoDiagnosticsError&) {
+    handset.answers = true;
+    throw;
+  }
 }
 
 // Whoever has the line: only diagnostics would tell more.
@@ -195,6 +214,7 @@ void ManyHandsets::Prepare() {
                                       {"slot", std::to_string(slot == slots.end() ? number + 1 : slot->second)},
                                       {"serial", AsFileName(handset.verdict.serial)},
                                       {"model", AsFileName(handset.verdict.model)}});
+    handset.command->context.session.serial = handset.verdict.serial;
   }
   RefuseSameFiles();
 }
@@ -217,6 +237,10 @@ void ManyHandsets::RefuseSameFiles() const {
       }
       const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
       if (is_new) continue;
+      if (first->second == handset->verdict.port) {
+        throw ToolError(ExitCode::kUsage, Format("kral {} would write {} twice", command_.line->verb(), file),
+                        "give each a file of its own");
+      }
       if (file == "-") {
         throw ToolError(ExitCode::kUsage, Format("kral {} writes to the standard output", command_.line->verb()),
                         "name a file with {port}, {serial}, {model} or {slot}");
@@ -303,7 +327,9 @@ void ManyHandsets::Run() {
 std::uint16_t PortAt(std::string_view text, std::string_view whole) {
   const auto port = ParsePort(text);
   if (port != 0 && port <= kLastPort) return port;
-  throw ToolError(ExitCode::kUsage, Format("{} is no list of ports", whole), "give numbers and ranges: -p 7,8,20-27");
+  throw ToolError(ExitCode::kUsage,
+                  Format("{} is not a port number{}", text, text == whole ? "" : Format(" in {}", whole)),
+                  Format("ports have the numbers 1 to {}", kLastPort));
 }
 
 }  // namespace
@@ -316,7 +342,10 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text) {
     const auto dash = part.find('-');
     const auto first = PortAt(part.substr(0, dash), text);
     const auto last = dash == std::string_view::npos ? first : PortAt(part.substr(dash + 1), text);
-    if (last < first) PortAt("0", text);
+    if (last < first) {
+      throw ToolError(ExitCode::kUsage, Format("{} is no list of ports", text),
+                      "give numbers and ranges: -p 7,8,20-27");
+    }
     for (unsigned port = first; port <= last; ++port) {
       if (std::ranges::find(ports, port) != ports.end()) {
         throw ToolError(ExitCode::kUsage, Format("COM{} is named twice in {}", port, text), "name each port once");

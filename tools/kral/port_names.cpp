@@ -89,9 +89,14 @@ std::uint16_t PortOfDevice(const std::string& device) {
 
 // --- Serial numbers and sockets -------------------------------------------------------------------------------------
 
+std::uint32_t SerialIn(std::string_view name) {
+  const auto serial = NumberIn<std::uint32_t>(name.substr(kEsn.size()), 16);
+  if (!serial) throw ToolError(ExitCode::kUsage, Format("{} is no serial number", name), kNames);
+  return *serial;
+}
+
 std::uint16_t PortOfSerial(std::string_view name) {
-  const auto wanted = NumberIn<std::uint32_t>(name.substr(kEsn.size()), 16);
-  if (!wanted) throw ToolError(ExitCode::kUsage, Format("{} is no serial number", name), kNames);
+  const auto wanted = SerialIn(name);
   const auto ports = ListPorts();
   std::mutex mutex;
   std::vector<std::uint16_t> found;
@@ -103,7 +108,7 @@ std::uint16_t PortOfSerial(std::string_view name) {
     const bool told = KRAL_DIAG_READ_ESN_F(handle, &serial) != 0;
     KRAL_DisconnectServer(handle);
     const std::lock_guard lock(mutex);
-    if (told && serial == *wanted) found.push_back(ports[number]);
+    if (told && serial == wanted) found.push_back(ports[number]);
   });
   ThrowIfInterrupted();
   std::ranges::sort(found);
@@ -203,11 +208,14 @@ void ResolvePortNames(SessionOptions& options) {
   options.port = resolved.numbers;
 }
 
-void CheckPortName(const std::string& name) {
-  if (name.find_first_of(", \t\n") != std::string::npos || name.starts_with(kSlot)) {
-    throw ToolError(ExitCode::kUsage, Format("'{}' is no name of one port", name), kNames);
-  }
-  if (!IsName(name)) ParsePort(name);
+std::string PortName(const std::string& name) {
+  const bool is_text = std::ranges::none_of(
+      name, [](unsigned char character) { return character <= ' ' || character == ',' || character == 0x7F; });
+  if (is_text && IsDevice(name)) return name;
+  if (name.starts_with(kEsn)) return Format("{}{:08X}", kEsn, SerialIn(name));
+  if (is_text && name.starts_with(kUsb) && name.size() > kUsb.size()) return name;
+  if (!is_text || IsName(name)) throw ToolError(ExitCode::kUsage, Format("'{}' is no name of one port", name), kNames);
+  return std::to_string(ParsePorts(name).front());
 }
 
 std::string SlotFile() {

@@ -20,8 +20,8 @@ void ResolvePortNames(SessionOptions& options);
 std::map<std::uint16_t, std::string> ReadSlots();
 void WriteSlots(const std::map<std::uint16_t, std::string>& slots);
 std::string SlotFile();
-// ToolError for what cannot be the name of a port.
-void CheckPortName(const std::string& name);
+// A name in the one way in which it is kept; ToolError for what cannot be the name of a port.
+std::string PortName(const std::string& name);
 
 // Waits until all ports are there and handsets answer on them, or for so long: what is then still missing the verb
 // tells. A boot loader is not asked.

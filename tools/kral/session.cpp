@@ -15,6 +15,7 @@
 #include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/handset_identity.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/port_report.h"
 #include "tools/kral/result_lines.h"
@@ -193,6 +194,7 @@ Session::Session(const SessionOptions& options, Expected expected)
     // What the handset answers late shall not be taken for the answer to something else.
     KRAL_SetResynchronise(handle_, 1);
     CheckAnswers(expected);
+    if (answers_ && !options.serial.empty()) CheckSerial(options.serial);
   } catch (...) {
     if (trace_) trace_->End(true);
     KRAL_DisconnectServer(handle_);
@@ -252,6 +254,12 @@ bool Session::AnswersBehindTraffic(double& packets_per_second) const {
   return false;
 }
 
+NoDiagnosticsError Session::Flooded(double packets_per_second, const std::optional<KRAL_ERROR>& record) const {
+  return {ExitCode::kNoAnswer,
+          Format("{} sends {:.0f} packets/s and answers late", DescribePort(port_), packets_per_second),
+          "kral log off --all, with --time-out 60000 where its answer has to wait as well", record};
+}
+
 // What has the line of a handset that is being downloaded to, in words; null for anything else. A no-operation of
 // either tells; handsets in diagnostic mode refuse both.
 const char* Session::DownloadState() const {
@@ -287,21 +295,27 @@ void Session::CheckAnswers(Expected expected) {
   answers_ = AnswersBehindTraffic(rate);
   if (answers_) return;
   ThrowIfInterrupted();
-  if (rate >= kLeastTraffic) {
-    throw ToolError(ExitCode::kNoAnswer,
-                    Format("{} sends {:.0f} packets/s and answers late", DescribePort(port_), rate),
-                    "kral log off --all, with --time-out 60000 where its answer has to wait as well", record);
-  }
+  if (rate >= kLeastTraffic) throw Flooded(rate, record);
   if (may_be_in_download) return;
   if (const auto* const state = DownloadState()) {
-    throw ToolError(ExitCode::kRefused, Format("{} runs {}, and no diagnostics", DescribePort(port_), state),
-                    "kral flash info tells more, kral flash reset restarts the handset");
+    throw NoDiagnosticsError(ExitCode::kRefused, Format("{} runs {}, and no diagnostics", DescribePort(port_), state),
+                             "kral flash info tells more, kral flash reset restarts the handset");
   }
   if (IsOtherThanSilence(record)) throw ExplainRecord(*record, kLivenessCheck, port_);
   throw ToolError(ExitCode::kNoAnswer, Format("nothing answers on {}", DescribePort(port_)),
                   "check that this is the handset's diagnostic port and that the handset is on; --time-out MS waits "
                   "longer, --log FILE shows what came",
                   record);
+}
+
+// Minutes may have passed, and hands plug.
+void Session::CheckSerial(const std::string& serial) {
+  const auto now = IfTold(*this, SerialOf);
+  if (now == serial) return;
+  throw ToolError(ExitCode::kSafetyStop,
+                  Format("another handset is on {} by now: {} in place of {}", DescribePort(port_),
+                         now.empty() ? "one that does not tell its serial number" : now, serial),
+                  "nothing was done to it; run the command again");
 }
 
 void Session::Begin() {
@@ -316,6 +330,9 @@ std::optional<ToolError> Session::Silence() const {
   const auto after = TroubleOf(handle_);
   if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, record);
   if (IsOtherThanSilence(record)) return ExplainRecord(*record, kLivenessCheck, port_);
+  double rate = 0;
+  if (AnswersBehindTraffic(rate)) return std::nullopt;
+  if (rate >= kLeastTraffic) return Flooded(rate, record);
   return ToolError(ExitCode::kNoAnswer, Format("the handset on {} answers nothing any more", DescribePort(port_)),
                    "check cable and power", record);
 }
@@ -336,7 +353,7 @@ ToolError Session::Explain(std::string_view what) const {
   const auto silence = Silence();
   if (silence && silence->code() == ExitCode::kLost) return *silence;
   return ExplainRecord(*record, what, port_,
-                       silence ? "the handset answers nothing any more: check cable and power"
+                       silence ? Format("{}: {}", silence->what(), silence->hint())
                                : "the handset still answers other requests; --time-out MS waits longer");
 }
 

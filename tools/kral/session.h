@@ -20,6 +20,7 @@ namespace kral::tool {
 struct SessionOptions {
   std::string port;                              // empty: the only port on which a handset answers
   std::map<std::uint16_t, std::uint16_t> slots;  // of those ports that were named by their slot
+  std::string serial;                            // of the handset that it must still be; empty: any
   std::uint32_t wait_ms = 0;                     // for a port and its handset to appear
   std::string log_file;
   std::optional<std::uint32_t> log_flags;
@@ -42,9 +43,16 @@ std::uint16_t LatestPort();
 // One in its boot loader says hello once: its port is not even opened.
 enum class Expected { kAnswers, kMayBeInDownload, kInBootLoader };
 
+// A handset is there, but no diagnostics that answer in time: it is in download, or hidden behind what it sends.
+class NoDiagnosticsError : public ToolError {
+ public:
+  using ToolError::ToolError;
+};
+
 class Session {
  public:
-  // Connects and checks that a handset answers, unless it need not; ToolError when not.
+  // Connects and checks that a handset answers, unless it need not; ToolError when not, and when it is another one than
+  // it must be.
   explicit Session(const SessionOptions& options, Expected expected = Expected::kAnswers);
   ~Session();
   Session(const Session&) = delete;
@@ -73,8 +81,10 @@ class Session {
   std::optional<ToolError> ExplainPort(const KRAL_ERROR& record) const;
   void StartLog(const SessionOptions& options) const;
   void CheckAnswers(Expected expected);
+  void CheckSerial(const std::string& serial);
   bool AnswersInTheEnd() const;
   bool AnswersBehindTraffic(double& packets_per_second) const;
+  NoDiagnosticsError Flooded(double packets_per_second, const std::optional<KRAL_ERROR>& record) const;
   const char* DownloadState() const;
 
   std::uint16_t port_;

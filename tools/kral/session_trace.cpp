@@ -2,6 +2,7 @@
 #include "tools/kral/session_trace.h"
 
 #include <exception>
+#include <utility>
 
 #include "tools/kral/call_failure.h"
 #include "tools/kral/exit_codes.h"
@@ -32,6 +33,20 @@ void RefuseLogFile(const std::string& log_file, const std::string& file, const c
   if (log_file.empty() || file.empty() || !IsOneFile(log_file, file)) return;
   throw ToolError(ExitCode::kUsage, Format("{} cannot be in the file of the text log, {}", what, file),
                   "name another file than that of --log");
+}
+
+void RefuseFilesOfVerb(const std::string& log_file, const TraceOptions& trace, const std::vector<std::string>& words) {
+  const std::pair<const char*, const std::string&> files[] = {
+      {"--log", log_file}, {"--trace", trace.file}, {"--trace-on-failure", trace.file_on_failure}};
+  for (const auto& [option, file] : files) {
+    if (file.empty()) continue;
+    for (const auto& word : words) {
+      const auto name = word.substr(word.find_first_not_of("0123456789") == word.find(':') ? word.find(':') + 1 : 0);
+      if (word.empty() || (!IsOneFile(file, word) && !IsOneFile(file, name))) continue;
+      throw ToolError(ExitCode::kUsage, Format("{} would destroy {}, a file of the command itself", option, name),
+                      Format("name another file behind {}", option));
+    }
+  }
 }
 
 SessionTrace::SessionTrace(KRAL_HANDLE handle, const TraceOptions& options) : handle_(handle), options_(options) {

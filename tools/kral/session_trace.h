@@ -3,6 +3,7 @@
 #define KRAL_TOOLS_SESSION_TRACE_H
 
 #include <string>
+#include <vector>
 
 #include "kral/kral.h"
 
@@ -15,6 +16,10 @@ struct TraceOptions {
 
 // ToolError when something else would be written to the file of the text log: each would destroy the other.
 void RefuseLogFile(const std::string& log_file, const std::string& file, const char* what);
+
+// ToolError when text log or trace would be written to a file of the verb: one of these words, or what stands behind
+// the number of an image's type in it.
+void RefuseFilesOfVerb(const std::string& log_file, const TraceOptions& trace, const std::vector<std::string>& words);
 
 class SessionTrace {
  public:

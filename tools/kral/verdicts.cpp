@@ -49,7 +49,7 @@ std::string TableOf(const Verdicts& verdicts) {
   std::string text;
   for (const auto* verdict : verdicts) {
     text += Format("{:<7} {:<8} {:>8.1f} s  {}\n", Format("COM{}", verdict->port), verdict->serial, verdict->seconds,
-                   verdict->passed() ? "passed" : Format("FAILED: {}", verdict->failure->what()));
+                   verdict->passed() ? "passed" : Format("FAILED: {}", SafeText(verdict->failure->what())));
   }
   return text;
 }

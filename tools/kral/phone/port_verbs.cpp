@@ -41,7 +41,7 @@ void ShowSlots(const Context& context, const std::map<std::uint16_t, std::string
   std::string text;
   for (const auto& [slot, name] : slots) {
     list.push_back({{"slot", slot}, {"name", name}});
-    text += Format("slot:{}  {}\n", slot, name);
+    text += Format("slot:{}  {}\n", slot, NameText(name));
   }
   if (slots.empty()) context.out.Note(Format("no slot is assigned in {}", SlotFile()));
   context.out.Result({{"slots", list}, {"file", SlotFile()}}, text);
@@ -49,21 +49,24 @@ void ShowSlots(const Context& context, const std::map<std::uint16_t, std::string
 
 void Assign(const Context& context, const PortOptions& options) {
   auto slots = ReadSlots();
-  if (!options.slot) return ShowSlots(context, slots);
-  if (options.name.empty() != options.remove) {
+  if (!options.slot && !options.remove) return ShowSlots(context, slots);
+  if (options.name.empty() != options.remove || (options.remove && !options.slot)) {
     throw ToolError(ExitCode::kUsage, "a slot is assigned to a port, or removed",
                     "kral ports assign 3 usb:1-4.2, or kral ports assign 3 --remove");
   }
-  slots.erase(*options.slot);
+  if (slots.erase(*options.slot) == 0 && options.remove) {
+    throw ToolError(ExitCode::kUsage, Format("slot {} is not assigned", *options.slot),
+                    "kral ports assign lists those that are");
+  }
   if (!options.remove) {
-    CheckPortName(options.name);
+    const auto wanted = PortName(options.name);
     for (const auto& [slot, name] : slots) {
-      if (name == options.name) {
+      if (name == wanted) {
         throw ToolError(ExitCode::kUsage, Format("{} is slot {} already", name, slot),
                         Format("kral ports assign {} --remove takes it away from there", slot));
       }
     }
-    slots[*options.slot] = options.name;
+    slots[*options.slot] = wanted;
   }
   WriteSlots(slots);
   ShowSlots(context, slots);
