@@ -35,7 +35,8 @@ class Utf8Terminal {
 
 // Bytes written to the standard output come out as they are, line ends included.
 void UseBinaryOutput();
-// All that comes on the standard input, until its end; false where it is more than so many bytes.
+// All that comes on the standard input, until its end; false where it is more than so many bytes, and when the flag of
+// CatchInterrupts is set meanwhile.
 bool ReadStandardInput(size_t limit, std::vector<uint8_t>& bytes);
 
 // From now on Ctrl-C, a polite request to end and the closing of the terminal set `flag` instead of ending the program;

@@ -7,9 +7,12 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <string_view>
+
+#include "platform/posix/poll_wait.h"
 
 namespace kral {
 namespace {
@@ -74,12 +77,18 @@ Utf8Terminal::~Utf8Terminal() = default;
 void UseBinaryOutput() {}  // they always do
 
 bool ReadStandardInput(size_t limit, std::vector<uint8_t>& bytes) {
+  constexpr uint32_t kLookAroundMs = 100;
   std::array<uint8_t, 65536> piece{};
-  while (const size_t count = std::fread(piece.data(), 1, piece.size(), stdin)) {
-    if (count > limit - bytes.size()) return false;
-    bytes.insert(bytes.end(), piece.begin(), piece.begin() + static_cast<std::ptrdiff_t>(count));
+  std::array<pollfd, 1> input{{{STDIN_FILENO, POLLIN, 0}}};
+  for (;;) {
+    const auto* const flag = interrupt_flag.load();
+    if (flag != nullptr && *flag) return false;
+    if (!PollFor(input, kLookAroundMs)) continue;
+    const auto count = ::read(STDIN_FILENO, piece.data(), piece.size());
+    if (count <= 0) return count == 0;
+    if (static_cast<size_t>(count) > limit - bytes.size()) return false;
+    bytes.insert(bytes.end(), piece.begin(), piece.begin() + count);
   }
-  return std::ferror(stdin) == 0;
 }
 
 void CatchInterrupts(std::atomic<bool>* flag) {

@@ -6,7 +6,7 @@ import subprocess
 import time
 
 import tool
-from tool import PATIENCE, ToolTest, clean_environment, start
+from tool import PATIENCE, ToolTest, clean_environment, start, wait_until
 
 
 class Files(ToolTest):
@@ -125,6 +125,12 @@ class Files(ToolTest):
             self.fs(0, "mkdir", ":/c1")
             self.fs(0, "put", local, ":/c1/\x9b31m\x7f\u00e4")
             self.assertEqual([entry["name"] for entry in self.fs(0, "ls", ":/c1")["entries"]], ["\x9b31m\x7f\u00e4"])
+            self.assertIn(" \\xC2\\x9B31m\\x7F\u00e4\n", self.text("fs", "ls", ":/c1"))
+            # What is no text can be told apart, and given back.
+            self.fs(0, "put", local, os.fsdecode(b":/c1/n\xff\xfe"))
+            given = {entry.get("name_bytes") for entry in self.fs(0, "ls", ":/c1")["entries"]}
+            self.assertEqual(given, {None, "6E FF FE"})
+            self.assertIn(r"c1/n\xFE", self.fs(7, "stat", os.fsdecode(b":/c1/n\xfe"))["error"]["text"])
         # "." and ".." are the directory itself and the one above, in any listing.
         self.assertEqual(len(answer["left_out"]), len(names) - 1)
         self.assertEqual(len(tree), len(names))
@@ -144,6 +150,13 @@ class Files(ToolTest):
                 out, _ = process.communicate(timeout=PATIENCE)
                 self.assertEqual((process.returncode, json.loads(out)["error"]["name"]), (130, "interrupted"))
                 self.assertEqual(self.fs(0, "ls")["entries"], [])
+                log = self.path("log")
+                process = start("-p", "7", "--log", log, "fs", "put", "-", ":/f", ports=self.ports, stdin=subprocess.PIPE)
+                wait_until(lambda: tool.holds(log, "SEND"))
+                process.send_signal(signals[0])
+                self.assertEqual(process.wait(timeout=PATIENCE), 130, "while nothing comes to put")
+                process.communicate()
+                os.remove(log)
         self.assertEqual((event["event"], event["subject"], event["total"]), ("progress", local, 400000))
         self.assertGreater(event["done"], 0)
         self.assertGreater(event["seconds_left"], 0)

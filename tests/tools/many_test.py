@@ -106,6 +106,10 @@ class ManyHandsets(ToolTest):
             flash = ("flash", "all", "--enter", "--wait", "1", programmer, image)
             self.assertEqual(self.verdicts(0, "-p", "1,3", *flash, "--log", self.path("log{port}")), {1: 0, 3: 0})
             self.assertGreater(len(self.content("log3")), 0)
+            for code, port, log in ((2, 1, "log"), (10, 1, "no/log{port}"), (3, 9, "log{slot}")):
+                error = self.expect_json(code, "-p", f"{port},3", "--log", self.path(log), "flash", "write", image)["error"]
+                self.assertNotIn("COM0", error["text"])
+            self.assertTrue(os.path.exists(self.path("log1")))
             self.assertEqual({row["state"] for row in self.expect_json(0, "-p", "1,3", "flash", "info")["handsets"]},
                              {"programmer"})
             answer = self.expect_json(0, "--all", "flash", "write", image, "--reset")

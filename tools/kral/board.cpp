@@ -7,6 +7,7 @@
 #include "platform/console.h"
 #include "tools/kral/format.h"
 #include "tools/kral/progress.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -133,7 +134,7 @@ std::string Board::LineOf(const Row& row, std::size_t width) const {
       line = title + "  " + row.verdict;
       break;
   }
-  return line.substr(0, width);
+  return FirstCharacters(line, width);
 }
 
 std::vector<std::string> Board::Lines(std::size_t width, std::size_t height) const {

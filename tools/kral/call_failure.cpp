@@ -93,7 +93,7 @@ std::string SentenceOf(const KRAL_ERROR& record, std::string_view what, std::uin
   constexpr std::string_view kHandset = "the handset ";
   std::string text = record.text;
   if (IsLocal(record)) return text;
-  const std::string where = Mentions(text, port) ? "" : " on " + DescribePort(port);
+  const std::string where = port == 0 || Mentions(text, port) ? "" : " on " + DescribePort(port);
   if (IsOfRequest(record)) return Format("{}{}: {}", what, where, text);
   if (where.empty() || !text.starts_with(kHandset)) return text + where;
   return Format("the handset{} {}", where, text.substr(kHandset.size()));
@@ -119,7 +119,9 @@ ToolError ExplainRecord(const KRAL_ERROR& record, std::string_view what, std::ui
 ToolError ExplainRecord(const std::optional<KRAL_ERROR>& record, std::string_view what, std::uint16_t port,
                         std::string hint) {
   if (record) return ExplainRecord(*record, what, port, std::move(hint));
-  return {ExitCode::kInternal, Format("{} failed on {}", what, DescribePort(port)), "--log FILE tells more"};
+  return {ExitCode::kInternal,
+          port == 0 ? Format("{} failed", what) : Format("{} failed on {}", what, DescribePort(port)),
+          "--log FILE tells more"};
 }
 
 }  // namespace kral::tool

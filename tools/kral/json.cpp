@@ -5,6 +5,8 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
+#include "tools/kral/safe_text.h"
+
 namespace kral::tool {
 
 struct Json::Entry {
@@ -77,6 +79,22 @@ void Json::update(const Json& object) {
   for (const auto& [name, value] : object.entries_) (*this)[name] = value;
 }
 
+namespace {
+
+std::string BytesOf(const std::string& text) {
+  constexpr const char* kDigits = "0123456789ABCDEF";
+  std::string bytes;
+  for (const char character : text) {
+    const auto byte = static_cast<unsigned char>(character);
+    if (!bytes.empty()) bytes += ' ';
+    bytes += kDigits[byte >> 4];
+    bytes += kDigits[byte & 15];
+  }
+  return bytes;
+}
+
+}  // namespace
+
 struct Json::Writer {
   static Json Value(const nlohmann::ordered_json& tree) {
     if (tree.is_object()) {
@@ -109,7 +127,7 @@ struct Json::Writer {
       case Kind::kDouble:
         return json.double_;
       case Kind::kText:
-        return json.text_;
+        return IsUtf8(json.text_) ? json.text_ : NameText(json.text_);
       case Kind::kArray: {
         auto array = nlohmann::ordered_json::array();
         for (const auto& entry : json.entries_) array.push_back(Tree(entry.value));
@@ -117,7 +135,11 @@ struct Json::Writer {
       }
       case Kind::kObject: {
         auto object = nlohmann::ordered_json::object();
-        for (const auto& entry : json.entries_) object[entry.name] = Tree(entry.value);
+        for (const auto& [name, value] : json.entries_) {
+          object[name] = Tree(value);
+          // A name that is no text, to be given back.
+          if (value.kind_ == Kind::kText && !IsUtf8(value.text_)) object[name + "_bytes"] = BytesOf(value.text_);
+        }
         return object;
       }
     }
@@ -130,7 +152,7 @@ Json Json::parsed(std::string_view text) {
 }
 
 std::string Json::dump() const {
-  return Writer::Tree(*this).dump(-1, ' ', false, nlohmann::ordered_json::error_handler_t::replace);
+  return Writer::Tree(*this).dump();
 }
 
 }  // namespace kral::tool

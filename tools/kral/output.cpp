@@ -7,6 +7,7 @@
 #include <iterator>
 
 #include "tools/kral/format.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -15,37 +16,6 @@ constexpr std::size_t kDumpWidth = 16;
 
 bool IsPrintable(char character) {
   return character >= ' ' && character <= '~';
-}
-
-// How many bytes the character has that begins here; 0 for what is no UTF-8, and for controls.
-std::size_t CharacterLength(std::string_view text) {
-  const auto at = [&text](std::size_t i) { return i < text.size() ? static_cast<unsigned char>(text[i]) : 0U; };
-  const auto first = at(0);
-  if (first < 0x80) return first >= ' ' && first != 0x7F ? 1 : 0;
-  const std::size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
-  if (first < 0xC2 || first > 0xF4) return 0;
-  std::uint32_t code = first & (0x7FU >> length);
-  for (std::size_t i = 1; i < length; ++i) {
-    if ((at(i) & 0xC0U) != 0x80) return 0;
-    code = code << 6 | (at(i) & 0x3FU);
-  }
-  constexpr std::array<std::uint32_t, 5> kLeast{0, 0, 0xA0, 0x800, 0x10000};  // those in front of A0 are controls
-  const bool is_character = code >= kLeast[length] && code <= 0x10FFFF && (code < 0xD800 || code > 0xDFFF);
-  return is_character ? length : 0;
-}
-
-std::string Escaped(std::string_view text, std::string_view kept) {
-  std::string safe;
-  while (!text.empty()) {
-    const auto length = kept.find(text[0]) != std::string_view::npos ? 1 : CharacterLength(text);
-    if (length == 0) {
-      safe += Format("\\x{:02X}", static_cast<unsigned char>(text[0]));
-    } else {
-      safe += text.substr(0, length);
-    }
-    text.remove_prefix(std::max<std::size_t>(length, 1));
-  }
-  return safe;
 }
 
 constexpr std::array<const char*, 8> kStatusKinds{"none", "refusal", "reply",   "efs",
@@ -154,14 +124,6 @@ std::string Printable(std::string_view text) {
   std::replace_if(
       shown.begin(), shown.end(), [](char character) { return !IsPrintable(character); }, '?');
   return shown;
-}
-
-std::string NameText(std::string_view name) {
-  return Escaped(name, "");
-}
-
-std::string SafeText(std::string_view text) {
-  return Escaped(text, "\n\t");
 }
 
 std::string HexText(std::span<const std::uint8_t> bytes) {

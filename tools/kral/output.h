@@ -49,9 +49,6 @@ class Output {
 // "error" of an object that tells a failure.
 Json ErrorJson(const ToolError& error);
 
-// The same for whole texts, which may have lines and hold what a user, a file or a handset has named.
-std::string SafeText(std::string_view text);
-
 // On the standard error. That nobody reads it any more is no reason to stop anything.
 void WriteAside(std::string_view text) noexcept;
 
@@ -61,9 +58,6 @@ std::string JsonLine(const Json& object);
 
 // A text of the handset made fit for a terminal and for JSON: padding cut, anything but printable ASCII shown as '?'.
 std::string Printable(std::string_view text);
-
-// A name as it is shown: UTF-8 as it is, controls and bytes that are none as "\xFF".
-std::string NameText(std::string_view name);
 
 // Two upper-case digits per byte, separated by blanks.
 std::string HexText(std::span<const std::uint8_t> bytes);

@@ -78,13 +78,6 @@ std::uint16_t TheOnlyPort(Expected expected) {
                   "check cable and power of the handset and that no other program uses its port, or name it with -p N");
 }
 
-// An unwritable log is noticed here: the library drops the lines of a file that it cannot open without a word.
-std::shared_ptr<std::FILE> OpenLogFile(const std::string& name) {
-  if (std::FILE* const file = OpenToWriteText(name)) return {file, std::fclose};
-  throw ToolError(ExitCode::kBadFile, Format("the log file {} cannot be written", name),
-                  "check folder and permissions of the file named by --log; a pipe must have its reader already");
-}
-
 // The state when it stands in the way of every request; nothing when the port is open, or closed by a time-out only.
 std::optional<std::int32_t> TroubleOf(KRAL_HANDLE handle) {
   std::int32_t state = KRAL_PORT_OPEN;
@@ -143,6 +136,12 @@ std::string DescribePort(std::uint16_t port) {
   const std::string name = Format("COM{}", port);
   const std::string device = ComPortDevice(port);
   return device.empty() || device.find(name) != std::string::npos ? name : Format("{} ({})", name, device);
+}
+
+std::shared_ptr<std::FILE> OpenLogFile(const std::string& name) {
+  if (std::FILE* const file = OpenToWriteText(name)) return {file, std::fclose};
+  throw ToolError(ExitCode::kBadFile, Format("the log file {} cannot be written", name),
+                  "check folder and permissions of the file named by --log; a pipe must have its reader already");
 }
 
 std::uint16_t LatestPort() {

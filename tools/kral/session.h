@@ -49,6 +49,9 @@ class NoDiagnosticsError : public ToolError {
   using ToolError::ToolError;
 };
 
+// Kept open meanwhile: what the library cannot write is dropped without a word. ToolError kBadFile.
+std::shared_ptr<std::FILE> OpenLogFile(const std::string& name);
+
 class Session {
  public:
   // Connects and checks that a handset answers, unless it need not; ToolError when not, and when it is another one than

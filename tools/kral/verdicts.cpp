@@ -10,6 +10,7 @@
 #include "tools/kral/interrupt.h"
 #include "tools/kral/page.h"
 #include "tools/kral/run_report.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {

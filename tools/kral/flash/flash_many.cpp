@@ -3,10 +3,13 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstdio>
 #include <deque>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -46,12 +49,15 @@ class FlashJob {
     std::optional<Progress> progress;
     bool ended = false;
     StepTimes steps;
+    std::string log_name;
+    std::shared_ptr<std::FILE> log;
   };
 
   void Do(std::uint8_t result, const char* what) const;
   std::vector<std::uint16_t> Ports() const;
   void SetUp();
   void AddHandset(std::uint16_t port);
+  std::string LogOf(std::uint16_t port, std::size_t place) const;
   void Watch(Board& board);
   void Look(std::uint32_t number, Board& board);
   double SecondsNow() const;
@@ -113,19 +119,34 @@ void FlashJob::SetUp() {
   }
 }
 
+// Handsets in download do not tell who they are.
+std::string FlashJob::LogOf(std::uint16_t port, std::size_t place) const {
+  const auto slot = context_.session.slots.find(port);
+  const std::pair<std::string_view, std::string> names[] = {
+      {"{port}", std::to_string(port)},
+      {"{slot}", std::to_string(slot == context_.session.slots.end() ? place : slot->second)}};
+  auto log = context_.session.log_file;
+  for (const auto& [name, value] : names) {
+    for (auto at = log.find(name); at != std::string::npos; at = log.find(name, at + value.size())) {
+      log.replace(at, name.size(), value);
+    }
+  }
+  return log;
+}
+
 void FlashJob::AddHandset(std::uint16_t port) {
   std::uint32_t number = 0;
   Do(KRAL_VENTRIMS_AddPort(job_, port, &number), "the port");
   handsets_.emplace_back().verdict.port = port;
-  auto log = context_.session.log_file;
+  const auto log = LogOf(port, handsets_.size());
   if (log.empty()) return;
-  constexpr std::string_view kPort = "{port}";
-  const auto at = log.find(kPort);
-  if (at == std::string::npos) {
-    throw ToolError(ExitCode::kUsage, Format("the log {} would be that of all handsets", log),
-                    "put {port} into its name");
+  for (const auto& handset : handsets_) {
+    if (handset.log_name != log) continue;
+    throw ToolError(ExitCode::kUsage, Format("the log {} would be that of several handsets", log),
+                    "put {port} or {slot} into its name");
   }
-  log.replace(at, kPort.size(), std::to_string(port));
+  handsets_.back().log_name = log;
+  handsets_.back().log = OpenLogFile(log);
   KRAL_HANDLE handle = 0;
   Do(KRAL_VENTRIMS_GetHandle(job_, number, &handle), "the handset");
   if (context_.session.log_flags) KRAL_SetLogFlags(handle, *context_.session.log_flags);

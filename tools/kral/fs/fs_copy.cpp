@@ -12,6 +12,8 @@
 #include "platform/folder.h"
 #include "tools/kral/format.h"
 #include "tools/kral/fs/fs_names.h"
+#include "tools/kral/interrupt.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -23,6 +25,7 @@ const Bytes& StandardInput() {
   static const Bytes all = [] {
     Bytes bytes;
     if (ReadStandardInput(kLargestFile, bytes)) return bytes;
+    ThrowIfInterrupted();
     throw ToolError(ExitCode::kBadFile, "the standard input cannot be read whole",
                     Format("it may have {}", SizeText(kLargestFile)));
   }();
@@ -315,7 +318,7 @@ void Copier::Run(Plan&& plan, MakeOne&& make_folder, CopyOne&& copy) {
 }
 
 void Copier::Leave(std::string_view path, std::string_view reason) {
-  progress_.Note(Format("{} is left out: {}", Printable(path), reason));
+  progress_.Note(Format("{} is left out: {}", NameText(path), reason));
   left_.push_back({{"path", path}, {"reason", reason}});
 }
 

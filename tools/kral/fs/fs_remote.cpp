@@ -9,6 +9,7 @@
 #include "tools/kral/fs/fs_names.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/output.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -79,7 +80,7 @@ void KRAL_CALL RemoteFiles::OnEntry(const KRAL_EFS_ENTRY* entry, KRAL_HANDLE han
 }
 
 std::string RemoteFiles::Where(std::string_view path) const {
-  return Format("{} on {}", Printable(path), DescribePort(session_.port()));
+  return Format("{} on {}", NameText(path), DescribePort(session_.port()));
 }
 
 // A call whose answer is an error number has not failed, and leaves no record: the number is told as one is.
@@ -91,7 +92,7 @@ ToolError RemoteFiles::Refusal(std::string_view what, std::string_view path, std
   record.status_kind = KRAL_ERROR_STATUS_EFS;
   record.status = error_number;
   const std::string text = error_number == kNoSuchFile && !path.empty()
-                               ? Format("no such file {}", Printable(path))
+                               ? Format("no such file {}", NameText(path))
                                : Format("the handset refused {}: {}", what, ErrorText(error_number));
   text.copy(record.text, sizeof record.text - 1);
   return ExplainRecord(record, what, session_.port());
@@ -129,7 +130,7 @@ void RemoteFiles::Ask(std::string_view what, std::string_view path, std::string_
 std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
   RemoteStatus status;
   std::uint32_t error = 0;
-  const auto what = Format("the status of {}", Printable(path));
+  const auto what = Format("the status of {}", NameText(path));
   Transfer(what, [&] {
     return KRAL_EFS2_DIAG_STAT(session_.handle(), path.c_str(), &error, &status.mode, &status.size, &status.links,
                                &status.accessed, &status.modified, &status.changed);
@@ -141,13 +142,13 @@ std::optional<RemoteStatus> RemoteFiles::Find(const std::string& path) {
 
 RemoteStatus RemoteFiles::Status(const std::string& path) {
   if (const auto status = Find(path)) return *status;
-  throw Refusal(Format("the status of {}", Printable(path)), path, kNoSuchFile, kStatus);
+  throw Refusal(Format("the status of {}", NameText(path)), path, kNoSuchFile, kStatus);
 }
 
 std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
   listed_ = path;
   entries_.clear();
-  const auto what = Format("the listing of {}", Printable(path));
+  const auto what = Format("the listing of {}", NameText(path));
   session_.Begin();
   if (KRAL_EfsDirectory(session_.handle(), path.c_str(), KRAL_EFS_FILTER_ALL, nullptr, nullptr) == 0) {
     if (Interrupted() || entry_count_ < kMostEntries) throw session_.Explain(what);
@@ -161,7 +162,7 @@ std::vector<RemoteEntry> RemoteFiles::List(const std::string& path) {
 }
 
 void RemoteFiles::MakeDirectory(const std::string& path) {
-  const auto what = Format("the making of directory {}", Printable(path));
+  const auto what = Format("the making of directory {}", NameText(path));
   std::uint32_t error = 0;
   session_.Begin();
   if (KRAL_EfsMkDir(session_.handle(), path.c_str(), &error) == 0) {
@@ -179,20 +180,20 @@ void RemoteFiles::MakeParents(const std::string& path) {
 }
 
 void RemoteFiles::ReadInto(const std::string& local, const std::string& path) {
-  Transfer(Format("reading {}", Printable(path)),
+  Transfer(Format("reading {}", NameText(path)),
            [&] { return KRAL_EfsRead(session_.handle(), local.c_str(), path.c_str()); });
 }
 
 Bytes RemoteFiles::ReadAll(const std::string& path, std::uint32_t size) {
   Bytes bytes(size);
-  Transfer(Format("reading {}", Printable(path)),
+  Transfer(Format("reading {}", NameText(path)),
            [&] { return KRAL_EfsReadMem(session_.handle(), path.c_str(), bytes.data(), &size); });
   bytes.resize(size);
   return bytes;
 }
 
 void RemoteFiles::Write(const std::string& path, std::span<const std::uint8_t> bytes) {
-  Put(Format("writing {}", Printable(path)), path, [&] {
+  Put(Format("writing {}", NameText(path)), path, [&] {
     return KRAL_EfsWriteMem(session_.handle(), bytes.data(), static_cast<std::uint32_t>(bytes.size()), path.c_str());
   });
 }
@@ -203,7 +204,7 @@ void RemoteFiles::WriteItem(const std::string& path, std::span<const std::uint8_
                     Format("an item file holds {} bytes; remove it first to put an ordinary file in its place",
                            KRAL_EFS_ITEM_SIZE));
   }
-  Put(Format("writing the item {}", Printable(path)), path, [&] {
+  Put(Format("writing the item {}", NameText(path)), path, [&] {
     return KRAL_EfsPutItemFromMem(session_.handle(), path.c_str(), bytes.data(),
                                   static_cast<std::uint32_t>(bytes.size()));
   });

@@ -10,6 +10,7 @@
 #include "tools/kral/fs/fs_copy.h"
 #include "tools/kral/fs/fs_names.h"
 #include "tools/kral/fs/fs_remote.h"
+#include "tools/kral/safe_text.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -63,7 +64,7 @@ Json Describe(const RemoteEntry& entry) {
 std::string ListLine(const RemoteEntry& entry) {
   const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
   return Format("{}  {:>10}  {}  {}{}\n", ModeText(entry.mode), entry.size, TimeText(entry.modified),
-                Printable(entry.name), is_directory ? "/" : "");
+                NameText(entry.name), is_directory ? "/" : "");
 }
 
 // --- Looking --------------------------------------------------------------------------------------------------------
@@ -94,7 +95,7 @@ Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent
     const auto& entry = entries[i];
     const bool last = i + 1 == entries.size();
     const bool is_directory = entry.kind == RemoteEntry::Kind::kDirectory;
-    text += Format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", Printable(entry.name), is_directory ? "/" : "");
+    text += Format("{}{}{}{}\n", indent, last ? "`-- " : "|-- ", NameText(entry.name), is_directory ? "/" : "");
     rows.push_back(Describe(entry));
     if (!is_directory || entry.name.find('/') != std::string::npos) continue;
     const auto inner = indent + (last ? "    " : "|   ");
@@ -111,7 +112,7 @@ Json Draw(RemoteFiles& files, const std::string& path, const std::string& indent
 
 void Tree(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
-  auto text = Printable(path) + "\n";
+  auto text = NameText(path) + "\n";
   const auto rows = Draw(files, path, "", text);
   context.out.Result({{"port", files.session().port()}, {"path", path}, {"entries", rows}}, text);
 }
@@ -153,14 +154,14 @@ void Stat(Context& context, RemoteFiles& files, const FsOptions& options) {
   context.out.Result(
       members, Format("{}\n  type      {}\n  mode      {} ({:o})\n  size      {}\n  links     {}\n"
                       "  accessed  {}\n  modified  {}\n  changed   {}\n",
-                      Printable(path), KindName(status), ModeText(status.mode), status.mode, status.size, status.links,
+                      NameText(path), KindName(status), ModeText(status.mode), status.mode, status.size, status.links,
                       TimeText(status.accessed), TimeText(status.modified), TimeText(status.changed)));
 }
 
 void Room(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   KRAL_EFS_STATFS status{};
-  files.Ask(Format("the room of {}", Printable(path)), path, "KRAL_EFS2_DIAG_STATFS", [&](std::uint32_t* error) {
+  files.Ask(Format("the room of {}", NameText(path)), path, "KRAL_EFS2_DIAG_STATFS", [&](std::uint32_t* error) {
     return KRAL_EFS2_DIAG_STATFS(files.session().handle(), path.c_str(), error, &status);
   });
   const auto bytes = [&status](std::uint32_t blocks) { return std::uint64_t{blocks} * status.block_size; };
@@ -234,7 +235,7 @@ void ForEachPath(Context& context, RemoteFiles& files, const FsOptions& options,
 }
 
 void Remove(RemoteFiles& files, const std::string& path, std::string_view function, PathCall call) {
-  files.Ask(Format("the removal of {}", Printable(path)), path, function,
+  files.Ask(Format("the removal of {}", NameText(path)), path, function,
             [&](std::uint32_t* error) { return call(files.session().handle(), path.c_str(), error); });
 }
 
@@ -321,7 +322,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto from = EfsPath(options.paths[0]);
   auto to = EfsPath(options.paths[1]);
   if (const auto there = files.Find(to); there && there->is_directory()) to = JoinEfs(to, LastEfsName(from));
-  files.Ask(Format("the renaming of {} to {}", Printable(from), Printable(to)), from, "KRAL_EFS2_DIAG_RENAME",
+  files.Ask(Format("the renaming of {} to {}", NameText(from), NameText(to)), from, "KRAL_EFS2_DIAG_RENAME",
             [&](std::uint32_t* error) {
               return KRAL_EFS2_DIAG_RENAME(files.session().handle(), from.c_str(), to.c_str(), error);
             });
@@ -331,7 +332,7 @@ void Move(Context& context, RemoteFiles& files, const FsOptions& options) {
 void Link(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto target = EfsPath(options.paths[0]);
   const auto link = EfsPath(options.paths[1]);
-  files.Ask(Format("the link {}", Printable(link)), {}, "KRAL_EfsCreateLink", [&](std::uint32_t* error) {
+  files.Ask(Format("the link {}", NameText(link)), {}, "KRAL_EfsCreateLink", [&](std::uint32_t* error) {
     return KRAL_EfsCreateLink(files.session().handle(), target.c_str(), link.c_str(), error);
   });
   context.out.Result({{"port", files.session().port()}, {"target", target}, {"link", link}}, "");
@@ -341,7 +342,7 @@ void Sync(Context& context, RemoteFiles& files, const FsOptions& options) {
   const auto path = First(options);
   files.session().Begin();
   if (KRAL_EFS2_SyncWithWait(files.session().handle(), path.c_str(), options.wait_ms) == 0) {
-    const ToolError error = files.session().Explain(Format("the sync of {}", Printable(path)));
+    const ToolError error = files.session().Explain(Format("the sync of {}", NameText(path)));
     if (error.code() != ExitCode::kNoAnswer) throw error;
     throw ToolError(error.code(), error.what(), "--wait MS waits longer", error.record());
   }

@@ -8,6 +8,7 @@
 #include "tools/kral/format.h"
 #include "tools/kral/port_names.h"
 #include "tools/kral/port_report.h"
+#include "tools/kral/safe_text.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
