@@ -53,6 +53,8 @@ class Diag_FTM {
   // --- Connection -------------------------------------------------------------------------------------------------
   // Remembers the caller's functions: a port that is closed later is reopened with them, and otherwise with all zero.
   bool OpenPort(const OpenArguments& arguments);
+  // How often it was told to. What is known of the handset that was there before is then known no longer.
+  uint32_t connects() const { return connects_; }
   bool ClosePort();
   bool IsPhoneConnected();
   // Asks the diagnostic service of an application processor for a sign of life, with time-out 1.
@@ -218,6 +220,7 @@ class Diag_FTM {
   // Read and set without the request lock.
   std::array<std::atomic<uint32_t>, kTimeOutCount> time_outs_{};
   std::atomic<bool> connected_{false};
+  uint32_t connects_ = 0;
   std::atomic<uint8_t> target_type_{kTargetModem};
   std::atomic<uint32_t> handle_{0};
   std::atomic<bool> data_to_diagnostic_search_{true};

@@ -23,6 +23,7 @@ constexpr uint32_t kStateAliveWithoutAnswer = 4;
 }  // namespace
 
 bool Diag_FTM::OpenPort(const OpenArguments& arguments) {
+  ++connects_;
   user_ = arguments.user;
   GiveBackPort();
   return Open(arguments) || Fail(PortFailure(*this));

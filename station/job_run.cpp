@@ -11,6 +11,7 @@
 #include "station/job.h"
 #include "station/job_files.h"
 #include "station/job_plan.h"
+#include "storage/efs/efs_client.h"
 
 namespace kral::station {
 namespace {
@@ -27,7 +28,10 @@ bool Aborted() {
 bool OpenPort(JobHandset& handset, bool boot_loader) {
   Diag_FTM& phone = handset.phone();
   const std::lock_guard lock(phone.request_lock());
-  if (handset.own_port() && !phone.connected()) phone.SetReceiveMode(ReceiveMode::kWakeOnData);
+  if (handset.own_port() && !phone.connected()) {
+    phone.SetReceiveMode(ReceiveMode::kWakeOnData);
+    efs::SetAutomaticPacketSizes(phone, true);
+  }
   const bool open = boot_loader ? phone.BorrowPort() != nullptr : phone.IsPortOpen();
   return open || Fail(PortFailure(phone));
 }

@@ -21,7 +21,14 @@ When When::Of(std::string_view prefix_hex) const {
   return when;
 }
 
+When When::LongerThan(size_t bytes) const {
+  When when = *this;
+  when.longer_than_ = bytes;
+  return when;
+}
+
 bool When::Counts(ByteView packet) const {
+  if (longer_than_ != 0 && packet.size() <= longer_than_) return false;
   return packet.size() >= prefix_.size() && std::equal(prefix_.begin(), prefix_.end(), packet.begin());
 }
 

@@ -17,7 +17,8 @@
 namespace kral::handset {
 
 // Which requests a fault strikes; all replies to a struck request are. Counted from 1, among the requests that begin
-// with the prefix, from the moment the fault is added. In a wire mode every packet sent counts as one.
+// with the prefix and are longer than said, from the moment the fault is added. In a wire mode every packet sent counts
+// as one.
 class When {
  public:
   static When Nth(uint64_t n) { return When(n, 0); }
@@ -27,6 +28,7 @@ class When {
   static When Chance(double probability);
 
   When Of(std::string_view prefix_hex) const;
+  When LongerThan(size_t bytes) const;
 
  private:
   friend class FaultPlan;
@@ -34,6 +36,7 @@ class When {
   bool Counts(ByteView packet) const;
 
   Bytes prefix_;
+  size_t longer_than_ = 0;
   uint64_t first_;
   uint64_t step_;  // 0: only the first
   double probability_ = 1;

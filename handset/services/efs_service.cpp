@@ -107,7 +107,7 @@ Bytes EfsService::Read(ByteView request) {
     EfsNode& node = *file->second.node;
     const ByteView all = node.data;
     const size_t begin = std::min<size_t>(offset, all.size());
-    data = all.subspan(begin, std::min<size_t>(GetU32(request, 8), all.size() - begin));
+    data = all.subspan(begin, std::min({size_t{GetU32(request, 8)}, all.size() - begin, read_limit_}));
     node.accessed = tree_.now;
   }
   return efs::Reply(request)
@@ -270,6 +270,11 @@ void EfsService::OpenItemFiles(bool open) {
 void EfsService::SetWriteLimit(size_t bytes) {
   const std::lock_guard lock(mutex_);
   write_limit_ = bytes;
+}
+
+void EfsService::SetReadLimit(size_t bytes) {
+  const std::lock_guard lock(mutex_);
+  read_limit_ = bytes;
 }
 
 void EfsService::SetBadOffset(uint32_t offset) {

@@ -39,6 +39,7 @@ class EfsService final : public Service {
   void OpenItemFiles(bool open);
   // A write takes so many bytes at most; 0 takes none and tells no error.
   void SetWriteLimit(size_t bytes);
+  void SetReadLimit(size_t bytes);  // an answer has so many bytes of a file at most
   // Worn memory: files keep a wrong byte at this offset.
   void SetBadOffset(uint32_t offset);
   // A handset that is not to be trusted: its listings show one name as another.
@@ -89,6 +90,7 @@ class EfsService final : public Service {
   size_t most_directories_ = 4;
   bool opens_item_files_ = false;
   size_t write_limit_ = SIZE_MAX;
+  size_t read_limit_ = SIZE_MAX;
   std::optional<uint32_t> bad_offset_;
   std::map<std::string, std::string> shown_names_;
   uint32_t sync_polls_ = 0;

@@ -142,6 +142,20 @@ typedef void(KRAL_CALL* KRAL_EFS_DIRECTORY_CALLBACK)(const KRAL_EFS_ENTRY* entry
 KRAL_API uint8_t KRAL_CALL KRAL_SetEfsReadAndWritePacketSize(KRAL_HANDLE handle, uint16_t read_size,
                                                              uint16_t write_size);
 
+/**
+ * Lets transfers find out how large the packets are that the handset takes; off by default.
+ *
+ * The protocol has no question for it. So a transfer of 4 KiB or more tries packets of 6,143 bytes (writing) or 4,091
+ * (reading) first, then such of 2 KiB data, then those of KRAL_SetEfsReadAndWritePacketSize, which it never goes below.
+ * What the handset took stays in use until the caller connects again. A size that has not passed yet gets one try of at
+ * most 500 ms, later ones two: a handset that takes no notice of long packets costs a second, once. The data are right
+ * in either case.
+ *
+ * @param on  1: find out; 0: use the sizes that are set
+ * @return 1
+ */
+KRAL_API uint8_t KRAL_CALL KRAL_SetEfsAutomaticPacketSize(KRAL_HANDLE handle, uint8_t on);
+
 /** Sets both callbacks; null for none. They are called with the handle as their context. */
 KRAL_API uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_EFS_TRANSFER_CALLBACK transfer,
                                                        KRAL_EFS_DIRECTORY_CALLBACK directory);

@@ -139,7 +139,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_GetStepName(KRAL_VENTRIMS_JOB job, uint
 
 /**
  * Adds the handset on a COM port, 1 to 255, which the job opens when it is started, and closes when it is freed. A
- * connection of this program that has the port already is used, and stays as it is.
+ * connection of this program that has the port already is used, and stays as it is. On one of its own the job finds
+ * the largest packets of file transfers (KRAL_SetEfsAutomaticPacketSize).
  *
  * @param      job     the job
  * @param      port    number of the port

@@ -14,6 +14,7 @@ namespace kral::efs {
 
 // --- Settings (efs_settings.cpp); without the request lock --------------------------------------------------------
 bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size);
+bool SetAutomaticPacketSizes(Diag_FTM& phone, bool on);
 bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
                   KRAL_EFS_DIRECTORY_CALLBACK directory);
 

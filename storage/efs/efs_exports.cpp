@@ -18,6 +18,10 @@ uint8_t KRAL_CALL KRAL_SetEfsReadAndWritePacketSize(KRAL_HANDLE handle, uint16_t
       .RunAtOnce(efs::SetPacketSizes, read_size, write_size);
 }
 
+uint8_t KRAL_CALL KRAL_SetEfsAutomaticPacketSize(KRAL_HANDLE handle, uint8_t on) {
+  return ExportCall(handle, __func__).RunAtOnce(efs::SetAutomaticPacketSizes, on != 0);
+}
+
 uint8_t KRAL_CALL KRAL_ConfigureEfs2CallBacks(KRAL_HANDLE handle, KRAL_EFS_TRANSFER_CALLBACK transfer,
                                               KRAL_EFS_DIRECTORY_CALLBACK directory) {
   return ExportCall(handle, __func__).RunAtOnce(efs::SetCallbacks, handle, transfer, directory);

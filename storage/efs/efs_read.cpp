@@ -5,6 +5,7 @@
 #include "base/text_argument.h"
 #include "platform/file_util.h"
 #include "storage/efs/efs_handle.h"
+#include "storage/efs/efs_packets.h"
 #include "storage/efs/efs_request.h"
 #include "storage/efs/efs_transfer.h"
 
@@ -26,18 +27,20 @@ bool StatExisting(Diag_FTM& phone, const char* efs_file, FileStatus& status) {
 }
 
 // The data of one chunk, in the phone's packet buffer; nothing when it could not be had.
-std::optional<std::span<const u8>> ReadChunk(Diag_FTM& phone, const RemoteFile& file, u32 wanted, u32 offset) {
+std::optional<std::span<const u8>> ReadChunk(Diag_FTM& phone, const RemoteFile& file, const PacketSizes& sizes,
+                                             u32 wanted, u32 offset) {
   const u32 descriptor = file.value();
   Compose(phone, kRead, descriptor, wanted, offset);
   u32 error = 0;
   u32 count = 0;
-  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset); };
-  const Reply accepted = ExchangeUntil(phone, DefaultTimeOut(phone), is_own, [&](std::span<const u8> reply) {
+  const u32 most = sizes.MostOf(wanted);
+  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset, most); };
+  const auto accepts = [&](std::span<const u8> reply) {
     if (!ReadAt(phone, kTransferError, error)) return false;
     count = *LoadLe<u32>(reply, kTransferCount);
     return error != kDone || (count <= wanted && count <= reply.size() - kReadData) || Contradicts(phone);
-  });
-  if (!accepted) return std::nullopt;
+  };
+  if (!ExchangeUntil(phone, sizes.TimeOut(DefaultTimeOut(phone)), is_own, accepts, sizes.tries())) return std::nullopt;
   if (!IsDone(error, file.path())) {
     phone.log().WriteLine(kLogErr, "EFS Read error code %d", static_cast<int>(error));
     return std::nullopt;
@@ -51,32 +54,40 @@ bool EndedEarly(Diag_FTM& phone, const char* efs_file, u32 offset, u32 total) {
       Failure(KRAL_ERROR_LINK, "%s ended at %u of %u bytes", TextOrEmpty(efs_file), offset, total).Offset(offset));
 }
 
+bool CanRead(Diag_FTM& phone, u16 packet_size, u32 total) {
+  // A larger size works for files that do not fill a packet.
+  const u32 wanted = packet_size - std::min<u32>(packet_size, kReadOverhead);
+  if (wanted > 0 && kReadOverhead + std::min(wanted, total) <= kLongestReply) return true;
+  phone.log().WriteLine(kLogErr, "EFS Read packet size %d cannot be used", packet_size);
+  return Fail(Failure(KRAL_ERROR_ARGUMENT, "a read packet size of %d cannot be used", packet_size));
+}
+
+// A file that is being written may grow; one without end would fill the disk of the PC.
+bool IsWithinGrowth(Diag_FTM& phone, uint64_t end, u32 total) {
+  if (end <= std::min<uint64_t>(uint64_t{total} + kMostGrowth, UINT32_MAX)) return true;
+  phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes that the handset told, by far", total);
+  return Contradicts(phone);
+}
+
 // False also when the transfer was aborted, and when the file turned out shorter than the handset told.
 bool ReadChunks(Diag_FTM& phone, const RemoteFile& file, u32 total, const Sink& sink) {
-  const u16 packet_size = phone.state<Settings>().read_packet_size;
-  const u32 wanted = packet_size - std::min<u32>(packet_size, kReadOverhead);
-  // A larger size works for files that do not fill a packet.
-  if (wanted == 0 || kReadOverhead + std::min(wanted, total) > kLongestReply) {
-    phone.log().WriteLine(kLogErr, "EFS Read packet size %d cannot be used", packet_size);
-    return Fail(Failure(KRAL_ERROR_ARGUMENT, "a read packet size of %d cannot be used", packet_size));
-  }
+  PacketSizes sizes(phone, Direction::kFromHandset, total);
+  if (!CanRead(phone, sizes.callers_size(), total)) return false;
   u32 offset = 0;
-  for (bool full = true; full;) {
+  for (bool more = true; more;) {
     if (IsAborted(phone, "Read")) return false;
-    const auto chunk = ReadChunk(phone, file, wanted, offset);
+    const auto wanted = static_cast<u32>(sizes.size() - kReadOverhead);
+    const auto chunk = ReadChunk(phone, file, sizes, wanted, offset);
     if (!chunk) {
-      IsAborted(phone, "Read");
-      return false;
+      if (IsAborted(phone, "Read") || !sizes.FallBack()) return false;
+      continue;
     }
+    sizes.Passed();
     const auto count = static_cast<u32>(chunk->size());
-    // A file that is being written may grow; one without end would fill the disk of the PC.
-    if (uint64_t{offset} + count > std::min<uint64_t>(uint64_t{total} + kMostGrowth, UINT32_MAX)) {
-      phone.log().WriteLine(kLogErr, "EFS Read needs more than the %u bytes that the handset told, by far", total);
-      return Contradicts(phone);
-    }
-    if (!sink.write(*chunk)) return false;
-    full = count == wanted;
+    if (!IsWithinGrowth(phone, uint64_t{offset} + count, total) || !sink.write(*chunk)) return false;
     offset += count;
+    // Of more than the caller's size the handset may send what it can.
+    more = count == wanted || (!sizes.is_callers() && count > 0 && offset < total);
     phone.log().WriteLine(kLogRet, " EFS Read Transferred %u", offset);
     Tell(sink.progress, KRAL_EFS_OPERATION_READ, offset, total);
   }

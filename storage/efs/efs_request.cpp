@@ -133,9 +133,9 @@ Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own) {
   return reply;
 }
 
-Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts) {
+Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts, int tries) {
   Reply reply;
-  for (int attempt = 0; attempt < kTries; ++attempt) {
+  for (int attempt = 0; attempt < tries; ++attempt) {
     // With a handset that is silent, an abort would otherwise wait for every try.
     if (attempt > 0 && IsAborted(phone, "request")) return ReplyKind::kAborted;
     reply = Checked(ExchangeOnce(phone, time_out_ms, is_own), [&] { return accepts(phone.packet().response()); });

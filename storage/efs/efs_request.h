@@ -34,9 +34,10 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
 bool IsWithinLimit(Diag_FTM& phone);
 // Sends once; handles that late replies tell of are closed besides.
 Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
-// Sends until a reply of its own is accepted, at most five times and not after an abort. Each try opens a port that an
-// earlier one's time-out has closed. Whoever does not accept a reply has noted why.
-Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts);
+// Sends until a reply of its own is accepted, at most so many times and not after an abort. Each try opens a port that
+// an earlier one's time-out has closed. Whoever does not accept a reply has noted why.
+Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts,
+                    int tries = kTries);
 
 // A transfer, listing or sync, as long as it runs: an abort ends each of its requests but those that clean up. Earlier
 // aborts are forgotten, but for one of the job that it is a part of.

@@ -15,6 +15,11 @@ bool SetPacketSizes(Diag_FTM& phone, uint16_t read_size, uint16_t write_size) {
   return true;
 }
 
+bool SetAutomaticPacketSizes(Diag_FTM& phone, bool on) {
+  phone.state<Settings>().automatic_packet_size = on;
+  return true;
+}
+
 bool SetCallbacks(Diag_FTM& phone, KRAL_HANDLE context, KRAL_EFS_TRANSFER_CALLBACK transfer,
                   KRAL_EFS_DIRECTORY_CALLBACK directory) {
   Settings& settings = phone.state<Settings>();

@@ -18,11 +18,22 @@ struct OpenHandles {
   std::vector<uint32_t> strays;  // opened by such requests, to be closed
 };
 
+// What is known of the largest packet in one direction: the size by its place in the list of those that are tried, and
+// whether one has passed.
+struct FoundPacketSize {
+  uint8_t step = 0;
+  bool passed = false;
+};
+
 // The atomic ones are set from any thread, also while a transfer runs; the others belong to whoever holds the request
 // lock.
 struct Settings {
   std::atomic<uint16_t> read_packet_size{536};
   std::atomic<uint16_t> write_packet_size{524};
+  std::atomic<bool> automatic_packet_size{false};
+  FoundPacketSize found_read;  // since somebody has connected for the n-th time
+  FoundPacketSize found_write;
+  uint32_t found_on = 0;
   std::atomic<bool> abort{false};
   std::atomic<bool> job_abort{false};  // set with it, and cleared by what is made of many transfers only
   std::atomic<uint32_t> aborts{0};     // how often they were set

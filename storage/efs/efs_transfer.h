@@ -26,9 +26,11 @@ inline void Tell(const Progress& progress, u32 operation, u32 done, u32 total) {
   if (progress) progress(operation, done, total);
 }
 
-// Whether a read or write reply answers the packet at this offset. That to an earlier packet, come late, does not.
-inline bool IsOfChunk(std::span<const u8> reply, u32 descriptor, u32 offset) {
-  return LoadLe<u32>(reply, kHandleAt) == descriptor && LoadLe<u32>(reply, kTransferOffset) == offset;
+// Whether a read or write reply answers the packet at this offset. That to an earlier packet, come late, does not; nor
+// does one of more bytes than the `most` of this packet, where larger ones were tried first.
+inline bool IsOfChunk(std::span<const u8> reply, u32 descriptor, u32 offset, u32 most) {
+  return LoadLe<u32>(reply, kHandleAt) == descriptor && LoadLe<u32>(reply, kTransferOffset) == offset &&
+         LoadLe<u32>(reply, kTransferCount).value_or(0) <= most;
 }
 
 // --- Whole transfers ------------------------------------------------------------------------------------------------

@@ -6,6 +6,7 @@
 #include "base/text_argument.h"
 #include "platform/file_util.h"
 #include "storage/efs/efs_handle.h"
+#include "storage/efs/efs_packets.h"
 #include "storage/efs/efs_request.h"
 #include "storage/efs/efs_transfer.h"
 
@@ -69,19 +70,21 @@ bool IsUsable(Diag_FTM& phone, u16 packet_size) {
   return Fail(Failure(KRAL_ERROR_ARGUMENT, "a write packet size of %d cannot be used", packet_size));
 }
 
-bool WriteChunk(Diag_FTM& phone, const RemoteFile& file, u32 offset, std::span<const u8> chunk, u32& written) {
+bool WriteChunk(Diag_FTM& phone, const RemoteFile& file, const PacketSizes& sizes, u32 offset,
+                std::span<const u8> chunk, u32& written) {
   const u32 descriptor = file.value();
   Compose(phone, kWrite, descriptor, offset, chunk);
-  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset); };
-  const Reply accepted = ExchangeUntil(phone, PacketTimeOut(phone), is_own, [&](std::span<const u8> reply) {
+  const u32 most = sizes.MostOf(static_cast<u32>(chunk.size()));
+  const auto is_own = [&](std::span<const u8> reply) { return IsOfChunk(reply, descriptor, offset, most); };
+  const auto accepts = [&](std::span<const u8> reply) {
     u32 error = kDone;
     if (!ReadAt(phone, kTransferError, error)) return false;
     written = *LoadLe<u32>(reply, kTransferCount);
     if (IsDone(error, file.path())) return true;
     phone.log().WriteLine(kLogErr, "EFS Write error code %u", error);
     return false;
-  });
-  if (!accepted) return false;
+  };
+  if (!ExchangeUntil(phone, sizes.TimeOut(PacketTimeOut(phone)), is_own, accepts, sizes.tries())) return false;
   if (written > 0 && written <= chunk.size()) return true;
   phone.log().WriteLine(kLogErr, "EFS Write of %d bytes: the handset wrote %u", static_cast<int>(chunk.size()),
                         written);
@@ -89,17 +92,22 @@ bool WriteChunk(Diag_FTM& phone, const RemoteFile& file, u32 offset, std::span<c
 }
 
 // True also when the transfer was aborted.
-bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, u16 packet_size, const Source& source) {
+bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, PacketSizes sizes, const Source& source) {
   const std::atomic<bool>& abort = *phone.state<Settings>().heeded_abort();
-  std::vector<u8> buffer(packet_size - kWriteOverhead);
+  std::vector<u8> buffer(sizes.size() - kWriteOverhead);
   for (u32 offset = 0; offset < source.size && !abort;) {
-    const auto chunk = std::span(buffer).first(std::min<size_t>(buffer.size(), source.size - offset));
+    const size_t room = sizes.size() - kWriteOverhead;
+    const auto chunk = std::span(buffer).first(std::min<size_t>(room, source.size - offset));
     if (!source.read(offset, chunk)) {
       phone.log().WriteLine(kLogErr, "EFS Write: the local file cannot be read at %u", offset);
       return false;
     }
     u32 written = 0;
-    if (!WriteChunk(phone, file, offset, chunk, written)) return abort;
+    if (!WriteChunk(phone, file, sizes, offset, chunk, written)) {
+      if (!abort && sizes.FallBack()) continue;
+      return abort;
+    }
+    sizes.Passed();
     offset += written;
     phone.log().WriteLine(kLogRet, " EFS Write Transferred %u / %u bytes", offset, source.size);
     Tell(source.progress, KRAL_EFS_OPERATION_WRITE, offset, source.size);
@@ -110,12 +118,12 @@ bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, u16 packet_size, const
 bool Write(Diag_FTM& phone, const Source& source, const char* efs_file) {
   if (efs_file == nullptr) efs_file = "";
   // The handset's old file goes with the next steps, so everything that can be known to fail has failed before.
-  const u16 packet_size = phone.state<Settings>().write_packet_size;
-  if (!RemoteFile::CanOpen(phone, efs_file) || !IsUsable(phone, packet_size)) return false;
+  const PacketSizes sizes(phone, Direction::kToHandset, source.size);
+  if (!RemoteFile::CanOpen(phone, efs_file) || !IsUsable(phone, sizes.callers_size())) return false;
   if (!HasRoom(phone, source.size) || IsAborted(phone, "Write") || !RemoveItemFile(phone, efs_file)) return false;
   RemoteFile file(phone, efs_file);
   if (IsAborted(phone, "Write") || !file.Open(kOpenToWrite, kModeOfNewFiles)) return false;
-  const bool written = WriteChunks(phone, file, packet_size, source);
+  const bool written = WriteChunks(phone, file, sizes, source);
   if (!written) phone.log().WriteLine(kLogErr, "EFS2WriteEntireFile() failed");
   const bool closed = written && file.Close();
   if (!IsAborted(phone, "Write") && closed) return true;

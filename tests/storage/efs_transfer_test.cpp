@@ -122,6 +122,108 @@ TEST_F(EfsTransfer, PacketSizesAreTheCallers) {
   }
 }
 
+// The sizes of the packets of a put and a get: of 20,000 bytes each, and how many of each came first.
+struct FoundSizes {
+  const char* name;
+  Fault fault;
+  When when;
+  std::vector<size_t> writes, writes_again;  // bytes of data, the first ones; again: of the next transfer
+  std::vector<uint32_t> reads, reads_again;  // bytes asked for
+};
+
+class EfsPacketSizes : public EfsTransfer {
+ protected:
+  void SetUp() override {
+    EfsTransfer::SetUp();
+    ConnectAnew();
+  }
+  void ConnectAnew() {
+    Connect();
+    KRAL_SetReceiveMode(handle(), 1);
+    KRAL_SetEfsAutomaticPacketSize(handle(), 1);
+    ShortenTimeOuts(100);
+  }
+  void PutAndGet(const Bytes& data) {
+    handset().ClearTrace();
+    EXPECT_EQ(KRAL_EfsWriteMem(handle(), data.data(), static_cast<uint32_t>(data.size()), "/f"), 1) << LogText();
+    EXPECT_EQ(handset().efs().File("/f"), data);
+    Bytes back(data.size() + 1);
+    EXPECT_EQ(ReadMem("/f", back), 1) << LogText();
+    EXPECT_EQ(back, data);
+  }
+  std::vector<size_t> Writes(size_t most) {
+    std::vector<size_t> sizes;
+    for (const Bytes& request : RequestsOf(5)) sizes.push_back(request.size() - 8);
+    sizes.resize(std::min(most, sizes.size()));
+    return sizes;
+  }
+  std::vector<uint32_t> Reads(size_t most) {
+    std::vector<uint32_t> sizes;
+    for (const Bytes& request : RequestsOf(4)) sizes.push_back(handset::GetU32(request, 4));
+    sizes.resize(std::min(most, sizes.size()));
+    return sizes;
+  }
+  const Bytes data_ = RandomBytes(20000);
+};
+
+TEST_F(EfsPacketSizes, AreTheLargestThatTheHandsetTakes) {
+  const FoundSizes rows[] = {
+      {"takes all", handset::Ignore(), When::Nth(1).Of("FF"), {6131, 6131, 6131}, {6131}, {4071, 4071}, {4071}},
+      {"ignores writes",
+       handset::Ignore(),
+       When::Always().LongerThan(2100),
+       {6131, 2048, 2048},
+       {2048},
+       {4071},
+       {4071}},
+      {"refuses writes",
+       handset::Refuse(handset::Refusal::kBadLength),
+       When::Always().LongerThan(2000),
+       {6131, 2048, 512, 512},
+       {512},
+       {4071},
+       {4071}},
+      {"ignores reads",
+       handset::Ignore(),
+       When::Always().Of("4B 13 04 00 00 00 00 00 E7 0F"),
+       {6131},
+       {6131},
+       {4071, 2048, 2048},
+       {2048}},
+      // The answer to the packet that was tried comes in front of that to the one in its place.
+      {"writes late", handset::Lag(150), When::Nth(1).LongerThan(6000), {6131, 2048, 2048}, {2048}, {4071}, {4071}},
+      // Not the size is at fault where such a packet has passed before.
+      {"loses one", handset::Lose(), When::Nth(2).LongerThan(6000), {6131, 6131, 6131, 6131}, {6131}, {4071}, {4071}},
+  };
+  for (const FoundSizes& row : rows) {
+    SCOPED_TRACE(row.name);
+    ConnectAnew();
+    handset().faults().Clear();
+    handset().faults().Add(row.fault, row.when);
+    PutAndGet(data_);
+    EXPECT_EQ(Writes(row.writes.size()), row.writes);
+    EXPECT_EQ(Reads(row.reads.size()), row.reads);
+    PutAndGet(data_);
+    EXPECT_EQ(Writes(1), row.writes_again) << "known now";
+    EXPECT_EQ(Reads(1), row.reads_again);
+  }
+}
+
+TEST_F(EfsPacketSizes, AreTheCallersForShortFilesAndNeverSmaller) {
+  PutAndGet(RandomBytes(4000));
+  EXPECT_EQ(Writes(1), std::vector<size_t>{512}) << "not worth a try";
+  handset().efs().SetReadLimit(1000);
+  PutAndGet(data_);
+  EXPECT_EQ(Reads(2), (std::vector<uint32_t>{4071, 4071})) << "it sends what it can";
+  EXPECT_EQ(RequestsOf(4).size(), 20u);
+  handset().efs().SetReadLimit(SIZE_MAX);
+  ConnectAnew();
+  KRAL_SetEfsReadAndWritePacketSize(handle(), 536, 1500);
+  handset().faults().Add(handset::Ignore(), When::Always().LongerThan(1600));
+  PutAndGet(data_);
+  EXPECT_EQ(Writes(3), (std::vector<size_t>{6131, 2048, 1488}));
+}
+
 TEST_F(EfsTransfer, PacketSizesWithoutRoomFailTheTransfer) {
   const uint8_t byte = 1;
   for (const uint16_t size : {0, 12, 6144, 65535}) {

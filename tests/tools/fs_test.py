@@ -175,7 +175,7 @@ class Files(ToolTest):
         local = self.add("f", bytes(12000))
         ours, theirs = os.openpty()
         with self.handset("--fault", "delay=20,of=4B1305"):
-            subprocess.run([tool.KRAL, "-p", "7", "fs", "put", local, ":/f"], env=clean_environment(self.ports),
+            subprocess.run([tool.KRAL, "-p", "7", "fs", "--packet-size", "524", "put", local, ":/f"], env=clean_environment(self.ports),
                            stderr=theirs, stdout=subprocess.DEVNULL, check=True, timeout=PATIENCE)
         os.close(theirs)
         shown = os.read(ours, 65536).decode()
@@ -185,7 +185,7 @@ class Files(ToolTest):
 
     def test_handset_that_vanishes_while_copying_is_lost(self):
         local = self.add("f", bytes(5000))
-        with self.handset("--fault", "hang-up,nth=4,of=4B1304"):
+        with self.handset("--fault", "hang-up,nth=2,of=4B1304"):
             self.fs(0, "put", "--no-verify", local, ":/f")
             answer = self.ask(9, "--time-out", "200", "fs", "get", ":/f", self.path("back"))
             self.assertIn("went away", answer["error"]["text"])

@@ -192,6 +192,7 @@ Session::Session(const SessionOptions& options, Expected expected)
     }
     // What the handset answers late shall not be taken for the answer to something else.
     KRAL_SetResynchronise(handle_, 1);
+    KRAL_SetEfsAutomaticPacketSize(handle_, 1);
     CheckAnswers(expected);
     if (answers_ && !options.serial.empty()) CheckSerial(options.serial);
   } catch (...) {

@@ -28,7 +28,7 @@ struct FsOptions {
   bool unverified = false;
   bool parents = false;
   std::uint32_t wait_ms = kDefaultSyncMs;
-  std::uint16_t packet_size = 0;  // 0: the library's own
+  std::uint16_t packet_size = 0;  // 0: as large as the handset takes
 };
 
 std::string First(const FsOptions& options) {
@@ -426,6 +426,7 @@ void Run(Context& context, const FsOptions& options, const Verb& verb) {
   verb.check(options);
   RemoteFiles files(context.session);
   if (options.packet_size != 0) {
+    KRAL_SetEfsAutomaticPacketSize(files.session().handle(), 0);
     KRAL_SetEfsReadAndWritePacketSize(files.session().handle(), options.packet_size, options.packet_size);
   }
   verb.act(context, files, options);
@@ -449,7 +450,8 @@ void AddFlags(const Command& fs, FsOptions& options) {
 void AddFsVerbs(const Command& root, Context& context) {
   const auto options = std::make_shared<FsOptions>();
   const auto fs = root.Noun("fs", "Files on the handset; a ':' in front of a path marks the handset's side");
-  fs.Add("--packet-size", options->packet_size, "Bytes of a packet in transfers; larger ones are faster")
+  fs.Add("--packet-size", options->packet_size,
+         "Bytes of a packet in transfers; otherwise the largest that the handset takes")
       .Between(kSmallestPacket, kLargestPacket, "bytes");
   for (const auto& verb : kVerbs) {
     const auto subcommand = fs.Verb(verb.name, verb.help);

@@ -109,8 +109,15 @@ void AddFault(handset::FaultPlan& faults, const std::string& words) {
   const auto fault = ParseKind(words, TakeWord(rest));
   auto when = When::Always();
   std::string prefix;
+  std::size_t longer_than = 0;
   while (!rest.empty()) {
     const auto word = TakeWord(rest);
+    if (word.name == "longer") {
+      const auto bytes = ParseNumber(word.value);
+      if (!bytes || *bytes == 0) Reject(words, "longer needs a number of bytes, longer=2100");
+      longer_than = *bytes;
+      continue;
+    }
     if (word.name == "of") {
       prefix = word.value;
       continue;
@@ -119,6 +126,7 @@ void AddFault(handset::FaultPlan& faults, const std::string& words) {
     if (!parsed) Reject(words, Format("'{}={}' does not say when", word.name, word.value));
     when = *parsed;
   }
+  when = when.LongerThan(longer_than);
   try {
     faults.Add(fault, prefix.empty() ? when : when.Of(prefix));
   } catch (const std::invalid_argument&) {
@@ -127,7 +135,8 @@ void AddFault(handset::FaultPlan& faults, const std::string& words) {
 }
 
 std::string DescribeFaults() {
-  std::string text = "Faults of the simulated handset, KIND[=VALUE][,nth=N|from=N|every=N|chance=P][,of=HEX]:\n";
+  std::string text =
+      "Faults of the simulated handset, KIND[=VALUE][,nth=N|from=N|every=N|chance=P][,of=HEX][,longer=BYTES]:\n";
   for (const auto& kind : kKinds) {
     const auto written = kind.value.empty() ? std::string(kind.name) : Format("{}={}", kind.name, kind.value);
     text += Format("  {:<14}{}\n", written, kind.meaning);
