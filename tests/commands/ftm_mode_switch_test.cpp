@@ -67,6 +67,7 @@ TEST_F(ModeSwitchTest, BootModeStopsAtABadNvStatusAndAtAFailedSwitch) {
 
 TEST_F(ModeSwitchTest, ApplicationTargetIsNotInFtmWhateverItsServiceSays) {
   Connect([] { KRAL_SetTargetType(1); });
+  KRAL_ConfigureTimeOut(handle(), KRAL_TIME_OUT_LIVENESS, kAnswerInTimeMs);
   EXPECT_EQ(IsFtm(), 0);
   EXPECT_TRUE(Logged(
       "4 GetPhoneOperatingMode() is not supported in ZTD target. Use 0x4B, 0x32, 0x3, 0x0 to check diag service"));

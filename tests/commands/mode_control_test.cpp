@@ -64,7 +64,7 @@ TEST_F(ModeControl, OtherModesReturnRightAfterTheRequest) {
 
 TEST_F(ModeControl, SlowHandsetIsAskedAgainUntilItHasSwitched) {
   SetTimeOut(kReadBack, 5000);
-  handset().mode().SetSwitchingDelay(120);
+  handset().mode().SetSwitchingDelay(400);
   EXPECT_EQ(KRAL_DIAG_CONTROL_F(handle(), 3), 1);
   EXPECT_GE(handset().request_count(), 3u);
 }
@@ -72,7 +72,7 @@ TEST_F(ModeControl, SlowHandsetIsAskedAgainUntilItHasSwitched) {
 TEST_F(ModeControl, HandsetThatNeverSwitchesFailsTheCall) {
   handset().mode().SetSwitchingDelay(60000);
   EXPECT_EQ(KRAL_DIAG_CONTROL_F(handle(), 3), 0);
-  EXPECT_TRUE(HasLineWith("4 DIAG_CONTROL_F -- mode switching status polling has timeout (time used = 1"));
+  EXPECT_TRUE(HasLineWith("4 DIAG_CONTROL_F -- mode switching status polling has timeout (time used = "));
 }
 
 // The low four bits are sent, but the comparison takes the mode as it was passed.

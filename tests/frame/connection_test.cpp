@@ -90,6 +90,7 @@ TEST_F(Connection, WithoutADispatcherThreadConnectsFailAndSaySo) {
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 0);
   EXPECT_TRUE(log.Has("16 Error. No thread for the dispatcher of port 12."));
   SetThreadMaker({});
+  KRAL_ConfigureTimeOut(handle, KRAL_TIME_OUT_LIVENESS, kAnswerInTimeMs);
   EXPECT_EQ(KRAL_IsPhoneConnected(handle), 1) << "as soon as there are threads again";
 }
 
@@ -207,6 +208,7 @@ const std::pair<const char*, uint8_t> kServiceReplies[] = {
 TEST_F(Connection, ApplicationTargetAsksForTheDiagnosticService) {
   KRAL_SetTargetType(1);
   const KRAL_HANDLE handle = KRAL_ConnectServer(kPort);
+  KRAL_ConfigureTimeOut(handle, KRAL_TIME_OUT_LIVENESS, kAnswerInTimeMs);
   const test::PhoneLog log(handle, KRAL_LOG_IO);
   for (const auto& [reply, connected] : kServiceReplies) {
     handset_.Expect("4B 32 03 00 00 00 00 00 00 00 00 00").Reply(reply);

@@ -41,6 +41,9 @@ using handset::FromHex;
 using handset::HexText;
 using handset::When;
 
+// The time-out of a request that is answered at once: what a busy machine may need, and nothing has to wait for.
+inline constexpr int32_t kAnswerInTimeMs = 5000;
+
 }  // namespace kral
 
 #endif

@@ -175,8 +175,8 @@ class Files(ToolTest):
         local = self.add("f", bytes(12000))
         ours, theirs = os.openpty()
         with self.handset("--fault", "delay=20,of=4B1305"):
-            subprocess.run([tool.KRAL, "-p", "7", "fs", "--packet-size", "524", "put", local, ":/f"], env=clean_environment(self.ports),
-                           stderr=theirs, stdout=subprocess.DEVNULL, check=True, timeout=PATIENCE)
+            subprocess.run([tool.KRAL, "-p", "7", "fs", "--packet-size", "524", "put", local, ":/f"],
+                           env=clean_environment(self.ports), stderr=theirs, stdout=subprocess.DEVNULL, check=True, timeout=PATIENCE)
         os.close(theirs)
         shown = os.read(ours, 65536).decode()
         os.close(ours)
