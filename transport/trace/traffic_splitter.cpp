@@ -139,7 +139,10 @@ void TrafficSplitter::Flush(Side& side, const TrafficPiece& piece, const char* c
 }
 
 void TrafficSplitter::TakeEvent(const TrafficPiece& piece) {
-  const auto remark = [this](const std::string& text) { remark_ += (remark_.empty() ? "" : "; ") + text; };
+  // Gaps without a frame between them are one to the reader.
+  const auto remark = [this](const std::string& text) {
+    if (!remark_.ends_with(text)) remark_ += (remark_.empty() ? "" : "; ") + text;
+  };
   Side& side = At(piece.direction);
   switch (piece.kind) {
     case TrafficPiece::Kind::kOpened:
