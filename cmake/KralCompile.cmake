@@ -9,6 +9,9 @@ set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_C_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
 set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+# Nothing of what is delivered holds, or depends on the length of, the name of the folder that it was built in.
+set(CMAKE_BUILD_RPATH_USE_ORIGIN ON)
+add_compile_options($<$<CONFIG:Release,RelWithDebInfo>:-ffile-prefix-map=${PROJECT_SOURCE_DIR}=.>)
 
 add_library(kral_compile INTERFACE)
 target_compile_options(kral_compile INTERFACE
@@ -48,8 +51,8 @@ if(WIN32)
     add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
   endif()
   add_compile_definitions(_WIN32_WINNT=0x0601 WIN32_LEAN_AND_MEAN NOMINMAX __USE_MINGW_ANSI_STDIO=1)
-  # The runtimes are linked in: every program and the DLL are one file.
-  add_link_options(-static)
+  # The runtimes are linked in: every program and the DLL are one file. They do not tell when they were linked.
+  add_link_options(-static -Wl,--no-insert-timestamp)
 else()
   set(KRAL_PLATFORM posix)
 endif()
@@ -61,6 +64,7 @@ function(kral_unite target)
   set_target_properties(${target} PROPERTIES UNITY_BUILD_MODE GROUP)
   foreach(source IN LISTS sources)
     cmake_path(GET source PARENT_PATH folder)
+    cmake_path(RELATIVE_PATH folder BASE_DIRECTORY ${PROJECT_SOURCE_DIR})
     string(MAKE_C_IDENTIFIER "${folder}" folder)
     set_source_files_properties(${source} PROPERTIES UNITY_GROUP ${folder})
   endforeach()

@@ -22,8 +22,7 @@ if(WIN32)
     set(base 0x263000000)
     set(machine i386:x86-64)
   endif()
-  # A fixed base and no time stamp: two builds of one tree give the same bytes.
-  target_link_options(kral PRIVATE -Wl,--image-base=${base} -Wl,--no-insert-timestamp
+  target_link_options(kral PRIVATE -Wl,--image-base=${base}
     -Wl,--output-def=${CMAKE_CURRENT_BINARY_DIR}/kral-ordinals.def)
 
   # Visual C++ links through a short-form import library of its own. The ordinals are left out of it: they change
