@@ -9,6 +9,8 @@ set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_C_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
 set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+# The same doubles on every machine: where a multiplication could be fused with an addition, it is not.
+add_compile_options(-ffp-contract=off)
 # Nothing of what is delivered holds, or depends on the length of, the name of the folder that it was built in.
 set(CMAKE_BUILD_RPATH_USE_ORIGIN ON)
 add_compile_options($<$<CONFIG:Release,RelWithDebInfo>:-ffile-prefix-map=${PROJECT_SOURCE_DIR}=.>)

@@ -40,6 +40,16 @@ machine_sources() {
       print type, $2, $3, $4 }'
 }
 
+# Options that carry the machine's proxy settings into a new root.
+proxy_options() {
+  local scheme proxy
+  for scheme in http https; do
+    eval "$(apt-config shell proxy "Acquire::$scheme::Proxy")"
+    [ -z "${proxy:-}" ] || printf '%s\n' "--aptopt=Acquire::$scheme::Proxy \"$proxy\""
+    unset proxy
+  done
+}
+
 # What every build needs.
 build_packages=(cmake ninja-build g++ pkg-config zlib1g-dev libxml2-dev googletest libfmt-dev libcli11-dev nlohmann-json3-dev
   libtomlplusplus-dev python3 python3-pycparser libxml2-utils srecord libgsf-bin python3-olefile)
@@ -59,3 +69,5 @@ package_packages=(lintian man-db mmdebstrap util-linux)
 # What the Windows platform needs beside it, of 32 and of 64 bits.
 windows_packages=(g++-mingw-w64-i686-posix g++-mingw-w64-x86-64-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)
+# What builds for 64-bit ARM Linux, and runs it.
+arm64_packages=(g++-aarch64-linux-gnu mmdebstrap qemu-user)

@@ -132,11 +132,7 @@ TEST(Fcs16, BitsBehindTheLastWholeByteCountOneByOne) {
 template <class Block>
 class ByteBlocks : public testing::Test {};
 
-#ifdef __SSE2__
-using Kinds = testing::Types<WordBlock, Sse2Block>;
-#else
-using Kinds = testing::Types<WordBlock>;
-#endif
+using Kinds = testing::Types<WordBlock, ByteBlock>;
 TYPED_TEST_SUITE(ByteBlocks, Kinds);
 
 TYPED_TEST(ByteBlocks, FindMarksExactlyTheBytesOfTheValue) {

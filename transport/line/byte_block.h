@@ -1,4 +1,5 @@
-// A block of neighbouring bytes, loaded, stored and searched at once: 16 where SSE2 is part of the machine, else 8.
+// A block of neighbouring bytes, loaded, stored and searched at once: 16 where SSE2 or NEON is part of the machine, as it
+// is of every machine that the library is built for, else 8.
 #ifndef KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
 #define KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
 
@@ -9,6 +10,8 @@
 
 #ifdef __SSE2__
 #include <emmintrin.h>
+#elif defined(__aarch64__)
+#include <arm_neon.h>
 #endif
 
 namespace kral {
@@ -71,6 +74,35 @@ class Sse2Block {
 };
 
 using ByteBlock = Sse2Block;
+
+#elif defined(__aarch64__)
+
+// Sixteen bytes in a NEON register.
+class NeonBlock {
+ public:
+  static constexpr size_t kSize = 16;
+
+  static NeonBlock Load(const uint8_t* bytes) {
+    NeonBlock block;
+    block.bytes_ = vld1q_u8(bytes);
+    return block;
+  }
+  void Store(uint8_t* bytes) const { vst1q_u8(bytes, bytes_); }
+
+  // No instruction takes a bit of each byte: each keeps one of its own, and neighbours are added three times.
+  uint32_t Find(uint8_t value) const {
+    constexpr uint8x16_t kBits = {1, 2, 4, 8, 16, 32, 64, 128, 1, 2, 4, 8, 16, 32, 64, 128};
+    const uint8x16_t equal = vandq_u8(vceqq_u8(bytes_, vdupq_n_u8(value)), kBits);
+    const uint8x16_t pairs = vpaddq_u8(equal, equal);
+    const uint8x16_t fours = vpaddq_u8(pairs, pairs);
+    return vgetq_lane_u16(vreinterpretq_u16_u8(vpaddq_u8(fours, fours)), 0);
+  }
+
+ private:
+  uint8x16_t bytes_ = {};
+};
+
+using ByteBlock = NeonBlock;
 
 #else
 
