@@ -69,14 +69,14 @@ class BlockUnpacker {
 
 std::vector<uint8_t> MakeCaptureBlock(std::span<const uint8_t> records) {
   const auto stream = Compress(records, Effort::kFast);
-  std::vector<uint8_t> bytes(block::kSize);
+  std::vector<uint8_t> bytes(block::kSize + stream.size());
   std::ranges::copy(block::kMark, bytes.begin());
   const auto size = static_cast<uint32_t>(stream.size());
   StoreLe(std::span(bytes), block::kStreamSize, size);
   StoreLe(std::span(bytes), block::kStreamSizeComplement, ~size);
   StoreLe(std::span(bytes), block::kRecordsSize, static_cast<uint32_t>(records.size()));
   StoreLe(std::span(bytes), block::kMicroseconds, *LoadLe<uint64_t>(records, capture_record::kMicroseconds));
-  bytes.insert(bytes.end(), stream.begin(), stream.end());
+  std::ranges::copy(stream, bytes.begin() + block::kSize);
   return bytes;
 }
 
