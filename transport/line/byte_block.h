@@ -1,5 +1,5 @@
-// A block of neighbouring bytes, loaded, stored and searched at once: 16 where SSE2 or NEON is part of the machine, as it
-// is of every machine that the library is built for, else 8.
+// A block of neighbouring bytes, loaded, stored and searched at once: 16 where SSE2 or NEON is part of the machine, as
+// it is of every machine that the library is built for, else 8.
 #ifndef KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
 #define KRAL_TRANSPORT_LINE_BYTE_BLOCK_H
 
