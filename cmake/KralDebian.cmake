@@ -76,6 +76,16 @@ if(TARGET kral_tool)
   set(CPACK_DEBIAN_TOOL_PACKAGE_DEPENDS "${soname_package} (= ${KRAL_DEBIAN_VERSION})")
 endif()
 
+if(TARGET kral_reference)
+  list(APPEND CPACK_COMPONENTS_ALL documentation)
+  kral_debian_package(documentation kral-doc doc "reference of kral"
+    "${about}
+These are its functions, guides, examples and errors as HTML.")
+  set(CPACK_DEBIAN_DOCUMENTATION_PACKAGE_ARCHITECTURE all)
+  install(FILES packaging/debian/kral-doc.doc-base DESTINATION share/doc-base COMPONENT documentation RENAME kral-doc
+    EXCLUDE_FROM_ALL)
+endif()
+
 if(TARGET kral_bindings)
   list(APPEND CPACK_COMPONENTS_ALL python)
   kral_debian_package(python python3-kral python "manufacturing and test support for mobile handsets (Python 3)"

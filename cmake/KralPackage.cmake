@@ -38,6 +38,14 @@ install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT
   FILES_MATCHING PATTERN "*.h*")
 install(DIRECTORY share/kral/wireshark share/kral/commands DESTINATION ${CMAKE_INSTALL_DATADIR}/kral COMPONENT tool)
 
+if(WIN32)
+  set(examples_folder examples)
+else()
+  set(examples_folder ${CMAKE_INSTALL_DATADIR}/doc/libkral-dev/examples)
+endif()
+install(DIRECTORY examples/ DESTINATION ${examples_folder} COMPONENT development
+  PATTERN CMakeLists.txt EXCLUDE PATTERN __pycache__ EXCLUDE)
+
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/kral)
 install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder} COMPONENT development)
 configure_package_config_file(cmake/kralConfig.cmake.in ${PROJECT_BINARY_DIR}/package/kralConfig.cmake

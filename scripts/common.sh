@@ -65,9 +65,9 @@ language_packages=(flake8 libmono-system-core4.0-cil mono-mcs mono-runtime mypy 
 # What reads traces.
 trace_packages=(tshark)
 # What makes the packages whole (man pages, reference), and tries them.
-package_packages=(lintian man-db mmdebstrap util-linux)
+package_packages=(doxygen lintian man-db mmdebstrap util-linux)
 # What the Windows platform needs beside it, of 32 and of 64 bits.
-windows_packages=(g++-mingw-w64-i686-posix g++-mingw-w64-x86-64-posix libz-mingw-w64-dev llvm)
+windows_packages=(doxygen g++-mingw-w64-i686-posix g++-mingw-w64-x86-64-posix libz-mingw-w64-dev llvm)
 wine_packages=(mmdebstrap util-linux)
 # What builds for 64-bit ARM Linux, and runs it.
 arm64_packages=(g++-aarch64-linux-gnu mmdebstrap qemu-user)

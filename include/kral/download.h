@@ -220,7 +220,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_STREAM_WriteImageMem(KRAL_HANDLE handle, const u
 /** @name Image files; no handset is needed, and nothing is logged */
 /**@{*/
 
-#define KRAL_IMAGE_REGIONS 2
+#define KRAL_IMAGE_REGIONS 2 /**< that a KRAL_IMAGE_INFO has */
 
 /** What is in an image file. */
 typedef struct KRAL_IMAGE_INFO {

@@ -71,42 +71,42 @@ extern "C" {
 #define KRAL_EFS_MODE_KIND 0xF000u
 #define KRAL_EFS_MODE_ITEM_FILE 0xE000u
 
-#define KRAL_EFS_NAME_SIZE 512
+#define KRAL_EFS_NAME_SIZE 512 /**< bytes of a path, its end included */
 
 /** One entry of a directory. Times are the handset's, in seconds. */
 typedef struct KRAL_EFS_ENTRY {
-  uint32_t type; /**< KRAL_EFS_ENTRY_..., and 0 for types that only the handset knows */
-  uint32_t mode;
-  uint32_t size;
-  uint32_t access_time;
-  uint32_t modify_time;
-  uint32_t change_time;
+  uint32_t type;                 /**< KRAL_EFS_ENTRY_..., and 0 for types that only the handset knows */
+  uint32_t mode;                 /**< kind and permissions */
+  uint32_t size;                 /**< bytes */
+  uint32_t access_time;          /**< of its latest reading */
+  uint32_t modify_time;          /**< of its latest writing */
+  uint32_t change_time;          /**< of the latest change of its status */
   char name[KRAL_EFS_NAME_SIZE]; /**< the full path */
 } KRAL_EFS_ENTRY;
 
 /** What a file system reports about itself; sizes in blocks unless said otherwise. */
 typedef struct KRAL_EFS_STATFS {
-  uint32_t file_system_id;
-  uint32_t type;
-  uint32_t block_size; /**< bytes */
-  uint32_t total_blocks;
-  uint32_t available_blocks;
-  uint32_t free_blocks;
-  uint32_t max_file_size; /**< bytes */
-  uint32_t file_count;
-  uint32_t max_file_count;
+  uint32_t file_system_id;   /**< the handset's number of it */
+  uint32_t type;             /**< the handset's number of its kind */
+  uint32_t block_size;       /**< bytes */
+  uint32_t total_blocks;     /**< in use or not */
+  uint32_t available_blocks; /**< of those free, what files may take */
+  uint32_t free_blocks;      /**< not in use */
+  uint32_t max_file_size;    /**< bytes */
+  uint32_t file_count;       /**< files that are there */
+  uint32_t max_file_count;   /**< files that there may be */
 } KRAL_EFS_STATFS;
 
 /** The memory under the file system. */
 typedef struct KRAL_EFS_DEVICE_INFO {
-  uint32_t total_blocks;
-  uint32_t pages_per_block;
+  uint32_t total_blocks;    /**< that can be erased */
+  uint32_t pages_per_block; /**< that can be written */
   uint32_t page_size;       /**< bytes of data */
   uint32_t total_page_size; /**< bytes, spare area included */
-  uint32_t maker_id;
-  uint32_t device_id;
-  uint32_t device_type;
-  char name[64]; /**< terminated; a longer one is cut */
+  uint32_t maker_id;        /**< as the memory itself tells */
+  uint32_t device_id;       /**< the same */
+  uint32_t device_type;     /**< the handset's number of its kind */
+  char name[64];            /**< terminated; a longer one is cut */
 } KRAL_EFS_DEVICE_INFO;
 
 /**

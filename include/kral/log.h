@@ -48,7 +48,7 @@ typedef struct KRAL_EVENT {
   uint8_t time_stamp[8];     /**< of a truncated one the first two bytes */
   uint8_t event_id[2];       /**< little-endian, 0 to 4,095 */
   uint8_t payload_length;    /**< 0 also for payloads of one and of two bytes that go without a length */
-  uint8_t payload[256];
+  uint8_t payload[256];      /**< what belongs to the event, in its first payload_length bytes */
 } KRAL_EVENT;
 
 /* --- Collecting --------------------------------------------------------------------------------------------------- */

@@ -151,19 +151,22 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVEfsFilenamesStringLength(KRAL_HANDLE ha
  * definition. 12: the buffer is too small.
  */
 
-/** @param[out] data  [size] the value @param[in,out] size  the room; its bytes, also when the room is too small */
+/** Gets a value as bytes. @param[out] data  [size] the value @param[in,out] size  the room; its bytes, also when the
+ * room is too small */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
                                                                 uint16_t array_index, uint8_t* data, uint32_t* size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                                uint8_t* data, uint32_t* size);
 
-/** @param data  [size] the value @param size  bytes of the item's type, or of a value of variable size */
+/** Sets a value from bytes. @param data  [size] the value @param size  bytes of the item's type, or of a value of
+ * variable size */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByIndex(KRAL_HANDLE handle, uint32_t index,
                                                                 uint16_t array_index, const uint8_t* data,
                                                                 uint32_t size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueByteStreamByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,
                                                                const uint8_t* data, uint32_t size);
 
+/** Gets a value as text: decimal numbers with commas between them, or what the definition makes of them. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                             char* text, uint32_t size);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByIndexStringLength(KRAL_HANDLE handle, uint32_t index,
@@ -177,6 +180,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByEfsFilename(KRAL_HANDLE ha
 KRAL_API uint32_t KRAL_CALL KRAL_NV_GetNVValueStringByEfsFilenameStringLength(KRAL_HANDLE handle, const char* efs_file,
                                                                               uint32_t* length);
 
+/** Sets a value from such a text. */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueStringByIndex(KRAL_HANDLE handle, uint32_t index, uint16_t array_index,
                                                             const char* text);
 KRAL_API uint32_t KRAL_CALL KRAL_NV_SetNVValueStringByNVID(KRAL_HANDLE handle, uint16_t item, uint16_t array_index,

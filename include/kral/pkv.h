@@ -53,23 +53,23 @@ extern "C" {
 
 /** An NV item or a file, and what became of it. */
 typedef struct KRAL_PKV_ITEM {
-  uint16_t id; /**< of an NV item; 0 for a file */
-  uint16_t index;
-  uint16_t subscription;
-  uint16_t reserved;
-  uint32_t status; /**< NV status, or the error number of a file; 0xFFFF where the handset refused without one */
-  uint32_t result; /**< KRAL_PKV_DONE, ... */
+  uint16_t id;           /**< of an NV item; 0 for a file */
+  uint16_t index;        /**< of the element, where the item is an array */
+  uint16_t subscription; /**< that it belongs to */
+  uint16_t reserved;     /**< 0 */
+  uint32_t status;       /**< NV status, or the error number of a file; 0xFFFF where the handset refused without one */
+  uint32_t result;       /**< KRAL_PKV_DONE, ... */
 } KRAL_PKV_ITEM;
 
 /** How many of each result there were. */
 typedef struct KRAL_PKV_COUNTS {
-  uint32_t total; /**< items, files and what the PKV file holds beside (skipped); the others add up to it */
-  uint32_t done;
-  uint32_t skipped;
-  uint32_t refused;
-  uint32_t different;
-  uint32_t not_read_back;
-  uint32_t not_reached;
+  uint32_t total;         /**< items, files and what the PKV file holds beside (skipped); the others add up to it */
+  uint32_t done;          /**< KRAL_PKV_DONE */
+  uint32_t skipped;       /**< KRAL_PKV_SKIPPED */
+  uint32_t refused;       /**< KRAL_PKV_REFUSED */
+  uint32_t different;     /**< KRAL_PKV_DIFFERENT */
+  uint32_t not_read_back; /**< KRAL_PKV_NOT_READ_BACK */
+  uint32_t not_reached;   /**< KRAL_PKV_NOT_REACHED */
 } KRAL_PKV_COUNTS;
 
 /**

@@ -221,18 +221,18 @@ KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_Wait(KRAL_VENTRIMS_JOB job, uint32_t ti
 
 /** A job as a whole. */
 typedef struct KRAL_VENTRIMS_STATE {
-  uint32_t size;       /**< sizeof(KRAL_VENTRIMS_STATE) */
-  uint32_t state;      /**< KRAL_VENTRIMS_NEW, ... */
-  uint32_t steps;      /**< how many, with those that the options add; 0 while they are in a wrong order */
-  uint32_t handsets;   /**< how many; the next five add up to it */
-  uint32_t waiting;    /**< for others to end */
-  uint32_t working;    /**< also those that are awaited back */
-  uint32_t passed;     /**< all steps done */
-  uint32_t failed;     /**< see KRAL_VENTRIMS_GetResult */
-  uint32_t aborted;    /**< by KRAL_VENTRIMS_Abort */
-  uint32_t elapsed_ms; /**< since the start, until the end */
-  uint64_t bytes_done; /**< acknowledged by all handsets */
-  uint64_t bytes_total;
+  uint32_t size;        /**< sizeof(KRAL_VENTRIMS_STATE) */
+  uint32_t state;       /**< KRAL_VENTRIMS_NEW, ... */
+  uint32_t steps;       /**< how many, with those that the options add; 0 while they are in a wrong order */
+  uint32_t handsets;    /**< how many; the next five add up to it */
+  uint32_t waiting;     /**< for others to end */
+  uint32_t working;     /**< also those that are awaited back */
+  uint32_t passed;      /**< all steps done */
+  uint32_t failed;      /**< see KRAL_VENTRIMS_GetResult */
+  uint32_t aborted;     /**< by KRAL_VENTRIMS_Abort */
+  uint32_t elapsed_ms;  /**< since the start, until the end */
+  uint64_t bytes_done;  /**< acknowledged by all handsets */
+  uint64_t bytes_total; /**< of all handsets */
 } KRAL_VENTRIMS_STATE;
 
 /**
@@ -266,9 +266,9 @@ typedef struct KRAL_VENTRIMS_PROGRESS {
   uint64_t bytes_done;  /**< of programmer and images: acknowledged */
   uint64_t bytes_total; /**< of programmer and images */
   char step_name[64];   /**< as KRAL_VENTRIMS_GetStepName */
-  char model[64];
-  char revision[64]; /**< of its software, as told last */
-  char serial[16];   /**< eight hexadecimal digits */
+  char model[64];       /**< as the handset tells it */
+  char revision[64];    /**< of its software, as told last */
+  char serial[16];      /**< eight hexadecimal digits */
 } KRAL_VENTRIMS_PROGRESS;
 
 /**
