@@ -152,3 +152,128 @@
       return result;
     }
   }
+
+  /// <summary>What became of a handset of a job. Error is why it did not pass, Step where.</summary>
+  public sealed class Verdict {
+    internal Verdict(KRAL_VENTRIMS_RESULT result) {
+      Progress = result.progress;
+      if (result.passed == 0) {
+        Error = new KralException(Kral.Text(result.error.function), Kral.Text(result.error.text), result.error);
+      }
+    }
+
+    public KRAL_VENTRIMS_PROGRESS Progress { get; private set; }
+    public KralException Error { get; private set; }
+    public bool Passed { get { return Error == null; } }
+    public uint Port { get { return Progress.port; } }
+    public string Serial { get { return Kral.Text(Progress.serial); } }
+    public string Model { get { return Kral.Text(Progress.model); } }
+    public string Step { get { return Kral.Text(Progress.step_name); } }
+  }
+
+  /// <summary>The same work for many handsets at once: steps, handsets, one Run. Dispose aborts what still runs.</summary>
+  public sealed class Job : IDisposable {
+    private const uint LookMs = 100;
+    private readonly List<Phone> phones = new List<Phone>();  // which must live as long
+    private uint job;
+    private uint handsets;
+
+    /// <summary>EnterLoader: handsets are in diagnostics before a download. Reset: and are restarted after it.</summary>
+    public Job(bool enterLoader = false, bool reset = false, uint atOnce = 0, uint retries = 2) {
+      job = Native.KRAL_VENTRIMS_Create();
+      if (job == 0) throw KralException.Of(0, "KRAL_VENTRIMS_Create");
+      KRAL_VENTRIMS_OPTIONS options = new KRAL_VENTRIMS_OPTIONS();
+      options.size = (uint)Marshal.SizeOf(options);
+      Check(Native.KRAL_VENTRIMS_GetOptions(job, ref options), "KRAL_VENTRIMS_GetOptions");
+      options.flags = (enterLoader ? (uint)Native.KRAL_VENTRIMS_ENTER_LOADER : 0) |
+                      (reset ? (uint)Native.KRAL_VENTRIMS_RESET : 0);
+      options.at_once = atOnce;
+      options.retries = retries;
+      Check(Native.KRAL_VENTRIMS_SetOptions(job, ref options), "KRAL_VENTRIMS_SetOptions");
+    }
+
+    ~Job() { Dispose(); }
+
+    public void Dispose() {
+      uint own = job;
+      job = 0;
+      if (own != 0) Native.KRAL_VENTRIMS_Free(own);
+      GC.SuppressFinalize(this);
+    }
+
+    /// <summary>Loads a flash programmer: by the loader (HEX), or with the boot transfer.</summary>
+    public void AddProgrammer(string file, bool isHex) {
+      uint kind = (uint)(isHex ? Native.KRAL_VENTRIMS_PROGRAMMER_HEX : Native.KRAL_VENTRIMS_PROGRAMMER_BOOT);
+      Check(Native.KRAL_VENTRIMS_AddProgrammer(job, file, kind), "KRAL_VENTRIMS_AddProgrammer");
+    }
+
+    public void AddPartitionTable(string file, bool replace = false) {
+      byte result = Native.KRAL_VENTRIMS_AddPartitionTable(job, file, (byte)(replace ? 1 : 0));
+      Check(result, "KRAL_VENTRIMS_AddPartitionTable");
+    }
+
+    public void AddImage(string file, byte type = 0, string header = null) {
+      byte result = Native.KRAL_VENTRIMS_AddImage(job, file, (uint)Native.KRAL_IMAGE_FORMAT_BY_CONTENT, type, header,
+                                                  (byte)Native.KRAL_STREAM_MULTI_IMAGE);
+      Check(result, "KRAL_VENTRIMS_AddImage");
+    }
+
+    public void AddIdentity() { Check(Native.KRAL_VENTRIMS_AddIdentity(job), "KRAL_VENTRIMS_AddIdentity"); }
+    public void AddMode(uint mode) { Check(Native.KRAL_VENTRIMS_AddMode(job, mode), "KRAL_VENTRIMS_AddMode"); }
+    public void AddRestore(string file) { Check(Native.KRAL_VENTRIMS_AddRestore(job, file), "KRAL_VENTRIMS_AddRestore"); }
+    public void AddVerify(string file) { Check(Native.KRAL_VENTRIMS_AddVerify(job, file), "KRAL_VENTRIMS_AddVerify"); }
+
+    /// <summary>The handset on a COM port.</summary>
+    public void Add(uint port) {
+      uint number;
+      Check(Native.KRAL_VENTRIMS_AddPort(job, port, out number), "KRAL_VENTRIMS_AddPort");
+      ++handsets;
+    }
+
+    /// <summary>A handset that is connected.</summary>
+    public void Add(Phone phone) {
+      uint number;
+      Check(Native.KRAL_VENTRIMS_AddHandle(job, phone.Handle, out number), "KRAL_VENTRIMS_AddHandle");
+      phones.Add(phone);
+      ++handsets;
+    }
+
+    /// <summary>Ends the work on all handsets, from any thread.</summary>
+    public void Abort() {
+      Check(Native.KRAL_VENTRIMS_Abort(job, Native.KRAL_VENTRIMS_ALL), "KRAL_VENTRIMS_Abort");
+    }
+
+    /// <summary>
+    /// Looks at all files and ports, begins, and gives the verdicts as they come. progress is called on this thread,
+    /// for each handset that works, ten times a second.
+    /// </summary>
+    public IEnumerable<Verdict> Run(Action<KRAL_VENTRIMS_PROGRESS> progress = null) {
+      Check(Native.KRAL_VENTRIMS_Start(job), "KRAL_VENTRIMS_Start");
+      return Verdicts(progress);
+    }
+
+    private IEnumerable<Verdict> Verdicts(Action<KRAL_VENTRIMS_PROGRESS> progress) {
+      List<uint> waiting = new List<uint>();
+      for (uint handset = 0; handset < handsets; ++handset) waiting.Add(handset);
+      while (waiting.Count != 0) {
+        Native.KRAL_VENTRIMS_Wait(job, LookMs);
+        foreach (uint handset in waiting.ToArray()) {
+          KRAL_VENTRIMS_PROGRESS now = new KRAL_VENTRIMS_PROGRESS();
+          now.size = (uint)Marshal.SizeOf(now);
+          Check(Native.KRAL_VENTRIMS_GetProgress(job, handset, ref now), "KRAL_VENTRIMS_GetProgress");
+          if (progress != null) progress(now);
+          if (now.state < Native.KRAL_VENTRIMS_PASSED) continue;
+          KRAL_VENTRIMS_RESULT result = new KRAL_VENTRIMS_RESULT();
+          result.size = (uint)Marshal.SizeOf(result);
+          Check(Native.KRAL_VENTRIMS_GetResult(job, handset, ref result), "KRAL_VENTRIMS_GetResult");
+          waiting.Remove(handset);
+          yield return new Verdict(result);
+        }
+      }
+    }
+
+    private void Check(byte result, string function) {
+      if (job == 0) throw new ObjectDisposedException("Job");
+      if (result == 0) throw KralException.Of(job, function);
+    }
+  }

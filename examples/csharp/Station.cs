@@ -58,6 +58,14 @@ static class Station {
     // What the collector moves meanwhile must not matter to callbacks of the library.
     GC.Collect();
     phone.PKV_Verify(file, out status);
+    // The same comparison as a job, which takes as many handsets as there are.
+    using (Job job = new Job()) {
+      job.AddVerify(file);
+      job.Add(phone);
+      foreach (Verdict verdict in job.Run()) {
+        Console.WriteLine("job: {0} {1}, {2}", verdict.Serial, verdict.Passed ? "passed" : verdict.Error.Message, verdict.Step);
+      }
+    }
     KRAL_PKV_COUNTS counts;
     phone.PKV_GetCounts(out counts);
     Console.WriteLine("backup of {0} items, {1} equal, callback saw {2}", counts.total, counts.done, seen);

@@ -23,6 +23,7 @@ from kral.errors import (Aborted, BadArgument, BadFile, ErrorRecord, InternalErr
 from kral.files import Entry, FileError, Files, Status
 from kral.flashing import ImageInfo, flash, image_info
 from kral.ftm import Ftm
+from kral.jobs import Job, JobProgress, Verdict
 from kral.modes import Mode
 from kral.nv import Nv, NvDefinition, NvError, NvValue
 from kral.phone import Identity, Phone, connect, ports
@@ -31,8 +32,9 @@ from kral.traffic import Event, Packet
 
 __all__ = [
     "Aborted", "BadArgument", "BadFile", "Entry", "ErrorRecord", "Event", "FileError", "Files", "Ftm", "FtmModeId",
-    "Identity", "ImageInfo", "InternalError", "KralError", "LibraryNotFound", "LinkError", "Lost", "Mismatch", "Mode",
-    "NoAnswer", "NoPort", "Nv", "NvDefinition", "NvError", "NvValue", "Packet", "Phone", "PkvItem", "PkvResult",
-    "PortBusy", "Refused", "RfMode", "SafetyStop", "Status", "TimeOut", "__version__", "api", "bands", "connect",
-    "error_text", "flash", "image_info", "library_path", "library_version", "ports",
+    "Identity", "ImageInfo", "InternalError", "Job", "JobProgress", "KralError", "LibraryNotFound", "LinkError",
+    "Lost", "Mismatch", "Mode", "NoAnswer", "NoPort", "Nv", "NvDefinition", "NvError", "NvValue", "Packet", "Phone",
+    "PkvItem", "PkvResult", "PortBusy", "Refused", "RfMode", "SafetyStop", "Status", "TimeOut", "Verdict",
+    "__version__", "api", "bands", "connect", "error_text", "flash", "image_info", "library_path",
+    "library_version", "ports",
 ]

@@ -123,7 +123,11 @@ def last_error(handle: int = 0) -> Optional[ErrorRecord]:
     record = _api.KRAL_ERROR()
     if not load().KRAL_GetLastError(handle, ctypes.byref(record)):
         return None
+    return record_of(record)
 
+
+def record_of(record: Any) -> ErrorRecord:
+    """What a KRAL_ERROR says."""
     def known(bit: int, value: int) -> Optional[int]:
         return value if record.present & bit else None
 

@@ -187,6 +187,31 @@ def test_backup_restore_verify(phone, tmp_path):
         phone.restore(tmp_path / "none.pkv")
 
 
+@pytest.mark.handset("--esn", "0x10")
+def test_job_on_many_handsets(phone, handset, tmp_path):
+    file, told = tmp_path / "phone.pkv", []
+    phone.backup(file, items=range(440, 460))
+    with kral.sim.SimulatedHandset(199, "--esn", "0x20", "--fault", "refuse=20,of=29") as second:
+        job = kral.Job(retries=0)
+        job.mode(kral.Mode.OFFLINE)
+        job.restore(file)
+        job.verify(file)
+        verdicts = {verdict.serial: verdict for verdict in job.run([phone, second.port], told.append)}
+        passed, failed = verdicts["00000010"], verdicts["00000020"]
+        assert passed.passed and passed.error is None and passed.port == handset.port
+        assert failed.progress.step.startswith("mode") and isinstance(failed.error, kral.Refused) and failed.port == 199
+        assert {progress.port for progress in told} == {handset.port, 199} and phone.mode == kral.Mode.OFFLINE
+        # What is wrong is raised before anything is sent, and a job that is left ends.
+        with pytest.raises(kral.NoPort):
+            job.run([phone, 255])
+        for _ in job.run([phone, second.port]):
+            break
+        job.verify(tmp_path / "none.pkv")
+        with pytest.raises(kral.BadFile):
+            job.run([phone])
+    assert phone.identity.serial == 0x10
+
+
 def test_an_exception_in_progress_ends_the_work(phone, tmp_path):
     calls = []
 
