@@ -33,6 +33,7 @@ add_custom_target(kral_reference ALL DEPENDS ${KRAL_REFERENCE_DIR}/html/index.ht
 
 if(WIN32)
   install(DIRECTORY ${KRAL_REFERENCE_DIR}/html DESTINATION doc COMPONENT documentation)
+  install(FILES CHANGELOG.md DESTINATION doc COMPONENT documentation)
 else()
   install(DIRECTORY ${KRAL_REFERENCE_DIR}/html DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/kral-doc
     COMPONENT documentation)
