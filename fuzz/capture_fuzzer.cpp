@@ -4,10 +4,12 @@
 #include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <vector>
 
 #include "base/little_endian.h"
 #include "base/text_log.h"
 #include "fuzz/support.h"
+#include "transport/collection/capture_blocks.h"
 #include "transport/collection/capture_format.h"
 #include "transport/collection/capture_reader.h"
 #include "transport/collection/capture_seek.h"
@@ -16,6 +18,7 @@
 namespace {
 
 using namespace kral;
+using fuzz::ByteView;
 using fuzz::Require;
 
 // Through a file of two MiB, which goes round: shorter ones are read from the front.
@@ -32,9 +35,48 @@ void Seek(std::span<const uint8_t> file) {
     }
     return std::optional(count);
   };
-  const uint64_t found =
-      FindCaptureTime(bytes, capture_head::kSize, kLength, *LoadLe<uint64_t>(file, capture_head::kSize));
-  Require(found >= capture_head::kSize && found <= kLength);
+  for (const auto find : {FindCaptureTime, FindCaptureBlock}) {
+    const uint64_t found = find(bytes, capture_head::kSize, kLength, *LoadLe<uint64_t>(file, capture_head::kSize));
+    Require(found >= capture_head::kSize && found <= kLength);
+  }
+}
+
+struct Read {
+  std::vector<fuzz::Bytes> packets;
+  CaptureReader::Outcome outcome = CaptureReader::Outcome::kRecord;
+};
+
+Read ReadAll(ByteView file) {
+  Read read;
+  CaptureReader reader(fuzz::SourceOf(file));
+  for (CaptureRecord record; (read.outcome = reader.Next(record)) == CaptureReader::Outcome::kRecord;) {
+    read.packets.push_back(record.packet);
+  }
+  return read;
+}
+
+// What stands behind the head, compressed in two blocks: the same is read, and less of a file that is cut.
+void Pack(ByteView file) {
+  constexpr size_t kLeast = sizeof(uint64_t);  // the time of a block is that of its first record
+  const ByteView records = file.subspan(std::min(file.size(), capture_head::kSize));
+  if (records.size() < 2 * kLeast || LoadLe<uint16_t>(file, capture_head::kHeadSize) != capture_head::kSize ||
+      LoadLe<uint16_t>(file, capture_head::kVersion) != capture_head::kRecords) {
+    return;
+  }
+  const size_t middle = std::clamp(size_t{records[0]}, kLeast, records.size() - kLeast);
+  fuzz::Bytes packed(file.begin(), file.begin() + capture_head::kSize);
+  StoreLe(std::span(packed), capture_head::kVersion, capture_head::kBlocks);
+  for (const ByteView part : {records.first(middle), records.subspan(middle)}) {
+    const auto block = MakeCaptureBlock(part);
+    packed.insert(packed.end(), block.begin(), block.end());
+  }
+  const Read plain = ReadAll(file);
+  const Read same = ReadAll(packed);
+  Require(same.packets == plain.packets && same.outcome == plain.outcome);
+  packed.resize(packed.size() - std::min(size_t{records[1]}, packed.size() - capture_head::kSize));
+  const Read less = ReadAll(packed);
+  Require(less.packets.size() <= plain.packets.size() &&
+          std::equal(less.packets.begin(), less.packets.end(), plain.packets.begin()));
 }
 
 }  // namespace
@@ -78,5 +120,6 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Require(counters.collected + responses.size() + responses.dropped() == packets && counters.oversized == 0);
   while (const auto event = events.Pop()) Require(*LoadLe<uint16_t>(event->bytes, EventRecord::kEventId) <= 0xFFF);
   Seek(file);
+  Pack(file);
   return 0;
 }

@@ -11,7 +11,8 @@ import sys
 # What each target is for: the files below these paths read what it gives them.
 READERS = {
     "boot": ["download/boot/"],
-    "capture": ["transport/collection/capture_reader", "transport/collection/capture_seek"],
+    "capture": ["transport/collection/capture_blocks", "transport/collection/capture_reader",
+                "transport/collection/capture_seek"],
     "commands": ["commands/defined/decode", "commands/defined/definition", "commands/defined/field_xml",
                  "platform/posix/xml_", "platform/xml_"],
     "deframer": ["transport/line/hdlc_deframer", "transport/line/fcs16"],
