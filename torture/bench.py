@@ -4,18 +4,22 @@ from __future__ import annotations
 import collections
 import ctypes
 import hashlib
+import os
 import pathlib
 import random
+import shutil
 import tempfile
 import threading
 import time
-from typing import Any, Callable, Counter, Deque, Iterator, Tuple
+from typing import Any, Callable, Counter, Deque, Iterator, Optional, Tuple
 
 import contextlib
 
 import kral
 from kral import _api
-from torture.peer.line import Line, Ports
+from torture.peer.line import CallerLine, Line, Ports, PtyLine
+from torture.peer.phone import Phone
+from torture.windows import driver
 
 # Milliseconds that the calls under trial are given, where nothing else is said.
 TIME_OUT_MS = 200
@@ -25,6 +29,14 @@ MODES = {"poll": _api.KRAL_RECEIVE_MODE_POLL, "wake": _api.KRAL_RECEIVE_MODE_WAK
 _CALLER_PORTS = 1000
 # COM ports whose numbers are no serial port's of the machine: with its link gone, a low number would be one.
 _FIRST_COM_PORT = 200
+
+
+LINUX, WINDOWS = "linux", "windows-x86"
+
+
+def platform() -> str:
+    """That of the library under trial."""
+    return WINDOWS if os.environ.get("KRAL_LIBRARY", "").endswith(".dll") else LINUX
 
 
 class Broken(Exception):
@@ -39,12 +51,12 @@ class Lateness:
     """
 
     _SLEEP = 0.004
-    # What a sleep is always late by: the timer's own.
-    _SLACK = 0.001
     # More than the longest time that is asked for, and no more: it would look as if the library grew.
     _KEPT = 10000
 
-    def __init__(self) -> None:
+    def __init__(self, sleep: Callable[[float], Any] = time.sleep, slack: float = 0.001) -> None:
+        """`slack` is what a sleep is always late by: the timer's own."""
+        self._sleep, self._slack = sleep, slack
         self._late: Deque[Tuple[float, float]] = collections.deque(maxlen=self._KEPT)
         self._stop = False
         self._thread = threading.Thread(target=self._run, daemon=True)
@@ -53,7 +65,7 @@ class Lateness:
     def _run(self) -> None:
         while not self._stop:
             begin = time.monotonic()
-            time.sleep(self._SLEEP)
+            self._sleep(self._SLEEP)
             end = time.monotonic()
             self._late.append((end, end - begin - self._SLEEP))
 
@@ -62,7 +74,7 @@ class Lateness:
         while self._late and self._late[-1][0] < end:  # the sleep that was under way at the end counts, too
             time.sleep(self._SLEEP)
         sleeps = [late for when, late in list(self._late) if when >= begin and when - late <= end + self._SLEEP]
-        return sum(max(0.0, late - self._SLACK) for late in sleeps)
+        return sum(max(0.0, late - self._slack) for late in sleeps)
 
     def stop(self) -> None:
         self._stop = True
@@ -78,12 +90,23 @@ class Bench:
         self.short = short
         self.folder = folder
         self.ports = Ports(pathlib.Path(tempfile.mkdtemp(prefix="ports", dir=folder)))
-        self.lateness = Lateness()
         self.figures: Counter[str] = collections.Counter()
         self.worst: Counter[str] = collections.Counter()
         self._lock = threading.Lock()
         self._next_port = _CALLER_PORTS
         self._free = list(range(_FIRST_COM_PORT, _FIRST_COM_PORT + CONTEXTS))
+        self.driver: Optional[driver.Driver] = None
+        if platform() != LINUX:
+            self.driver = self._start_driver()
+        self.lateness = Lateness() if self.driver is None else Lateness(self.driver.sleep, driver.SLACK)
+
+    def _start_driver(self) -> driver.Driver:
+        """The library in a process of the other system, where its ports have the same numbers."""
+        shutil.copy(os.environ["KRAL_LIBRARY"], self.folder)
+        started = driver.Driver(self.folder, {port: str(self.ports.path(port)) for port in self._free})
+        remote = driver.RemoteApi(started)
+        setattr(kral, "api", lambda: remote)
+        return started
 
     def random(self, case: str) -> random.Random:
         """The same numbers for the same case and seed, whatever else runs."""
@@ -115,8 +138,23 @@ class Bench:
             with self._lock:
                 self._free.append(number)
 
+    @contextlib.contextmanager
+    def port(self) -> Iterator[int]:
+        """A number for lines, one after the other: a caller's transports where the library can be given them."""
+        if self.driver is None:
+            yield self.caller_port()
+            return
+        with self.com_port() as port:
+            yield port
+
+    def line(self, phone: Phone, port: int) -> Line:
+        """`port` is one of port()."""
+        return CallerLine(phone, port) if self.driver is None else PtyLine(phone, self.ports, port)
+
     def close(self) -> None:
         self.lateness.stop()
+        if self.driver is not None:
+            self.driver.close()
 
 
 def check(good: bool, text: str) -> None:

@@ -18,7 +18,7 @@ import traceback
 from typing import Any, Dict, List, Optional
 
 import torture.promises
-from torture.bench import Bench, Broken
+from torture.bench import LINUX, WINDOWS, Bench, Broken, platform
 
 # A program that has not ended by then hangs; it is killed, and what it had not run counts as failed.
 _LONGEST_S = 3600.0
@@ -29,11 +29,13 @@ _SHOWN_FAILURES = 20
 def promises() -> Dict[int, Any]:
     names = [module.name for module in pkgutil.iter_modules(torture.promises.__path__)]
     modules = [importlib.import_module(f"torture.promises.{name}") for name in names]
-    return {module.NUMBER: module for module in sorted(modules, key=lambda module: int(module.NUMBER))}
+    return {module.NUMBER: module for module in sorted(modules, key=lambda module: int(module.NUMBER))
+            if platform() in getattr(module, "PLATFORMS", (LINUX,))}
 
 
-def _repeat(number: int, seed: int, case: str) -> str:
-    return f"scripts/torture {number} --seed {seed} --case '{case}'"
+def _repeat(number: int, seed: int, case: str = "") -> str:
+    where = f" --platform {platform()}" if platform() != LINUX else ""
+    return f"scripts/torture {number} --seed {seed}{where}" + (f" --case '{case}'" if case else "")
 
 
 def _run_case(module: Any, bench: Bench, case: str) -> Optional[str]:
@@ -51,9 +53,10 @@ def _chosen(module: Any, bench: Bench, only: Optional[str]) -> List[str]:
     cases: List[str] = module.cases(bench)
     if only is not None:
         return [only]
-    if not bench.short or len(cases) <= module.SHORT:
+    some = module.SHORT if platform() == LINUX else getattr(module, "SHORT_WINDOWS", module.SHORT)
+    if not bench.short or len(cases) <= some:
         return cases
-    return random.Random(bench.seed).sample(cases, module.SHORT)
+    return random.Random(bench.seed).sample(cases, some)
 
 
 def run_here(number: int, seed: int, short: bool, only: Optional[str], folder: pathlib.Path) -> Dict[str, Any]:
@@ -95,7 +98,7 @@ def _child(arguments: argparse.Namespace) -> int:
 def _environment(module: Any, folder: pathlib.Path) -> Dict[str, str]:
     """What a promise has preloaded; where a sanitized library is at hand, the promises that say so run on it."""
     environment = dict(os.environ)
-    if hasattr(module, "preload"):
+    if hasattr(module, "preload") and platform() == LINUX:
         environment["LD_PRELOAD"] = module.preload(folder)
     sanitizer = getattr(module, "SANITIZER", "")
     library = environment.get(f"KRAL_{sanitizer.upper()}_LIBRARY") if sanitizer else None
@@ -125,7 +128,7 @@ def _run_child(number: int, seed: int, arguments: argparse.Namespace) -> Dict[st
     except subprocess.TimeoutExpired:
         how = f"it had not ended after {limit:.0f} s"
     print(f"FAILED: promise {number}: {how} and no result (seed {seed})\n"
-          f"    again: scripts/torture {number} --seed {seed}", file=sys.stderr, flush=True)
+          f"    again: {_repeat(number, seed)}", file=sys.stderr, flush=True)
     return {"cases": 1, "ran": 0, "failed": 0, "figures": {}, "worst": {}}
 
 
@@ -167,6 +170,8 @@ def main(words: List[str]) -> int:
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--short", action="store_true", help="a sample of the cases of each")
     parser.add_argument("--case", help="only this one")
+    parser.add_argument("--platform", choices=(LINUX, WINDOWS), default=platform(),
+                        help="as scripts/torture has chosen the library for it")
     parser.add_argument("--child", action="store_true", help=argparse.SUPPRESS)
     arguments = parser.parse_args(words)
     if arguments.child:

@@ -67,6 +67,7 @@ bool IsVanished(DWORD code) {
     case ERROR_ACCESS_DENIED:
     case ERROR_INVALID_HANDLE:
     case ERROR_BAD_COMMAND:
+    case ERROR_NOT_READY:
     case ERROR_GEN_FAILURE:
     case ERROR_IO_DEVICE:
     case ERROR_DEVICE_NOT_CONNECTED:

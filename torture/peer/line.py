@@ -38,6 +38,8 @@ class Line:
         self.came = threading.Event()
         # Gives what comes in front of every piece, and when there is none; or nothing.
         self.source: Optional[Callable[[], bytes]] = None
+        # What the line makes of bytes, in both directions.
+        self.spoil: Callable[[bytes], bytes] = lambda data: data
         self._deframer = Deframer()
         self._lock = threading.Lock()
         self._pieces: List[Tuple[float, int, bytes]] = []
@@ -63,7 +65,7 @@ class Line:
             self.source = None
 
     def _receive(self, data: bytes) -> None:
-        for request in self._deframer.feed(data):
+        for request in self._deframer.feed(self.spoil(data)):
             self.requests.append(request)
             self.behaviour(request, self)
             self.came.set()
@@ -77,7 +79,7 @@ class Line:
                 if self._pieces and self._pieces[0][0] <= time.monotonic():
                     data += heapq.heappop(self._pieces)[2]
             self._rest = data[room:]
-            return data[:room]
+            return self.spoil(data[:room])
 
     def _wake(self) -> None:
         """There may be something to send."""
@@ -137,14 +139,17 @@ class Ports:
         self.folder = folder
         os.environ["KRAL_PORT_DIR"] = str(folder)
 
+    def path(self, port: int) -> pathlib.Path:
+        return self.folder / f"com{port}"
+
     def link(self, port: int, device: str) -> None:
-        link = self.folder / f"com{port}"
+        link = self.path(port)
         fresh = self.folder / f".com{port}.new"
         fresh.symlink_to(device)
         fresh.replace(link)
 
     def unlink(self, port: int) -> None:
-        (self.folder / f"com{port}").unlink(missing_ok=True)
+        self.path(port).unlink(missing_ok=True)
 
 
 class PtyLine(Line):

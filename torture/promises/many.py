@@ -1,23 +1,26 @@
 """Fifty handsets in one process, a thread for each: connects, requests, disconnects, every answer of the right one."""
 from __future__ import annotations
 
+import random
 import struct
 from typing import Any, Dict, List
 
 import kral
 from torture import calls
-from torture.bench import CONTEXTS, MODES, Bench, check, connected
-from torture.peer.line import CallerLine
+from torture.bench import CONTEXTS, LINUX, MODES, WINDOWS, Bench, check, connected
+from torture.peer.line import Line
 from torture.peer.phone import Phone
 
 NUMBER = 8
 TITLE = "50 handsets in one process"
 SHORT = CONTEXTS
+PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = CONTEXTS
 _TIME_OUT_MS = 20000
 _ROUNDS = 40
-_ROUNDS_SHORT = 3
+_ROUNDS_SHORT = 2
 _REQUESTS = 60
+_REQUESTS_SHORT = 20
 _FIRST_SERIAL = 0x80000100
 
 
@@ -48,22 +51,25 @@ def _expected(serial: int) -> Dict[str, Any]:
     }
 
 
+def _round(bench: Bench, line: Line, serial: int, numbers: random.Random) -> None:
+    expected = _expected(serial)
+    mode = numbers.choice(list(MODES.values()))
+    with connected(line, mode, _TIME_OUT_MS) as handle:
+        for _ in range(_REQUESTS_SHORT if bench.short else _REQUESTS):
+            name = numbers.choice(list(expected))
+            result, value = calls.CALLS[name].run(handle)
+            check(result == 1 and value == expected[name], f"handset {serial:X}, {name}: {result}, {value!r}")
+        if numbers.random() < 0.5:  # a second connect of the port counts, and keeps the first one's handle
+            again = line.connect(mode)
+            check(again == handle, f"a second connect to the port gave {again:X}, not {handle:X}")
+            kral.api().KRAL_DisconnectServer(again)
+        bench.count("requests", len(line.requests))
+    bench.count("connects")
+
+
 def run(bench: Bench, case: str) -> None:
     serial = _FIRST_SERIAL + int(case)
     numbers = bench.random(case)
-    expected = _expected(serial)
-    port = bench.caller_port()
-    for _ in range(_ROUNDS_SHORT if bench.short else _ROUNDS):
-        mode = numbers.choice(list(MODES.values()))
-        line = CallerLine(_phone(serial), port)
-        with connected(line, mode, _TIME_OUT_MS) as handle:
-            for _ in range(_REQUESTS):
-                name = numbers.choice(list(expected))
-                result, value = calls.CALLS[name].run(handle)
-                check(result == 1 and value == expected[name], f"handset {serial:X}, {name}: {result}, {value!r}")
-            if numbers.random() < 0.5:  # a second connect of the port counts, and keeps the first one's handle
-                again = kral.api().KRAL_ConnectServer_UserDefinedTransport(port, 1, 2, *line.functions)
-                check(again == handle, f"a second connect to the port gave {again:X}, not {handle:X}")
-                kral.api().KRAL_DisconnectServer(again)
-            bench.count("requests", len(line.requests))
-        bench.count("connects")
+    with bench.port() as port:
+        for _ in range(_ROUNDS_SHORT if bench.short else _ROUNDS):
+            _round(bench, bench.line(_phone(serial), port), serial, numbers)

@@ -9,19 +9,21 @@ import ctypes
 import os
 import pathlib
 import subprocess
-from typing import Dict, List
+from typing import Any, Dict, List
 
 import kral
 from kral import _api
 from torture import calls
-from torture.bench import MODES, Bench, check, connected
-from torture.peer.line import CallerLine
+from torture.bench import LINUX, MODES, WINDOWS, Bench, check, connected
 from torture.peer.phone import Phone
 from torture.promises.liars import MORE
+from torture.windows.driver import Driver, text, word
 
 NUMBER = 10
 TITLE = "Out of memory anywhere is a failed call"
 SHORT = 10
+SHORT_WINDOWS = 3
+PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 1
 _TIME_OUT_MS = 60
 # Beside the library itself; `new` allocates in the first.
@@ -66,7 +68,23 @@ def cases(bench: Bench) -> List[str]:
     return list(_CALLS)
 
 
-def _failing_malloc() -> ctypes.CDLL:
+class _OtherProcess:
+    """The same in the driver, whose allocations are those of the DLL."""
+
+    _FUNCTIONS = 3
+
+    def __init__(self, driver: Driver) -> None:
+        self._driver = driver
+        count, _ = driver.call("-!watch_allocations", text("kral.dll"))
+        check(count & 0xFF == self._FUNCTIONS, f"{count} functions of the DLL allocate")
+
+    def fail_allocation(self, k: int) -> int:
+        return self._driver.call("-!fail_allocation", word(k))[0] & 0xFFFFFFFF
+
+
+def _failing_malloc(bench: Bench) -> Any:
+    if bench.driver is not None:
+        return _OtherProcess(bench.driver)
     preloaded = ctypes.CDLL(os.environ["LD_PRELOAD"])
     preloaded.fail_allocation.restype = ctypes.c_long
     preloaded.fail_allocation.argtypes = [ctypes.c_long]
@@ -81,13 +99,13 @@ def run(bench: Bench, case: str) -> None:
     call = _CALLS[case]
     pathlib.Path("definitions.xml").write_bytes(_DEFINITIONS)
     phone = calls.prepare(Phone(calls.SERIAL))
-    with connected(CallerLine(phone, bench.caller_port()), MODES["wake"], _TIME_OUT_MS) as handle:
+    with bench.port() as port, connected(bench.line(phone, port), MODES["wake"], _TIME_OUT_MS) as handle:
         # The lines of the text log are made, too.
         kral.api().KRAL_SetLogFlags(handle, 0xFFFFFFFF)
         kral.api().KRAL_StartLogging(handle, f"{case}.log".encode())
         result, expected = call.run(handle)
         check(result == 1, f"a handset that works gave {result}, {expected!r}")
-        malloc = _failing_malloc()
+        malloc = _failing_malloc(bench)
         for k in range(1, (_MOST_SHORT if bench.short else _MOST) + 1):
             malloc.fail_allocation(k)
             result, value = call.run(handle)

@@ -10,13 +10,14 @@ from typing import Any, Callable, Dict, List
 import kral
 from kral import _api
 from torture import calls
-from torture.bench import MODES, Bench, Broken, check, connected, last_error
+from torture.bench import LINUX, MODES, WINDOWS, Bench, Broken, check, connected, last_error
 from torture.peer.line import WORKS, Line, PtyLine
 from torture.peer.phone import Phone
 
 NUMBER = 2
 TITLE = "An unplug is reported within 500 ms; the next request works once the port is back"
 SHORT = 40
+PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 4
 _ALLOWED_MS = 500
 _TIME_OUT_MS = 5000
