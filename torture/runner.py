@@ -18,6 +18,7 @@ import traceback
 from typing import Any, Dict, List, Optional
 
 import torture.promises
+from torture import soak
 from torture.bench import LINUX, WINDOWS, Bench, Broken, platform
 
 # A program that has not ended by then hangs; it is killed, and what it had not run counts as failed.
@@ -163,6 +164,23 @@ def _row(number: int, title: str, total: Dict[str, Any]) -> str:
             f"{'; '.join(figures) or '-'} | {total['seconds']:.0f} s |")
 
 
+def _soak(arguments: argparse.Namespace) -> int:
+    with tempfile.TemporaryDirectory(prefix="torture") as folder:
+        os.chdir(folder)
+        bench = Bench(soak.NUMBER, arguments.seed, pathlib.Path(folder), False)
+        wrong = soak.run(bench, arguments.soak)
+        bench.close()
+        for text in wrong:
+            print(f"FAILED: the soak: {text}\n    again: scripts/torture --soak {arguments.soak:g} "
+                  f"--seed {arguments.seed}", file=sys.stderr)
+        total = {"failed": len(wrong), "ran": 1, "cases": 1, "figures": dict(bench.figures), "worst": dict(bench.worst),
+                 "seconds": arguments.soak * 60}
+        print(_row(soak.NUMBER, "A mixed station of 8 handsets", total), flush=True)
+        print(f"torture: {0 if wrong else 1} passed, {len(wrong)} failed", flush=True)
+    sys.stderr.flush()
+    os._exit(1 if wrong else 0)
+
+
 def main(words: List[str]) -> int:
     parser = argparse.ArgumentParser(prog="torture", description=__doc__)
     parser.add_argument("promises", nargs="*", type=int, metavar="PROMISE", help="numbers; all without")
@@ -170,12 +188,15 @@ def main(words: List[str]) -> int:
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--short", action="store_true", help="a sample of the cases of each")
     parser.add_argument("--case", help="only this one")
+    parser.add_argument("--soak", type=float, metavar="MINUTES", help="a mixed station instead, for so long")
     parser.add_argument("--platform", choices=(LINUX, WINDOWS), default=platform(),
                         help="as scripts/torture has chosen the library for it")
     parser.add_argument("--child", action="store_true", help=argparse.SUPPRESS)
     arguments = parser.parse_args(words)
     if arguments.child:
         return _child(arguments)
+    if arguments.soak:
+        return _soak(arguments)
     known = promises()
     chosen = arguments.promises or list(known)
     unknown = [number for number in chosen if number not in known]

@@ -12,17 +12,18 @@ import pathlib
 import random
 from typing import Any, Callable, Dict, List
 
-import olefile  # type: ignore[import]
-
 import kral
+from kral import _api
 from torture import calls
 from torture.bench import LINUX, MODES, WINDOWS, Bench, check, connected
+from torture.peer.backups import same
 from torture.peer.line import Line
 from torture.peer.phone import Phone
+from torture.peer.programmer import Programmer
 
 NUMBER = 5
 TITLE = "No silent corruption at bit error rates 1e-6 and 1e-5"
-SHORT = 8
+SHORT = 10
 SHORT_WINDOWS = 3
 PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 4
@@ -32,6 +33,8 @@ _BYTES = 8 << 20
 _BYTES_SHORT = 1 << 19
 _FILE = 200000
 _READ_SIZE, _WRITE_SIZE = 4091, 4091
+# Blocks whose check covers them whole, and the writes that may be under way.
+_BLOCK, _WINDOW = 4096, 9
 _ITEMS = range(300, 340)
 
 
@@ -80,16 +83,28 @@ class _Files:
         return bool(result)
 
 
-def _streams(file: pathlib.Path) -> Dict[str, bytes]:
-    """What a backup holds. The storage around it may have time stamps."""
-    with olefile.OleFileIO(str(file)) as storage:
-        return {"/".join(path): storage.openstream(path).read() for path in storage.listdir()}
+class _Flash:
+    """Images through the stream: packets one way, acknowledgements the other, both over the bad line."""
+
+    def __init__(self, line: Line, numbers: random.Random) -> None:
+        self._line, self._numbers = line, numbers
+
+    def write(self) -> bool:
+        data, address = self._numbers.randbytes(_FILE), self._numbers.randrange(0, 1 << 24, 4)
+        outcome = ctypes.c_uint32()
+        result = kral.api().KRAL_STREAM_WriteImageMem(self._line.handle, data, len(data), address, 1, None, 0,
+                                                      _api.KRAL_STREAM_MULTI_IMAGE, _BLOCK, _WINDOW,
+                                                      ctypes.byref(outcome))
+        programmer = self._line.phone
+        assert isinstance(programmer, Programmer)
+        check(not result or programmer.image(address) == data, "an image is not in flash as it was given")
+        return bool(result)
 
 
 class _Items:
     def __init__(self, line: Line, numbers: random.Random) -> None:
         self._line, self._numbers = line, numbers
-        self.reference: Dict[str, bytes] = {}
+        self.reference = b""
 
     def one(self) -> bool:
         item, data = self._numbers.choice(_ITEMS), self._numbers.randbytes(128)
@@ -108,25 +123,26 @@ class _Items:
         result = kral.api().KRAL_BackupNVFromMobileToPKV(self._line.handle, os.fsencode(file), ctypes.byref(status))
         if not self.reference:
             check(result == 1, "no backup over a good line")
-            self.reference = _streams(file)
-        check(not result or _streams(file) == self.reference, "a backup is not what the handset holds")
+            self.reference = file.read_bytes()
+        check(not result or same(file.read_bytes(), self.reference), "a backup is not what the handset holds")
         return bool(result)
 
 
 def _operation(what: str, line: Line, numbers: random.Random) -> Callable[[], bool]:
-    files, items = _Files(line, numbers), _Items(line, numbers)
+    files, items, flash = _Files(line, numbers), _Items(line, numbers), _Flash(line, numbers)
     operations: Dict[str, Callable[[], bool]] = {"write": files.write, "read": files.read, "items": items.one,
-                                                 "back-up": items.back_up}
+                                                 "back-up": items.back_up, "flash": flash.write}
     return operations[what]
 
 
 def cases(bench: Bench) -> List[str]:
-    return [f"{what}/{rate}/{mode}" for what in ("write", "read", "items", "back-up") for rate in _RATES
+    return [f"{what}/{rate}/{mode}" for what in ("write", "read", "items", "back-up", "flash") for rate in _RATES
             for mode in MODES]
 
 
 def _phone() -> Phone:
-    phone = calls.prepare(Phone(calls.SERIAL))
+    """It answers as a handset and as a flash programmer."""
+    phone = calls.prepare(Programmer(calls.SERIAL))
     for item in _ITEMS:
         phone.set_item(item, bytes((item + i) & 0xFF for i in range(128)))
     for folder in ("/nv/item_files/rfnv", "/nv/item_files/conf"):
@@ -148,7 +164,7 @@ def run(bench: Bench, case: str) -> None:
         operation()  # over a good line: what is compared later
         noise.set_rate(_RATES[rate])
         # Items go in small packets, a millisecond or more each.
-        goal = (_BYTES_SHORT if bench.short else _BYTES) // (1 if what in ("read", "write") else 20)
+        goal = (_BYTES_SHORT if bench.short else _BYTES) // (1 if what in ("read", "write", "flash") else 20)
         while noise.bytes < goal:
             bench.count("good" if operation() else "failed")
         bench.count("bytes", noise.bytes)

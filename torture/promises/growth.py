@@ -3,13 +3,11 @@ from __future__ import annotations
 
 import contextlib
 import functools
-import gc
-import os
 import time
 from typing import Callable, Dict, Iterator, List
 
 import kral
-from torture import calls
+from torture import calls, process
 from torture.bench import LINUX, MODES, TIME_OUT_MS, WINDOWS, Bench, check, connected
 from torture.peer.codec import frame
 from torture.peer.line import WORKS, CallerLine, Line, PtyLine
@@ -36,13 +34,7 @@ def cases(bench: Bench) -> List[str]:
 
 
 def _state(bench: Bench) -> Dict[str, int]:
-    gc.collect()
-    if bench.driver is not None:
-        return bench.driver.state()
-    with open("/proc/self/status", encoding="ascii") as status:
-        memory = next(int(line.split()[1]) for line in status if line.startswith("RssAnon"))
-    return {"memory": memory, "descriptors": len(os.listdir("/proc/self/fd")),
-            "threads": len(os.listdir("/proc/self/task"))}
+    return process.state() if bench.driver is None else bench.driver.state()
 
 
 def _unwell(request: bytes, line: Line) -> None:
