@@ -242,6 +242,7 @@ TEST_F(SerialPortTest, AVanishedDeviceIsLetGoAndStaysGoneUntilThePortIsThereAgai
     bool gone;
   };
   for (const Case& c : {Case{DeviceError::kNoSuchPort, true}, Case{DeviceError::kBusy, false},
+                        Case{DeviceError::kBuffers, true}, Case{DeviceError::kLineSettings, true},
                         Case{DeviceError::kNotPermitted, false}, Case{DeviceError::kNone, false}}) {
     open_failure_ = {};
     OpenQuietly();

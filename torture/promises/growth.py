@@ -26,6 +26,8 @@ _SECONDS_SHORT = 6.0
 _WARM = 0.4
 # What the memory of the process may have gained: half of it is the noise of the allocator.
 _ALLOWED_KIB = 2048
+# A lock of the DLL gets its event when threads first meet at it.
+_ALLOWED = {"memory": _ALLOWED_KIB, "handles": 8}
 _FAILING_MS = 20
 
 
@@ -95,5 +97,4 @@ def _judge(bench: Bench, work: Callable[[], None]) -> None:
     after = _state(bench)
     gained = {name: after[name] - before[name] for name in after}
     bench.note("KiB gained", gained["memory"])
-    check(all(count <= 0 for what, count in gained.items() if what != "memory"), f"{gained} more after {seconds} s")
-    check(gained["memory"] <= _ALLOWED_KIB, f"{gained} more after {seconds} s")
+    check(all(count <= _ALLOWED.get(what, 0) for what, count in gained.items()), f"{gained} more after {seconds} s")

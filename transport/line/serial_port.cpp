@@ -43,6 +43,11 @@ int32_t SettingErrorCode(DeviceError error) {
   }
 }
 
+// Some systems keep the name of a port whose device is gone: it opens, and then takes no setting.
+bool IsNoDevice(DeviceError error) {
+  return error == DeviceError::kNoSuchPort || error == DeviceError::kBuffers || error == DeviceError::kLineSettings;
+}
+
 DeviceResult NotOpen() {
   return {DeviceError::kOther, 0, "the port is not open"};
 }
@@ -69,7 +74,7 @@ uint32_t CSerialPort::Open(int32_t number) {
     last_error_ = OpenErrorCode(open_result_.error);
     {
       const MutexLock lock(mutex_);
-      gone_ = gone_ && open_result_.error == DeviceError::kNoSuchPort;
+      gone_ = gone_ && IsNoDevice(open_result_.error);
     }
     log_->WriteLine(kLogErr, "CSerialPort::Open(COM%d) failed: %s (%u)", number, open_result_.text.c_str(),
                     open_result_.system_code);
