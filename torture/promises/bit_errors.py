@@ -30,6 +30,7 @@ AT_ONCE = 4
 _TIME_OUT_MS = 150
 _RATES = {"1e-6": 1e-6, "1e-5": 1e-5}
 _BYTES = 8 << 20
+_BYTES_WINDOWS = 1 << 20
 _BYTES_SHORT = 1 << 19
 _FILE = 200000
 _READ_SIZE, _WRITE_SIZE = 4091, 4091
@@ -164,7 +165,8 @@ def run(bench: Bench, case: str) -> None:
         operation()  # over a good line: what is compared later
         noise.set_rate(_RATES[rate])
         # Items go in small packets, a millisecond or more each.
-        goal = (_BYTES_SHORT if bench.short else _BYTES) // (1 if what in ("read", "write", "flash") else 20)
+        whole = _BYTES if bench.driver is None else _BYTES_WINDOWS
+        goal = (_BYTES_SHORT if bench.short else whole) // (1 if what in ("read", "write", "flash") else 20)
         while noise.bytes < goal:
             bench.count("good" if operation() else "failed")
         bench.count("bytes", noise.bytes)
