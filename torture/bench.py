@@ -11,12 +11,13 @@ import shutil
 import tempfile
 import threading
 import time
-from typing import Any, Callable, Counter, Deque, Iterator, Optional, Tuple
+from typing import Any, Callable, Counter, Deque, Dict, Iterator, Optional, Tuple
 
 import contextlib
 
 import kral
 from kral import _api
+from torture import process
 from torture.peer.line import CallerLine, Line, Ports, PtyLine
 from torture.peer.phone import Phone
 from torture.windows import driver
@@ -150,6 +151,10 @@ class Bench:
     def line(self, phone: Phone, port: int) -> Line:
         """`port` is one of port()."""
         return CallerLine(phone, port) if self.driver is None else PtyLine(phone, self.ports, port)
+
+    def state(self) -> Dict[str, int]:
+        """What the process of the library has of the system."""
+        return process.state() if self.driver is None else self.driver.state()
 
     def close(self) -> None:
         self.lateness.stop()

@@ -16,7 +16,6 @@ from torture.bench import MODES, Bench, Broken, check, last_error, set_time_outs
 from torture.peer.codec import frame
 from torture.peer.line import PtyLine
 from torture.peer.phone import Phone, log
-from torture.process import state
 
 NUMBER = 0
 _HANDSETS = 8
@@ -142,7 +141,7 @@ def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Threa
     warm = begin + (end - begin) * _WARM
     while any(thread.is_alive() for thread in threads):
         time.sleep(_WATCH_S)
-        now, at = state(), time.monotonic()
+        now, at = bench.state(), time.monotonic()
         if not before and at > warm:
             before = now
         bench.note("most memory, KiB", now["memory"])
@@ -153,7 +152,7 @@ def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Threa
             return [f"{len(hung)} handsets hang"]
         if at > end:
             break
-    after = state()
+    after = bench.state()
     bench.note("KiB gained", after["memory"] - before.get("memory", after["memory"]))
     grown = after["memory"] - before.get("memory", after["memory"])
     return [f"{grown} KiB more since a fifth of the time"] if grown > _ALLOWED_KIB else []
@@ -162,7 +161,7 @@ def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Threa
 def run(bench: Bench, minutes: float) -> List[str]:
     """What was wrong."""
     end = time.monotonic() + minutes * 60
-    first = state()
+    first = bench.state()
     ports = [bench.com_port() for _ in range(_HANDSETS)]
     modes = list(MODES.values())
     stations = [_Station(bench, number, port.__enter__(), modes[number % len(modes)])
@@ -180,7 +179,7 @@ def run(bench: Bench, minutes: float) -> List[str]:
     for station in stations:
         wrong += station.wrong
         station.close()
-    last = state()
+    last = bench.state()
     for what in ("descriptors", "threads"):
         if last[what] > first[what]:
             wrong.append(f"{last[what] - first[what]} {what} are left")

@@ -7,7 +7,7 @@ import time
 from typing import Callable, Dict, Iterator, List
 
 import kral
-from torture import calls, process
+from torture import calls
 from torture.bench import LINUX, MODES, TIME_OUT_MS, WINDOWS, Bench, check, connected
 from torture.peer.codec import frame
 from torture.peer.line import WORKS, CallerLine, Line, PtyLine
@@ -33,10 +33,6 @@ _FAILING_MS = 20
 
 def cases(bench: Bench) -> List[str]:
     return [f"{what}/{mode}" for what in ("connects", "requests") for mode in MODES]
-
-
-def _state(bench: Bench) -> Dict[str, int]:
-    return process.state() if bench.driver is None else bench.driver.state()
 
 
 def _unwell(request: bytes, line: Line) -> None:
@@ -93,8 +89,8 @@ def _judge(bench: Bench, work: Callable[[], None]) -> None:
     while time.monotonic() < begin + seconds:
         work()
         if not before and time.monotonic() > begin + seconds * _WARM:
-            before = _state(bench)
-    after = _state(bench)
+            before = bench.state()
+    after = bench.state()
     gained = {name: after[name] - before[name] for name in after}
     bench.note("KiB gained", gained["memory"])
     check(all(count <= _ALLOWED.get(what, 0) for what, count in gained.items()), f"{gained} more after {seconds} s")
