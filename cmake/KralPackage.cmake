@@ -37,6 +37,17 @@ endif()
 install(DIRECTORY include/kral DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT development
   FILES_MATCHING PATTERN "*.h*")
 install(DIRECTORY share/kral/wireshark share/kral/commands DESTINATION ${CMAKE_INSTALL_DATADIR}/kral COMPONENT tool)
+if(TARGET kral_tool AND NOT WIN32)
+  install(FILES share/completion/kral.bash RENAME kral
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions COMPONENT tool)
+  # Where zsh looks for what is installed locally, and for what comes in packages.
+  foreach(folder site-functions vendor-completions)
+    install(FILES share/completion/kral.zsh RENAME _kral DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/${folder}
+      COMPONENT tool)
+  endforeach()
+  install(FILES share/completion/kral.fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d
+    COMPONENT tool)
+endif()
 
 if(WIN32)
   set(examples_folder examples)

@@ -43,6 +43,7 @@ struct Chosen {
   Names names;
   std::set<std::string> asked;
   std::vector<std::string> words;
+  std::map<const CLI::Option*, Suggest> suggestions;
 };
 
 namespace {
@@ -267,6 +268,65 @@ void TakeSettled(Chosen& chosen) {
   }
 }
 
+// --- Lines that are being typed -------------------------------------------------------------------------------------
+
+// Where the last word stands: a noun or verb, or the value of an option or argument.
+struct Cursor {
+  CLI::App* app;
+  const CLI::Option* option = nullptr;
+};
+
+const CLI::Option* ArgumentAt(const CLI::App& app, std::size_t number) {
+  for (const auto* option : app.get_options()) {
+    if (!option->get_positional()) continue;
+    const auto most = static_cast<std::size_t>(option->get_items_expected_max());
+    if (number < most) return option;
+    number -= most;
+  }
+  return nullptr;
+}
+
+Cursor CursorOf(CLI::App& root, const std::vector<std::string>& words) {
+  Cursor cursor{&root};
+  const CLI::Option* option = nullptr;
+  int values = 0;
+  std::size_t arguments = 0;
+  bool only_arguments = false;
+  for (std::size_t i = 0; i + 1 < words.size(); ++i) {
+    const auto& word = words[i];
+    if (values > 0) {
+      --values;
+    } else if (!only_arguments && word == "--") {
+      only_arguments = true;
+    } else if (!only_arguments && word.size() > 1 && word.front() == '-') {
+      option = FindOption(cursor.app, word);
+      values = option == nullptr ? 0 : option->get_items_expected_min();
+    } else if (!VerbsOf(*cursor.app).empty()) {
+      const auto found = cursor.app->get_subcommands([&word](const CLI::App* verb) { return verb->check_name(word); });
+      if (found.empty()) continue;
+      cursor.app = found.front();
+    } else {
+      ++arguments;
+    }
+  }
+  if (values > 0) {
+    cursor.option = option;
+  } else if (VerbsOf(*cursor.app).empty()) {
+    cursor.option = ArgumentAt(*cursor.app, arguments);
+  }
+  return cursor;
+}
+
+std::vector<Completion> OptionsAt(const CLI::App* app) {
+  std::vector<Completion> found;
+  for (; app != nullptr; app = app->get_parent()) {
+    for (const auto* option : app->get_options()) {
+      if (option->nonpositional()) found.push_back({option->get_name(), option->get_description()});
+    }
+  }
+  return found;
+}
+
 void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
   const auto place = Follow(root, words);
   if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
@@ -324,6 +384,11 @@ Option& Option::Between(double least, double most, const char* unit) {
 Option& Option::OneOf(std::initializer_list<std::string> words) {
   const std::vector<std::string> list(words);
   option_->type_name(Joined(list, "|"));
+  Suggests([list](const std::vector<std::string>&) {
+    std::vector<Completion> found;
+    for (const auto& word : list) found.push_back({word, ""});
+    return found;
+  });
   return Check([list](const std::string& text) {
     const bool known = std::ranges::find(list, text) != list.end();
     return known ? std::string() : Format("it is {}", Joined(list, " or "));
@@ -357,6 +422,11 @@ Option& Option::File() {
 
 Option& Option::Settled(const char* name, const char* unless) {
   chosen_->settled.push_back({app_, option_, name, unless == nullptr ? nullptr : app_->get_option(unless)});
+  return *this;
+}
+
+Option& Option::Suggests(Suggest suggest) {
+  chosen_->suggestions[option_] = std::move(suggest);
   return *this;
 }
 
@@ -539,7 +609,12 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
   const auto man = std::make_shared<std::string>();
   const auto help = root().Verb("help", "Print the help of a verb");
   help.NeedsNoHandset();
-  help.Add("verb", *words, "Noun and verb");
+  help.Add("verb", *words, "Noun and verb").Suggests([parser = parser_.get()](const std::vector<std::string>& line) {
+    const auto place = Follow(parser->app, {line.begin() + 1, line.end() - 1});
+    std::vector<Completion> found;
+    for (const auto& verb : VerbsOf(*place.app)) found.push_back({verb, ""});
+    return found;
+  });
   help.Add("--man", *man, "Write manual pages of the same text into this folder");
   help.Run([parser = parser_.get(), words, man] {
     if (man->empty()) return PrintHelp(parser->app, *words);
@@ -576,6 +651,31 @@ std::function<void()> CommandLine::Parse(const std::vector<std::string>& argumen
   }
   if (parser_->chosen.act) TakeSettled(parser_->chosen);
   return parser_->chosen.act;
+}
+
+Completions CommandLine::Complete(const std::vector<std::string>& words) {
+  const auto last = words.empty() ? std::string() : words.back();
+  auto cursor = CursorOf(parser_->app, words);
+  const bool is_option = last.starts_with("-") && (cursor.option == nullptr || cursor.option->get_positional());
+  const auto equals = is_option ? last.find('=') : std::string::npos;
+  const auto front = equals == std::string::npos ? std::string() : last.substr(0, equals + 1);
+  if (!front.empty()) cursor.option = FindOption(cursor.app, last.substr(0, equals));
+  Completions all;
+  if (is_option && front.empty()) {
+    all.words = OptionsAt(cursor.app);
+  } else if (cursor.option != nullptr) {
+    const auto found = parser_->chosen.suggestions.find(cursor.option);
+    const bool is_known = found != parser_->chosen.suggestions.end();
+    if (is_known) all.words = found->second(words);
+    all.files = !is_known && cursor.option->get_type_name() == "TEXT";
+  } else {
+    for (const auto* verb : cursor.app->get_subcommands([](const CLI::App*) { return true; })) {
+      all.words.push_back({verb->get_name(), verb->get_description()});
+    }
+  }
+  for (auto& each : all.words) each.word.insert(0, front);
+  std::erase_if(all.words, [&last](const Completion& each) { return !each.word.starts_with(last); });
+  return all;
 }
 
 void CommandLine::SetNames(Names names) {

@@ -31,6 +31,18 @@ struct NumberRange {
   const char* unit = "";
 };
 
+// What a word may be, and what that means.
+struct Completion {
+  std::string word;
+  std::string help;
+};
+struct Completions {
+  std::vector<Completion> words;
+  bool files = false;  // names of files as well
+};
+// Asked with the words of a line that is being typed, of which the last may be unfinished.
+using Suggest = std::function<std::vector<Completion>(const std::vector<std::string>& words)>;
+
 // An option or an argument, for whatever else is to be said of it.
 class Option {
  public:
@@ -47,6 +59,7 @@ class Option {
   Option& File();
   // What is settled of that name (settings.h), where the option is not given. `unless`: nor that other one.
   Option& Settled(const char* name, const char* unless = nullptr);
+  Option& Suggests(Suggest suggest);
   // Gives what is wrong with a text; nothing when it is right.
   Option& Check(std::function<std::string(const std::string&)> fault);
 
@@ -137,6 +150,8 @@ class CommandLine {
   // What the chosen verb does; nothing when help or the version was asked for, which is then printed. ToolError for
   // mistakes. Options of a noun or of the root are taken behind a verb, too.
   std::function<void()> Parse(const std::vector<std::string>& arguments);
+  // What may stand in the place of the last word, as far as it begins with it.
+  Completions Complete(const std::vector<std::string>& words);
   void SetNames(Names names);  // before it; without, names of files stay as they are
 
   // --- Of the verb that was chosen ---

@@ -70,11 +70,12 @@ struct VerbsOf {
 };
 
 constexpr VerbsOf kVerbs[] = {
-    {"ports", AddPortVerbs},    {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
-    {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},       {"log", AddLogVerbs},     {"event", AddEventVerbs},
-    {"nv", AddNvVerbs},         {"flash", AddFlashVerbs},   {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
-    {"band", AddBandVerbs},     {"raw", AddRawVerbs},       {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
-    {"config", AddConfigVerbs},
+    {"ports", AddPortVerbs},  {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},
+    {"mode", AddModeVerbs},   {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},
+    {"log", AddLogVerbs},     {"event", AddEventVerbs},   {"nv", AddNvVerbs},
+    {"flash", AddFlashVerbs}, {"nv", AddNvBackupVerbs},   {"flash boot", AddBootVerbs},
+    {"band", AddBandVerbs},   {"raw", AddRawVerbs},       {"sim", AddSimVerbs},
+    {"cmd", AddCmdVerbs},     {"config", AddConfigVerbs}, {"completion", AddCompletionVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.
@@ -196,7 +197,18 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
   command->act();
 }
 
+// A shell that is completing a line has no use for messages.
+int Complete(const std::vector<std::string>& words) {
+  try {
+    PrintCompletions(*Declared("")->line, words);
+  } catch (const std::exception&) {
+    return static_cast<int>(ExitCode::kUsage);
+  }
+  return static_cast<int>(ExitCode::kDone);
+}
+
 int Run(const std::vector<std::string>& words) {
+  if (!words.empty() && words.front() == "__complete") return Complete({words.begin() + 1, words.end()});
   const auto arguments = WithUsualWait(words);
   auto command = Declared("");
   // Known before the command line is understood, so that mistakes in it are told in JSON, too.

@@ -29,6 +29,7 @@ struct Context {
 void AddBootVerbs(const Command& root, Context& context);  // behind AddFlashVerbs
 void AddBandVerbs(const Command& root, Context& context);
 void AddCmdVerbs(const Command& root, Context& context);
+void AddCompletionVerbs(const Command& root, Context& context);
 void AddConfigVerbs(const Command& root, Context& context);
 void AddDoctorVerbs(const Command& root, Context& context);
 void AddFsVerbs(const Command& root, Context& context);
@@ -43,6 +44,10 @@ void AddNvVerbs(const Command& root, Context& context);
 void AddNvBackupVerbs(const Command& root, Context& context);
 void AddRawVerbs(const Command& root, Context& context);
 void AddSimVerbs(const Command& root, Context& context);
+
+// What may stand in the place of the last of these words: a line each, with a tab and what it means. ":files": names of
+// files, which the shell knows better.
+void PrintCompletions(CommandLine& line, const std::vector<std::string>& words);
 
 }  // namespace kral::tool
 

@@ -1,4 +1,5 @@
 // kral cmd: commands that a definition file describes.
+#include <algorithm>
 #include <array>
 #include <functional>
 #include <memory>
@@ -9,6 +10,7 @@
 #include "tools/kral/cmd/cmd_header.h"
 #include "tools/kral/format.h"
 #include "tools/kral/one_file.h"
+#include "tools/kral/settings.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -118,6 +120,59 @@ void Call(const Context& context, const CmdOptions& options) {
                      reply + "\n");
 }
 
+// --- What may be typed ----------------------------------------------------------------------------------------------
+
+// The files that a line names with --defs, or those that are settled.
+std::vector<std::string> FilesOf(const std::vector<std::string>& words) {
+  constexpr std::string_view kOption = "--defs=";
+  std::vector<std::string> files;
+  for (std::size_t i = 0; i + 1 < words.size(); ++i) {
+    if (words[i] == "--defs" && i + 2 < words.size()) files.push_back(words[i + 1]);
+    if (words[i].starts_with(kOption)) files.push_back(words[i].substr(kOption.size()));
+  }
+  if (!files.empty()) return files;
+  const auto settled = SettledFor("commands");
+  return settled ? settled->words : files;
+}
+
+std::vector<Completion> SuggestCommands(const std::vector<std::string>& words) {
+  Session session(WithoutHandset({}));
+  LoadCommands(session, FilesOf(words));
+  std::vector<Completion> found;
+  for (const auto& [name, record] : ListCommands(session)) found.push_back({name, record.documentation});
+  return found;
+}
+
+std::vector<Completion> SuggestFields(const std::vector<std::string>& words) {
+  Session session(WithoutHandset({}));
+  LoadCommands(session, FilesOf(words));
+  const auto call = std::ranges::find(words, "call");
+  std::vector<Completion> found;
+  for (const auto& command : ListCommands(session)) {
+    if (std::find(call, words.end(), command.name) == words.end()) continue;
+    for (const auto& field : FieldsOf(session, command, false)) {
+      if (field.kind >= KRAL_CMD_KIND_RECORD) continue;
+      const auto begin = std::string(field.path) + "=";
+      const auto is_begin = [&begin](const std::string& word) { return word.starts_with(begin); };
+      const bool is_set = std::any_of(words.begin(), words.end() - 1, is_begin);
+      if (is_set || (field.flags & KRAL_CMD_FIELD_COUNTS) != 0) continue;
+      if (!is_begin(words.back())) {
+        const auto help = FieldLine(field);
+        found.push_back({begin, help.substr(help.find_first_not_of(' '))});
+        continue;
+      }
+      std::array<char, 64> word{};
+      std::int64_t value = 0;
+      for (std::uint32_t i = 0; KRAL_CMD_GetWord(session.handle(), command.name.c_str(), 0, field.index, i, word.data(),
+                                                 word.size(), &value) != 0;
+           ++i) {
+        found.push_back({begin + word.data(), std::to_string(value)});
+      }
+    }
+  }
+  return found;
+}
+
 struct HeaderOptions {
   std::vector<std::string> files;
   std::string output;
@@ -169,13 +224,14 @@ void AddCmdVerbs(const Command& root, Context& context) {
 
   const auto show = cmd.Verb("show", "Show the fields of a command and of its reply");
   show.NeedsNoHandset();
-  show.Add("command", options->command, "FAMILY.NAME").Required();
+  show.Add("command", options->command, "FAMILY.NAME").Required().Suggests(SuggestCommands);
   add_files(show);
   show.Run([&context, options] { Show(context, *options); });
 
   const auto call = cmd.Verb("call", "Call a command, and print its reply as JSON");
-  call.Add("command", options->command, "FAMILY.NAME").Required();
-  call.Add("fields", options->fields, "field=value, as in channel=6 flags.on=1 list=1,2,3 data=00FF");
+  call.Add("command", options->command, "FAMILY.NAME").Required().Suggests(SuggestCommands);
+  call.Add("fields", options->fields, "field=value, as in channel=6 flags.on=1 list=1,2,3 data=00FF")
+      .Suggests(SuggestFields);
   add_files(call);
   call.Add("--mode-id", options->mode_id, "Mode id, of families that use the current one");
   call.Add("--rf-mode", options->rf_mode, "RF mode to be set in front");
