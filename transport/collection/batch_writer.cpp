@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <new>
 #include <thread>
 #include <utility>
 
@@ -102,7 +103,11 @@ BatchWriter::Ended BatchWriter::End(uint32_t time_out_ms) {
 
 bool BatchWriter::GoOnIn(const std::function<CaptureSink()>& open) {
   sink_ = {};
-  sink_ = open();
+  try {
+    sink_ = open();
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
   return static_cast<bool>(sink_);
 }
 

@@ -3,6 +3,7 @@
 #include "transport/collection/capture_writer.h"
 
 #include <algorithm>
+#include <new>
 #include <utility>
 
 #include "base/little_endian.h"
@@ -76,6 +77,7 @@ bool CaptureWriter::OnBegin() {
   lost_before_ = lost();
   loss_told_ = false;
   failed_ = false;
+  if (layout_.compressed) block_.reserve(capture_block::kMostRecords);
   return BeginFile();
 }
 
@@ -153,7 +155,15 @@ void CaptureWriter::Take(const Records& records) {
 void CaptureWriter::WriteBlock() {
   if (block_.empty()) return;
   const uint64_t count = in_block_.load(std::memory_order_relaxed);
-  const auto block = MakeCaptureBlock(block_);
+  std::vector<uint8_t> block;
+  try {
+    block = MakeCaptureBlock(block_);
+  } catch (const std::bad_alloc&) {
+    block_.clear();
+    Lose(count, "out of memory");
+    in_block_.store(0, std::memory_order_relaxed);
+    return;
+  }
   const bool has_blocks = file_size_ > capture_head::kSize;
   if (!failed_ && has_blocks && layout_.file_bytes != 0 && file_size_ + block.size() > layout_.file_bytes) {
     failed_ = !GoOnIn(open_) || !BeginFile();
