@@ -11,6 +11,7 @@
 #include "kral/cmd.h"
 #include "kral/ftm.h"
 #include "platform/file_util.h"
+#include "platform/xml_document.h"
 
 namespace {
 
@@ -54,6 +55,7 @@ void BesideTheFunction(benchmark::State& state, Station& station, const Call& ca
   state.counters["p50_us"] = Percentile(times, 0.5);
   state.counters["peer_p50_us"] = Percentile(peer, 0.5);
   state.counters["over_us"] = Percentile(times, 0.5) - Percentile(peer, 0.5);
+  state.counters["p50_ratio"] = Percentile(times, 0.5) / Percentile(peer, 0.5);
 }
 
 void CallPrepared(benchmark::State& state) {
@@ -95,18 +97,29 @@ void LoadCommands(benchmark::State& state) {
             "</Command>";
   }
   text += "</Family></CommandDefinition>";
+  const std::span<const uint8_t> document(reinterpret_cast<const uint8_t*>(text.data()), text.size());
+  std::vector<double> times;
+  std::vector<double> parsing;
   for (auto _ : state) {
-    std::vector<defined::CommandPtr> commands;
-    defined::Problem problem;
-    defined::Definitions definitions;
-    if (!defined::ReadDefinitions({reinterpret_cast<const uint8_t*>(text.data()), text.size()}, definitions, commands,
-                                  problem)) {
-      return state.SkipWithError(problem.text.c_str());
-    }
-    definitions.Add(std::move(commands));
-    benchmark::DoNotOptimize(definitions.count());
+    times.push_back(Microseconds([&] {
+      std::vector<defined::CommandPtr> commands;
+      defined::Problem problem;
+      defined::Definitions definitions;
+      if (!defined::ReadDefinitions(document, definitions, commands, problem)) return false;
+      definitions.Add(std::move(commands));
+      return definitions.count() == static_cast<size_t>(state.range(0));
+    }));
+    if (times.back() < 0) return state.SkipWithError("the definitions cannot be read");
+    state.PauseTiming();
+    std::string problem;
+    parsing.push_back(Microseconds([&] {
+      XmlElement root;
+      return ParseXml(document, root, problem) == XmlResult::kOk;
+    }));
+    state.ResumeTiming();
   }
+  state.counters["times_parsing"] = Percentile(times, 0.5) / Percentile(parsing, 0.5);
 }
-BENCHMARK(LoadCommands)->Arg(5000)->Unit(benchmark::kMillisecond);
+BENCHMARK(LoadCommands)->Arg(1250)->Arg(5000)->Unit(benchmark::kMillisecond);
 
 }  // namespace
