@@ -80,7 +80,7 @@ bool HandsetWorker::EnterLoader() {
   if (!reply && reply.kind() != ReplyKind::kNone && reply.kind() != ReplyKind::kGone && !reply.not_sent()) return false;
   const auto programmer =
       std::ranges::find_if(plan_, [](const Step& step) { return step.kind == StepKind::kProgrammer; });
-  return programmer->number == KRAL_VENTRIMS_PROGRAMMER_BOOT || AwaitLoader(options_.start_ms);
+  return programmer->number == KRAL_VENTRIMS_PROGRAMMER_BOOT || InTime(AwaitLoader(options_.start_ms));
 }
 
 bool HandsetWorker::StartProgrammer(const Step& step) {
@@ -99,7 +99,7 @@ bool HandsetWorker::BootTransfer(const Step& step) {
   const auto is_late = [&] { return Now() - start >= options_.start_ms; };
   uint32_t version = 0;
   if (!kivrat::Connect(phone_, version, nullptr, [&] { return stopped() || is_late(); })) {
-    if (stopped() || !is_late()) return false;
+    if (stopped() || InTime(!is_late())) return false;
     return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the boot loader on COM%d said no hello within %u ms", phone_.port(),
                         options_.start_ms));
   }
@@ -136,12 +136,12 @@ bool HandsetWorker::WriteImage(const Step& step) {
 bool HandsetWorker::Restart() {
   if (!download::KovaReset(phone_) && failure_->record().code == KRAL_ERROR_REFUSED) return false;
   greeted_ = programmer_started_ = false;
-  return AwaitDiagnostics(options_.start_ms) && ReadIdentity(false);
+  return InTime(AwaitDiagnostics(options_.start_ms)) && ReadIdentity(false);
 }
 
 bool HandsetWorker::SetMode(uint32_t mode) {
   if (!diag::ControlMode(phone_, static_cast<uint16_t>(mode))) return false;
-  return mode != KRAL_MODE_RESET || AwaitDiagnostics(options_.start_ms);
+  return mode != KRAL_MODE_RESET || InTime(AwaitDiagnostics(options_.start_ms));
 }
 
 // With a request that every handset knows, or refuses: it answers either way. The first tries are short, for one that

@@ -58,7 +58,7 @@ bool HandsetWorker::RunStep(const Step& step) {
     failure_ = nullptr;
     if (done && !stopped()) return true;
     const KRAL_ERROR record = RecordOf(failure, step);
-    if (stopped() || !recovered || !MayPass(record.code) || retries_left_ == 0) {
+    if (stopped() || !recovered || is_too_late_ || !MayPass(record.code) || retries_left_ == 0) {
       phone_.log().WriteLine(kLogErr, "KRAL_VENTRIMS: %s: %s", step.name.c_str(), record.text);
       handset_.FailWith(record);
       return false;
@@ -120,6 +120,11 @@ bool HandsetWorker::Await(uint32_t within_ms, const std::function<bool()>& holds
     if (stopped() || Now() - start >= within_ms || !Pause(kLookAroundMs)) return false;
   }
   return true;
+}
+
+bool HandsetWorker::InTime(bool in_time) {
+  is_too_late_ = !in_time;
+  return in_time;
 }
 
 bool HandsetWorker::Pause(uint32_t milliseconds) {

@@ -44,6 +44,8 @@ class HandsetWorker {
   bool Await(uint32_t within_ms, const std::function<bool()>& holds);  // false also when an abort ended it
   bool Pause(uint32_t milliseconds);                                   // false when an abort ended it
   bool stopped() const { return handset_.stop(); }
+  // What `start_ms` bounds: waiting that long once more would help nobody.
+  bool InTime(bool in_time);
   uint32_t Now() const { return phone_.clock().TickMs(); }
 
   JobHandset& handset_;
@@ -53,6 +55,7 @@ class HandsetWorker {
   uint32_t retries_left_;
   const CallFailure* failure_ = nullptr;  // of the attempt under way
   uint32_t lost_by_ = KRAL_ERROR_NONE;    // the failure before
+  bool is_too_late_ = false;              // the time of a start is over
   bool programmer_started_ = false;
   bool greeted_ = false;
   uint32_t block_size_ = 0;

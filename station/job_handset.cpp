@@ -46,7 +46,6 @@ void JobHandset::Abort() {
     const Failure aborted(KRAL_ERROR_ABORTED, "aborted before the work on it began");
     EndLocked(KRAL_VENTRIMS_ABORTED, &aborted.record());
   }
-  Tell();
 }
 
 bool JobHandset::ended() const {
@@ -81,11 +80,14 @@ void JobHandset::Prepare(uint64_t bytes_total, std::function<void()> changed) {
 bool JobHandset::Begin() {
   {
     const MutexLock lock(mutex_);
-    if (record_.state != KRAL_VENTRIMS_WAITING) return false;
-    record_.state = KRAL_VENTRIMS_WORKING;
-    began_ = Now();
+    if (record_.state == KRAL_VENTRIMS_WAITING) {
+      record_.state = KRAL_VENTRIMS_WORKING;
+      began_ = Now();
+      return true;
+    }
   }
-  return true;
+  Tell();  // here, not where it was aborted: callbacks come on threads of the job
+  return false;
 }
 
 void JobHandset::BeginStep(uint32_t number, const Step& step) {

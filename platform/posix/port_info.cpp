@@ -125,6 +125,14 @@ bool IsPseudoTerminal(const struct stat& device) {
   return kind >= kFirstTerminalSlave && kind <= kLastTerminalSlave;
 }
 
+// A device, but no terminal, /dev/null for instance: as far as the system tells.
+bool IsOtherDevice(const struct stat& device) {
+  const auto numbers = std::to_string(major(device.st_rdev)) + ":" + std::to_string(minor(device.st_rdev));
+  std::error_code error;
+  const auto subsystem = fs::read_symlink(fs::path("/sys/dev/char") / numbers / "subsystem", error);
+  return !error && subsystem.filename() != "tty";
+}
+
 void FindHolder(const PortSources& sources, const struct stat& device, PortInfo& info) {
   auto holder = HolderOfLock(sources.processes, device);
   if (!holder && !IsPseudoTerminal(device)) holder = HolderOfDescriptor(sources.processes, device);
@@ -141,7 +149,7 @@ void FindObstacle(const PortSources& sources, PortInfo& info) {
     info.obstacle = errno == EACCES && !info.device.empty() ? PortObstacle::kNotPermitted : PortObstacle::kNotFound;
     return;
   }
-  if (!S_ISCHR(device.st_mode)) {
+  if (!S_ISCHR(device.st_mode) || IsOtherDevice(device)) {
     info.obstacle = PortObstacle::kNotFound;
     return;
   }

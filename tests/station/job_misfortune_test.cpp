@@ -1,6 +1,7 @@
 // Handsets of a job that are silent, slow, refuse, or vanish, while others finish; aborts at every moment.
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <chrono>
 #include <thread>
 
@@ -150,6 +151,17 @@ TEST_F(JobMisfortune, AnAbortEndsWhateverIsUnderWay) {
   AddToJob(12);
   SetOptions(0, 0, 30000, 1);
   ASSERT_EQ(AddImage(AddBytes("image.bin", Pattern(20000))), 1);
+  struct Calls {
+    const std::thread::id caller = std::this_thread::get_id();
+    std::atomic<bool> of_caller{false};
+    std::atomic<bool> of_waiting{false};
+  } calls;
+  const auto on_change = [](KRAL_VENTRIMS_JOB, uint32_t handset, uintptr_t value) {
+    auto& told = *reinterpret_cast<Calls*>(value);
+    if (std::this_thread::get_id() == told.caller) told.of_caller = true;
+    if (handset == 1) told.of_waiting = true;
+  };
+  ASSERT_EQ(KRAL_VENTRIMS_SetCallback(job_, on_change, reinterpret_cast<uintptr_t>(&calls)), 1);
   ASSERT_EQ(KRAL_VENTRIMS_Start(job_), 1) << Error().text;
   ASSERT_TRUE(Soon([this] { return Progress(0).bytes_done > 0; }));
   EXPECT_EQ(KRAL_VENTRIMS_Wait(job_, 0), 0);
@@ -160,6 +172,24 @@ TEST_F(JobMisfortune, AnAbortEndsWhateverIsUnderWay) {
   const KRAL_VENTRIMS_RESULT result = Result(0);
   EXPECT_EQ(result.progress.state, KRAL_VENTRIMS_ABORTED);
   EXPECT_EQ(result.error.code, static_cast<uint32_t>(KRAL_ERROR_ABORTED));
+  EXPECT_TRUE(calls.of_waiting) << "its end is told as well";
+  EXPECT_FALSE(calls.of_caller) << "who may hold a lock that the callback takes";
+}
+
+TEST_F(JobMisfortune, AHelloThatDoesNotComeInTimeIsNotAwaitedOnceMore) {
+  AddSocket(11).faults().Add(handset::Ignore(), When::Always());
+  AddToJob(11);
+  KRAL_VENTRIMS_OPTIONS options{};
+  options.size = sizeof options;
+  ASSERT_EQ(KRAL_VENTRIMS_GetOptions(job_, &options), 1);
+  options.start_ms = 50;
+  options.retries = 2;
+  ASSERT_EQ(KRAL_VENTRIMS_SetOptions(job_, &options), 1);
+  const auto programmer = AddBytes("programmer.bin", Pattern(2000));
+  ASSERT_EQ(KRAL_VENTRIMS_AddProgrammer(job_, programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT), 1);
+  RunToEnd();
+  EXPECT_NE(std::string(Result(0).error.text).find("no hello within 50 ms"), std::string::npos) << Result(0).error.text;
+  EXPECT_EQ(Result(0).progress.attempts, 1u);
 }
 
 TEST_F(JobMisfortune, FreeingEndsAJobThatRuns) {

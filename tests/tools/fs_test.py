@@ -131,6 +131,8 @@ class Files(ToolTest):
             given = {entry.get("name_bytes") for entry in self.fs(0, "ls", ":/c1")["entries"]}
             self.assertEqual(given, {None, "6E FF FE"})
             self.assertIn(r"c1/n\xFE", self.fs(7, "stat", os.fsdecode(b":/c1/n\xfe"))["error"]["text"])
+            for path in (":/.", ":.", "://./", ":/x/..", ":/..", ":/"):
+                self.fs(2, "rm", "-r", path)
         # "." and ".." are the directory itself and the one above, in any listing.
         self.assertEqual(len(answer["left_out"]), len(names) - 1)
         self.assertEqual(len(tree), len(names))

@@ -39,7 +39,9 @@ class ManyHandsets(ToolTest):
             self.assertIn("1 of 3 handsets failed: COM3", done.err)
             # One that answers, but not who it is, is none of those that passed.
             command(sim, "fault 2 lose,of=26")
-            self.assertEqual(self.verdicts(12, "--all", "--time-out", "200", "raw", "7C"), {1: 0, 2: 5, 3: 0})
+            traces = ("--trace-on-failure", self.path("trace{port}"))
+            self.assertEqual(self.verdicts(12, "--all", "--time-out", "200", *traces, "raw", "7C"), {1: 0, 2: 5, 3: 0})
+            self.assertGreater(len(self.content("trace2")), 0)
 
     def test_those_that_fail_alike_end_with_their_code(self):
         with self.fixture(2, "--fault", "refuse=24,of=4B 0F") as (_, self.ports):
@@ -65,6 +67,7 @@ class ManyHandsets(ToolTest):
         with self.fixture(3) as (sim, self.ports):
             self.ports[9] = os.path.realpath(self.ports[1])
             log = self.path("log")
+            self.expect(0, "-p", "1", "nv", "backup", self.path("1.pkv"), "--items", "0-3")
             for code, text, words in (
                     (2, "COM2 is named twice", ("-p", "1,2,2", "info")),
                     (2, "COM2 is named twice", ("-p", "1-2,2-3", "info")),
@@ -73,7 +76,7 @@ class ManyHandsets(ToolTest):
                     (2, "is not a port number", ("-p", "1,", "info")),
                     (2, "are the same device", ("-p", "1,9", "info")),
                     (2, "different things", ("-p", "1", "--all", "info")),
-                    (2, "one handset at a time", ("-p", "1,2", "sim")),
+                    (2, "one handset at a time", ("-p", "1,2", "event", "tail")),
                     (2, "x.pkv for both COM1 and COM2", ("-p", "1,2", "nv", "backup", self.path("x.pkv"))),
                     (2, "both COM1 and COM2", ("--all", "fs", "get", ":/x")),
                     (2, "both COM1 and COM3", ("-p", "1,3", "info", "--log", log)),
@@ -81,6 +84,7 @@ class ManyHandsets(ToolTest):
                     (2, "does nothing to handsets", ("-p", "1", "band", "list", "--report", log)),
                     (2, "beside the report", ("-p", "1", "nv", "backup", log, "--report", log)),
                     (10, "cannot be written", ("-p", "1", "fs", "mkdir", ":/made", "--report", "/nonexistent/page")),
+                    (10, "2.pkv for COM2", ("-p", "1,2", "nv", "restore", self.path("{port}.pkv"))),
                     (3, "nothing was done", ("-p", "1-3,5", "fs", "mkdir", ":/made"))):
                 with self.subTest(words=words):
                     self.assertIn(text, self.expect_json(code, *words)["error"]["text"])
@@ -103,9 +107,12 @@ class ManyHandsets(ToolTest):
             self.expect_json(2, "--all", "flash", "all", programmer, image)
             self.expect_json(2, "-p", "1,2", "boot", "info", "--log", self.path("{serial}"))
             self.expect_json(10, "-p", "1-3", "flash", "all", programmer, "/nonexistent/image")
+            for row in self.expect_json(7, "-p", "1,3", "flash", "write", image)["handsets"]:
+                self.assertIn("is in diagnostic mode", row["error"]["text"])
             flash = ("flash", "all", "--enter", "--wait", "1", programmer, image)
             self.assertEqual(self.verdicts(0, "-p", "1,3", *flash, "--log", self.path("log{port}")), {1: 0, 3: 0})
             self.assertGreater(len(self.content("log3")), 0)
+            self.expect_json(10, "-p", "1,3", "boot", "load", "/nonexistent/programmer")
             for code, port, log in ((2, 1, "log"), (10, 1, "no/log{port}"), (3, 9, "log{slot}")):
                 error = self.expect_json(code, "-p", f"{port},3", "--log", self.path(log), "flash", "write", image)["error"]
                 self.assertNotIn("COM0", error["text"])

@@ -108,10 +108,15 @@ class Failures(ToolTest):
                 (["-p", "7", "-p", "8", "info"], "kral info: --port is given too often"),
                 (["info", "me"], "kral info takes no 'me'"),
                 (["info", "--time-out", "0"], "--time-out takes a number from 1 to 3600000 ms, not '0'"),
-                (["band", "ul", "gsm", "1"], "band takes a number from 0 to 65535, not 'gsm'"),
+                (["band", "ul", "gsm", "x"], "channel takes a number from"),
+                (["band", "ul", "tetra", "1"], "there is no band tetra"),
+                (["band", "ul", "gsm900", "4000"], "no band gsm900 has channel 4000"),
                 (["ftm", "tx", "up"], "state cannot be 'up': it is on or off")):
             with self.subTest(words=words):
                 self.assertIn(text, self.expect_json(2, *words)["error"]["text"])
+
+    def test_a_band_has_an_id_and_a_name(self):
+        self.assertEqual(self.expect(0, "band", "ul", "gsm900", "62").out, self.expect(0, "band", "ul", "1", "62").out)
 
     def verbs_of(self, *words):
         """Every verb below these words, with its help."""

@@ -30,6 +30,7 @@ struct Chosen {
   std::set<const CLI::App*> takes_ports;
   std::map<const CLI::App*, Command::InDownload> in_download;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
+  std::map<const CLI::App*, std::function<std::vector<std::string>()>> reads;
   std::map<const CLI::App*, std::function<bool()>> without_handset;
   std::map<const CLI::App*, std::function<bool()>> asks_nobody;
   struct SettledOption {
@@ -582,6 +583,10 @@ std::vector<std::string> Command::Given(const char* option) const {
   return found->results();
 }
 
+void Command::Reads(std::function<std::vector<std::string>()> files) const {
+  chosen_->reads[app_] = std::move(files);
+}
+
 void Command::Writes(std::function<std::vector<std::string>()> files) const {
   chosen_->writes[app_] = std::move(files);
 }
@@ -699,6 +704,10 @@ bool CommandLine::asks_nobody() const {
   return IsSo(parser_->chosen.asks_nobody, parser_->chosen.verb);
 }
 
+bool CommandLine::needs_no_handset() const {
+  return IsSo(parser_->chosen.without_handset, parser_->chosen.verb);
+}
+
 bool CommandLine::asks_identity() const {
   return parser_->chosen.in_download.count(parser_->chosen.verb) == 0;
 }
@@ -710,6 +719,11 @@ bool CommandLine::may_ask_all() const {
 
 const std::vector<std::string>& CommandLine::words() const {
   return parser_->chosen.words;
+}
+
+std::vector<std::string> CommandLine::Read() const {
+  const auto found = parser_->chosen.reads.find(parser_->chosen.verb);
+  return found == parser_->chosen.reads.end() ? std::vector<std::string>() : found->second();
 }
 
 std::vector<std::string> CommandLine::Written() const {

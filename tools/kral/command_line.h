@@ -117,6 +117,8 @@ class Command {
   std::vector<std::string> Given(const char* option) const;
   // Which local files it writes, asked behind the parsing: no two handsets may write the same.
   void Writes(std::function<std::vector<std::string>()> files) const;
+  // Which it reads: they must be there before the work begins on any handset.
+  void Reads(std::function<std::vector<std::string>()> files) const;
   // Below the options in the help.
   void Explain(std::function<std::string()> text) const;
 
@@ -159,11 +161,13 @@ class CommandLine {
   bool for_many() const;
   bool takes_ports() const;
   bool asks_nobody() const;
+  bool needs_no_handset() const;
   bool asks_identity() const;
   bool may_ask_all() const;
   const std::vector<std::string>& words() const;  // of its own texts, names of files as they are now
-  std::vector<std::string> Written() const;       // local files, as far as it has said so
-  const std::set<std::string>& asked() const;     // which names were asked for: "serial"
+  std::vector<std::string> Read() const;
+  std::vector<std::string> Written() const;    // local files, as far as it has said so
+  const std::set<std::string>& asked() const;  // which names were asked for: "serial"
 
  private:
   struct Parser;

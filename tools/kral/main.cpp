@@ -46,7 +46,12 @@ void AddCommonOptions(const Command& root, Context& context) {
       .Between(0, kLongestWaitS, "s");
   root.Add("--jobs", context.jobs, "How many handsets are worked on at once; default: all").Between(1, kMostJobs);
   root.Flag(
-      "--json", [&context] { context.out.UseJson(); }, "Print one JSON object");
+      "--json",
+      [&context] {
+        context.out.UseJson();
+        context.session.trace.in_json = true;
+      },
+      "Print one JSON object");
   root.Add("--log", context.session.log_file, "Write the text log of the connection to this file")
       .File()
       .Settled("log");
@@ -70,12 +75,11 @@ struct VerbsOf {
 };
 
 constexpr VerbsOf kVerbs[] = {
-    {"ports", AddPortVerbs},  {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},
-    {"mode", AddModeVerbs},   {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},
-    {"log", AddLogVerbs},     {"event", AddEventVerbs},   {"nv", AddNvVerbs},
-    {"flash", AddFlashVerbs}, {"nv", AddNvBackupVerbs},   {"flash boot", AddBootVerbs},
-    {"band", AddBandVerbs},   {"raw", AddRawVerbs},       {"sim", AddSimVerbs},
-    {"cmd", AddCmdVerbs},     {"config", AddConfigVerbs}, {"completion", AddCompletionVerbs},
+    {"ports", AddPortVerbs},    {"doctor", AddDoctorVerbs},    {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
+    {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},          {"log", AddLogVerbs},     {"event", AddEventVerbs},
+    {"nv", AddNvVerbs},         {"flash boot", AddFlashVerbs}, {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
+    {"band", AddBandVerbs},     {"raw", AddRawVerbs},          {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
+    {"config", AddConfigVerbs}, {"completion", AddCompletionVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.
@@ -96,7 +100,7 @@ std::unique_ptr<ParsedCommand> Declared(std::string_view noun) {
 
 // The verb has done its work all the same.
 void TellLogFileTrouble(const Context& context) {
-  if (const auto trouble = ResultLine(kLogFileTrouble)) context.out.Note(Format("{}{}", kLogFileTrouble, *trouble));
+  for (const auto& trouble : ResultLines(kLogFileTrouble)) context.out.Note(Format("{}{}", kLogFileTrouble, trouble));
 }
 
 int End(const Context& context, const ToolError& error) {
@@ -147,8 +151,9 @@ void CheckReport(Context& context, const CommandLine& line) {
   CheckPage(context.report, "--report");
 }
 
-void RefuseFilesOfVerb(const ParsedCommand& command) {
-  RefuseFilesOfVerb(command.context.session.log_file, command.context.session.trace, command.line->words());
+void RefuseSharedFiles(const ParsedCommand& command) {
+  const auto& session = command.context.session;
+  RefuseSharedFiles(session.log_file, session.trace, {command.line->Written(), command.line->words()});
 }
 
 // From here on ports are numbers.
@@ -171,7 +176,7 @@ void FindPorts(Context& context, const std::string& verb) {
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
   CheckReport(command->context, *command->line);
-  RefuseFilesOfVerb(*command);
+  RefuseSharedFiles(*command);
   if (command->line->asks_nobody()) {
     IsForMany(*command);  // which may refuse
     return command->act();
@@ -183,7 +188,7 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     own->context.session.slots = command->context.session.slots;
     own->context.all = false;
     own->context.report.clear();
-    RefuseFilesOfVerb(*own);
+    RefuseSharedFiles(*own);
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
@@ -192,7 +197,7 @@ void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>
     const auto found = command->context.session;
     command = ParseAgain(arguments, *command->line, NamesOf(*command->line, found));
     command->context.session.port = found.port;
-    RefuseFilesOfVerb(*command);
+    RefuseSharedFiles(*command);
   }
   command->act();
 }

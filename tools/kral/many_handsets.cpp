@@ -14,6 +14,7 @@
 #include <thread>
 #include <utility>
 
+#include "platform/folder.h"
 #include "platform/port_list.h"
 #include "tools/kral/board.h"
 #include "tools/kral/format.h"
@@ -58,9 +59,15 @@ SessionOptions ForIdentity(SessionOptions options) {
   return options;
 }
 
-SessionOptions ForIdentity(SessionOptions options, std::uint16_t port) {
+// With them where port and place alone make them the handset's: one that fails here is what they are for.
+SessionOptions ForIdentity(SessionOptions options, std::uint16_t port, std::size_t place) {
   options.port = std::to_string(port);
-  return ForIdentity(std::move(options));
+  for (auto* const file : {&options.log_file, &options.trace.file, &options.trace.file_on_failure}) {
+    auto own = FileOfPort(*file, options, port, place);
+    if (own == *file || own.find('{') != std::string::npos) own.clear();
+    *file = std::move(own);
+  }
+  return options;
 }
 
 // --- The work -------------------------------------------------------------------------------------------------------
@@ -85,11 +92,12 @@ class ManyHandsets {
   // `work` on all handsets without a failure, so many at once. A failure of it is that of the handset.
   void OnEach(const std::function<void(std::size_t number)>& work);
   void Identify(const std::vector<std::uint16_t>& ports);
-  void AskIdentity(OneHandset& handset) const;
+  void AskIdentity(std::size_t number) const;
   void TakePorts(const std::vector<std::uint16_t>& ports);
   void RefuseNone() const;
   void RefuseTrouble() const;
   void Prepare();
+  void RefuseMissingFiles() const;
   void RefuseSameFiles() const;
   void Work();
   void WorkOn(std::size_t number, Board& board);
@@ -141,7 +149,7 @@ void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
   OnEach([this](std::size_t number) {
     const auto begin = std::chrono::steady_clock::now();
     try {
-      AskIdentity(*handsets_[number]);
+      AskIdentity(number);
     } catch (...) {
       handsets_[number]->verdict.seconds =
           std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count();
@@ -150,15 +158,26 @@ void ManyHandsets::Identify(const std::vector<std::uint16_t>& ports) {
   });
   ThrowIfInterrupted();
   if (!context().all) return RefuseTrouble();
-  // Those that nobody named and that do not answer are none of the handsets.
+  // Those that nobody named and that do not answer are none of the handsets. That one cannot be asked is told.
+  std::vector<std::string> closed;
+  for (const auto& handset : handsets_) {
+    const auto& failure = handset->verdict.failure;
+    if (!handset->answers && failure && failure->code() == ExitCode::kPortInUse) closed.emplace_back(failure->what());
+  }
   std::erase_if(handsets_, [](const auto& handset) { return !handset->answers; });
+  if (handsets_.empty() && !closed.empty()) {
+    throw ToolError(ExitCode::kNoPort, "no handset answers on any port: " + Joined(closed, ", "),
+                    "kral doctor tells what mends it");
+  }
   RefuseNone();
+  for (const auto& text : closed) out().Note("left out: " + text);
 }
 
-void ManyHandsets::AskIdentity(OneHandset& handset) const {
+void ManyHandsets::AskIdentity(std::size_t number) const {
+  auto& handset = *handsets_[number];
   auto& verdict = handset.verdict;
   try {
-    Session session(ForIdentity(context().session, verdict.port));
+    Session session(ForIdentity(context().session, verdict.port, number + 1));
     handset.answers = true;
     verdict.serial = Ask(session, Asks(*command_.line, "serial"), SerialOf);
     if (Asks(*command_.line, "model") || out().json()) {
@@ -166,6 +185,9 @@ void ManyHandsets::AskIdentity(OneHandset& handset) const {
     }
   } catch (const NoDiagnosticsError&) {
     handset.answers = true;
+    throw;
+  } catch (const ToolError& error) {  // a log that cannot be written tells nothing of the handset
+    handset.answers = handset.answers || error.code() == ExitCode::kBadFile;
     throw;
   }
 }
@@ -216,7 +238,20 @@ void ManyHandsets::Prepare() {
                                       {"model", AsFileName(handset.verdict.model)}});
     handset.command->context.session.serial = handset.verdict.serial;
   }
+  RefuseMissingFiles();
   RefuseSameFiles();
+}
+
+void ManyHandsets::RefuseMissingFiles() const {
+  for (const auto& handset : handsets_) {
+    if (!handset->command) continue;
+    for (const auto& file : handset->command->line->Read()) {
+      if (LookAt(file).kind != LocalKind::kMissing) continue;
+      throw ToolError(ExitCode::kBadFile,
+                      Format("there is no {} for COM{}; nothing was done on any port", file, handset->verdict.port),
+                      "check the name");
+    }
+  }
 }
 
 void ManyHandsets::RefuseSameFiles() const {
@@ -385,6 +420,18 @@ Names NamesOf(const CommandLine& line, const SessionOptions& options) {
   return names;
 }
 
+std::string FileOfPort(std::string name, const SessionOptions& session, std::uint16_t port, std::size_t place) {
+  const auto slot = session.slots.find(port);
+  const std::pair<std::string_view, std::string> values[] = {
+      {"{port}", std::to_string(port)}, {"{slot}", std::to_string(slot == session.slots.end() ? place : slot->second)}};
+  for (const auto& [braced, value] : values) {
+    for (auto at = name.find(braced); at != std::string::npos; at = name.find(braced, at + value.size())) {
+      name.replace(at, braced.size(), value);
+    }
+  }
+  return name;
+}
+
 ToolError MustNameBootLoaders() {
   return {ExitCode::kUsage, "to ask all ports would cost boot loaders their hello", "name the ports: -p 7-14"};
 }
@@ -394,7 +441,7 @@ bool IsForMany(const ParsedCommand& command) {
   if (context.all && !context.session.port.empty()) {
     throw ToolError(ExitCode::kUsage, "--all and --port say different things", "give one of them");
   }
-  if (command.line->takes_ports()) return false;
+  if (command.line->takes_ports() || command.line->needs_no_handset()) return false;
   const bool many = context.for_several();
   if (!many || command.line->for_many()) return many;
   throw ToolError(ExitCode::kUsage, Format("kral {} is for one handset at a time", command.line->verb()),

@@ -3,6 +3,7 @@
 #ifndef KRAL_TOOLS_MANY_HANDSETS_H
 #define KRAL_TOOLS_MANY_HANDSETS_H
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -32,6 +33,9 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text);
 // Without those that lead to the same device as one in front of them: a link of a port folder has a number beside that
 // of its target. ToolError for such as were named.
 std::vector<std::uint16_t> WithoutTwins(const std::vector<std::uint16_t>& ports, bool are_named);
+
+// {port} and {slot} of a name put in, for handsets that are not asked who they are. `place` in the list, from 1.
+std::string FileOfPort(std::string name, const SessionOptions& session, std::uint16_t port, std::size_t place);
 
 // Of --all where boot loaders may be.
 ToolError MustNameBootLoaders();

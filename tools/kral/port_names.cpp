@@ -4,7 +4,9 @@
 #include <algorithm>
 #include <charconv>
 #include <chrono>
+#include <cstdio>
 #include <filesystem>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <set>
@@ -223,6 +225,50 @@ std::string SlotFile() {
   return named && !named->empty() ? *named : ConfigFile("slots");
 }
 
+namespace {
+
+ToolError SlotsNotWritten(const std::string& file, const std::string& why) {
+  return {ExitCode::kBadFile, Format("{} cannot be written: {}", file, why),
+          "check folder and permissions, or name another file in KRAL_SLOTS"};
+}
+
+// Of two that change it at once the later one goes by what the other has written.
+std::shared_ptr<std::FILE> LockOf(const std::string& file) {
+  constexpr int kTries = 100;
+  const auto name = file + ".lock";
+  for (int i = 0; i < kTries; ++i) {
+    if (std::FILE* const lock = OpenToWrite(name)) return {lock, CloseStream};
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    ThrowIfInterrupted();
+  }
+  throw SlotsNotWritten(file, Format("{} cannot be opened, or is kept by another program", name));
+}
+
+// The lines of whoever has written some.
+std::string CommentsOf(const std::string& file) {
+  std::vector<std::uint8_t> bytes;
+  if (ReadWholeFile(file, kLargestSlotFile, bytes)) return {};
+  std::string comments;
+  std::string_view rest(reinterpret_cast<const char*>(bytes.data()), bytes.size());
+  while (!rest.empty()) {
+    const auto line = rest.substr(0, rest.find('\n'));
+    rest.remove_prefix(std::min(rest.size(), line.size() + 1));
+    if (line.starts_with('#')) comments.append(line).append("\n");
+  }
+  return comments;
+}
+
+// As it would be assigned; nothing for what would not.
+std::optional<std::string> PortNameIn(std::string_view text) {
+  try {
+    return PortName(std::string(text));
+  } catch (const ToolError&) {
+    return {};
+  }
+}
+
+}  // namespace
+
 std::map<std::uint16_t, std::string> ReadSlots() {
   const auto file = SlotFile();
   std::vector<std::uint8_t> bytes;
@@ -242,21 +288,25 @@ std::map<std::uint16_t, std::string> ReadSlots() {
     if (line.empty() || line.starts_with('#')) continue;
     const auto blank = line.find(' ');
     const auto slot = NumberIn<std::uint16_t>(line.substr(0, blank));
-    if (!slot || blank == std::string_view::npos || !slots.emplace(*slot, line.substr(blank + 1)).second) {
-      throw bad(Format("has no slot of its own in line {}", number));
+    const auto name = blank == std::string_view::npos ? std::nullopt : PortNameIn(line.substr(blank + 1));
+    if (!slot || *slot == 0 || *slot > kLastSlot || !name || !slots.emplace(*slot, *name).second) {
+      throw bad(Format("has no slot of its own with a port in line {}", number));
     }
   }
   return slots;
 }
 
-void WriteSlots(const std::map<std::uint16_t, std::string>& slots) {
+void ChangeSlots(const std::function<void(std::map<std::uint16_t, std::string>& slots)>& change) {
   const auto file = SlotFile();
-  std::string text = "# Which port each slot of the fixture is: kral ports assign SLOT PORT\n";
-  for (const auto& [slot, name] : slots) text += Format("{} {}\n", slot, name);
   MakeFoldersOf(file);
+  const auto lock = LockOf(file);
+  auto slots = ReadSlots();
+  change(slots);
+  auto text = CommentsOf(file);
+  if (text.empty()) text = "# Which port each slot of the fixture is: kral ports assign SLOT PORT\n";
+  for (const auto& [slot, name] : slots) text += Format("{} {}\n", slot, name);
   if (const auto error = ReplaceWholeFile(file, {reinterpret_cast<const std::uint8_t*>(text.data()), text.size()})) {
-    throw ToolError(ExitCode::kBadFile, Format("{} cannot be written: {}", file, error.message()),
-                    "check folder and permissions, or name another file in KRAL_SLOTS");
+    throw SlotsNotWritten(file, error.message());
   }
 }
 

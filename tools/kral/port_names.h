@@ -4,6 +4,7 @@
 #define KRAL_TOOLS_PORT_NAMES_H
 
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <string>
 
@@ -18,7 +19,8 @@ void ResolvePortNames(SessionOptions& options);
 // Which name each slot of the fixture has: `kral ports assign`. ToolError for a file that is there and is none of
 // these.
 std::map<std::uint16_t, std::string> ReadSlots();
-void WriteSlots(const std::map<std::uint16_t, std::string>& slots);
+// All of it, or nothing when `change` throws; one at a time, whoever else does so.
+void ChangeSlots(const std::function<void(std::map<std::uint16_t, std::string>& slots)>& change);
 std::string SlotFile();
 // A name in the one way in which it is kept; ToolError for what cannot be the name of a port.
 std::string PortName(const std::string& name);

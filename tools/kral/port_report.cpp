@@ -8,6 +8,7 @@
 
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -72,7 +73,7 @@ std::vector<PortReport> ReportPorts(const std::vector<std::uint16_t>& ports, boo
 std::string HolderText(const KRAL_PORT_INFO& info) {
   if (info.process == 0) return {};
   return info.process_name[0] == '\0' ? Format("process {}", info.process)
-                                      : Format("{} (process {})", info.process_name, info.process);
+                                      : Format("{} (process {})", NameText(info.process_name), info.process);
 }
 
 std::string StateText(const PortReport& report) {
@@ -87,11 +88,11 @@ std::string StateText(const PortReport& report) {
 }
 
 std::string UsbText(const KRAL_PORT_INFO& info) {
-  if (info.usb_path[0] == '\0') return info.description;
+  if (info.usb_path[0] == '\0') return NameText(info.description);
   std::string text = Format("usb:{}:{}  {:04X}:{:04X}", info.usb_path, info.usb_interface, info.vendor, info.product);
   if (info.serial[0] != '\0') text += Format(" {}", info.serial);
   if (info.description[0] != '\0') text += Format("  {}", info.description);
-  return text;
+  return NameText(text);
 }
 
 Json PortJson(const PortReport& report) {

@@ -42,4 +42,13 @@ std::optional<std::string> ResultLine(std::string_view beginning, KRAL_HANDLE ha
   return found == results.end() ? std::nullopt : std::optional(found->second);
 }
 
+std::vector<std::string> ResultLines(std::string_view beginning) {
+  const std::lock_guard lock(mutex);
+  std::vector<std::string> lines;
+  for (const auto& [key, line] : results) {
+    if (key.first != 0 && key.second == beginning) lines.push_back(line);
+  }
+  return lines;
+}
+
 }  // namespace kral::tool

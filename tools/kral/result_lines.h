@@ -7,6 +7,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "kral/kral.h"
 
@@ -22,6 +23,9 @@ inline constexpr std::string_view kLogFileTrouble = "Text log: ";  // the file d
 void CollectResultLines(KRAL_HANDLE handle);  // from now on, through the text-log callback of the handle
 // The rest of the last line with this beginning, of a handle or of all.
 std::optional<std::string> ResultLine(std::string_view beginning, KRAL_HANDLE handle = 0);
+
+// That of each handle.
+std::vector<std::string> ResultLines(std::string_view beginning);
 
 }  // namespace kral::tool
 

@@ -329,10 +329,11 @@ std::optional<ToolError> Session::Silence() const {
   const auto record = LastError(handle_);
   const auto after = TroubleOf(handle_);
   if (const auto trouble = after ? after : before) return PortError(port_, *trouble, true, record);
-  if (IsOtherThanSilence(record)) return ExplainRecord(*record, kLivenessCheck, port_);
+  // The first of many frames may be damaged: the port was opened in the middle of it.
   double rate = 0;
   if (AnswersBehindTraffic(rate)) return std::nullopt;
   if (rate >= kLeastTraffic) return Flooded(rate, record);
+  if (IsOtherThanSilence(record)) return ExplainRecord(*record, kLivenessCheck, port_);
   return ToolError(ExitCode::kNoAnswer, Format("the handset on {} answers nothing any more", DescribePort(port_)),
                    "check cable and power", record);
 }

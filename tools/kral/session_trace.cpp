@@ -1,6 +1,7 @@
 // Starts a trace, and brings it to its file.
 #include "tools/kral/session_trace.h"
 
+#include <algorithm>
 #include <exception>
 #include <utility>
 
@@ -9,6 +10,7 @@
 #include "tools/kral/format.h"
 #include "tools/kral/one_file.h"
 #include "tools/kral/output.h"
+#include "tools/kral/safe_text.h"
 
 namespace kral::tool {
 namespace {
@@ -17,6 +19,16 @@ namespace {
 constexpr std::uint32_t kKeptBytes = 8u << 20;
 // Each waits for a second; a disk that takes nothing for so long has gone.
 constexpr int kMostWaits = 30;
+
+// Whether a word names that file.
+auto IsFile(const std::string& file) {
+  return [&file](const std::string& word) {
+    if (word.empty()) return false;
+    const auto colon = word.find(':');
+    const bool has_type = colon != std::string::npos && word.find_first_not_of("0123456789") == colon;
+    return IsOneFile(file, word) || (has_type && IsOneFile(file, word.substr(colon + 1)));
+  };
+}
 
 bool Stop(KRAL_HANDLE handle) {
   KRAL_TRACE_COUNTERS counters{};
@@ -35,17 +47,19 @@ void RefuseLogFile(const std::string& log_file, const std::string& file, const c
                   "name another file than that of --log");
 }
 
-void RefuseFilesOfVerb(const std::string& log_file, const TraceOptions& trace, const std::vector<std::string>& words) {
-  const std::pair<const char*, const std::string&> files[] = {
+void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const FilesOfVerb& files) {
+  const std::pair<const char*, const std::string&> others[] = {
       {"--log", log_file}, {"--trace", trace.file}, {"--trace-on-failure", trace.file_on_failure}};
-  for (const auto& [option, file] : files) {
+  for (const auto& [option, file] : others) {
     if (file.empty()) continue;
-    for (const auto& word : words) {
-      const auto name = word.substr(word.find_first_not_of("0123456789") == word.find(':') ? word.find(':') + 1 : 0);
-      if (word.empty() || (!IsOneFile(file, word) && !IsOneFile(file, name))) continue;
-      throw ToolError(ExitCode::kUsage, Format("{} would destroy {}, a file of the command itself", option, name),
-                      Format("name another file behind {}", option));
-    }
+    if (!std::ranges::any_of(files.words, IsFile(file)) && !std::ranges::any_of(files.written, IsFile(file))) continue;
+    throw ToolError(ExitCode::kUsage, Format("{} would destroy {}, a file of the command itself", option, file),
+                    Format("name another file behind {}", option));
+  }
+  for (const auto& file : files.written) {
+    if (file.empty() || file == "-" || std::ranges::count_if(files.words, IsFile(file)) < 2) continue;
+    throw ToolError(ExitCode::kUsage, Format("{} would be written, and is named once more", file),
+                    "give what is written a file of its own");
   }
 }
 
@@ -61,16 +75,21 @@ SessionTrace::SessionTrace(KRAL_HANDLE handle, const TraceOptions& options) : ha
                   LastError(handle));
 }
 
+void SessionTrace::Tell(const std::string& text) const {
+  const Json event{{"event", "note"}, {"text", text}};
+  WriteAside(options_.in_json ? JsonLine(event) : SafeText(text) + "\n");
+}
+
 void SessionTrace::End(bool failed) noexcept {
   try {
     if (!options_.file.empty() && !Stop(handle_)) {
-      WriteAside(Format("the trace file {} does not hold everything: its disk is full, slow or gone\n", options_.file));
+      Tell(Format("the trace file {} does not hold everything: its disk is full, slow or gone", options_.file));
     }
     if (options_.file_on_failure.empty() || !failed) return;
     const auto& file = options_.file_on_failure;
     const bool saved = KRAL_SaveTrace(handle_, file.c_str()) != 0;
-    WriteAside(saved ? Format("the traffic in front of the failure is in {}\n", file)
-                     : Format("the trace file {} cannot be written\n", file));
+    Tell(saved ? Format("the traffic in front of the failure is in {}", file)
+               : Format("the trace file {} cannot be written", file));
   } catch (const std::exception&) {  // nobody is left to be told
   }
 }

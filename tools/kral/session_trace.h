@@ -12,14 +12,21 @@ namespace kral::tool {
 struct TraceOptions {
   std::string file;
   std::string file_on_failure;
+  bool in_json = false;  // what is told of it
 };
 
 // ToolError when something else would be written to the file of the text log: each would destroy the other.
 void RefuseLogFile(const std::string& log_file, const std::string& file, const char* what);
 
-// ToolError when text log or trace would be written to a file of the verb: one of these words, or what stands behind
-// the number of an image's type in it.
-void RefuseFilesOfVerb(const std::string& log_file, const TraceOptions& trace, const std::vector<std::string>& words);
+// The files of a verb: those that it writes, and the words of its command line, of which any may be a file, or one
+// behind the number of an image's type.
+struct FilesOfVerb {
+  std::vector<std::string> written;
+  std::vector<std::string> words;  // with those that it writes
+};
+// ToolError when text log or trace would be written to one of them, and when what it writes is twice among them: it
+// would destroy what it reads.
+void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const FilesOfVerb& files);
 
 class SessionTrace {
  public:
@@ -30,6 +37,8 @@ class SessionTrace {
   void End(bool failed) noexcept;
 
  private:
+  void Tell(const std::string& text) const;
+
   const KRAL_HANDLE handle_;
   const TraceOptions options_;
 };

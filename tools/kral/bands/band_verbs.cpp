@@ -1,6 +1,12 @@
 // kral band: bands, their channels and carrier frequencies. Pure arithmetic: no handset is needed.
 #include <array>
+#include <cctype>
+#include <charconv>
 #include <memory>
+#include <optional>
+#include <set>
+#include <string>
+#include <string_view>
 #include <vector>
 
 #include "tools/kral/format.h"
@@ -19,6 +25,16 @@ constexpr std::array<Direction, 3> kDirections{{
     {KRAL_BAND_UPLINK, "uplink", KRAL_Band_Helper_CalculateULFrequency},
     {KRAL_BAND_DOWNLINK, "downlink", KRAL_Band_Helper_CalculateDLFrequency},
 }};
+
+// Decimal, or hexadecimal with 0x in front; nothing for what is no number.
+std::optional<std::uint16_t> ParseBandId(std::string_view text) {
+  const bool is_hex = text.starts_with("0x") || text.starts_with("0X");
+  if (is_hex) text.remove_prefix(2);
+  std::uint16_t id = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), id, is_hex ? 16 : 10);
+  if (text.empty() || error != std::errc() || end != text.data() + text.size()) return std::nullopt;
+  return id;
+}
 
 struct ChannelRange {
   std::int32_t first;
@@ -68,7 +84,54 @@ void List(const Context& context) {
   context.out.Result({{"bands", rows}}, text);
 }
 
-void Convert(const Context& context, const Direction& direction, std::uint16_t band, std::int32_t channel) {
+// "E-GSM 900" is "egsm900".
+std::string PlainName(std::string_view name) {
+  std::string plain;
+  for (const char letter : name) {
+    const auto character = static_cast<unsigned char>(letter);
+    if (std::isalnum(character) != 0) plain += static_cast<char>(std::tolower(character));
+  }
+  return plain;
+}
+
+std::vector<std::uint16_t> BandsNamed(const std::string& text) {
+  const auto wanted = PlainName(text);
+  std::vector<std::uint16_t> alike;
+  for (std::uint32_t i = 0; i < KRAL_Band_Helper_GetBandCount(); ++i) {
+    std::uint16_t band = 0;
+    if (KRAL_Band_Helper_GetBand(i, &band) == 0) continue;
+    const auto name = PlainName(NameOfBand(band));
+    if (name == wanted) return {band};
+    if (!wanted.empty() && name.find(wanted) != std::string::npos) alike.push_back(band);
+  }
+  return alike;
+}
+
+// By id or by name. Several that are called so are one where the channel is the same carrier in all that have it.
+std::uint16_t BandOf(const std::string& text, const Direction& direction, std::int32_t channel) {
+  if (const auto id = ParseBandId(text)) return *id;
+  const auto bands = BandsNamed(text);
+  std::vector<std::uint16_t> with_channel;
+  std::set<double> carriers;
+  std::vector<std::string> names;
+  for (const auto band : bands) {
+    names.push_back(Format("{} ({})", band, NameOfBand(band)));
+    const double carrier = direction.frequency(band, channel);
+    if (carrier == 0.0) continue;
+    carriers.insert(carrier);
+    with_channel.push_back(band);
+  }
+  if (carriers.size() == 1) return with_channel.front();
+  if (bands.size() == 1) return bands.front();
+  throw ToolError(ExitCode::kUsage,
+                  bands.empty()      ? Format("there is no band {}", text)
+                  : carriers.empty() ? Format("no band {} has channel {}", text, channel)
+                                     : Format("several bands are called {}: {}", text, Joined(names, ", ")),
+                  "kral band list shows ids and names");
+}
+
+void Convert(const Context& context, const Direction& direction, const std::string& name, std::int32_t channel) {
+  const auto band = BandOf(name, direction, channel);
   const double frequency = direction.frequency(band, channel);
   if (frequency == 0.0) {
     throw ToolError(ExitCode::kUsage,
@@ -80,11 +143,11 @@ void Convert(const Context& context, const Direction& direction, std::uint16_t b
 }
 
 void AddConversion(const Command& parent, Context& context, const char* verb, const Direction& direction) {
-  const auto band = std::make_shared<std::uint16_t>();
+  const auto band = std::make_shared<std::string>();
   const auto channel = std::make_shared<std::int32_t>();
   const auto conversion = parent.Verb(verb, Format("Print the {} carrier of a channel", direction.name));
   conversion.NeedsNoHandset();
-  conversion.Add("band", *band, "Band id, as in the list").Required();
+  conversion.Add("band", *band, "Band id or name, as in the list: 1, gsm900").Required();
   conversion.Add("channel", *channel, "Channel number").Required();
   conversion.Run([&context, &direction, band, channel] { Convert(context, direction, *band, *channel); });
 }

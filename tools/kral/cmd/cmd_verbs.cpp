@@ -204,6 +204,7 @@ void AddHeaderVerb(const Command& cmd, Context& context) {
   header.NeedsNoHandset();
   header.Add("files", options->files, "Definition files").Required();
   header.Add("--output", options->output, "The header; default: the standard output").File();
+  header.Writes([options] { return std::vector<std::string>{options->output}; });
   header.Run([&context, options] { WriteHeader(context, *options); });
 }
 

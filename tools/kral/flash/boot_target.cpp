@@ -12,8 +12,9 @@ namespace {
 
 constexpr std::uint32_t kLookAroundMs = 100;
 
-// What to do where a boot loader is concerned.
-std::string HintOf(std::uint32_t code) {
+}  // namespace
+
+std::string BootHint(std::uint32_t code) {
   switch (code) {
     case KRAL_ERROR_NO_ANSWER:
       return "power the handset off and on: its hello comes once, and is lost when another program reads it";
@@ -28,8 +29,6 @@ std::string HintOf(std::uint32_t code) {
       return {};
   }
 }
-
-}  // namespace
 
 BootTarget::BootTarget(const Context& context, const BootOptions& options)
     : context_(context),
@@ -136,7 +135,7 @@ bool BootTarget::IsPortMissing() const {
 ToolError BootTarget::Explain() const {
   const auto record = LastError(session_.handle());
   if (Interrupted()) return InterruptedError();
-  return ExplainRecord(record, "the boot transfer", session_.port(), record ? HintOf(record->code) : std::string());
+  return ExplainRecord(record, "the boot transfer", session_.port(), record ? BootHint(record->code) : std::string());
 }
 
 }  // namespace kral::tool

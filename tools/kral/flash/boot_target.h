@@ -26,6 +26,9 @@ struct BootIdentity {
   std::optional<std::uint32_t> chip;  // nothing for a target that has none
 };
 
+// What to do where a boot loader is concerned; empty for what concerns none.
+std::string BootHint(std::uint32_t code);
+
 class BootTarget {
  public:
   BootTarget(const Context& context, const BootOptions& options);

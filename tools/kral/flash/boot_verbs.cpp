@@ -101,6 +101,7 @@ void FlashAll(Context& context, const FlashAllArguments& arguments) {
     plan.programmer = arguments.programmer;
     plan.enter = arguments.options.enter;
     plan.return_s = arguments.options.wait_s;
+    plan.pre_done_delay_ms = arguments.options.pre_done_delay_ms;
     plan.images = images;
     plan.reset = arguments.reset;
     return FlashMany(context, plan);
@@ -144,6 +145,7 @@ void AddBootVerbs(const Command& root, Context& context) {
   const auto programmer = std::make_shared<std::string>();
   const auto load = boot.Verb("load", "Transfer a flash programmer, which starts at once");
   AddLoadOptions(load, *options, *programmer);
+  load.Reads([programmer] { return std::vector<std::string>{*programmer}; });
   load.ForMany(Command::InDownload::kBootLoader);
   load.Run([&context, options, programmer] { Load(context, *options, *programmer); });
 

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "tools/kral/call_failure.h"
+#include "tools/kral/flash/boot_target.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
 #include "tools/kral/many_handsets.h"
@@ -24,6 +25,8 @@ namespace kral::tool {
 namespace {
 
 constexpr std::uint32_t kDrawEveryMs = 100;
+constexpr std::uint32_t kHelloMs = 5000;
+constexpr std::uint32_t kHelloDelayMs = 500;  // between two looks, as the library has it
 constexpr std::uint32_t kEndOfThreadsMs = 1000;
 
 template <class Record>
@@ -57,11 +60,11 @@ class FlashJob {
   std::vector<std::uint16_t> Ports() const;
   void SetUp();
   void AddHandset(std::uint16_t port);
-  std::string LogOf(std::uint16_t port, std::size_t place) const;
   void Watch(Board& board);
   void Look(std::uint32_t number, Board& board);
   double SecondsNow() const;
   void Judge(std::uint32_t number);
+  ToolError Explain(const KRAL_VENTRIMS_RESULT& result) const;
   // On a thread of the job.
   void NoteStep(std::uint32_t number);
 
@@ -103,6 +106,8 @@ void FlashJob::SetUp() {
   options.block_size = plan_.options.block_size;
   options.command_ms = context_.session.time_out_ms.value_or(0);
   if (plan_.return_s != 0) options.return_ms = plan_.return_s * 1000;
+  // Of a start only the boot loader's hello remains, which is said by now or as soon as the port is there.
+  if (plan_.return_s != 0 && !plan_.enter && !plan_.reset) options.start_ms = options.return_ms + kHelloMs;
   Do(KRAL_VENTRIMS_SetOptions(job_, &options), "the job");
   if (!plan_.programmer.empty()) {
     Do(KRAL_VENTRIMS_AddProgrammer(job_, plan_.programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT), "the programmer");
@@ -119,26 +124,14 @@ void FlashJob::SetUp() {
   }
 }
 
-// Handsets in download do not tell who they are.
-std::string FlashJob::LogOf(std::uint16_t port, std::size_t place) const {
-  const auto slot = context_.session.slots.find(port);
-  const std::pair<std::string_view, std::string> names[] = {
-      {"{port}", std::to_string(port)},
-      {"{slot}", std::to_string(slot == context_.session.slots.end() ? place : slot->second)}};
-  auto log = context_.session.log_file;
-  for (const auto& [name, value] : names) {
-    for (auto at = log.find(name); at != std::string::npos; at = log.find(name, at + value.size())) {
-      log.replace(at, name.size(), value);
-    }
-  }
-  return log;
-}
-
 void FlashJob::AddHandset(std::uint16_t port) {
   std::uint32_t number = 0;
   Do(KRAL_VENTRIMS_AddPort(job_, port, &number), "the port");
   handsets_.emplace_back().verdict.port = port;
-  const auto log = LogOf(port, handsets_.size());
+  KRAL_HANDLE handle = 0;
+  Do(KRAL_VENTRIMS_GetHandle(job_, number, &handle), "the handset");
+  if (plan_.pre_done_delay_ms != 0) KRAL_Kivrat_Configure(handle, 0, kHelloDelayMs, plan_.pre_done_delay_ms);
+  const auto log = FileOfPort(context_.session.log_file, context_.session, port, handsets_.size());
   if (log.empty()) return;
   for (const auto& handset : handsets_) {
     if (handset.log_name != log) continue;
@@ -147,8 +140,6 @@ void FlashJob::AddHandset(std::uint16_t port) {
   }
   handsets_.back().log_name = log;
   handsets_.back().log = OpenLogFile(log);
-  KRAL_HANDLE handle = 0;
-  Do(KRAL_VENTRIMS_GetHandle(job_, number, &handle), "the handset");
   if (context_.session.log_flags) KRAL_SetLogFlags(handle, *context_.session.log_flags);
   KRAL_StartLogging(handle, log.c_str());
 }
@@ -186,8 +177,24 @@ void FlashJob::Judge(std::uint32_t number) {
   } else if (result.progress.state == KRAL_VENTRIMS_ABORTED) {
     verdict.failure = InterruptedError();
   } else {
-    verdict.failure = ExplainRecord(result.error, result.progress.step_name, verdict.port);
+    verdict.failure = Explain(result);
   }
+}
+
+ToolError FlashJob::Explain(const KRAL_VENTRIMS_RESULT& result) const {
+  const auto& error = result.error;
+  const auto port = static_cast<std::uint16_t>(result.progress.port);
+  const std::string_view step = result.progress.step_name;
+  // Whatever has a flash programmer's line takes its hello.
+  if (plan_.programmer.empty() && result.progress.bytes_done == 0 && error.status_kind == KRAL_ERROR_STATUS_REFUSAL) {
+    return InDiagnosticMode(port);
+  }
+  const bool is_transfer = step.starts_with("flash programmer");
+  auto hint = is_transfer ? BootHint(error.code) : std::string();
+  if (is_transfer && error.code == KRAL_ERROR_NO_ANSWER && result.progress.bytes_done != 0) {
+    hint = "check that the programmer is meant for this handset";
+  }
+  return ExplainRecord(error, step, port, hint);
 }
 
 double FlashJob::SecondsNow() const {

@@ -13,6 +13,7 @@ struct FlashPlan {
   std::string programmer;      // for boot loaders; empty: one is running
   bool enter = false;          // from diagnostics into the boot loader first
   std::uint32_t return_s = 0;  // how long a port may take to come back; 0: as the library has it
+  std::uint32_t pre_done_delay_ms = 0;
   std::string partition_table;
   bool override_table = false;
   std::vector<FlashImage> images;

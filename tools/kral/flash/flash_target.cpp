@@ -106,11 +106,7 @@ std::optional<ProgrammerLimits> FlashTarget::TryHello(std::uint32_t tries) {
 }
 
 ProgrammerLimits FlashTarget::Hello() {
-  if (session_.answers_diagnostics()) {
-    throw ToolError(ExitCode::kRefused,
-                    Format("the handset on {} is in diagnostic mode", DescribePort(session_.port())),
-                    "load a flash programmer first: kral flash load FILE");
-  }
+  if (session_.answers_diagnostics()) throw InDiagnosticMode(session_.port());
   if (const auto limits = TryHello(kAllTries)) return *limits;
   throw ToolError(ExitCode::kNoAnswer, Format("no flash programmer answers on {}", DescribePort(session_.port())),
                   "kral flash info tells what has the line; a programmer is loaded with kral flash load FILE");
@@ -179,6 +175,11 @@ void FlashTarget::Write(const FlashImage& image, const WriteOptions& options, co
                                                   limits.window, &result) != 0;
   progress_ = nullptr;
   if (!written) throw ExplainWrite(session_, image.file, result);
+}
+
+ToolError InDiagnosticMode(std::uint16_t port) {
+  return {ExitCode::kRefused, Format("the handset on {} is in diagnostic mode", DescribePort(port)),
+          "load a flash programmer first: kral flash load FILE"};
 }
 
 ToolError ExplainWrite(const Session& session, const std::string& file, std::uint32_t result) {

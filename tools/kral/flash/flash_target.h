@@ -49,6 +49,9 @@ struct WriteOptions {
 // Why an image could not be written, right behind the call; `result` as KRAL_STREAM_WriteImageFile gave it.
 ToolError ExplainWrite(const Session& session, const std::string& file, std::uint32_t result);
 
+// Where a flash programmer should have the line.
+ToolError InDiagnosticMode(std::uint16_t port);
+
 class FlashTarget {
  public:
   explicit FlashTarget(const Context& context);

@@ -229,6 +229,7 @@ void AddLoadVerb(const Command& flash, Context& context) {
       .ShowDefault();
   load.Flag("--dry-run", arguments->dry_run, "Check the file and print the plan, without a handset");
   load.AsksNobody([arguments] { return arguments->dry_run; });
+  load.Reads([arguments] { return std::vector<std::string>{arguments->file}; });
   load.ForMany();
   load.Run([&context, arguments] { LoadProgrammer(context, *arguments); });
 }
@@ -281,6 +282,7 @@ void AddFlashVerbs(const Command& root, Context& context) {
   hex.NeedsNoHandset();
   hex.Add("input", arguments->input, "File to read: the other format is written").Required();
   hex.Add("output", arguments->output, "File to write").Required();
+  hex.Writes([arguments] { return std::vector<std::string>{arguments->output}; });
   hex.Add("--base", arguments->base, "First address of a binary; a multiple of 0x10000");
   hex.Run([&context, arguments] { Convert(context, *arguments); });
 }

@@ -87,6 +87,16 @@ std::string EfsPath(std::string_view argument) {
   return argument.empty() ? "/" : std::string(argument);
 }
 
+std::vector<std::string> EfsNames(std::string_view path) {
+  std::vector<std::string> names;
+  while (!path.empty()) {
+    const auto name = path.substr(0, path.find('/'));
+    path.remove_prefix(std::min(path.size(), name.size() + 1));
+    if (!name.empty() && name != ".") names.emplace_back(name);
+  }
+  return names;
+}
+
 std::string JoinEfs(std::string_view folder, std::string_view name) {
   return Format("{}{}{}", folder, folder.ends_with('/') ? "" : "/", name);
 }

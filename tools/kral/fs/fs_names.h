@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace kral::tool {
 
@@ -13,6 +14,8 @@ namespace kral::tool {
 std::string EfsPath(std::string_view argument);
 bool IsEfsArgument(std::string_view argument);  // with a colon
 
+// The names of a path, one after another, without those that lead nowhere: "" and ".".
+std::vector<std::string> EfsNames(std::string_view path);
 std::string JoinEfs(std::string_view folder, std::string_view name);
 std::string_view LastEfsName(std::string_view path);  // empty for the root
 std::string_view LastName(std::string_view path);     // of the PC's side; empty for a root

@@ -367,9 +367,14 @@ void CheckGet(const FsOptions& options) {
 }
 
 void CheckRemove(const FsOptions& options) {
+  if (!options.copy.recursive) return;
   for (const auto& path : options.paths) {
-    if (!options.copy.recursive || EfsPath(path).find_first_not_of('/') != std::string::npos) continue;
-    throw ToolError(ExitCode::kUsage, "the root directory is not removed", "name what is in it");
+    const auto names = EfsNames(EfsPath(path));
+    if (std::ranges::find(names, "..") != names.end()) {
+      throw ToolError(ExitCode::kUsage, Format("{} may lead anywhere", NameText(path)),
+                      "name what is removed without ..");
+    }
+    if (names.empty()) throw ToolError(ExitCode::kUsage, "the root directory is not removed", "name what is in it");
   }
 }
 
@@ -460,6 +465,11 @@ void AddFsVerbs(const Command& root, Context& context) {
     paths.File();
     if (verb.act != Cat) subcommand.ForMany();
     if (verb.act == Get) subcommand.Writes([options] { return std::vector<std::string>{LocalTarget(*options)}; });
+    if (verb.act == Put) {
+      subcommand.Reads([options] {
+        return options->paths[0] == kStandardInput ? std::vector<std::string>() : std::vector{options->paths[0]};
+      });
+    }
     subcommand.Run([&context, options, &verb] { Run(context, *options, verb); });
   }
   AddFlags(fs, *options);

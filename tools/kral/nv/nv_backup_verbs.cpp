@@ -306,12 +306,15 @@ void AddNvBackupVerbs(const Command& root, Context& context) {
   backup.Add("--items", options->items, "Range of item ids to read");
   backup.Add("--subscriptions", options->subscriptions, "How many subscriptions the handset has").Between(1, 16);
   const auto restore = add("restore", "Write what a PKV file holds to the handset and read it back", Restore);
+  const auto verify = add("verify", "Compare a PKV file with the handset", Verify);
+  for (const auto& verb : {restore, verify}) {
+    verb.Reads([options] { return std::vector<std::string>{options->file}; });
+  }
   restore.Flag("--dry-run", options->dry_run, "Only tell what would be written");
   restore.Flag("--force", options->force, "Also what was read from another model");
   restore.Add("--read-only", options->read_only, "Items that may be read-only (0,447): skipped, not refused")
       .Separated(',')
       .OneEach();
-  add("verify", "Compare a PKV file with the handset", Verify);
 }
 
 }  // namespace kral::tool

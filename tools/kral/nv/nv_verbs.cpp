@@ -247,6 +247,7 @@ void AddNvVerbs(const Command& root, Context& context) {
   diff.Add("first", arguments->first, "PKV file").Required();
   diff.Add("second", arguments->second, "PKV file").Required();
   diff.Add("page", arguments->page, "HTML file to be written").Required();
+  diff.Writes([arguments] { return std::vector<std::string>{arguments->page}; });
   const auto definitions = add("defs", "Print what definition files define; needs no handset", ListDefinitions);
   definitions.NeedsNoHandset();
   definitions.Add("file", arguments->items, "Definition file").Required();

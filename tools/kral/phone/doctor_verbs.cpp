@@ -51,6 +51,7 @@ class Doctor {
   void LookAtRights(const PortReport& report, const PortAccess& access);
   void LookAtState(const PortReport& report);
   void LookAtLatency(const PortReport& report, const PortAccess& access);
+  SessionOptions OptionsOf(std::size_t number) const;
   void LookAtLines();
   void JudgeLine(const Patient& patient);
   void Found(Finding finding) { findings_.push_back(std::move(finding)); }
@@ -116,16 +117,30 @@ void Doctor::LookAtLatency(const PortReport& report, const PortAccess& access) {
          Format("echo 1 | sudo tee {}", access.latency_file)});
 }
 
+// Each line has its own text log and trace.
+SessionOptions Doctor::OptionsOf(std::size_t number) const {
+  auto options = context_.session;
+  const auto port = patients_[number].report.port;
+  options.port = std::to_string(port);
+  for (auto* const file : {&options.log_file, &options.trace.file, &options.trace.file_on_failure}) {
+    const auto own = FileOfPort(*file, options, port, number + 1);
+    if (patients_.size() > 1 && !file->empty() && own == *file) {
+      throw ToolError(ExitCode::kUsage, Format("{} would be written for all ports", *file), "put {port} into its name");
+    }
+    *file = own;
+  }
+  return options;
+}
+
 void Doctor::LookAtLines() {
   std::mutex mutex;
+  std::vector<SessionOptions> options;
+  for (std::size_t number = 0; number < patients_.size(); ++number) options.push_back(OptionsOf(number));
   InParallel(patients_.size(), [&](std::size_t number) {
     auto& patient = patients_[number];
     if (patient.report.info.answers != KRAL_ANSWERS_DIAGNOSTICS) return;
     try {
-      auto options = context_.session;
-      options.port = std::to_string(patient.report.port);
-      options.log_file.clear();
-      Session session(options);
+      Session session(options[number]);
       patient.link = CheckLink(session, seconds_);
     } catch (const ToolError& error) {
       const std::lock_guard lock(mutex);

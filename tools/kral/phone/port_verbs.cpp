@@ -48,29 +48,31 @@ void ShowSlots(const Context& context, const std::map<std::uint16_t, std::string
   context.out.Result({{"slots", list}, {"file", SlotFile()}}, text);
 }
 
-void Assign(const Context& context, const PortOptions& options) {
-  auto slots = ReadSlots();
-  if (!options.slot && !options.remove) return ShowSlots(context, slots);
-  if (options.name.empty() != options.remove || (options.remove && !options.slot)) {
-    throw ToolError(ExitCode::kUsage, "a slot is assigned to a port, or removed",
-                    "kral ports assign 3 usb:1-4.2, or kral ports assign 3 --remove");
-  }
+void Change(std::map<std::uint16_t, std::string>& slots, const PortOptions& options) {
   if (slots.erase(*options.slot) == 0 && options.remove) {
     throw ToolError(ExitCode::kUsage, Format("slot {} is not assigned", *options.slot),
                     "kral ports assign lists those that are");
   }
-  if (!options.remove) {
-    const auto wanted = PortName(options.name);
-    for (const auto& [slot, name] : slots) {
-      if (name == wanted) {
-        throw ToolError(ExitCode::kUsage, Format("{} is slot {} already", name, slot),
-                        Format("kral ports assign {} --remove takes it away from there", slot));
-      }
+  if (options.remove) return;
+  const auto wanted = PortName(options.name);
+  for (const auto& [slot, name] : slots) {
+    if (name == wanted) {
+      throw ToolError(ExitCode::kUsage, Format("{} is slot {} already", name, slot),
+                      Format("kral ports assign {} --remove takes it away from there", slot));
     }
-    slots[*options.slot] = wanted;
   }
-  WriteSlots(slots);
-  ShowSlots(context, slots);
+  slots[*options.slot] = wanted;
+}
+
+void Assign(const Context& context, const PortOptions& options) {
+  if (options.slot || options.remove) {
+    if (options.name.empty() != options.remove || !options.slot) {
+      throw ToolError(ExitCode::kUsage, "a slot is assigned to a port, or removed",
+                      "kral ports assign 3 usb:1-4.2, or kral ports assign 3 --remove");
+    }
+    ChangeSlots([&](auto& slots) { Change(slots, options); });
+  }
+  ShowSlots(context, ReadSlots());
 }
 
 }  // namespace

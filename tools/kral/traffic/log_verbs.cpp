@@ -449,6 +449,7 @@ void AddLogVerbs(const Command& root, Context& context) {
   stats.NeedsNoHandset([options] { return !options->file.empty(); });
   stats.Add("file", options->file, "A capture file; default: the handset");
   stats.Add("--html", options->page, "Write a page with a timeline of packets by code to this file").File();
+  stats.Writes([options] { return std::vector<std::string>{options->page}; });
   stats.Add("--names", options->names, "Table of log names");
   options->limit.AddTo(stats, "packets");
   run(stats, Statistics);
