@@ -75,11 +75,12 @@ struct VerbsOf {
 };
 
 constexpr VerbsOf kVerbs[] = {
-    {"ports", AddPortVerbs},    {"doctor", AddDoctorVerbs},    {"info", AddInfoVerbs},   {"mode", AddModeVerbs},
-    {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},          {"log", AddLogVerbs},     {"event", AddEventVerbs},
-    {"nv", AddNvVerbs},         {"flash boot", AddFlashVerbs}, {"nv", AddNvBackupVerbs}, {"flash boot", AddBootVerbs},
-    {"band", AddBandVerbs},     {"raw", AddRawVerbs},          {"sim", AddSimVerbs},     {"cmd", AddCmdVerbs},
-    {"config", AddConfigVerbs}, {"completion", AddCompletionVerbs},
+    {"ports", AddPortVerbs},       {"doctor", AddDoctorVerbs}, {"info", AddInfoVerbs},
+    {"mode", AddModeVerbs},        {"fs", AddFsVerbs},         {"ftm", AddFtmVerbs},
+    {"log", AddLogVerbs},          {"event", AddEventVerbs},   {"nv", AddNvVerbs},
+    {"flash boot", AddFlashVerbs}, {"nv", AddNvBackupVerbs},   {"flash boot", AddBootVerbs},
+    {"band", AddBandVerbs},        {"raw", AddRawVerbs},       {"sim", AddSimVerbs},
+    {"cmd", AddCmdVerbs},          {"config", AddConfigVerbs}, {"completion", AddCompletionVerbs},
 };
 
 // Of one noun, or of all: a command line for each of many handsets costs time.
