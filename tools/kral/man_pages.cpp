@@ -4,12 +4,12 @@
 #include <algorithm>
 #include <array>
 #include <cctype>
-#include <filesystem>
-#include <fstream>
+#include <cstdint>
 #include <sstream>
 #include <string_view>
 
 #include "kral/kral.h"
+#include "platform/file_util.h"
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
 
@@ -187,20 +187,17 @@ std::string MainPage(const CommandText& program) {
   return page;
 }
 
-void Write(const std::filesystem::path& file, const std::string& page) {
-  std::ofstream output(file, std::ios::binary);
-  output << page;
-  output.close();
-  if (!output) throw ToolError(ExitCode::kBadFile, Format("{} cannot be written", file.string()), "");
+void Write(const std::string& file, const std::string& page) {
+  const auto error = ReplaceWholeFile(file, {reinterpret_cast<const std::uint8_t*>(page.data()), page.size()});
+  if (error) throw ToolError(ExitCode::kBadFile, Format("{} cannot be written: {}", file, error.message()), "");
 }
 
 }  // namespace
 
 void WriteManPages(const CommandText& program, const std::string& folder) {
-  const std::filesystem::path directory(folder);
-  Write(directory / (program.name + ".1"), MainPage(program));
+  Write(Format("{}/{}.1", folder, program.name), MainPage(program));
   for (const auto& noun : program.verbs) {
-    Write(directory / Format("{}-{}.1", program.name, noun.name), PageOf(noun));
+    Write(Format("{}/{}-{}.1", folder, program.name, noun.name), PageOf(noun));
   }
 }
 
