@@ -110,9 +110,10 @@ def page_of(target: str, anchor: str) -> str:
         return "@ref python_package" if path.parent.name == "python" else "index.html"
     if path.suffix == ".md":
         return f"@ref {path.stem}-{anchor}" if anchor else f"@ref {path.stem}_page"
-    if path.suffix == ".h" or "examples" in path.parts:
-        escaped = path.name.replace("_", "__").replace(".", "_8")
-        return escaped + (".html" if path.suffix == ".h" else "-example.html") if path.suffix in (".h", ".c") else ""
+    if path.suffix == ".h":
+        return path.name.replace("_", "__").replace(".", "_8") + ".html"
+    if path.suffix == ".c" and "examples" in path.parts:
+        return path.name.replace(".", "_8") + "-example.html"
     return ""
 
 
