@@ -1,4 +1,5 @@
-// Folders of the PC: what is in them, and making them. Names are bytes as the system's file functions take them.
+// Folders of the PC: what is in them, making them, and removing files. Names are bytes as the system's file functions
+// take them.
 #ifndef KRAL_PLATFORM_FOLDER_H
 #define KRAL_PLATFORM_FOLDER_H
 
@@ -29,6 +30,8 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
 
 // A folder that is there already is no error.
 std::error_code MakeFolder(const std::string& path);
+
+std::error_code RemoveFile(const std::string& path);
 
 // '/' goes between them, which both platforms understand.
 std::string JoinPath(const std::string& folder, const std::string& name);

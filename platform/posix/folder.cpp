@@ -3,6 +3,7 @@
 
 #include <dirent.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -45,6 +46,10 @@ std::error_code MakeFolder(const std::string& path) {
   if (::mkdir(path.c_str(), 0777) == 0) return {};
   const auto error = LastError();
   return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
+}
+
+std::error_code RemoveFile(const std::string& path) {
+  return ::unlink(path.c_str()) == 0 ? std::error_code() : LastError();
 }
 
 }  // namespace kral

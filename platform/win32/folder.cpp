@@ -56,4 +56,8 @@ std::error_code MakeFolder(const std::string& path) {
   return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
 }
 
+std::error_code RemoveFile(const std::string& path) {
+  return ::DeleteFileW(WidePath(path).c_str()) ? std::error_code() : LastError();
+}
+
 }  // namespace kral

@@ -51,6 +51,9 @@ TEST(Folder, NamesAreUtf8) {
   EXPECT_FALSE(ListFolder(folder, entries));
   ASSERT_EQ(entries.size(), 1u);
   EXPECT_EQ(entries[0].name, name);
+  EXPECT_FALSE(RemoveFile(file));
+  EXPECT_EQ(LookAt(file).kind, LocalKind::kMissing);
+  EXPECT_TRUE(RemoveFile(file));
 }
 
 TEST(Folder, PathsMayBeLong) {

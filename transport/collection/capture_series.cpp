@@ -68,7 +68,7 @@ CaptureSink OpenNext(const SeriesName& name, uint32_t keep) {
   const size_t left = keep == 0 ? numbers.size() : std::min<size_t>(numbers.size(), keep - 1);
   for (size_t i = 0; i < numbers.size() - left; ++i) {
     const auto path = name.Path(numbers[i]);
-    if (!IsInUse(path)) std::remove(path.c_str());  // one that is being played goes another time
+    if (!IsInUse(path)) RemoveFile(path);  // one that is being played goes another time
   }
   return OpenCaptureFile(name.Path(last + 1));
 }
