@@ -53,8 +53,9 @@ if(WIN32)
     add_compile_options(-msse2 -mfpmath=sse -mstackrealign)
   endif()
   add_compile_definitions(_WIN32_WINNT=0x0601 WIN32_LEAN_AND_MEAN NOMINMAX __USE_MINGW_ANSI_STDIO=1)
-  # The runtimes are linked in: every program and the DLL are one file. They do not tell when they were linked.
-  add_link_options(-static -Wl,--no-insert-timestamp)
+  # The runtimes are linked in: every program and the DLL are one file. They do not tell when they were linked; strip
+  # would put that back, so what is delivered leaves the linker without symbols.
+  add_link_options(-static -Wl,--no-insert-timestamp $<$<CONFIG:Release>:-s>)
 else()
   set(KRAL_PLATFORM posix)
 endif()

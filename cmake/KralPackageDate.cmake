@@ -8,3 +8,5 @@ if(NOT DEFINED ENV{SOURCE_DATE_EPOCH})
   endif()
   set(ENV{SOURCE_DATE_EPOCH} ${date})
 endif()
+# A zip has dates of no time zone, as they are where it is made.
+set(ENV{TZ} UTC)
