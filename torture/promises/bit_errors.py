@@ -29,9 +29,8 @@ PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 4
 _TIME_OUT_MS = 150
 _RATES = {"1e-6": 1e-6, "1e-5": 1e-5}
-_BYTES = 8 << 20
-_BYTES_WINDOWS = 1 << 20
-_BYTES_SHORT = 1 << 19
+# By whether the library is in this process, and whether the run is a short one.
+_BYTES = {(True, False): 8 << 20, (True, True): 1 << 19, (False, False): 1 << 20, (False, True): 1 << 17}
 _FILE = 200000
 _READ_SIZE, _WRITE_SIZE = 4091, 4091
 # Blocks whose check covers them whole, and the writes that may be under way.
@@ -165,8 +164,7 @@ def run(bench: Bench, case: str) -> None:
         operation()  # over a good line: what is compared later
         noise.set_rate(_RATES[rate])
         # Items go in small packets, a millisecond or more each.
-        whole = _BYTES if bench.driver is None else _BYTES_WINDOWS
-        goal = (_BYTES_SHORT if bench.short else whole) // (1 if what in ("read", "write", "flash") else 20)
+        goal = _BYTES[bench.driver is None, bench.short] // (1 if what in ("read", "write", "flash") else 20)
         while noise.bytes < goal:
             bench.count("good" if operation() else "failed")
         bench.count("bytes", noise.bytes)
