@@ -67,6 +67,9 @@ SessionOptions ForIdentity(SessionOptions options, std::uint16_t port, std::size
     if (own == *file || own.find('{') != std::string::npos) own.clear();
     *file = std::move(own);
   }
+  // That these are one file is told when the work is prepared.
+  const auto& log = options.log_file;
+  if (!log.empty() && (log == options.trace.file || log == options.trace.file_on_failure)) options.trace = {};
   return options;
 }
 
@@ -272,10 +275,6 @@ void ManyHandsets::RefuseSameFiles() const {
       }
       const auto [first, is_new] = writers.emplace(file, handset->verdict.port);
       if (is_new) continue;
-      if (first->second == handset->verdict.port) {
-        throw ToolError(ExitCode::kUsage, Format("kral {} would write {} twice", command_.line->verb(), file),
-                        "give each a file of its own");
-      }
       if (file == "-") {
         throw ToolError(ExitCode::kUsage, Format("kral {} writes to the standard output", command_.line->verb()),
                         "name a file with {port}, {serial}, {model} or {slot}");
