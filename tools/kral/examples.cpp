@@ -10,6 +10,7 @@ constexpr const char* kExamples[] = {
     "kral ports --probe",
     "kral ports assign 3 usb:1-4.2",
     "kral config",
+    "kral completion bash",
     "kral doctor",
     "kral -p 7 doctor --seconds 10",
     "kral -p slot:1-8 info --wait",
