@@ -8,6 +8,7 @@
 #include "frame/library_state.h"
 #include "frame/orbt_server.h"
 #include "frame/resource_manager.h"
+#include "platform/com_port_opener.h"
 #include "platform/forced_unwind.h"
 
 namespace kral {
@@ -70,7 +71,10 @@ std::shared_ptr<Diag_FTM> MakePhone(KRAL_HANDLE handle, uint16_t port) {
       const MutexLock lock(library.mutex);
       opener = library.device_opener;
     }
+    const ComPortOpener com_ports;
+    if (!opener) opener = com_ports;
     phone = std::make_shared<Diag_FTM>(port, SystemClock(), std::move(opener));
+    phone->state<ComPortOpener>() = com_ports;
     phone->SetReceiveMode(Kral_ResourceManager::default_receive_mode());
   }
   phone->SetTargetType(Kral_ResourceManager::target_type());

@@ -6,6 +6,7 @@
 #include "frame/diag_ftm_parts.h"
 #include "frame/orbt_server.h"
 #include "frame/request_failure.h"
+#include "platform/com_port_opener.h"
 #include "platform/forced_unwind.h"
 
 namespace kral {
@@ -26,6 +27,7 @@ bool Diag_FTM::OpenPort(const OpenArguments& arguments) {
   ++connects_;
   user_ = arguments.user;
   GiveBackPort();
+  state<ComPortOpener>().Forget();
   return Open(arguments) || Fail(PortFailure(*this));
 }
 

@@ -48,7 +48,7 @@ struct LibraryState {
   std::array<Context, Kral_ResourceManager::kContextCount> contexts KRAL_GUARDED_BY(mutex);
   std::shared_ptr<OrbtServer> port_info KRAL_GUARDED_BY(mutex);
   std::vector<std::pair<uint16_t, uint16_t>> aliases KRAL_GUARDED_BY(mutex);  // logical, physical
-  DeviceOpener device_opener KRAL_GUARDED_BY(mutex) = OpenComPort;
+  DeviceOpener device_opener KRAL_GUARDED_BY(mutex);                          // empty: the COM ports of the machine
   Kral_ResourceManager::PortLister port_lister KRAL_GUARDED_BY(mutex) = ListComPorts;
   Kral_ResourceManager::MutexMaker mutex_maker KRAL_GUARDED_BY(mutex) = CreateNamedMutex;
   ServerFactory server_factory KRAL_GUARDED_BY(mutex);

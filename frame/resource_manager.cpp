@@ -151,7 +151,7 @@ void SetDefaultReceiveMode(ReceiveMode mode) {
 void SetDeviceOpener(DeviceOpener opener) {
   auto& library = Library();
   const MutexLock lock(library.mutex);
-  library.device_opener = opener ? std::move(opener) : DeviceOpener(OpenComPort);
+  library.device_opener = std::move(opener);
 }
 
 void SetPortLister(PortLister lister) {

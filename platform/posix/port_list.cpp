@@ -21,6 +21,11 @@ namespace fs = std::filesystem;
 
 constexpr int kLastComNumber = 255;
 
+// Places of a number's names: its variable, the link folders from 1 on, the system's tty.
+constexpr uint32_t kVariablePlace = 0;
+constexpr uint32_t kFirstLinkPlace = 1;
+constexpr uint32_t kTtyPlace = UINT32_MAX - 1;
+
 struct TtyRange {
   std::string_view prefix;
   int first;  // COM number of device 0
@@ -130,12 +135,24 @@ bool ListComPorts(const PortSources& sources, std::vector<uint16_t>& ports) {
 }
 
 std::string ComPortDevice(const PortSources& sources, int number) {
+  uint32_t place = UINT32_MAX;
+  return ComPortDevice(sources, number, place);
+}
+
+std::string ComPortDevice(const PortSources& sources, int number, uint32_t& place) {
+  const uint32_t last = place;
+  place = kVariablePlace;
   if (const auto named = sources.variables.find(number); named != sources.variables.end()) return named->second;
+  place = kFirstLinkPlace;
   for (const fs::path& folder : sources.link_folders) {
+    if (place > last) return {};
     const auto link = folder / ("com" + std::to_string(number));
     std::error_code error;
     if (fs::exists(fs::symlink_status(link, error))) return link.string();
+    ++place;
   }
+  place = kTtyPlace;
+  if (place > last) return {};
   for (const TtyRange& range : kTtyRanges) {
     if (number < range.first || number > range.last) continue;
     return "/dev/" + std::string(range.prefix) + std::to_string(number - range.first);

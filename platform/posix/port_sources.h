@@ -24,6 +24,9 @@ PortSources CurrentPortSources();
 
 bool ListComPorts(const PortSources& sources, std::vector<uint16_t>& ports);
 std::string ComPortDevice(const PortSources& sources, int number);
+// The same, but of the names of a number only the first ones count: `place` is that of the last, and becomes that of
+// the name that was found. Empty when none of them is there.
+std::string ComPortDevice(const PortSources& sources, int number, uint32_t& place);
 PortInfo DescribeComPort(const PortSources& sources, int number);
 
 }  // namespace kral

@@ -17,10 +17,11 @@
 #include <system_error>
 #include <thread>
 
-#include "platform/port_list.h"
+#include "platform/com_port_opener.h"
 #include "platform/posix/file_descriptor.h"
 #include "platform/posix/line_settings.h"
 #include "platform/posix/poll_wait.h"
+#include "platform/posix/port_sources.h"
 
 namespace kral {
 namespace {
@@ -198,14 +199,11 @@ int HoldExclusively(int fd) {
   return 0;
 }
 
-}  // namespace
-
-std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
+std::unique_ptr<SerialDevice> OpenTty(const std::string& path, DeviceResult& result) {
   const auto fail = [&result](DeviceResult reason) {
     result = std::move(reason);
     return nullptr;
   };
-  const std::string path = ComPortDevice(number);
   if (path.empty()) return fail(Failure(ENOENT));
   FileDescriptor fd(::open(path.c_str(), O_RDWR | O_NOCTTY | O_NONBLOCK | O_CLOEXEC));
   if (!fd.valid()) return fail(Failure(errno));
@@ -219,6 +217,20 @@ std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
   }
   result = {};
   return std::make_unique<Tty>(std::move(fd), std::move(wake));
+}
+
+}  // namespace
+
+std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
+  return ComPortOpener()(number, result);
+}
+
+std::unique_ptr<SerialDevice> ComPortOpener::operator()(int number, DeviceResult& result) const {
+  uint32_t place = *last_place_;
+  const std::string path = ComPortDevice(CurrentPortSources(), number, place);
+  auto device = OpenTty(path, result);
+  if (device) *last_place_ = place;
+  return device;
 }
 
 }  // namespace kral

@@ -8,6 +8,7 @@
 #include <atomic>
 #include <chrono>
 
+#include "platform/com_port_opener.h"
 #include "platform/port_list.h"
 #include "platform/win32/line_settings.h"
 #include "platform/win32/pending_read.h"
@@ -257,6 +258,10 @@ std::unique_ptr<SerialDevice> OpenComPort(int number, DeviceResult& result) {
   }
   result = {};
   return std::make_unique<ComPort>(std::move(file), std::move(read_event), std::move(write_event), std::move(wake));
+}
+
+std::unique_ptr<SerialDevice> ComPortOpener::operator()(int number, DeviceResult& result) const {
+  return OpenComPort(number, result);
 }
 
 }  // namespace kral

@@ -95,8 +95,18 @@ TEST_F(PortListTest, TheFirstNameOfANumberWins) {
   EXPECT_EQ(ComPortDevice(sources_, 1), folder_.Path("second/com1"));
   AddLink("first/com1");
   EXPECT_EQ(ComPortDevice(sources_, 1), folder_.Path("first/com1"));
+  uint32_t link_place = UINT32_MAX;
+  EXPECT_EQ(ComPortDevice(sources_, 1, link_place), folder_.Path("first/com1"));
   sources_.variables = {{1, "/dev/pts/7"}};
   EXPECT_EQ(ComPortDevice(sources_, 1), "/dev/pts/7");
+
+  // For who opens it again: by a name in front, and by none behind.
+  uint32_t place = link_place;
+  EXPECT_EQ(ComPortDevice(sources_, 1, place), "/dev/pts/7");
+  sources_.variables.clear();
+  EXPECT_EQ(ComPortDevice(sources_, 1, place), "");
+  fs::remove(folder_.Path("first/com1"));
+  EXPECT_EQ(ComPortDevice(sources_, 1, link_place), "") << "neither the other link, nor the system's port";
 }
 
 // --- What is known of a port -----------------------------------------------------------------------------------------
