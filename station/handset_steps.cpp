@@ -141,7 +141,7 @@ bool HandsetWorker::Restart() {
 
 bool HandsetWorker::SetMode(uint32_t mode) {
   if (!diag::ControlMode(phone_, static_cast<uint16_t>(mode))) return false;
-  return mode != KRAL_MODE_RESET || InTime(AwaitDiagnostics(options_.start_ms));
+  return mode != KRAL_MODE_RESET || (InTime(AwaitDiagnostics(options_.start_ms)) && IsSameHandset());
 }
 
 // With a request that every handset knows, or refuses: it answers either way. The first tries are short, for one that

@@ -2,8 +2,14 @@
 #include "station/handset_worker.h"
 
 #include <algorithm>
+#include <array>
+#include <cstdio>
 #include <mutex>
+#include <string>
 
+#include "base/little_endian.h"
+#include "commands/core/core_diag.h"
+#include "commands/nv/nv_item.h"
 #include "download/download_client.h"
 #include "download/link/download_settings.h"
 #include "frame/request_failure.h"
@@ -53,7 +59,7 @@ bool HandsetWorker::RunStep(const Step& step) {
       const Attempt attempt(phone_, handset_, options_.command_ms);
       if (!stopped() && lost) recovered = Recover(step);
       if (lost && recovered && !stopped()) handset_.EndReturn();
-      if (!stopped() && recovered) done = Do(step);
+      if (!stopped() && recovered) done = IsThere(step) && Do(step);
     }
     failure_ = nullptr;
     if (done && !stopped()) return true;
@@ -75,8 +81,9 @@ bool HandsetWorker::Recover(const Step& step) {
   if (!AwaitPort()) return false;
   switch (step.kind) {
     case StepKind::kEnterLoader:
+      return !IsStillInDiagnostics() || IsSameHandset();
     case StepKind::kReset:
-      return true;  // they may have been carried out: what they wait for tells
+      return true;  // it may have been carried out: what it waits for tells
     case StepKind::kProgrammer:
       if (programmer_started_ || step.number == KRAL_VENTRIMS_PROGRAMMER_BOOT) return true;
       return download::KovaNop(phone_) ||
@@ -85,8 +92,56 @@ bool HandsetWorker::Recover(const Step& step) {
     case StepKind::kImage:
       return GreetAgain();
     default:
-      return AwaitDiagnostics(options_.return_ms);
+      return AwaitDiagnostics(options_.return_ms) && IsSameHandset();
   }
+}
+
+// It may have been carried out already, and is waited for then. A loader takes the question for noise; a boot loader
+// would take it for a packet of its own, and is not asked.
+bool HandsetWorker::IsStillInDiagnostics() {
+  const bool has_boot_programmer = std::ranges::any_of(plan_, [](const Step& step) {
+    return step.kind == StepKind::kProgrammer && step.number == KRAL_VENTRIMS_PROGRAMMER_BOOT;
+  });
+  const KeepFailure keep;
+  return !has_boot_programmer && phone_.IsPhoneConnected();
+}
+
+// The next request would open the port again, whatever is on it by then. Where a download goes on, the handset says
+// hello; in front of one its going is a part of the way.
+bool HandsetWorker::IsThere(const Step& step) {
+  const bool in_diagnostics = step.kind == StepKind::kIdentity || step.kind == StepKind::kMode ||
+                              step.kind == StepKind::kRestore || step.kind == StepKind::kVerify;
+  return !in_diagnostics || !phone_.device_gone() || Fail(PortFailure(phone_));
+}
+
+// Whatever has been put into the socket while the cable was out answers like the handset that was there.
+bool HandsetWorker::IsSameHandset() {
+  const std::string known = handset_.progress().serial;
+  if (known.empty()) return true;
+  uint32_t serial = 0;
+  bool told = false;
+  const auto answers = [&] {
+    told = diag::ReadSerialNumber(phone_, &serial);
+    return told || failure_->record().code == KRAL_ERROR_REFUSED;
+  };
+  if (!Await(options_.return_ms, answers)) return false;
+  if (!told)
+    return Fail(Failure(KRAL_ERROR_LOST, "what came back on COM%d does not tell its serial number: it was %s",
+                        phone_.port(), known.c_str()));
+  return MayHaveSerial(serial) || Fail(Failure(KRAL_ERROR_LOST, "another handset came back on COM%d: %08X, not %s",
+                                               phone_.port(), static_cast<unsigned>(serial), known.c_str()));
+}
+
+// The one that it told, or one that the job itself writes.
+bool HandsetWorker::MayHaveSerial(uint32_t serial) const {
+  std::array<char, 16> text{};
+  std::snprintf(text.data(), text.size(), "%08X", static_cast<unsigned>(serial));
+  const auto writes_it = [serial](const pkv::PkvNvItem& item) {
+    return item.id == nv::kEsnItem && item.subscription == 0 && LoadLe<uint32_t>(item.data) == serial;
+  };
+  return std::string(text.data()) == handset_.progress().serial || std::ranges::any_of(plan_, [&](const Step& step) {
+           return step.kind == StepKind::kRestore && std::ranges::any_of(step.set->items, writes_it);
+         });
 }
 
 bool HandsetWorker::GreetAgain() {

@@ -27,6 +27,7 @@ class HandsetWorker {
   // These two under the request lock, inside an Attempt.
   bool Do(const Step& step);
   bool Recover(const Step& step);  // false with the failure noted: what was lost cannot go on
+  bool IsThere(const Step& step);  // false with the failure noted: it went away between two steps
 
   bool ReadIdentity(bool whole);
   bool EnterLoader();
@@ -39,6 +40,9 @@ class HandsetWorker {
   bool SetMode(uint32_t mode);
 
   bool AwaitPort();
+  bool IsStillInDiagnostics();
+  bool IsSameHandset();
+  bool MayHaveSerial(uint32_t serial) const;
   bool AwaitDiagnostics(uint32_t within_ms);
   bool AwaitLoader(uint32_t within_ms);
   bool Await(uint32_t within_ms, const std::function<bool()>& holds);  // false also when an abort ended it

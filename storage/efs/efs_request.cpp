@@ -139,7 +139,7 @@ Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, c
     // With a handset that is silent, an abort would otherwise wait for every try.
     if (attempt > 0 && IsAborted(phone, "request")) return ReplyKind::kAborted;
     reply = Checked(ExchangeOnce(phone, time_out_ms, is_own), [&] { return accepts(phone.packet().response()); });
-    if (reply) break;
+    if (reply || reply.kind() == ReplyKind::kGone) break;
   }
   return reply;
 }

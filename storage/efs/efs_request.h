@@ -34,8 +34,9 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
 bool IsWithinLimit(Diag_FTM& phone);
 // Sends once; handles that late replies tell of are closed besides.
 Reply ExchangeOnce(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own = {});
-// Sends until a reply of its own is accepted, at most so many times and not after an abort. Each try opens a port that
-// an earlier one's time-out has closed. Whoever does not accept a reply has noted why.
+// Sends until a reply of its own is accepted, at most so many times, and neither after an abort nor to a device that
+// went away: what is back by then may be another handset. Each try opens a port that an earlier one's time-out has
+// closed. Whoever does not accept a reply has noted why.
 Reply ExchangeUntil(Diag_FTM& phone, u32 time_out_ms, const ReplyTest& is_own, const ReplyTest& accepts,
                     int tries = kTries);
 

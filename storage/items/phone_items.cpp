@@ -27,9 +27,15 @@ std::vector<uint8_t> WireData(const pkv::PkvNvItem& item, bool element) {
 
 PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
   for (int i = 0; i < kTries; ++i) {
+    if (went_away()) {
+      Fail(PortFailure(phone_));
+      return Answer::kLost;
+    }
     const Reply reply = ask();
     refusal_ = reply.refusal();
+    has_answered_ = has_answered_ || reply.came();
     if (reply) return Answer::kAnswered;
+    if (reply.kind() == ReplyKind::kGone) return Answer::kLost;
     if (refusal_ != 0) return Answer::kRefused;
     if (aborts_.aborted()) return Answer::kLost;
   }
@@ -38,6 +44,7 @@ PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
 
 // One request that gets no answer, or is too long to be sent, does not end the work with a handset that is there.
 PhoneItems::Answer PhoneItems::Unanswered() {
+  if (went_away()) return Answer::kLost;
   const KeepFailure keep;  // the request that failed, rather than the check
   return phone_.IsPhoneConnected() ? Answer::kRefused : Answer::kLost;
 }

@@ -1,5 +1,6 @@
 // Single items and files on the handset, as backups need them: every request is tried again, and the late answer to an
-// earlier request is never taken for this one's.
+// earlier request is never taken for this one's. A device that went away is not opened again: what is back by then may
+// be another handset, and half of the work would be done on each.
 #ifndef KRAL_STORAGE_ITEMS_PHONE_ITEMS_H
 #define KRAL_STORAGE_ITEMS_PHONE_ITEMS_H
 
@@ -22,7 +23,7 @@ class PhoneItems {
   enum class Answer {
     kAnswered,  // with a status
     kRefused,   // or passed over in silence, or never sent: no status, but the handset is there
-    kLost,      // no answer, in spite of all tries or until an abort
+    kLost,      // no answer, in spite of all tries or until an abort; or the device went away
   };
   static constexpr uint32_t kRefusedStatus = 0xFFFF;
   // As many full items as one packet of a batch takes.
@@ -69,6 +70,7 @@ class PhoneItems {
  private:
   Answer Try(const std::function<Reply()>& ask);
   Answer Unanswered();
+  bool went_away() const { return has_answered_ && phone_.device_gone(); }
   Answer Walk(const std::string& path, int depth, std::vector<FoundFile>& files, std::vector<UnlistedFolder>& unlisted);
   void TellUnlisted(const std::string& folder, uint32_t status, std::vector<UnlistedFolder>& unlisted);
   bool List(const std::string& folder, std::vector<KRAL_EFS_ENTRY>& entries);
@@ -81,8 +83,9 @@ class PhoneItems {
   Diag_FTM& phone_;
   const Diag_FTM::Resynchronising resynchronising_{phone_};  // replies to item requests do not name their file
   const efs::AbortWatch aborts_;
-  size_t walked_ = 0;                           // folders and what is listed as one
-  uint8_t refusal_ = 0;                         // the code of the last Try that was refused
+  size_t walked_ = 0;    // folders and what is listed as one
+  uint8_t refusal_ = 0;  // the code of the last Try that was refused
+  bool has_answered_ = false;
   std::set<std::string, std::less<>> folders_;  // that were made, or were there
 };
 

@@ -120,6 +120,69 @@ TEST_F(JobMisfortune, ChangesNothingForTheOthers) {
   EXPECT_EQ(state.failed, 3u);
 }
 
+// The cable comes back at the first try to open the port: nothing but the lost one tells of it.
+TEST_F(JobMisfortune, WhatComesBackInRestoreAndVerifyIsTheSameHandsetOrTheEndOfTheWork) {
+  struct Row {
+    const char* what;
+    bool restores;
+    bool between_steps;
+    uint32_t serial;  // of what comes back
+  };
+  constexpr uint32_t kPort = 11;
+  constexpr Row kRows[] = {{"restore", true, false, kPort},         {"verify", false, false, kPort},
+                           {"another in restore", true, false, 12}, {"another in verify", false, false, 12},
+                           {"between steps", true, true, kPort},    {"another between steps", true, true, 12}};
+  const std::string backup = AddBackup();
+  for (const Row& row : kRows) {
+    VirtualHandset& handset = AddSocket(kPort);
+    if (!row.restores) {
+      for (uint16_t id = 10; id < 40; ++id) handset.nv().Set(id, handset::Bytes{static_cast<uint8_t>(id)});
+    }
+    ports_.SetBeforeOpen([&](uint16_t) {
+      if (!handset.vanished()) return;
+      handset.nv().Set(handset::kSerialNumberItem, handset::ByteWriter().U32(row.serial).Take());
+      handset.PlugIn();
+    });
+    if (job_ == 0) job_ = KRAL_VENTRIMS_Create();
+    AddToJob(kPort);
+    SetOptions(0, 1);
+    ASSERT_EQ(
+        row.restores ? KRAL_VENTRIMS_AddRestore(job_, backup.c_str()) : KRAL_VENTRIMS_AddVerify(job_, backup.c_str()),
+        1);
+    if (row.between_steps) {
+      const auto at_the_second = [](KRAL_VENTRIMS_JOB job, uint32_t number, uintptr_t value) {
+        KRAL_VENTRIMS_PROGRESS progress{};
+        progress.size = sizeof progress;
+        KRAL_VENTRIMS_GetProgress(job, number, &progress);
+        if (progress.step == 1 && progress.step_done == 0 && progress.attempts == 1 &&
+            progress.state == KRAL_VENTRIMS_WORKING) {
+          reinterpret_cast<VirtualHandset*>(value)->HangUp();
+        }
+      };
+      KRAL_VENTRIMS_SetCallback(job_, at_the_second, reinterpret_cast<uintptr_t>(&handset));
+    } else {
+      handset.faults().Add(handset::HangUp(), When::Nth(6).Of("26"));  // behind five that tell of items
+    }
+    RunToEnd();
+    const KRAL_VENTRIMS_RESULT result = Result(0);
+    const bool same = row.serial == kPort;
+    EXPECT_EQ(result.passed, same ? 1u : 0u) << row.what << ": " << result.error.text;
+    if (same) {
+      EXPECT_EQ(result.progress.attempts, 2u) << row.what;
+    } else {
+      EXPECT_EQ(result.error.code, uint32_t{KRAL_ERROR_LOST}) << row.what << ": " << result.error.text;
+      EXPECT_STREQ(result.error.text, "another handset came back on COM11: 0000000C, not 0000000B") << row.what;
+    }
+    if (row.restores) {
+      EXPECT_EQ(handset.nv().Value(39).has_value(), same) << row.what;
+    }
+    EXPECT_STREQ(result.progress.serial, "0000000B") << row.what;
+    EXPECT_EQ(KRAL_VENTRIMS_Free(std::exchange(job_, 0)), 1);
+    ports_.SetBeforeOpen({});
+    ports_.Remove(kPort);
+  }
+}
+
 TEST_F(JobMisfortune, APortIsNotAwaitedForEver) {
   AddProgrammed(11).faults().Add(handset::HangUp(), Acknowledgement(5));
   AddToJob(11);

@@ -3,6 +3,7 @@
 #ifndef KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 #define KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 
+#include <functional>
 #include <set>
 
 #include "frame/resource_manager.h"
@@ -52,6 +53,11 @@ class HandsetPorts {
     const std::lock_guard lock(state_->mutex);
     state_->open.insert(port);
   }
+  // Called before a port is opened: who plugs in there comes back with the first try.
+  void SetBeforeOpen(std::function<void(uint16_t port)> call) {
+    const std::lock_guard lock(state_->mutex);
+    state_->before_open = std::move(call);
+  }
   void SetCanList(bool can) {
     const std::lock_guard lock(state_->mutex);
     state_->can_list = can;
@@ -79,6 +85,7 @@ class HandsetPorts {
     bool can_list = true;
     std::vector<uint16_t> opens;
     std::set<uint16_t> open;
+    std::function<void(uint16_t)> before_open;
   };
 
   class Device final : public FakeDevice {
@@ -109,6 +116,7 @@ class HandsetPorts {
   static std::unique_ptr<SerialDevice> Open(const std::shared_ptr<State>& state, int number, DeviceResult& result) {
     const auto port = static_cast<uint16_t>(number);
     const std::lock_guard lock(state->mutex);
+    if (state->before_open) state->before_open(port);
     state->opens.push_back(port);
     const auto found = state->handsets.find(port);
     if (found == state->handsets.end()) {
