@@ -1,17 +1,25 @@
 // Export of what is known of a port. It stands here and not with the other port functions because those who answer on a
 // port include the loaders.
 #include <algorithm>
+#include <chrono>
+#include <mutex>
 #include <span>
 #include <string>
+#include <thread>
 
 #include "base/at_exit.h"
 #include "download/port_question.h"
 #include "frame/export_call.h"
+#include "frame/phone_claim.h"
 #include "frame/port_state.h"
 #include "kral/connection.h"
 #include "platform/port_info.h"
 
 namespace {
+
+// Longer than a request takes, and not felt.
+constexpr std::chrono::milliseconds kBusyWait{300};
+constexpr std::chrono::milliseconds kLookAgain{5};
 
 using kral::Fail;
 using kral::Failure;
@@ -43,6 +51,18 @@ uint32_t StateOf(const kral::PortInfo& port) {
   }
 }
 
+// At once where a job works on the handset, between its steps as well: what is asked there is no part of them. False
+// also when something else keeps the connection busy.
+bool LockToAsk(kral::Diag_FTM& phone, std::unique_lock<std::recursive_mutex>& lock) {
+  const auto end = std::chrono::steady_clock::now() + kBusyWait;
+  const auto& job = phone.state<kral::PhoneClaim>().job;
+  while (job == 0 && !lock.try_lock()) {
+    if (std::chrono::steady_clock::now() >= end) return false;
+    std::this_thread::sleep_for(kLookAgain);
+  }
+  return job == 0;
+}
+
 // In a context of its own, or in that of whoever is connected to the port.
 bool Ask(uint16_t port, KRAL_PORT_INFO& info) {
   const KRAL_HANDLE handle = table::CreateContext(port);
@@ -50,7 +70,11 @@ bool Ask(uint16_t port, KRAL_PORT_INFO& info) {
   const kral::AtExit asked([handle] { table::ReleaseContext(handle, false); });
   const auto phone = table::GetPhone(handle);
   if (!phone) return Fail(Failure(KRAL_ERROR_NO_PORT, "there is no phone server"));
-  const std::lock_guard lock(phone->request_lock());
+  std::unique_lock lock(phone->request_lock(), std::defer_lock);
+  if (!LockToAsk(*phone, lock)) {
+    info.state = KRAL_PORT_OPEN;
+    return true;
+  }
   const bool was_open = phone->connected() || phone->port_borrowed();
   info.answers = kral::AskPort(*phone);
   const auto state = static_cast<uint32_t>(kral::PortState(*phone));

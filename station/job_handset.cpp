@@ -6,6 +6,7 @@
 
 #include "base/failure.h"
 #include "download/download_client.h"
+#include "frame/phone_claim.h"
 #include "frame/resource_manager.h"
 #include "storage/efs/efs_client.h"
 
@@ -169,7 +170,7 @@ void JobHandset::EndLocked(uint32_t state, const KRAL_ERROR* error) {
   if (error != nullptr) error_ = *error;
   std::snprintf(error_.function, sizeof error_.function, "%s", error == nullptr ? "" : "KRAL_VENTRIMS_Start");
   // Here, so that who sees the end may start another job with it.
-  phone_->state<Claim>().job = 0;
+  phone_->state<PhoneClaim>().job = 0;
 }
 
 void JobHandset::Tell() const {

@@ -15,11 +15,6 @@
 
 namespace kral::station {
 
-// Which job works on a handset, kept with its phone object.
-struct Claim {
-  std::atomic<uint32_t> job{0};
-};
-
 // For any thread.
 class JobHandset {
  public:

@@ -6,6 +6,7 @@
 #include "base/at_exit.h"
 #include "base/failure.h"
 #include "base/guarded_call.h"
+#include "frame/phone_claim.h"
 #include "frame/request_failure.h"
 #include "station/handset_worker.h"
 #include "station/job.h"
@@ -89,7 +90,7 @@ bool Job::LookAtFiles() {
 bool Job::Claim() {
   for (const auto& handset : handsets_) {
     uint32_t nobody = 0;
-    if (handset->phone().state<station::Claim>().job.compare_exchange_strong(nobody, handle_)) continue;
+    if (handset->phone().state<PhoneClaim>().job.compare_exchange_strong(nobody, handle_)) continue;
     return Fail(Failure(KRAL_ERROR_ARGUMENT, "COM%d is worked on by another job", handset->phone().port()));
   }
   return true;
@@ -98,7 +99,7 @@ bool Job::Claim() {
 void Job::Unclaim() {
   for (const auto& handset : handsets_) {
     uint32_t own = handle_;
-    handset->phone().state<station::Claim>().job.compare_exchange_strong(own, 0);
+    handset->phone().state<PhoneClaim>().job.compare_exchange_strong(own, 0);
   }
 }
 

@@ -228,6 +228,11 @@ TEST_F(JobMisfortune, AnAbortEndsWhateverIsUnderWay) {
   ASSERT_EQ(KRAL_VENTRIMS_Start(job_), 1) << Error().text;
   ASSERT_TRUE(Soon([this] { return Progress(0).bytes_done > 0; }));
   EXPECT_EQ(KRAL_VENTRIMS_Wait(job_, 0), 0);
+  KRAL_PORT_INFO info{};
+  EXPECT_EQ(KRAL_GetPortInfo(11, 1, &info), 1);
+  EXPECT_EQ(info.answers, uint32_t{KRAL_ANSWERS_NOT_ASKED}) << "asked behind the step, or in between";
+  EXPECT_EQ(info.state, uint32_t{KRAL_PORT_OPEN});
+  EXPECT_FALSE(HasEnded(0)) << "the step was waited for";
   EXPECT_EQ(KRAL_VENTRIMS_Abort(job_, 1), 1);
   EXPECT_EQ(Result(1).progress.state, KRAL_VENTRIMS_ABORTED) << "at once: it had not begun";
   EXPECT_EQ(KRAL_VENTRIMS_Abort(job_, 0), 1);
