@@ -78,6 +78,8 @@ bool Ask(uint16_t port, KRAL_PORT_INFO& info) {
   const bool was_open = phone->connected() || phone->port_borrowed();
   info.answers = kral::AskPort(*phone);
   const auto state = static_cast<uint32_t>(kral::PortState(*phone));
+  // Busy, and with this process: its device has another number besides, and is open under that.
+  if (state == KRAL_PORT_BUSY && info.state == KRAL_PORT_OPEN) return true;
   info.state = state == KRAL_PORT_OPEN && !was_open ? KRAL_PORT_CLOSED : state;
   return true;
 }

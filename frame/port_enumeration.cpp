@@ -32,7 +32,7 @@ bool ListMachinePorts(std::vector<uint16_t>& ports) {
 }
 
 // The proxy that answers for ports rather than for a handset; made on first use, kept until all is disconnected.
-std::shared_ptr<OrbtServer> PortInfo() {
+std::shared_ptr<OrbtServer> PortInfoServer() {
   auto& library = Library();
   const MutexLock building(library.build_mutex);
   {
@@ -49,7 +49,7 @@ bool CopyServerPorts(std::vector<std::string> (OrbtServer::*list)(), std::span<u
   count = 0;
   std::vector<std::string> names;
   try {
-    const auto server = PortInfo();
+    const auto server = PortInfoServer();
     if (server) names = (*server.*list)();
   } catch (...) {
     PassForcedUnwind();

@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "frame/diag_ftm.h"
+#include "platform/port_info.h"
 
 namespace kral {
 namespace {
@@ -87,6 +88,10 @@ Failure PortFailure(Diag_FTM& phone) {
     case DeviceError::kNoSuchPort:
       return Failure(KRAL_ERROR_NO_PORT, "there is no port COM%d", port).System(system);
     case DeviceError::kBusy:
+      // Under another number of the same device.
+      if (DescribeComPort(port).obstacle == PortObstacle::kInUseHere)
+        return Failure(KRAL_ERROR_PORT_IN_USE, "the device of COM%d is open in this program already", port)
+            .System(system);
       return Failure(KRAL_ERROR_PORT_IN_USE, "COM%d is in use by another program", port).System(system);
     case DeviceError::kNotPermitted:
       return Failure(KRAL_ERROR_PORT_IN_USE, "COM%d may not be opened by this user", port).System(system);

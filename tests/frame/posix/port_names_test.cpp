@@ -1,4 +1,4 @@
-// Numbers of ports that lead to other devices meanwhile: handsets on pseudo terminals.
+// Numbers of ports that lead to other devices meanwhile, or to the same one: handsets on pseudo terminals.
 #include "handset/pty_cable.h"
 #include "handset/virtual_handset.h"
 #include "kral/kral.h"
@@ -12,6 +12,7 @@ namespace {
 
 constexpr uint16_t kNamedPort = 241;
 constexpr const char* kNameInFront = "KRAL_COM241";  // of the link
+constexpr uint16_t kSecondNumber = 242;
 
 class PortNames : public testing::Test {
  protected:
@@ -69,6 +70,23 @@ TEST_F(PortNames, ALostPortIsOpenedAgainByTheNameThatItHadAndByNoneBehindIt) {
   SetEnvironmentValue(kNameInFront, std::nullopt);
   EXPECT_EQ(KRAL_ConnectServer(kNamedPort), handle);
   EXPECT_EQ(SerialNumber(handle), 2u) << "a connect chooses anew";
+}
+
+TEST_F(PortNames, ASecondNumberOfADeviceIsNoOtherProgram) {
+  handset::VirtualHandset handset;
+  const auto cable = Attach(handset, 1, folder_.Path("com241"));
+  ASSERT_TRUE(cable);
+  std::filesystem::create_symlink(cable->device_path(), folder_.Path("com242"));
+  const KRAL_HANDLE handle = KRAL_ConnectServer(kNamedPort);
+  ASSERT_EQ(SerialNumber(handle), 1u);
+  KRAL_PORT_INFO info{};
+  EXPECT_EQ(KRAL_GetPortInfo(kSecondNumber, 1, &info), 1);
+  EXPECT_EQ(info.state, uint32_t{KRAL_PORT_OPEN});
+  EXPECT_EQ(info.answers, uint32_t{KRAL_ANSWERS_NOT_ASKED});
+  const KRAL_HANDLE second = KRAL_ConnectServer(kSecondNumber);
+  EXPECT_EQ(SerialNumber(second), 0u);
+  EXPECT_EQ(Error(second).code, uint32_t{KRAL_ERROR_PORT_IN_USE});
+  EXPECT_STREQ(Error(second).text, "the device of COM242 is open in this program already");
 }
 
 }  // namespace
