@@ -10,6 +10,10 @@
  *   another thread is running on the handset has ended. KRAL_GetAvailablePhonesPortList and a connect to KRAL_PORT_ANY
  *   close every connection of the process, those of other threads too; a handset that another thread connects meanwhile
  *   may find its port closed again, and opens it with its next request.
+ * - A port that is opened again, after a time-out or a lost cable, is the one that the connect opened. On Linux a
+ *   number has a row of names (variable, link, tty of the system): it is opened by the name that it had, wherever that
+ *   leads by then, or by one in front of it. Where only names behind it are left, the port is gone. On Windows the
+ *   number is the name. A connect chooses anew.
  * - Release every handle before the library is unloaded.
  */
 #ifndef KRAL_CONNECTION_H
@@ -278,6 +282,8 @@ typedef struct KRAL_PORT_INFO {
  * tells: on Linux users of this library always, other programs where this user may look into them; on Windows none.
  *
  * With `ask` a port that is free is opened and asked; one that this process has connected is asked on that connection.
+ * Where a job works on it, or a request takes longer than 300 ms, nobody is asked: the port is KRAL_PORT_OPEN. So is
+ * one whose device this process has open under another number.
  * A boot loader says its hello once, and loses it by this: power the handset off and on then. An addition to the given
  * interface.
  *

@@ -197,9 +197,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_VENTRIMS_Start(KRAL_VENTRIMS_JOB job);
 #define KRAL_VENTRIMS_ALL 0xFFFFFFFFu /**< every handset */
 
 /**
- * Ends the work on one handset or on all of them; one that has ended stays as it is. From any thread. A handset ends
- * within 250 ms, but for these: bytes that the port does not take (time-out 7), the 500 ms after a boot transfer, and a
- * callback.
+ * Ends the work on one handset or on all of them; one that has ended stays as it is. From any thread, and with any lock
+ * held: no callback comes on it. That of a handset which still waited comes when a thread of the job gets to it. A
+ * handset ends within 250 ms, but for these: bytes that the port does not take (time-out 7), the 500 ms after a boot
+ * transfer, and a callback.
  *
  * @return 0 for an unknown job or handset, and for a job that has not been started
  */
