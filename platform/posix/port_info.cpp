@@ -125,12 +125,27 @@ bool IsPseudoTerminal(const struct stat& device) {
   return kind >= kFirstTerminalSlave && kind <= kLastTerminalSlave;
 }
 
+// Whether a line of the table of terminal drivers, "usbserial /dev/ttyUSB 188 0-511 serial", is that of the device.
+bool IsDriverOf(const std::string& line, const struct stat& device) {
+  std::istringstream words(line);
+  std::string name, node, kind, minors;
+  words >> name >> node >> kind >> minors;
+  const size_t dash = minors.find('-');
+  const auto first = NumberIn<unsigned int>(std::string_view(minors).substr(0, dash), 10);
+  const auto last = dash == std::string::npos ? first : NumberIn<unsigned int>(minors.substr(dash + 1), 10);
+  return NumberIn<unsigned int>(kind, 10) == major(device.st_rdev) && first && last &&
+         minor(device.st_rdev) >= *first && minor(device.st_rdev) <= *last;
+}
+
 // A device, but no terminal, /dev/null for instance: as far as the system tells.
-bool IsOtherDevice(const struct stat& device) {
-  const auto numbers = std::to_string(major(device.st_rdev)) + ":" + std::to_string(minor(device.st_rdev));
-  std::error_code error;
-  const auto subsystem = fs::read_symlink(fs::path("/sys/dev/char") / numbers / "subsystem", error);
-  return !error && subsystem.filename() != "tty";
+bool IsOtherDevice(const fs::path& processes, const struct stat& device) {
+  if (IsPseudoTerminal(device)) return false;
+  std::ifstream drivers(processes / "tty" / "drivers");
+  bool tells = false;
+  for (std::string line; std::getline(drivers, line); tells = true) {
+    if (IsDriverOf(line, device)) return false;
+  }
+  return tells;
 }
 
 void FindHolder(const PortSources& sources, const struct stat& device, PortInfo& info) {
@@ -149,7 +164,7 @@ void FindObstacle(const PortSources& sources, PortInfo& info) {
     info.obstacle = errno == EACCES && !info.device.empty() ? PortObstacle::kNotPermitted : PortObstacle::kNotFound;
     return;
   }
-  if (!S_ISCHR(device.st_mode) || IsOtherDevice(device)) {
+  if (!S_ISCHR(device.st_mode) || IsOtherDevice(sources.processes, device)) {
     info.obstacle = PortObstacle::kNotFound;
     return;
   }

@@ -16,7 +16,7 @@ struct PortSources {
   std::map<int, std::string> variables;             // KRAL_COM<n>
   std::vector<std::filesystem::path> link_folders;  // with links com<n>, in the order they are searched
   std::filesystem::path tty_class;                  // one entry per tty of the system
-  std::filesystem::path processes;                  // one folder per process, and the table of locks
+  std::filesystem::path processes;                  // one folder per process, and the tables of locks and terminals
 };
 
 // What the environment of this process and the system say.

@@ -158,6 +158,16 @@ TEST_F(PortListTest, WhatStandsInTheWayOfAPortIsToldWithoutOpeningIt) {
   folder_.Add("processes/42/comm", "prober\n");
   EXPECT_EQ(obstacle("/dev/null"), PortObstacle::kInUse);
   EXPECT_EQ(DescribeComPort(sources_, 7).process_name, "prober");
+
+  // Whether it is a terminal, by the drivers of those: /dev/null is device 1:3.
+  fs::create_directories(folder_.Path("processes/tty"));
+  for (const auto& [drivers, is_terminal] :
+       {std::pair{"serial /dev/ttyS 4 64-111 serial\nmem /dev/x 1 4 serial\n", false},
+        {"mem /dev/x 1 0-4 serial\n", true},
+        {"mem /dev/x 1 3 serial\n", true}}) {
+    folder_.Add("processes/tty/drivers", drivers);
+    EXPECT_EQ(obstacle("/dev/null"), is_terminal ? PortObstacle::kInUse : PortObstacle::kNotFound) << drivers;
+  }
 }
 
 // Another program, by its lock: on a pseudo terminal the simulating side has a descriptor, too.
