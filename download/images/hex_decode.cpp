@@ -1,6 +1,7 @@
 // Intel HEX into an image. The first pass finds the base address, the second loads the data.
 #include <algorithm>
 #include <array>
+#include <iterator>
 #include <limits>
 #include <span>
 #include <string_view>
@@ -112,6 +113,7 @@ bool HexPhoneImageDecoder::LoadData(PhoneImage& image, LineReader& lines) {
 
   loss_ = {};
   beyond_.clear();
+  for (auto& ranges : written_) ranges.clear();
   Cursor cursor{kUnknown, 0, false};
   LineReader::Line line;
   while (lines.Next(line)) {
@@ -169,6 +171,7 @@ bool HexPhoneImageDecoder::LoadBytes(PhoneImage& image, const LineReader::Line& 
   const std::span<const uint8_t> record = CheckedBytes(line, length, bytes);
   if (record.empty()) return false;
   const uint32_t address = cursor.extended_base + ValueAt<uint16_t>(line.text, hex::kOffsetAt, 4);
+  Lose(CountReplaced(image, cursor.region, address, record.subspan(hex::kHeaderBytes, length)), line.number, true);
   image.Write(address, record.data() + hex::kHeaderBytes, length, cursor.region);
   // The first record of a region sets its size without its distance from the base, and sizes are compared modulo 2^32.
   const uint64_t end = uint64_t{address - image.GetBaseAddress(cursor.region)} + length;
@@ -176,12 +179,46 @@ bool HexPhoneImageDecoder::LoadBytes(PhoneImage& image, const LineReader::Line& 
   return true;
 }
 
-void HexPhoneImageDecoder::Lose(uint64_t bytes, uint64_t line) {
-  if (loss_.bytes == 0 && bytes != 0) loss_.line = line;
+// Bytes that an earlier record had written otherwise; notes that these are written now.
+uint64_t HexPhoneImageDecoder::CountReplaced(const PhoneImage& image, uint32_t region, uint32_t address,
+                                             std::span<const uint8_t> data) {
+  if (data.empty()) return 0;
+  const uint64_t begin = address - image.GetBaseAddress(region);
+  const uint64_t end = begin + data.size();
+  auto& ranges = written_[region];
+  auto range = ranges.upper_bound(begin);
+  if (range != ranges.begin() && std::prev(range)->second >= begin) {
+    --range;
+  } else {
+    range = ranges.emplace_hint(range, begin, begin);
+  }
+  uint64_t replaced = 0;
+  for (auto next = range; next != ranges.end() && next->first <= end;) {
+    const uint64_t first = std::max(begin, next->first);
+    const uint64_t last = std::min(end, next->second);
+    if (first < last) {
+      RecordBytes earlier;
+      image.Read(static_cast<uint32_t>(address + (first - begin)), earlier.data(), static_cast<uint32_t>(last - first),
+                 region);
+      for (uint64_t at = first; at < last; ++at) {
+        if (earlier[at - first] != data[at - begin]) ++replaced;
+      }
+    }
+    range->second = std::max({range->second, next->second, end});
+    next = next == range ? std::next(next) : ranges.erase(next);
+  }
+  return replaced;
+}
+
+void HexPhoneImageDecoder::Lose(uint64_t bytes, uint64_t line, bool replaces) {
+  if (bytes == 0) return;
+  if (loss_.bytes == 0 || line < loss_.line) {
+    loss_.line = line;
+    loss_.replaces = replaces;
+  }
   loss_.bytes += bytes;
 }
 
-// Dropped data stand in front of all others, so that the first line is the first here too.
 void HexPhoneImageDecoder::LoseBeyond(PhoneImage& image) {
   for (const Beyond& record : beyond_) {
     const uint64_t size = image.GetSize(record.region);

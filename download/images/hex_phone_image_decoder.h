@@ -3,6 +3,8 @@
 #define KRAL_DOWNLOAD_IMAGES_HEX_PHONE_IMAGE_DECODER_H
 
 #include <cstdint>
+#include <map>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -13,10 +15,12 @@ namespace kral::images {
 
 class HexWriter;
 
-// Data of a file that its image does not hold: dropped by the reader, or behind the end of their region.
+// Data of a file that its image does not hold: dropped by the reader, behind the end of their region, or replaced by
+// other data for the same address.
 struct HexLoss {
   uint64_t bytes = 0;
-  uint64_t line = 0;  // of the first of them, from 1
+  uint64_t line = 0;      // the first that loses some, from 1: its own, or those that it replaces
+  bool replaces = false;  // that line does
 };
 
 // Why a Decode failed, and at which line.
@@ -64,7 +68,8 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
   bool LoadData(PhoneImage& image, LineReader& lines);
   bool LoadRecord(PhoneImage& image, const LineReader::Line& line, Cursor& cursor);
   bool LoadBytes(PhoneImage& image, const LineReader::Line& line, const Cursor& cursor);
-  void Lose(uint64_t bytes, uint64_t line);
+  uint64_t CountReplaced(const PhoneImage& image, uint32_t region, uint32_t address, std::span<const uint8_t> data);
+  void Lose(uint64_t bytes, uint64_t line, bool replaces = false);
   void LoseBeyond(PhoneImage& image);
   void EncodeRegion(PhoneImage& image, uint32_t region, HexWriter& writer) const;
 
@@ -74,6 +79,7 @@ class HexPhoneImageDecoder final : public PhoneImageDecoder {
   HexLoss loss_;
   HexFault fault_;
   std::vector<Beyond> beyond_;
+  std::map<uint64_t, uint64_t> written_[2];  // begin and end, from the region's base; none touches another
 };
 
 }  // namespace kral::images

@@ -101,15 +101,20 @@ Failure NotDecoded(const std::string& file, const HexFault& fault) {
       .Line(static_cast<uint32_t>(fault.line));
 }
 
+const char* WhatLoses(const HexLoss& loss) {
+  return loss.replaces ? "holds other data for addresses that have some" : "holds data that have no place in the image";
+}
+
 Failure DataLost(const std::string& file, const HexLoss& loss) {
-  return Failure(KRAL_ERROR_BAD_FILE, "line %llu of the file %.120s holds data that have no place in the image",
-                 static_cast<unsigned long long>(loss.line), file.c_str())
+  return Failure(KRAL_ERROR_BAD_FILE, "line %llu of the file %.120s %s", static_cast<unsigned long long>(loss.line),
+                 file.c_str(), WhatLoses(loss))
       .Line(static_cast<uint32_t>(loss.line));
 }
 
 void LogLoss(DataLogFileHandler& log, const std::string& file, const HexLoss& loss) {
-  log.WriteLine(kLogErr, "%s: line %llu holds data that have no place in the image, %llu bytes are lost in all",
-                file.c_str(), static_cast<unsigned long long>(loss.line), static_cast<unsigned long long>(loss.bytes));
+  log.WriteLine(kLogErr, "%s: line %llu %s, %llu bytes are lost in all", file.c_str(),
+                static_cast<unsigned long long>(loss.line), WhatLoses(loss),
+                static_cast<unsigned long long>(loss.bytes));
 }
 
 bool PassesTheEnd(uint32_t base, uint64_t size) {

@@ -42,6 +42,7 @@ class ImageFile {
 
 // Of a decoder that has just failed; of data that were just lost.
 Failure NotDecoded(const std::string& file, const HexFault& fault);
+const char* WhatLoses(const HexLoss& loss);  // "holds ...", said of its line
 Failure DataLost(const std::string& file, const HexLoss& loss);
 void LogLoss(DataLogFileHandler& log, const std::string& file, const HexLoss& loss);
 

@@ -243,12 +243,12 @@ KRAL_API uint8_t KRAL_CALL KRAL_IMAGE_GetInfo(const char* image_file, uint32_t f
                                               uint32_t* result);
 
 /**
- * Reports which data of an Intel HEX file have no place in its image. Such a file can be decoded, but what came out
- * would not be what it holds; every other function refuses it. Data are lost before the first extended address record
- * (type 02 or 04), and where the first record lies above the image's base and none after it reaches as far.
+ * Reports which data of an Intel HEX file have no place in its image. Such a file can be decoded, but not to what it
+ * holds; every other function refuses it. Data are lost before the first extended address record (type 02 or 04), where
+ * the first record lies above the image's base and none after it reaches as far, and to other data for their address.
  *
  * @param      hex_file path of the file
- * @param[out] line     number of the first line of which data are lost, from 1; 0 when nothing is
+ * @param[out] line     first line that loses data, its own or those it replaces, from 1; 0 when nothing is lost
  * @param[out] bytes    bytes that are lost in all; may be null
  * @param[out] result   KRAL_STREAM_FILE_NOT_OPENED, ..._NOT_DECODED, ..._BAD_ARGUMENT or 0; may be null
  * @return 1 when the file can be decoded, whether it loses data or not

@@ -64,6 +64,7 @@ TEST_F(ImageFiles, ThatWouldLoseDataAreRefusedWithTheLineOfTheFirstLoss) {
   const auto output = folder_.Add("output", "as it was");
   const std::string base1 = HexRecord("020000040001");
   const std::string hello = HexRecord("0500200068656C6C6F");  // at 0x20 of the extended address
+  const std::string abc = HexRecord("03000000616263");
   const std::string end = ":00000001FF\n";
   const struct {
     const char* name;
@@ -76,8 +77,14 @@ TEST_F(ImageFiles, ThatWouldLoseDataAreRefusedWithTheLineOfTheFirstLoss) {
       {"a start address is no base", HexRecord("0400000500010000") + hello + end, 2, 5},
       {"one record above the base", base1 + hello + end, 2, 5},
       {"falling order", base1 + hello + HexRecord("03000000616263") + end, 2, 5},
-      {"a later record reaches a part of it", base1 + hello + HexRecord("03001F00616263") + end, 2, 3},
-      {"a later record reaches all of it", base1 + hello + HexRecord("03002300616263") + end, 0, 0},
+      {"a later record reaches a part of it", base1 + hello + HexRecord("03001F00616865") + end, 2, 3},
+      {"a later record reaches all of it", base1 + hello + HexRecord("030023006C6F63") + end, 0, 0},
+      {"the same data again", base1 + abc + abc + HexRecord("020001006263") + end, 0, 0},
+      {"other data for some addresses", base1 + abc + HexRecord("0400010062646566") + end, 3, 1},
+      {"other data for erased flash, which is data too", base1 + HexRecord("02000000FFFF") + abc + end, 3, 2},
+      {"other data for two records and their gap",
+       base1 + abc + HexRecord("0100040065") + HexRecord("0500000061FF63FFFF") + end, 4, 2},
+      {"other data behind some without a place", base1 + hello + HexRecord("0200200068FF") + end, 2, 4},
       {"the end of the address space",
        HexRecord("02000004FFFF") + HexRecord("02FFFC005555") + HexRecord("02FFFE005555") + end, 2, 4},
       {"the second region above its base", base1 + HexRecord("0100000055") + HexRecord("020000040800") + hello + end, 4,

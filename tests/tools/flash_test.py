@@ -158,11 +158,13 @@ class Flash(ToolTest):
 
     def test_files_that_lose_data_or_are_too_large_are_refused(self):
         lossy = self.add("lossy.hex", b":020000040002F8\n:02001000AABB89\n:00000001FF\n")
+        double = self.add("double.hex", b":020000040000FA\n:0400000001020304F2\n:0400000005060708E2\n:00000001FF\n")
         large = self.add("large.bin", b"")
         os.truncate(large, 5 << 30)
+        readers = (("verify-image",), ("write", "--dry-run"), ("load", "--dry-run"), ("hex",))
         for file, reason, verbs in (
-                (lossy, "2 bytes of its data have no place in the image, the first of them on line 2",
-                 (("verify-image",), ("write", "--dry-run"), ("load", "--dry-run"), ("hex",))),
+                (lossy, f"line 2 of the file {lossy} holds data that have no place in the image: 2 bytes", readers),
+                (double, f"line 3 of the file {double} holds other data for addresses that have some: 4 bytes", readers),
                 (large, "4 GiB", (("verify-image",), ("write", "--dry-run"), ("hex",)))):
             for verb, *more in verbs:
                 words = ["flash", verb, *more, file] + ([self.path("output")] if verb == "hex" else [])

@@ -32,11 +32,14 @@ ToolError BadImage(const KRAL_ERROR& record, std::string hint) {
   return {ExitCode::kBadFile, record.text + reason, std::move(hint), record};
 }
 
-std::string DescribeLoss(const std::string& file) {
+ToolError LosesData(const std::string& file, KRAL_ERROR record) {
   std::uint32_t line = 0;
   std::uint64_t bytes = 0;
   KRAL_HEX_FindLoss(file.c_str(), &line, &bytes, nullptr);
-  return Format("{} bytes of its data have no place in the image, the first of them on line {}", bytes, line);
+  return {ExitCode::kBadFile, Format("{}: {} would be lost in all", record.text, Counted(bytes, "byte")),
+          "data need an extended address record (type 02 or 04) in front of them, the lowest of a region must come "
+          "first, and no address twice with other data: kral flash hex writes such files from a binary",
+          record};
 }
 
 KRAL_IMAGE_INFO ReadInfo(const std::string& file, std::uint32_t format) {
@@ -53,10 +56,7 @@ KRAL_IMAGE_INFO ReadInfo(const std::string& file, std::uint32_t format) {
     case KRAL_STREAM_FILE_NOT_READ:
       throw BadImage(file, "the file became shorter while it was read", "wait until it is complete", record);
     case KRAL_STREAM_DATA_LOST:
-      throw BadImage(file, DescribeLoss(file),
-                     "data need an extended address record (type 02 or 04) in front of them, and the lowest of a "
-                     "region must come first: kral flash hex writes such files from a binary",
-                     record);
+      throw LosesData(file, record);
     case KRAL_STREAM_PAST_END:
       throw BadImage(file, "its image would go on past address 0xFFFFFFFF",
                      "each extended address record (type 02 or 04) must have data right behind it", record);
