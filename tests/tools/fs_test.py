@@ -91,8 +91,14 @@ class Files(ToolTest):
     def test_mistakes_are_found_before_anything_is_copied(self):
         with self.handset():
             self.fs(0, "mkdir", "/d")
-            self.fs(0, "put", self.add("f", b"1"), ":/d")
-            for code, *words in ((2, "get", "f", ":/f"), (2, "put", ":/f", "f"), (2, "get", ":/d"), (2, "cat", "/d"),
+            self.assertEqual(self.fs(0, "put", self.add("f", b"1"), self.add("h", b"2"), ":/d")["copied"], 2)
+            error = self.ask(2, "fs", "mkdir", "-p", ":/a/b")["error"]
+            self.assertIn("fs mkdir --parents", error["text"])
+            for code, *words in ((2, "put", self.add("f", b"1"), self.add("h", b"2"), ":/x"),
+                                 (2, "put", self.add("f", b"1"), "-", ":/d"),
+                                 (2, "put", self.add("f", b"1"), self.add("sub/f", b"2"), ":/d"),
+                                 (10, "put", self.add("f", b"1"), self.path("none"), ":/d"),
+                                 (2, "get", "f", ":/f"), (2, "put", ":/f", "f"), (2, "get", ":/d"), (2, "cat", "/d"),
                                  (2, "put", self.folder, ":/x"), (10, "put", self.path("none"), ":/x"),
                                  (2, "put", self.add("f", b"1"), ":/" + "n" * 300),
                                  (10, "put", "--item", self.add("g", b"1" * 1025), ":/x"),

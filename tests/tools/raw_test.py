@@ -122,6 +122,11 @@ class Failures(ToolTest):
         """Every verb below these words, with its help."""
         page = self.expect(0, "help", *words).out
         self.assertEqual(page, self.expect(0, *words, "--help").out)
+        answer = self.expect_json(0, "help", *words)
+        self.assertEqual(answer, self.expect_json(0, *words, "--help"))
+        for text in (*(each["names"] for each in answer["options"]), *(each["name"] for each in answer["verbs"]),
+                     *answer["examples"]):
+            self.assertIn(text, page)
         below = re.findall(r"(?m)^  (\S+)", page.partition("Subcommands:\n")[2].partition("\n\n")[0])
         if not below or "\nExamples:" in page:
             yield words, page

@@ -17,8 +17,10 @@
 
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/json.h"
 #include "tools/kral/man_pages.h"
 #include "tools/kral/nearest_word.h"
+#include "tools/kral/output.h"
 #include "tools/kral/settings.h"
 
 namespace kral::tool {
@@ -328,13 +330,6 @@ std::vector<Completion> OptionsAt(const CLI::App* app) {
   return found;
 }
 
-void PrintHelp(CLI::App& root, const std::vector<std::string>& words) {
-  const auto place = Follow(root, words);
-  if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
-  // Its own help() would be that of the verb in use, which is "help".
-  std::cout << place.app->get_formatter()->make_help(place.app, TitleOf(*place.app), CLI::AppFormatMode::Normal);
-}
-
 // --- As text --------------------------------------------------------------------------------------------------------
 
 using Examples = std::map<const CLI::App*, std::vector<std::string>>;
@@ -365,6 +360,48 @@ CommandText TextOf(const CLI::App& app, const Examples& examples) {
     text.verbs.push_back(TextOf(*verb, examples));
   }
   return text;
+}
+
+Json JsonOf(const std::vector<ParameterText>& parameters) {
+  Json list = Json::array();
+  for (const auto& each : parameters) {
+    list.push_back({{"names", each.names},
+                    {"values", each.values},
+                    {"help", each.help},
+                    {"required", each.required},
+                    {"many", each.many}});
+  }
+  return list;
+}
+
+Json JsonOf(const CommandText& command) {
+  Json verbs = Json::array();
+  for (const auto& verb : command.verbs) verbs.push_back(JsonOf(verb));
+  Json examples = Json::array();
+  for (const auto& example : command.examples) examples.push_back(example);
+  return {{"name", command.name},
+          {"help", command.help},
+          {"arguments", JsonOf(command.arguments)},
+          {"options", JsonOf(command.options)},
+          {"explanation", command.explanation},
+          {"examples", examples},
+          {"verbs", verbs}};
+}
+
+// As text, or with --json as one object.
+void PrintHelp(CLI::App& root, const std::vector<std::string>& words, const Examples& examples) {
+  const auto place = Follow(root, words);
+  if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
+  const auto title = TitleOf(*place.app);
+  const auto* const json = FindOption(&root, "--json");
+  if (json != nullptr && json->count() != 0) {
+    Json object{{"ok", true}, {"schema", kSchema}, {"verb", title}};
+    object.update(JsonOf(TextOf(*place.app, examples)));
+    std::cout << object.dump() << "\n";
+    return;
+  }
+  // Its own help() would be that of the verb in use, which may be "help".
+  std::cout << place.app->get_formatter()->make_help(place.app, title, CLI::AppFormatMode::Normal);
 }
 
 }  // namespace
@@ -622,7 +659,7 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
   });
   help.Add("--man", *man, "Write manual pages of the same text into this folder");
   help.Run([parser = parser_.get(), words, man] {
-    if (man->empty()) return PrintHelp(parser->app, *words);
+    if (man->empty()) return PrintHelp(parser->app, *words, parser->examples);
     WriteManPages(TextOf(parser->app, parser->examples), *man);
   });
 }
@@ -651,7 +688,11 @@ std::function<void()> CommandLine::Parse(const std::vector<std::string>& argumen
     parser_->app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() != 0) throw Explain(parser_->app, arguments, error);
-    parser_->app.exit(error);  // --help, --version
+    if (dynamic_cast<const CLI::CallForHelp*>(&error) != nullptr) {
+      PrintHelp(parser_->app, arguments, parser_->examples);
+    } else {
+      parser_->app.exit(error);  // --version
+    }
     return {};
   }
   if (parser_->chosen.act) TakeSettled(parser_->chosen);

@@ -36,11 +36,17 @@ std::string FaultOfTraceFile(const std::string& file) {
   return file.empty() ? "a trace has a file" : "";
 }
 
+// What others take for the parents of a directory is the port here, in front of the verb and behind it.
+std::string FaultOfPort(const std::string& name) {
+  return name.starts_with(':') ? "that is a path on the handset; kral fs mkdir --parents makes those above, too" : "";
+}
+
 void AddCommonOptions(const Command& root, Context& context) {
   root.Flag("--all", context.all, "Every port on which a handset answers");
   root.Add("-p,--port", context.session.port,
            "Ports, such as 7, 20-27, /dev/ttyUSB0, esn:80C0FFEE, usb:1-4.2, slot:3, or several with commas; default: "
            "the only one with a handset")
+      .Check(FaultOfPort)
       .Settled("port", "--all");
   root.Add("--wait", context.wait_s, "Wait so long until the ports are there and handsets answer; --wait alone: 30 s")
       .Between(0, kLongestWaitS, "s");

@@ -155,16 +155,28 @@ const char* Copier::GetOne(const Job& job) {
 
 // --- To the handset -------------------------------------------------------------------------------------------------
 
-void Copier::Put(const std::string& source, const std::string& target) {
-  auto local = LookAt(source);
-  if (source == kStandardInput) local = {LocalKind::kFile, StandardInput().size()};
+void Copier::Put(const std::vector<std::string>& sources, const std::string& target) {
   const auto there = files_.Find(target);
-  const bool into = source != kStandardInput && there && there->is_directory() && IsName(LastName(source));
-  const auto to = into ? JoinEfs(target, LastName(source)) : target;
-  if (local.kind == LocalKind::kFolder && !options_.recursive) throw NeedsRecursion(source);
+  const bool is_folder = there && there->is_directory();
+  if (sources.size() > 1 && !is_folder) {
+    throw ToolError(ExitCode::kUsage, Format("{} is no directory for {} files", files_.Where(target), sources.size()),
+                    "kral fs mkdir makes it");
+  }
+  for (const auto& source : sources) {
+    if (LookAt(source).kind == LocalKind::kFolder && !options_.recursive) throw NeedsRecursion(source);
+  }
   const auto plan = [&] {
-    if (local.kind == LocalKind::kFolder) return PlanPut(source, to);
-    AddJob(source, to, local.size, local.size * (options_.verify ? 2 : 1));
+    for (const auto& source : sources) {
+      const bool into = is_folder && source != kStandardInput && IsName(LastName(source));
+      const auto to = into ? JoinEfs(target, LastName(source)) : target;
+      auto local = LookAt(source);
+      if (source == kStandardInput) local = {LocalKind::kFile, StandardInput().size()};
+      if (local.kind == LocalKind::kFolder) {
+        PlanPut(source, to);
+      } else {
+        AddJob(source, to, local.size, local.size * (options_.verify ? 2 : 1));
+      }
+    }
   };
   Run(
       plan, [this](const std::string& path) { files_.MakeDirectory(path); },

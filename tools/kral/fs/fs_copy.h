@@ -31,7 +31,7 @@ class Copier {
   Copier& operator=(const Copier&) = delete;
 
   void Get(const std::string& source, const std::string& target);
-  void Put(const std::string& source, const std::string& target);
+  void Put(const std::vector<std::string>& sources, const std::string& target);  // several: only into a directory
 
  private:
   struct Job {

@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <functional>
 #include <memory>
+#include <set>
 #include <utility>
 
 #include "platform/console.h"
@@ -383,18 +384,34 @@ void Get(Context& context, RemoteFiles& files, const FsOptions& options) {
   Copier(context, files, options.copy, "get").Get(EfsPath(options.paths[0]), LocalTarget(options));
 }
 
+std::vector<std::string> PutSources(const FsOptions& options) {
+  return {options.paths.begin(), options.paths.end() - 1};
+}
+
+// Several files must have names of their own in the directory they go to.
 void CheckPut(const FsOptions& options) {
-  CheckSides(options.paths[1], options.paths[0]);
-  if (options.paths[0] == kStandardInput) return;
-  if (LookAt(options.paths[0]).kind == LocalKind::kMissing) {
-    throw ToolError(ExitCode::kBadFile, Format("there is no {}", options.paths[0]), "check the name");
+  const auto sources = PutSources(options);
+  std::set<std::string> names;
+  for (const auto& source : sources) {
+    CheckSides(options.paths.back(), source);
+    const std::string name(LastName(source));
+    if (sources.size() > 1 && (source == kStandardInput || name.empty() || name == "." || name == "..")) {
+      throw ToolError(ExitCode::kUsage, Format("{} has no name among several files", source), "put it by itself");
+    }
+    if (!names.insert(name).second) {
+      throw ToolError(ExitCode::kUsage, Format("two of the files would be {} in {}", name, options.paths.back()),
+                      "put them one after the other, under other names");
+    }
+    if (source != kStandardInput && LookAt(source).kind == LocalKind::kMissing) {
+      throw ToolError(ExitCode::kBadFile, Format("there is no {}", source), "check the name");
+    }
   }
 }
 
 void Put(Context& context, RemoteFiles& files, const FsOptions& options) {
   auto copy = options.copy;
   copy.verify = !options.unverified;
-  Copier(context, files, copy, "put").Put(options.paths[0], EfsPath(options.paths[1]));
+  Copier(context, files, copy, "put").Put(PutSources(options), EfsPath(options.paths.back()));
 }
 
 // --- The command line -----------------------------------------------------------------------------------------------
@@ -419,7 +436,8 @@ constexpr Verb kVerbs[] = {
     {"ls", "List a directory", "path", 0, 1, List},
     {"mkdir", "Make directories", "paths", 1, kMany, MakeDirectories},
     {"mv", "Rename or move: mv OLD NEW", "paths", 2, 2, Move},
-    {"put", "Copy to the handset, and compare: put LOCAL :PATH; - is the standard input", "paths", 2, 2, Put, CheckPut},
+    {"put", "Copy to the handset, and compare: put LOCAL... :PATH; - is the standard input", "paths", 2, kMany, Put,
+     CheckPut},
     {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles, CheckRemove},
     {"rmdir", "Remove empty directories", "paths", 1, kMany, RemoveDirectories},
     {"stat", "Print what there is to know about a path", "path", 1, 1, Stat},
@@ -467,7 +485,9 @@ void AddFsVerbs(const Command& root, Context& context) {
     if (verb.act == Get) subcommand.Writes([options] { return std::vector<std::string>{LocalTarget(*options)}; });
     if (verb.act == Put) {
       subcommand.Reads([options] {
-        return options->paths[0] == kStandardInput ? std::vector<std::string>() : std::vector{options->paths[0]};
+        auto files = PutSources(*options);
+        std::erase(files, kStandardInput);
+        return files;
       });
     }
     subcommand.Run([&context, options, &verb] { Run(context, *options, verb); });
