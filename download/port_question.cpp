@@ -17,6 +17,7 @@ namespace {
 constexpr uint32_t kHelloWaitMs = 50;  // a driver that has just been opened fetches what the device has
 constexpr uint32_t kPatienceMs = 200;
 constexpr std::array<int32_t, 2> kLiveness = {80, 500};  // a busy machine may keep a healthy handset's answer
+constexpr uint64_t kMostReplies = 16;                    // that a loader may have for these questions
 
 bool SaysHello(Diag_FTM& phone) {
   kivrat::RawPort port(phone);
@@ -33,13 +34,16 @@ bool Answers(Diag_FTM& phone, uint8_t request, uint8_t reply) {
   return static_cast<bool>(phone.SendSync({&request, 1}, room, reply, kPatienceMs));
 }
 
+// Whoever sends many packets meanwhile is there as well: answers stand behind logs and events then, and come late.
 bool IsInDiagnostics(Diag_FTM& phone) {
+  const uint64_t packets = phone.counters().packets_received;
   const auto before = static_cast<int32_t>(phone.TimeOut(kTimeOutLiveness));
   const AtExit restore([&] { phone.ConfigureTimeOut(kTimeOutLiveness, before); });
-  return std::ranges::any_of(kLiveness, [&](int32_t milliseconds) {
+  const bool answers = std::ranges::any_of(kLiveness, [&](int32_t milliseconds) {
     phone.ConfigureTimeOut(kTimeOutLiveness, std::max(before, milliseconds));
     return phone.IsPhoneConnected();
   });
+  return answers || (phone.IsPortOpen() && phone.counters().packets_received - packets > kMostReplies);
 }
 
 }  // namespace

@@ -256,7 +256,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_GetPortState(KRAL_HANDLE handle, int32_t* state)
 /** Who answers on a port, as KRAL_GetPortInfo finds out. */
 #define KRAL_ANSWERS_NOT_ASKED 0        /* not asked, or the port could not be opened */
 #define KRAL_ANSWERS_NOTHING 1          /* nothing came */
-#define KRAL_ANSWERS_DIAGNOSTICS 2      /* the software of a handset */
+#define KRAL_ANSWERS_DIAGNOSTICS 2      /* the software of a handset, which may answer late */
 #define KRAL_ANSWERS_LOADER 3           /* the loader, which takes a flash programmer */
 #define KRAL_ANSWERS_FLASH_PROGRAMMER 4 /* a flash programmer, which writes images */
 #define KRAL_ANSWERS_BOOT_LOADER 5      /* the primary boot loader, in its hello */

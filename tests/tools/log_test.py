@@ -200,6 +200,11 @@ class Traffic(ToolTest):
             error = self.ask(5, "info", "--time-out", "300")["error"]
             self.assertRegex(error["text"], f"^{late}$")
             self.assertIn("kral log off --all", error["hint"])
+            port = next(row for row in self.expect_json(0, "ports", "--probe")["ports"] if row["port"] == 7)
+            self.assertEqual(port["state"], "handset")
+            error = self.expect_json(5, "-p", "esn:12345678", "info")["error"]
+            self.assertRegex(error["text"], r"COM7 .* did not answer in time$")
+            self.assertRegex(self.ask(5, "doctor", "--seconds", "0", "--time-out", "300")["error"]["text"], f"^{late}$")
 
     def test_reader_may_be_slow_and_may_leave(self):
         def waiting(stream):

@@ -16,6 +16,7 @@
 #include "platform/environment.h"
 #include "platform/file_util.h"
 #include "platform/port_list.h"
+#include "tools/kral/call_failure.h"
 #include "tools/kral/config_folder.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
@@ -102,18 +103,28 @@ std::uint16_t PortOfSerial(std::string_view name) {
   const auto ports = ListPorts();
   std::mutex mutex;
   std::vector<std::uint16_t> found;
+  std::vector<std::string> late;
   InParallel(ports.size(), [&](std::size_t number) {
     KRAL_PORT_INFO info{};
     if (KRAL_GetPortInfo(ports[number], 1, &info) == 0 || info.answers != KRAL_ANSWERS_DIAGNOSTICS) return;
     const KRAL_HANDLE handle = KRAL_ConnectServer(ports[number]);
     std::uint32_t serial = 0;
     const bool told = KRAL_DIAG_READ_ESN_F(handle, &serial) != 0;
+    // What came in place of its answer may have been due to an earlier question.
+    const bool is_late = !told && LastError(handle).value_or(KRAL_ERROR{}).code != KRAL_ERROR_REFUSED;
     KRAL_DisconnectServer(handle);
     const std::lock_guard lock(mutex);
+    if (is_late) late.push_back(DescribePort(ports[number]));
     if (told && serial == wanted) found.push_back(ports[number]);
   });
   ThrowIfInterrupted();
   std::ranges::sort(found);
+  if (found.empty() && !late.empty()) {
+    throw ToolError(
+        ExitCode::kNoAnswer,
+        Format("no handset tells the serial number {}; {} did not answer in time", name, Joined(late, ", ")),
+        "kral -p N info tells why");
+  }
   return TheOne(name, found, "kral --all info tells the serial numbers of the handsets that answer");
 }
 
