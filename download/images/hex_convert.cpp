@@ -1,5 +1,7 @@
 // Intel HEX files to binary files and back.
 #include <algorithm>
+#include <cstdio>
+#include <memory>
 #include <vector>
 
 #include "download/images/hex_phone_image_decoder.h"
@@ -81,9 +83,19 @@ uint32_t NotWritten(const std::string& output, const std::error_code& error) {
   return KRAL_HEX_NOT_WRITTEN;
 }
 
+// By whatever name.
+bool IsInputToo(const std::string& input, const std::string& output) {
+  const std::unique_ptr<std::FILE, bool (*)(std::FILE*)> reading(OpenToRead(input), CloseStream);
+  if (reading == nullptr || !IsInUse(output)) return false;
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "the output %.150s would replace a file that is being read or written",
+               output.c_str()));
+  return true;
+}
+
 }  // namespace
 
 uint32_t HexToBinary(const std::string& input, const std::string& output, uint32_t& base) {
+  if (IsInputToo(input, output)) return KRAL_STREAM_BAD_ARGUMENT;
   ImageFile hex;
   const uint32_t result = hex.Open(input, KRAL_IMAGE_FORMAT_HEX);
   if (result != KRAL_STREAM_WRITTEN) return result;
@@ -109,6 +121,7 @@ uint32_t BinaryToHex(const std::string& input, const std::string& output, uint32
     Fail(Failure(KRAL_ERROR_ARGUMENT, "the base 0x%08X is no multiple of 0x10000", base));
     return KRAL_STREAM_BAD_ARGUMENT;
   }
+  if (IsInputToo(input, output)) return KRAL_STREAM_BAD_ARGUMENT;
   ImageFile binary;
   const uint32_t result = binary.Open(input, KRAL_IMAGE_FORMAT_BINARY);
   if (result != KRAL_STREAM_WRITTEN) return result;

@@ -259,7 +259,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* lin
 #define KRAL_HEX_FROM_BINARY 1u
 
 /**
- * Converts an Intel HEX file to a binary file, or back. The output replaces what was there in one step.
+ * Converts an Intel HEX file to a binary file, or back. The output replaces what was there in one step, but no input.
  *
  * A binary holds the first region from its base to its last byte, gaps as 0xFF; a file with a second region is refused.
  * A HEX file is written with extended linear addresses and without a start address.

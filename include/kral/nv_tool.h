@@ -271,7 +271,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_NV_CreateComplementNVFilter(KRAL_HANDLE handle,
  * Compares two PKV files in a page of HTML, with values decoded by the definitions that are loaded. Values in the tool
  * stay as they are.
  *
- * @return 0, whether they differ or not; 7, 18 or 20 for the PKV files; 17 when the page cannot be written
+ * @return 0, whether they differ or not; 7, 18 or 20 for the PKV files; 17 for the page, also when it is one of them
  */
 KRAL_API uint32_t KRAL_CALL KRAL_NV_PKV_Diff(KRAL_HANDLE handle, const char* first_pkv, const char* second_pkv,
                                              const char* html_file);

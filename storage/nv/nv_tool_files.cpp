@@ -1,6 +1,8 @@
 // Sets of items between the NV tool and files of the PC, and the reports.
 #include <algorithm>
+#include <cstdio>
 #include <map>
+#include <memory>
 #include <set>
 #include <utility>
 
@@ -299,6 +301,13 @@ NvError NVTool_Manager::WriteToSource(Diag_FTM& phone, const std::string& file) 
 
 NvError NVTool_Manager::ComparePkv(Diag_FTM& phone, const std::string& first, const std::string& second,
                                    const std::string& page) {
+  for (const auto* const source : {&first, &second}) {
+    const std::unique_ptr<std::FILE, bool (*)(std::FILE*)> reading(OpenToRead(*source), CloseStream);
+    if (reading == nullptr || !IsInUse(page)) continue;
+    Fail(Failure(KRAL_ERROR_ARGUMENT, "the page %.150s would replace a file that is being read or written",
+                 page.c_str()));
+    return NvError::kCannotOpenReport;
+  }
   pkv::PkvSet first_set;
   pkv::PkvSet second_set;
   if (const NvError error = ReadPkvFile(phone, first, first_set); error != NvError::kNone) return error;

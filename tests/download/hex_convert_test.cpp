@@ -180,6 +180,10 @@ TEST_F(ImageFiles, FailuresHaveTheirResultsNameFileAndLineAndLeaveTheOutputAlone
         convert(binary, output, KRAL_HEX_FROM_BINARY, KRAL_STREAM_BAD_ARGUMENT, 0x100)},
        {"KRAL_HEX_Convert ARGUMENT", "past address 0xFFFFFFFF",
         convert(binary, output, KRAL_HEX_FROM_BINARY, KRAL_STREAM_PAST_END, 0xFFFF0000)},
+       {"KRAL_HEX_Convert ARGUMENT", "would replace",
+        convert(binary, folder_.Path("./image.bin"), KRAL_HEX_FROM_BINARY, KRAL_STREAM_BAD_ARGUMENT)},
+       {"KRAL_HEX_Convert ARGUMENT", "would replace",
+        convert(broken, broken, KRAL_HEX_TO_BINARY, KRAL_STREAM_BAD_ARGUMENT)},
        {"KRAL_HEX_Convert ARGUMENT", "direction", convert(binary, output, 2, KRAL_STREAM_BAD_ARGUMENT)},
        {"KRAL_HEX_Convert BAD_FILE", "cannot be written",
         convert(binary, nowhere, KRAL_HEX_FROM_BINARY, KRAL_HEX_NOT_WRITTEN), true}});

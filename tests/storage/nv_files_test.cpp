@@ -262,6 +262,12 @@ TEST_F(NvFiles, ComparisonShowsWhatDiffers) {
   EXPECT_EQ(Value(2), "1,77");
   EXPECT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), Path("nowhere").c_str(), page.c_str()), 7u);
   EXPECT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), second.c_str(), Path("no/page.html").c_str()), 17u);
+  const auto kept = folder_.Content("second.pkv");
+  EXPECT_EQ(KRAL_NV_PKV_Diff(handle(), first.c_str(), second.c_str(), Path("./second.pkv").c_str()), 17u);
+  KRAL_ERROR error{};
+  ASSERT_EQ(KRAL_GetLastError(handle(), &error), 1);
+  EXPECT_EQ(error.code, uint32_t{KRAL_ERROR_ARGUMENT}) << error.text;
+  EXPECT_EQ(folder_.Content("second.pkv"), kept) << "what is compared is never replaced";
 
   ASSERT_EQ(KRAL_NV_GenerateQDF(handle(), Path("list.qdf").c_str()), 0u);
   EXPECT_EQ(folder_.Content("list.qdf"),
