@@ -139,6 +139,15 @@ class ManyHandsets(ToolTest):
             self.assertIn(b"image 1 (&lt;b>software) ", self.content("page.html"))
             self.assertEqual(answer["handsets"][1]["error"]["name"], "link")
 
+    def test_the_rate_of_a_download_is_counted_anew_in_a_retry(self):
+        words = (self.add("programmer", BootLoader.PROGRAMMER), self.add("image", bytes(120000)))
+        with self.fixture(2, "--loader", "boot", "--rate", "100k", "--fault-at", "1:wrong=13,nth=110,of=08") as (_, self.ports):
+            done = self.expect(0, "--all", "--json", "flash", "all", "--enter", *words)
+        told = [event for event in map(json.loads, done.err.splitlines())
+                if event["event"] == "progress" and event["port"] == 1 and "per_second" in event]
+        before, after = next(pair for pair in zip(told, told[1:]) if pair[0]["done"] > pair[1]["done"])
+        self.assertGreater(after["per_second"], before["per_second"] / 2)
+
     def test_another_handset_on_the_port_is_not_worked_on(self):
         with self.fixture(3, "--rate", "20k") as (_, self.ports):
             process = start("-p", "1,2", "--jobs", "1", "--json", "fs", "put", self.add("big", bytes(8000)), ":/big",

@@ -93,10 +93,14 @@ void Progress::Describe(std::string_view subject) {
 }
 
 void Progress::Update(std::uint64_t done) {
-  done_ = done;
   const auto tick = clock_.TickMs();
   elapsed_ms_ += tick - last_tick_;
   last_tick_ = tick;
+  if (done < done_) {  // begun again: what went before says nothing on how long it takes from here
+    rate_from_ms_ = elapsed_ms_;
+    rate_from_ = done;
+  }
+  done_ = done;
   if (elapsed_ms_ >= next_ms_) Show();
 }
 
@@ -123,7 +127,8 @@ void Progress::Show() {
 }
 
 double Progress::Rate() const {
-  return elapsed_ms_ < kSettledMs ? 0 : static_cast<double>(done_) * 1000 / static_cast<double>(elapsed_ms_);
+  const auto elapsed_ms = elapsed_ms_ - rate_from_ms_;
+  return elapsed_ms < kSettledMs ? 0 : static_cast<double>(done_ - rate_from_) * 1000 / static_cast<double>(elapsed_ms);
 }
 
 std::uint64_t Progress::SecondsLeft(double rate) const {

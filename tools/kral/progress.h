@@ -61,6 +61,8 @@ class Progress {
   std::uint64_t done_ = 0;
   std::uint64_t elapsed_ms_ = 0;
   std::uint32_t last_tick_;
+  std::uint64_t rate_from_ms_ = 0;  // since when, and from which amount on, the rate is counted
+  std::uint64_t rate_from_ = 0;
   std::uint64_t next_ms_;  // when something is to be shown again
   std::size_t drawn_width_ = 0;
 };
