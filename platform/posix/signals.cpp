@@ -36,6 +36,9 @@ void CallWithSignalsBlocked(const std::function<void()>& start) {
   sigset_t signals;
   sigfillset(&signals);
   for (const int fault : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS}) sigdelset(&signals, fault);
+  // Runtimes that collect garbage stop each thread that has run their code with one of these, and wait until it has.
+  for (const int stop : {SIGPWR, SIGXCPU}) sigdelset(&signals, stop);
+  for (int real_time = SIGRTMIN; real_time <= SIGRTMAX; ++real_time) sigdelset(&signals, real_time);
   const BlockedSignals blocked(signals);
   start();
 }
