@@ -80,14 +80,16 @@ uint32_t PacketSizes::TimeOut(uint32_t usual_ms) const {
   return is_callers() || has_passed() ? usual_ms : std::min(usual_ms, kTrialMs);
 }
 
-void PacketSizes::Passed() {
-  if (is_callers() && !fell_) return;
-  found_ = {.step = step_, .passed = !is_callers()};
+// A shorter one shows nothing of the others.
+void PacketSizes::Passed(size_t bytes) {
+  if (!is_callers() && bytes >= size()) found_ = {.step = step_, .passed = true};
 }
 
+// Remembered at once: a handset that restarts at a long packet shall not meet one with each transfer.
 bool PacketSizes::FallBack() {
   if (is_callers()) return false;
   step_ = StepFrom(direction_, static_cast<uint8_t>(step_ + 1), callers_);
+  found_ = {.step = step_};
   fell_ = true;
   return true;
 }

@@ -30,8 +30,8 @@ class PacketSizes {
   // late, and does not count. Where none was, an answer of more bytes is the handset's mistake.
   uint32_t MostOf(uint32_t bytes) const { return fell_ ? bytes : UINT32_MAX; }
 
-  void Passed();    // the handset took, or sent, a packet of this size
-  bool FallBack();  // to the next smaller ones; false where there are none
+  void Passed(size_t bytes);  // the handset took, or sent, a packet of so many
+  bool FallBack();            // to the next smaller ones; false where there are none
 
  private:
   bool has_passed() const;  // a packet of this size

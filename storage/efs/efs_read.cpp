@@ -82,8 +82,8 @@ bool ReadChunks(Diag_FTM& phone, const RemoteFile& file, u32 total, const Sink& 
       if (IsAborted(phone, "Read") || !sizes.FallBack()) return false;
       continue;
     }
-    sizes.Passed();
     const auto count = static_cast<u32>(chunk->size());
+    sizes.Passed(kReadOverhead + count);
     if (!IsWithinGrowth(phone, uint64_t{offset} + count, total) || !sink.write(*chunk)) return false;
     offset += count;
     // Of more than the caller's size the handset may send what it can.

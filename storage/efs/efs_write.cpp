@@ -107,7 +107,7 @@ bool WriteChunks(Diag_FTM& phone, const RemoteFile& file, PacketSizes sizes, con
       if (!abort && sizes.FallBack()) continue;
       return abort;
     }
-    sizes.Passed();
+    sizes.Passed(kWriteOverhead + written);
     offset += written;
     phone.log().WriteLine(kLogRet, " EFS Write Transferred %u / %u bytes", offset, source.size);
     Tell(source.progress, KRAL_EFS_OPERATION_WRITE, offset, source.size);

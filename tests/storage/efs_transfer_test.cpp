@@ -212,6 +212,12 @@ TEST_F(EfsPacketSizes, AreTheLargestThatTheHandsetTakes) {
 TEST_F(EfsPacketSizes, AreTheCallersForShortFilesAndNeverSmaller) {
   PutAndGet(RandomBytes(4000));
   EXPECT_EQ(Writes(1), std::vector<size_t>{512}) << "not worth a try";
+  PutAndGet(RandomBytes(5400));
+  handset().faults().Add(handset::Ignore(), When::Always().LongerThan(5500));
+  PutAndGet(data_);
+  EXPECT_EQ(Writes(2), (std::vector<size_t>{6131, 2048})) << "one of 5,412 bytes has shown nothing of larger ones";
+  ConnectAnew();
+  handset().faults().Clear();
   handset().efs().SetReadLimit(1000);
   PutAndGet(data_);
   EXPECT_EQ(Reads(2), (std::vector<uint32_t>{4071, 4071})) << "it sends what it can";
