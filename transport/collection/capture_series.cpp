@@ -57,20 +57,24 @@ struct SeriesName {
 CaptureSink OpenNext(const SeriesName& name, uint32_t keep) {
   std::vector<FolderEntry> entries;
   if (ListFolder(name.folder, entries)) return {};
-  std::vector<uint32_t> numbers;
+  std::vector<uint32_t> files;
+  uint32_t last = 0;  // of whatever has such a name
   for (const auto& entry : entries) {
     const auto number = name.NumberOf(entry.name);
-    if (number && entry.file.kind == LocalKind::kFile) numbers.push_back(*number);
+    if (!number) continue;
+    last = std::max(last, *number);
+    if (entry.file.kind == LocalKind::kFile) files.push_back(*number);
   }
-  std::ranges::sort(numbers);
-  const uint32_t last = numbers.empty() ? 0 : numbers.back();
   if (last >= kMostFiles) return {};
-  const size_t left = keep == 0 ? numbers.size() : std::min<size_t>(numbers.size(), keep - 1);
-  for (size_t i = 0; i < numbers.size() - left; ++i) {
-    const auto path = name.Path(numbers[i]);
+  CaptureSink next = OpenCaptureFile(name.Path(last + 1));
+  // Only a file that has begun takes the place of others.
+  if (!next || keep == 0) return next;
+  std::ranges::sort(files);
+  for (size_t i = 0; i + keep <= files.size(); ++i) {
+    const auto path = name.Path(files[i]);
     if (!IsInUse(path)) RemoveFile(path);  // one that is being played goes another time
   }
-  return OpenCaptureFile(name.Path(last + 1));
+  return next;
 }
 
 }  // namespace
