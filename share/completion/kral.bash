@@ -18,7 +18,9 @@ _kral() {
     # Bash replaces what stands behind the last = and : of a word.
     prefix=${word%"${word##*[=:]}"}
     first=${first%%$'\t'*}
-    COMPREPLY+=("${first#"$prefix"}")
+    # Quoted: words of a definition file may hold what a shell would run.
+    printf -v first %q "${first#"$prefix"}"
+    COMPREPLY+=("$first")
   done
   if [[ ${#COMPREPLY[@]} -eq 1 && ${COMPREPLY[0]} == *= ]]; then compopt -o nospace 2>/dev/null; fi
 }
