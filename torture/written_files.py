@@ -25,6 +25,8 @@ class Writer:
     exit_code: int = 0
     # Of a process of Python, not the tool's.
     call: str = ""
+    # What it keeps beside the file.
+    stays: Sequence[str] = ()
 
     def command(self, port: int, words: Sequence[str] = ()) -> List[str]:
         if self.call and not words:
@@ -53,7 +55,7 @@ WRITERS: Dict[str, Writer] = {
                      first=(_CAPTURE, ("log", "export", "caught", "exported"))),
     "page": Writer(("log", "stats", "caught", "--html", "target"), first=(_CAPTURE,)),
     "header": Writer(("cmd", "header", f"{_EXAMPLES}/commands.xml", "--output", "target")),
-    "slots": Writer(("ports", "assign", "3", "7")),
+    "slots": Writer(("ports", "assign", "3", "7"), stays=("target.lock",)),
     "capture": Writer(("log", "capture", "target", "--on", "0x1001", "--count", "2000"), kind=GROWS),
     "text-log": Writer(("--log", "target", *_DUMP), kind=GROWS),
     "trace": Writer(("--trace", "target", *_DUMP), kind=GROWS),

@@ -125,7 +125,8 @@ class _Desk:
         return self.target.read_bytes()
 
     def left_over(self) -> List[str]:
-        return sorted(path.name for path in self.folder.iterdir() if path.name not in self._inputs | {"target"})
+        known = self._inputs | {"target", *self.writer.stays}
+        return sorted(path.name for path in self.folder.iterdir() if path.name not in known)
 
 
 def cases(bench: Bench) -> List[str]:
