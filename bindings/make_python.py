@@ -18,9 +18,49 @@ from __future__ import annotations
 
 import ctypes
 import enum
+import operator
 from typing import Any, Callable, Dict, List, Tuple
 
 VERSION = "{version}"
+
+
+class Number:
+    """An argument of an integer type: ctypes itself would cut a number that does not fit."""
+
+    def __init__(self, kind: Any) -> None:
+        half = 1 << 8 * ctypes.sizeof(kind) - 1
+        self._kind = kind
+        self._range = range(-half, half) if kind(-1).value < 0 else range(2 * half)
+
+    def from_param(self, value: Any) -> Any:
+        number = operator.index(getattr(value, "value", value))
+        if number not in self._range:
+            raise OverflowError(f"{{number}} is not within {{self._range[0]}} to {{self._range[-1]}}")
+        return self._kind(number)
+
+
+class Text:
+    """Bytes that end with a zero, or room for some: what follows a zero would be left out without a word."""
+
+    @staticmethod
+    def from_param(value: Any) -> Any:
+        if isinstance(value, bytes) and b"\\0" in value:
+            raise ValueError("embedded null byte")
+        return ctypes.c_char_p.from_param(value)
+
+
+class Data:
+    """Bytes, or room for some: ctypes itself would take a text for wide characters."""
+
+    @staticmethod
+    def from_param(value: Any) -> Any:
+        if isinstance(value, str):
+            raise TypeError("bytes are needed, not str")
+        if isinstance(value, (bytearray, memoryview)):
+            view = memoryview(value).cast("B")
+            kind = ctypes.c_char * len(view)
+            return kind.from_buffer_copy(view) if view.readonly else kind.from_buffer(view)
+        return ctypes.c_void_p.from_param(value)
 '''
 
 API = '''
@@ -66,6 +106,15 @@ def type_name(kind: headers.Type, size: str) -> str:
     if kind.name == "void" or kind.name == "uint8_t" and size:
         return "ctypes.c_void_p"
     return f"ctypes.POINTER({type_name(headers.Type(kind.name), '')})"
+
+
+def argument_type(kind: headers.Type, size: str) -> str:
+    """What ctypes asks to convert an argument of a function."""
+    name = type_name(kind, size)
+    checked = {"ctypes.c_char_p": "Text", "ctypes.c_void_p": "Data"}
+    if kind.pointers == 0 and name.startswith("ctypes.c_") and name != "ctypes.c_double":
+        return f"Number({name})"
+    return checked.get(name, name)
 
 
 def callback_type(argument: headers.Argument) -> str:
@@ -117,7 +166,7 @@ def callbacks(description: headers.Description) -> typing.Iterator[str]:
 def functions(description: headers.Description) -> typing.Iterator[str]:
     yield "\nPROTOTYPES: Dict[str, Tuple[Any, List[Any]]] = {"
     for function in description.functions:
-        types = ", ".join(type_name(item.type, item.size) for item in function.arguments)
+        types = ", ".join(argument_type(item.type, item.size) for item in function.arguments)
         yield f'    "{function.name}": ({result_type(function.result)}, [{types}]),'
     yield "}" + API
     for function in description.functions:

@@ -96,14 +96,22 @@ class Connection:
     def close(self) -> None:
         self._end()
 
+    def call(self, name: str, *arguments: Any) -> int:
+        """A call with the handle in front."""
+        handle = self.handle
+        try:
+            return int(getattr(self.api, name)(handle, *arguments))
+        except ctypes.ArgumentError as error:
+            raise BadArgument(f"{name}: {error}") from None
+
     def check(self, name: str, *arguments: Any) -> None:
         """A call whose 0 is a failure; the handle is put in front."""
-        if not getattr(self.api, name)(self.handle, *arguments):
+        if not self.call(name, *arguments):
             fail(self.handle, name)
 
     def ask(self, name: str, *arguments: Any) -> bool:
         """A call whose 0 is an answer."""
-        return bool(getattr(self.api, name)(self.handle, *arguments))
+        return bool(self.call(name, *arguments))
 
     def number(self, name: str, kind: Any, *arguments: Any) -> int:
         """A call with one number as its last output."""

@@ -19,6 +19,11 @@ _KINDS = {_api.KRAL_EFS_ENTRY_DIRECTORY: "directory", _api.KRAL_EFS_ENTRY_FILE: 
           _api.KRAL_EFS_ENTRY_LINK: "link"}
 
 
+def _bytes(path: str) -> bytes:
+    """What goes over the wire: names that are no text come from listings with their bytes escaped."""
+    return path.encode("utf-8", "surrogateescape")
+
+
 class FileError(Refused):
     """The handset's file system said no; `status` is its error number (KRAL_EFS_ERROR_...)."""
 
@@ -72,25 +77,25 @@ class Files:
     def get(self, path: str, to: Optional[LocalPath] = None, progress: Optional[Progress] = None) -> bytes:
         """Reads a file: gives its bytes, or copies it into a file of the PC and gives b""."""
         if to is not None:
-            self._transfer("KRAL_EfsRead", progress, os.fsencode(to), path.encode())
+            self._transfer("KRAL_EfsRead", progress, os.fsencode(to), _bytes(path))
             return b""
         size = max(self.stat(path).size, _api.KRAL_EFS_ITEM_SIZE) + 4096
         buffer = ctypes.create_string_buffer(size)
         count = ctypes.c_uint32(size)
-        self._transfer("KRAL_EfsReadMem", progress, path.encode(), buffer, ctypes.byref(count))
+        self._transfer("KRAL_EfsReadMem", progress, _bytes(path), buffer, ctypes.byref(count))
         return buffer.raw[:count.value]
 
     def put(self, source: Union[bytes, bytearray, LocalPath], path: str, progress: Optional[Progress] = None) -> None:
         """Writes bytes, or a file of the PC, to a file of the handset, replacing what is there."""
         if isinstance(source, (bytes, bytearray)):
             data = bytes(source)
-            self._transfer("KRAL_EfsWriteMem", progress, data, len(data), path.encode())
+            self._transfer("KRAL_EfsWriteMem", progress, data, len(data), _bytes(path))
         else:
-            self._transfer("KRAL_EfsWrite", progress, os.fsencode(source), path.encode())
+            self._transfer("KRAL_EfsWrite", progress, os.fsencode(source), _bytes(path))
 
     def put_item(self, data: bytes, path: str) -> None:
         """Writes an item file: at most 1,024 bytes, in one request."""
-        self._connection.check("KRAL_EfsPutItemFromMem", path.encode(), data, len(data))
+        self._connection.check("KRAL_EfsPutItemFromMem", _bytes(path), data, len(data))
 
     def _transfer(self, name: str, progress: Optional[Progress], *arguments: Any) -> None:
         connection = self._connection
@@ -116,7 +121,7 @@ class Files:
         while True:
             entries = (_api.KRAL_EFS_ENTRY * room)()
             count = ctypes.c_uint32(room)
-            connection.long(lambda: connection.check("KRAL_EfsDirectory", path.encode(), _api.KRAL_EFS_FILTER_ALL,
+            connection.long(lambda: connection.check("KRAL_EfsDirectory", _bytes(path), _api.KRAL_EFS_FILTER_ALL,
                                                      entries, ctypes.byref(count)))
             if count.value <= room:
                 return [self._entry(entry) for entry in entries[:count.value]]
@@ -155,11 +160,11 @@ class Files:
 
     def rename(self, old: str, new: str) -> None:
         """Renames or moves."""
-        self._numbered("KRAL_EFS2_DIAG_RENAME", old, new.encode())
+        self._numbered("KRAL_EFS2_DIAG_RENAME", old, _bytes(new))
 
     def link(self, target: str, path: str) -> None:
         """Makes a symbolic link at `path` that leads to `target`."""
-        self._numbered("KRAL_EfsCreateLink", target, path.encode())
+        self._numbered("KRAL_EfsCreateLink", target, _bytes(path))
 
     def exists(self, path: str) -> bool:
         try:
@@ -180,7 +185,7 @@ class Files:
         """A call that returns 1 whenever the handset answered, and its answer as an error number."""
         number = ctypes.c_uint32()
         handle = self._connection.handle
-        answered = getattr(self._connection.api, name)(handle, path.encode(), *more, ctypes.byref(number), *after)
+        answered = self._connection.call(name, _bytes(path), *more, ctypes.byref(number), *after)
         if not answered and not number.value:
             fail(handle, name)
         if number.value in allowed:

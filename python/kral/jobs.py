@@ -18,7 +18,7 @@ from typing import Any, Callable, Dict, Iterable, Iterator, List, Optional, Tupl
 
 from kral import _api
 from kral._library import load
-from kral.errors import BY_CODE, KralError, fail, record_of
+from kral.errors import BY_CODE, BadArgument, KralError, fail, record_of
 from kral.files import LocalPath
 from kral.modes import Mode
 from kral.phone import Phone
@@ -162,7 +162,11 @@ class _Run:
             self._api.KRAL_VENTRIMS_Free(job)
 
     def _check(self, name: str, *arguments: Any) -> None:
-        if not getattr(self._api, name)(self._job, *arguments):
+        try:
+            done = getattr(self._api, name)(self._job, *arguments)
+        except ctypes.ArgumentError as error:
+            raise BadArgument(f"{name}: {error}") from None
+        if not done:
             fail(self._job, name)
 
     def _verdict(self, handset: int) -> Verdict:

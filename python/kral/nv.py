@@ -92,7 +92,7 @@ class Nv:
     def _tool(self, name: str, *arguments: object, allowed: Tuple[int, ...] = (0,)) -> int:
         """A call whose result is an error code."""
         handle = self._connection.handle
-        code = int(getattr(self._connection.api, name)(handle, *arguments))
+        code = self._connection.call(name, *arguments)
         if code in allowed:
             return code
         record = last_error(handle)

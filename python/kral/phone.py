@@ -12,7 +12,7 @@ from kral import _api, pkv, traffic
 from kral._connection import Connection
 from kral._library import load
 from kral.commands import Commands
-from kral.errors import KralError, LinkError, NoAnswer, NoPort, PortBusy, fail
+from kral.errors import BadArgument, KralError, LinkError, NoAnswer, NoPort, PortBusy, fail
 from kral.files import Files, LocalPath
 from kral.ftm import Ftm
 from kral.modes import STATES, Mode
@@ -137,6 +137,8 @@ class Phone:
         Raises the exception of the outcome, whose `result` has the counts and what was refused: Refused means that the
         file is written, without what the handset refused.
         """
+        if not isinstance(items, range) or items.step != 1 or not items:
+            raise BadArgument("items of a backup are a range without gaps, such as range(10000)")
         self._connection.check("KRAL_PKV_ConfigureBackup", items[0], items[-1], subscriptions)
         return pkv.run(self._connection, "KRAL_BackupNVFromMobileToPKV", path, progress)
 
@@ -196,6 +198,8 @@ def connect(port: int, wait: float = 0.0) -> Phone:
 
     Tries for `wait` seconds. Raises NoPort, PortBusy, or NoAnswer when the port is there and nobody answers.
     """
+    if not 0 < port <= 0xFFFF:
+        raise BadArgument(f"{port} is no number of a port")
     api = load()
     api.KRAL_SetDefaultReceiveMode(_api.KRAL_RECEIVE_MODE_WAKE)
     deadline = time.monotonic() + wait

@@ -1,5 +1,6 @@
 """The package against a simulated handset."""
 import gc
+import os
 import pathlib
 import struct
 import threading
@@ -121,6 +122,10 @@ def test_files(phone, tmp_path):
     for index in range(70):
         files.put_item(b"x", f"/a/b/{index:02}")
     assert len(files.listdir("/a/b")) == 71
+    odd = os.fsdecode(b"/a/b/\xff")  # no text: it is given back as it came
+    files.mkdir(odd)
+    files.put(b"1", odd + "/x")
+    assert [path for path, _, _ in files.walk("/a/b")] == ["/a/b", odd] and files.get(odd + "/x") == b"1"
     with pytest.raises(kral.FileError) as failure:
         files.rmdir("/a/b")
     assert failure.value.status not in (None, 0)
@@ -148,6 +153,26 @@ def test_failures_are_exceptions_by_outcome(request, fault, call, kind, status):
     assert failure.value.record is not None and failure.value.record.function.startswith("KRAL_")
     if status is not None:
         assert failure.value.status == status
+
+
+@pytest.mark.parametrize("call", [
+    lambda phone: phone.nv.write(65536 + 453, b"\1"),
+    lambda phone: phone.nv.read(-1),
+    lambda phone: phone.nv.write(453, "abc"),
+    lambda phone: phone.nv.write(453, b"\1" * 65537),
+    lambda phone: phone.request("abc"),
+    lambda phone: phone.ftm.set_channel(65536 + 9750),
+    lambda phone: phone.files.remove("/a\0b"),
+    lambda phone: phone.files.put(b"", "/a\0b"),
+    lambda phone: phone.backup("x.pkv", items=range(0, 200, 50)),
+    lambda phone: phone.backup("x.pkv", items=range(0)),
+    lambda phone: kral.connect(65536 + phone.port),
+    lambda phone: kral.connect(-1),
+])
+def test_what_c_would_cut_is_refused(phone, call):
+    with pytest.raises(kral.BadArgument):
+        call(phone)
+    phone.identity  # nothing was sent, and no other connection was closed
 
 
 def test_connects_that_fail(handset):
