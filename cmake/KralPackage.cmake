@@ -55,7 +55,7 @@ else()
   set(examples_folder ${CMAKE_INSTALL_DATADIR}/doc/libkral-dev/examples)
 endif()
 install(DIRECTORY examples/ DESTINATION ${examples_folder} COMPONENT development
-  PATTERN CMakeLists.txt EXCLUDE PATTERN __pycache__ EXCLUDE)
+  REGEX "/examples/CMakeLists[.]txt$" EXCLUDE PATTERN .clang-format EXCLUDE PATTERN __pycache__ EXCLUDE)
 
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/kral)
 install(EXPORT kralTargets NAMESPACE kral:: DESTINATION ${package_folder} COMPONENT development)
