@@ -200,8 +200,9 @@ uint64_t HexPhoneImageDecoder::CountReplaced(const PhoneImage& image, uint32_t r
       RecordBytes earlier;
       image.Read(static_cast<uint32_t>(address + (first - begin)), earlier.data(), static_cast<uint32_t>(last - first),
                  region);
-      for (uint64_t at = first; at < last; ++at) {
-        if (earlier[at - first] != data[at - begin]) ++replaced;
+      const auto now = data.subspan(static_cast<size_t>(first - begin), static_cast<size_t>(last - first));
+      for (size_t i = 0; i < now.size(); ++i) {
+        if (earlier[i] != now[i]) ++replaced;
       }
     }
     range->second = std::max({range->second, next->second, end});
