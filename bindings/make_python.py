@@ -61,6 +61,13 @@ class Data:
             kind = ctypes.c_char * len(view)
             return kind.from_buffer_copy(view) if view.readonly else kind.from_buffer(view)
         return ctypes.c_void_p.from_param(value)
+
+
+# What converts an argument in place of its type.
+CHECKED: Dict[Any, Any] = {{ctypes.c_char_p: Text, ctypes.c_void_p: Data}}
+for _kind in (ctypes.c_uint8, ctypes.c_int8, ctypes.c_uint16, ctypes.c_int16, ctypes.c_uint32, ctypes.c_int32,
+              ctypes.c_uint64, ctypes.c_int64):
+    CHECKED[_kind] = Number(_kind)
 '''
 
 API = '''
@@ -77,7 +84,7 @@ class Api:
             if function is None:
                 continue
             function.restype = result
-            function.argtypes = arguments
+            function.argtypes = [CHECKED.get(kind, kind) for kind in arguments]
             setattr(self, name, function)
 '''
 
@@ -106,15 +113,6 @@ def type_name(kind: headers.Type, size: str) -> str:
     if kind.name == "void" or kind.name == "uint8_t" and size:
         return "ctypes.c_void_p"
     return f"ctypes.POINTER({type_name(headers.Type(kind.name), '')})"
-
-
-def argument_type(kind: headers.Type, size: str) -> str:
-    """What ctypes asks to convert an argument of a function."""
-    name = type_name(kind, size)
-    checked = {"ctypes.c_char_p": "Text", "ctypes.c_void_p": "Data"}
-    if kind.pointers == 0 and name.startswith("ctypes.c_") and name != "ctypes.c_double":
-        return f"Number({name})"
-    return checked.get(name, name)
 
 
 def callback_type(argument: headers.Argument) -> str:
@@ -166,7 +164,7 @@ def callbacks(description: headers.Description) -> typing.Iterator[str]:
 def functions(description: headers.Description) -> typing.Iterator[str]:
     yield "\nPROTOTYPES: Dict[str, Tuple[Any, List[Any]]] = {"
     for function in description.functions:
-        types = ", ".join(argument_type(item.type, item.size) for item in function.arguments)
+        types = ", ".join(type_name(item.type, item.size) for item in function.arguments)
         yield f'    "{function.name}": ({result_type(function.result)}, [{types}]),'
     yield "}" + API
     for function in description.functions:
