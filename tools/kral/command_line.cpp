@@ -424,6 +424,7 @@ Option& Option::OneOf(std::initializer_list<std::string> words) {
   option_->type_name(Joined(list, "|"));
   Suggests([list](const std::vector<std::string>&) {
     std::vector<Completion> found;
+    found.reserve(list.size());
     for (const auto& word : list) found.push_back({word, ""});
     return found;
   });
