@@ -5,7 +5,6 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
-#include <charconv>
 #include <iostream>
 #include <limits>
 #include <map>
@@ -20,6 +19,7 @@
 #include "tools/kral/json.h"
 #include "tools/kral/man_pages.h"
 #include "tools/kral/nearest_word.h"
+#include "tools/kral/numbers.h"
 #include "tools/kral/output.h"
 #include "tools/kral/settings.h"
 
@@ -61,21 +61,6 @@ constexpr int kAnyNumber = CLI::detail::expected_max_vector_size;
 std::string TextOf(const NumberRange& range, const char* to) {
   const auto unit = *range.unit == '\0' ? std::string() : Format(" {}", range.unit);
   return Format("{:.12g}{}{:.12g}{}", range.least, to, range.most, unit);
-}
-
-template <class Number>
-std::optional<Number> ParseNumber(std::string_view text) {
-  const char* const end = text.data() + text.size();
-  Number value{};
-  std::from_chars_result parsed{};
-  if constexpr (std::is_floating_point_v<Number>) {
-    parsed = std::from_chars(text.data(), end, value);
-  } else {
-    const bool hex = text.starts_with("0x") || text.starts_with("0X");
-    parsed = std::from_chars(text.data() + (hex ? 2 : 0), end, value, hex ? 16 : 10);
-  }
-  if (parsed.ec != std::errc() || parsed.ptr != end) return std::nullopt;
-  return value;
 }
 
 // 64-bit numbers have no range of their own to tell: a double would not hold it.

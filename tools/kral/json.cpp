@@ -5,6 +5,7 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
+#include "tools/kral/output.h"
 #include "tools/kral/safe_text.h"
 
 namespace kral::tool {
@@ -79,22 +80,6 @@ void Json::update(const Json& object) {
   for (const auto& [name, value] : object.entries_) (*this)[name] = value;
 }
 
-namespace {
-
-std::string BytesOf(const std::string& text) {
-  constexpr const char* kDigits = "0123456789ABCDEF";
-  std::string bytes;
-  for (const char character : text) {
-    const auto byte = static_cast<unsigned char>(character);
-    if (!bytes.empty()) bytes += ' ';
-    bytes += kDigits[byte >> 4];
-    bytes += kDigits[byte & 15];
-  }
-  return bytes;
-}
-
-}  // namespace
-
 struct Json::Writer {
   static Json Value(const nlohmann::ordered_json& tree) {
     if (tree.is_object()) {
@@ -138,7 +123,9 @@ struct Json::Writer {
         for (const auto& [name, value] : json.entries_) {
           object[name] = Tree(value);
           // A name that is no text, to be given back.
-          if (value.kind_ == Kind::kText && !IsUtf8(value.text_)) object[name + "_bytes"] = BytesOf(value.text_);
+          if (value.kind_ == Kind::kText && !IsUtf8(value.text_))
+            object[name + "_bytes"] =
+                HexText({reinterpret_cast<const std::uint8_t*>(value.text_.data()), value.text_.size()});
         }
         return object;
       }

@@ -6,6 +6,7 @@
 #include <map>
 #include <string_view>
 
+#include "tools/kral/clock_text.h"
 #include "tools/kral/format.h"
 #include "tools/kral/page.h"
 
@@ -203,13 +204,7 @@ std::string RunPage(const RunHead& head, const std::vector<const Verdict*>& verd
 }
 
 std::string TimeNow() {
-  const auto now = std::chrono::floor<std::chrono::seconds>(std::chrono::system_clock::now());
-  const auto day = std::chrono::floor<std::chrono::days>(now);
-  const std::chrono::year_month_day date(day);
-  const std::chrono::hh_mm_ss time(now - day);
-  return Format("{}-{:02}-{:02} {:02}:{:02}:{:02} UTC", static_cast<int>(date.year()),
-                static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), time.hours().count(),
-                time.minutes().count(), time.seconds().count());
+  return ClockText(std::chrono::floor<std::chrono::seconds>(std::chrono::system_clock::now())) + " UTC";
 }
 
 }  // namespace kral::tool

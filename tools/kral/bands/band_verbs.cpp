@@ -1,15 +1,14 @@
 // kral band: bands, their channels and carrier frequencies. Pure arithmetic: no handset is needed.
 #include <array>
 #include <cctype>
-#include <charconv>
 #include <memory>
-#include <optional>
 #include <set>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "tools/kral/format.h"
+#include "tools/kral/numbers.h"
 #include "tools/kral/verbs.h"
 
 namespace kral::tool {
@@ -25,16 +24,6 @@ constexpr std::array<Direction, 3> kDirections{{
     {KRAL_BAND_UPLINK, "uplink", KRAL_Band_Helper_CalculateULFrequency},
     {KRAL_BAND_DOWNLINK, "downlink", KRAL_Band_Helper_CalculateDLFrequency},
 }};
-
-// Decimal, or hexadecimal with 0x in front; nothing for what is no number.
-std::optional<std::uint16_t> ParseBandId(std::string_view text) {
-  const bool is_hex = text.starts_with("0x") || text.starts_with("0X");
-  if (is_hex) text.remove_prefix(2);
-  std::uint16_t id = 0;
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), id, is_hex ? 16 : 10);
-  if (text.empty() || error != std::errc() || end != text.data() + text.size()) return std::nullopt;
-  return id;
-}
 
 struct ChannelRange {
   std::int32_t first;
@@ -109,7 +98,7 @@ std::vector<std::uint16_t> BandsNamed(const std::string& text) {
 
 // By id or by name. Several that are called so are one where the channel is the same carrier in all that have it.
 std::uint16_t BandOf(const std::string& text, const Direction& direction, std::int32_t channel) {
-  if (const auto id = ParseBandId(text)) return *id;
+  if (const auto id = ParseNumber<std::uint16_t>(text)) return *id;
   const auto bands = BandsNamed(text);
   std::vector<std::uint16_t> with_channel;
   std::set<double> carriers;

@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "kral/efs.h"
+#include "tools/kral/clock_text.h"
 #include "tools/kral/format.h"
 
 namespace kral::tool {
@@ -136,14 +137,7 @@ std::string ModeText(std::uint32_t mode) {
 }
 
 std::string TimeText(std::uint32_t seconds) {
-  // Not by time_t, which has 32 bits on 32-bit Windows.
-  const std::chrono::sys_seconds time{std::chrono::seconds(std::int64_t{seconds})};
-  const auto day = std::chrono::floor<std::chrono::days>(time);
-  const std::chrono::year_month_day date(day);
-  const std::chrono::hh_mm_ss clock(time - day);
-  return Format("{:04}-{:02}-{:02} {:02}:{:02}:{:02}", static_cast<int>(date.year()),
-                static_cast<unsigned>(date.month()), static_cast<unsigned>(date.day()), clock.hours().count(),
-                clock.minutes().count(), clock.seconds().count());
+  return ClockText(std::chrono::sys_seconds(std::chrono::seconds(std::int64_t{seconds})));
 }
 
 std::string ErrorText(std::uint32_t error_number) {

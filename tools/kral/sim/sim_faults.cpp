@@ -9,6 +9,7 @@
 
 #include "tools/kral/exit_codes.h"
 #include "tools/kral/format.h"
+#include "tools/kral/numbers.h"
 
 namespace kral::tool {
 namespace {
@@ -63,15 +64,6 @@ Word TakeWord(std::string_view& rest) {
   return {word.substr(0, equals), word.substr(equals + 1)};
 }
 
-std::optional<std::uint32_t> ParseNumber(std::string_view text) {
-  const bool hex = text.starts_with("0x") || text.starts_with("0X");
-  if (hex) text.remove_prefix(2);
-  std::uint32_t value = 0;
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value, hex ? 16 : 10);
-  if (error != std::errc() || end != text.data() + text.size()) return std::nullopt;
-  return value;
-}
-
 std::optional<When> ParseWhen(const Word& word) {
   if (word.name == "chance") {
     double probability = 0;
@@ -80,7 +72,7 @@ std::optional<When> ParseWhen(const Word& word) {
     if (error != std::errc() || end != last || probability < 0 || probability > 1) return std::nullopt;
     return When::Chance(probability);
   }
-  const auto number = ParseNumber(word.value);
+  const auto number = ParseNumber<std::uint32_t>(word.value);
   if (!number || *number == 0) return std::nullopt;
   if (word.name == "nth") return When::Nth(*number);
   if (word.name == "from") return When::From(*number);
@@ -95,7 +87,7 @@ Fault ParseKind(const std::string& words, const Word& word) {
     if (!word.value.empty()) Reject(words, Format("{} takes no value", kind->name));
     return kind->make(0);
   }
-  const auto value = ParseNumber(word.value);
+  const auto value = ParseNumber<std::uint32_t>(word.value);
   if (!value || (kind->value == "code" && *value > 0xFF)) {
     Reject(words, Format("{} needs a value, {}={}", kind->name, kind->name, kind->value));
   }
@@ -113,7 +105,7 @@ void AddFault(handset::FaultPlan& faults, const std::string& words) {
   while (!rest.empty()) {
     const auto word = TakeWord(rest);
     if (word.name == "longer") {
-      const auto bytes = ParseNumber(word.value);
+      const auto bytes = ParseNumber<std::uint32_t>(word.value);
       if (!bytes || *bytes == 0) Reject(words, "longer needs a number of bytes, longer=2100");
       longer_than = *bytes;
       continue;
