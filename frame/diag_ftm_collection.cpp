@@ -55,8 +55,13 @@ bool Diag_FTM::StopCapture() {
 
 bool Diag_FTM::StartPlayback(const char* file_name, PlayPace pace, const CaptureStretch& stretch) {
   // Through a phone server there is no dispatcher to play into.
-  if (!server_mode() &&
-      player().Start(OpenCaptureSourceAt(file_name, stretch.from), pace, dispatcher(), sorter(), parts_, stretch)) {
+  bool is_sought = true;
+  if (!server_mode() && player().Start(OpenCaptureSourceAt(file_name, stretch.from, &is_sought), pace, dispatcher(),
+                                       sorter(), parts_, stretch)) {
+    if (stretch.from != 0 && !is_sought) {
+      log().WriteLine(kLogErr, "Capture file: %s was not ended, or its times step back: it is read from its beginning",
+                      file_name);
+    }
     return true;
   }
   log().WriteLine(kLogErr, "Capture file: %s cannot be read or is being written, or a file is played already",

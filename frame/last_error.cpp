@@ -45,7 +45,9 @@ LastErrors::Entry& LastErrors::Place(KRAL_HANDLE handle, uint32_t thread) {
 void LastErrors::Note(KRAL_HANDLE handle, const KRAL_ERROR& error) noexcept try {
   const uint32_t thread = ThisThread();
   const MutexLock lock(mutex_);
-  Place(handle, thread) = {handle, thread, ++noted_, error};
+  Entry& entry = Place(handle, thread);
+  entry = {handle, thread, ++noted_, error};
+  entry.error.number = static_cast<uint32_t>(entry.order);
 } catch (...) {
   // No memory, and no older record to write over.
 }
@@ -62,8 +64,10 @@ bool LastErrors::Find(KRAL_HANDLE handle, KRAL_ERROR& error) const noexcept {
     }
     if (handle != 0 && (found == nullptr || entry.order > found->order)) found = &entry;
   }
-  if (found != nullptr) error = found->error;
-  return found != nullptr;
+  if (found == nullptr) return false;
+  error = found->error;
+  if (found->thread != thread) error.present |= KRAL_ERROR_OF_OTHER_THREAD;
+  return true;
 }
 
 void LastErrors::Forget(KRAL_HANDLE handle) noexcept {

@@ -13,7 +13,7 @@ static_assert(sizeof(KRAL_PKV_COUNTS) == 28);
 static_assert(sizeof(KRAL_PKV_ITEM) == 16);
 static_assert(sizeof(KRAL_TRAFFIC_COUNTERS) == 120);
 static_assert(sizeof(KRAL_TRACE_COUNTERS) == 48);
-static_assert(sizeof(KRAL_VENTRIMS_OPTIONS) == 32);
+static_assert(sizeof(KRAL_VENTRIMS_OPTIONS) == 36);
 static_assert(sizeof(KRAL_VENTRIMS_STATE) == 56);
 static_assert(sizeof(KRAL_VENTRIMS_PROGRESS) == 264);
 static_assert(sizeof(KRAL_VENTRIMS_RESULT) == 632);

@@ -18,6 +18,8 @@ namespace kral {
 // written by two. (On Linux other programs, and file systems that know no locks, may do so all the same.)
 std::FILE* OpenToRead(const std::string& path);
 std::FILE* OpenToWrite(const std::string& path);  // emptied, or made
+// Made; std::errc::file_exists where anything has that name. Of two that do this at once, one makes it.
+std::error_code OpenToWriteNew(const std::string& path, std::FILE*& stream);
 // Closes what these two have opened; false when not everything reached the file.
 bool CloseStream(std::FILE* stream);
 // Whether one of these two has the file open, by whatever name.
@@ -66,6 +68,8 @@ class AtomicFile {
 
   std::error_code Open(const std::string& path);
   std::error_code Write(std::span<const uint8_t> bytes);
+  // What was written there before; nothing is written behind it any more.
+  std::error_code Rewrite(uint64_t offset, std::span<const uint8_t> bytes);
   std::error_code Commit();  // on the disk and under the target's name, replacing what was there
 
  private:

@@ -3,6 +3,7 @@
 #ifndef KRAL_PLATFORM_FOLDER_H
 #define KRAL_PLATFORM_FOLDER_H
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
 #include <system_error>
@@ -32,6 +33,9 @@ std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& en
 std::error_code MakeFolder(const std::string& path);
 
 std::error_code RemoveFile(const std::string& path);
+
+// Where in a path the name of the file begins, behind its folder.
+size_t NameBegin(const std::string& path);
 
 // '/' goes between them, which both platforms understand.
 std::string JoinPath(const std::string& folder, const std::string& name);

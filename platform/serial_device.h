@@ -36,6 +36,7 @@ class SerialDevice {
   // Returns at once with what the driver holds, 0 bytes included. `gone` turns true when the device has vanished.
   virtual size_t Read(std::span<uint8_t> buffer) = 0;
   virtual size_t InputWaiting() = 0;
+  virtual bool HasInput() { return InputWaiting() > 0; }
   virtual bool gone() const = 0;
 
   // Waits until bytes can be read (true), or until Wake or the time-out (false). A Wake that comes before the wait

@@ -74,7 +74,7 @@ KRAL_API uint32_t KRAL_CALL KRAL_GetLibraryVersionNumber(void);
 
 /** Receive modes: how the receive thread of a connection waits for bytes. */
 #define KRAL_RECEIVE_MODE_POLL 0 /* sleeps 1 ms between reads, which costs each request about that much */
-#define KRAL_RECEIVE_MODE_WAKE 1 /* waits in the port and wakes with the first byte */
+#define KRAL_RECEIVE_MODE_WAKE 1 /* waits in the port; a thread that awaits a reply may do so in its place */
 
 /**
  * Chooses how the receive threads of the connections made afterwards wait for bytes.

@@ -50,9 +50,10 @@ extern "C" {
  * @name Bits of KRAL_ERROR::present
  * @{
  */
-#define KRAL_ERROR_HAS_COMMAND 1 /**< command is set */
-#define KRAL_ERROR_HAS_OFFSET 2  /**< offset is set */
-#define KRAL_ERROR_HAS_LINE 4    /**< line is set */
+#define KRAL_ERROR_HAS_COMMAND 1     /**< command is set */
+#define KRAL_ERROR_HAS_OFFSET 2      /**< offset is set */
+#define KRAL_ERROR_HAS_LINE 4        /**< line is set */
+#define KRAL_ERROR_OF_OTHER_THREAD 8 /**< the failure is another thread's: the calling one has none on the handle */
 /** @} */
 
 /** One failure: 360 bytes without padding, the same on all platforms. Texts are UTF-8, terminated, without controls. */
@@ -61,10 +62,10 @@ typedef struct KRAL_ERROR {
   uint32_t status_kind;  /**< one of KRAL_ERROR_STATUS_ */
   uint32_t status;       /**< what the handset said */
   uint32_t system_error; /**< errno, or GetLastError() on Windows; 0 when the system had no part in it */
-  uint32_t present;      /**< KRAL_ERROR_HAS_ bits */
+  uint32_t present;      /**< KRAL_ERROR_HAS_ bits, and whose failure it is */
   uint32_t command;      /**< the first four bytes of the request, the first one lowest: 75, subsystem, command */
   uint32_t line;         /**< line of a text file, from 1 */
-  uint32_t reserved;     /**< 0 */
+  uint32_t number;       /**< of the failure, as KRAL_GetLastError gives it: a later one has another */
   uint64_t offset;       /**< byte offset in the file or memory concerned */
   char function[64];     /**< the exported function that failed */
   char text[256];        /**< one sentence that names what was wrong */
@@ -74,9 +75,10 @@ typedef struct KRAL_ERROR {
  * Gets the record of the calling thread's last failed call on a handle. Where this thread has none on it, the latest
  * one of any thread: hosts such as LabVIEW move a program between threads.
  *
- * A successful call does not clear the record (as with errno): look only after a failure. Records are kept for the
- * latest few hundred failures; those of a handle are forgotten when a connect returns its value again. Functions whose
- * 0 is an answer, such as KRAL_IsLoggingStarted, leave a record only when they could not ask.
+ * A successful call does not clear the record (as with errno): look only after a failure. Functions whose 0 is an
+ * answer, such as KRAL_IsLoggingStarted, leave a record only when they could not ask; then its `number` is a new one.
+ * Records are kept for the latest few hundred failures; those of a handle are forgotten when a connect returns its
+ * value again.
  *
  * @param      handle  from a connect function, or one that is not valid any more; 0: the calling thread's last failed
  *                     connect, or failed call of a function without handle

@@ -98,6 +98,14 @@ std::FILE* OpenToWrite(const std::string& path) {
   return MakeStream(std::move(file), "wb");
 }
 
+std::error_code OpenToWriteNew(const std::string& path, std::FILE*& stream) {
+  FileDescriptor file;
+  if (const auto error = OpenIf(IsOrdinary, path, O_WRONLY | O_CREAT | O_EXCL, file)) return error;
+  if (IsHeldByAnother(file.get(), LOCK_EX)) return std::make_error_code(std::errc::file_exists);
+  stream = MakeStream(std::move(file), "wb");
+  return stream != nullptr ? std::error_code() : LastError();
+}
+
 bool IsInUse(const std::string& path) {
   FileDescriptor file;
   if (OpenIf(IsOrdinary, path, O_RDONLY, file)) return false;
@@ -214,6 +222,12 @@ std::error_code AtomicFile::Write(std::span<const uint8_t> bytes) {
     }
   }
   return state.failed;
+}
+
+std::error_code AtomicFile::Rewrite(uint64_t offset, std::span<const uint8_t> bytes) {
+  State& state = *state_;
+  if (!state.failed && ::lseek(state.file.get(), static_cast<off_t>(offset), SEEK_SET) < 0) state.failed = LastError();
+  return Write(bytes);
 }
 
 std::error_code AtomicFile::Commit() {

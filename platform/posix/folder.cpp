@@ -48,6 +48,10 @@ std::error_code MakeFolder(const std::string& path) {
   return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
 }
 
+size_t NameBegin(const std::string& path) {
+  return path.rfind('/') + 1;  // 0 behind npos
+}
+
 std::error_code RemoveFile(const std::string& path) {
   return ::unlink(path.c_str()) == 0 ? std::error_code() : LastError();
 }

@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/folder.h"
 #include "platform/win32/last_error.h"
 #include "platform/win32/wide_text.h"
 #include "platform/win32/win_handle.h"
@@ -118,6 +119,14 @@ std::FILE* OpenToRead(const std::string& path) {
 
 std::FILE* OpenToWrite(const std::string& path) {
   return OpenEmptied(IsOrdinary, path, FILE_SHARE_READ, _O_BINARY, "wb");
+}
+
+std::error_code OpenToWriteNew(const std::string& path, std::FILE*& stream) {
+  WinHandle file;
+  const auto error = OpenIf(IsOrdinary, path, {GENERIC_WRITE, FILE_SHARE_READ, CREATE_NEW}, file);
+  if (error) return LookAt(path).kind != LocalKind::kMissing ? std::make_error_code(std::errc::file_exists) : error;
+  stream = MakeStream(std::move(file), _O_BINARY, "wb");
+  return stream != nullptr ? std::error_code() : std::make_error_code(std::errc::io_error);
 }
 
 // Neither shares a file with others that write.
@@ -231,6 +240,14 @@ std::error_code AtomicFile::Write(std::span<const uint8_t> bytes) {
     bytes = bytes.subspan(written);
   }
   return state.failed;
+}
+
+std::error_code AtomicFile::Rewrite(uint64_t offset, std::span<const uint8_t> bytes) {
+  State& state = *state_;
+  LARGE_INTEGER place{};
+  place.QuadPart = static_cast<LONGLONG>(offset);
+  if (!state.failed && !::SetFilePointerEx(state.file.get(), place, nullptr, FILE_BEGIN)) state.failed = LastError();
+  return Write(bytes);
 }
 
 std::error_code AtomicFile::Commit() {

@@ -56,6 +56,10 @@ std::error_code MakeFolder(const std::string& path) {
   return LookAt(path).kind == LocalKind::kFolder ? std::error_code() : error;
 }
 
+size_t NameBegin(const std::string& path) {
+  return path.find_last_of("/\\") + 1;  // 0 behind npos
+}
+
 std::error_code RemoveFile(const std::string& path) {
   return ::DeleteFileW(WidePath(path).c_str()) ? std::error_code() : LastError();
 }

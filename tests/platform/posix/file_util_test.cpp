@@ -16,6 +16,7 @@
 #include "tests/support/temp_folder.h"
 #include "tests/support/test.h"
 #include "transport/collection/capture_reader.h"
+#include "transport/collection/capture_series.h"
 #include "transport/collection/capture_writer.h"
 
 namespace {
@@ -63,6 +64,12 @@ TEST_F(Pipes, AreNoFilesAndNeverWaitedFor) {
   EXPECT_EQ(KRAL_EfsWrite(handle(), pipe_.c_str(), "/file"), 0);
   EXPECT_FALSE(OpenCaptureSource(pipe_));
   EXPECT_FALSE(OpenCaptureFile(pipe_));
+}
+
+TEST(CaptureSeriesTest, NameMayHaveABackslash) {
+  const test::TempFolder folder;
+  EXPECT_TRUE(CaptureSeries(folder.Path("a\\b.cap"), 0)());
+  EXPECT_TRUE(std::filesystem::exists(folder.Path("a\\b-00001.cap")));
 }
 
 TEST_F(Pipes, TakeTheTextLogOnceSomebodyReadsAndTheReadersEndCostsLinesOnly) {
