@@ -4,6 +4,7 @@
 #define KRAL_TESTS_SUPPORT_TEST_WIRE_H
 
 #include <condition_variable>
+#include <thread>
 
 #include "tests/support/fake_device.h"
 #include "tests/support/plain_codec.h"
@@ -47,6 +48,7 @@ class TestWire {
     Wake();
   }
   uint64_t reads() const { return reads_; }
+  std::thread::id last_reader() const { return last_reader_; }
   int opened() const { return opened_; }
 
   // --- The host's side ----------------------------------------------------------------------------------------------
@@ -66,6 +68,7 @@ class TestWire {
     explicit Device(TestWire& wire) : wire_(wire) {}
     size_t Write(std::span<const uint8_t> bytes, uint32_t) override { return wire_.Write(bytes); }
     size_t Read(std::span<uint8_t> buffer) override { return wire_.Read(buffer); }
+    bool HasInput() override { return wire_.HasInput(); }
     bool gone() const override { return wire_.vanished_; }
     bool WaitReadable(uint32_t milliseconds) override { return wire_.WaitReadable(milliseconds); }
     void Wake() override { wire_.Wake(); }
@@ -90,6 +93,7 @@ class TestWire {
 
   size_t Read(std::span<uint8_t> buffer) {
     ++reads_;
+    last_reader_ = std::this_thread::get_id();
     std::unique_lock lock(mutex_);
     holding_ = hold_;
     changed_.notify_all();
@@ -108,6 +112,11 @@ class TestWire {
     std::unique_lock lock(mutex_);
     changed_.wait_for(lock, std::chrono::milliseconds(milliseconds), [this] { return wake_ || !chunks_.empty(); });
     wake_ = false;
+    return !chunks_.empty();
+  }
+
+  bool HasInput() {
+    const std::lock_guard lock(mutex_);
     return !chunks_.empty();
   }
 
@@ -147,6 +156,7 @@ class TestWire {
   std::atomic<bool> fail_writes_{false};
   std::atomic<bool> vanished_{false};
   std::atomic<uint64_t> reads_{0};
+  std::atomic<std::thread::id> last_reader_{};
   std::atomic<int> opened_{0};
 };
 

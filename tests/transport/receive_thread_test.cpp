@@ -132,6 +132,91 @@ TEST(ReceiveThread, WakeOnDataReadsOnlyWhatIsThereAndLeavesAVanishedDeviceAlone)
   EXPECT_TRUE(Eventually([&] { return engine->responses.size() == 2; })) << "the reopened one is read";
 }
 
+// --- Replies read by who awaits them ---------------------------------------------------------------------------------
+
+struct Conversation : testing::Test {
+  Conversation() {
+    engine->transport.SetReceiveMode(ReceiveMode::kWakeOnData);
+    wire.OnWrite([](const Bytes&) { return PlainFrame({5, 6}); });
+  }
+  Reply Ask() { return engine->transport.SendSync(Bytes{5}, room, 5, 60000, 0); }
+  bool IsReader() const { return wire.last_reader() == std::this_thread::get_id(); }
+  bool Begins() {
+    return engine->OpenDevice() && Eventually([this] { return Ask() && IsReader(); });
+  }
+  // Of a request that is not answered at first.
+  Reply AskWhile(const std::function<void()>& happens) {
+    wire.OnWrite({});
+    const size_t before = wire.Written().size();
+    std::thread other([&] {
+      Eventually([&] { return wire.Written().size() > before; });
+      std::this_thread::sleep_for(milliseconds(10));
+      happens();
+    });
+    const Reply reply = Ask();
+    other.join();
+    return reply;
+  }
+
+  TestWire wire;
+  Bytes room = Bytes(8);
+  EngineGuard engine{EngineBundle::Make(wire.AsDevice(), SystemClock(), 0)};
+};
+
+TEST_F(Conversation, TakesNoReplyThatCameBetweenTheRequests) {
+  ASSERT_TRUE(Begins());
+  for (int i = 0; i < 20; ++i) {
+    wire.ToHost(PlainFrame({5, 9}));
+    ASSERT_TRUE(Ask());
+    ASSERT_EQ(room[1], 6) << i;
+  }
+}
+
+TEST_F(Conversation, LeavesOtherTrafficToTheReceiveThread) {
+  engine->sorter.SetCollection(true);
+  const Bytes log = PlainFrame({16, 1, 2, 3});
+  ASSERT_TRUE(Begins());
+  wire.ToHost(log);
+  EXPECT_TRUE(Eventually([this] { return engine->asynchronous.size() == 1; })) << "nobody asks for anything";
+  wire.OnWrite([&log](const Bytes&) {
+    Bytes both = log;
+    const Bytes reply = PlainFrame({5, 6});
+    both.insert(both.end(), reply.begin(), reply.end());
+    return both;
+  });
+  ASSERT_TRUE(Ask());
+  ASSERT_TRUE(Ask());
+  EXPECT_FALSE(IsReader());
+  EXPECT_TRUE(Eventually([this] { return engine->asynchronous.size() == 3; }));
+}
+
+TEST_F(Conversation, IsEndedByAnAbort) {
+  ASSERT_TRUE(Begins());
+  std::atomic<bool> abort{false};
+  engine->transport.SetAbort(&abort);
+  const Reply reply = AskWhile([&] {
+    abort = true;
+    engine->transport.WakeWaiter();
+  });
+  EXPECT_EQ(reply.kind(), ReplyKind::kAborted);
+}
+
+TEST_F(Conversation, IsEndedByTheDevicesEnd) {
+  ASSERT_TRUE(Begins());
+  EXPECT_EQ(AskWhile([this] { wire.Vanish(true); }).kind(), ReplyKind::kGone);
+}
+
+TEST_F(Conversation, GoesOnInAnotherReceiveMode) {
+  ASSERT_TRUE(Begins());
+  EXPECT_TRUE(AskWhile([this] {
+    engine->transport.SetReceiveMode(ReceiveMode::kAsWritten);
+    wire.ToHost(PlainFrame({5, 6}));
+  }));
+  wire.OnWrite([](const Bytes&) { return PlainFrame({5, 6}); });
+  EXPECT_TRUE(Ask());
+  EXPECT_FALSE(IsReader());
+}
+
 // --- Caller's transports that tell of bytes, or wait for them -------------------------------------------------------
 
 struct CallersTransport : testing::Test {

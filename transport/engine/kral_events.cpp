@@ -65,11 +65,11 @@ void CKralEvents::Push(std::span<const uint8_t> packet) {
   PushAll(one);
 }
 
-void CKralEvents::PushAll(std::vector<Packet>& packets) {
+void CKralEvents::PushAll(std::vector<Packet>& packets, bool may_pump) {
   // The queue is locked for moments only. The receive thread may be one that shows windows for the caller's
   // transport, whose messages must not wait even so.
   while (!queue_mutex_.TryLock()) {
-    PumpPendingMessages();
+    if (may_pump) PumpPendingMessages();
     std::this_thread::yield();
   }
   bool was_empty = false;

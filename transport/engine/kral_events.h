@@ -43,8 +43,9 @@ class CKralEvents {
   // From the receive thread: pumps the calling thread's messages while the queue is busy. Without a running
   // dispatcher thread the packet is dropped.
   void Push(std::span<const uint8_t> packet);
-  // The same for several at once, which are gone from the vector afterwards.
-  void PushAll(std::vector<Packet>& packets);
+  // The same for several at once, which are gone from the vector afterwards. A thread of the caller's must not have its
+  // messages pumped.
+  void PushAll(std::vector<Packet>& packets, bool may_pump = true);
 
   // Takes the packets through the listeners at once, on the calling thread, and empties the vector. False where that is
   // not done: packets that came before are still on their way, the packets are many, or a listener may take long.

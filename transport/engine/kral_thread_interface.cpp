@@ -28,6 +28,7 @@ CKralThreadInterface::CKralThreadInterface(DataLogFileHandler& log, Clock& clock
     : log_(log), clock_(clock), port_(clock, std::move(opener)), framer_(clock) {
   framer_.SetPort(&port_);
   framer_.SetLogger(&log);
+  feed_.loop = &loop_;
   loop_.SetGoneHandler([this] {
     log_.WriteLine(kLogErr, "Error. The device has gone: its port is closed");
     EndWaits();
@@ -49,6 +50,11 @@ void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> pac
   constexpr size_t kManyPackets = 64;
   gathered_.emplace_back(packet.begin(), packet.end());
   const bool is_answer = packet.empty() || !IsAsynchronousCode(packet.front());
+  if (is_answer) {
+    loop->turn().NoteReply();
+  } else {
+    loop->turn().NoteOther();
+  }
   if (is_answer || gathered_.size() >= kManyPackets) OnBatchEnd();
 }
 
@@ -56,7 +62,10 @@ void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   if (gathered_.empty()) return;
   // Counted first: whoever has been given a packet finds it counted.
   packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
-  if (dispatcher != nullptr && !dispatcher->DispatchHere(gathered_)) dispatcher->PushAll(gathered_);
+  if (dispatcher != nullptr && !dispatcher->DispatchHere(gathered_)) {
+    loop->turn().NoteOther();
+    dispatcher->PushAll(gathered_, loop->on_thread());
+  }
   gathered_.clear();
 }
 
@@ -220,6 +229,11 @@ bool CKralThreadInterface::NotifyReceived() {
 void CKralThreadInterface::SetReceiveMode(ReceiveMode mode) {
   loop_.SetMode(mode);
   WakeReceiver();
+}
+
+void CKralThreadInterface::WakeWaiter() {
+  if (responses_ != nullptr) responses_->EndWaits();
+  port_.Wake();
 }
 
 // Wherever the thread waits, it looks at its settings again.

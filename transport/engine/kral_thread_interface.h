@@ -79,9 +79,10 @@ class CKralThreadInterface {
                  uint32_t delay_ms, const ReplyTest& is_own = {});
   // Awaits another reply to the request that was sent last; a time-out leaves the port open.
   Reply AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms, const ReplyTest& is_own = {});
-  // What ends the wait for a reply once it is set and EndWaits of the response queue was called; null: nothing. A
+  // What ends the wait for a reply once it is set and WakeWaiter was called; null: nothing. A
   // handset that is only slow may answer for a moment still. The port stays open. Returns the former one.
   const std::atomic<bool>* SetAbort(const std::atomic<bool>* abort) { return std::exchange(abort_, abort); }
+  void WakeWaiter();  // for the abort that has just been set; from any thread
   bool aborted() const { return abort_ != nullptr && abort_->load(); }
   // Is given every reply that no request takes: one that comes between two requests, answers an earlier one, or has
   // another first byte; empty: nobody.
@@ -115,13 +116,14 @@ class CKralThreadInterface {
   CSerialPort& port() { return port_; }
 
  private:
-  // Takes the splitter's packets on the receive thread. The asynchronous ones of a chunk are handed on together: for
+  // Takes the splitter's packets on the thread that reads. The asynchronous ones of a chunk are handed on together: for
   // each of a flood the dispatcher would be met at its lock and woken.
   class DispatcherFeed final : public PacketListener {
    public:
     void OnPacket(std::span<const uint8_t> packet) override;
     void OnBatchEnd() override;
     CKralEvents* dispatcher = nullptr;
+    ReceiveLoop* loop = nullptr;
     std::atomic<uint64_t> packets{0};
 
    private:

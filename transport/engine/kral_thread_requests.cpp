@@ -77,6 +77,7 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
 // Only replies to the request that follows shall count. What has been read already answers an earlier one: it is let
 // through to the queue before that is cleared, or a reply that came twice would fail the next request.
 void CKralThreadInterface::ForgetReplies() {
+  loop_.ReadWaiting();
   loop_.WaitForChunk(kSettleMs);
   if (feed_.dispatcher != nullptr) feed_.dispatcher->WaitUntilDispatched(kSettleMs);
   for (const Packet& record : responses_->TakeAll()) {
@@ -123,6 +124,8 @@ std::optional<Packet> CKralThreadInterface::PopWithin(std::chrono::milliseconds 
     control_.Notify();
     left = std::chrono::ceil<std::chrono::milliseconds>(end - steady_clock::now());
   }
+  loop_.ReadHere(left, [this] { return responses_->size() > 0 || responses_->closed() || aborted(); });
+  left = std::chrono::ceil<std::chrono::milliseconds>(end - steady_clock::now());
   return responses_->PopWithin(std::max(left, std::chrono::milliseconds(0)), abort_);
 }
 
@@ -169,6 +172,7 @@ Reply CKralThreadInterface::SendRaw(std::span<const uint8_t> request, std::span<
 }
 
 Reply CKralThreadInterface::PollRecord(std::span<uint8_t> room, uint32_t time_out_ms) {
+  loop_.TakeBack();
   const uint32_t start = clock_.TickMs();
   for (uint32_t turn = 1;; ++turn) {
     const bool ended = responses_->closed();
@@ -190,6 +194,7 @@ Reply CKralThreadInterface::SendASync(std::span<const uint8_t> request, uint32_t
     log_.WriteLine(kLogErr, "Send Sync skipped for NULL port");
     return ReplyKind::kNullPort;
   }
+  loop_.TakeBack();  // what comes of it is not awaited here
   const uint32_t start = clock_.TickMs();
   const auto size = static_cast<uint32_t>(request.size());
   if (framer_.Send(request.data(), size, time_out_ms, start_flag ? 1 : 0) != 1) {

@@ -20,6 +20,12 @@ constexpr uint32_t kUntilSomethingHappens = UINT32_MAX;
 // Between two looks at a caller's transport that tells of nothing.
 constexpr uint32_t kPollEveryMs = 1;
 
+// How long the thread stands aside for a request that may follow: traffic that nobody asked for waits as long.
+constexpr uint32_t kAsideMs = 5;
+
+// More than a conversation leaves behind; a flood is the receive thread's.
+constexpr int kFewReads = 4;
+
 }  // namespace
 
 void ReceiveLoop::Run() {
@@ -28,6 +34,7 @@ void ReceiveLoop::Run() {
   thread_ = std::this_thread::get_id();
   acknowledged_pause_ = 0;
   sleep_counter_ = 0;
+  turn_.Reset();
   while (!control_.stop_requested()) {
     const uint32_t changes_seen = control_.changes();
     const bool wake_on_data = mode_ == ReceiveMode::kWakeOnData;
@@ -44,6 +51,7 @@ void ReceiveLoop::Run() {
       clock_.SleepMs(1);  // nothing came where something was promised
     }
     if (port_.CloseIfGone() && on_gone_) on_gone_();
+    if (wake_on_data) StandAside(changes_seen);
   }
   log_.WriteLine(kLogFn, "THREAD: Stop thread request detected, setting stop ACK event");
 }
@@ -90,6 +98,51 @@ void ReceiveLoop::ReadFromCaller(uint32_t changes_seen) {
   control_.WaitForChange(changes_seen, is_told ? kUntilSomethingHappens : kPollEveryMs);
 }
 
+// Whatever is asked of the thread meanwhile is a change.
+void ReceiveLoop::StandAside(uint32_t changes_seen) {
+  if (port_.user_defined() || !turn_.StandAside()) return;
+  do {
+    control_.WaitForChange(changes_seen, kAsideMs);
+  } while (!turn_.Resume(control_.changes() != changes_seen));
+}
+
+bool ReceiveLoop::TakeTurn() {
+  return mode_ == ReceiveMode::kWakeOnData && !port_.user_defined() && turn_.Take();
+}
+
+void ReceiveLoop::ReadHere(std::chrono::milliseconds time_out, const std::function<bool()>& done) {
+  using std::chrono::steady_clock;
+  if (!TakeTurn()) return;
+  const auto end = steady_clock::now() + time_out;
+  bool is_done = done();
+  const AtExit given_back([&] {
+    turn_.GiveBack();
+    // A time-out, a device that is gone, or something that is asked of the thread: all of it is the thread's.
+    if (!is_done) control_.Notify();
+  });
+  while (!is_done && turn_.is_quiet()) {
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(end - steady_clock::now()).count();
+    if (left <= 0 || !port_.WaitReadable(static_cast<uint32_t>(left)) || !ReadChunk()) break;
+    is_done = done();
+  }
+}
+
+void ReceiveLoop::ReadWaiting() {
+  if (!TakeTurn()) return;
+  bool is_empty = false;
+  const AtExit given_back([&] {
+    turn_.GiveBack();
+    if (!is_empty) control_.Notify();
+  });
+  for (int i = 0; i < kFewReads && turn_.is_quiet() && !is_empty; ++i) {
+    is_empty = !port_.HasInput() || !ReadChunk();
+  }
+}
+
+void ReceiveLoop::TakeBack() {
+  if (turn_.is_aside()) control_.Notify();
+}
+
 void ReceiveLoop::ForgetCaller() {
   callers_wait_ms_ = 0;
   caller_notifies_ = false;
@@ -98,7 +151,7 @@ void ReceiveLoop::ForgetCaller() {
 void ReceiveLoop::NotifyReceived() {
   // In the receive function itself it tells nothing: what brings bytes is asked again anyway, and what brings none and
   // tells of some would be asked for ever.
-  if (std::this_thread::get_id() == thread_.load()) return;
+  if (on_thread()) return;
   caller_notifies_ = true;
   control_.Notify();
 }

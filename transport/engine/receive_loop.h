@@ -3,6 +3,7 @@
 #define KRAL_TRANSPORT_ENGINE_RECEIVE_LOOP_H
 
 #include <atomic>
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <thread>
@@ -12,6 +13,7 @@
 #include "base/mutex.h"
 #include "kral/connection.h"
 #include "platform/clock.h"
+#include "transport/engine/reader_turn.h"
 
 namespace kral {
 
@@ -47,6 +49,16 @@ class ReceiveLoop {
 
   void Run();
 
+  // Reads on the calling thread, which awaits a reply, until `done` holds or for at most that long, unless the receive
+  // thread reads, or is to take over. Not on a caller's transport, nor in receive mode 0.
+  void ReadHere(std::chrono::milliseconds time_out, const std::function<bool()>& done);
+  // The same for what has come already.
+  void ReadWaiting();
+  // The receive thread goes on at once should it have stood aside.
+  void TakeBack();
+  ReaderTurn& turn() { return turn_; }
+  bool on_thread() const { return std::this_thread::get_id() == thread_.load(); }
+
   // Waits until the chunk that is being made packets of is through; false when that takes longer.
   bool WaitForChunk(uint32_t time_out_ms);
 
@@ -57,6 +69,8 @@ class ReceiveLoop {
   bool IsPaused();
   bool WaitForBytes(uint32_t changes_seen);
   void ReadFromCaller(uint32_t changes_seen);
+  void StandAside(uint32_t changes_seen);
+  bool TakeTurn();
   bool ReadChunk();
   void Split(uint32_t count);
   void SetSplitting(bool splitting);
@@ -81,7 +95,9 @@ class ReceiveLoop {
   bool splitting_ KRAL_GUARDED_BY(chunk_mutex_) = false;
   uint64_t chunks_ KRAL_GUARDED_BY(chunk_mutex_) = 0;
 
-  // The thread's own. Memory that is refused once it runs has nobody to be told to.
+  ReaderTurn turn_{clock_};
+
+  // Of who reads. Memory that is refused once it runs has nobody to be told to.
   static constexpr size_t kReadSize = 40960;
   std::vector<uint8_t> buffer_ = std::vector<uint8_t>(kReadSize);
   uint32_t sleep_counter_ = 0;

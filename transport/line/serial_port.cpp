@@ -241,6 +241,11 @@ bool CSerialPort::WaitReadable(uint32_t milliseconds) {
   return device && device->WaitReadable(milliseconds);
 }
 
+bool CSerialPort::HasInput() const {
+  const auto device = user_defined_ ? nullptr : Device();
+  return device && device->HasInput();
+}
+
 void CSerialPort::Wake() {
   if (const auto device = Device()) device->Wake();
 }

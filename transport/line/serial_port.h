@@ -45,9 +45,9 @@ inline constexpr int32_t kPortNotPermitted = -197;
 inline constexpr int32_t kPortNoSuchDevice = -198;
 inline constexpr int32_t kPortOtherError = -200;
 
-// Send belongs to the thread that issues requests, Receive, WaitReadable and CloseIfGone to the receive thread; Wake
-// may be called from anywhere. Open, Close and the settings are made while nobody receives; should a reader be late to
-// leave, the device lives until it has.
+// Send belongs to the thread that issues requests; Receive, WaitReadable and HasInput to the one whose turn it is to
+// read; CloseIfGone to the receive thread. Wake may be called from anywhere. Open, Close and the settings are made
+// while nobody receives; should a reader be late to leave, the device lives until it has.
 class CSerialPort {
  public:
   explicit CSerialPort(Clock& clock = SystemClock(), DeviceOpener opener = OpenComPort);
@@ -96,6 +96,7 @@ class CSerialPort {
   // device that can be waited on (a caller's transport).
   bool CanWait() const;
   bool WaitReadable(uint32_t milliseconds);
+  bool HasInput() const;  // of a device: bytes that can be read now
   void Wake();
 
   // Why the last Open failed, for the log and the tool; for the thread that opens.
