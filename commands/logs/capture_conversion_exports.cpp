@@ -1,10 +1,16 @@
 // Exports that make pcapng files of captures, and captures of pcapng files.
+#include <array>
+#include <span>
+#include <utility>
+
 #include "base/failure.h"
+#include "base/little_endian.h"
 #include "base/outputs.h"
 #include "frame/export_call.h"
 #include "frame/version.h"
 #include "kral/log.h"
 #include "platform/file_util.h"
+#include "transport/collection/capture_format.h"
 #include "transport/trace/capture_conversion.h"
 
 namespace {
@@ -31,6 +37,11 @@ bool ConvertFile(const char* from, const char* to, const char* foreign, Conversi
       return !error;
     });
     if (conversion.end == Conversion::End::kForeign) return Fail(FileFailure(from, foreign));
+    if (!error && conversion.mark != 0) {
+      std::array<uint8_t, sizeof(conversion.mark)> mark{};
+      kral::StoreLe(std::span<uint8_t>(mark), 0, conversion.mark);
+      error = file.Rewrite(kral::capture_head::kStepsBack, mark);
+    }
     if (!error) error = file.Commit();
   }
   return !error || Fail(FileFailure(to, "cannot be written").System(error));

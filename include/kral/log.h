@@ -377,7 +377,8 @@ KRAL_API uint8_t KRAL_CALL KRAL_StartCapture(KRAL_HANDLE handle, const char* fil
  * @param handle        from a connect function
  * @param file_name     an ordinary file, emptied first; of several files this name without a number
  * @param file_bytes    the next file begins with the packet that would make this one longer: 65536 and more; 0: never
- * @param file_seconds  the next file begins with the first packet that comes so long after the first of this; 0: never
+ * @param file_seconds  the next file begins with the first packet that comes so long after the first of this; 0: never.
+ *                      With either number one also begins where the clock was set back by more than a second
  * @param keep          when a file begins, the oldest are removed until so many are left with it, those of former
  *                      captures of that name too; 0: none are
  * @param compress      1: with zlib
@@ -426,9 +427,9 @@ KRAL_API uint8_t KRAL_CALL KRAL_StopCapture(KRAL_HANDLE handle);
 KRAL_API uint8_t KRAL_CALL KRAL_StartPlayback(KRAL_HANDLE handle, const char* file_name, uint32_t pace);
 
 /**
- * Plays a part of a capture file: from the first packet that came at a time or behind it, to the last one in front of
- * the first that came after another. What is in front is not read: it begins at once in a file of any length. Where the
- * clock of the PC was set back while the file was written, it may begin at another packet of that time.
+ * Plays a part of a capture file: the packets that came from one time to another, both included. What is in front is
+ * not read: it begins at once in a file of any length. Where the clock of the PC was set back, its packets of that time
+ * are played as well. A file whose capture never ended is read as a whole, and the text log says so.
  *
  * @param handle     from a connect function
  * @param file_name  as for KRAL_StartPlayback

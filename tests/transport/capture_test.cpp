@@ -298,6 +298,94 @@ TEST_F(CaptureTimes, StretchOfAFileIsReadFromItsFirstPacketToItsLast) {
   EXPECT_EQ(foreign.Next(record), Outcome::kForeign);
 }
 
+// What is in the packets, and how the times go.
+struct TimedFile {
+  const char* name;
+  Packet (*content)(size_t i);
+  uint64_t (*time)(size_t i);
+  uint32_t mark;  // of the head: by how much times step back, or 0
+};
+
+constexpr size_t kSoughtPackets = 1500;
+constexpr uint64_t kHour = 3'600'000'000;
+constexpr uint64_t kNoon = 1'700'000'000'000'000;
+
+uint64_t Growing(size_t i) {
+  return kNoon + i * 10'000;
+}
+uint64_t SetBack(size_t i) {
+  return i < kSoughtPackets / 2 ? Growing(i) : Growing(i) - kHour;
+}
+
+// Random bytes, with the head of an early record or block here and there. Blocks are seldom: a stream would shrink
+// them.
+Packet Lures(size_t i, bool blocks, size_t first, size_t step) {
+  std::mt19937 random(static_cast<uint32_t>(i));
+  Packet packet(4000);
+  std::ranges::generate(packet, [&random] { return static_cast<uint8_t>(random()); });
+  packet[0] = 16;
+  Packet lure(capture_block::kSize);
+  if (blocks) {
+    std::ranges::copy(capture_block::kMark, lure.begin());
+    StoreLe(std::span(lure), capture_block::kStreamSize, uint32_t{5000});
+    StoreLe(std::span(lure), capture_block::kStreamSizeComplement, ~uint32_t{5000});
+    StoreLe(std::span(lure), capture_block::kRecordsSize, uint32_t{5000});
+    StoreLe(std::span(lure), capture_block::kMicroseconds, uint64_t{77});
+  } else {
+    const auto head = CaptureRecordHead(77, step - capture_record::kSize);
+    lure.assign(head.begin(), head.end());
+  }
+  if (blocks && i % 10 != 5) return packet;
+  for (size_t at = first; at + lure.size() <= packet.size(); at += step) {
+    std::ranges::copy(lure, packet.begin() + static_cast<std::ptrdiff_t>(at));
+  }
+  return packet;
+}
+
+const TimedFile kTimedFiles[] = {
+    {"as they came", [](size_t i) { return Packet(2 + i % 4000, 16); }, Growing, 1},
+    {"chains of records in each", [](size_t i) { return Lures(i, false, 4, 36); }, Growing, 1},
+    {"a chain of records through all", [](size_t i) { return Lures(i, false, 700, 4012); }, Growing, 1},
+    {"heads of blocks in each", [](size_t i) { return Lures(i, true, 100, 4000); }, Growing, 1},
+    {"the clock was set back", [](size_t) { return Packet(4000, 16); }, SetBack, 3'600'001},
+    {"nothing is known of times", [](size_t) { return Packet(4000, 16); }, SetBack, 0},
+    {"more than can be said", [](size_t) { return Packet(4000, 16); }, SetBack, UINT32_MAX},
+};
+
+TEST(CaptureStretches, HoldEveryPacketOfTheirTimeWhateverIsInTheFile) {
+  const test::TempFolder folder;
+  for (const auto& c : kTimedFiles) {
+    for (const bool compressed : {false, true}) {
+      const auto head = CaptureHead(compressed ? capture_head::kBlocks : capture_head::kRecords);
+      Packet file(head.begin(), head.end());
+      StoreLe(std::span(file), 12, c.mark);
+      Packet records;
+      for (size_t i = 0; i < kSoughtPackets; ++i) {
+        const Packet packet = c.content(i);
+        const auto record = CaptureRecordHead(c.time(i), packet.size());
+        records.insert(records.end(), record.begin(), record.end());
+        records.insert(records.end(), packet.begin(), packet.end());
+        if (compressed && i % 30 != 29) continue;
+        const Packet piece = compressed ? MakeCaptureBlock(records) : records;
+        file.insert(file.end(), piece.begin(), piece.end());
+        records.clear();
+      }
+      const std::string path = folder.Add("capture", {reinterpret_cast<const char*>(file.data()), file.size()});
+      for (const uint64_t from : {uint64_t{1}, c.time(400), c.time(700), c.time(1000), c.time(1490), UINT64_MAX - 9}) {
+        const uint64_t to = from + 100'000 < from ? UINT64_MAX : from + 100'000;
+        size_t wanted = 0;
+        for (size_t i = 0; i < kSoughtPackets; ++i) wanted += c.time(i) >= from && c.time(i) <= to ? 1 : 0;
+        CaptureReader reader(OpenCaptureSourceAt(path, from), {from, to});
+        CaptureRecord record;
+        size_t read = 0;
+        while (reader.Next(record) == Outcome::kRecord) ++read;
+        EXPECT_EQ(read, wanted) << c.name << ", compressed " << compressed << ", " << from;
+        EXPECT_EQ(reader.Next(record), Outcome::kEnd) << c.name << ", compressed " << compressed << ", " << from;
+      }
+    }
+  }
+}
+
 // --- Compressed, and in several files --------------------------------------------------------------------------------
 
 const CaptureLayout kCompressed{.compressed = true};
@@ -427,6 +515,34 @@ TEST(CaptureSeriesTest, FilesEndBySizeAndTimeAndNothingIsMissing) {
   }
 }
 
+TEST(CaptureSeriesTest, FileEndsWhereTheClockIsSetBackAndItsHeadSaysByHowMuchTimesStepBack) {
+  for (const bool compressed : {false, true}) {
+    const test::TempFolder folder;
+    CaptureWriter writer(NullLog());
+    ASSERT_TRUE(writer.Start(CaptureSeries(folder.Path("night.cap"), 0), nullptr,
+                             {.compressed = compressed, .file_seconds = 2}));
+    for (const uint64_t time : {5'000'000, 5'500'000, 5'498'500, 5'600'000, 1'000'000, 1'900'000, 2'900'000, 3'000'000})
+      writer.Append(kPackets[0], time);
+    ASSERT_TRUE(writer.Stop(10'000));
+    const struct {
+      const char* name;
+      std::vector<uint64_t> times;
+      uint32_t mark;
+    } files[] = {{"night-00001.cap", {5'000'000, 5'500'000, 5'498'500, 5'600'000}, 3},
+                 {"night-00002.cap", {1'000'000, 1'900'000, 2'900'000}, 1},
+                 {"night-00003.cap", {3'000'000}, 1}};
+    for (const auto& file : files) {
+      CaptureReader reader(OpenCaptureSource(folder.Path(file.name)));
+      CaptureRecord record;
+      std::vector<uint64_t> times;
+      while (reader.Next(record) == Outcome::kRecord) times.push_back(record.microseconds);
+      EXPECT_EQ(times, file.times) << file.name << compressed;
+      const std::string content = folder.Content(file.name);
+      EXPECT_EQ(LoadLe<uint32_t>(Packet(content.begin(), content.end()), 12), file.mark) << file.name << compressed;
+    }
+  }
+}
+
 TEST(CaptureSeriesTest, NextFileThatCannotBeOpenedIsCountedAsLoss) {
   for (const bool compressed : {false, true}) {
     Disk disk;
@@ -459,8 +575,30 @@ TEST(CaptureSeriesTest, NamesAreNumberedAndOnlyTheLatestKept) {
   { const auto sink = open(); }
   EXPECT_EQ(names(), "night-00008.cap night-00008.txt night-00009.cap night-7.cap ");
   EXPECT_FALSE(CaptureSeries(folder.Path("none/night.cap"), 2)());
-  folder.Add("night-99999.cap", "the last number");
+  folder.Add("night-99999.cap", "of five digits");
+  { const auto sink = open(); }
+  { const auto sink = open(); }
+  EXPECT_EQ(names(), "night-00008.txt night-100000.cap night-100001.cap night-7.cap ");
+  folder.Add("night-4294967295.cap", "the last number");
   EXPECT_FALSE(open()) << "none is written over";
+}
+
+TEST(CaptureSeriesTest, TwoCapturesOfOneNameTakeTheirNumbersInTurn) {
+  const test::TempFolder folder;
+  std::atomic<int> opened{0};
+  const auto capture = [&] {
+    const auto open = CaptureSeries(folder.Path("night.cap"), 0);
+    std::vector<CaptureSink> files;
+    for (int i = 0; i < 100; ++i) {
+      files.push_back(open());
+      opened += files.back() ? 1 : 0;
+    }
+  };
+  std::thread other(capture);
+  capture();
+  other.join();
+  EXPECT_EQ(opened, 200);
+  EXPECT_TRUE(LookAt(folder.Path("night-00200.cap")).kind == LocalKind::kFile);
 }
 
 // --- Playback -------------------------------------------------------------------------------------------------------

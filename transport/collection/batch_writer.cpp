@@ -21,6 +21,18 @@ constexpr size_t kGoodPiece = size_t{64} << 10;
 constexpr size_t kBehind = 4 * kGoodPiece;
 constexpr size_t kSlice = size_t{16} << 10;  // what the system copies in a few microseconds
 
+CaptureSink SinkOf(std::FILE* opened) {
+  const std::shared_ptr<std::FILE> file(opened, CloseStream);
+  // Pieces are large already; without a buffer the result tells what the system has taken.
+  std::setvbuf(file.get(), nullptr, _IONBF, 0);
+  return CaptureSink(
+      [file](std::span<const uint8_t> bytes) { return std::fwrite(bytes.data(), 1, bytes.size(), file.get()); },
+      [file](size_t offset, std::span<const uint8_t> bytes) {
+        if (std::fseek(file.get(), static_cast<long>(offset), SEEK_SET) != 0) return;
+        std::fwrite(bytes.data(), 1, bytes.size(), file.get());
+      });
+}
+
 }  // namespace
 
 uint64_t MicrosecondsNow() {
@@ -29,13 +41,15 @@ uint64_t MicrosecondsNow() {
 }
 
 CaptureSink OpenCaptureFile(const std::string& path) {
-  const std::shared_ptr<std::FILE> file(OpenToWrite(path), [](std::FILE* opened) {
-    if (opened != nullptr) CloseStream(opened);
-  });
-  if (!file) return {};
-  // Pieces are large already; without a buffer the result tells what the system has taken.
-  std::setvbuf(file.get(), nullptr, _IONBF, 0);
-  return [file](std::span<const uint8_t> bytes) { return std::fwrite(bytes.data(), 1, bytes.size(), file.get()); };
+  std::FILE* const opened = OpenToWrite(path);
+  return opened != nullptr ? SinkOf(opened) : CaptureSink();
+}
+
+std::error_code MakeCaptureFile(const std::string& path, CaptureSink& sink) {
+  std::FILE* opened = nullptr;
+  if (const auto error = OpenToWriteNew(path, opened)) return error;
+  sink = SinkOf(opened);
+  return {};
 }
 
 bool BatchWriter::Start(const std::function<CaptureSink()>& open, std::shared_ptr<void> owner) {

@@ -10,6 +10,8 @@
 #include <memory>
 #include <span>
 #include <string>
+#include <system_error>
+#include <utility>
 #include <vector>
 
 #include "base/event.h"
@@ -18,13 +20,34 @@
 
 namespace kral {
 
-// Takes bytes to where they are kept, and gives the number of those taken; fewer than given: it takes no more.
-// Destroyed with the end of the file.
-using CaptureSink = std::function<size_t(std::span<const uint8_t> bytes)>;
+// Where bytes are kept. Destroyed with the end of the file.
+class CaptureSink {
+ public:
+  // Gives the number of the bytes taken; fewer than given: it takes no more.
+  using Append = std::function<size_t(std::span<const uint8_t> bytes)>;
+  // Of what was taken before. Nothing is appended behind it.
+  using Rewrite = std::function<void(size_t offset, std::span<const uint8_t> bytes)>;
+
+  CaptureSink() = default;
+  explicit CaptureSink(Append append, Rewrite rewrite = {})
+      : append_(std::move(append)), rewrite_(std::move(rewrite)) {}
+
+  explicit operator bool() const { return static_cast<bool>(append_); }
+  size_t operator()(std::span<const uint8_t> bytes) const { return append_(bytes); }
+  void RewriteAt(size_t offset, std::span<const uint8_t> bytes) const {
+    if (rewrite_) rewrite_(offset, bytes);
+  }
+
+ private:
+  Append append_;
+  Rewrite rewrite_;
+};
 
 // A file of that name, emptied first; an empty function when it cannot be opened, and when somebody else writes or
 // plays it.
 CaptureSink OpenCaptureFile(const std::string& path);
+// The same of a name that nothing has yet; std::errc::file_exists where something has.
+std::error_code MakeCaptureFile(const std::string& path, CaptureSink& sink);
 
 enum class CaptureState : uint8_t {
   kNone,
@@ -75,6 +98,8 @@ class BatchWriter {
 
   // For these three. Gives the number of bytes taken.
   size_t Write(std::span<const uint8_t> bytes);
+  // What stands there in the file, which ends with it.
+  void RewriteAt(size_t offset, std::span<const uint8_t> bytes) { sink_.RewriteAt(offset, bytes); }
   // Closes the file, and goes on in another. False when that cannot be opened: then nothing more may be written.
   bool GoOnIn(const std::function<CaptureSink()>& open);
 

@@ -13,7 +13,11 @@ namespace capture_head {
 inline constexpr std::array<uint8_t, 8> kMagic = {'K', 'R', 'A', 'L', 'C', 'A', 'P', 0x1A};
 inline constexpr size_t kVersion = 8;    // u16
 inline constexpr size_t kHeadSize = 10;  // u16: where the first record begins; later versions may have longer heads
-inline constexpr size_t kSize = 16;      // the rest is zero
+// u32: by how many milliseconds a time is at most behind one in front of it, rounded up, and 1. Written when the file
+// has ended as it should; 0 and kStepsUnknown: nobody knows.
+inline constexpr size_t kStepsBack = 12;
+inline constexpr uint32_t kStepsUnknown = UINT32_MAX;
+inline constexpr size_t kSize = 16;
 inline constexpr uint16_t kRecords = 1;  // versions: behind the head are records,
 inline constexpr uint16_t kBlocks = 2;   // or blocks of them, each a zlib stream
 }  // namespace capture_head

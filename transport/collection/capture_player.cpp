@@ -45,7 +45,11 @@ bool CapturePlayer::Start(CaptureSource source, PlayPace pace, CKralEvents& disp
   skipped_ = 0;
   ended_.Reset();
   sorter.SetCollection(true);
-  std::function<void()> body = [this, reader = CaptureReader(std::move(source), stretch),
+  // What is left out between two packets may be long.
+  const auto until_stopped = [this, source = std::move(source)](std::span<uint8_t> buffer) {
+    return GoesOn() ? source(buffer) : std::nullopt;
+  };
+  std::function<void()> body = [this, reader = CaptureReader(until_stopped, stretch),
                                 line = Line{pace, dispatcher, sorter}]() mutable { Play(reader, line); };
   state_ = PlayState::kPlaying;
   if (thread_.Start(std::move(body), std::move(owner))) return true;
@@ -101,7 +105,7 @@ PlayState CapturePlayer::Run(CaptureReader reader, const Line& line) {
       case CaptureReader::Outcome::kEnd:
         return AwaitListeners(line) ? PlayState::kDone : PlayState::kStopped;
       case CaptureReader::Outcome::kCut:
-        return AwaitListeners(line) ? PlayState::kCut : PlayState::kStopped;
+        return GoesOn() && AwaitListeners(line) ? PlayState::kCut : PlayState::kStopped;
       case CaptureReader::Outcome::kForeign:
         return PlayState::kForeign;
     }

@@ -34,9 +34,14 @@ CaptureReader::Outcome CaptureReader::Next(CaptureRecord& record) {
   }
   do {
     last_ = ReadRecord(record);
-  } while (last_ == Outcome::kRecord && record.microseconds < stretch_.from);
-  stretch_.from = 0;
+  } while (last_ == Outcome::kRecord && (record.microseconds < stretch_.from || record.microseconds > stretch_.to));
   return last_;
+}
+
+std::optional<uint64_t> StepsBackOf(std::span<const uint8_t> head) {
+  const uint32_t mark = LoadLe<uint32_t>(head, capture_head::kStepsBack).value_or(0);
+  if (mark == 0 || mark == capture_head::kStepsUnknown) return std::nullopt;
+  return (mark - uint64_t{1}) * 1000;
 }
 
 CaptureReader::Outcome CaptureReader::ReadHead() {
@@ -49,6 +54,8 @@ CaptureReader::Outcome CaptureReader::ReadHead() {
   if (size < head.size()) return Outcome::kForeign;
   std::vector<uint8_t> skipped(size - head.size());
   if (source_(skipped) != skipped.size()) return Outcome::kCut;
+  const auto steps = StepsBackOf(head);
+  if (steps && stretch_.to <= UINT64_MAX - *steps) last_time_ = stretch_.to + *steps;
   if (version == capture_head::kBlocks) source_ = UnpackCaptureBlocks(std::move(source_));
   return Outcome::kRecord;
 }
@@ -63,7 +70,7 @@ CaptureReader::Outcome CaptureReader::ReadRecord(CaptureRecord& record) {
   if (length != complement || length < capture_record::kShortestPacket || length > kMaximumPacket) {
     return Outcome::kCut;
   }
-  if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) > stretch_.to) return Outcome::kEnd;
+  if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) > last_time_) return Outcome::kEnd;
   std::vector<uint8_t> packet(length);
   if (source_(packet) != packet.size()) return Outcome::kCut;
   record.microseconds = *LoadLe<uint64_t>(head, capture_record::kMicroseconds);

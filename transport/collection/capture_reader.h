@@ -24,11 +24,15 @@ struct CaptureRecord {
   std::vector<uint8_t> packet;
 };
 
-// From the first record at or behind a time to the last one in front of the first that is later than another.
+// Every record from one time to another, both included.
 struct CaptureStretch {
   uint64_t from = 0;
   uint64_t to = UINT64_MAX;
 };
+
+// By how many microseconds a record is at most behind one in front of it, as the head of a file tells; nothing where it
+// does not.
+std::optional<uint64_t> StepsBackOf(std::span<const uint8_t> head);
 
 class CaptureReader {
  public:
@@ -51,6 +55,7 @@ class CaptureReader {
 
   CaptureSource source_;
   CaptureStretch stretch_;
+  uint64_t last_time_ = UINT64_MAX;  // behind a later one nothing of the stretch comes
   bool begun_ = false;
   Outcome last_ = Outcome::kRecord;
 };

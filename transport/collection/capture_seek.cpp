@@ -1,5 +1,6 @@
-// Halves the file again and again. Records have no mark in front of them: one is recognized by its length, which stands
-// there twice, and by those that follow it. Blocks of compressed records have a mark.
+// Halves the file again and again. Neither records nor blocks can be told from what a packet may hold, one by one. But
+// of all chains that begin somewhere and go on to the end of a long piece one is the file's: where they are one, or
+// come together, is a place in the file that nothing in a packet can feign.
 #include "transport/collection/capture_seek.h"
 
 #include <algorithm>
@@ -18,71 +19,113 @@
 namespace kral {
 namespace {
 
-constexpr size_t kLongestRecord = capture_record::kSize + kMaximumPacket;
-// So many in a row are no accident; fewer only at the end of the file.
-constexpr int kChain = 16;
-constexpr size_t kWindow = (kChain + 1) * kLongestRecord;
-// From here on it is read record by record.
-constexpr uint64_t kShortStretch = uint64_t{1} << 20;
+// What the file is a chain of.
+struct Links {
+  size_t longest;
+  size_t head;
+  size_t time;                                        // where in the head
+  size_t (*size_of)(std::span<const uint8_t> bytes);  // of the one that begins there; 0: none does
+};
 
-// The size of the record that begins there; nothing where none does.
-std::optional<size_t> SizeOfRecord(std::span<const uint8_t> bytes) {
+size_t SizeOfRecord(std::span<const uint8_t> bytes) {
   const auto length = LoadLe<uint16_t>(bytes, capture_record::kLength);
   const auto complement = LoadLe<uint16_t>(bytes, capture_record::kLengthComplement);
   if (!complement || *length != static_cast<uint16_t>(~*complement) || *length < capture_record::kShortestPacket ||
       *length > kMaximumPacket) {
-    return std::nullopt;
+    return 0;
   }
   return capture_record::kSize + *length;
 }
 
-bool BeginsChain(std::span<const uint8_t> bytes, bool reaches_end) {
-  for (int i = 0; i < kChain; ++i) {
-    const auto size = SizeOfRecord(bytes);
-    if (!size) return reaches_end && i > 0 && bytes.empty();
-    if (*size > bytes.size()) return reaches_end && i > 0;  // a record that a crash has cut
-    bytes = bytes.subspan(*size);
-  }
-  return true;
+size_t SizeOfBlock(std::span<const uint8_t> bytes) {
+  const auto head = ReadCaptureBlockHead(bytes);
+  return head ? capture_block::kSize + head->stream_size : 0;
 }
+
+constexpr Links kRecordLinks{capture_record::kSize + kMaximumPacket, capture_record::kSize,
+                             capture_record::kMicroseconds, SizeOfRecord};
+constexpr Links kBlockLinks{capture_block::kSize + capture_block::kLongestStream, capture_block::kSize,
+                            capture_block::kMicroseconds, SizeOfBlock};
+
+// Chains are followed for so many of the longest; and from here on all is read.
+constexpr size_t kPieces = 3;
+constexpr uint64_t kShortStretch = uint64_t{1} << 20;
+static_assert(kPieces * kBlockLinks.longest < kShortStretch / 2, "a piece ends in front of the end of the file");
 
 struct Place {
   uint64_t offset;
   uint64_t microseconds;
 };
 
-// The first record at or behind an offset.
-std::optional<Place> FindRecord(const CaptureBytes& bytes, uint64_t offset) {
-  std::vector<uint8_t> window(kWindow);
-  const size_t count = bytes(offset, window).value_or(0);
-  const std::span<const uint8_t> read = std::span(window).first(count);
-  for (size_t at = 0; at < std::min(count, kLongestRecord); ++at) {
-    if (!BeginsChain(read.subspan(at), count < kWindow)) continue;
-    return Place{offset + at, *LoadLe<uint64_t>(read, at + capture_record::kMicroseconds)};
+// All chains of a piece of the file. What a piece has only a part of may be anything.
+class Chains {
+ public:
+  Chains(std::span<const uint8_t> piece, const Links& links) : next_(piece.size()), links_(links) {
+    for (size_t at = piece.size(); at-- > 0;) {
+      const size_t size = piece.size() - at < links.head ? links.longest : links.size_of(piece.subspan(at));
+      const bool goes_on = size != 0 && (at + size >= piece.size() || next_[at + size] != 0);
+      next_[at] = goes_on ? at + size : 0;
+    }
   }
-  return std::nullopt;
+
+  bool none() const { return First() == limit(); }
+
+  // The first place that all of them have; nothing when there is none.
+  std::optional<size_t> Common() const {
+    const size_t first = First();
+    if (first == limit()) return std::nullopt;
+    std::vector<bool> met(next_.size());  // by the first chain, and by those that were followed
+    std::vector<bool> on_first(next_.size());
+    for (size_t at = first; at < next_.size(); at = next_[at]) met[at] = on_first[at] = true;
+    size_t common = first;
+    for (size_t begin = first + 1; begin < limit(); ++begin) {
+      if (next_[begin] == 0) continue;
+      size_t at = begin;
+      for (; at < next_.size() && !met[at]; at = next_[at]) met[at] = true;
+      if (at >= next_.size()) return std::nullopt;
+      if (on_first[at]) common = std::max(common, at);
+    }
+    if (next_.size() - common < links_.head) return std::nullopt;
+    return common;
+  }
+
+ private:
+  size_t limit() const { return std::min(next_.size(), links_.longest); }
+  size_t First() const {
+    size_t first = 0;
+    while (first < limit() && next_[first] == 0) ++first;
+    return first;
+  }
+
+  std::vector<size_t> next_;  // 0: no chain that goes on to the end
+  const Links& links_;
+};
+
+enum class Found { kPlace, kNothing, kDoubtful };
+
+// The first record or block at or behind an offset that is surely one.
+Found FindLink(const CaptureBytes& bytes, uint64_t offset, const Links& links, Place& place) {
+  std::vector<uint8_t> piece(kPieces * links.longest);
+  piece.resize(bytes(offset, piece).value_or(0));
+  const Chains chains(piece, links);
+  if (chains.none()) return Found::kNothing;
+  const auto common = chains.Common();
+  if (!common) return Found::kDoubtful;
+  place = {offset + *common, *LoadLe<uint64_t>(piece, *common + links.time)};
+  return Found::kPlace;
 }
 
-// The first block at or behind an offset.
-std::optional<Place> FindBlock(const CaptureBytes& bytes, uint64_t offset) {
-  constexpr size_t kLongestBlock = capture_block::kSize + capture_block::kLongestStream;
-  std::vector<uint8_t> window(kLongestBlock + capture_block::kSize);
-  const size_t count = bytes(offset, window).value_or(0);
-  const std::span<const uint8_t> read = std::span(window).first(count);
-  for (size_t at = 0; at + capture_block::kSize <= count; ++at) {
-    if (const auto head = ReadCaptureBlockHead(read.subspan(at))) return Place{offset + at, head->microseconds};
-  }
-  return std::nullopt;
-}
-
-// A place in front of which all is earlier, and which is not far from the one that is sought.
-template <class Find>
-uint64_t Halve(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds, Find find) {
+// A place in front of which all is earlier, and which is not far from the one that is sought; the beginning where that
+// is in doubt.
+uint64_t Halve(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds, const Links& links) {
+  const uint64_t first = begin;
   while (end - begin > kShortStretch) {
     const uint64_t middle = begin + (end - begin) / 2;
-    const std::optional<Place> place = find(bytes, middle);
-    if (place && place->offset < end && place->microseconds < microseconds) {
-      begin = place->offset;
+    Place place{};
+    const Found found = FindLink(bytes, middle, links, place);
+    if (found == Found::kDoubtful) return first;
+    if (found == Found::kPlace && place.offset < end && place.microseconds < microseconds) {
+      begin = place.offset;
     } else {
       end = middle;
     }
@@ -94,19 +137,19 @@ uint64_t Halve(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t
 
 uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
   const uint64_t whole = end;
-  begin = Halve(bytes, begin, end, microseconds, FindRecord);
+  begin = Halve(bytes, begin, end, microseconds, kRecordLinks);
   // The one that is sought may be the next behind the end.
   for (std::array<uint8_t, capture_record::kSize> head{};;) {
     if (bytes(begin, head) != head.size()) return begin;
-    const auto size = SizeOfRecord(head);
-    if (!size || begin + *size > whole) return begin;  // what is cut or damaged is the reader's to tell
+    const size_t size = SizeOfRecord(head);
+    if (size == 0 || begin + size > whole) return begin;  // what is cut or damaged is the reader's to tell
     if (*LoadLe<uint64_t>(head, capture_record::kMicroseconds) >= microseconds) return begin;
-    begin += *size;
+    begin += size;
   }
 }
 
 uint64_t FindCaptureBlock(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds) {
-  begin = Halve(bytes, begin, end, microseconds, FindBlock);
+  begin = Halve(bytes, begin, end, microseconds, kBlockLinks);
   std::array<uint8_t, capture_block::kSize> bytes_of_head{};
   const auto head_at = [&](uint64_t offset) {
     return bytes(offset, bytes_of_head) == bytes_of_head.size() ? ReadCaptureBlockHead(bytes_of_head) : std::nullopt;
@@ -120,12 +163,54 @@ uint64_t FindCaptureBlock(const CaptureBytes& bytes, uint64_t begin, uint64_t en
   return begin;
 }
 
-CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds) {
+namespace {
+
+// Reads large pieces: what is asked for are heads and packets.
+class BufferedBytes {
+ public:
+  BufferedBytes(CaptureBytes bytes, uint64_t at) : bytes_(std::move(bytes)), at_(at) {}
+
+  void Seek(uint64_t at) {
+    at_ = at;
+    rest_ = {};
+  }
+  std::optional<size_t> Read(std::span<uint8_t> buffer) {
+    size_t filled = 0;
+    while (filled < buffer.size()) {
+      if (rest_.empty()) {
+        piece_.resize(kPiece);
+        const auto got = bytes_(at_, piece_);
+        if (!got) return std::nullopt;
+        at_ += *got;
+        rest_ = std::span(piece_).first(*got);
+        if (rest_.empty()) break;
+      }
+      const size_t count = std::min(buffer.size() - filled, rest_.size());
+      std::copy_n(rest_.begin(), count, buffer.subspan(filled).begin());
+      rest_ = rest_.subspan(count);
+      filled += count;
+    }
+    return filled;
+  }
+
+ private:
+  static constexpr size_t kPiece = size_t{256} << 10;
+
+  CaptureBytes bytes_;
+  uint64_t at_;
+  std::vector<uint8_t> piece_;
+  std::span<const uint8_t> rest_;
+};
+
+}  // namespace
+
+CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds, bool* is_sought) {
   // The stream keeps writers away; the reader goes to any place.
   const std::shared_ptr<std::FILE> lock(OpenToRead(path), [](std::FILE* opened) {
     if (opened != nullptr) CloseStream(opened);
   });
   const auto file = std::make_shared<FileReader>();
+  if (is_sought != nullptr) *is_sought = false;
   if (!lock || file->Open(path)) return {};
   const CaptureBytes bytes = [file](uint64_t offset, std::span<uint8_t> buffer) -> std::optional<size_t> {
     size_t count = 0;
@@ -137,19 +222,24 @@ CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds
   if (bytes(0, head) == head.size()) records = *LoadLe<uint16_t>(head, capture_head::kHeadSize);
   // What is no capture is the reader's to tell.
   const bool is_capture = records >= head.size() && std::ranges::equal(capture_head::kMagic, std::span(head).first(8));
-  const auto find =
-      *LoadLe<uint16_t>(head, capture_head::kVersion) == capture_head::kBlocks ? FindCaptureBlock : FindCaptureTime;
-  const uint64_t begin = is_capture ? find(bytes, records, file->size(), microseconds) : records;
-  return [lock, bytes, records, begin, at = uint64_t{0}](std::span<uint8_t> buffer) mutable -> std::optional<size_t> {
+  uint64_t begin = records;
+  if (const auto steps = StepsBackOf(head); is_capture && steps) {
+    const auto find =
+        *LoadLe<uint16_t>(head, capture_head::kVersion) == capture_head::kBlocks ? FindCaptureBlock : FindCaptureTime;
+    begin = find(bytes, records, file->size(), microseconds - std::min(microseconds, *steps));
+    if (is_sought != nullptr) *is_sought = true;
+  }
+  const auto buffered = std::make_shared<BufferedBytes>(bytes, 0);
+  return [lock, buffered, records, begin, at = uint64_t{0}](std::span<uint8_t> buffer) mutable {
     const auto from_head = static_cast<size_t>(std::min<uint64_t>(buffer.size(), at < records ? records - at : 0));
-    const auto head_bytes = from_head == 0 ? std::optional(size_t{0}) : bytes(at, buffer.first(from_head));
-    if (!head_bytes) return std::nullopt;
+    const auto head_bytes = buffered->Read(buffer.first(from_head));
+    if (!head_bytes) return head_bytes;
     at += *head_bytes;
-    if (*head_bytes < from_head || *head_bytes == buffer.size()) return head_bytes;
-    const auto more = bytes(begin + (at - records), buffer.subspan(*head_bytes));
-    if (!more) return std::nullopt;
-    at += *more;
-    return *head_bytes + *more;
+    if (*head_bytes < from_head || from_head == buffer.size()) return head_bytes;
+    if (at == records) buffered->Seek(begin);
+    const auto more = buffered->Read(buffer.subspan(from_head));
+    at += more.value_or(0);
+    return more ? std::optional(from_head + *more) : std::nullopt;
   };
 }
 

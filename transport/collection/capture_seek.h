@@ -18,15 +18,15 @@ namespace kral {
 using CaptureBytes = std::function<std::optional<size_t>(uint64_t offset, std::span<uint8_t> buffer)>;
 
 // Where the first record stands whose time is not before this one: between `begin`, where a record begins, and the end.
-// Times are taken to grow; where the clock was set back, it is one of the places that fit.
+// Where times step back, it is a place in front of which all is earlier than this time and the greatest step.
 uint64_t FindCaptureTime(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds);
 
 // The same for a file of blocks: the last of those that begin before this time, which may hold the record.
 uint64_t FindCaptureBlock(const CaptureBytes& bytes, uint64_t begin, uint64_t end, uint64_t microseconds);
 
-// As OpenCaptureSource: the head of the file, and behind it its records from that time on, or, in a file of blocks,
-// from a little before it.
-CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds);
+// As OpenCaptureSource: the head of the file, and behind it all records from that time on, with some from before it. A
+// file that does not tell how its times go is given whole: then it was not sought in.
+CaptureSource OpenCaptureSourceAt(const std::string& path, uint64_t microseconds, bool* is_sought = nullptr);
 
 }  // namespace kral
 

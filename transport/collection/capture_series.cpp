@@ -2,9 +2,7 @@
 #include "transport/collection/capture_series.h"
 
 #include <algorithm>
-#include <array>
 #include <charconv>
-#include <cstdio>
 #include <optional>
 #include <string_view>
 #include <vector>
@@ -15,13 +13,12 @@
 namespace kral {
 namespace {
 
-constexpr size_t kDigits = 5;
-constexpr uint32_t kMostFiles = 99999;
+constexpr size_t kLeastDigits = 5;
+constexpr uint32_t kLastNumber = UINT32_MAX;
 
 struct SeriesName {
   explicit SeriesName(const std::string& path) {
-    const size_t slash = path.find_last_of("/\\");
-    const size_t name = slash == std::string::npos ? 0 : slash + 1;
+    const size_t name = NameBegin(path);
     const size_t dot = path.find_last_of('.');
     // A name that begins with its only dot has no ending.
     const size_t end = dot == std::string::npos || dot <= name ? path.size() : dot;
@@ -32,16 +29,18 @@ struct SeriesName {
   }
 
   std::string Path(uint32_t number) const {
-    std::array<char, kDigits + 1> digits{};
-    std::snprintf(digits.data(), digits.size(), "%05u", static_cast<unsigned>(number));
-    return begin + digits.data() + ending;
+    std::string digits = std::to_string(number);
+    digits.insert(0, kLeastDigits - std::min(kLeastDigits, digits.size()), '0');
+    return begin + digits + ending;
   }
 
   std::optional<uint32_t> NumberOf(std::string_view name) const {
-    if (name.size() != stem.size() + kDigits + ending.size() || !name.starts_with(stem) || !name.ends_with(ending)) {
+    if (name.size() < stem.size() + kLeastDigits + ending.size() || !name.starts_with(stem) ||
+        !name.ends_with(ending)) {
       return std::nullopt;
     }
-    const auto digits = name.substr(stem.size(), kDigits);
+    const auto digits = name.substr(stem.size(), name.size() - stem.size() - ending.size());
+    if (digits.size() > kLeastDigits && digits.front() == '0') return std::nullopt;
     uint32_t number = 0;
     const auto end = digits.data() + digits.size();
     const auto result = std::from_chars(digits.data(), end, number);
@@ -65,10 +64,15 @@ CaptureSink OpenNext(const SeriesName& name, uint32_t keep) {
     last = std::max(last, *number);
     if (entry.file.kind == LocalKind::kFile) files.push_back(*number);
   }
-  if (last >= kMostFiles) return {};
-  CaptureSink next = OpenCaptureFile(name.Path(last + 1));
+  // Another capture of the name may have taken a number meanwhile.
+  CaptureSink next;
+  while (!next) {
+    if (last == kLastNumber) return {};
+    const auto error = MakeCaptureFile(name.Path(++last), next);
+    if (error && error != std::errc::file_exists) return {};
+  }
   // Only a file that has begun takes the place of others.
-  if (!next || keep == 0) return next;
+  if (keep == 0) return next;
   std::ranges::sort(files);
   for (size_t i = 0; i + keep <= files.size(); ++i) {
     const auto path = name.Path(files[i]);

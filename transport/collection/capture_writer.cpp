@@ -19,6 +19,9 @@ constexpr char kFileTakesNoMore[] = "the file cannot be written any more";
 // What is compressed is with the system at most so long, and a batch, after it came: small blocks hardly shrink.
 constexpr std::chrono::seconds kBlockTime{1};
 
+// Less is no clock that somebody has set, but one that wavers.
+constexpr uint64_t kSetBack = 1'000'000;
+
 // The first of records; nothing where it is cut.
 std::span<const uint8_t> FirstRecord(std::span<const uint8_t> bytes) {
   if (bytes.size() < capture_record::kSize) return {};
@@ -59,6 +62,16 @@ std::array<uint8_t, capture_record::kSize> CaptureRecordHead(uint64_t microsecon
   return head;
 }
 
+void TimeSteps::Add(uint64_t microseconds) {
+  latest_ = std::max(latest_, microseconds);
+  back_ = std::max(back_, latest_ - microseconds);
+}
+
+uint32_t TimeSteps::mark() const {
+  const uint64_t milliseconds = back_ / 1000 + (back_ % 1000 != 0 ? 1 : 0);
+  return static_cast<uint32_t>(std::min<uint64_t>(milliseconds + 1, capture_head::kStepsUnknown));
+}
+
 CaptureWriter::~CaptureWriter() {
   Stop();
 }
@@ -85,6 +98,7 @@ bool CaptureWriter::BeginFile() {
   const auto head = CaptureHead(layout_.compressed ? capture_head::kBlocks : capture_head::kRecords);
   file_size_ = head.size();
   file_begin_ = 0;
+  steps_ = {};
   return Write(head) == head.size();
 }
 
@@ -106,19 +120,17 @@ bool CaptureWriter::Stop(uint32_t time_out_ms) {
 
 void CaptureWriter::OnBatch(const Batch& batch) {
   const std::span<const uint8_t> bytes(batch.bytes);
-  Records run{bytes, batch.records};
-  if (layout_.compressed || layout_.file_bytes != 0 || layout_.file_seconds != 0) {
-    run = {bytes.first(0), 0};
-    for (auto record = FirstRecord(bytes); !record.empty();) {
-      if (BelongsToNextFile(record, run.bytes.size())) {
-        Take(run);
-        BeginNextFile();
-        run = {record.first(0), 0};
-      }
-      if (file_begin_ == 0) file_begin_ = TimeOf(record);
-      run = {{run.bytes.data(), run.bytes.size() + record.size()}, run.count + 1};
-      record = FirstRecord({record.data() + record.size(), bytes.data() + bytes.size()});
+  Records run{bytes.first(0), 0};
+  for (auto record = FirstRecord(bytes); !record.empty();) {
+    if (BelongsToNextFile(record, run.bytes.size())) {
+      Take(run);
+      BeginNextFile();
+      run = {record.first(0), 0};
     }
+    if (file_begin_ == 0) file_begin_ = TimeOf(record);
+    steps_.Add(TimeOf(record));
+    run = {{run.bytes.data(), run.bytes.size() + record.size()}, run.count + 1};
+    record = FirstRecord({record.data() + record.size(), bytes.data() + bytes.size()});
   }
   Take(run);
   if (!block_.empty() && std::chrono::steady_clock::now() - block_begin_ >= kBlockTime) WriteBlock();
@@ -126,8 +138,9 @@ void CaptureWriter::OnBatch(const Batch& batch) {
 
 // `before`: bytes of this file that are not in it yet. The size of a block is known once it is made.
 bool CaptureWriter::BelongsToNextFile(std::span<const uint8_t> record, size_t before) const {
-  if (failed_ || file_begin_ == 0) return false;
+  if (failed_ || file_begin_ == 0 || (layout_.file_bytes == 0 && layout_.file_seconds == 0)) return false;
   const uint64_t time = TimeOf(record);
+  if (time < steps_.latest() && steps_.latest() - time >= kSetBack) return true;
   if (layout_.file_seconds != 0 && time >= file_begin_ &&
       time - file_begin_ >= layout_.file_seconds * uint64_t{1'000'000}) {
     return true;
@@ -135,8 +148,21 @@ bool CaptureWriter::BelongsToNextFile(std::span<const uint8_t> record, size_t be
   return !layout_.compressed && layout_.file_bytes != 0 && file_size_ + before + record.size() > layout_.file_bytes;
 }
 
+// A head that says nothing of times costs time only: a failure is none of the capture's.
+void CaptureWriter::EndFile() {
+  std::array<uint8_t, sizeof(uint32_t)> mark{};
+  StoreLe(std::span<uint8_t>(mark), 0, steps_.mark());
+  RewriteAt(capture_head::kStepsBack, mark);
+}
+
+void CaptureWriter::OnEnd() {
+  WriteBlock();
+  EndFile();
+}
+
 void CaptureWriter::BeginNextFile() {
   WriteBlock();
+  if (!failed_) EndFile();
   failed_ = failed_ || !GoOnIn(open_) || !BeginFile();
 }
 
@@ -166,8 +192,11 @@ void CaptureWriter::WriteBlock() {
   }
   const bool has_blocks = file_size_ > capture_head::kSize;
   if (!failed_ && has_blocks && layout_.file_bytes != 0 && file_size_ + block.size() > layout_.file_bytes) {
+    const TimeSteps steps = steps_;  // of this block too: what it adds makes no step smaller than it is
+    EndFile();
     failed_ = !GoOnIn(open_) || !BeginFile();
     file_begin_ = TimeOf(block_);
+    steps_ = steps;
   }
   failed_ = failed_ || Write(block) < block.size();
   file_size_ += block.size();

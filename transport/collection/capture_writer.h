@@ -23,10 +23,22 @@ class DataLogFileHandler;
 std::array<uint8_t, capture_head::kSize> CaptureHead(uint16_t version = capture_head::kRecords);
 std::array<uint8_t, capture_record::kSize> CaptureRecordHead(uint64_t microseconds, size_t length);
 
+// How times go that should only grow.
+class TimeSteps {
+ public:
+  void Add(uint64_t microseconds);
+  uint64_t latest() const { return latest_; }
+  uint32_t mark() const;  // capture_head::kStepsBack
+
+ private:
+  uint64_t latest_ = 0;
+  uint64_t back_ = 0;
+};
+
 struct CaptureLayout {
   bool compressed = false;
   // The next file begins with the packet that would make this one longer, or that comes so long after its first.
-  // 0: not for that.
+  // 0: not for that. With either it also begins where the clock was set back.
   uint64_t file_bytes = 0;
   uint32_t file_seconds = 0;
 };
@@ -61,8 +73,9 @@ class CaptureWriter final : public BatchWriter {
   bool OnBegin() override;
   bool BeginFile();
   void OnBatch(const Batch& batch) override;
-  void OnEnd() override { WriteBlock(); }
+  void OnEnd() override;
   bool BelongsToNextFile(std::span<const uint8_t> record, size_t before) const;
+  void EndFile();
   void BeginNextFile();
   void Take(const Records& records);
   void WriteBlock();
@@ -81,6 +94,7 @@ class CaptureWriter final : public BatchWriter {
   std::function<CaptureSink()> open_;
   uint64_t file_size_ = 0;
   uint64_t file_begin_ = 0;  // the time of its first record; 0: it has none
+  TimeSteps steps_;          // of what is in the file, or is to be
   std::vector<uint8_t> block_;
   std::chrono::steady_clock::time_point block_begin_;
   std::atomic<uint64_t> in_block_{0};  // records

@@ -65,14 +65,18 @@ Conversion CaptureToPcapng(CaptureSource source, std::string_view application, c
 
 Conversion PcapngToCapture(CaptureSource source, const ConversionSink& write) {
   const auto begin = CaptureHead();
-  const auto append = [](std::vector<uint8_t>& bytes, const PcapngRecord& record) {
+  TimeSteps steps;
+  const auto append = [&steps](std::vector<uint8_t>& bytes, const PcapngRecord& record) {
     if (!FitsCapture(record)) return false;
+    steps.Add(record.microseconds);
     const auto head = CaptureRecordHead(record.microseconds, record.data.size());
     bytes.insert(bytes.end(), head.begin(), head.end());
     bytes.insert(bytes.end(), record.data.begin(), record.data.end());
     return true;
   };
-  return Convert<PcapngRecord>(PcapngReader(std::move(source)), {begin.begin(), begin.end()}, write, append);
+  auto conversion = Convert<PcapngRecord>(PcapngReader(std::move(source)), {begin.begin(), begin.end()}, write, append);
+  conversion.mark = steps.mark();
+  return conversion;
 }
 
 }  // namespace kral

@@ -18,12 +18,14 @@ struct Conversion {
   uint64_t packets = 0;
   uint64_t skipped = 0;  // those that a capture cannot hold
   bool cut = false;      // it was read up to its last whole packet
+  uint32_t mark = 0;     // of a capture: what its head says of the times, capture_head::kStepsBack
 };
 
 using ConversionSink = std::function<bool(std::span<const uint8_t> bytes)>;  // false: no more is taken
 
 Conversion CaptureToPcapng(CaptureSource source, std::string_view application, const ConversionSink& write);
-// Takes what a handset sends unasked: received frames of link type 147, their FCS included.
+// Writes no mark: only the end tells it. Takes what a handset sends unasked: received frames of link type 147, their
+// FCS included.
 Conversion PcapngToCapture(CaptureSource source, const ConversionSink& write);
 
 }  // namespace kral
