@@ -22,18 +22,13 @@ uint32_t Saturated(uint64_t value) {
 class WholeWay {
  public:
   WholeWay(Diag_FTM& phone, uint64_t total)
-      : settings_(phone.state<Settings>()),
-        handle_(phone.handle()),
-        callback_(settings_.progress_callback),
-        value_(settings_.callback_value),
-        total_(total) {
+      : settings_(phone.state<Settings>()), handle_(phone.handle()), total_(total) {
     settings_.keep_abort = true;
-    settings_.callback_value = reinterpret_cast<uintptr_t>(this);
-    settings_.progress_callback = &WholeWay::OnPart;
+    settings_.part_value = reinterpret_cast<uintptr_t>(this);
+    settings_.part_callback = &WholeWay::OnPart;
   }
   ~WholeWay() {
-    settings_.progress_callback = callback_;
-    settings_.callback_value = value_;
+    settings_.part_callback = nullptr;
     settings_.keep_abort = false;
   }
   WholeWay(const WholeWay&) = delete;
@@ -45,14 +40,13 @@ class WholeWay {
  private:
   static void KRAL_CALL OnPart(KRAL_HANDLE, uint32_t done, uint32_t, uintptr_t value) {
     const auto& self = *reinterpret_cast<const WholeWay*>(value);
-    if (self.callback_ == nullptr) return;
-    self.callback_(self.handle_, Saturated(self.before_ + done), Saturated(self.total_), self.value_);
+    const auto callback = self.settings_.progress_callback.load();
+    if (callback == nullptr) return;
+    callback(self.handle_, Saturated(self.before_ + done), Saturated(self.total_), self.settings_.callback_value);
   }
 
   Settings& settings_;
   const KRAL_HANDLE handle_;
-  const KRAL_DOWNLOAD_PROGRESS_CALLBACK callback_;
-  const uintptr_t value_;
   const uint64_t total_;
   uint64_t before_ = 0;
 };

@@ -23,8 +23,6 @@ backup::Settings& BackupOf(Diag_FTM& phone) {
 HandsetWorker::Attempt::Attempt(Diag_FTM& phone, JobHandset& handset, uint32_t command_ms)
     : phone_(phone),
       resynchronising_(phone),
-      bytes_callback_(DownloadOf(phone).progress_callback),
-      bytes_value_(DownloadOf(phone).callback_value),
       item_callback_(BackupOf(phone).callback),
       command_ms_(command_ms),
       handsets_command_ms_(phone.TimeOut(kTimeOutDefaultCommand)),
@@ -33,8 +31,8 @@ HandsetWorker::Attempt::Attempt(Diag_FTM& phone, JobHandset& handset, uint32_t c
   download::Settings& download = DownloadOf(phone);
   download.abort = false;  // the handset's stop is looked at after this
   download.keep_abort = true;
-  download.callback_value = reinterpret_cast<uintptr_t>(&handset);
-  download.progress_callback = &Attempt::OnBytes;
+  download.part_value = reinterpret_cast<uintptr_t>(&handset);
+  download.part_callback = &Attempt::OnBytes;
   BackupOf(phone).callback = &Attempt::OnItem;
   if (command_ms != 0) phone.ConfigureTimeOut(kTimeOutDefaultCommand, static_cast<int32_t>(command_ms));
 }
@@ -44,8 +42,7 @@ HandsetWorker::Attempt::~Attempt() {
     phone_.ConfigureTimeOut(kTimeOutDefaultCommand, static_cast<int32_t>(handsets_command_ms_));
   BackupOf(phone_).callback = item_callback_;
   download::Settings& download = DownloadOf(phone_);
-  download.progress_callback = bytes_callback_;
-  download.callback_value = bytes_value_;
+  download.part_callback = nullptr;
   download.keep_abort = false;
   phone_.transport().SetAbort(abort_);
   worked_on = nullptr;

@@ -27,8 +27,6 @@ class HandsetWorker::Attempt {
 
   Diag_FTM& phone_;
   const Diag_FTM::Resynchronising resynchronising_;
-  const KRAL_DOWNLOAD_PROGRESS_CALLBACK bytes_callback_;
-  const uintptr_t bytes_value_;
   const KRAL_PKV_CALLBACK item_callback_;
   const uint32_t command_ms_;  // of the job; 0: the handset's own
   const uint32_t handsets_command_ms_;

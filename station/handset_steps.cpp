@@ -20,11 +20,16 @@ namespace {
 constexpr uint32_t kHelloNops = 3;
 constexpr uint32_t kFirstPatienceMs = 200;
 
-kivrat::Programmer AsProgrammer(const CMapFileToMemory& file) {
-  return {file.Size(), [&file](uint64_t offset, std::span<uint8_t> room, size_t& count) {
-            count = static_cast<size_t>(std::min<uint64_t>(room.size(), file.Size() - std::min(offset, file.Size())));
-            return file.Copy(offset, room.data(), count) ? std::error_code()
-                                                         : std::make_error_code(std::errc::io_error);
+kivrat::Programmer AsProgrammer(const images::PhoneImage& file) {
+  const uint64_t size = file.GetTotalSize();
+  return {size, [&file, size](uint64_t offset, std::span<uint8_t> room, size_t& count) {
+            count = static_cast<size_t>(std::min<uint64_t>(room.size(), size - std::min(offset, size)));
+            try {
+              file.Read(static_cast<uint32_t>(offset), room.data(), static_cast<uint32_t>(count), 0);
+            } catch (const images::PhoneImageException&) {
+              return std::make_error_code(std::errc::io_error);
+            }
+            return std::error_code();
           }};
 }
 
@@ -37,7 +42,7 @@ bool HandsetWorker::Do(const Step& step) {
     case StepKind::kEnterLoader:
       return EnterLoader();
     case StepKind::kProgrammer:
-      return StartProgrammer(step) && Greet();
+      return StartProgrammer(step) && GreetFirst();
     case StepKind::kPartitionTable:
       return Greet() && download::SendPartitionTable(phone_, *step.table, step.number != 0 ? 1 : 0, nullptr);
     case StepKind::kImage:
@@ -96,16 +101,24 @@ bool HandsetWorker::BootTransfer(const Step& step) {
   settings.hello_retries = UINT32_MAX;
   const AtExit set_back([&] { settings.hello_retries = retries; });
   const uint32_t start = Now();
-  const auto is_late = [&] { return Now() - start >= options_.start_ms; };
+  const uint32_t within_ms = options_.hello_ms != 0 ? options_.hello_ms : options_.start_ms;
+  const auto is_late = [&] { return Now() - start >= within_ms; };
   uint32_t version = 0;
   if (!kivrat::Connect(phone_, version, nullptr, [&] { return stopped() || is_late(); })) {
     if (stopped() || InTime(!is_late())) return false;
-    return Fail(Failure(KRAL_ERROR_NO_ANSWER, "the boot loader on COM%d said no hello within %u ms", phone_.port(),
-                        options_.start_ms));
+    return Fail(
+        Failure(KRAL_ERROR_NO_ANSWER, "the boot loader on COM%d said no hello within %u ms", phone_.port(), within_ms));
   }
   if (download::ServeFlashProgrammer(phone_, AsProgrammer(*step.boot))) return true;
   phone_.GiveBackPort();
   return false;
+}
+
+// One that was never heard is no programmer for this handset: waiting once more would help nobody.
+bool HandsetWorker::GreetFirst() {
+  const bool greeted = Greet();
+  is_final_ = !greeted && failure_->record().code == KRAL_ERROR_NO_ANSWER;
+  return greeted;
 }
 
 // A hello is a row of waits; together they end within `within_ms`.
@@ -136,7 +149,9 @@ bool HandsetWorker::WriteImage(const Step& step) {
 bool HandsetWorker::Restart() {
   if (!download::KovaReset(phone_) && failure_->record().code == KRAL_ERROR_REFUSED) return false;
   greeted_ = programmer_started_ = false;
-  return InTime(AwaitDiagnostics(options_.start_ms)) && ReadIdentity(false);
+  if (!InTime(AwaitDiagnostics(options_.start_ms))) return false;
+  is_final_ = !IsSameHandset(true);
+  return !is_final_ && ReadIdentity(false);
 }
 
 bool HandsetWorker::SetMode(uint32_t mode) {

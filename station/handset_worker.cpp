@@ -64,7 +64,7 @@ bool HandsetWorker::RunStep(const Step& step) {
     failure_ = nullptr;
     if (done && !stopped()) return true;
     const KRAL_ERROR record = RecordOf(failure, step);
-    if (stopped() || !recovered || is_too_late_ || !MayPass(record.code) || retries_left_ == 0) {
+    if (stopped() || !recovered || is_final_ || !MayPass(record.code) || retries_left_ == 0) {
       phone_.log().WriteLine(kLogErr, "KRAL_VENTRIMS: %s: %s", step.name.c_str(), record.text);
       handset_.FailWith(record);
       return false;
@@ -115,7 +115,8 @@ bool HandsetWorker::IsThere(const Step& step) {
 }
 
 // Whatever has been put into the socket while the cable was out answers like the handset that was there.
-bool HandsetWorker::IsSameHandset() {
+// New software may have lost the number, or may not tell it; it does not tell another one.
+bool HandsetWorker::IsSameHandset(bool with_new_software) {
   const std::string known = handset_.progress().serial;
   if (known.empty()) return true;
   uint32_t serial = 0;
@@ -125,11 +126,16 @@ bool HandsetWorker::IsSameHandset() {
     return told || failure_->record().code == KRAL_ERROR_REFUSED;
   };
   if (!Await(options_.return_ms, answers)) return false;
+  if (with_new_software && (!told || serial == 0)) return true;
   if (!told)
     return Fail(Failure(KRAL_ERROR_LOST, "what came back on COM%d does not tell its serial number: it was %s",
                         phone_.port(), known.c_str()));
-  return MayHaveSerial(serial) || Fail(Failure(KRAL_ERROR_LOST, "another handset came back on COM%d: %08X, not %s",
-                                               phone_.port(), static_cast<unsigned>(serial), known.c_str()));
+  return MayHaveSerial(serial) || FailAsAnother(serial);
+}
+
+bool HandsetWorker::FailAsAnother(uint32_t serial) {
+  return Fail(Failure(KRAL_ERROR_LOST, "another handset came back on COM%d: %08X, not %s", phone_.port(),
+                      static_cast<unsigned>(serial), handset_.progress().serial));
 }
 
 // The one that it told, or one that the job itself writes.
@@ -178,7 +184,7 @@ bool HandsetWorker::Await(uint32_t within_ms, const std::function<bool()>& holds
 }
 
 bool HandsetWorker::InTime(bool in_time) {
-  is_too_late_ = !in_time;
+  is_final_ = !in_time;
   return in_time;
 }
 

@@ -34,6 +34,7 @@ class HandsetWorker {
   bool StartProgrammer(const Step& step);
   bool BootTransfer(const Step& step);
   bool Greet(uint32_t within_ms = UINT32_MAX);
+  bool GreetFirst();
   bool GreetAgain();
   bool WriteImage(const Step& step);
   bool Restart();
@@ -41,14 +42,15 @@ class HandsetWorker {
 
   bool AwaitPort();
   bool IsStillInDiagnostics();
-  bool IsSameHandset();
+  bool IsSameHandset(bool with_new_software = false);
+  bool FailAsAnother(uint32_t serial);
   bool MayHaveSerial(uint32_t serial) const;
   bool AwaitDiagnostics(uint32_t within_ms);
   bool AwaitLoader(uint32_t within_ms);
   bool Await(uint32_t within_ms, const std::function<bool()>& holds);  // false also when an abort ended it
   bool Pause(uint32_t milliseconds);                                   // false when an abort ended it
   bool stopped() const { return handset_.stop(); }
-  // What `start_ms` bounds: waiting that long once more would help nobody.
+  // What `start_ms` and `hello_ms` bound: waiting that long once more would help nobody.
   bool InTime(bool in_time);
   uint32_t Now() const { return phone_.clock().TickMs(); }
 
@@ -59,7 +61,7 @@ class HandsetWorker {
   uint32_t retries_left_;
   const CallFailure* failure_ = nullptr;  // of the attempt under way
   uint32_t lost_by_ = KRAL_ERROR_NONE;    // the failure before
-  bool is_too_late_ = false;              // the time of a start is over
+  bool is_final_ = false;                 // the time of a start is over, or another handset is there
   bool programmer_started_ = false;
   bool greeted_ = false;
   uint32_t block_size_ = 0;

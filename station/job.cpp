@@ -24,14 +24,15 @@ KRAL_VENTRIMS_OPTIONS DefaultOptions() {
           .return_ms = 30000,
           .start_ms = 60000,
           .command_ms = 0,
-          .block_size = 0};
+          .block_size = 0,
+          .hello_ms = 0};
 }
 
 const char* WhatIsWrong(const KRAL_VENTRIMS_OPTIONS& options) {
   if ((options.flags & ~kFlags) != 0) return "there is an unknown flag among the options";
   if (options.at_once > Kral_ResourceManager::kContextCount) return "no more than 50 handsets can be worked on at once";
   if (options.retries > kMostRetries) return "no more than 100 retries are possible";
-  if (std::max({options.return_ms, options.start_ms, options.command_ms}) > kLongestMs)
+  if (std::max({options.return_ms, options.start_ms, options.command_ms, options.hello_ms}) > kLongestMs)
     return "no time-out is longer than 3,600,000 ms";
   return nullptr;
 }

@@ -4,6 +4,7 @@
 #include "base/failure.h"
 #include "base/text_log.h"
 #include "download/download_client.h"
+#include "download/images/phone_image_binary.h"
 #include "download/link/download_failure.h"
 #include "download/stream/image_set_up.h"
 #include "download/stream/stream_format.h"
@@ -35,17 +36,20 @@ bool JobFiles::Open(Step& step) try {
     default:
       return true;
   }
+} catch (const images::PhoneImageException&) {
+  return Fail(FileFailure(step.file, "became shorter while it was read"));
 } catch (const std::exception&) {  // no memory, or no address space for an image
   return Fail(Failure(KRAL_ERROR_INTERNAL, "there is no memory for the file %.200s", step.file.c_str()));
 }
 
 bool JobFiles::OpenBoot(Step& step) {
-  auto file = std::make_shared<CMapFileToMemory>();
-  if (file->Open(step.file, false) == nullptr) {
-    return Fail(file->too_large() ? FileFailure(step.file, "has more than this process can map")
+  auto file = std::make_shared<images::PhoneImageBinary>();
+  if (!file->Open(step.file)) {
+    return Fail(file->too_large() ? FileFailure(step.file, "has 4 GiB or more, or more than this process can map")
                                   : download::NotOpened(step.file));
   }
-  step.bytes = file->Size();
+  file->KeepInMemory();
+  step.bytes = file->GetTotalSize();
   step.boot = std::move(file);
   return true;
 }
@@ -80,6 +84,8 @@ bool JobFiles::OpenImage(Step& step) {
     }
     if (const uint32_t size = step.has_header ? opened->header.image().GetSize(0) : 0; size > stream::kLongestHeader)
       return Fail(HeaderTooLong(step.header_file, size));
+    if (opened->image.image().GetSize(0) == 0) return Fail(FileFailure(step.file, "holds no data"));
+    opened->image.KeepInMemory();
     known = std::move(opened);
   }
   step.bytes = known->image.image().GetSize(0);

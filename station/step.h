@@ -11,8 +11,8 @@
 
 #include "base/utf8_text.h"
 #include "download/images/image_file.h"
+#include "download/images/phone_image.h"
 #include "download/kova/kova.h"
-#include "platform/file_mapping.h"
 #include "storage/pkv/pkv_set.h"
 
 namespace kral::station {
@@ -50,7 +50,7 @@ struct Step {
   uint64_t bytes = 0;     // that go into the handset's memory or flash
 
   // What the file is made of: the one of these that the kind needs. Read by several threads at once.
-  std::shared_ptr<const CMapFileToMemory> boot = {};
+  std::shared_ptr<const images::PhoneImage> boot = {};
   std::shared_ptr<const kova::ProgrammerFile> hex = {};
   std::shared_ptr<const std::vector<uint8_t>> table = {};
   std::shared_ptr<const OpenedImage> image = {};

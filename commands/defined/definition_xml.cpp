@@ -266,7 +266,7 @@ class Reader {
   std::set<std::string> families_;
 };
 
-// Parsers begin with the line where they know it.
+// Texts of parsers begin with the line where they know it.
 uint32_t LineOfFault(std::string_view text) {
   constexpr std::string_view kLine = "line ";
   uint32_t line = 0;
@@ -290,8 +290,8 @@ bool ReadDefinitions(std::span<const uint8_t> document, const Definitions& known
     commands = std::move(read);
     return true;
   } catch (const BadXml& bad) {
-    problem.text = bad.what();
     problem.line = LineOf(document, root, *file.at);
+    problem.text = problem.line != 0 ? "line " + std::to_string(problem.line) + ": " + bad.what() : bad.what();
     return false;
   }
 }

@@ -2,7 +2,6 @@
 #include "download/images/image_file.h"
 
 #include <algorithm>
-#include <array>
 #include <vector>
 
 #include "download/images/phone_image_binary.h"
@@ -17,11 +16,17 @@ namespace {
 constexpr uint32_t kMaximumKib = 128 * 1024;
 constexpr uint32_t kCountedPiece = 64 * 1024;
 
-uint32_t FormatByContent(const std::string& path) {
-  TextFile file;
-  std::array<char, 1> first{};
-  const bool hex = file.OpenForReading(path) && file.Read(first) == 1 && first[0] == ':';
-  return hex ? KRAL_IMAGE_FORMAT_HEX : KRAL_IMAGE_FORMAT_BINARY;
+// One that cannot be mapped may still be read as text.
+bool BeginsAsHex(const PhoneImageBinary& opened, const std::string& path) try {
+  char first = 0;
+  if (opened.GetTotalSize() != 0) {
+    opened.Read(0, &first, 1, 0);
+  } else if (TextFile file; opened.too_large() && file.OpenForReading(path)) {
+    file.Read({&first, 1});
+  }
+  return first == ':';
+} catch (const PhoneImageException&) {
+  return false;
 }
 
 uint32_t CountPayload(const PhoneImage& image, uint32_t region) {
@@ -42,14 +47,25 @@ uint32_t CountPayload(const PhoneImage& image, uint32_t region) {
 }  // namespace
 
 uint32_t ImageFile::Open(const std::string& path, uint32_t format) {
-  format_ = format == KRAL_IMAGE_FORMAT_BY_CONTENT ? FormatByContent(path) : format;
-  if (format_ == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
-  if (format_ != KRAL_IMAGE_FORMAT_BINARY) {
-    Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no image format %u", format));
-    return KRAL_STREAM_BAD_ARGUMENT;
-  }
+  format_ = format;
+  if (format == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
+  if (format == KRAL_IMAGE_FORMAT_BINARY || format == KRAL_IMAGE_FORMAT_BY_CONTENT) return OpenBinary(path);
+  Fail(Failure(KRAL_ERROR_ARGUMENT, "there is no image format %u", format));
+  return KRAL_STREAM_BAD_ARGUMENT;
+}
+
+void ImageFile::KeepInMemory() {
+  if (format_ == KRAL_IMAGE_FORMAT_BINARY) static_cast<PhoneImageBinary&>(*image_).KeepInMemory();
+}
+
+uint32_t ImageFile::OpenBinary(const std::string& path) {
   auto binary = std::make_unique<PhoneImageBinary>();
-  if (!binary->Open(path)) {
+  const bool opened = binary->Open(path);
+  if (format_ == KRAL_IMAGE_FORMAT_BY_CONTENT) {
+    format_ = BeginsAsHex(*binary, path) ? KRAL_IMAGE_FORMAT_HEX : KRAL_IMAGE_FORMAT_BINARY;
+    if (format_ == KRAL_IMAGE_FORMAT_HEX) return OpenHex(path);
+  }
+  if (!opened) {
     Fail(binary->too_large() ? FileFailure(path, "has 4 GiB or more, or more than this process can map")
                              : download::NotOpened(path));
     return binary->too_large() ? KRAL_STREAM_FILE_TOO_LARGE : KRAL_STREAM_FILE_NOT_OPENED;

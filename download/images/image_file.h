@@ -20,6 +20,8 @@ class ImageFile {
  public:
   // Gives KRAL_STREAM_FILE_..., ..._DATA_LOST, ..._PAST_END, ..._BAD_ARGUMENT or 0. The format may be found by content.
   uint32_t Open(const std::string& path, uint32_t format);
+  // For many readers: see PhoneImageBinary. A HEX file is in memory in any case.
+  void KeepInMemory();
 
   PhoneImage& image() { return *image_; }
   const PhoneImage& image() const { return *image_; }
@@ -33,6 +35,7 @@ class ImageFile {
 
  private:
   uint32_t OpenHex(const std::string& path);
+  uint32_t OpenBinary(const std::string& path);  // or what is found to be HEX
 
   uint32_t format_ = KRAL_IMAGE_FORMAT_BY_CONTENT;
   HexLoss loss_;

@@ -70,9 +70,11 @@ void DownloadConnection::Report(uint32_t done, uint32_t total) {
   reported_ = true;
   last_report_ = done;
   const Settings& settings = phone_.state<Settings>();
-  const auto callback = settings.progress_callback.load();
+  auto callback = settings.part_callback.load();
+  const bool is_part = callback != nullptr;
+  if (!is_part) callback = settings.progress_callback;
   if (callback == nullptr) return;
-  const uintptr_t value = settings.callback_value;
+  const uintptr_t value = is_part ? settings.part_value : settings.callback_value;
   CallGuarded([&] { callback(phone_.handle(), done, total, value); });
 }
 

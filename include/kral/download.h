@@ -275,7 +275,7 @@ KRAL_API uint8_t KRAL_CALL KRAL_HEX_FindLoss(const char* hex_file, uint32_t* lin
 KRAL_API uint8_t KRAL_CALL KRAL_HEX_Convert(const char* input, const char* output, uint32_t direction,
                                             uint32_t* base_address, uint32_t* result);
 
-#define KRAL_HEX_NOT_WRITTEN 11u
+#define KRAL_HEX_NOT_WRITTEN 11u /**< a result of KRAL_HEX_Convert: the output cannot be written */
 
 /**@}*/
 

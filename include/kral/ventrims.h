@@ -66,6 +66,7 @@ typedef struct KRAL_VENTRIMS_OPTIONS {
   uint32_t start_ms;   /**< how long a restarted handset may take to answer; 60,000 at first */
   uint32_t command_ms; /**< time-out 0 while the job runs, and a hello's longest wait; 0, as at first: as they are */
   uint32_t block_size; /**< the most that a write to flash carries; 0, as at first: what the programmer announces */
+  uint32_t hello_ms;   /**< how long the hello of a boot loader may take; 0, as at first: start_ms */
 } KRAL_VENTRIMS_OPTIONS;
 
 /**

@@ -64,7 +64,7 @@ bool Abort(Diag_FTM& phone) {
   ++settings.aborts;
   settings.abort = true;
   settings.job_abort = true;
-  phone.responses().EndWaits();
+  phone.transport().WakeWaiter();
   return true;
 }
 

@@ -164,6 +164,8 @@ TEST_F(DefinedCommands, ContradictionsAreRefusedWithTheirLineAndChangeNothing) {
     EXPECT_NE(reason, nullptr) << error.text;
     const bool told = reason != nullptr && row.line == kParsers;
     EXPECT_EQ(error.line, told ? std::strtoul(reason + std::strlen(row.reason), nullptr, 10) : row.line) << error.text;
+    const std::string line = error.line != 0 ? "line " + std::to_string(error.line) + ": " : "";
+    EXPECT_NE(std::string(error.text).find("cannot be used: " + line), std::string::npos) << error.text;
     EXPECT_EQ(Count(), 0u);
     KRAL_CMD_ClearDefinitions(handle());
   }

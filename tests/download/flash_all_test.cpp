@@ -63,6 +63,7 @@ class FlashAll : public testing::Test {
   static void KRAL_CALL OnProgress(KRAL_HANDLE handle, uint32_t done, uint32_t total, uintptr_t value) {
     auto& self = *reinterpret_cast<FlashAll*>(value);
     self.figures_.emplace_back(done, total);
+    KRAL_ConfigureDownloadCallBack(handle, &FlashAll::OnProgress, value);  // at any time: the whole stays one
     if (done >= self.abort_at_) KRAL_AbortDownload(handle);
     if (done >= self.replug_at_) self.Replug();
   }

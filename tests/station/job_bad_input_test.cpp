@@ -29,6 +29,7 @@ TEST_F(JobBadInput, IsRefusedBeforeAnythingIsSent) {
   const std::string missing = folder_.Path("missing");
   const std::string broken = folder_.Add("broken.hex", test::kBrokenHex);
   const std::string dropped = folder_.Add("dropped.hex", test::kDroppedHex);
+  const std::string no_data = folder_.Add("no_data.hex", ":00000001FF\n");
   const std::string second_region = folder_.Add("second.hex", test::kTwoRegionsHex);
   const std::string long_header = AddBytes("header", Pattern(513));
   const std::string programmer = folder_.Add("programmer.hex", kProgrammerHex);
@@ -49,6 +50,7 @@ TEST_F(JobBadInput, IsRefusedBeforeAnythingIsSent) {
       {"a missing file", KRAL_ERROR_BAD_FILE, "missing", [&] { AddImage(image_), AddImage(missing); }},
       {"a broken HEX file", KRAL_ERROR_BAD_FILE, "line 2", [&] { AddImage(broken); }},
       {"a HEX file that loses data", KRAL_ERROR_BAD_FILE, "line 1", [&] { AddImage(dropped); }},
+      {"a HEX file without data", KRAL_ERROR_BAD_FILE, "holds no data", [&] { AddImage(no_data); }},
       {"a second region", KRAL_ERROR_BAD_FILE, "second region", [&] { AddImage(second_region); }},
       {"a long header", KRAL_ERROR_BAD_FILE, "header has 513 bytes: a header takes 512",
        [&] {

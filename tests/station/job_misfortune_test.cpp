@@ -183,6 +183,46 @@ TEST_F(JobMisfortune, WhatComesBackInRestoreAndVerifyIsTheSameHandsetOrTheEndOfT
   }
 }
 
+TEST_F(JobMisfortune, WhatComesBackFromTheRestartIsTheHandsetThatWasFlashed) {
+  struct Swap {
+    VirtualHandset& handset;
+    uint32_t serial;  // of what is in the socket by then
+  };
+  const auto at_the_restart = [](KRAL_VENTRIMS_JOB job, uint32_t number, uintptr_t value) {
+    KRAL_VENTRIMS_PROGRESS progress{};
+    progress.size = sizeof progress;
+    KRAL_VENTRIMS_GetProgress(job, number, &progress);
+    const auto& swap = *reinterpret_cast<const Swap*>(value);
+    if (std::string(progress.step_name) == "restart")
+      swap.handset.nv().Set(handset::kSerialNumberItem, handset::ByteWriter().U32(swap.serial).Take());
+  };
+  const std::string backup = AddBackup();
+  const std::string programmer = folder_.Add("programmer.hex", kProgrammerHex);
+  const std::string software = AddBytes("software.bin", handset::MakeSoftware("VHS-2.0.1", 3000));
+  for (const uint32_t serial : {11u, 12u, 0u}) {
+    Swap swap{AddSocket(11), serial};
+    if (job_ == 0) job_ = KRAL_VENTRIMS_Create();
+    AddToJob(11);
+    SetOptions(KRAL_VENTRIMS_ENTER_LOADER | KRAL_VENTRIMS_RESET, 2);
+    KRAL_VENTRIMS_AddProgrammer(job_, programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_HEX);
+    AddImage(software);
+    KRAL_VENTRIMS_AddRestore(job_, backup.c_str());
+    KRAL_VENTRIMS_SetCallback(job_, at_the_restart, reinterpret_cast<uintptr_t>(&swap));
+    RunToEnd();
+    const KRAL_VENTRIMS_RESULT result = Result(0);
+    const bool is_other = serial == 12;
+    EXPECT_EQ(result.passed, is_other ? 0u : 1u) << serial << ": " << result.error.text;
+    EXPECT_EQ(swap.handset.nv().Value(39).has_value(), !is_other) << "restored";
+    if (is_other) {
+      EXPECT_STREQ(result.error.text, "another handset came back on COM11: 0000000C, not 0000000B");
+      EXPECT_STREQ(result.progress.serial, "0000000B");
+      EXPECT_EQ(result.progress.attempts, 1u);
+    }
+    EXPECT_EQ(KRAL_VENTRIMS_Free(std::exchange(job_, 0)), 1);
+    ports_.Remove(11);
+  }
+}
+
 TEST_F(JobMisfortune, APortIsNotAwaitedForEver) {
   AddProgrammed(11).faults().Add(handset::HangUp(), Acknowledgement(5));
   AddToJob(11);
@@ -250,13 +290,26 @@ TEST_F(JobMisfortune, AHelloThatDoesNotComeInTimeIsNotAwaitedOnceMore) {
   KRAL_VENTRIMS_OPTIONS options{};
   options.size = sizeof options;
   ASSERT_EQ(KRAL_VENTRIMS_GetOptions(job_, &options), 1);
-  options.start_ms = 50;
+  options.hello_ms = 50;
   options.retries = 2;
   ASSERT_EQ(KRAL_VENTRIMS_SetOptions(job_, &options), 1);
   const auto programmer = AddBytes("programmer.bin", Pattern(2000));
   ASSERT_EQ(KRAL_VENTRIMS_AddProgrammer(job_, programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT), 1);
   RunToEnd();
   EXPECT_NE(std::string(Result(0).error.text).find("no hello within 50 ms"), std::string::npos) << Result(0).error.text;
+  EXPECT_EQ(Result(0).progress.attempts, 1u);
+}
+
+TEST_F(JobMisfortune, AProgrammerThatNeverSaysHelloIsGreetedOnce) {
+  AddSocket(11).faults().Add(handset::Lose(), When::Always().Of("02").LongerThan(5));  // the hello
+  AddToJob(11);
+  SetOptions(KRAL_VENTRIMS_ENTER_LOADER, 2);
+  ASSERT_EQ(KRAL_VENTRIMS_AddProgrammer(job_, folder_.Add("programmer.hex", kProgrammerHex).c_str(),
+                                        KRAL_VENTRIMS_PROGRAMMER_HEX),
+            1);
+  Phone(0).state<download::Settings>().handshake_limit_ms = 20;
+  RunToEnd();
+  EXPECT_EQ(Result(0).error.code, uint32_t{KRAL_ERROR_NO_ANSWER}) << Result(0).error.text;
   EXPECT_EQ(Result(0).progress.attempts, 1u);
 }
 

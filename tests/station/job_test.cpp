@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <filesystem>
 
 #include "tests/support/station_fixture.h"
 
@@ -82,16 +83,17 @@ TEST_F(Job, GoesFromTheBootLoaderToFlash) {
     handset.SetStartMode(handset.boot_loader());
     handset.Restart();
   }
-  ASSERT_EQ(KRAL_VENTRIMS_AddProgrammer(job_, AddBytes("programmer", handset::MakeProgrammer(2500)).c_str(),
-                                        KRAL_VENTRIMS_PROGRAMMER_BOOT),
-            1);
+  const std::string programmer = AddBytes("programmer", handset::MakeProgrammer(2500));
+  ASSERT_EQ(KRAL_VENTRIMS_AddProgrammer(job_, programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT), 1);
   const std::string file = AddBytes("image.bin", image);
   const std::string header = folder_.Add("header", "head");
   ASSERT_EQ(
       KRAL_VENTRIMS_AddImage(job_, file.c_str(), KRAL_IMAGE_FORMAT_BINARY, 9, header.c_str(), KRAL_STREAM_MULTI_IMAGE),
       1);
   for (const uint16_t port : {11, 12}) AddToJob(port);
-  RunToEnd();
+  ASSERT_EQ(KRAL_VENTRIMS_Start(job_), 1) << Error().text;
+  std::filesystem::resize_file(programmer, 0);
+  ASSERT_EQ(KRAL_VENTRIMS_Wait(job_, 120000), 1);
   for (uint32_t number = 0; number < 2; ++number) {
     const KRAL_VENTRIMS_RESULT result = Result(number);
     EXPECT_EQ(result.passed, 1u) << result.error.text << " in " << result.progress.step_name;
@@ -131,8 +133,7 @@ TEST_F(Job, TakesAConnectedHandsetAndLeavesItsSettingsAlone) {
   handset.HangUp();
 }
 
-TEST_F(Job, OpensEveryFileOnce) {
-  // What nobody has open any more cannot be opened again: gone on Linux, and held fast on Windows.
+TEST_F(Job, ReadsEveryFileOnce) {
   const Bytes image = Pattern(50000);
   const std::string file = AddBytes("image.bin", image);
   const std::string hex = folder_.Add("table.hex", ":020000040004F6\n:0400000001020304F2\n:00000001FF\n");
@@ -146,8 +147,7 @@ TEST_F(Job, OpensEveryFileOnce) {
   ASSERT_EQ(AddImage(hex), 1);
   ASSERT_EQ(AddImage(file), 1);
   ASSERT_EQ(KRAL_VENTRIMS_Start(job_), 1) << Error().text;
-  std::error_code ignored;
-  for (const std::string& name : {file, hex}) std::filesystem::remove(name, ignored);
+  for (const std::string& name : {file, hex}) std::filesystem::resize_file(name, 0);
   ASSERT_EQ(KRAL_VENTRIMS_Wait(job_, 120000), 1);
   EXPECT_EQ(State().passed, 4u) << Result(0).error.text;
 }
