@@ -1,6 +1,7 @@
 """What a shell is told of a line that is being typed, and the script that asks for it."""
 import os
 import subprocess
+import unittest.mock
 
 import tool
 from tool import ToolTest
@@ -35,7 +36,20 @@ class Completion(ToolTest):
         for noun in self.completed(""):
             for verb in self.completed(noun, "") if noun not in ("help", "completion") else ():
                 if verb != ":files":
-                    self.assertIn("--json", self.completed(noun, verb, "--"), (noun, verb))
+                    options = self.completed(noun, verb, "--")
+                    self.assertIn("--json", options, (noun, verb))
+                    self.assertEqual(sorted(set(options)), sorted(options), (noun, verb))
+
+    def test_ports_are_those_that_are_there(self):
+        self.ports = {207: "/dev/null", 217: "/dev/zero"}
+        with unittest.mock.patch.dict(tool.EXTRA_ENVIRONMENT, {"KRAL_SLOTS": self.add("slots", b"3 /dev/ttyUSB0\n")}):
+            for words, wanted in (
+                    (("-p", "20"), ["207"]), (("info", "--port", "207,21"), ["207,217"]),
+                    (("info", "--port=21"), ["--port=217"]), (("-p", "/dev/z"), ["/dev/zero"]),
+                    (("-p", "s"), ["slot:3"]), (("-p", "207,s"), ["207,slot:3"])):
+                with self.subTest(words=words):
+                    self.assertEqual(self.completed(*words), wanted)
+            self.assertEqual(self.expect(0, "__complete", "-p", "207").out, "207\t/dev/null\n")
 
     def test_bash_completes(self):
         script = self.add("kral.bash", self.expect(0, "completion", "bash").out.encode())

@@ -11,6 +11,7 @@ import re
 import struct
 import subprocess
 import sys
+import zlib
 
 sys.dont_write_bytecode = True  # nothing is left in the tree
 
@@ -65,6 +66,9 @@ KINDS = b"""<CommandDefinition><Family name="KINDS" frame="subsystem" subsystem=
 <Reply><Field name="status" type="u8" success="0"/></Reply></Command>
 <Command name="STATUS" id="2"><Request><Field name="status" type="u8"/></Request>
 <Reply><Field name="status" type="u8" success="0"/><Field name="more" type="u32"/></Reply></Command>
+<Command name="COUNTS" id="3" doc="none is sent"><Request><Field name="n" type="s8" min="0" max="3"/>
+<Field name="a" type="u8" count="n"/><Field name="m" type="u8"/><Field name="t" type="text" size="m" max_size="2"/>
+<Field name="r" type="u8" count="*" max_count="2"/></Request></Command>
 </Family></CommandDefinition>"""
 # A flash programmer of 32 bytes for the loader, as text records.
 HEX = (b":020000040002F8\n:10000000000102030405060708090A0B0C0D0E0F78\n"
@@ -241,6 +245,55 @@ class Dissector(ToolTest):
                  for packet in chance.choices(seeds, k=4000)]
         damaged = self.add("damaged.pcapng", b"".join(many))
         self.assertEqual(tshark(damaged, "-V", definitions=definitions).count("\nFrame ") + 1, 4000)
+
+    def test_what_is_not_as_defined_is_marked(self):
+        definitions, calls = self.defined_calls()
+        with open(calls[3][0], "rb") as file:
+            content = file.read()
+        sent = next(packet for packet in pcapng.packets(content) if packet.sent and packet.data[1:4] == b"\xFB\x01\0")
+        heads = b"".join(pcapng.block(kind, body) for kind, body in pcapng.blocks(content)
+                         if kind in (pcapng.SECTION, pcapng.INTERFACE))
+        head, stream = sent.data[:4] + bytes(8 + 5 + 8 + 5), zlib.compress(b"ab")
+        counts = b"\x4B\xFB\x03\0"
+
+        def all_kinds(stream):
+            return head + struct.pack(">H", len(stream)) + stream
+
+        rows = (("whole", all_kinds(stream), None),
+                ("cut in its checksum", all_kinds(stream[:-2]), "zlib stream"),
+                ("another checksum", all_kinds(stream[:-1] + b"x"), "zlib stream"),
+                ("behind the stream", all_kinds(stream + b"x"), "zlib stream"),
+                ("more than defined in it", all_kinds(zlib.compress(b"abc")), "z holds more than defined"),
+                ("behind the fields", all_kinds(stream) + b"x", "longer than defined"),
+                ("counted", counts + b"\x01\x07\x01tr", None),
+                ("a negative count", counts + b"\x80" + bytes(40), "n=-128 is no count"),
+                ("beyond the range of the count", counts + b"\x04" + bytes(40), "n=4 is no count"),
+                ("beyond the size", counts + b"\0\x03" + bytes(3), "m=3 is no count"),
+                ("too many", counts + b"\0\0" + bytes(3), "r has too many elements"))
+        file = self.add("rows.pcapng", heads + b"".join(pcapng.packet_block(sent, row[1] + b"\0\0") for row in rows))
+        messages = tshark(file, "-T", "fields", "-e", "_ws.expert.message", definitions=definitions).splitlines()
+        for (name, _, wrong), fields, message in zip(rows, dissected(file, definitions), messages, strict=True):
+            with self.subTest(name=name):
+                self.assertIn("kral.defined", fields)
+                self.assertEqual("kral.defined.wrong" in fields, wrong is not None)
+                self.assertIn(wrong or "", message)
+
+    def test_definition_files_are_taken_as_the_library_takes_them(self):
+        _, calls = self.defined_calls()
+        file = calls[3][0]
+        wanted = [fields.get("kral.defined.field") for fields in dissected(file, self.path("kinds.xml"))]
+        text = KINDS.decode().replace("none is sent", "&#228;&#x1F4F1; \u00e4 \u20ac").replace(
+            "<Command name", "&#32;<![CDATA[ \n]]>&#x9;<Command name").replace('name="u64"', 'name="&#117;64" unit="&#181;s"')
+        narrow = text.replace("\u20ac", "")
+        for name, content in (("utf8", text.encode("utf-8-sig")), ("utf16", text.encode("utf-16")),
+                              ("utf16be", b"\xFE\xFF" + text.encode("utf-16-be")),
+                              ("latin", b"<?xml version='1.0' encoding='ISO-8859-1'?>" + narrow.encode("latin-1"))):
+            with self.subTest(name=name):
+                definitions = self.add(name + ".xml", content)
+                self.expect(0, "cmd", "list", "--defs", definitions)
+                shown = dissected(file, definitions)
+                self.assertEqual([fields.get("kral.defined.field") for fields in shown], wanted)
+                self.assertIn("18446744073709551615 \u00b5s", tshark(file, "-V", definitions=definitions))
 
     def test_hostile_definitions_cost_the_view_nothing_else(self):
         definitions, calls = self.defined_calls()

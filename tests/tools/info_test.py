@@ -78,12 +78,13 @@ class Ports(ToolTest):
                                      (3, "no port /dev/nothing", "/dev/nothing"), (2, "slot 7 is not", "slot:7"),
                                      (2, "slot:2 and slot:30 are both COM3", "slot:2,slot:30"),
                                      (2, "slot:1 and esn:11 are both COM2", "slot:1,esn:11"),
+                                     (2, "slot:2 and 3 are both COM3", "slot:2,3"),
                                      (2, "is no serial number", "esn:xyz"), (2, "is no slot", "slot:2-1")):
                 with self.subTest(name=name):
                     self.assertIn(text, self.expect_json(code, "-p", name, "info")["error"]["text"])
             self.assertIn(r"no port /dev/\x1b[1mü", self.expect(3, "-p", "/dev/\x1b[1mü", "info").err.replace("1B", "1b"))
             for words in (("5", "esn:11"), ("5", "esn:00000011"), ("5", "COM3"), ("5", "003"), ("5", "65535"), ("5", "usb:"),
-                          ("5", "esn:zz"), ("5", "/dev/\x1b[1m"), ("5", "slot:1"), ("5", "7,8"), ("5",), ("0", "7"),
+                          ("5", "esn:zz"), ("5", "/dev/\x1b[1m"), ("5", "slot:1"), ("5", "7,8"), ("5", "7-8"), ("5",), ("0", "7"),
                           ("5", "x"), ("5", "--remove"), ("--remove",)):
                 self.expect_json(2, "ports", "assign", *words)
             self.expect(0, "ports", "assign", "1", "--remove")

@@ -117,12 +117,15 @@ class Traffic(ToolTest):
         file = self.add("capture", b"KRALCAP\x1A" + struct.pack("<2HI", 1, 16, 0) + b"".join(
             struct.pack("<Q2H2B", (midnight + at) * 1000000, 2, 0xFFFD, 16, at & 0xFF) for at in (-20, -10, 0, 10)))
         day = time.strftime("%Y-%m-%d", time.gmtime(midnight))
-        for words, packets in (((), 4), (("--from", "23:59:50"), 3), (("--from", "23:59:45", "--to", "00:00:05"), 2),
-                               (("--to", "23:59:50"), 2), (("--to", "00:00"), 3), (("--from", f"{day}T00:00:00.5Z"), 1),
+        for words, packets in (((), 4), (("--from", "23:59:50"), 3), (("--from", "23:59:45", "--to", f"{day}T00:00:05"), 2),
+                               (("--to", "23:59:50"), 2), (("--to", "12:00"), 0), (("--to", f"{day}T00:00"), 3), (("--from", f"{day}T00:00:00.5Z"), 1),
                                (("--from", "12:00"), 4), (("--from", f"{day} 01:00"), 0)):
             with self.subTest(words=words):
                 self.assertEqual(self.stream("log", "play", file, *words)[-1]["packets"], packets)
-        for wrong in ("24:00", "1:2", "12:60", "12:00:0", "2026-02-30T01:00", "noon", "12:00x"):
+        self.assertIn("23:59:40", self.expect(0, "log", "play", file, "--to", "12:00").err)
+        refused = self.expect_json(2, "log", "play", file, "--from", "23:59:45", "--to", "00:00:05")
+        self.assertIn(f"--to {day}T00:00:05", refused["error"]["hint"])
+        for wrong in ("", "24:00", "1:2", "12:60", "12:00:0", "2026-02-30T01:00", "noon", "12:00x"):
             self.expect_json(2, "log", "play", file, "--from", wrong)
 
     def test_captures_become_pcapng_files_and_captures_again(self):
@@ -130,6 +133,7 @@ class Traffic(ToolTest):
         with self.handset(*self.RATES):
             packets = self.ask(0, "log", "capture", capture, "--on", "0x1001", "--count", "50")["packets"]
             self.expect(0, "-p", "7", "--trace", self.path("trace"), "log", "capture", self.path("x"), "--count", "20")
+        self.expect_json(2, "log", "export", capture, "-")
         self.assertEqual(self.expect_json(0, "log", "export", capture, file)["packets"], packets)
         self.assertEqual(len(pcapng.packets(self.content(file))), packets)
         done = self.expect_json(0, "log", "import", file, again)

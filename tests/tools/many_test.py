@@ -9,7 +9,9 @@ import struct
 import subprocess
 import termios
 
+import nv_test
 import tool
+from cmd_test import EXAMPLE as COMMANDS
 from flash_test import BootLoader
 from tool import PATIENCE, ToolTest, clean_environment, command, fixture, start, wait_until
 
@@ -73,21 +75,44 @@ class ManyHandsets(ToolTest):
                     (2, "COM2 is named twice", ("-p", "1-2,2-3", "info")),
                     (2, "is no list of ports", ("-p", "3-1", "info")),
                     (2, "0 is not a port number in 1,0", ("-p", "1,0", "info")),
-                    (2, "is not a port number", ("-p", "1,", "info")),
+                    (2, "1, is no list of ports", ("-p", "1,", "info")),
+                    (2, "that is no port", ("-p", "", "mode", "get")),
+                    (2, "nothing behind --port=", ("--port=", "mode", "get")),
+                    (2, "no name of a file", ("-p", "1", "mode", "get", "--log", "")),
+                    (2, "would destroy", ("-p", "1", "nv", "verify", self.path("1.pkv"), "--report", self.path("1.pkv"))),
+                    (2, "would destroy", ("-p", "1,2", "nv", "verify", self.path("{port}.pkv"), "--report",
+                                          self.path("1.pkv"))),
+                    (2, "would destroy", ("-p", "1,2", "flash", "write", f"2:{self.path('1.pkv')}", "--report",
+                                          self.path("1.pkv"))),
+                    (2, "{port} is of one", ("-p", "1", "info", "--report", self.path("{port}.html"))),
                     (2, "are the same device", ("-p", "1,9", "info")),
                     (2, "different things", ("-p", "1", "--all", "info")),
                     (2, "one handset at a time", ("-p", "1,2", "event", "tail")),
                     (2, "x.pkv for both COM1 and COM2", ("-p", "1,2", "nv", "backup", self.path("x.pkv"))),
                     (2, "both COM1 and COM2", ("--all", "fs", "get", ":/x")),
                     (2, "both COM1 and COM3", ("-p", "1,3", "info", "--log", log)),
+                    (2, "zz is not hex", ("-p", "1,2", "nv", "write", "447", "zz")),
+                    (2, "129 bytes are too many", ("--all", "nv", "write", "447", "00" * 129)),
+                    (2, "no item nosuch", ("-p", "1,2", "nv", "read", "nosuch")),
+                    (2, "99-1 is no range", ("-p", "1,2", "nv", "backup", self.path("{port}"), "--items", "99-1")),
+                    (2, "NV item 10: ", ("-p", "1,2", "nv", "write", "10", "1,x", *nv_test.NvItems.DEFS)),
+                    (2, "xyz is not hex", ("-p", "1,2", "raw", "xyz")),
+                    (2, "no FTM command NOSUCH", ("-p", "1,2", "ftm", "cmd", "NOSUCH")),
+                    (2, "no path of its side", ("-p", "1,2", "fs", "put", log, "/x")),
+                    (2, "nothing to switch", ("-p", "1,2", "log", "on")),
+                    (2, "99999 is not an id", ("-p", "1,2", "log", "capture", self.path("{port}.log"), "--on", "99999")),
+                    (2, "there is no command A.B", ("-p", "1,2", "cmd", "call", "A.B", "--defs", COMMANDS)),
+                    (2, "channel", ("-p", "1,2", "cmd", "call", "WLAN.TX_START", "channel=15", "--defs", COMMANDS)),
                     (2, "named", ("info", "--report", log)),
                     (2, "does nothing to handsets", ("-p", "1", "band", "list", "--report", log)),
-                    (2, "beside the report", ("-p", "1", "nv", "backup", log, "--report", log)),
+                    (2, "would destroy", ("-p", "1", "nv", "backup", log, "--report", log)),
                     (10, "cannot be written", ("-p", "1", "fs", "mkdir", ":/made", "--report", "/nonexistent/page")),
                     (10, "2.pkv for COM2", ("-p", "1,2", "nv", "restore", self.path("{port}.pkv"))),
                     (3, "nothing was done", ("-p", "1-3,5", "fs", "mkdir", ":/made"))):
                 with self.subTest(words=words):
-                    self.assertIn(text, self.expect_json(code, *words)["error"]["text"])
+                    answer = self.expect_json(code, *words)
+                    self.assertIn(text, answer["error"]["text"])
+                    self.assertNotIn("handsets", answer, "none of them has a verdict")
             self.assertFalse(os.path.exists(self.path("x.pkv")))
             command(sim, "fault 3 lose,of=7C")
             held = start("-p", "3", "--time-out", "20000", "--log", log, "raw", "7C", ports=self.ports)

@@ -52,6 +52,15 @@ class NvItems(ToolTest):
         self.assertEqual(len(self.expect_json(0, "nv", "defs", self.DEFS[1])["definitions"]), 29)
         self.assertIn("3101 CHANNEL_OFFSET [0-3]\n", self.expect(0, "nv", "defs", self.DEFS[1]).out)
 
+    def test_elements_of_an_array_keep_their_values(self):
+        with self.handset("--array", "3101:4"):
+            for index, value in (("1", "1,5"), ("3", "-2,9"), ("0", "7,7")):
+                self.ask(0, "nv", "write", "CHANNEL_OFFSET", value, "--index", index, *self.DEFS)
+            read = self.ask(0, "nv", "read", "CHANNEL_OFFSET", *self.DEFS)
+            self.assertEqual([(each["index"], [*each["value"].values()]) for each in read["items"][0]["elements"]],
+                             [(0, [7, 7]), (1, [1, 5]), (3, [-2, 9])])
+        self.expect(2, "sim", "--array", "3101:0")
+
     def test_dump_keeps_items_without_definition(self):
         source = self.path("source.xml")
         with self.handset("--fault", "hang-up,nth=9,of=26"):

@@ -139,8 +139,10 @@ class Failures(ToolTest):
         for words, page in pages.items():
             with self.subTest(words=words):
                 self.assertRegex(page, rf"\n  kral (-\S+ (\d+ )?)*{' '.join(words)}\b")
-                self.assertNotRegex(page, r" in \[|INT|FLOAT|:\{")
+                self.assertNotRegex(page, r" in \[|INT|FLOAT|:\{|Usage:.*\(\d+x\)|\n\nPositionals:\n  paths ")
+        self.assertIn("\nUsage: kral fs put [OPTIONS] LOCAL... :PATH\n", pages["fs", "put"])
         self.expect(0, "help", "--man", self.path("."))
+        self.assertIn(b"\\fBfs put\\fR [\\fIOPTION\\fR]... \\fILOCAL... :PATH\\fR\n", self.content("kral-fs.1"))
         for words, page in pages.items():
             with self.subTest(manual=words), open(self.path(f"kral-{words[0]}.1"), encoding="utf-8") as file:
                 manual = file.read().replace("\\-", "-").replace("\\&", "")

@@ -33,6 +33,7 @@ struct Chosen {
   std::map<const CLI::App*, Command::InDownload> in_download;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> writes;
   std::map<const CLI::App*, std::function<std::vector<std::string>()>> reads;
+  std::map<const CLI::App*, std::function<void()>> checks;
   std::map<const CLI::App*, std::function<bool()>> without_handset;
   std::map<const CLI::App*, std::function<bool()>> asks_nobody;
   struct SettledOption {
@@ -47,6 +48,7 @@ struct Chosen {
   std::set<std::string> asked;
   std::vector<std::string> words;
   std::map<const CLI::Option*, Suggest> suggestions;
+  std::map<const CLI::Option*, const char*> usages;
 };
 
 namespace {
@@ -305,11 +307,14 @@ Cursor CursorOf(CLI::App& root, const std::vector<std::string>& words) {
   return cursor;
 }
 
+// What a verb has in common with those above it is its own.
 std::vector<Completion> OptionsAt(const CLI::App* app) {
   std::vector<Completion> found;
+  std::set<std::string> names;
   for (; app != nullptr; app = app->get_parent()) {
     for (const auto* option : app->get_options()) {
-      if (option->nonpositional()) found.push_back({option->get_name(), option->get_description()});
+      if (!option->nonpositional() || !names.insert(option->get_name()).second) continue;
+      found.push_back({option->get_name(), option->get_description()});
     }
   }
   return found;
@@ -323,15 +328,42 @@ std::string FooterOf(const std::vector<std::string>& examples) {
   return examples.empty() ? "" : Format("Examples:\n  {}\n", Joined(examples, "\n  "));
 }
 
-ParameterText TextOf(const CLI::Option& option) {
+// The help of the parser library, but for arguments: "paths..." however many these are, or as their verb puts them.
+class HelpFormat : public CLI::Formatter {
+ public:
+  explicit HelpFormat(const std::map<const CLI::Option*, const char*>& usages) : usages_(usages) {}
+
+  std::string make_option_usage(const CLI::Option* option) const override {
+    if (const auto found = usages_.find(option); found != usages_.end()) return found->second;
+    const auto name = option->get_name(true) + (option->get_items_expected_max() > 1 ? "..." : "");
+    return option->get_required() ? name : Format("[{}]", name);
+  }
+
+  std::string make_option_name(const CLI::Option* option, bool is_argument) const override {
+    const auto found = usages_.find(option);
+    return found == usages_.end() ? Formatter::make_option_name(option, is_argument) : found->second;
+  }
+
+  std::string make_option_opts(const CLI::Option* option) const override {
+    return usages_.count(option) != 0 ? std::string() : Formatter::make_option_opts(option);
+  }
+
+ private:
+  const std::map<const CLI::Option*, const char*>& usages_;
+};
+
+ParameterText TextOf(const CLI::Option& option, const Chosen& chosen) {
   const bool has_value = option.get_items_expected_max() > 0;
   const auto& standard = option.get_default_str();
   return {option.get_name(option.get_positional(), true),
-          has_value ? option.get_type_name() + (standard.empty() ? "" : "=" + standard) : "", option.get_description(),
-          option.get_required(), option.get_items_expected_max() > 1};
+          has_value ? option.get_type_name() + (standard.empty() ? "" : "=" + standard) : "",
+          option.get_description(),
+          option.get_required(),
+          option.get_items_expected_max() > 1,
+          chosen.usages.count(&option) == 0 ? "" : chosen.usages.at(&option)};
 }
 
-CommandText TextOf(const CLI::App& app, const Examples& examples) {
+CommandText TextOf(const CLI::App& app, const Chosen& chosen, const Examples& examples) {
   CommandText text{app.get_name(), app.get_description(), NeedsVerb(app), {}, {}, app.get_footer(), {}, {}};
   if (const auto found = examples.find(&app); found != examples.end()) {
     text.examples = found->second;
@@ -339,10 +371,10 @@ CommandText TextOf(const CLI::App& app, const Examples& examples) {
   }
   for (const auto* option : app.get_options()) {
     if (option == app.get_help_ptr() && app.get_parent() != nullptr) continue;  // the same everywhere
-    (option->nonpositional() ? text.options : text.arguments).push_back(TextOf(*option));
+    (option->nonpositional() ? text.options : text.arguments).push_back(TextOf(*option, chosen));
   }
   for (const auto* verb : app.get_subcommands([](const CLI::App*) { return true; })) {
-    text.verbs.push_back(TextOf(*verb, examples));
+    text.verbs.push_back(TextOf(*verb, chosen, examples));
   }
   return text;
 }
@@ -355,6 +387,7 @@ Json JsonOf(const std::vector<ParameterText>& parameters) {
                     {"help", each.help},
                     {"required", each.required},
                     {"many", each.many}});
+    if (!each.usage.empty()) list.back()["usage"] = each.usage;
   }
   return list;
 }
@@ -374,14 +407,14 @@ Json JsonOf(const CommandText& command) {
 }
 
 // As text, or with --json as one object.
-void PrintHelp(CLI::App& root, const std::vector<std::string>& words, const Examples& examples) {
+void PrintHelp(CLI::App& root, const std::vector<std::string>& words, const Chosen& chosen, const Examples& examples) {
   const auto place = Follow(root, words);
   if (!place.unknown.empty()) throw ToolError(ExitCode::kUsage, DescribeUnknown(place), "kral help lists the verbs");
   const auto title = TitleOf(*place.app);
   const auto* const json = FindOption(&root, "--json");
   if (json != nullptr && json->count() != 0) {
     Json object{{"ok", true}, {"schema", kSchema}, {"verb", title}};
-    object.update(JsonOf(TextOf(*place.app, examples)));
+    object.update(JsonOf(TextOf(*place.app, chosen, examples)));
     std::cout << object.dump() << "\n";
     return;
   }
@@ -436,6 +469,11 @@ Option& Option::Separated(char by) {
 
 Option& Option::Count(int least, int most) {
   option_->expected(least, most);
+  return *this;
+}
+
+Option& Option::Usage(const char* words) {
+  chosen_->usages[option_] = words;
   return *this;
 }
 
@@ -606,6 +644,10 @@ std::vector<std::string> Command::Given(const char* option) const {
   return found->results();
 }
 
+void Command::Checks(std::function<void()> check) const {
+  chosen_->checks[app_] = std::move(check);
+}
+
 void Command::Reads(std::function<std::vector<std::string>()> files) const {
   chosen_->reads[app_] = std::move(files);
 }
@@ -621,10 +663,12 @@ void Command::Explain(std::function<std::string()> text) const {
 // --- The whole ------------------------------------------------------------------------------------------------------
 
 struct CommandLine::Parser {
-  Parser(const std::string& program, const std::string& description) : app(description, program) {}
+  Parser(const std::string& program, const std::string& description) : app(description, program) {
+    app.formatter(std::make_shared<HelpFormat>(chosen.usages));
+  }
 
-  CLI::App app;
   Chosen chosen;
+  CLI::App app;
   Examples examples;
 };
 
@@ -645,8 +689,8 @@ CommandLine::CommandLine(const std::string& program, const std::string& descript
   });
   help.Add("--man", *man, "Write manual pages of the same text into this folder");
   help.Run([parser = parser_.get(), words, man] {
-    if (man->empty()) return PrintHelp(parser->app, *words, parser->examples);
-    WriteManPages(TextOf(parser->app, parser->examples), *man);
+    if (man->empty()) return PrintHelp(parser->app, *words, parser->chosen, parser->examples);
+    WriteManPages(TextOf(parser->app, parser->chosen, parser->examples), *man);
   });
 }
 
@@ -675,7 +719,7 @@ std::function<void()> CommandLine::Parse(const std::vector<std::string>& argumen
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() != 0) throw Explain(parser_->app, arguments, error);
     if (dynamic_cast<const CLI::CallForHelp*>(&error) != nullptr) {
-      PrintHelp(parser_->app, arguments, parser_->examples);
+      PrintHelp(parser_->app, arguments, parser_->chosen, parser_->examples);
     } else {
       parser_->app.exit(error);  // --version
     }
@@ -698,7 +742,11 @@ Completions CommandLine::Complete(const std::vector<std::string>& words) {
   } else if (cursor.option != nullptr) {
     const auto found = parser_->chosen.suggestions.find(cursor.option);
     const bool is_known = found != parser_->chosen.suggestions.end();
-    if (is_known) all.words = found->second(words);
+    if (is_known) {
+      auto typed = words;
+      typed.back().erase(0, front.size());
+      all.words = found->second(typed);
+    }
     all.files = !is_known && cursor.option->get_type_name() == "TEXT";
   } else {
     for (const auto* verb : cursor.app->get_subcommands([](const CLI::App*) { return true; })) {
@@ -746,6 +794,11 @@ bool CommandLine::may_ask_all() const {
 
 const std::vector<std::string>& CommandLine::words() const {
   return parser_->chosen.words;
+}
+
+void CommandLine::Check() const {
+  const auto& chosen = parser_->chosen;
+  if (const auto found = chosen.checks.find(chosen.verb); found != chosen.checks.end()) found->second();
 }
 
 std::vector<std::string> CommandLine::Read() const {

@@ -40,7 +40,8 @@ struct Completions {
   std::vector<Completion> words;
   bool files = false;  // names of files as well
 };
-// Asked with the words of a line that is being typed, of which the last may be unfinished.
+// Asked with the words of a line that is being typed, of which the last may be unfinished; of --name=value only the
+// value is in it.
 using Suggest = std::function<std::vector<Completion>(const std::vector<std::string>& words)>;
 
 // An option or an argument, for whatever else is to be said of it.
@@ -54,6 +55,8 @@ class Option {
   Option& OneEach();           // every value has the option in front of it
   Option& Separated(char by);  // values in one word
   Option& Count(int least, int most);
+  // Of a list whose values mean different things: how the line of usage has them, "LOCAL... :PATH".
+  Option& Usage(const char* words);
   // Of a text, or a list of them: names of files, in which {port}, {serial}, {model} and {slot} stand for the
   // handset's.
   Option& File();
@@ -119,6 +122,8 @@ class Command {
   void Writes(std::function<std::vector<std::string>()> files) const;
   // Which it reads: they must be there before the work begins on any handset.
   void Reads(std::function<std::vector<std::string>()> files) const;
+  // What can be wrong with its words alone: a ToolError of this is told once, before several handsets are asked.
+  void Checks(std::function<void()> check) const;
   // Below the options in the help.
   void Explain(std::function<std::string()> text) const;
 
@@ -165,6 +170,7 @@ class CommandLine {
   bool asks_identity() const;
   bool may_ask_all() const;
   const std::vector<std::string>& words() const;  // of its own texts, names of files as they are now
+  void Check() const;
   std::vector<std::string> Read() const;
   std::vector<std::string> Written() const;    // local files, as far as it has said so
   const std::set<std::string>& asked() const;  // which names were asked for: "serial"

@@ -36,8 +36,14 @@ std::string FaultOfTraceFile(const std::string& file) {
   return file.empty() ? "a trace has a file" : "";
 }
 
+std::string FaultOfOutput(const std::string& file) {
+  return file.empty() ? "that is no name of a file" : "";
+}
+
 // What others take for the parents of a directory is the port here, in front of the verb and behind it.
 std::string FaultOfPort(const std::string& name) {
+  if (name.empty()) return "that is no port; without --port the only one with a handset is taken";
+  if (name.starts_with('-')) return "ports are numbers from 1 to 255, or names";
   return name.starts_with(':') ? "that is a path on the handset; kral fs mkdir --parents makes those above, too" : "";
 }
 
@@ -47,6 +53,7 @@ void AddCommonOptions(const Command& root, Context& context) {
            "Ports, such as 7, 20-27, /dev/ttyUSB0, esn:80C0FFEE, usb:1-4.2, slot:3, or several with commas; default: "
            "the only one with a handset")
       .Check(FaultOfPort)
+      .Suggests(SuggestPorts)
       .Settled("port", "--all");
   root.Add("--wait", context.wait_s, "Wait so long until the ports are there and handsets answer; --wait alone: 30 s")
       .Between(0, kLongestWaitS, "s");
@@ -60,6 +67,7 @@ void AddCommonOptions(const Command& root, Context& context) {
       "Print one JSON object");
   root.Add("--log", context.session.log_file, "Write the text log of the connection to this file")
       .File()
+      .Check(FaultOfOutput)
       .Settled("log");
   root.Add("--log-flags", context.session.log_flags, "Categories of the text log, such as 0x421F").Settled("log_flags");
   root.Add("--trace", context.session.trace.file, "Write what passes over the port to this file, as pcapng")
@@ -69,7 +77,8 @@ void AddCommonOptions(const Command& root, Context& context) {
            "Write the last of it to this file, if the command fails")
       .File()
       .Check(FaultOfTraceFile);
-  root.Add("--report", context.report, "Write a page with steps, times and verdict of each handset to this file");
+  root.Add("--report", context.report, "Write a page with steps, times and verdict of each handset to this file")
+      .Check(FaultOfOutput);
   root.Add("--time-out", context.session.time_out_ms, "Milliseconds to wait for each answer")
       .Between(1, kLongestTimeOutMs, "ms")
       .Settled("time_out");
@@ -132,6 +141,16 @@ std::unique_ptr<ParsedCommand> ParseAgain(const std::vector<std::string>& argume
   return command;
 }
 
+// An option with "=" and nothing behind it: the parser would take the next word for its value.
+void RefuseMissingValues(const std::vector<std::string>& arguments) {
+  for (const auto& argument : arguments) {
+    if (argument == "--") return;
+    if (!argument.starts_with("--") || argument.find('=') != argument.size() - 1) continue;
+    throw ToolError(ExitCode::kUsage, Format("there is nothing behind {}", argument),
+                    "give it a value, or leave it out");
+  }
+}
+
 // --wait without a value: the parser would take the word behind it, whatever that is.
 std::vector<std::string> WithUsualWait(std::vector<std::string> arguments) {
   for (std::size_t i = 0; i < arguments.size() && arguments[i] != "--"; ++i) {
@@ -154,13 +173,18 @@ void CheckReport(Context& context, const CommandLine& line) {
   if (!context.all && context.session.port.empty()) {
     throw ToolError(ExitCode::kUsage, "a report is of ports that are named", "-p 7, -p 7-14 or --all");
   }
+  for (const char* name : {"{port}", "{serial}", "{model}", "{slot}"}) {
+    if (context.report.find(name) == std::string::npos) continue;
+    throw ToolError(ExitCode::kUsage, Format("one report is of all handsets: {} is of one", name), "leave it out");
+  }
   RefuseLogFile(context.session.log_file, context.report, "the report");
   CheckPage(context.report, "--report");
 }
 
 void RefuseSharedFiles(const ParsedCommand& command) {
   const auto& session = command.context.session;
-  RefuseSharedFiles(session.log_file, session.trace, {command.line->Written(), command.line->words()});
+  RefuseSharedFiles(session.log_file, session.trace, command.context.report,
+                    {command.line->Written(), command.line->words()});
 }
 
 // From here on ports are numbers.
@@ -182,20 +206,21 @@ void FindPorts(Context& context, const std::string& verb) {
 }
 
 void Act(std::unique_ptr<ParsedCommand>& command, const std::vector<std::string>& arguments) {
-  CheckReport(command->context, *command->line);
   RefuseSharedFiles(*command);
+  CheckReport(command->context, *command->line);
   if (command->line->asks_nobody()) {
     IsForMany(*command);  // which may refuse
     return command->act();
   }
+  if (command->context.for_several() && command->line->asked().empty()) command->line->Check();
   FindPorts(command->context, command->line->verb());
   const auto parse_for = [&](std::uint16_t port, const Names& names) {
     auto own = ParseAgain(arguments, *command->line, names);
     own->context.session.port = std::to_string(port);
     own->context.session.slots = command->context.session.slots;
     own->context.all = false;
-    own->context.report.clear();
     RefuseSharedFiles(*own);
+    own->context.report.clear();
     return own;
   };
   if (IsForMany(*command)) return RunOnMany(*command, parse_for);
@@ -228,6 +253,7 @@ int Run(const std::vector<std::string>& words) {
   AddExamples(*command->line);
 
   try {
+    RefuseMissingValues(arguments);
     command->act = command->line->Parse(arguments);
     if (command->act == nullptr) return static_cast<int>(ExitCode::kDone);  // help
     Act(command, arguments);

@@ -86,6 +86,7 @@ std::string Sentence(const std::string& help) {
 
 // "-p, --port TEXT", "file..."
 std::string TitleOf(const ParameterText& parameter) {
+  if (!parameter.usage.empty()) return Italic(parameter.usage);
   if (!parameter.names.starts_with('-')) return Italic(parameter.names) + (parameter.many ? "..." : "");
   std::string title;
   std::istringstream names(parameter.names);
@@ -104,11 +105,15 @@ void AddLines(std::string_view lines, std::string& page) {
   page += Format(".PP\n.EX\n{}{}.EE\n", Roff(lines), lines.ends_with('\n') ? "" : "\n");
 }
 
-// "kral [OPTION]... fs put [OPTION]... paths..."
+// "kral [OPTION]... fs put [OPTION]... LOCAL... :PATH"
 std::string Synopsis(const std::string& words, const CommandText& verb) {
   std::string line = Format("{} [{}]... {}", Bold("kral"), Italic("OPTION"), Bold(words));
   if (!verb.options.empty()) line += Format(" [{}]...", Italic("OPTION"));
   for (const auto& argument : verb.arguments) {
+    if (!argument.usage.empty()) {
+      line += " " + Italic(argument.usage);
+      continue;
+    }
     const auto name = Italic(argument.names) + (argument.many ? "..." : "");
     line += argument.required ? " " + name : Format(" [{}]", name);
   }

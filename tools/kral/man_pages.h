@@ -13,6 +13,7 @@ struct ParameterText {
   std::string help;
   bool required;
   bool many;
+  std::string usage;  // in place of its name in a synopsis, where its values mean different things: "LOCAL... :PATH"
 };
 
 struct CommandText {

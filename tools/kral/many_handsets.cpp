@@ -242,6 +242,10 @@ void ManyHandsets::Prepare() {
     handset.command->context.session.serial = handset.verdict.serial;
   }
   RefuseMissingFiles();
+  // Where names of files are those of a handset, its words are only known now.
+  for (const auto& handset : handsets_) {
+    if (handset->command && !command_.line->asked().empty()) handset->command->line->Check();
+  }
   RefuseSameFiles();
 }
 
@@ -358,7 +362,12 @@ void ManyHandsets::Run() {
   Conclude();
 }
 
+ToolError NoList(std::string_view text) {
+  return {ExitCode::kUsage, Format("{} is no list of ports", text), "give numbers and ranges: -p 7,8,20-27"};
+}
+
 std::uint16_t PortAt(std::string_view text, std::string_view whole) {
+  if (text.empty()) throw NoList(whole);
   const auto port = ParsePort(text);
   if (port != 0 && port <= kLastPort) return port;
   throw ToolError(ExitCode::kUsage,
@@ -377,8 +386,7 @@ std::vector<std::uint16_t> ParsePorts(std::string_view text) {
     const auto first = PortAt(part.substr(0, dash), text);
     const auto last = dash == std::string_view::npos ? first : PortAt(part.substr(dash + 1), text);
     if (last < first) {
-      throw ToolError(ExitCode::kUsage, Format("{} is no list of ports", text),
-                      "give numbers and ranges: -p 7,8,20-27");
+      throw NoList(text);
     }
     for (unsigned port = first; port <= last; ++port) {
       if (std::ranges::find(ports, port) != ports.end()) {

@@ -98,7 +98,28 @@ std::uint32_t SerialIn(std::string_view name) {
   return *serial;
 }
 
-std::uint16_t PortOfSerial(std::string_view name) {
+// Behind what a handset sends by itself its answer comes late: as long as packets come it is asked again.
+bool ReadSerial(KRAL_HANDLE handle, const SessionOptions& options, std::uint32_t& serial) {
+  constexpr int kMostAskings = 3;
+  constexpr std::uint64_t kLeastPackets = 100;  // in the time of an answer
+  const auto received = [handle] {
+    KRAL_TRAFFIC_COUNTERS counters{};
+    return KRAL_GetTrafficCounters(handle, &counters) == 0 ? std::uint64_t{0} : counters.packets_received;
+  };
+  KRAL_SetResynchronise(handle, 1);
+  if (options.time_out_ms) {
+    KRAL_ConfigureTimeOut(handle, KRAL_TIME_OUT_COMMAND, static_cast<std::int32_t>(*options.time_out_ms));
+  }
+  for (int asked = 0; asked < kMostAskings && !Interrupted(); ++asked) {
+    const auto before = received();
+    if (KRAL_DIAG_READ_ESN_F(handle, &serial) != 0) return true;
+    if (LastError(handle).value_or(KRAL_ERROR{}).code == KRAL_ERROR_REFUSED) return false;
+    if (received() - before < kLeastPackets) return false;
+  }
+  return false;
+}
+
+std::uint16_t PortOfSerial(std::string_view name, const SessionOptions& options) {
   const auto wanted = SerialIn(name);
   const auto ports = ListPorts();
   std::mutex mutex;
@@ -109,7 +130,7 @@ std::uint16_t PortOfSerial(std::string_view name) {
     if (KRAL_GetPortInfo(ports[number], 1, &info) == 0 || info.answers != KRAL_ANSWERS_DIAGNOSTICS) return;
     const KRAL_HANDLE handle = KRAL_ConnectServer(ports[number]);
     std::uint32_t serial = 0;
-    const bool told = KRAL_DIAG_READ_ESN_F(handle, &serial) != 0;
+    const bool told = ReadSerial(handle, options, serial);
     // What came in place of its answer may have been due to an earlier question.
     const bool is_late = !told && LastError(handle).value_or(KRAL_ERROR{}).code != KRAL_ERROR_REFUSED;
     KRAL_DisconnectServer(handle);
@@ -141,8 +162,8 @@ std::uint16_t PortOfSocket(std::string_view name) {
   return TheOne(name, found, "kral ports shows the sockets in use; check that the handset is plugged in and on");
 }
 
-std::uint16_t PortOf(const std::string& name) {
-  if (name.starts_with(kEsn)) return PortOfSerial(name);
+std::uint16_t PortOf(const std::string& name, const SessionOptions& options) {
+  if (name.starts_with(kEsn)) return PortOfSerial(name, options);
   if (name.starts_with(kUsb)) return PortOfSocket(name);
   return IsDevice(name) ? PortOfDevice(name) : ParsePort(name);
 }
@@ -179,9 +200,8 @@ struct Resolved {
       throw ToolError(ExitCode::kUsage, Format("{} and {} are both {}", first->second, name, DescribePort(port)),
                       "name each port once");
     }
-    AddText(std::to_string(port));
+    numbers += (numbers.empty() ? "" : ",") + std::to_string(port);
   }
-  void AddText(const std::string& text) { numbers += (numbers.empty() ? "" : ",") + text; }
 };
 
 void AddSlots(const std::string& name, SessionOptions& options, Resolved& resolved) {
@@ -192,7 +212,7 @@ void AddSlots(const std::string& name, SessionOptions& options, Resolved& resolv
       throw ToolError(ExitCode::kUsage, Format("slot {} is not assigned", slot),
                       Format("kral ports assign {} usb:1-4.2 tells where it is", slot));
     }
-    const auto port = PortOf(found->second);
+    const auto port = PortOf(found->second, options);
     resolved.Add(port, Format("slot:{}", slot));
     options.slots[port] = slot;
   }
@@ -213,12 +233,26 @@ void ResolvePortNames(SessionOptions& options) {
     if (part.starts_with(kSlot)) {
       AddSlots(part, options, resolved);
     } else if (IsName(part)) {
-      resolved.Add(PortOf(part), part);
+      resolved.Add(PortOf(part, options), part);
     } else {
-      resolved.AddText(part);
+      for (const auto port : ParsePorts(part)) resolved.Add(port, part);
     }
   }
   options.port = resolved.numbers;
+}
+
+std::vector<Completion> SuggestPorts(const std::vector<std::string>& words) {
+  const auto& typed = words.back();
+  const auto front = typed.substr(0, typed.rfind(',') + 1);
+  const bool wants_device = IsDevice(std::string_view(typed).substr(front.size()));
+  std::vector<Completion> found;
+  for (const auto port : ListPorts()) {
+    const auto device = ComPortDevice(port);
+    if (!wants_device) found.push_back({Format("{}{}", front, port), device});
+    if (wants_device && IsDevice(device)) found.push_back({front + device, Format("COM{}", port)});
+  }
+  for (const auto& [slot, name] : ReadSlots()) found.push_back({Format("{}{}{}", front, kSlot, slot), name});
+  return found;
 }
 
 std::string PortName(const std::string& name) {
@@ -228,7 +262,8 @@ std::string PortName(const std::string& name) {
   if (name.starts_with(kEsn)) return Format("{}{:08X}", kEsn, SerialIn(name));
   if (is_text && name.starts_with(kUsb) && name.size() > kUsb.size()) return name;
   if (!is_text || IsName(name)) throw ToolError(ExitCode::kUsage, Format("'{}' is no name of one port", name), kNames);
-  return std::to_string(ParsePorts(name).front());
+  if (const auto ports = ParsePorts(name); ports.size() == 1) return std::to_string(ports.front());
+  throw ToolError(ExitCode::kUsage, Format("'{}' is no name of one port", name), kNames);
 }
 
 std::string SlotFile() {

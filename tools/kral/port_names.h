@@ -7,7 +7,9 @@
 #include <functional>
 #include <map>
 #include <string>
+#include <vector>
 
+#include "tools/kral/command_line.h"
 #include "tools/kral/session.h"
 
 namespace kral::tool {
@@ -24,6 +26,9 @@ void ChangeSlots(const std::function<void(std::map<std::uint16_t, std::string>& 
 std::string SlotFile();
 // A name in the one way in which it is kept; ToolError for what cannot be the name of a port.
 std::string PortName(const std::string& name);
+
+// The ports of this machine and the slots of the fixture, as -p takes them; `words` end in what is being typed.
+std::vector<Completion> SuggestPorts(const std::vector<std::string>& words);
 
 // Waits until all ports are there and handsets answer on them, or for so long: what is then still missing the verb
 // tells. A boot loader is not asked.

@@ -120,6 +120,14 @@ bool IsOtherThanSilence(const std::optional<KRAL_ERROR>& record) {
 
 }  // namespace
 
+SessionOptions OfNullPort(SessionOptions options) {
+  options.port = std::to_string(KRAL_PORT_NULL);
+  options.serial.clear();
+  options.log_file.clear();
+  options.trace = {};
+  return options;
+}
+
 std::uint16_t ParsePort(std::string_view text) {
   auto digits = text;
   if (digits.size() > 3 && (digits.substr(0, 3) == "COM" || digits.substr(0, 3) == "com")) digits.remove_prefix(3);

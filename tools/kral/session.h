@@ -28,6 +28,9 @@ struct SessionOptions {
   std::optional<std::uint32_t> time_out_ms;  // of every request
 };
 
+// Of the null port, which answers for a handset where only the library is asked; neither logged nor traced.
+SessionOptions OfNullPort(SessionOptions options);
+
 // "7", "COM7"; ToolError kUsage for anything else.
 std::uint16_t ParsePort(std::string_view text);
 // "COM7", with the device behind it where that is a different name.

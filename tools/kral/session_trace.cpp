@@ -47,9 +47,12 @@ void RefuseLogFile(const std::string& log_file, const std::string& file, const c
                   "name another file than that of --log");
 }
 
-void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const FilesOfVerb& files) {
-  const std::pair<const char*, const std::string&> others[] = {
-      {"--log", log_file}, {"--trace", trace.file}, {"--trace-on-failure", trace.file_on_failure}};
+void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const std::string& report,
+                       const FilesOfVerb& files) {
+  const std::pair<const char*, const std::string&> others[] = {{"--log", log_file},
+                                                               {"--trace", trace.file},
+                                                               {"--trace-on-failure", trace.file_on_failure},
+                                                               {"--report", report}};
   for (const auto& [option, file] : others) {
     if (file.empty()) continue;
     if (!std::ranges::any_of(files.words, IsFile(file)) && !std::ranges::any_of(files.written, IsFile(file))) continue;

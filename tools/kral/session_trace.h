@@ -24,9 +24,10 @@ struct FilesOfVerb {
   std::vector<std::string> written;
   std::vector<std::string> words;  // with those that it writes
 };
-// ToolError when text log or trace would be written to one of them, and when what it writes is twice among them: it
-// would destroy what it reads.
-void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const FilesOfVerb& files);
+// ToolError when text log, trace or report would be written to one of them, and when what it writes is twice among
+// them: it would destroy what it reads.
+void RefuseSharedFiles(const std::string& log_file, const TraceOptions& trace, const std::string& report,
+                       const FilesOfVerb& files);
 
 class SessionTrace {
  public:

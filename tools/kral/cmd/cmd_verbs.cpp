@@ -99,9 +99,24 @@ std::string QuotedField(const std::string& word) {
   return field + '"';
 }
 
-void Call(const Context& context, const CmdOptions& options) {
+std::string QuotedFields(const CmdOptions& options) {
   std::string fields;
   for (const auto& word : options.fields) fields += QuotedField(word) + ' ';
+  return fields;
+}
+
+void CheckCall(const Context& context, const CmdOptions& options) {
+  const auto fields = QuotedFields(options);
+  Session session(OfNullPort(context.session));
+  LoadCommands(session, options.files);
+  const auto command = FindCommand(session, options.command);
+  std::uint32_t call = 0;
+  session.Run(command.name, [&] { return KRAL_CMD_Prepare(session.handle(), command.name.c_str(), &call); });
+  session.Run(command.name, [&] { return KRAL_CMD_SetFields(session.handle(), call, fields.c_str()); });
+}
+
+void Call(const Context& context, const CmdOptions& options) {
+  const auto fields = QuotedFields(options);
   Session session(context.session);
   LoadCommands(session, options.files);
   const auto command = FindCommand(session, options.command);
@@ -237,6 +252,7 @@ void AddCmdVerbs(const Command& root, Context& context) {
   call.Add("--mode-id", options->mode_id, "Mode id, of families that use the current one");
   call.Add("--rf-mode", options->rf_mode, "RF mode to be set in front");
   call.ForMany();
+  call.Checks([&context, options] { CheckCall(context, *options); });
   call.Run([&context, options] { Call(context, *options); });
   AddHeaderVerb(cmd, context);
 }

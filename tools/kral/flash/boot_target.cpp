@@ -12,6 +12,11 @@ namespace {
 
 constexpr std::uint32_t kLookAroundMs = 100;
 
+bool IsListed(std::uint16_t port) {
+  KRAL_PORT_INFO info{};
+  return KRAL_GetPortInfo(port, 0, &info) != 0 && info.state != KRAL_PORT_NOT_FOUND;
+}
+
 }  // namespace
 
 std::string BootHint(std::uint32_t code) {
@@ -117,12 +122,16 @@ void BootTarget::Reset() {
 void BootTarget::AwaitPort(const std::function<bool()>& attempt) {
   Clock& clock = SystemClock();
   const std::uint32_t start = clock.TickMs();
+  const auto is_late = [&] { return clock.TickMs() - start >= options_.wait_s * 1000; };
   for (;;) {
     session_.Begin();
     if (attempt()) return;
     if (Interrupted()) throw InterruptedError();
-    if (!IsPortMissing() || clock.TickMs() - start >= options_.wait_s * 1000) throw Explain();
-    clock.SleepMs(kLookAroundMs);
+    if (!IsPortMissing() || is_late()) throw Explain();
+    // An attempt begins with its files.
+    do {
+      clock.SleepMs(kLookAroundMs);
+    } while (!Interrupted() && !is_late() && !IsListed(session_.port()));
   }
 }
 

@@ -90,21 +90,21 @@ void PrintFlashPlan(const Context& context, const FlashAllArguments& arguments, 
 }
 
 void FlashAll(Context& context, const FlashAllArguments& arguments) {
-  std::vector<FlashImage> images;
-  for (const auto& image : arguments.images) images.push_back(ReadFlashImage(image, KRAL_IMAGE_FORMAT_BY_CONTENT));
-  if (arguments.dry_run) {
-    CheckFile(arguments.programmer);
-    return PrintFlashPlan(context, arguments, images);
-  }
-  if (context.for_several()) {
+  if (context.for_several() && !arguments.dry_run) {
     FlashPlan plan;
     plan.programmer = arguments.programmer;
     plan.enter = arguments.options.enter;
     plan.return_s = arguments.options.wait_s;
     plan.pre_done_delay_ms = arguments.options.pre_done_delay_ms;
-    plan.images = images;
+    plan.images = arguments.images;
     plan.reset = arguments.reset;
     return FlashMany(context, plan);
+  }
+  std::vector<FlashImage> images;
+  for (const auto& image : arguments.images) images.push_back(ReadFlashImage(image, KRAL_IMAGE_FORMAT_BY_CONTENT));
+  if (arguments.dry_run) {
+    CheckFile(arguments.programmer);
+    return PrintFlashPlan(context, arguments, images);
   }
   BootTarget target(context, arguments.options);
   target.FlashAll(arguments.programmer, images);

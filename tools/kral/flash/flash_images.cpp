@@ -80,13 +80,13 @@ std::optional<std::uint8_t> TakeType(std::string_view& argument) {
 
 }  // namespace
 
-void CheckFile(const std::string& file, std::uint64_t most) {
+std::uint64_t CheckFile(const std::string& file, std::uint64_t most) {
   FileReader reader;
   if (const auto error = reader.Open(file)) {
     throw BadImage(file, "the file cannot be opened: " + error.message(), "check its name and permissions");
   }
   if (reader.size() == 0) throw BadImage(file, "the file is empty", "check its name");
-  if (reader.size() <= most) return;
+  if (reader.size() <= most) return reader.size();
   throw BadImage(file, Format("it has {} bytes", reader.size()), Format("at most {} are taken", most));
 }
 
@@ -95,10 +95,15 @@ std::uint32_t ParseImageFormat(std::string_view name) {
   return name == "bin" ? KRAL_IMAGE_FORMAT_BINARY : KRAL_IMAGE_FORMAT_BY_CONTENT;
 }
 
-FlashImage ReadFlashImage(std::string_view argument, std::uint32_t format) {
+FlashImage NameFlashImage(std::string_view argument) {
   FlashImage image;
   image.type = TakeType(argument);
   image.file = argument;
+  return image;
+}
+
+FlashImage ReadFlashImage(std::string_view argument, std::uint32_t format) {
+  auto image = NameFlashImage(argument);
   image.info = ReadInfo(image.file, format);
   if (image.info.size[1] != 0) {
     throw BadImage(image.file, "it has a second region at 0x08000000, which a download would leave out",

@@ -22,13 +22,15 @@ struct FlashImage {
 // "hex", "bin" or "auto".
 std::uint32_t ParseImageFormat(std::string_view name);
 
-// "FILE" or "TYPE:FILE", opened and read from end to end; ToolError kBadFile when it cannot be downloaded.
+// "FILE" or "TYPE:FILE", which is not looked at.
+FlashImage NameFlashImage(std::string_view argument);
+// The same, opened and read from end to end; ToolError kBadFile when it cannot be downloaded.
 FlashImage ReadFlashImage(std::string_view argument, std::uint32_t format);
 // A flash programmer: HEX, not too large, and started at its lowest address.
 FlashImage ReadProgrammer(const std::string& file);
 
-// ToolError kBadFile for one that is no readable file, empty, or longer than `most` bytes.
-void CheckFile(const std::string& file, std::uint64_t most = UINT64_MAX);
+// How long it is. ToolError kBadFile for one that is no readable file, empty, or longer than `most` bytes.
+std::uint64_t CheckFile(const std::string& file, std::uint64_t most = UINT64_MAX);
 
 // What a file holds, for people and in JSON.
 std::string DescribeImage(const FlashImage& image);

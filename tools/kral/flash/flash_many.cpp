@@ -60,6 +60,7 @@ class FlashJob {
   std::vector<std::uint16_t> Ports() const;
   void SetUp();
   void AddHandset(std::uint16_t port);
+  void Start();
   void Watch(Board& board);
   void Look(std::uint32_t number, Board& board);
   double SecondsNow() const;
@@ -71,6 +72,7 @@ class FlashJob {
   Context& context_;
   const FlashPlan& plan_;
   const KRAL_VENTRIMS_JOB job_;
+  std::uint64_t programmer_bytes_ = 0;
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
   std::deque<OneHandset> handsets_;
   std::mutex steps_mutex_;  // of all of them
@@ -106,17 +108,19 @@ void FlashJob::SetUp() {
   options.block_size = plan_.options.block_size;
   options.command_ms = context_.session.time_out_ms.value_or(0);
   if (plan_.return_s != 0) options.return_ms = plan_.return_s * 1000;
-  // Of a start only the boot loader's hello remains, which is said by now or as soon as the port is there.
-  if (plan_.return_s != 0 && !plan_.enter && !plan_.reset) options.start_ms = options.return_ms + kHelloMs;
+  // It is said by now, or as soon as the port is there.
+  if (!plan_.programmer.empty()) options.hello_ms = plan_.return_s * 1000 + kHelloMs;
   Do(KRAL_VENTRIMS_SetOptions(job_, &options), "the job");
   if (!plan_.programmer.empty()) {
+    programmer_bytes_ = CheckFile(plan_.programmer);
     Do(KRAL_VENTRIMS_AddProgrammer(job_, plan_.programmer.c_str(), KRAL_VENTRIMS_PROGRAMMER_BOOT), "the programmer");
   }
   if (!plan_.partition_table.empty()) {
     Do(KRAL_VENTRIMS_AddPartitionTable(job_, plan_.partition_table.c_str(), plan_.override_table ? 1 : 0),
        "the partition table");
   }
-  for (const auto& image : plan_.images) {
+  for (const auto& argument : plan_.images) {
+    const auto image = NameFlashImage(argument);
     Do(KRAL_VENTRIMS_AddImage(job_, image.file.c_str(), plan_.options.format, image.type.value_or(plan_.options.type),
                               plan_.options.header.empty() ? nullptr : plan_.options.header.c_str(),
                               plan_.options.nor ? KRAL_STREAM_NOR : KRAL_STREAM_MULTI_IMAGE),
@@ -142,6 +146,16 @@ void FlashJob::AddHandset(std::uint16_t port) {
   handsets_.back().log = OpenLogFile(log);
   if (context_.session.log_flags) KRAL_SetLogFlags(handle, *context_.session.log_flags);
   KRAL_StartLogging(handle, log.c_str());
+}
+
+// What the job says of a file is put into more words.
+void FlashJob::Start() {
+  if (KRAL_VENTRIMS_Start(job_) != 0) return;
+  const auto record = LastError(job_);
+  if (record && record->code == KRAL_ERROR_BAD_FILE) {
+    for (const auto& image : plan_.images) ReadFlashImage(image, plan_.options.format);
+  }
+  throw ExplainRecord(record, "the start of the download", 0);
 }
 
 void FlashJob::Look(std::uint32_t number, Board& board) {
@@ -172,8 +186,9 @@ void FlashJob::Judge(std::uint32_t number) {
                      {"step", result.progress.step_name},
                      {"attempts", result.progress.attempts}};
   if (result.passed != 0) {
-    verdict.data = Format("{} in {} written and acknowledged\n", Counted(TotalBytes(plan_.images), "byte"),
-                          Counted(plan_.images.size(), "image"));
+    verdict.data =
+        Format("{} in {} written and acknowledged\n", Counted(result.progress.bytes_done - programmer_bytes_, "byte"),
+               Counted(plan_.images.size(), "image"));
   } else if (result.progress.state == KRAL_VENTRIMS_ABORTED) {
     verdict.failure = InterruptedError();
   } else {
@@ -233,7 +248,7 @@ void FlashJob::Run() {
     reinterpret_cast<FlashJob*>(job)->NoteStep(number);
   };
   Do(KRAL_VENTRIMS_SetCallback(job_, note_step, reinterpret_cast<std::uintptr_t>(this)), "the job");
-  Do(KRAL_VENTRIMS_Start(job_), "the start of the download");
+  Start();
   {
     Board board(context_.out, ports);
     for (std::size_t number = 0; number < handsets_.size(); ++number) {

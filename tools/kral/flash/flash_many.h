@@ -16,12 +16,12 @@ struct FlashPlan {
   std::uint32_t pre_done_delay_ms = 0;
   std::string partition_table;
   bool override_table = false;
-  std::vector<FlashImage> images;
+  std::vector<std::string> images;  // as FILE or TYPE:FILE
   WriteOptions options;
   bool reset = false;
 };
 
-// Each file is read once, whatever the number of handsets.
+// Each file is read once, by the job, whatever the number of handsets.
 void FlashMany(Context& context, const FlashPlan& plan);
 
 }  // namespace kral::tool

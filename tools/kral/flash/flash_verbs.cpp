@@ -107,14 +107,14 @@ void PrintPlan(Context& context, const std::vector<FlashImage>& images, std::uin
       {{"dry_run", true}, {"images", rows}, {"bytes", bytes}, {"blocks", blocks}, {"block_size", block_size}}, text);
 }
 
-void WriteToMany(Context& context, const WriteArguments& arguments, const std::vector<FlashImage>& images) {
+void WriteToMany(Context& context, const WriteArguments& arguments) {
   if (arguments.security_mode) {
     throw ToolError(ExitCode::kUsage, "a security mode is set on one handset at a time", "name one port: -p 7");
   }
   FlashPlan plan;
   plan.partition_table = arguments.partition_table;
   plan.override_table = arguments.override_table;
-  plan.images = images;
+  plan.images = arguments.images;
   plan.options = arguments.options;
   plan.reset = arguments.reset;
   FlashMany(context, plan);
@@ -124,13 +124,13 @@ void WriteToMany(Context& context, const WriteArguments& arguments, const std::v
 void WriteImages(Context& context, WriteArguments arguments) {
   auto& options = arguments.options;
   options.format = ParseImageFormat(arguments.format);
-  std::vector<FlashImage> images;
-  for (const auto& argument : arguments.images) images.push_back(ReadFlashImage(argument, options.format));
   if (!options.header.empty()) CheckFile(options.header, kLargestOpening);
   if (!arguments.partition_table.empty()) CheckFile(arguments.partition_table, kLargestOpening);
+  if (context.for_several() && !arguments.dry_run) return WriteToMany(context, arguments);
+  std::vector<FlashImage> images;
+  for (const auto& argument : arguments.images) images.push_back(ReadFlashImage(argument, options.format));
   if (arguments.dry_run)
     return PrintPlan(context, images, options.block_size == 0 ? kLargestBlock : options.block_size);
-  if (context.for_several()) return WriteToMany(context, arguments, images);
 
   FlashTarget target(context);
   const auto limits = target.Hello();

@@ -421,28 +421,32 @@ constexpr int kMany = 1000;
 struct Verb {
   const char* name;
   const char* help;
-  const char* paths;
+  const char* paths;  // what the line of usage has
+  const char* meaning;
   int least;
   int most;
   void (*act)(Context& context, RemoteFiles& files, const FsOptions& options);
   void (*check)(const FsOptions& options) = [](const FsOptions&) {};  // before anything is opened
 };
 
+constexpr const char* kWhichDirectory = "On the handset; default: /";
+
 constexpr Verb kVerbs[] = {
-    {"cat", "Print a file", "path", 1, 1, Cat},
-    {"df", "Print how much room there is", "path", 0, 1, Room},
-    {"get", "Copy from the handset: get :PATH [LOCAL]; - is the standard output", "paths", 1, 2, Get, CheckGet},
-    {"ln", "Make a symbolic link: ln TARGET LINK", "paths", 2, 2, Link},
-    {"ls", "List a directory", "path", 0, 1, List},
-    {"mkdir", "Make directories", "paths", 1, kMany, MakeDirectories},
-    {"mv", "Rename or move: mv OLD NEW", "paths", 2, 2, Move},
-    {"put", "Copy to the handset, and compare: put LOCAL... :PATH; - is the standard input", "paths", 2, kMany, Put,
-     CheckPut},
-    {"rm", "Remove files and links", "paths", 1, kMany, RemoveFiles, CheckRemove},
-    {"rmdir", "Remove empty directories", "paths", 1, kMany, RemoveDirectories},
-    {"stat", "Print what there is to know about a path", "path", 1, 1, Stat},
-    {"sync", "Have everything written to the flash", "path", 0, 1, Sync},
-    {"tree", "List a directory and everything below", "path", 0, 1, Tree},
+    {"cat", "Print a file", ":PATH", "A file of the handset", 1, 1, Cat},
+    {"df", "Print how much room there is", "[:PATH]", "Of which file system; default: /", 0, 1, Room},
+    {"get", "Copy from the handset", ":PATH [LOCAL]",
+     "What is copied, and where to; - is the standard output; default: into this folder", 1, 2, Get, CheckGet},
+    {"ln", "Make a symbolic link", ":TARGET :LINK", "Where the link leads, and where it is", 2, 2, Link},
+    {"ls", "List a directory", "[:PATH]", kWhichDirectory, 0, 1, List},
+    {"mkdir", "Make directories", ":PATH...", "Directories of the handset", 1, kMany, MakeDirectories},
+    {"mv", "Rename or move", ":OLD :NEW", "Its path, and the one that it gets", 2, 2, Move},
+    {"put", "Copy to the handset, and compare", "LOCAL... :PATH",
+     "What is copied, and where to; - is the standard input", 2, kMany, Put, CheckPut},
+    {"rm", "Remove files and links", ":PATH...", "What is removed", 1, kMany, RemoveFiles, CheckRemove},
+    {"rmdir", "Remove empty directories", ":PATH...", "What is removed", 1, kMany, RemoveDirectories},
+    {"stat", "Print what there is to know about a path", ":PATH", "On the handset", 1, 1, Stat},
+    {"sync", "Have everything written to the flash", "[:PATH]", "Of which file system; default: /", 0, 1, Sync},
+    {"tree", "List a directory and everything below", "[:PATH]", kWhichDirectory, 0, 1, Tree},
 };
 
 void Run(Context& context, const FsOptions& options, const Verb& verb) {
@@ -478,10 +482,12 @@ void AddFsVerbs(const Command& root, Context& context) {
       .Between(kSmallestPacket, kLargestPacket, "bytes");
   for (const auto& verb : kVerbs) {
     const auto subcommand = fs.Verb(verb.name, verb.help);
-    auto paths = subcommand.Add(verb.paths, options->paths).Count(verb.least, verb.most);
+    auto paths = subcommand.Add(verb.most > 1 ? "paths" : "path", options->paths, verb.meaning);
+    paths.Count(verb.least, verb.most).Usage(verb.paths);
     if (verb.least > 0) paths.Required();
     paths.File();
     if (verb.act != Cat) subcommand.ForMany();
+    subcommand.Checks([options, &verb] { verb.check(*options); });
     if (verb.act == Get) subcommand.Writes([options] { return std::vector<std::string>{LocalTarget(*options)}; });
     if (verb.act == Put) {
       subcommand.Reads([options] {

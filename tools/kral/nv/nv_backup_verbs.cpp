@@ -302,6 +302,7 @@ void AddNvBackupVerbs(const Command& root, Context& context) {
     return verb;
   };
   const auto backup = add("backup", "Read all items and item files into a PKV file", Backup);
+  backup.Checks([options] { ParseIdRange(options->items); });
   backup.Writes([options] { return std::vector<std::string>{options->file}; });
   backup.Add("--items", options->items, "Range of item ids to read");
   backup.Add("--subscriptions", options->subscriptions, "How many subscriptions the handset has").Between(1, 16);

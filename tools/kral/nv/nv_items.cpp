@@ -91,6 +91,10 @@ NvReading::Kind KindOf(std::uint16_t failure) {
                                                                                            : NvReading::Kind::kRefused;
 }
 
+std::string WordsOf(const NvItem& item) {
+  return item.path.empty() ? Format("NV item {}", *item.id) : item.path;
+}
+
 ExitCode ExitOf(std::uint32_t code) {
   switch (code) {
     case KRAL_NV_ERROR_INDEX_OUT_OF_BOUND:
@@ -278,26 +282,36 @@ NvReading NvItems::ReadBytes(const NvItem& item) {
   return reading;
 }
 
+std::vector<std::uint8_t> NvItems::Set(const NvItem& item, std::uint16_t array_index, const std::string& value) const {
+  const std::string what = WordsOf(item);
+  if (item.defined) {
+    Check(item.path.empty()
+              ? KRAL_NV_SetNVValueStringByNVID(session_.handle(), *item.id, array_index, value.c_str())
+              : KRAL_NV_SetNVValueStringByEfsFilename(session_.handle(), item.path.c_str(), value.c_str()),
+          what);
+    return {};
+  }
+  if (!item.path.empty()) {
+    throw ToolError(ExitCode::kUsage, Format("{} is not defined", item.path),
+                    "give its definition by --defs, or write the file with kral fs put");
+  }
+  auto bytes = ParseHex({value});
+  if (bytes.size() <= KRAL_NV_DATA_SIZE) return bytes;
+  throw ToolError(ExitCode::kUsage, Format("{} bytes are too many for {}", bytes.size(), what),
+                  "an item has 128 bytes at most");
+}
+
 void NvItems::Write(const NvItem& item, std::uint16_t array_index, const std::string& value) {
   session_.Begin();
   std::uint16_t status = 0;
-  const std::string what = item.path.empty() ? Format("NV item {}", *item.id) : item.path;
+  const std::string what = WordsOf(item);
+  const auto bytes = Set(item, array_index, value);
   if (item.defined && item.path.empty()) {
-    Check(KRAL_NV_SetNVValueStringByNVID(session_.handle(), *item.id, array_index, value.c_str()), what);
     const std::uint32_t code = KRAL_NV_WriteNVItemToMobileByNVID(session_.handle(), *item.id, &status);
     if (status == 0) return Check(code, what);
   } else if (item.defined) {
-    Check(KRAL_NV_SetNVValueStringByEfsFilename(session_.handle(), item.path.c_str(), value.c_str()), what);
     return Check(KRAL_NV_WriteNVItemToMobileByEfsFilename(session_.handle(), item.path.c_str()), what);
-  } else if (!item.path.empty()) {
-    throw ToolError(ExitCode::kUsage, Format("{} is not defined", item.path),
-                    "give its definition by --defs, or write the file with kral fs put");
   } else {
-    const auto bytes = ParseHex({value});
-    if (bytes.size() > KRAL_NV_DATA_SIZE) {
-      throw ToolError(ExitCode::kUsage, Format("{} bytes are too many for {}", bytes.size(), what),
-                      "an item has 128 bytes at most");
-    }
     const auto size = static_cast<std::uint16_t>(bytes.size());
     session_.Run(what, [&] {
       return options_.subscription ? KRAL_DIAG_NV_WRITE_EXT_F(session_.handle(), *item.id, bytes.data(),

@@ -65,7 +65,10 @@ class NvItems {
   void KeepUndefined() { keeps_undefined_ = true; }
   // From the handset; ToolError when that goes wrong otherwise than by the handset's word on the item.
   NvReading Read(const NvItem& item);
-  // Writes it: decimal numbers where it is defined, else bytes in hex.
+  // What it is to hold, not sent yet: decimal numbers where it is defined, else bytes in hex, which are given back.
+  // ToolError for what it cannot hold.
+  std::vector<std::uint8_t> Set(const NvItem& item, std::uint16_t array_index, const std::string& value) const;
+  // Sets and writes it.
   void Write(const NvItem& item, std::uint16_t array_index, const std::string& value);
 
   // Throws for any error code but 0 and those allowed.

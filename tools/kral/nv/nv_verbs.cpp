@@ -112,11 +112,42 @@ void WriteItem(Context& context, const Arguments& arguments) {
   context.out.Result({{"port", session.port()}, {"item", ValueJson(item, reading)}}, ValueText(item, reading));
 }
 
+// The library knows what can be written by the definitions alone.
+template <class Ask>
+void AskDefinitions(const Context& context, NvOptions options, Ask&& ask) {
+  options.subscription.reset();
+  Session session(OfNullPort(context.session));
+  const NvItems items(session, options);
+  ask(items);
+}
+
+void CheckRead(const Context& context, const Arguments& arguments) {
+  AskDefinitions(context, arguments.options, [&](const NvItems& items) {
+    for (const auto& which : arguments.items) items.Find(which);
+  });
+}
+
+void CheckWrite(const Context& context, const Arguments& arguments) {
+  AskDefinitions(context, arguments.options, [&](const NvItems& items) {
+    items.Set(items.Find(arguments.item), arguments.array_index, arguments.value);
+  });
+}
+
 std::vector<NvItem> ItemsOfRange(const NvItems& items, const std::string& range) {
   const auto [first, last] = ParseIdRange(range);
   std::vector<NvItem> found;
   for (std::uint32_t id = first; id <= last; ++id) found.push_back(items.Find(static_cast<std::uint16_t>(id)));
   return found;
+}
+
+std::vector<NvItem> ItemsToDump(const NvItems& items, const Arguments& arguments) {
+  auto wanted = arguments.range.empty() ? items.all() : ItemsOfRange(items, arguments.range);
+  if (!wanted.empty()) return wanted;
+  throw ToolError(ExitCode::kUsage, "nothing says which items to read", "give --defs FILE, or --items 0-999");
+}
+
+void CheckDump(const Context& context, const Arguments& arguments) {
+  AskDefinitions(context, arguments.options, [&](const NvItems& items) { ItemsToDump(items, arguments); });
 }
 
 void WriteFiles(const Session& session, const NvItems& items, const Arguments& arguments) {
@@ -131,10 +162,7 @@ void WriteFiles(const Session& session, const NvItems& items, const Arguments& a
 void Dump(Context& context, const Arguments& arguments) {
   Session session(context.session);
   NvItems items(session, arguments.options);
-  const std::vector<NvItem> wanted = arguments.range.empty() ? items.all() : ItemsOfRange(items, arguments.range);
-  if (wanted.empty()) {
-    throw ToolError(ExitCode::kUsage, "nothing says which items to read", "give --defs FILE, or --items 0-999");
-  }
+  const auto wanted = ItemsToDump(items, arguments);
   const bool to_files = !arguments.source_file.empty() || !arguments.pkv_file.empty();
   if (to_files) items.KeepUndefined();
   ReadSoFar read;
@@ -259,6 +287,9 @@ void AddNvVerbs(const Command& root, Context& context) {
     }
     return files;
   });
+  read.Checks([&context, arguments] { CheckRead(context, *arguments); });
+  write.Checks([&context, arguments] { CheckWrite(context, *arguments); });
+  dump.Checks([&context, arguments] { CheckDump(context, *arguments); });
   for (const auto& verb : {read, write, dump}) {
     verb.ForMany();
     AddDefinitionOptions(verb, arguments->options);

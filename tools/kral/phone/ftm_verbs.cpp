@@ -106,13 +106,18 @@ std::size_t MostPayload(std::uint16_t command_code, std::uint8_t form) {
   return command_code == kLegacyCode ? kLegacyRoom - 7 - lengths : kRoom - 6 - lengths;
 }
 
+std::vector<std::uint8_t> ParsePayload(const FtmOptions& options, const CommandArguments& arguments) {
+  if (arguments.payload.empty()) return {};
+  auto payload = ParseHex(arguments.payload);
+  const auto most = MostPayload(options.command_code, arguments.form);
+  if (payload.size() <= most) return payload;
+  throw ToolError(ExitCode::kUsage, Format("a payload of {} bytes is too long: at most {}", payload.size(), most),
+                  "an FTM request is one packet");
+}
+
 void SendCommand(const Context& context, const FtmOptions& options, const CommandArguments& arguments) {
   const std::uint16_t command = ParseCommand(arguments.command);
-  const auto payload = arguments.payload.empty() ? std::vector<std::uint8_t>() : ParseHex(arguments.payload);
-  if (const auto most = MostPayload(options.command_code, arguments.form); payload.size() > most) {
-    throw ToolError(ExitCode::kUsage, Format("a payload of {} bytes is too long: at most {}", payload.size(), most),
-                    "an FTM request is one packet");
-  }
+  const auto payload = ParsePayload(options, arguments);
   Session session(context.session);
   Apply(session, options);
   std::array<std::uint8_t, 4096> response{};
@@ -175,6 +180,10 @@ void AddFtmVerbs(const Command& root, Context& context) {
   AddRfMode(command, options);
   command.Run([&context, options, arguments] { SendCommand(context, *options, *arguments); });
 
+  command.Checks([options, arguments] {
+    ParseCommand(arguments->command);
+    ParsePayload(*options, *arguments);
+  });
   for (const auto& verb : {mode, channel, tx, command}) verb.ForMany();
 
   const auto list = ftm.Verb("list", "Print the table of RF commands");

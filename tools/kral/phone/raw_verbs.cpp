@@ -13,12 +13,15 @@ constexpr std::size_t kMostRequest = 4096;
 constexpr std::size_t kReplyRoom = 4096;
 constexpr std::int32_t kDefaultTimeOutMs = 4000;
 
+std::vector<std::uint8_t> ParseRequest(const std::vector<std::string>& words) {
+  auto request = ParseHex(words);
+  if (!request.empty() && request.size() <= kMostRequest) return request;
+  throw ToolError(ExitCode::kUsage, Format("a request has 1 to {} bytes, not {}", kMostRequest, request.size()),
+                  "give the bytes in hex, command code first: kral raw 7C");
+}
+
 void SendRaw(Context& context, const std::vector<std::string>& words) {
-  const auto request = ParseHex(words);
-  if (request.empty() || request.size() > kMostRequest) {
-    throw ToolError(ExitCode::kUsage, Format("a request has 1 to {} bytes, not {}", kMostRequest, request.size()),
-                    "give the bytes in hex, command code first: kral raw 7C");
-  }
+  const auto request = ParseRequest(words);
   Session session(context.session);
   const auto time_out = static_cast<std::int32_t>(context.session.time_out_ms.value_or(kDefaultTimeOutMs));
   std::array<std::uint8_t, kReplyRoom> reply{};
@@ -49,6 +52,7 @@ void AddRawVerbs(const Command& root, Context& context) {
   const auto raw = root.Verb("raw", "Send one request, given in hex, and print the reply");
   raw.Add("bytes", *words, "The request without framing, such as 4B 0F 00 00").Required();
   raw.ForMany();
+  raw.Checks([words] { ParseRequest(*words); });
   raw.Run([&context, words] { SendRaw(context, *words); });
 }
 

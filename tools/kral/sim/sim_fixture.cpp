@@ -11,6 +11,7 @@
 #include "tools/kral/call_failure.h"
 #include "tools/kral/format.h"
 #include "tools/kral/interrupt.h"
+#include "tools/kral/numbers.h"
 #include "tools/kral/sim/sim_faults.h"
 
 namespace kral::tool {
@@ -57,6 +58,10 @@ void SetUp(handset::VirtualHandset& handset, const SimOptions& options) {
   if (options.efs_blocks != 0) handset.efs().SetTotalBlocks(options.efs_blocks);
   if (options.efs_bad_offset) handset.efs().SetBadOffset(*options.efs_bad_offset);
   for (const auto& [name, shown] : options.efs_shown_names) handset.efs().ShowNameAs(name, shown);
+  for (const auto& text : options.arrays) {
+    const auto array = ParseArray(text);
+    handset.nv().MakeArray(array->first, array->second);
+  }
   auto programmer = handset.programmer().settings();
   if (options.flash_block != 0) programmer.block_size = options.flash_block;
   if (options.flash_window != 0) programmer.window = options.flash_window;
@@ -91,6 +96,15 @@ void Misbehave(handset::FaultPlan& faults, std::uint16_t number, const SimOption
 }
 
 }  // namespace
+
+std::optional<std::pair<std::uint16_t, std::uint8_t>> ParseArray(const std::string& text) {
+  const auto colon = text.find(':');
+  if (colon == std::string::npos) return std::nullopt;
+  const auto item = ParseNumber<std::uint16_t>(std::string_view(text).substr(0, colon));
+  const auto count = ParseNumber<std::uint8_t>(std::string_view(text).substr(colon + 1));
+  if (!item || !count || *count == 0) return std::nullopt;
+  return std::pair{*item, *count};
+}
 
 std::optional<std::uint32_t> ParseRate(const std::string& text) {
   std::uint32_t value = 0;

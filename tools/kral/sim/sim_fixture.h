@@ -31,7 +31,8 @@ struct SimOptions {
   std::uint32_t efs_blocks = 0;     // 0: as many as there are
   std::optional<std::uint32_t> efs_bad_offset;
   std::vector<std::pair<std::string, std::string>> efs_shown_names;
-  std::uint32_t flash_block = 0;  // 0: as the programmer has it
+  std::vector<std::string> arrays;  // "3101:4", see ParseArray
+  std::uint32_t flash_block = 0;    // 0: as the programmer has it
   std::uint16_t flash_window = 0;
   std::vector<std::string> faults;
   std::vector<std::string> faults_at;  // "3:lose,of=08": of one
@@ -46,6 +47,9 @@ struct SimOptions {
 
 // "250000", "250k", "1M": bytes a second; nothing for anything else.
 std::optional<std::uint32_t> ParseRate(const std::string& text);
+
+// "3101:4": a numbered item, and of how many elements it is.
+std::optional<std::pair<std::uint16_t, std::uint8_t>> ParseArray(const std::string& text);
 
 // One handset with its cable, numbered from 1.
 class SimSocket {

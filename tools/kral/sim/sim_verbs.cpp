@@ -73,6 +73,11 @@ void AddOptions(const Command& sim, SimOptions& options) {
   sim.Add("--efs-blocks", options.efs_blocks, "Size of the file system in blocks of 512 bytes");
   sim.Add("--efs-bad-offset", options.efs_bad_offset, "Files that are written keep a wrong byte at this offset");
   sim.Add("--efs-show", options.efs_shown_names, "NAME SHOWN: listings show one name as another; several times");
+  sim.Add("--array", options.arrays, "ITEM:COUNT, as in 3101:4: an NV item that is an array of so many elements")
+      .OneEach()
+      .Check([](const std::string& text) {
+        return ParseArray(text) ? "" : "an array is an item and the number of its elements, 1 to 255, such as 3101:4";
+      });
   constexpr double kMostPerSecond = 1e6;
   sim.Add("--logs", options.traffic.logs, "Log packets per second, of the codes that are on")
       .Between(0, kMostPerSecond, "a second");

@@ -139,12 +139,15 @@ void SwitchAll(Session& session, bool on) {
   }
 }
 
+void CheckSwitch(const LogOptions& options) {
+  const bool nothing = ParseIds(options.codes).empty() && ParseIds(options.categories).empty() && !options.all;
+  if (nothing) throw ToolError(ExitCode::kUsage, "nothing to switch", "give log codes, --category or --all");
+}
+
 void Switch(const Context& context, const LogOptions& options, bool on) {
+  CheckSwitch(options);
   const auto codes = ParseIds(options.codes);
   const auto categories = ParseIds(options.categories);
-  if (codes.empty() && categories.empty() && !options.all) {
-    throw ToolError(ExitCode::kUsage, "nothing to switch", "give log codes, --category or --all");
-  }
   Session session(context.session);
   if (options.all) SwitchAll(session, on);
   SwitchCodes(session, codes, on);
@@ -214,12 +217,17 @@ KRAL_TRAFFIC_COUNTERS FinishCapture(KRAL_HANDLE handle) {
   }
 }
 
+void CheckCapture(const LogOptions& options) {
+  ParseIds(options.codes);
+  ParseRotation(options.rotate);
+  if (options.keep == 0 || !options.rotate.empty()) return;
+  throw ToolError(ExitCode::kUsage, "--keep without --rotate: there is one file", "say when the next file begins");
+}
+
 void Capture(Context& context, LogOptions& options) {
+  CheckCapture(options);
   const auto codes = ParseIds(options.codes);
   const auto rotation = ParseRotation(options.rotate);
-  if (options.keep != 0 && options.rotate.empty()) {
-    throw ToolError(ExitCode::kUsage, "--keep without --rotate: there is one file", "say when the next file begins");
-  }
   RefuseLogFile(context.session.log_file, options.file, "the capture");
   Session session(context.session);
   // First: the old recording stays as it is where a code is refused.
@@ -258,20 +266,27 @@ void NoteCut(const Context& context, const std::string& file) {
   context.out.Note(Format("{} is cut or damaged behind its last whole packet", file));
 }
 
-Stretch StretchOf(KRAL_HANDLE handle, const LogOptions& options) {
+Stretch StretchOf(std::uint64_t begin, const LogOptions& options) {
   Stretch stretch;
-  if (options.from.empty() && options.to.empty()) return stretch;
-  const auto begin = BeginOf(handle, options.file);
-  if (!begin) return stretch;
-  if (!options.from.empty()) stretch.from = ParseTime(options.from, *begin, 0);
-  if (!options.to.empty()) stretch.to = ParseTime(options.to, *begin, std::max(*begin, stretch.from));
+  if (!options.from.empty()) stretch.from = ParseTime(options.from, begin);
+  if (!options.to.empty()) stretch.to = ParseTime(options.to, begin);
+  if (stretch.from > stretch.to) {
+    constexpr std::uint64_t kDay = 86'400'000'000;
+    throw ToolError(ExitCode::kUsage,
+                    Format("--from {} is behind --to {}", TimeText(stretch.from), TimeText(stretch.to)),
+                    Format("a time of another day than the first packet's has its date in front: --to {}",
+                           TimeText(stretch.to + kDay)));
+  }
   return stretch;
 }
 
 void Play(const Context& context, const LogOptions& options) {
   const OfflineHandle handle;
   std::uint64_t packets = 0;
-  const auto stretch = StretchOf(handle.get(), options);
+  const bool is_part = !options.from.empty() || !options.to.empty();
+  const auto begin = is_part ? BeginOf(handle.get(), options.file) : std::nullopt;
+  const std::uint64_t first_time = begin.value_or(0);
+  const auto stretch = begin ? StretchOf(first_time, options) : Stretch();
   const bool whole = PlayFile(
       handle.get(), options.file, options.as_recorded ? Pace::kAsRecorded : Pace::kAtOnce,
       [&](const PlayedPacket& packet) {
@@ -286,6 +301,10 @@ void Play(const Context& context, const LogOptions& options) {
       },
       stretch);
   if (!whole) NoteCut(context, options.file);
+  if (packets == 0 && begin && whole) {
+    context.out.Note(
+        Format("no packet is of that time; the first of {} came at {}", options.file, TimeText(first_time)));
+  }
   context.out.Result({{"file", options.file}, {"packets", packets}, {"cut", !whole}}, "");
 }
 
@@ -367,6 +386,10 @@ void Convert(const Context& context, const LogOptions& options, bool is_export) 
   std::uint64_t packets = 0;
   std::uint64_t skipped = 0;
   std::uint32_t cut = 0;
+  if (options.target == "-") {
+    throw ToolError(ExitCode::kUsage, "the file is written as a whole, and never to the standard output",
+                    "name a file; ./- for one of this name");
+  }
   const char* const from = options.file.c_str();
   const char* const to = options.target.c_str();
   const bool done = is_export ? KRAL_ExportCapture(from, to, &packets, &cut) != 0
@@ -412,6 +435,7 @@ void AddLogVerbs(const Command& root, Context& context) {
     verb.Add("--category", options->categories, "Message categories, as well");
     verb.Flag("--all", options->all, "Every log code that the handset has");
     verb.ForMany();
+    verb.Checks([options] { CheckSwitch(*options); });
     run(verb, [on](const Context& c, LogOptions& o) { Switch(c, o, on); });
   }
 
@@ -424,6 +448,7 @@ void AddLogVerbs(const Command& root, Context& context) {
   capture.Flag("--compress", options->compress, "With zlib; everything reads it that reads captures");
   options->limit.AddTo(capture, "packets");
   capture.ForMany();
+  capture.Checks([options] { CheckCapture(*options); });
   capture.Writes([options] { return std::vector<std::string>{options->file}; });
   run(capture, Capture);
 
@@ -431,9 +456,11 @@ void AddLogVerbs(const Command& root, Context& context) {
   play.NeedsNoHandset();
   play.Add("file", options->file, "The capture file").Required();
   play.Flag("--as-recorded", options->as_recorded, "With the time between packets as it was");
+  const auto fault = [](const std::string& text) { return text.empty() ? "it is not a time" : ""; };
   play.Add("--from", options->from,
-           "Only what came then or later: 14:02:10 of the first day, or 2026-03-01T14:02:10; UTC");
-  play.Add("--to", options->to, "Only what came then or earlier");
+           "Only what came then or later: 14:02:10 of the first packet's day, or 2026-03-01T14:02:10; UTC")
+      .Check(fault);
+  play.Add("--to", options->to, "Only what came then or earlier").Check(fault);
   run(play, Play);
 
   for (const bool is_export : {true, false}) {

@@ -72,7 +72,7 @@ std::optional<std::uint64_t> TakeTime(std::string_view& text) {
 
 }  // namespace
 
-std::uint64_t ParseTime(const std::string& text, std::uint64_t begin, std::uint64_t not_before) {
+std::uint64_t ParseTime(const std::string& text, std::uint64_t begin) {
   std::string_view rest = text;
   const auto date = TakeDate(rest);
   const auto time = TakeTime(rest);
@@ -81,9 +81,7 @@ std::uint64_t ParseTime(const std::string& text, std::uint64_t begin, std::uint6
     throw ToolError(ExitCode::kUsage, Format("{} is not a time", text),
                     "give it in UTC as kral log play prints it: 14:02:10, 14:02:10.250 or 2026-03-01T14:02:10");
   }
-  if (date) return *date + *time;
-  const std::uint64_t on_that_day = begin - begin % kDay + *time;
-  return on_that_day < not_before ? on_that_day + kDay : on_that_day;
+  return (date ? *date : begin - begin % kDay) + *time;
 }
 
 }  // namespace kral::tool

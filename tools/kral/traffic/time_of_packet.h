@@ -8,8 +8,8 @@
 namespace kral::tool {
 
 // Microseconds since 1970 UTC of "2026-03-01T09:30:00.25" or "09:30", in UTC. One without a date is on the day of
-// `begin`, or on the next one if it were in front of `not_before`. ToolError kUsage for anything else.
-std::uint64_t ParseTime(const std::string& text, std::uint64_t begin, std::uint64_t not_before);
+// `begin`. ToolError kUsage for anything else.
+std::uint64_t ParseTime(const std::string& text, std::uint64_t begin);
 
 }  // namespace kral::tool
 
