@@ -280,25 +280,67 @@ end
 
 local MOST_XML, MOST_ELEMENTS, DEEPEST = 16 * 1024 * 1024, 200000, 32
 
+-- As UTF-8.
+local function character(code)
+  if code < 0x80 then return string.char(code) end
+  local tail = ""
+  local room = 0x40
+  while code >= room do
+    tail = string.char(0x80 + code % 0x40) .. tail
+    code, room = math.floor(code / 0x40), room == 0x40 and 0x20 or room / 2
+  end
+  return string.char(0x100 - 2 * room + code) .. tail
+end
+
+-- The encodings that the library's parsers know everywhere: UTF-8, UTF-16 and Latin-1.
+local function as_utf8(text)
+  local first, second = text:byte(1, 2)
+  if first == 0xEF then return text:sub(4) end
+  local big = first == 0xFE or first == 0
+  if big or first == 0xFF or second == 0 then
+    local lead
+    return (text:sub((first == 0xFE or first == 0xFF) and 3 or 1):gsub("(.)(.?)", function(one, other)
+      if other == "" then error("half a character", 0) end
+      local code = big and one:byte() * 256 + other:byte() or other:byte() * 256 + one:byte()
+      if code >= 0xD800 and code < 0xDC00 then
+        lead = code
+        return ""
+      end
+      if lead and code >= 0xDC00 and code < 0xE000 then code = 0x10000 + (lead - 0xD800) * 0x400 + code - 0xDC00 end
+      lead = nil
+      return character(code)
+    end))
+  end
+  local encoding = text:match("^<%?xml[^>]-encoding%s*=%s*[\"']([%w_.-]+)")
+  if encoding and encoding:lower() == "iso-8859-1" then
+    return (text:gsub("[\128-\255]", function(byte) return character(byte:byte()) end))
+  end
+  return text
+end
+
 local entities = { lt = "<", gt = ">", amp = "&", quot = '"', apos = "'" }
 local function unescaped(text)
   return (text:gsub("&(#?%w+);", function(name)
     if entities[name] then return entities[name] end
     local code = name:match("^#(%d+)$") and tonumber(name:sub(2)) or name:match("^#x%x+$") and tonumber(name:sub(3), 16)
-    if not code or code > 127 then error("the character &" .. name .. "; is not taken", 0) end
-    return string.char(code)
+    if not code or code == 0 or code > 0x10FFFF then error("there is no character &" .. name .. ";", 0) end
+    return character(code)
   end))
 end
 
 -- Elements with `name`, `attributes` and their children; raises the fault as a text.
 local function parse_xml(text)
   local root = { name = "", attributes = {} }
-  local stack, at, elements = { root }, text:sub(1, 3) == "\239\187\191" and 4 or 1, 0
+  local stack, at, elements = { root }, 1, 0
   while true do
     local open = text:find("<", at, true)
-    if text:find("%S", at) ~= open then error("text between elements", 0) end
+    if text:find("%S", at) ~= open and unescaped(text:sub(at, (open or 0) - 1)):find("%S") then
+      error("text between elements", 0)
+    end
     if not open then break end
-    local skipped = text:sub(open, open + 3) == "<!--" and "-->" or text:sub(open, open + 1) == "<?" and "?>"
+    local blanks_end = text:match("^<!%[CDATA%[%s*%]%]()>", open)
+    local skipped = text:sub(open, open + 3) == "<!--" and "-->" or text:sub(open, open + 1) == "<?" and "?>" or
+      blanks_end and "]]>"
     if skipped then
       local _, last = text:find(skipped, open, true)
       if not last then error("a comment without end", 0) end
@@ -374,7 +416,7 @@ local function read_definitions(path)
   local text = stream:read(MOST_XML + 1) or ""
   stream:close()
   if #text > MOST_XML then error("longer than a definition file", 0) end
-  local root = parse_xml(text)
+  local root = parse_xml(as_utf8(text))
   if root.name ~= "CommandDefinition" then error("no definition file", 0) end
   local file = { words = {}, records = {} }
   for _, element in ipairs(root) do
@@ -419,6 +461,7 @@ local function compiled(element, file, big)
   local kind, bits = (a.type or ""):match("^([usf])(%d+)$")
   bits = tonumber(bits)
   local field = { name = a.name or "?", count = a.count, size = a.size, unit = a.unit, words = file.words[a.enum or ""],
+    most_elements = tonumber(a.max_count), most_bytes = tonumber(a.max_size),
     big = a.order == "big" or (a.order == nil and big) }
   if element.name == "Bit" then
     local first, last = (a.bits or ""):match("^(%d+)-?(%d*)$")
@@ -435,6 +478,7 @@ local function compiled(element, file, big)
   local number = function(word)
     return field.words and field.words.number[word] or tonumber(word)
   end
+  field.most = number(a.max or "")
   if a.success then
     field.success = {}
     for word in a.success:gmatch("[^,]+") do field.success[number(word) or word] = true end
@@ -470,12 +514,20 @@ function Fields:applies(when, scope)
   return among ~= when.is_not
 end
 
-function Fields:amount(text, scope)
-  return tonumber(text) or tonumber(value_of(scope, text) or "")
-end
-
 function Fields:stop(fault)
   error({ fault = fault }, 0)
+end
+
+-- A number, or what a field counts, which is `most` at most.
+function Fields:amount(text, scope, most)
+  local number = tonumber(text)
+  if number then return number end
+  local value, counter = value_of(scope, text)
+  number = tonumber(value or "")
+  if number and (number < 0 or number > (most or counter.most or 65535)) then
+    self:stop(text .. "=" .. string.format("%.0f", number) .. " is no count that it may have")
+  end
+  return number
 end
 
 function Fields:take(count)
@@ -492,6 +544,16 @@ function Fields:show(field, path, value, range)
   local tree = self.reader.tree
   local item = range and tree:add(f.defined_field, range, text) or tree:add(f.defined_field, text)
   if field.unit then item:append_text(" " .. field.unit) end
+end
+
+-- Whether a stream, which ends with a checksum, is a whole one of these bytes.
+local function is_whole_stream(range, plain)
+  local low, high = 1, 0
+  for at = 1, #plain do
+    low = (low + plain:byte(at)) % 65521
+    high = (high + low) % 65521
+  end
+  return range:len() > 6 and range(range:len() - 4, 4):uint() == high * 65536 + low
 end
 
 -- Of a number the value to show, and as a number to look at.
@@ -549,19 +611,24 @@ function Fields:block(field, path, scope, depth)
   if field.size == "terminated" then
     local size = 0
     while reader:has(size + 1) and reader.tvb(reader.at + size, 1):uint() ~= 0 do size = size + 1 end
+    if size > (field.most_bytes or size) then self:stop(field.name .. " has too many bytes") end
     local range = self:take(size)
     self:show(field, path, range and range:string() or "", range)
     self:take(1)
     return
   end
-  local range = self:take(field.size == "*" and reader.size - reader.at or self:amount(field.size or "", scope))
+  local rest = field.size == "*" and reader.size - reader.at
+  if rest and rest > (field.most_bytes or rest) then self:stop(field.name .. " has too many bytes") end
+  local range = self:take(rest or self:amount(field.size or "", scope, field.most_bytes))
   if field.kind == "zlib" then
     local done, plain = pcall(function() return range:uncompress("Unpacked " .. field.name) end)
     if not range or not done or not plain then self:stop("no zlib stream") end
     local tvb = plain:tvb()
     self.reader = Reader.new(tvb, tvb:len(), reader.tree)
     self:group(field.inside, path .. ".", { values = {}, fields = {}, outer = scope }, depth + 1)
+    if self.reader.at < self.reader.size then self:stop(field.name .. " holds more than defined") end
     self.reader = reader
+    if not is_whole_stream(range, plain:raw()) then self:stop(field.name .. " is no whole zlib stream") end
   elseif field.kind == "text" then
     self:show(field, path, range and range:string():match("^[^%z]*") or "", range)
   else
@@ -595,10 +662,11 @@ function Fields:group(elements, prefix, scope, depth)
       if not field.count then
         self:one(field, prefix .. field.name, scope, depth)
       else
-        local count = field.count == "*" and math.huge or self:amount(field.count, scope)
+        local count = field.count == "*" and math.huge or self:amount(field.count, scope, field.most_elements)
         if not count then self:stop("nothing counts " .. field.name) end
         local i = 0
         while i < count and not (field.count == "*" and self.reader.at >= self.reader.size) do
+          if i >= (field.most_elements or math.huge) then self:stop(field.name .. " has too many elements") end
           local before = self.reader.at
           self:one(field, prefix .. field.name .. "[" .. i .. "]", scope, depth)
           if self.reader.at == before then self:stop("elements without bytes") end
@@ -623,7 +691,8 @@ local function show_defined(reader, command, is_reply)
   end
   if not done and (type(why) ~= "table" or why.fault) then
     reader.tree:add_proto_expert_info(not_as_defined, type(why) == "table" and why.fault or tostring(why))
-  elseif done and not is_reply and reader.at < reader.size then
+  elseif done and reader.at < reader.size and (not is_reply or message and message.attributes.longer ~= "1" and
+    reader.tvb(0, 1):uint() ~= 59) then -- answers of code 59 may be padded
     reader.tree:add_proto_expert_info(not_as_defined, "longer than defined")
   end
   reader.tree = tree
