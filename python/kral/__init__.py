@@ -18,9 +18,9 @@ that takes long with the request under way. `kral.api()` has the whole C interfa
 from kral import bands
 from kral._api import VERSION as __version__, FtmModeId, RfMode, TimeOut
 from kral._library import LibraryNotFound, library_path, library_version, load as api
-from kral.errors import (Aborted, BadArgument, BadFile, ErrorRecord, InternalError, KralError, LinkError, Lost,
-                         Mismatch, NoAnswer, NoPort, PortBusy, Refused, SafetyStop, error_text)
-from kral.files import Entry, FileError, Files, Status
+from kral.errors import (Aborted, BadArgument, BadFile, ErrorRecord, FileError, InternalError, KralError, LinkError,
+                         Lost, Mismatch, NoAnswer, NoPort, PortBusy, Refused, SafetyStop, error_text)
+from kral.files import Entry, Files, Status
 from kral.flashing import ImageInfo, flash, image_info
 from kral.ftm import Ftm
 from kral.jobs import Job, JobProgress, Verdict

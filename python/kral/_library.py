@@ -26,12 +26,14 @@ def _names() -> List[str]:
 
 
 def _candidates() -> List[str]:
-    """KRAL_LIBRARY alone if it is set; else beside this package, then as the system finds it."""
+    """KRAL_LIBRARY alone if it is set; else beside this package or in its archive, else as the system finds it."""
     told = os.environ.get("KRAL_LIBRARY")
     if told:
         return [told]
     here = pathlib.Path(__file__).resolve().parent
-    beside = [str(here / name) for name in _names() if (here / name).exists()]
+    # Archives that are unpacked anywhere have python/kral and bin, or lib/python3/dist-packages/kral and lib.
+    folders = [here, here.parents[1] / "bin", here.parents[2]]
+    beside = [str(folder / name) for folder in folders for name in _names() if (folder / name).exists()]
     found = ctypes.util.find_library("kral")
     return beside + _names() + ([found] if found else [])
 

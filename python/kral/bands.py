@@ -6,7 +6,7 @@ import dataclasses
 from typing import List, Optional, Tuple
 
 from kral import _api
-from kral._library import load
+from kral._connection import call
 
 
 @dataclasses.dataclass(frozen=True)
@@ -21,18 +21,18 @@ class Band:
 
 def uplink(band: int, channel: int) -> Optional[float]:
     """The uplink carrier in MHz; None when the band has no such uplink channel."""
-    return load().KRAL_Band_Helper_CalculateULFrequency(band, channel) or None
+    return call("KRAL_Band_Helper_CalculateULFrequency", band, channel) or None
 
 
 def downlink(band: int, channel: int) -> Optional[float]:
     """The downlink carrier in MHz; None when the band has no such downlink channel."""
-    return load().KRAL_Band_Helper_CalculateDLFrequency(band, channel) or None
+    return call("KRAL_Band_Helper_CalculateDLFrequency", band, channel) or None
 
 
 def _ranges(band: int, direction: int) -> Tuple[Tuple[int, int], ...]:
     found: List[Tuple[int, int]] = []
     first, last = ctypes.c_int32(), ctypes.c_int32()
-    while load().KRAL_Band_Helper_GetBandRange(band, direction, len(found), ctypes.byref(first), ctypes.byref(last)):
+    while call("KRAL_Band_Helper_GetBandRange", band, direction, len(found), ctypes.byref(first), ctypes.byref(last)):
         found.append((first.value, last.value))
     return tuple(found)
 
@@ -40,17 +40,16 @@ def _ranges(band: int, direction: int) -> Tuple[Tuple[int, int], ...]:
 def get(band: int) -> Band:
     """One band by its id. KeyError when it has no channels."""
     text = ctypes.create_string_buffer(64)
-    if not load().KRAL_Band_Helper_GetBandName(band, text, len(text)):
+    if not call("KRAL_Band_Helper_GetBandName", band, text, len(text)):
         raise KeyError(band)
     return Band(band, text.value.decode(), _ranges(band, _api.KRAL_BAND_UPLINK), _ranges(band, _api.KRAL_BAND_DOWNLINK))
 
 
 def all() -> List[Band]:  # pylint: disable=redefined-builtin
     """Every band that has channels, by rising id."""
-    api = load()
     found = []
-    for index in range(api.KRAL_Band_Helper_GetBandCount()):
+    for index in range(call("KRAL_Band_Helper_GetBandCount")):
         number = ctypes.c_uint16()
-        api.KRAL_Band_Helper_GetBand(index, ctypes.byref(number))
+        call("KRAL_Band_Helper_GetBand", index, ctypes.byref(number))
         found.append(get(number.value))
     return found

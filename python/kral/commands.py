@@ -3,38 +3,57 @@ from __future__ import annotations
 
 import ctypes
 import json
-import os
-import threading
-from typing import Any, Dict, Iterator, List, Mapping, Tuple, Union
+from typing import Any, Dict, Iterator, List, Mapping, Tuple
 
-from kral._connection import Connection
+from kral._connection import Connection, LocalPath, local, octets
 
 _NAME_SIZE = 160
 
 
 class Reply(Mapping[str, Any]):
-    """The fields of a reply, as attributes and as a mapping. Groups are replies, arrays lists, blocks bytes."""
+    """The fields of a reply, as attributes and as a mapping. Groups are replies, arrays lists, blocks bytes.
+
+    A field takes the place of a method of its name: with a field `keys`, `reply.keys` is its value. Fields whose names
+    begin and end with two underscores are in the mapping only.
+    """
 
     def __init__(self, fields: Dict[str, Any]) -> None:
-        self._fields = fields
+        self.__dict__["_fields"] = fields
+
+    def __getattribute__(self, name: str) -> Any:
+        if not (name.startswith("__") and name.endswith("__")):
+            fields = _fields_of(self)
+            if name in fields:
+                return fields[name]
+        return super().__getattribute__(name)
 
     def __getattr__(self, name: str) -> Any:
-        try:
-            return self.__dict__["_fields"][name]
-        except KeyError:
-            raise AttributeError(f"the reply has no field {name}") from None
+        raise AttributeError(f"the reply has no field {name}")
 
     def __getitem__(self, name: str) -> Any:
-        return self._fields[name]
+        return _fields_of(self)[name]
 
     def __iter__(self) -> Iterator[str]:
-        return iter(self._fields)
+        return iter(_fields_of(self))
 
     def __len__(self) -> int:
-        return len(self._fields)
+        return len(_fields_of(self))
+
+    def __eq__(self, other: object) -> bool:
+        if not isinstance(other, Mapping):
+            return NotImplemented
+        return _fields_of(self) == {name: other[name] for name in other}
+
+    __hash__ = None  # type: ignore[assignment]
 
     def __repr__(self) -> str:
-        return f"Reply({', '.join(f'{name}={value!r}' for name, value in self._fields.items())})"
+        return f"Reply({', '.join(f'{name}={value!r}' for name, value in _fields_of(self).items())})"
+
+
+def _fields_of(reply: Reply) -> Dict[str, Any]:
+    """Not by attribute, which may be a field's."""
+    fields: Dict[str, Any] = object.__getattribute__(reply, "__dict__").get("_fields", {})
+    return fields
 
 
 def _reply(value: Any, fields: Dict[str, Dict[str, Any]]) -> Any:
@@ -55,13 +74,13 @@ def _reply(value: Any, fields: Dict[str, Dict[str, Any]]) -> Any:
 def _assignments(path: str, value: Any) -> Iterator[Tuple[str, str]]:
     """A value as the library takes it: groups and arrays field by field."""
     if isinstance(value, Mapping):
-        for name, inner in value.items():
-            yield from _assignments(f"{path}.{name}", inner)
+        for name in value:  # a reply may have a field `items`
+            yield from _assignments(f"{path}.{name}", value[name])
     elif isinstance(value, (list, tuple)):
         for index, inner in enumerate(value):
             yield from _assignments(f"{path}[{index}]", inner)
-    elif isinstance(value, (bytes, bytearray)):
-        yield path, bytes(value).hex()
+    elif isinstance(value, (bytes, bytearray, memoryview, ctypes.Array)):
+        yield path, octets(value).hex()
     elif isinstance(value, bool):
         yield path, str(int(value))
     else:
@@ -84,9 +103,8 @@ def _field_line(field: Dict[str, Any], indent: str = "    ") -> Iterator[str]:
 class Command:
     """One command of a family; its fields are the keywords of a call."""
 
-    def __init__(self, connection: Connection, lock: threading.Lock, name: str) -> None:
+    def __init__(self, connection: Connection, name: str) -> None:
         self._connection = connection
-        self._lock = lock
         length = connection.number("KRAL_CMD_DescribeLength", ctypes.c_uint32, name.encode())
         text = ctypes.create_string_buffer(length)
         connection.check("KRAL_CMD_Describe", name.encode(), text, length)
@@ -103,10 +121,10 @@ class Command:
                 lines.extend(_field_line(field))
         return "\n".join(lines)
 
-    def __call__(self, **fields: Any) -> Reply:
+    def __call__(self, /, **fields: Any) -> Reply:
         parts = [pair for name, value in fields.items() for pair in _assignments(name, value)]
         text = " ".join(f"{path}={_quoted(value)}" for path, value in parts)
-        with self._lock:  # the library keeps one reply for a handset, until the next call
+        with self._connection.shared.replies:
             self._connection.check("KRAL_CMD_Call", self.name.encode(), text.encode(), None, 0)
             length = self._connection.number("KRAL_CMD_GetReplyLength", ctypes.c_uint32)
             reply = ctypes.create_string_buffer(length)
@@ -126,9 +144,10 @@ class Family:
         self._name = name
 
     def __getattr__(self, name: str) -> Command:
-        if name.startswith("__") or f"{self._name}.{name}" not in self._commands.names():
-            raise AttributeError(f"the family {self._name} has no command {name}")
-        return self._commands[f"{self._name}.{name}"]
+        with self._commands._definitions:
+            if name.startswith("__") or f"{self._name}.{name}" not in self._commands.names():
+                raise AttributeError(f"the family {self._name} has no command {name}")
+            return self._commands[f"{self._name}.{name}"]
 
     def __dir__(self) -> List[str]:
         prefix = self._name + "."
@@ -140,31 +159,36 @@ class Commands:
 
     def __init__(self, connection: Connection) -> None:
         self._connection = connection
-        self._lock = threading.Lock()
+        self._definitions = connection.shared.definitions
         self._known: Dict[str, Command] = {}
 
-    def load(self, file: Union[str, "os.PathLike[str]"]) -> int:
+    def load(self, file: LocalPath) -> int:
         """Loads a definition file, and gives how many commands it has."""
-        return self._connection.number("KRAL_CMD_LoadDefinitions", ctypes.c_uint32, os.fsencode(os.fspath(file)))
+        with self._definitions:
+            return self._connection.number("KRAL_CMD_LoadDefinitions", ctypes.c_uint32, local(file))
 
     def clear(self) -> None:
         """Forgets all definitions."""
-        self._connection.check("KRAL_CMD_ClearDefinitions")
-        self._known.clear()
+        # A reply that somebody is about to read goes with them.
+        with self._definitions, self._connection.shared.replies:
+            self._connection.check("KRAL_CMD_ClearDefinitions")
+            self._known.clear()
 
     def names(self) -> List[str]:
         """All commands, as FAMILY.NAME."""
         text = ctypes.create_string_buffer(_NAME_SIZE)
         names = []
-        for index in range(self._connection.number("KRAL_CMD_GetCount", ctypes.c_uint32)):
-            self._connection.check("KRAL_CMD_GetName", index, text, _NAME_SIZE)
-            names.append(text.value.decode())
+        with self._definitions:
+            for index in range(self._connection.number("KRAL_CMD_GetCount", ctypes.c_uint32)):
+                self._connection.check("KRAL_CMD_GetName", index, text, _NAME_SIZE)
+                names.append(text.value.decode())
         return names
 
     def __getitem__(self, name: str) -> Command:
-        if name not in self._known:
-            self._known[name] = Command(self._connection, self._lock, name)
-        return self._known[name]
+        with self._definitions:
+            if name not in self._known:
+                self._known[name] = Command(self._connection, name)
+            return self._known[name]
 
     def __getattr__(self, name: str) -> Family:
         if name.startswith("_") or not any(known.startswith(name + ".") for known in self.names()):

@@ -85,6 +85,10 @@ class Refused(KralError):
     code = _api.KRAL_ERROR_REFUSED
 
 
+class FileError(Refused):
+    """The handset's file system said no; `status` is its error number (KRAL_EFS_ERROR_...)."""
+
+
 class Mismatch(KralError):
     """A comparison found a difference."""
 
@@ -118,6 +122,14 @@ class Aborted(KralError):
 BY_CODE: Dict[int, Type[KralError]] = {kind.code: kind for kind in KralError.__subclasses__()}
 
 
+def exception(record: ErrorRecord, text: str = "") -> KralError:
+    """The exception of a record."""
+    kind = BY_CODE.get(record.code, KralError)
+    if kind is Refused and record.status_kind == _api.KRAL_ERROR_STATUS_EFS:
+        kind = FileError
+    return kind(text or record.text, record)
+
+
 def last_error(handle: int = 0) -> Optional[ErrorRecord]:
     """The record of this thread's last failure on a handle; of a connect or a call without one for handle 0."""
     record = _api.KRAL_ERROR()
@@ -143,7 +155,7 @@ def fail(handle: int, function: str) -> NoReturn:
     if record is None or record.function != function:
         # Another failure's: it would tell a wrong reason.
         raise KralError(f"{function} failed", None)
-    raise BY_CODE.get(record.code, KralError)(record.text, record)
+    raise exception(record)
 
 
 def error_text(code: int) -> str:

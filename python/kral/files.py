@@ -8,24 +8,22 @@ import stat as _stat
 from typing import Any, Callable, Iterator, List, Optional, Tuple, Union
 
 from kral import _api
-from kral._connection import Connection, null
+from kral._connection import Connection, Data, LocalPath, local, octets
 from kral._work import Work
-from kral.errors import ErrorRecord, Refused, fail, last_error
+from kral.errors import ErrorRecord, FileError, fail, last_error
 
-LocalPath = Union[str, "os.PathLike[str]"]
+RemotePath = Union[str, "os.PathLike[str]"]  # a pathlib.PurePosixPath, say
 Progress = Callable[[int, int], Any]
+
+_NOT_A_DIRECTORY = 20  # a part of the path is a file
 
 _KINDS = {_api.KRAL_EFS_ENTRY_DIRECTORY: "directory", _api.KRAL_EFS_ENTRY_FILE: "file",
           _api.KRAL_EFS_ENTRY_LINK: "link"}
 
 
-def _bytes(path: str) -> bytes:
+def _bytes(path: RemotePath) -> bytes:
     """What goes over the wire: names that are no text come from listings with their bytes escaped."""
-    return path.encode("utf-8", "surrogateescape")
-
-
-class FileError(Refused):
-    """The handset's file system said no; `status` is its error number (KRAL_EFS_ERROR_...)."""
+    return os.fspath(path).encode("utf-8", "surrogateescape")
 
 
 @dataclasses.dataclass(frozen=True)
@@ -67,17 +65,17 @@ class Status:
 
 
 class Files:
-    """Files of a handset: `phone.files`. Paths of the handset are texts, files of the PC texts or pathlib paths."""
+    """Files of a handset: `phone.files`. Paths, of the handset and of the PC, are texts or of pathlib."""
 
     def __init__(self, connection: Connection) -> None:
         self._connection = connection
 
     # --- Whole files
 
-    def get(self, path: str, to: Optional[LocalPath] = None, progress: Optional[Progress] = None) -> bytes:
+    def get(self, path: RemotePath, to: Optional[LocalPath] = None, progress: Optional[Progress] = None) -> bytes:
         """Reads a file: gives its bytes, or copies it into a file of the PC and gives b""."""
         if to is not None:
-            self._transfer("KRAL_EfsRead", progress, os.fsencode(to), _bytes(path))
+            self._transfer("KRAL_EfsRead", progress, local(to), _bytes(path))
             return b""
         size = max(self.stat(path).size, _api.KRAL_EFS_ITEM_SIZE) + 4096
         buffer = ctypes.create_string_buffer(size)
@@ -85,36 +83,30 @@ class Files:
         self._transfer("KRAL_EfsReadMem", progress, _bytes(path), buffer, ctypes.byref(count))
         return buffer.raw[:count.value]
 
-    def put(self, source: Union[bytes, bytearray, LocalPath], path: str, progress: Optional[Progress] = None) -> None:
+    def put(self, source: Union[Data, LocalPath], path: RemotePath, progress: Optional[Progress] = None) -> None:
         """Writes bytes, or a file of the PC, to a file of the handset, replacing what is there."""
-        if isinstance(source, (bytes, bytearray)):
-            data = bytes(source)
-            self._transfer("KRAL_EfsWriteMem", progress, data, len(data), _bytes(path))
+        if isinstance(source, (str, os.PathLike)):
+            self._transfer("KRAL_EfsWrite", progress, local(source), _bytes(path))
         else:
-            self._transfer("KRAL_EfsWrite", progress, os.fsencode(source), _bytes(path))
+            data = octets(source)
+            self._transfer("KRAL_EfsWriteMem", progress, data, len(data), _bytes(path))
 
-    def put_item(self, data: bytes, path: str) -> None:
+    def put_item(self, data: Data, path: RemotePath) -> None:
         """Writes an item file: at most 1,024 bytes, in one request."""
-        self._connection.check("KRAL_EfsPutItemFromMem", _bytes(path), data, len(data))
+        content = octets(data)
+        self._connection.check("KRAL_EfsPutItemFromMem", _bytes(path), content, len(content))
 
     def _transfer(self, name: str, progress: Optional[Progress], *arguments: Any) -> None:
-        connection = self._connection
+        def moved(work: "Work[None]", _source: int, _target: int, _operation: int, _zero: int, done: int, total: int,
+                  _handle: int) -> None:
+            work.report(done, total)
 
-        def prepare(work: "Work[None]") -> None:
-            def moved(_source: int, _target: int, _operation: int, _zero: int, done: int, total: int, _h: int) -> None:
-                work.report(done, total)
-
-            connection.targets.set("transfer", moved if progress is not None else None)
-            if progress is not None:
-                connection.check("KRAL_ConfigureEfs2CallBacks",
-                                 connection.targets.make("transfer", _api.KRAL_EFS_TRANSFER_CALLBACK),
-                                 null(_api.KRAL_EFS_DIRECTORY_CALLBACK))
-
-        connection.long(lambda: connection.check(name, *arguments), prepare, progress)
+        self._connection.long(lambda: self._connection.check(name, *arguments), progress, "transfer",
+                              None if progress is None else moved)
 
     # --- Directories
 
-    def listdir(self, path: str = "/") -> List[Entry]:
+    def listdir(self, path: RemotePath = "/") -> List[Entry]:
         """The entries of a directory, in the handset's order."""
         connection = self._connection
         room = 64
@@ -132,63 +124,70 @@ class Files:
         return Entry(raw.name.decode("utf-8", "surrogateescape"), _KINDS.get(raw.type, "file"), raw.mode, raw.size,
                      raw.access_time, raw.modify_time, raw.change_time)
 
-    def walk(self, path: str = "/") -> Iterator[Tuple[str, List[Entry], List[Entry]]]:
+    def walk(self, path: RemotePath = "/") -> Iterator[Tuple[str, List[Entry], List[Entry]]]:
         """Like os.walk: a directory, its directories and its other entries, top down. Links are not followed."""
+        path = os.fspath(path)
         entries = self.listdir(path)
         folders = [entry for entry in entries if entry.kind == "directory"]
         yield path, folders, [entry for entry in entries if entry.kind != "directory"]
         for folder in folders:
             yield from self.walk(folder.path)
 
-    def mkdir(self, path: str, parents: bool = False) -> None:
+    def mkdir(self, path: RemotePath, parents: bool = False) -> None:
         """Makes a directory; one that is there already is none the worse for it."""
+        path = os.fspath(path)
         parts = path.strip("/").split("/")
         first = 1 if parents else len(parts)
         for count in range(first, len(parts) + 1):
-            self._numbered("KRAL_EfsMkDir", ("/" if path.startswith("/") else "") + "/".join(parts[:count]),
-                           allowed=(0, _api.KRAL_EFS_ERROR_EXISTS))
+            folder = ("/" if path.startswith("/") else "") + "/".join(parts[:count])
+            try:
+                self._numbered("KRAL_EfsMkDir", folder)
+            except FileError as error:
+                if error.status != _api.KRAL_EFS_ERROR_EXISTS or not self.stat(folder).is_directory:
+                    raise
 
-    def rmdir(self, path: str) -> None:
+    def rmdir(self, path: RemotePath) -> None:
         """Removes an empty directory."""
         self._numbered("KRAL_EfsRmDir", path)
 
     # --- Names and status
 
-    def remove(self, path: str) -> None:
+    def remove(self, path: RemotePath) -> None:
         """Removes a file, an item file or a link."""
         self._numbered("KRAL_EfsDelete", path)
 
-    def rename(self, old: str, new: str) -> None:
+    def rename(self, old: RemotePath, new: RemotePath) -> None:
         """Renames or moves."""
         self._numbered("KRAL_EFS2_DIAG_RENAME", old, _bytes(new))
 
-    def link(self, target: str, path: str) -> None:
+    def link(self, target: RemotePath, path: RemotePath) -> None:
         """Makes a symbolic link at `path` that leads to `target`."""
         self._numbered("KRAL_EfsCreateLink", target, _bytes(path))
 
-    def exists(self, path: str) -> bool:
+    def exists(self, path: RemotePath) -> bool:
+        """Whether a path leads to something, links followed."""
         try:
             self.stat(path)
         except FileError as error:
-            if error.status == _api.KRAL_EFS_ERROR_NO_SUCH_FILE:
+            if error.status in (_api.KRAL_EFS_ERROR_NO_SUCH_FILE, _NOT_A_DIRECTORY):
                 return False
             raise
         return True
 
-    def stat(self, path: str) -> Status:
+    def stat(self, path: RemotePath) -> Status:
         """The status of what a path names, links followed."""
         values = [ctypes.c_uint32() for _ in range(6)]
         self._numbered("KRAL_EFS2_DIAG_STAT", path, after=[ctypes.byref(value) for value in values])
         return Status(*(value.value for value in values))
 
-    def _numbered(self, name: str, path: str, *more: Any, after: Any = (), allowed: Tuple[int, ...] = (0,)) -> None:
+    def _numbered(self, name: str, path: RemotePath, *more: Any, after: Any = ()) -> None:
         """A call that returns 1 whenever the handset answered, and its answer as an error number."""
         number = ctypes.c_uint32()
         handle = self._connection.handle
         answered = self._connection.call(name, _bytes(path), *more, ctypes.byref(number), *after)
         if not answered and not number.value:
             fail(handle, name)
-        if number.value in allowed:
+        if not number.value:
             return
         record = last_error(handle) if not answered else None
         text = f"{path}: the handset answered with error {number.value}"

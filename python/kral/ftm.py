@@ -6,7 +6,7 @@ import ctypes
 from typing import Iterator
 
 from kral import _api
-from kral._connection import Connection
+from kral._connection import Connection, Data, octets
 from kral.errors import BadArgument
 
 
@@ -66,7 +66,7 @@ class Ftm:
         """Switches the transmitter off."""
         self._connection.check("KRAL_FTM_SET_TX_OFF")
 
-    def send(self, name: str, payload: bytes = b"") -> bytes:
+    def send(self, name: str, payload: Data = b"") -> bytes:
         """A command by its name, such as "GET_RSSI": what the handset sent after the command id."""
         function = f"KRAL_FTM_{name}"
         prototype = _api.PROTOTYPES.get(function)
@@ -74,12 +74,14 @@ class Ftm:
             raise BadArgument(f"{name} is no command with a payload; send_id takes any number")
         response = ctypes.create_string_buffer(_api.KRAL_LONGEST_REQUEST)
         size = ctypes.c_uint16(len(response))
-        self._connection.check(function, payload, len(payload), response, ctypes.byref(size))
+        data = octets(payload)
+        self._connection.check(function, data, len(data), response, ctypes.byref(size))
         return response.raw[:size.value]
 
-    def send_id(self, command: int, payload: bytes = b"") -> bytes:
+    def send_id(self, command: int, payload: Data = b"") -> bytes:
         """A command by its number, to the dispatcher of `mode_id`."""
         response = ctypes.create_string_buffer(_api.KRAL_LONGEST_REQUEST)
         size = ctypes.c_uint16(len(response))
-        self._connection.check("KRAL_FTM_SendCommand", command, payload, len(payload), response, ctypes.byref(size))
+        data = octets(payload)
+        self._connection.check("KRAL_FTM_SendCommand", command, data, len(data), response, ctypes.byref(size))
         return response.raw[:size.value]

@@ -17,9 +17,9 @@ import pathlib
 from typing import Any, Callable, Dict, Iterable, Iterator, List, Optional, Tuple, Union
 
 from kral import _api
+from kral._connection import LocalPath, call, fitting, integer, local, milliseconds
 from kral._library import load
-from kral.errors import BY_CODE, BadArgument, KralError, fail, record_of
-from kral.files import LocalPath
+from kral.errors import KralError, exception, fail, record_of
 from kral.modes import Mode
 from kral.phone import Phone
 
@@ -77,8 +77,8 @@ class Job:
     def __init__(self, *, enter_loader: bool = False, reset: bool = False, at_once: int = 0, retries: int = 2,
                  return_time: float = 30, start_time: float = 60) -> None:
         """enter_loader: handsets are in diagnostics before a download; reset: and are restarted after it."""
-        self._flags = (enter_loader * _api.KRAL_VENTRIMS_ENTER_LOADER) | (reset * _api.KRAL_VENTRIMS_RESET)
-        self._limits = at_once, retries, int(return_time * 1000), int(start_time * 1000)
+        self._flags = (bool(enter_loader) * _api.KRAL_VENTRIMS_ENTER_LOADER) | (bool(reset) * _api.KRAL_VENTRIMS_RESET)
+        self._limits = at_once, retries, milliseconds(return_time), milliseconds(start_time)
         self._steps: List[Tuple[str, Tuple[Any, ...]]] = []
 
     def _step(self, name: str, *arguments: Any) -> None:
@@ -88,28 +88,28 @@ class Job:
         """Loads a flash programmer: with the boot transfer, or, as a file with the ending .hex, by the loader."""
         is_hex = pathlib.PurePath(os.fsdecode(file)).suffix.lower() == ".hex" if boot is None else not boot
         kind = _api.KRAL_VENTRIMS_PROGRAMMER_HEX if is_hex else _api.KRAL_VENTRIMS_PROGRAMMER_BOOT
-        self._step("AddProgrammer", os.fsencode(file), kind)
+        self._step("AddProgrammer", local(file), kind)
 
     def partition_table(self, file: LocalPath, override: bool = False) -> None:
-        self._step("AddPartitionTable", os.fsencode(file), int(override))
+        self._step("AddPartitionTable", local(file), int(override))
 
     def image(self, file: LocalPath, image_type: int = 0, header: Optional[LocalPath] = None) -> None:
         """Writes an image; the type is that of the handset."""
-        self._step("AddImage", os.fsencode(file), _api.KRAL_IMAGE_FORMAT_BY_CONTENT, image_type,
-                   None if header is None else os.fsencode(header), _api.KRAL_STREAM_MULTI_IMAGE)
+        self._step("AddImage", local(file), _api.KRAL_IMAGE_FORMAT_BY_CONTENT, image_type,
+                   None if header is None else local(header), _api.KRAL_STREAM_MULTI_IMAGE)
 
     def identity(self) -> None:
         """Asks who it is; a job that begins in diagnostics does so in any case."""
         self._step("AddIdentity")
 
     def mode(self, mode: Mode) -> None:
-        self._step("AddMode", int(mode))
+        self._step("AddMode", integer(mode))
 
     def restore(self, file: LocalPath) -> None:
-        self._step("AddRestore", os.fsencode(file))
+        self._step("AddRestore", local(file))
 
     def verify(self, file: LocalPath) -> None:
-        self._step("AddVerify", os.fsencode(file))
+        self._step("AddVerify", local(file))
 
     def run(self, handsets: Iterable[Union[int, Phone]],
             progress: Optional[Callable[[JobProgress], Any]] = None) -> Iterator[Verdict]:
@@ -139,7 +139,8 @@ class _Run:
             options = _api.KRAL_VENTRIMS_OPTIONS(size=ctypes.sizeof(_api.KRAL_VENTRIMS_OPTIONS))
             self._check("KRAL_VENTRIMS_GetOptions", ctypes.byref(options))
             options.flags = flags
-            options.at_once, options.retries, options.return_ms, options.start_ms = limits
+            options.at_once, options.retries, options.return_ms, options.start_ms = (
+                fitting(ctypes.c_uint32, limit) for limit in limits)
             self._check("KRAL_VENTRIMS_SetOptions", ctypes.byref(options))
             for name, arguments in steps:
                 self._check(name, *arguments)
@@ -162,11 +163,7 @@ class _Run:
             self._api.KRAL_VENTRIMS_Free(job)
 
     def _check(self, name: str, *arguments: Any) -> None:
-        try:
-            done = getattr(self._api, name)(self._job, *arguments)
-        except ctypes.ArgumentError as error:
-            raise BadArgument(f"{name}: {error}") from None
-        if not done:
+        if not call(name, self._job, *arguments):
             fail(self._job, name)
 
     def _verdict(self, handset: int) -> Verdict:
@@ -174,8 +171,7 @@ class _Run:
         self._check("KRAL_VENTRIMS_GetResult", handset, ctypes.byref(result))
         error = None
         if not result.passed:
-            record = record_of(result.error)
-            error = BY_CODE.get(record.code, KralError)(record.text, record)
+            error = exception(record_of(result.error))
         return Verdict(bool(result.passed), error, _progress(result.progress))
 
     def verdicts(self, progress: Optional[Callable[[JobProgress], Any]]) -> Iterator[Verdict]:

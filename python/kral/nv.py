@@ -3,16 +3,25 @@ from __future__ import annotations
 
 import ctypes
 import dataclasses
-import os
+import operator
 import xml.etree.ElementTree as ElementTree
-from typing import Dict, Iterator, List, Mapping, Optional, Sequence, Tuple, Union
+from typing import Any, Dict, Iterable, Iterator, List, Mapping, Optional, Sequence, Tuple, Union
 
 from kral import _api
-from kral._connection import Connection
-from kral.errors import BY_CODE, ErrorRecord, KralError, Refused, last_error
-from kral.files import LocalPath
+from kral._connection import Connection, Data, LocalPath, local, octets
+from kral.errors import BadArgument, ErrorRecord, KralError, Refused, exception, last_error
 
 Numbers = Union[int, Sequence[int], Mapping[str, int], str]
+
+
+def _text(value: Union[int, Iterable[int], str]) -> str:
+    """Numbers as the library takes them; a truth value is one, too."""
+    if isinstance(value, str):
+        return value
+    try:
+        return str(operator.index(value))  # type: ignore[arg-type]
+    except TypeError:
+        return ",".join(str(operator.index(number)) for number in value)  # type: ignore[union-attr]
 
 
 class NvError(KralError):
@@ -41,8 +50,15 @@ class NvValue(Tuple[int, ...]):
         value.fields = fields
         return value
 
+    def __getnewargs__(self) -> Tuple[Tuple[int, ...], Tuple[str, ...]]:
+        return tuple(self), self.fields
+
     def __getitem__(self, key):  # type: ignore[no-untyped-def]
-        return super().__getitem__(self.fields.index(key) if isinstance(key, str) else key)
+        if isinstance(key, str):
+            if key not in self.fields:
+                raise KeyError(f"{key}: not among the fields {', '.join(self.fields)}")
+            key = self.fields.index(key)
+        return super().__getitem__(key)
 
     def __int__(self) -> int:
         if len(self) != 1:
@@ -74,10 +90,11 @@ class Nv:
         self._judge("KRAL_DIAG_NV_READ_F", item, status.value)
         return data.raw
 
-    def write(self, item: int, data: bytes) -> None:
+    def write(self, item: int, data: Data) -> None:
         """Writes what the data field of an item begins with; the rest of it becomes 0."""
         status = ctypes.c_uint16()
-        self._connection.check("KRAL_DIAG_NV_WRITE_F", item, data, len(data), ctypes.byref(status))
+        content = octets(data)
+        self._connection.check("KRAL_DIAG_NV_WRITE_F", item, content, len(content), ctypes.byref(status))
         self._judge("KRAL_DIAG_NV_WRITE_F", item, status.value)
 
     @staticmethod
@@ -97,7 +114,7 @@ class Nv:
             return code
         record = last_error(handle)
         if record is not None and record.function == name:
-            failure: KralError = BY_CODE.get(record.code, KralError)(record.text, record)
+            failure = exception(record)
         else:
             text = ctypes.create_string_buffer(128)
             self._connection.api.KRAL_NV_GetErrorText(0, code, text, len(text))
@@ -115,8 +132,8 @@ class Nv:
     def load_definitions(self, path: LocalPath, dictionary: Optional[LocalPath] = None) -> None:
         """Loads a file of definitions, and before it a dictionary of data types if there is one."""
         if dictionary is not None:
-            self._tool("KRAL_NV_LoadNVDataTypeDictinary", os.fsencode(dictionary))
-        self._tool("KRAL_NV_LoadNVDefinitionFile", os.fsencode(path), allowed=(0, _api.KRAL_NV_ERROR_REDEFINED))
+            self._tool("KRAL_NV_LoadNVDataTypeDictinary", local(dictionary))
+        self._tool("KRAL_NV_LoadNVDefinitionFile", local(path), allowed=(0, _api.KRAL_NV_ERROR_REDEFINED))
         self._definitions = {definition.name or definition.path or str(definition.id): definition
                              for definition in self._read_definitions()}
 
@@ -146,12 +163,31 @@ class Nv:
                 return definition
         raise KeyError(f"{key}: not among the {len(self._definitions)} definitions that are loaded")
 
+    def __contains__(self, key: object) -> bool:
+        """Whether `nv[key]` has a definition; nothing is asked of the handset."""
+        try:
+            self._find(key)
+        except (KeyError, TypeError, BadArgument):
+            return False
+        return True
+
+    def __iter__(self) -> Iterator[str]:
+        """The names of the items that are defined."""
+        return iter(list(self._definitions))
+
     # --- Values by definition
+
+    def _find(self, key: Any) -> Tuple[NvDefinition, int]:
+        """The definition that a key names, and the element."""
+        name, element = key if isinstance(key, tuple) else (key, 0)
+        definition = self.definition(name)
+        if not 0 <= element <= definition.max_index:
+            raise BadArgument(f"{name}: element {element} is not one of 0 to {definition.max_index}")
+        return definition, element
 
     def __getitem__(self, key: Union[str, int, Tuple[Union[str, int], int]]) -> NvValue:
         """Reads an item from the handset: `nv["FTM_MODE"]`, `nv[453]`, and an array's element `nv["SPEED_DIAL", 2]`."""
-        name, element = key if isinstance(key, tuple) else (key, 0)
-        definition = self.definition(name)
+        definition, element = self._find(key)
         if definition.path is not None:
             path = definition.path.encode()
             self._tool("KRAL_NV_ReadNVItemFromMobileByEfsFilename", path)
@@ -164,12 +200,14 @@ class Nv:
 
     def __setitem__(self, key: Union[str, int, Tuple[Union[str, int], int]], value: Numbers) -> None:
         """Writes an item to the handset: one number, all of them, or a mapping of fields to change in what is there."""
-        name, element = key if isinstance(key, tuple) else (key, 0)
-        definition = self.definition(name)
+        definition, element = self._find(key)
         if isinstance(value, Mapping):
-            value = [*{**self[name, element].asdict(), **value}.values()]
-        text = value if isinstance(value, str) else str(value) if isinstance(value, int) else \
-            ",".join(str(number) for number in value)
+            there = self[key].asdict()
+            for field in value:
+                if field not in there:
+                    raise KeyError(f"{field}: not among the fields {', '.join(there)}")
+            value = [*{**there, **value}.values()]
+        text = _text(value)
         if definition.path is not None:
             path = definition.path.encode()
             self._tool("KRAL_NV_SetNVValueStringByEfsFilename", path, text.encode())

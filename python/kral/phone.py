@@ -9,11 +9,10 @@ from types import TracebackType
 from typing import Any, Callable, Iterable, Iterator, Optional, Type
 
 from kral import _api, pkv, traffic
-from kral._connection import Connection
-from kral._library import load
+from kral._connection import Connection, Data, LocalPath, call, integer, local, milliseconds, octets, open_connection
 from kral.commands import Commands
-from kral.errors import BadArgument, KralError, LinkError, NoAnswer, NoPort, PortBusy, fail
-from kral.files import Files, LocalPath
+from kral.errors import BadArgument, BadFile, KralError, LinkError, NoAnswer, NoPort, PortBusy, fail
+from kral.files import Files
 from kral.ftm import Ftm
 from kral.modes import STATES, Mode
 from kral.nv import Nv
@@ -109,18 +108,23 @@ class Phone:
     @mode.setter
     def mode(self, value: int) -> None:
         """Switches the operating mode and waits for it."""
-        self._connection.check("KRAL_DIAG_CONTROL_F", int(value))
+        try:
+            mode = Mode(integer(value))
+        except ValueError as error:
+            raise BadArgument(str(error)) from None
+        self._connection.check("KRAL_DIAG_CONTROL_F", int(mode))
 
-    def request(self, data: bytes, timeout: float = 4.0) -> bytes:
+    def request(self, data: Data, timeout: float = 4.0) -> bytes:
         """Sends a request, command code first, and gives the reply."""
         reply = ctypes.create_string_buffer(_api.KRAL_LONGEST_REQUEST + 3)
         size = ctypes.c_uint16(len(reply))
-        self._connection.check("KRAL_SendSync", len(data), data, ctypes.byref(size), reply, int(timeout * 1000))
+        content, wait = octets(data), milliseconds(timeout)
+        self._connection.check("KRAL_SendSync", len(content), content, ctypes.byref(size), reply, wait)
         return reply.raw[:size.value]
 
     def set_timeout(self, which: int, seconds: float) -> None:
         """Sets one of the time-outs (TimeOut)."""
-        self._connection.check("KRAL_ConfigureTimeOut", which, int(seconds * 1000))
+        self._connection.check("KRAL_ConfigureTimeOut", which, milliseconds(seconds))
 
     def unlock(self, code: str) -> bool:
         """Sends the service programming code, six digits; whether the handset accepted it."""
@@ -139,8 +143,8 @@ class Phone:
         """
         if not isinstance(items, range) or items.step != 1 or not items:
             raise BadArgument("items of a backup are a range without gaps, such as range(10000)")
-        self._connection.check("KRAL_PKV_ConfigureBackup", items[0], items[-1], subscriptions)
-        return pkv.run(self._connection, "KRAL_BackupNVFromMobileToPKV", path, progress)
+        return pkv.run(self._connection, "KRAL_BackupNVFromMobileToPKV", path, progress,
+                       (items[0], items[-1], subscriptions))
 
     def restore(self, path: LocalPath, progress: Optional[pkv.Progress] = None) -> pkv.PkvResult:
         """Writes a PKV file to the handset, and reads back what it wrote."""
@@ -165,24 +169,30 @@ class Phone:
         """Writes what the library does to a file, or gives each line to a function, or both; without either, neither.
 
         The function is called on threads of the library, and must not use the phone.
+        Other phones of the port have functions and categories of their own, but there is one file: it is refused while
+        another phone has one, and has the categories of all.
         """
-        connection = self._connection
-        connection.check("KRAL_SetLogFlags", flags)
-        if path is not None:
-            connection.check("KRAL_StartLogging", os.fsencode(path))
-        elif connection.ask("KRAL_IsLoggingStarted"):
-            connection.check("KRAL_StopLogging")
-        if line is None:
-            connection.targets.set("text_log", None)
-            return
-
         def told(_size: int, record: int, _handle: int) -> None:
-            text = ctypes.string_at(record + 8, 999).split(b"\0")[0]
-            line(text.decode("utf-8", "replace"))  # type: ignore[misc]
+            category = int.from_bytes(ctypes.string_at(record, 2), "little")
+            if category & flags:  # others may ask for more
+                text = ctypes.string_at(record + 8, 999).split(b"\0")[0]
+                line(text.decode("utf-8", "replace"))  # type: ignore[misc]
 
-        connection.targets.set("text_log", told)
-        connection.api.KRAL_ConfigureLibraryTextLogCallBack(
-            connection.handle, connection.targets.make("text_log", _api.KRAL_TEXT_LOG_CALLBACK))
+        encoded = None if path is None else local(path)
+        if path is not None:
+            _try_file(path)
+        self._connection.log_to(encoded, flags, None if line is None else told)
+
+
+def _try_file(path: LocalPath) -> None:
+    """The library opens a text log with its first line, and does not tell that it could not. Pipes have to wait."""
+    if os.path.exists(path) and not os.path.isfile(path) and not os.path.isdir(path):
+        return
+    try:
+        with open(path, "ab"):
+            pass
+    except OSError as error:
+        raise BadFile(f"the text log cannot be written: {error}") from None
 
 
 _PORT_FAILURES = {
@@ -198,16 +208,12 @@ def connect(port: int, wait: float = 0.0) -> Phone:
 
     Tries for `wait` seconds. Raises NoPort, PortBusy, or NoAnswer when the port is there and nobody answers.
     """
-    if not 0 < port <= 0xFFFF:
+    if not 0 < integer(port) <= 0xFFFF:
         raise BadArgument(f"{port} is no number of a port")
-    api = load()
-    api.KRAL_SetDefaultReceiveMode(_api.KRAL_RECEIVE_MODE_WAKE)
+    call("KRAL_SetDefaultReceiveMode", _api.KRAL_RECEIVE_MODE_WAKE)
     deadline = time.monotonic() + wait
     while True:
-        handle = api.KRAL_ConnectServer(port)
-        if not handle:
-            fail(0, "KRAL_ConnectServer")
-        connection = Connection(handle)
+        connection = open_connection("KRAL_ConnectServer", port)
         if connection.ask("KRAL_IsPhoneConnected"):
             return Phone(connection, port)
         failure = _no_handset(connection, port)
@@ -229,9 +235,8 @@ def _no_handset(connection: Connection, port: int) -> KralError:
 
 def ports() -> "list[int]":
     """The serial ports of this machine, by COM number. None is opened."""
-    api = load()
     count = ctypes.c_uint16(1024)
     found = (ctypes.c_uint16 * 1024)()
-    if not api.KRAL_GetAllPortList(ctypes.byref(count), found):
+    if not call("KRAL_GetAllPortList", ctypes.byref(count), found):
         fail(0, "KRAL_GetAllPortList")
     return list(found[:count.value])

@@ -3,14 +3,12 @@ from __future__ import annotations
 
 import ctypes
 import dataclasses
-import os
-from typing import Any, Callable, List, Optional
+from typing import Any, Callable, List, Optional, Tuple
 
 from kral import _api
-from kral._connection import Connection
+from kral._connection import Connection, LocalPath, local
 from kral._work import Work
 from kral.errors import KralError
-from kral.files import LocalPath
 
 _RESULTS = {_api.KRAL_PKV_DONE: "done", _api.KRAL_PKV_SKIPPED: "skipped", _api.KRAL_PKV_REFUSED: "refused",
             _api.KRAL_PKV_DIFFERENT: "different", _api.KRAL_PKV_NOT_READ_BACK: "not read back",
@@ -46,33 +44,35 @@ class PkvResult:
 Progress = Callable[[int, int, PkvItem], Any]
 
 
-def run(connection: Connection, name: str, path: LocalPath, progress: Optional[Progress]) -> PkvResult:
+def run(connection: Connection, name: str, path: LocalPath, progress: Optional[Progress],
+        extent: Optional[Tuple[int, int, int]] = None) -> PkvResult:
     """Backup, restore or comparison. Raises the exception of its outcome, with a `result`."""
     left: List[PkvItem] = []
+    status, counts = ctypes.c_uint32(), _api.KRAL_PKV_COUNTS()
 
-    def prepare(work: "Work[None]") -> None:
-        def moved(item: Any, file: Optional[bytes], done: int, total: int, _handle: int) -> int:
-            raw = item.contents
-            told = PkvItem(raw.id, file.decode("utf-8", "surrogateescape") if file else None, raw.index,
-                           raw.subscription, raw.status, _RESULTS.get(raw.result, str(raw.result)))
-            if raw.result not in (_api.KRAL_PKV_DONE, _api.KRAL_PKV_SKIPPED):
-                left.append(told)
-            work.report(done, total, told)
-            return 1
+    def moved(work: "Work[Any]", item: Any, file: Optional[bytes], done: int, total: int, _handle: int) -> int:
+        raw = item.contents
+        told = PkvItem(raw.id, file.decode("utf-8", "surrogateescape") if file else None, raw.index,
+                       raw.subscription, raw.status, _RESULTS.get(raw.result, str(raw.result)))
+        if raw.result not in (_api.KRAL_PKV_DONE, _api.KRAL_PKV_SKIPPED):
+            left.append(told)
+        work.report(done, total, told)
+        return 1
 
-        connection.targets.set("pkv", moved)
-        connection.check("KRAL_PKV_ConfigureCallBack", connection.targets.make("pkv", _api.KRAL_PKV_CALLBACK, 1))
+    def carry_out() -> Optional[KralError]:
+        failure = None
+        if extent is not None:
+            # Here, after the work before it on the handle, which has an extent of its own.
+            connection.check("KRAL_PKV_ConfigureBackup", *extent)
+        try:
+            connection.check(name, local(path), ctypes.byref(status))
+        except KralError as error:
+            failure = error
+        # Here, before the next work on the handle, which has counts of its own.
+        connection.check("KRAL_PKV_GetCounts", ctypes.byref(counts))
+        return failure
 
-    status = ctypes.c_uint32()
-    failure: Optional[KralError] = None
-    try:
-        connection.long(lambda: connection.check(name, os.fsencode(path), ctypes.byref(status)), prepare, progress)
-    except KralError as error:
-        failure = error
-    finally:
-        connection.targets.set("pkv", None)
-    counts = _api.KRAL_PKV_COUNTS()
-    connection.check("KRAL_PKV_GetCounts", ctypes.byref(counts))
+    failure = connection.long(carry_out, progress, "pkv", moved)
     result = PkvResult(counts.total, counts.done, counts.skipped, counts.refused, counts.different,
                        counts.not_read_back, counts.not_reached, left)
     if failure is not None:

@@ -8,7 +8,7 @@ import time
 from typing import Any, Callable, Iterable, Iterator, Optional, TypeVar
 
 from kral import _api
-from kral._connection import Connection
+from kral._connection import Connection, array
 from kral.errors import ErrorRecord, Lost
 
 T = TypeVar("T")
@@ -68,11 +68,11 @@ def _each(connection: Connection, take: Callable[[int], Optional[T]], wanted: Ca
 
 def logs(connection: Connection, codes: Iterable[int], timeout: Optional[float]) -> Iterator[Packet]:
     """Switches log codes on, and gives the packets as they come."""
-    wanted = sorted(set(codes))
+    wanted = list(array(ctypes.c_uint16, sorted(set(codes))))
     connection.check("KRAL_DIAG_SetPhoneLoggingState", 1)
     for equipment in sorted({code >> 12 for code in wanted}):
         own = [code for code in wanted if code >> 12 == equipment]
-        connection.check("KRAL_DIAG_AddExtendedLogCodes", equipment, (ctypes.c_uint16 * len(own))(*own), len(own))
+        connection.check("KRAL_DIAG_AddExtendedLogCodes", equipment, array(ctypes.c_uint16, own), len(own))
     buffer = ctypes.create_string_buffer(_api.KRAL_LONGEST_PACKET)
 
     def take(wait_ms: int) -> Optional[Packet]:
@@ -92,7 +92,7 @@ def events(connection: Connection, ids: Optional[Iterable[int]], timeout: Option
         wanted: Any = None
     else:
         wanted = sorted(set(ids))
-        connection.check("KRAL_DIAG_SetEventMaskBits", (ctypes.c_uint16 * len(wanted))(*wanted), len(wanted), 1)
+        connection.check("KRAL_DIAG_SetEventMaskBits", array(ctypes.c_uint16, wanted), len(wanted), 1)
 
     def take(wait_ms: int) -> Optional[Event]:
         raw = _api.KRAL_EVENT()

@@ -1,10 +1,15 @@
 """The package against a simulated handset."""
+import array
+import copy
+import ctypes
 import gc
 import os
 import pathlib
+import pickle
 import struct
 import threading
 import time
+from collections.abc import Mapping
 from concurrent.futures import ThreadPoolExecutor
 
 import pytest
@@ -86,6 +91,41 @@ def test_commands_by_definition(phone, tmp_path):
     assert not hasattr(phone.cmd, "WLAN")
 
 
+def test_fields_may_have_any_name(phone, tmp_path):
+    names = ("self", "keys", "items", "values", "get", "_fields", "name")
+    fields = "".join(f"<Field name='{name}' type='u8'/>" for name in (*names, "__class__"))
+    file = tmp_path / "names.xml"
+    file.write_text(f"<CommandDefinition><Family name='ECHO' frame='ftm' mode='22'><Command name='BACK' id='901'>"
+                    f"<Request>{fields}</Request><Reply>{fields}</Reply></Command></Family></CommandDefinition>")
+    phone.cmd.load(file)
+    given = {name: 65 + place for place, name in enumerate((*names, "__class__"))}
+    with phone.ftm.active():
+        reply = phone.cmd.ECHO.BACK(**given)
+    assert [getattr(reply, name) for name in names] == [given[name] for name in names]
+    assert isinstance(reply, Mapping) and reply["__class__"] == given["__class__"]
+    assert reply == given and given == reply and reply != {} and "keys=66" in repr(reply)
+    assert not hasattr(reply, "x") and copy.copy(reply) == reply
+    with pytest.raises(kral.BadArgument, match="self=256 is out of range"):
+        phone.cmd.ECHO.BACK(**{**given, "self": 256})
+
+
+def test_definitions_may_be_looked_up_while_they_are_cleared_and_loaded(phone, tmp_path):
+    file = tmp_path / "commands.xml"
+    file.write_text(COMMANDS.replace("</Family>", "".join(f"<Command name='C{i}' id='{i + 90}'/>" for i in range(40)) +
+                                     "</Family>"))
+
+    def look_up(_):
+        names = phone.cmd.names()
+        return len(names) in (0, 41) and (not hasattr(phone.cmd, "WLAN") or bool(dir(phone.cmd)))
+
+    with ThreadPoolExecutor(2) as threads:
+        looked = threads.map(look_up, range(400))
+        for _ in range(100):
+            phone.cmd.clear()
+            assert phone.cmd.load(file) == 41
+        assert all(looked)
+
+
 def test_nv_items_as_bytes_and_by_name(defined):
     nv = defined.nv
     nv.write(453, b"\x01")
@@ -101,6 +141,15 @@ def test_nv_items_as_bytes_and_by_name(defined):
     assert failure.value.tool_code == _api.KRAL_NV_ERROR_CANNOT_SET_VALUE
     with pytest.raises(KeyError):
         nv["NO_SUCH_ITEM"]
+    nv["FTM_MODE"] = True
+    assert nv["FTM_MODE"] == (1,)
+    for misnamed in (lambda: nv["FTM_MODE"]["other"], lambda: nv.__setitem__("PREFERENCE", {"levle": 1})):
+        with pytest.raises(KeyError, match="not among the fields"):
+            misnamed()
+    for copied in (copy.copy, copy.deepcopy, lambda value: pickle.loads(pickle.dumps(value))):
+        assert copied(nv["PREFERENCE"])["offset"] == -8
+    assert list(nv) == ["FTM_MODE", "PREFERENCE", "LIMIT"]
+    assert "LIMIT" in nv and 453 in nv and "NO_SUCH_ITEM" not in nv and ("LIMIT", 1) not in nv
 
 
 @pytest.mark.handset(files={"/a/b/one": b"1", "/a/two": b"22"})
@@ -111,7 +160,7 @@ def test_files(phone, tmp_path):
     data = bytes(range(256)) * 40
     files.put(data, "/a/big", progress=lambda done, total: told.append((done, total)))
     assert files.get("/a/big") == data and told[-1] == (len(data), len(data)) and len(told) > 3
-    files.get("/a/big", to=tmp_path / "copy")
+    files.get(pathlib.PurePosixPath("/a/big"), to=tmp_path / "copy")
     assert (tmp_path / "copy").read_bytes() == data
     files.put(tmp_path / "copy", "/a/again")
     files.rename("/a/again", "/a/b/again")
@@ -124,11 +173,15 @@ def test_files(phone, tmp_path):
     assert len(files.listdir("/a/b")) == 71
     odd = os.fsdecode(b"/a/b/\xff")  # no text: it is given back as it came
     files.mkdir(odd)
-    files.put(b"1", odd + "/x")
+    files.put(memoryview(b"1"), odd + "/x")
     assert [path for path, _, _ in files.walk("/a/b")] == ["/a/b", odd] and files.get(odd + "/x") == b"1"
-    with pytest.raises(kral.FileError) as failure:
-        files.rmdir("/a/b")
-    assert failure.value.status not in (None, 0)
+    assert not files.exists("/a/two/x")
+    for call in (lambda: files.rmdir("/a/b"), lambda: files.get("/a"), lambda: files.listdir("/none"),
+                 lambda: files.get("/none", to=tmp_path / "none"), lambda: files.put(b"", "/none/x"),
+                 lambda: files.put_item(b"", "/none/x"), lambda: files.mkdir("/a/two")):
+        with pytest.raises(kral.FileError) as failure:
+            call()
+        assert failure.value.status not in (None, 0)
 
 
 # Which outcome a fault becomes: the exception, and the status that it carries.
@@ -162,17 +215,44 @@ def test_failures_are_exceptions_by_outcome(request, fault, call, kind, status):
     lambda phone: phone.nv.write(453, b"\1" * 65537),
     lambda phone: phone.request("abc"),
     lambda phone: phone.ftm.set_channel(65536 + 9750),
+    lambda phone: setattr(phone, "mode", 99),
     lambda phone: phone.files.remove("/a\0b"),
     lambda phone: phone.files.put(b"", "/a\0b"),
     lambda phone: phone.backup("x.pkv", items=range(0, 200, 50)),
     lambda phone: phone.backup("x.pkv", items=range(0)),
+    lambda phone: next(phone.events([65536 + 5], timeout=0)),
+    lambda phone: kral.flash(255, __file__, [(256, __file__)]),
     lambda phone: kral.connect(65536 + phone.port),
     lambda phone: kral.connect(-1),
+    lambda phone: kral.connect(1.0),
+    lambda phone: kral.Job().mode(2.5),
+    lambda phone: phone.request(b"\0", float("inf")),
+    lambda phone: bands.get("x"),
+    lambda phone: kral.image_info(__file__ + "\0"),
+    lambda phone: kral.flash(255, __file__ + "\0", [__file__]),
+    lambda phone: kral.flash(255, __file__, [__file__ + "\0.bin"]),
 ])
 def test_what_c_would_cut_is_refused(phone, call):
     with pytest.raises(kral.BadArgument):
         call(phone)
     phone.identity  # nothing was sent, and no other connection was closed
+
+
+@pytest.mark.parametrize("words", [
+    array.array("H", [0x0102] * 64),
+    memoryview(array.array("H", [0x0102] * 64)),
+    memoryview(array.array("H", [0x0102, 0] * 64))[::2],
+    (ctypes.c_uint16 * 64)(*[0x0102] * 64),
+], ids=["array", "view", "every second", "ctypes"])
+def test_all_bytes_of_wider_elements_are_sent(phone, words):
+    phone.nv.write(453, words)
+    assert phone.nv.read(453) == b"\2\1" * 64
+    for write, path in ((phone.files.put, "/file"), (phone.files.put_item, "/item")):
+        write(words, path)
+        assert phone.files.get(path) == b"\2\1" * 64
+    assert phone.request((ctypes.c_uint16 * 2)(0x0F4B, 0))[:4] == b"\x4b\x0f\0\0"
+    with phone.ftm.active():
+        assert phone.ftm.send_id(902, words) == b"\2\1" * 64
 
 
 def test_connects_that_fail(handset):
@@ -187,11 +267,23 @@ def test_connects_that_fail(handset):
         kral.connect(handset.port, wait=0.15)
 
 
+class Station:
+    """One that is told by its own phone."""
+
+    def __init__(self, port):
+        self.phone = kral.connect(port)
+        self.phone.text_log(line=self.line)
+
+    def line(self, text):
+        self.last = text
+
+
 def test_a_forgotten_phone_lets_go_of_its_port(handset):
-    phone = kral.connect(handset.port)
-    phone.text_log(line=lambda text: None)
-    handle = phone.handle
-    del phone
+    station = Station(handset.port)
+    handle = station.phone.handle
+    station.phone.identity
+    assert "DIAG_READ_ESN" in station.last
+    del station
     gc.collect()
     assert kral.api().KRAL_GetTimeOut(handle, 0) == 0  # the handle is unknown
 
@@ -235,6 +327,58 @@ def test_job_on_many_handsets(phone, handset, tmp_path):
         with pytest.raises(kral.BadFile):
             job.run([phone])
     assert phone.identity.serial == 0x10
+
+
+def test_backups_on_one_port_have_extents_of_their_own(phone, tmp_path):
+    with ThreadPoolExecutor(2) as threads:
+        first = []
+
+        def others(done, total, item):
+            for count in () if first else (10, 20):
+                first.append(threads.submit(phone.backup, tmp_path / str(count), items=range(count)))
+                time.sleep(0.05)
+
+        totals = [phone.backup(tmp_path / "long", progress=others, items=range(300)).total]
+        totals += [backup.result().total for backup in first]
+    files = phone.backup(tmp_path / "one", items=range(1)).total - 1
+    assert [total - files for total in totals] == [300, 10, 20]
+
+
+def test_the_end_of_another_phone_on_the_port_leaves_progress_alone(phone, tmp_path):
+    phone.nv.write(453, b"\x01")
+    told = []
+
+    def end_another(done, total, item):
+        if not told:
+            other.close()
+        told.append(done)
+
+    other = kral.connect(phone.port)
+    other.backup(tmp_path / "x.pkv", items=range(453, 454))  # has configured callbacks, too
+    result = phone.backup(tmp_path / "x.pkv", progress=end_another, items=range(440, 460))
+    assert told[-1] == result.total and len(told) > 10
+
+
+# A progress function runs while its work has the handset: what would wait for the end of that is refused.
+@pytest.mark.parametrize("use", [
+    lambda phone: phone.files.listdir("/"),
+    lambda phone: phone.backup("x.pkv"),
+    lambda phone: phone.nv.read(0),
+    lambda phone: next(phone.events(timeout=1)),
+    lambda phone: kral.connect(phone.port),
+    lambda phone: kral.flash(phone.port, __file__, [__file__]),
+    lambda phone: phone.close(),
+], ids=["listdir", "backup", "nv", "events", "connect", "flash", "close"])
+def test_a_progress_function_cannot_use_its_phone(phone, use):
+    refused = []
+
+    def progress(done, total):
+        with pytest.raises(kral.BadArgument, match="progress function") as failure:
+            use(phone)
+        refused.append(failure)
+
+    phone.files.put(bytes(5000), "/x", progress=progress)
+    assert refused and phone.files.get("/x") == bytes(5000)
 
 
 def test_an_exception_in_progress_ends_the_work(phone, tmp_path):
@@ -301,11 +445,45 @@ def test_bands():
         bands.get(99)
 
 
-def test_the_text_log_goes_to_a_function(phone):
-    lines = []
+def test_the_text_log_goes_to_the_functions_of_all_phones_on_the_port(phone):
+    lines, others = [], []
     phone.text_log(line=lines.append)
+    with kral.connect(phone.port) as second:
+        assert second.handle == phone.handle
+        second.text_log(line=others.append)
+        second.identity
+        assert any("KRAL_DIAG_VERNO_F" in line for line in lines)
+        assert [line for line in others if "KRAL_DIAG" in line] == [line for line in lines if "KRAL_DIAG" in line]
+    counts = len(lines), len(others)
     phone.identity
+    assert len(lines) > counts[0] and len(others) == counts[1]
+    with pytest.raises(kral.BadFile):
+        phone.text_log("/none/log.txt")
     phone.text_log()
     count = len(lines)
     phone.identity
-    assert any("KRAL_DIAG_VERNO_F" in line for line in lines) and len(lines) == count
+    assert len(lines) == count
+
+
+@pytest.mark.parametrize("other", [
+    lambda phone: phone.text_log(line=lambda text: None),
+    lambda phone: phone.text_log(flags=0, line=lambda text: None),
+    lambda phone: phone.text_log(),
+    lambda phone: pytest.raises(kral.BadArgument, phone.text_log, os.devnull),
+    lambda phone: phone.close(),
+], ids=["lines", "no categories", "neither", "file", "close"])
+def test_another_phone_on_the_port_leaves_the_text_log_alone(phone, tmp_path, other):
+    file, lines = tmp_path / "log.txt", []
+    with kral.connect(phone.port) as second:
+        phone.text_log(file, line=lines.append)
+        other(second)
+        before = file.stat().st_size, len(lines)
+        phone.identity
+        assert file.stat().st_size > before[0] and len(lines) > before[1]
+    phone.identity
+    with kral.connect(phone.port) as second:
+        phone.text_log(line=lines.append)
+        second.text_log(file, flags=_api.KRAL_LOG_FN)
+    before, count = file.stat().st_size, len(lines)
+    phone.identity  # its file has ended with the other phone
+    assert file.stat().st_size == before and len(lines) > count

@@ -104,10 +104,19 @@ def test_the_library_is_the_named_one_then_the_one_beside_then_the_installed_one
     named = {"KRAL_LIBRARY": str(library)}
     loader = {"LD_LIBRARY_PATH": str(installed)}
     beside = {"PYTHONPATH": str(copy.parent)}
+    unpacked = {}
+    for package_folder, library_folder in (("python", "bin"), ("lib/python3/dist-packages", "lib")):
+        archive = tmp_path / library_folder
+        shutil.copytree(package, archive / package_folder / "kral", ignore=shutil.ignore_patterns("lib*"))
+        (archive / library_folder).mkdir(exist_ok=True)
+        unpacked[archive / package_folder] = archive / library_folder / "libkral.so.6"
+        shutil.copy(library, unpacked[archive / package_folder])
     for name, environment, expected in [("named", {**named, **loader, **beside}, library),
                                         ("beside", {**loader, **beside}, copy / "libkral.so.6"),
                                         ("installed", {**loader, "PYTHONPATH": str(package.parent)},
-                                         installed / "libkral.so.6")]:
+                                         installed / "libkral.so.6"),
+                                        *[("unpacked", {**loader, "PYTHONPATH": str(folder)}, beside_it)
+                                          for folder, beside_it in unpacked.items()]]:
         done = say(environment, tmp_path)
         assert done.stdout.strip() == os.path.realpath(expected), (name, done.stderr)
     missing = say({"KRAL_LIBRARY": "/none/libkral.so", "PYTHONPATH": str(package.parent)}, tmp_path)
