@@ -19,7 +19,7 @@ void Snapshot(const kral::Connection &phone, const char *file) {
   std::vector<char> software(KRAL_BUILD_ID_TEXT_SIZE), model(KRAL_BUILD_ID_TEXT_SIZE);
   phone.Call(KRAL_DIAG_READ_ESN_F, &serial);
   phone.Call(KRAL_DIAG_EXT_BUILD_ID_F, nullptr, nullptr, software.data(), model.data());
-  phone.Call(KRAL_PKV_ConfigureBackup, std::uint16_t{0}, std::uint16_t{999}, std::uint16_t{1});
+  phone.Call(KRAL_PKV_ConfigureBackup, 0, 999, 1);
   phone.Call(KRAL_PKV_ConfigureCallBack, ShowRefused);
   phone.Call(KRAL_BackupNVFromMobileToPKV, file, &status);
   phone.Call(KRAL_PKV_Verify, file, &status);
