@@ -21,6 +21,18 @@
       return copy;
     }
 
+    /// <summary>Refuses an array that is shorter than the function is told. Null is the function's matter.</summary>
+    internal static void Fits(Array array, long needed, string name) {
+      if (array == null || array.LongLength >= needed) return;
+      throw new ArgumentException("an array of " + array.Length + " elements where there must be " + needed, name);
+    }
+
+    /// <summary>Refuses a text that C would take for a shorter one; gives any other.</summary>
+    internal static string Whole(string text, string name) {
+      if (text != null && text.IndexOf('\0') >= 0) throw new ArgumentException("a text with a zero in it", name);
+      return text;
+    }
+
     /// <summary>The version of the library in use, such as 6.0.29.</summary>
     public static Version LibraryVersion {
       get {
@@ -204,24 +216,31 @@
     /// <summary>Loads a flash programmer: by the loader (HEX), or with the boot transfer.</summary>
     public void AddProgrammer(string file, bool isHex) {
       uint kind = (uint)(isHex ? Native.KRAL_VENTRIMS_PROGRAMMER_HEX : Native.KRAL_VENTRIMS_PROGRAMMER_BOOT);
-      Check(Native.KRAL_VENTRIMS_AddProgrammer(job, file, kind), "KRAL_VENTRIMS_AddProgrammer");
+      Check(Native.KRAL_VENTRIMS_AddProgrammer(job, Kral.Whole(file, "file"), kind), "KRAL_VENTRIMS_AddProgrammer");
     }
 
     public void AddPartitionTable(string file, bool replace = false) {
-      byte result = Native.KRAL_VENTRIMS_AddPartitionTable(job, file, (byte)(replace ? 1 : 0));
+      byte result = Native.KRAL_VENTRIMS_AddPartitionTable(job, Kral.Whole(file, "file"), (byte)(replace ? 1 : 0));
       Check(result, "KRAL_VENTRIMS_AddPartitionTable");
     }
 
     public void AddImage(string file, byte type = 0, string header = null) {
-      byte result = Native.KRAL_VENTRIMS_AddImage(job, file, (uint)Native.KRAL_IMAGE_FORMAT_BY_CONTENT, type, header,
-                                                  (byte)Native.KRAL_STREAM_MULTI_IMAGE);
+      const uint format = (uint)Native.KRAL_IMAGE_FORMAT_BY_CONTENT;
+      const byte method = (byte)Native.KRAL_STREAM_MULTI_IMAGE;
+      Kral.Whole(header, "header");
+      byte result = Native.KRAL_VENTRIMS_AddImage(job, Kral.Whole(file, "file"), format, type, header, method);
       Check(result, "KRAL_VENTRIMS_AddImage");
     }
 
     public void AddIdentity() { Check(Native.KRAL_VENTRIMS_AddIdentity(job), "KRAL_VENTRIMS_AddIdentity"); }
     public void AddMode(uint mode) { Check(Native.KRAL_VENTRIMS_AddMode(job, mode), "KRAL_VENTRIMS_AddMode"); }
-    public void AddRestore(string file) { Check(Native.KRAL_VENTRIMS_AddRestore(job, file), "KRAL_VENTRIMS_AddRestore"); }
-    public void AddVerify(string file) { Check(Native.KRAL_VENTRIMS_AddVerify(job, file), "KRAL_VENTRIMS_AddVerify"); }
+    public void AddRestore(string file) {
+      Check(Native.KRAL_VENTRIMS_AddRestore(job, Kral.Whole(file, "file")), "KRAL_VENTRIMS_AddRestore");
+    }
+
+    public void AddVerify(string file) {
+      Check(Native.KRAL_VENTRIMS_AddVerify(job, Kral.Whole(file, "file")), "KRAL_VENTRIMS_AddVerify");
+    }
 
     /// <summary>The handset on a COM port.</summary>
     public void Add(uint port) {

@@ -7,9 +7,11 @@ import pathlib
 import re
 import typing
 
-from pycparser import c_ast, c_parser
+from pycparser import c_ast
 
+import arithmetic
 import comments
+import source
 
 # What <stdint.h> gives, as sizes and names.
 SCALARS = {
@@ -18,6 +20,8 @@ SCALARS = {
 }
 # A pointer to one of these without a size would be ambiguous: one byte, or many?
 BYTES = ("uint8_t", "char", "void")
+# What a size may be.
+COUNTS = ("uint8_t", "uint16_t", "uint32_t", "uint64_t", "uintptr_t")
 STANDARD = tuple(name for name in (*SCALARS, "uintptr_t") if name.endswith("_t"))
 
 
@@ -95,10 +99,6 @@ class Description:
     functions: typing.List[Function]
 
 
-def blank(match: typing.Match) -> str:
-    return re.sub(r"[^\n]", " ", match.group(0))
-
-
 class Reader:
     """One header after the other, in the order in which they include each other."""
 
@@ -106,12 +106,13 @@ class Reader:
         self.complaints: typing.List[str] = []
         self.handles: typing.Dict[str, str] = {}
         self.constants: typing.Dict[str, Constant] = {}
+        self.numbers: typing.Dict[str, arithmetic.Number] = {}  # the constants, as C calculates with them
         self.records: typing.Dict[str, Record] = {}
         self.callbacks: typing.Dict[str, Function] = {}
         self.functions: typing.Dict[str, Function] = {}
         self.seen: typing.Set[str] = set()
         self.header = ""
-        self.text = ""
+        self.source = source.Source("", "")
         self.file_comment = comments.parse("/** */")
         self.previous: typing.Optional[Function] = None
 
@@ -125,9 +126,14 @@ class Reader:
             return
         self.seen.add(path.name)
         raw = path.read_text(encoding="utf-8")
-        for included in re.findall(r'^#include "kral/(\w+\.h)"', raw, re.MULTILINE):
-            self.read(path.with_name(included))
-        self.header, self.text = path.name, raw
+        for found in re.finditer(r'^#include "kral/(\w+\.h)"', raw, re.MULTILINE):
+            included = path.with_name(found.group(1))
+            if included.is_file():
+                self.read(included)
+            else:
+                self.header = path.name
+                self.complain(raw.count("\n", 0, found.start()) + 1, f"there is no {included.name}")
+        self.header, self.source = path.name, source.Source(raw, path.name)
         self.previous = None
         first = comments.COMMENT.search(raw)
         if not first or "@file" not in first.group(0):
@@ -143,22 +149,36 @@ class Reader:
                 self.beside[begin] = match.group(0)
             elif not match.group(0).startswith("/* ---"):
                 self.above[end + 1] = match.group(0)
+        for line in self.source.conditional:
+            self.complain(line, "what only some platforms have cannot be described")
         self.read_constants(raw)
-        self.read_code(raw)
+        self.read_code()
 
     def comment_above(self, line: int) -> typing.Optional[comments.Comment]:
         return comments.parse(self.above[line]) if line in self.above else None
+
+    def check_name(self, name: str, table: typing.Container[str], line: int) -> None:
+        if not name.startswith("KRAL_"):
+            self.complain(line, f"{name} does not begin with KRAL_")
+        if name in table:
+            self.complain(line, f"{name} is declared twice")
 
     # --- Constants
 
     def read_constants(self, raw: str) -> None:
         group = ""
         for number, line in enumerate(raw.split("\n"), 1):
+            if line.endswith(";"):
+                group = ""  # a list ends where something else is declared
             if number in self.above:
                 group = comments.until_paragraph(comments.plain(self.above[number]))
             joined = re.sub(r"\\$", "", line)
-            match = re.match(r"#define (KRAL_\w+)\s+(.*)", joined)
-            if not match or match.group(1) in ("KRAL_API", "KRAL_CALL"):
+            match = re.match(r"#\s*define\s+(\w+)(\(|.*)", joined)
+            # What has no value guards its header.
+            if not match or match.group(1) in ("KRAL_API", "KRAL_CALL") or not match.group(2) and joined == line:
+                continue
+            if match.group(2) == "(":
+                self.complain(number, f"{match.group(1)} is a macro with parameters")
                 continue
             words = match.group(2)
             if line.endswith("\\"):
@@ -168,28 +188,26 @@ class Reader:
                               comments.one_line(comments.plain(text.group(0))) if text else group)
 
     def add_constant(self, name: str, expression: str, line: int, text: str) -> None:
-        expression = re.sub(r"\b(0[xX][0-9A-Fa-f]+|\d+)[uU]\b", r"\1", expression.strip())
-        known = {other: constant.value for other, constant in self.constants.items()}
+        self.check_name(name, self.constants, line)
         try:
-            value = eval(expression, {"__builtins__": {}}, known)  # pylint: disable=eval-used
-        except (SyntaxError, NameError) as error:
-            value = error
-        if not isinstance(value, int):
-            self.complain(line, f"{name} is no number that can be described: {value}")
+            number = arithmetic.evaluate(expression, self.numbers)
+        except (ArithmeticError, SyntaxError, ValueError) as error:
+            self.complain(line, f"{name} is no number that can be described: {error}")
             return
-        self.constants[name] = Constant(name, value, value > 0x7FFFFFFF, self.header, text)
+        if not text and not name.startswith("KRAL_VERSION_"):
+            self.complain(line, f"{name} has no comment")
+        self.numbers[name] = number
+        self.constants[name] = Constant(name, number.value, number.value > 0x7FFFFFFF, self.header, text)
 
     # --- Declarations
 
-    def read_code(self, raw: str) -> None:
-        code = comments.COMMENT.sub(blank, raw)
-        code = re.sub(r"#ifdef __cplusplus\n.*?#endif", blank, code, flags=re.DOTALL)
-        code = re.sub(r"^#(?:[^\n\\]|\\\n|\\.)*", blank, code, flags=re.MULTILINE)
-        code = re.sub(r"\bKRAL_(API|CALL)\b", lambda found: " " * len(found.group(0)), code)
-        known = (*STANDARD, *self.handles, *self.records, *self.callbacks)
-        prelude = "".join(f"typedef int {name};" for name in known)
-        tree = c_parser.CParser().parse(f"{prelude}\n#line 1\n{code}", self.header)
-        for node in tree.ext[len(known):]:
+    def read_code(self) -> None:
+        try:
+            nodes = self.source.nodes((*STANDARD, *self.handles, *self.records, *self.callbacks))
+        except source.Unreadable as error:
+            self.complain(error.line, str(error))
+            return
+        for node in nodes:
             self.read_declaration(node)
 
     def read_declaration(self, node: c_ast.Node) -> None:
@@ -197,17 +215,22 @@ class Reader:
         if isinstance(node, c_ast.Typedef):
             if isinstance(node.type, c_ast.PtrDecl) and isinstance(node.type.type, c_ast.FuncDecl):
                 self.read_function(node.name, node.type.type, line, self.callbacks)
-            elif isinstance(node.type, c_ast.TypeDecl) and isinstance(node.type.type, c_ast.Struct):
-                self.read_record(node.name, node.type.type, line)
+            elif isinstance(node.type, c_ast.TypeDecl) and isinstance(node.type.type, c_ast.Struct) and \
+                    node.type.type.decls:
+                self.read_record(node.name, node.type.type, node.type.type.coord.line)
             else:
                 self.read_handle(node, line)
         elif isinstance(node, c_ast.Decl) and isinstance(node.type, c_ast.FuncDecl):
             self.read_function(node.name, node.type, line, self.functions)
         elif isinstance(node, c_ast.Decl) and isinstance(node.type, c_ast.Enum):
+            group = self.above.get(node.type.coord.line, "")
             for row in node.type.values.enumerators:
                 trailing = self.beside.get(row.coord.line, "")
-                self.add_constant(row.name, row.value.value, row.coord.line,
-                                  comments.one_line(comments.plain(trailing)))
+                if not isinstance(row.value, c_ast.Constant):
+                    self.complain(row.coord.line, f"{row.name} has no number beside it")
+                    continue
+                text = comments.one_line(comments.plain(trailing)) or comments.until_paragraph(comments.plain(group))
+                self.add_constant(row.name, row.value.value, row.coord.line, text)
         else:
             self.complain(line, "a declaration that cannot be described")
 
@@ -220,13 +243,6 @@ class Reader:
         else:
             self.handles[node.name] = number
 
-    def first_line(self, line: int) -> int:
-        """A declaration may reach over several lines, and its name may be in a later one."""
-        lines = self.text.split("\n")
-        while line > 1 and not re.match(r"KRAL_API|typedef", lines[line - 1]):
-            line -= 1
-        return line
-
     def type_of(self, node: c_ast.Node, line: int) -> Type:
         pointers, const = 0, False
         while isinstance(node, c_ast.PtrDecl):
@@ -236,6 +252,8 @@ class Reader:
             self.complain(line, "a type that cannot be described")
             return Type("void", 1)
         const = pointers > 0 and "const" in node.quals
+        if set(node.quals) - {"const"}:
+            self.complain(line, f"{' '.join(node.quals)} cannot be described")
         name = " ".join(node.type.names)
         known = name in (*SCALARS, "void", "uintptr_t", *self.handles, *self.records, *self.callbacks)
         if not known or pointers > 2:
@@ -243,16 +261,24 @@ class Reader:
         return Type(name, pointers, const)
 
     def read_function(self, name: str, node: c_ast.FuncDecl, line: int, table: typing.Dict[str, Function]) -> None:
-        line = self.first_line(line)
+        line = self.source.first_line(line)
         own = self.comment_above(line)
-        if own is None and self.previous is None:
+        # One comment may stand above several functions, one right below the other.
+        if own is None and not (self.previous and line > 1 and self.source.lines[line - 2].strip()):
             self.complain(line, f"{name} has no comment")
+        self.check_form(name, node, own, line, table is self.functions)
         result = self.type_of(node.type, line)
+        if result.pointers:
+            self.complain(line, f"{name}: a pointer as a result")
         arguments = []
         for parameter in node.args.params if node.args else []:
+            if isinstance(parameter, c_ast.EllipsisParam):
+                continue
             kind = self.type_of(parameter.type, line)
             if kind.name == "void" and kind.pointers == 0:
                 continue
+            if any(parameter.name == other.name for other in arguments):
+                self.complain(line, f"{name} has two parameters {parameter.name}")
             arguments.append(Argument(parameter.name or "", kind))
         used = own or comments.Comment(self.previous.text if self.previous else "", {}, "", False, ())
         function = Function(name, result, arguments, self.header, used.text, used.result, "none")
@@ -260,10 +286,28 @@ class Reader:
         for argument in arguments:
             self.describe_argument(function, argument, own, line)
         self.check_sizes(function, line)
-        if name in table:
-            self.complain(line, f"{name} is declared twice")
+        self.check_name(name, table, line)
         table[name] = function
         self.previous = function
+
+    def check_form(self, name: str, node: c_ast.FuncDecl, own: typing.Optional[comments.Comment], line: int,
+                   exported: bool) -> None:
+        """What no binding is made from, and all rely on."""
+        if exported and not self.source.is_exported(name):
+            self.complain(line, f"{name} is not exported: KRAL_API")
+        if not self.source.is_called_alike(name):
+            self.complain(line, f"{name} has no calling convention: KRAL_CALL")
+        parameters = node.args.params if node.args else []
+        if not parameters:
+            self.complain(line, f"{name} leaves its parameters open; (void) has none")
+        if any(isinstance(parameter, c_ast.EllipsisParam) for parameter in parameters):
+            self.complain(line, f"{name} takes ..., which cannot be described")
+        names = [getattr(parameter, "name", None) for parameter in parameters]
+        for parameter, said in (own.parameters if own else {}).items():
+            if parameter not in names:
+                self.complain(line, f"{name} has no parameter {parameter}, which @param names")
+            if said.direction not in ("", "in", "out", "in,out"):
+                self.complain(line, f"{name}, {parameter}: {said.direction} is no direction")
 
     def kind_of_result(self, function: Function, comment: comments.Comment) -> str:
         result = function.result.name
@@ -327,10 +371,10 @@ class Reader:
             argument.size = ""
 
     def check_size_name(self, function: Function, argument: Argument, where: str, line: int) -> None:
-        names = [other.name for other in function.arguments]
+        names = [other.name for other in function.arguments if other.type.name in COUNTS]
         size = argument.size
         if size and size != "text" and not size.isdigit() and size not in names and size not in self.constants:
-            self.complain(line, f"{where}: its size {size} is no number, no constant and no parameter")
+            self.complain(line, f"{where}: its size {size} is no number, no constant and no parameter that counts")
 
     def check_sizes(self, function: Function, line: int) -> None:
         """A parameter that is named like a size and is nobody's, beside a pointer that seems to be one value."""
@@ -348,23 +392,26 @@ class Reader:
     # --- Records
 
     def read_record(self, name: str, node: c_ast.Struct, line: int) -> None:
-        comment = self.comment_above(self.first_line(line))
-        if comment is None:
-            comment = self.comment_above(line)
+        self.check_name(name, self.records, line)
+        comment = self.comment_above(line)
         if comment is None:
             self.complain(line, f"{name} has no comment")
         fields: typing.List[Field] = []
         ends = {"32": 0, "64": 0}
         widest = {"32": 1, "64": 1}
         for declaration in node.decls:
+            if getattr(declaration, "bitsize", None) is not None:
+                self.complain(declaration.coord.line, f"{name}: fields of bits cannot be described")
             kind, count = declaration.type, 0
             if isinstance(kind, c_ast.ArrayDecl):
                 count = self.length_of(kind.dim, declaration.coord.line)
                 kind = kind.type
             element = self.type_of(kind, declaration.coord.line)
-            if element.pointers:
+            if element.pointers and isinstance(kind, c_ast.PtrDecl):
                 self.complain(declaration.coord.line, f"{name}: a pointer in a record; uintptr_t carries them")
             text = self.beside.get(declaration.coord.line) or self.above.get(declaration.coord.line) or ""
+            if not text:
+                self.complain(declaration.coord.line, f"{name}, {declaration.name} has no comment")
             field = Field(declaration.name, element.name, count, {}, comments.one_line(comments.plain(text)))
             for bits, end in ends.items():
                 size, alignment = self.measure(element.name, bits)
@@ -404,6 +451,9 @@ def read(folder: pathlib.Path) -> typing.Tuple[Description, typing.List[str]]:
     for path in sorted(folder.glob("*.h")):
         if path.name not in reader.seen:
             reader.complaints.append(f"{path.name}: not included by kral.h")
-    version = ".".join(str(reader.constants[f"KRAL_VERSION_{part}"].value) for part in ("MAJOR", "MINOR", "PATCH"))
+    parts = [reader.constants.get(f"KRAL_VERSION_{part}") for part in ("MAJOR", "MINOR", "PATCH")]
+    if None in parts:
+        reader.complaints.append("kral.h: not all of KRAL_VERSION_MAJOR, _MINOR and _PATCH are there")
+    version = ".".join(str(part.value) for part in parts if part)
     return Description(version, reader.handles, list(reader.constants.values()), list(reader.records.values()),
                        list(reader.callbacks.values()), list(reader.functions.values())), reader.complaints

@@ -118,6 +118,24 @@ def delegates(description: headers.Description) -> typing.Iterator[str]:
         yield f"  public delegate {value_type(callback.result.name)} {callback.name}({arguments});"
 
 
+def checked(function: headers.Function) -> typing.Iterator[str]:
+    """What a method looks at before its call: what C would overrun, or cut."""
+    by_name = {argument.name: argument for argument in function.arguments}
+    for argument in function.arguments:
+        name = plain(argument.name)
+        if declared(argument) == UTF8:
+            yield f'Kral.Whole({name}, "{argument.name}"); '
+        elif argument.size and argument.type.pointers:
+            size = by_name.get(argument.size)
+            if size is None:
+                needed = argument.size if argument.size.isdigit() else f"Native.{argument.size}"
+            elif size.type.pointers and size.direction == "out":
+                continue  # told by the function, about room that it knows otherwise
+            else:
+                needed = plain(size.name)
+            yield f'Kral.Fits({name}, {needed}, "{argument.name}"); '
+
+
 def methods(description: headers.Description) -> typing.Iterator[str]:
     """What Phone has beside its hand-written part."""
     kept = {callback.name for callback in description.callbacks}
@@ -135,9 +153,10 @@ def methods(description: headers.Description) -> typing.Iterator[str]:
             "none": ("void", f"{call}; GC.KeepAlive(this);"),
         }.get(function.result_kind, (value_type(function.result.name), f"return Value({call});"))
         keep = "".join(f"Keep({plain(item.name)}); " for item in function.arguments if item.type.name in kept)
+        looks = "".join(checked(function))
         yield ""
         yield from summary(function.text, "    ")
-        yield f"    public {result} {function.name[len('KRAL_'):]}({arguments}) {{ {keep}{body} }}"
+        yield f"    public {result} {function.name[len('KRAL_'):]}({arguments}) {{ {looks}{keep}{body} }}"
     yield "  }"
 
 

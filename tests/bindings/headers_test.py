@@ -17,6 +17,7 @@ sys.path.insert(0, str(TREE / "bindings"))
 
 import exports  # noqa: E402
 import headers  # noqa: E402
+import make_labview  # noqa: E402
 
 LIBRARY = None  # the shared library; set before any test runs
 
@@ -59,11 +60,50 @@ class Refusals(unittest.TestCase):
              "padding at its end"),
             ("another thing", "/** R. */ typedef char KRAL_R[4];", "no handle, no record and no callback"),
             ("a number", '#define KRAL_X "text"', "KRAL_X is no number"),
+            ("a macro's parameters", "#define KRAL_X(x) (x)", "KRAL_X is a macro with parameters"),
+            ("the convention", "/** F. */ KRAL_API uint8_t KRAL_F(KRAL_HANDLE handle);", "no calling convention"),
+            ("a callback's convention", "/** F. */ typedef void (*KRAL_F)(uint32_t value);", "no calling convention"),
+            ("the export", f"/** F. */ {f}(KRAL_HANDLE handle); /** G. */ uint8_t KRAL_CALL KRAL_G(uint32_t value);",
+             "kral.h:9: KRAL_G is not exported"),
+            ("a later comment", f"/** F. */ {f}(uint32_t value); {f}2(uint32_t value);\n\n{f}3(uint32_t value);",
+             "KRAL_F3 has no comment"),
+            ("another parameter", f"/** F. @param other  it */ {f}(uint32_t value);", "no parameter other"),
+            ("a direction that is none", f"/** F. @param[into] value  it */ {f}(uint32_t* value);",
+             "into is no direction"),
+            ("more parameters", f"/** F. */ {f}(uint32_t value, ...);", "takes ..., which"),
+            ("any parameters", f"/** F. */ {f}();", "(void) has none"),
+            ("a foreign type", f"/** F. */ {f}(size_t value);", "the type size_t cannot be described"),
+            ("bits", "/** R. */ typedef struct KRAL_R { uint32_t a : 3; uint32_t b : 29; } KRAL_R;", "fields of bits"),
+            ("no fields", "/** R. */ typedef struct KRAL_R KRAL_R;", "no handle, no record"),
+            ("a constant's comment", "#define KRAL_X 1", "KRAL_X has no comment"),
+            ("a field's comment", "/** R. */ typedef struct KRAL_R {\n  uint32_t a;\n} KRAL_R;", "KRAL_R, a has no"),
+            ("a counted enumerator", "enum { KRAL_A };", "KRAL_A has no number"),
+            ("no C", f"/** F. */ {f}(uint32_t value;", "kral.h:7: no C that can be read"),
+            ("half of C", f"/** F. */ {f}(", "no C that can be read"),
+            ("32 bits", "/** X. */\n#define KRAL_X 0x100000000", "has more than 32 bits"),
+            ("an int", "/** X. */\n#define KRAL_X (-3000000000)", "is more than an int"),
+            ("a shifted int", "/** X. */\n#define KRAL_X (1 << 31)", "is more than an int"),
+            ("a fraction", "/** X. */\n#define KRAL_X 1.5", "KRAL_X is no number"),
+            ("no C number", "/** X. */\n#define KRAL_X True", "KRAL_X is no number"),
+            ("a second number", "/** X. */\n#define KRAL_X 1\n#define KRAL_X 2", "KRAL_X is declared twice"),
+            ("a number's end", "/** X. */\n#define KRAL_X 1\n#undef KRAL_X", "kral.h:8: what only some"),
+            ("a platform's number", "#ifdef _WIN32\n/** X. */\n#define KRAL_X 1\n#endif", "kral.h:8: what only some"),
+            ("a platform's function", f"#if 0\n/** F. */ {f}(uint32_t value);\n#endif", "kral.h:8: what only some"),
+            ("a second record", "/** R. */ typedef struct KRAL_R {\n  uint8_t a; /**< A. */\n} KRAL_R;\n" * 2,
+             "KRAL_R is declared twice"),
+            ("a second parameter", f"/** F. */ {f}(uint32_t value, uint32_t value);", "has two parameters value"),
+            ("a size that does not count", f"/** F. @param[out] data  [n] it */ {f}(uint8_t* data, int32_t n);",
+             "its size n is no number"),
+            ("a pointer's owner", "/** F. */ KRAL_API const char* KRAL_CALL KRAL_F(uint32_t value);",
+             "a pointer as a result"),
+            ("a function's prefix", "/** F. */ KRAL_API uint8_t KRAL_CALL Odd(uint32_t value);", "begin with KRAL_"),
+            ("a number's prefix", "/** X. */\n#define ODD 3", "ODD does not begin with KRAL_"),
+            ("a header", '#include "kral/none.h"', "kral.h:6: there is no none.h"),
         ]
         for name, text, complaint in cases:
             with self.subTest(name):
                 # Comments stand in a line of their own.
-                complaints = read(text.replace("*/ ", "*/\n"))[1]
+                complaints = read(text.replace("*/ ", "*/\n").replace("; /*", ";\n/*"))[1]
                 self.assertTrue(any(complaint in said for said in complaints), complaints)
 
     def test_a_break_of_the_interface_is_seen_and_not_updated(self):
@@ -79,6 +119,18 @@ class Refusals(unittest.TestCase):
                 self.assertEqual(exports.compare(present, path, False), code, said.getvalue())
                 self.assertEqual(exports.compare(present, path, True), 0 if mended else 1, said.getvalue())
                 self.assertEqual(path.read_text(encoding="utf-8").splitlines(), present if mended else listed)
+
+
+class Numbers(unittest.TestCase):
+    def test_constants_are_calculated_as_c_does(self):
+        for expression, value in [
+                ("~0u", 0xFFFFFFFF), ("(0u - 1u)", 0xFFFFFFFF), ("(-7 % 3)", -1), ("(-7 / 2)", -3), ("~0", -1),
+                ("(KRAL_VERSION_MAJOR * 65536u - 7)", 393209), ("(-1 / 2u)", 0x7FFFFFFF),
+                ("(1u << 31 | 1)", 0x80000001), ("0x80000000", 0x80000000), ("(-2147483647 - 1)", -2147483648)]:
+            with self.subTest(expression):
+                description, complaints = read(f"/** X. */\n#define KRAL_X {expression}\n")
+                self.assertEqual(complaints, [])
+                self.assertEqual(description.constants[-1].value, value)
 
 
 class Description(unittest.TestCase):
@@ -126,6 +178,17 @@ class Description(unittest.TestCase):
         self.assertEqual(library.KRAL_Band_Helper_CalculateULFrequency(1, 60), 902.0)
         for record in self.description.records:
             self.assertEqual(ffi.sizeof(record.name), record.size["64"])
+
+    def test_the_page_for_labview_knows_every_type_and_callback(self):
+        page = (TREE / "docs" / "labview.md").read_text(encoding="utf-8")
+        callbacks = {callback.name for callback in self.description.callbacks}
+        kinds = [(function.name, kind) for function in self.description.functions
+                 for kind in (function.result, *(argument.type for argument in function.arguments))]
+        wanted = {name for name, kind in kinds if kind.name in callbacks}
+        wanted |= {make_labview.spelled(kind) for _, kind in kinds
+                   if kind.name in make_labview.SCALARS and kind.pointers != 1 and kind.name != "void"}
+        self.assertGreater(len(wanted), 15)
+        self.assertEqual({each for each in wanted if f"`{each}`" not in page}, set())
 
     def test_the_list_has_every_function_once(self):
         rows = [row for row in exports.lines_of(self.description) if row.startswith("function ")]
