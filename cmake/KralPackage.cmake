@@ -40,11 +40,18 @@ install(DIRECTORY share/kral/wireshark share/kral/commands DESTINATION ${CMAKE_I
 if(TARGET kral_tool AND NOT WIN32)
   install(FILES share/completion/kral.bash RENAME kral
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions COMPONENT tool)
-  # Where zsh looks for what is installed locally, and for what comes in packages.
-  foreach(folder site-functions vendor-completions)
-    install(FILES share/completion/kral.zsh RENAME _kral DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/${folder}
-      COMPONENT tool)
-  endforeach()
+  # Where zsh looks for what comes in packages, and for what is installed locally.
+  install(CODE "set(kral_zsh \"${PROJECT_SOURCE_DIR}/share/completion/kral.zsh\" ${CMAKE_INSTALL_DATADIR}/zsh)"
+    COMPONENT tool)
+  install(CODE [[
+    list(GET kral_zsh 0 script)
+    list(GET kral_zsh 1 folder)
+    if(CMAKE_INSTALL_PREFIX MATCHES "(^|/)usr/?$")
+      string(APPEND folder /vendor-completions)
+    else()
+      string(APPEND folder /site-functions)
+    endif()
+    file(INSTALL ${script} DESTINATION ${CMAKE_INSTALL_PREFIX}/${folder} RENAME _kral)]] COMPONENT tool)
   install(FILES share/completion/kral.fish DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d
     COMPONENT tool)
 endif()
@@ -74,7 +81,7 @@ install(FILES ${PROJECT_BINARY_DIR}/package/kral.pc DESTINATION ${CMAKE_INSTALL_
 set(CPACK_PACKAGE_NAME kral)
 set(CPACK_PACKAGE_CONTACT "The kral developers <developers@kral.invalid>")
 set(CPACK_PACKAGE_VENDOR kral)
-set(CPACK_PRE_BUILD_SCRIPTS ${PROJECT_SOURCE_DIR}/cmake/KralPackageDate.cmake)
+set(CPACK_PRE_BUILD_SCRIPTS ${PROJECT_SOURCE_DIR}/cmake/KralPackedTree.cmake)
 set(CPACK_VERBATIM_VARIABLES ON)
 if(NOT WIN32)
   set(CPACK_STRIP_FILES ON)
@@ -92,5 +99,9 @@ elseif(CMAKE_CROSSCOMPILING)
   set(CPACK_PACKAGE_FILE_NAME kral-${PROJECT_VERSION}-linux-${CMAKE_SYSTEM_PROCESSOR})
 else()
   include(KralDebian)
+endif()
+if(NOT CPACK_GENERATOR STREQUAL "DEB" AND KRAL_PYTHON)
+  set(CPACK_KRAL_PYTHON ${KRAL_PYTHON})
+  set(CPACK_POST_BUILD_SCRIPTS ${PROJECT_SOURCE_DIR}/cmake/KralPlainArchive.cmake)
 endif()
 include(CPack)

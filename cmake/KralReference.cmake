@@ -20,7 +20,7 @@ else()
   set(KRAL_REFERENCE_WARNINGS NO)
 endif()
 configure_file(docs/reference/Doxyfile.in ${PROJECT_BINARY_DIR}/reference.doxyfile @ONLY)
-file(GLOB_RECURSE reference_sources CONFIGURE_DEPENDS include/kral/*.h docs/*.md docs/reference/* examples/*.c
+file(GLOB_RECURSE reference_sources CONFIGURE_DEPENDS include/kral/*.h* docs/*.md docs/reference/* examples/*.c
   examples/*.cpp examples/*.cs python/README.md)
 add_custom_command(OUTPUT ${KRAL_REFERENCE_DIR}/html/index.html
   COMMAND ${CMAKE_COMMAND} -E rm -rf ${KRAL_REFERENCE_DIR}

@@ -3,8 +3,8 @@
 
 A header gets what the description of the interface (bindings/describe.py) knows beside its comments: parameters that
 are told elsewhere, constants of a list that is told at its first, sections, and for each function an example: the first
-snippet of the example folder that calls it. A page gets links that lead to pages of the reference, not to files.
-A function without an example names a file that is not there, of which Doxygen complains.
+snippet of the example folder that calls it. Classes keep what is public. A page gets links that lead to pages of the
+reference, not to files. A function without an example names a file that is not there, of which Doxygen complains.
 """
 import json
 import pathlib
@@ -110,10 +110,11 @@ def page_of(target: str, anchor: str) -> str:
         return "@ref python_package" if path.parent.name == "python" else "index.html"
     if path.suffix == ".md":
         return f"@ref {path.stem}-{anchor}" if anchor else f"@ref {path.stem}_page"
-    if path.suffix == ".h":
+    if path.suffix in (".h", ".hpp"):
         return path.name.replace("_", "__").replace(".", "_8") + ".html"
-    if path.suffix == ".c" and "examples" in path.parts:
-        return path.name.replace(".", "_8") + "-example.html"
+    if "examples" in path.parts and path.suffix in (".c", ".cpp", ".cs"):
+        inner = "/".join(path.parts[path.parts.index("examples") + 1:])
+        return inner.replace("/", "_2").replace(".", "_8") + "-example.html"
     return ""
 
 
@@ -142,6 +143,9 @@ def main() -> int:
     description_file, folder, name = (pathlib.Path(word) for word in sys.argv[1:])
     if name.suffix == ".h":
         print(header(name, json.loads(description_file.read_text(encoding="utf-8")), snippets(folder)))
+    elif name.suffix == ".hpp":
+        # What is private Doxygen leaves out, but not its heading.
+        print(re.sub(r"^ private:\n.*?(?=^};)", "", name.read_text(encoding="utf-8"), flags=re.MULTILINE | re.DOTALL))
     elif name.suffix == ".md":
         print(page(name))
     else:
