@@ -191,6 +191,8 @@ class Diag_FTM {
   void EndCollection();
   bool IsLoopbackAnswered();
   bool IsVersionAnswered();
+  template <class SendOnce>
+  Reply OverOpenPort(SendOnce send);
   Reply SendThroughServer(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
                           uint32_t time_out_ms);
   Reply Noted(Reply reply, std::span<const uint8_t> request, uint32_t time_out_ms);

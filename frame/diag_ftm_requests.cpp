@@ -21,6 +21,16 @@ bool MayComeLater(const Reply& reply) {
 
 }  // namespace
 
+// Between two requests a cable may be pulled and plugged in again sooner than anybody has noticed: where nothing of the
+// request has gone to the device that was, it goes to the one that is.
+template <class SendOnce>
+Reply Diag_FTM::OverOpenPort(SendOnce send) {
+  if (!IsPortOpen()) return ReplyKind::kPortClosed;
+  Reply reply = send();
+  if (reply.kind() == ReplyKind::kGoneUnsent && IsPortOpen()) reply = send();
+  return reply.kind() == ReplyKind::kGoneUnsent ? ReplyKind::kGone : reply;
+}
+
 Reply Diag_FTM::Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
   const auto request = packet.request();
   if (request.empty()) {
@@ -35,12 +45,11 @@ Reply Diag_FTM::Send(CDiagPacket& packet, uint32_t time_out_ms, uint32_t delay_m
 
 Reply Diag_FTM::SendSync(std::span<const uint8_t> request, std::span<uint8_t> room, uint8_t expected_code,
                          uint32_t time_out_ms, uint32_t delay_ms, const ReplyTest& is_own) {
-  if (!IsPortOpen()) {
-    log().WriteLine(kLogErr, "Error. Port %d is not open.", port());
-    return Noted(ReplyKind::kPortClosed, request, time_out_ms);
-  }
-  const Reply reply = server_mode() ? SendThroughServer(request, room, expected_code, time_out_ms)
-                                    : transport().SendSync(request, room, expected_code, time_out_ms, delay_ms, is_own);
+  const Reply reply = OverOpenPort([&] {
+    return server_mode() ? SendThroughServer(request, room, expected_code, time_out_ms)
+                         : transport().SendSync(request, room, expected_code, time_out_ms, delay_ms, is_own);
+  });
+  if (reply.kind() == ReplyKind::kPortClosed) log().WriteLine(kLogErr, "Error. Port %d is not open.", port());
   if (MayComeLater(reply)) OweAnswer();
   if (const char* const refusal = RefusalText(reply.refusal())) log().WriteLine(kLogErr, "ERROR:\t%s", refusal);
   return Noted(reply, request, time_out_ms);
@@ -54,13 +63,13 @@ Reply Diag_FTM::AwaitNext(CDiagPacket& packet, uint32_t time_out_ms, const Reply
 }
 
 Reply Diag_FTM::SendRaw(std::span<const uint8_t> request, std::span<uint8_t> room, uint32_t time_out_ms) {
-  const Reply reply = IsPortOpen() ? transport().SendRaw(request, room, time_out_ms) : ReplyKind::kPortClosed;
+  const Reply reply = OverOpenPort([&] { return transport().SendRaw(request, room, time_out_ms); });
   if (MayComeLater(reply)) OweAnswer();
   return Noted(reply, request, time_out_ms);
 }
 
 Reply Diag_FTM::SendASync(std::span<const uint8_t> request, uint32_t time_out_ms, bool start_flag) {
-  const Reply reply = IsPortOpen() ? transport().SendASync(request, time_out_ms, start_flag) : ReplyKind::kPortClosed;
+  const Reply reply = OverOpenPort([&] { return transport().SendASync(request, time_out_ms, start_flag); });
   return Noted(reply, request, time_out_ms);
 }
 
@@ -68,7 +77,6 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms) {
   if (!answer_owed_ || !(resynchronise_ || resynchronising_ > 0) || server_mode() || !framed_) {
     return ReplyKind::kExpected;
   }
-  if (!IsPortOpen()) return Noted(ReplyKind::kPortClosed, kLoopbackRequest, time_out_ms);
   std::array<uint8_t, 6> loopback{kLoopbackRequest[0], 'S'};  // the liveness check's has other content
   StoreLe(loopback, 2, ++loopbacks_);
   const ReplyTest is_own = [&](std::span<const uint8_t> reply) {
@@ -76,7 +84,9 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms) {
   };
   std::array<uint8_t, kMaximumPacket> room;
   const uint32_t start = clock_.TickMs();
-  Reply reply = transport().SendSync(loopback, room, loopback[0], time_out_ms, 0, is_own);
+  Reply reply =
+      OverOpenPort([&] { return transport().SendSync(loopback, room, loopback[0], time_out_ms, 0, is_own); });
+  if (reply.kind() == ReplyKind::kPortClosed) return Noted(reply, kLoopbackRequest, time_out_ms);
   while (reply.kind() == ReplyKind::kOther) {
     // A handset that does not know the loopback refuses it, and repeats it: that tells as well.
     if (reply.refusal() != 0 && reply.bytes().size() > loopback.size() &&

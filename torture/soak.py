@@ -147,7 +147,7 @@ def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Threa
         bench.note("most memory, KiB", now["memory"])
         bench.note("most descriptors", now["descriptors"])
         bench.note("most threads", now["threads"])
-        hung = [station for station in stations if at - station.began > _LONGEST_DEED_S]
+        hung = [station for station in stations if not station.wrong and at - station.began > _LONGEST_DEED_S]
         if hung and at < end + _LONGEST_DEED_S:
             return [f"{len(hung)} handsets hang"]
         if at > end:

@@ -74,6 +74,20 @@ TEST_F(PortStates, UnplugInIdleClosesThePortAndTheNextRequestOpensItAgain) {
   }
 }
 
+// Also where it was unplugged in the moment after a reply, and nobody has looked at the port since.
+TEST_F(PortStates, TheFirstRequestOfAPortThatIsBackIsAnswered) {
+  for (const uint8_t receive_mode : {0, 1}) {
+    const KRAL_HANDLE handle = KRAL_ConnectServer(kWatchedPort);
+    KRAL_SetReceiveMode(handle, receive_mode);
+    for (int time = 0; time < 10; ++time) {
+      ASSERT_EQ(KRAL_IsPhoneConnected(handle), 1) << int{receive_mode} << ", " << time;
+      handset_.HangUp();
+      handset_.PlugIn();
+    }
+    KRAL_DisconnectServer(handle);
+  }
+}
+
 TEST_F(PortStates, UnplugEndsEveryWaitAtOnce) {
   static constexpr uint8_t kRequest = 0x26;
   const auto send_sync = [](KRAL_HANDLE handle) {

@@ -3,6 +3,7 @@
 #ifndef KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 #define KRAL_TESTS_SUPPORT_HANDSET_PORTS_H
 
+#include <atomic>
 #include <functional>
 #include <set>
 
@@ -97,20 +98,30 @@ class HandsetPorts {
       state_->open.erase(port_);
     }
     size_t Write(std::span<const uint8_t> bytes, uint32_t) override {
-      return handset_->FromHost(bytes) ? bytes.size() : 0;
+      return !HasLost() && handset_->FromHost(bytes) ? bytes.size() : 0;
     }
-    size_t Read(std::span<uint8_t> buffer) override { return handset_->ToHost(buffer); }
-    bool gone() const override { return handset_->vanished() || handset_->appearances() != appearance_; }
+    size_t Read(std::span<uint8_t> buffer) override { return HasLost() ? 0 : handset_->ToHost(buffer); }
+    bool gone() const override { return gone_; }
     // In slices: unlike a real one, the handset does not tell this of its going.
-    bool WaitReadable(uint32_t milliseconds) override { return handset_->WaitForOutput(std::min(milliseconds, 20u)); }
+    bool WaitReadable(uint32_t milliseconds) override {
+      const bool readable = handset_->WaitForOutput(std::min(milliseconds, 20u));
+      return !HasLost() && readable;
+    }
     void Wake() override { handset_->Wake(); }
     void PurgeInput() override { handset_->DropOutput(); }
 
    private:
+    // A device is known to be gone only once somebody has used it.
+    bool HasLost() {
+      if (handset_->vanished() || handset_->appearances() != appearance_) gone_ = true;
+      return gone_;
+    }
+
     const std::shared_ptr<State> state_;
     const std::shared_ptr<handset::VirtualHandset> handset_;
     const uint32_t appearance_;
     const uint16_t port_;
+    std::atomic<bool> gone_ = false;
   };
 
   static std::unique_ptr<SerialDevice> Open(const std::shared_ptr<State>& state, int number, DeviceResult& result) {

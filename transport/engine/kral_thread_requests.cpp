@@ -130,7 +130,8 @@ std::optional<Packet> CKralThreadInterface::PopWithin(std::chrono::milliseconds 
 }
 
 ReplyKind CKralThreadInterface::WhyNotWritten() const {
-  return port_.gone() ? ReplyKind::kGone : ReplyKind::kWriteFailed;
+  if (!port_.gone()) return ReplyKind::kWriteFailed;
+  return port_.may_have_sent() ? ReplyKind::kGone : ReplyKind::kGoneUnsent;
 }
 
 ReplyKind CKralThreadInterface::WhyNoReply() const {

@@ -19,6 +19,7 @@ enum class ReplyKind : uint8_t {
   kAborted,      // the caller's abort ended the wait
   kWriteFailed,  // the port did not take the request
   kPortClosed,   // not sent: the port cannot be opened
+  kGoneUnsent,   // not sent: the device had vanished before
   kNullPort,     // not sent: there is no handset behind the null port
   kNotSent,      // held back by the library itself
 };

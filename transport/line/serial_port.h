@@ -80,6 +80,8 @@ class CSerialPort {
   bool user_defined() const;
   // The device vanished under the open port, and has not been there since.
   bool gone() const;
+  // Whether the device, or the caller, may have taken bytes of the last Send. For the thread that sends.
+  bool may_have_sent() const { return may_have_sent_; }
   // True when this call has closed the port, because its device is gone. At once, and not with the next request: a
   // device that comes back is the same one again only where nobody holds the old one any more.
   bool CloseIfGone();
@@ -123,6 +125,7 @@ class CSerialPort {
   std::atomic<PortContent> content_{PortContent::kFrames};
   std::atomic<bool> open_{false};
   std::atomic<bool> user_defined_{false};
+  std::atomic<bool> may_have_sent_{false};
   std::atomic<int32_t> last_error_{kPortOk};
   std::atomic<uint32_t> baud_rate_{0};
   std::atomic<uint32_t> write_timeout_{300};

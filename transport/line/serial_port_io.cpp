@@ -59,6 +59,7 @@ void CSerialPort::Tell(PortDirection direction, std::span<const uint8_t> bytes) 
 
 uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_t& sent) {
   const auto device = Device();
+  may_have_sent_ = false;
   const uint32_t limit = write_size_limit_;
   if (!device || limit == 0) return 0;
   const uint32_t start = clock_.TickMs();
@@ -70,6 +71,7 @@ uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_
     const size_t written = device->Write({bytes + sent, piece}, std::max(left, 1U));
     const auto taken = static_cast<uint32_t>(std::min<size_t>(written, piece));
     sent += taken;
+    may_have_sent_ = sent > 0;
     if (clock_.TickMs() - start > time_out) {
       // A late write counts as failed even if everything was written: the reply could no longer be told from the
       // next request's.
@@ -84,6 +86,7 @@ uint32_t CSerialPort::SendToDevice(const uint8_t* bytes, uint32_t count, uint32_
 }
 
 uint32_t CSerialPort::SendToUser(const uint8_t* bytes, uint32_t count, uint32_t& sent) {
+  may_have_sent_ = true;
   const UserTransport user = User();
   if (user.send == nullptr) return 1;  // "one byte" without moving any
   uint32_t written = count;
