@@ -78,6 +78,21 @@ class Diag_FTM {
   // Held for a whole operation by ExportCall::Run; recursive, so that operations may be built from operations.
   std::recursive_mutex& request_lock() { return request_lock_; }
 
+  // One call of the caller's, under that lock: where the cable was pulled and plugged in again before it, sooner than
+  // anybody has noticed, its first request goes to the device that is there now. Further ones, and those of jobs, fail
+  // as lost: half of a transfer must not go to whoever came back.
+  class Call {
+   public:
+    explicit Call(Diag_FTM& phone) : lock_(phone.request_lock_), phone_(phone) { phone_.at_calls_begin_ = true; }
+    ~Call() { phone_.at_calls_begin_ = false; }
+    Call(const Call&) = delete;
+    Call& operator=(const Call&) = delete;
+
+   private:
+    const std::lock_guard<std::recursive_mutex> lock_;
+    Diag_FTM& phone_;
+  };
+
   // The default buffer of all commands; by index 1 that of EFS2 requests beside one under way, and 2, which is spare.
   CDiagPacket& packet(size_t index = 0) { return packets_[index]; }
 
@@ -212,6 +227,7 @@ class Diag_FTM {
   UserTransport user_;  // of the last explicit open
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
+  bool at_calls_begin_ = false;       // no request of the caller's call has been sent
   bool answer_owed_ = false;          // by the handset, to a request that was given up
   uint32_t owed_since_ = 0;
   uint32_t resynchronising_ = 0;

@@ -1,6 +1,7 @@
 // Sends the requests of a phone object, over its transport or through the phone server; names refusals in the log.
 #include <algorithm>
 #include <array>
+#include <utility>
 #include <vector>
 
 #include "base/little_endian.h"
@@ -21,13 +22,13 @@ bool MayComeLater(const Reply& reply) {
 
 }  // namespace
 
-// Between two requests a cable may be pulled and plugged in again sooner than anybody has noticed: where nothing of the
-// request has gone to the device that was, it goes to the one that is.
+// See Diag_FTM::Call.
 template <class SendOnce>
 Reply Diag_FTM::OverOpenPort(SendOnce send) {
+  const bool may_be_another = std::exchange(at_calls_begin_, false);
   if (!IsPortOpen()) return ReplyKind::kPortClosed;
   Reply reply = send();
-  if (reply.kind() == ReplyKind::kGoneUnsent && IsPortOpen()) reply = send();
+  if (reply.kind() == ReplyKind::kGoneUnsent && may_be_another && IsPortOpen()) reply = send();
   return reply.kind() == ReplyKind::kGoneUnsent ? ReplyKind::kGone : reply;
 }
 
@@ -84,8 +85,7 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms) {
   };
   std::array<uint8_t, kMaximumPacket> room;
   const uint32_t start = clock_.TickMs();
-  Reply reply =
-      OverOpenPort([&] { return transport().SendSync(loopback, room, loopback[0], time_out_ms, 0, is_own); });
+  Reply reply = OverOpenPort([&] { return transport().SendSync(loopback, room, loopback[0], time_out_ms, 0, is_own); });
   if (reply.kind() == ReplyKind::kPortClosed) return Noted(reply, kLoopbackRequest, time_out_ms);
   while (reply.kind() == ReplyKind::kOther) {
     // A handset that does not know the loopback refuses it, and repeats it: that tells as well.

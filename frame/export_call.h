@@ -46,7 +46,7 @@ class ExportCall {
   template <class Operation, class... Arguments>
   uint8_t Run(Operation&& operation, Arguments&&... arguments) {
     return Result(uint8_t{0}, uint8_t{0}, uint8_t{1}, [&](Diag_FTM& phone) -> uint8_t {
-      const std::lock_guard lock(phone.request_lock());
+      const Diag_FTM::Call call(phone);
       return std::invoke(operation, phone, std::forward<Arguments>(arguments)...) ? 1 : 0;
     });
   }

@@ -25,7 +25,7 @@ uint32_t OnTool(KRAL_HANDLE handle, const char* function, Operation&& operation)
       ExportCall(handle, function)
           .Result(NvError::kNoConnection, NvError::kUnknown, NvError::kNone, [&](Diag_FTM& phone) {
             const auto tool = Kral_ResourceManager::GetFamily<NVTool_Manager>(handle, FamilySlot::kNvManager, MakeTool);
-            const std::lock_guard lock(phone.request_lock());
+            const Diag_FTM::Call call(phone);
             if (tool && tool->is_moving()) {
               Fail(Failure(KRAL_ERROR_ARGUMENT, "the NV tool is moving a set, and takes no calls from its callback"));
               return NvError::kUnknown;

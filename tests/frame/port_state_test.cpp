@@ -76,6 +76,7 @@ TEST_F(PortStates, UnplugInIdleClosesThePortAndTheNextRequestOpensItAgain) {
 
 // Also where it was unplugged in the moment after a reply, and nobody has looked at the port since.
 TEST_F(PortStates, TheFirstRequestOfAPortThatIsBackIsAnswered) {
+  ports_.TellLate();
   for (const uint8_t receive_mode : {0, 1}) {
     const KRAL_HANDLE handle = KRAL_ConnectServer(kWatchedPort);
     KRAL_SetReceiveMode(handle, receive_mode);

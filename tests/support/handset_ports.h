@@ -59,6 +59,8 @@ class HandsetPorts {
     const std::lock_guard lock(state_->mutex);
     state_->before_open = std::move(call);
   }
+  // Devices are known to be gone only once they have been used, as real ones are.
+  void TellLate() { state_->tells_late = true; }
   void SetCanList(bool can) {
     const std::lock_guard lock(state_->mutex);
     state_->can_list = can;
@@ -87,6 +89,7 @@ class HandsetPorts {
     std::vector<uint16_t> opens;
     std::set<uint16_t> open;
     std::function<void(uint16_t)> before_open;
+    std::atomic<bool> tells_late = false;
   };
 
   class Device final : public FakeDevice {
@@ -101,7 +104,7 @@ class HandsetPorts {
       return !HasLost() && handset_->FromHost(bytes) ? bytes.size() : 0;
     }
     size_t Read(std::span<uint8_t> buffer) override { return HasLost() ? 0 : handset_->ToHost(buffer); }
-    bool gone() const override { return gone_; }
+    bool gone() const override { return state_->tells_late ? gone_.load() : IsElsewhere(); }
     // In slices: unlike a real one, the handset does not tell this of its going.
     bool WaitReadable(uint32_t milliseconds) override {
       const bool readable = handset_->WaitForOutput(std::min(milliseconds, 20u));
@@ -111,9 +114,9 @@ class HandsetPorts {
     void PurgeInput() override { handset_->DropOutput(); }
 
    private:
-    // A device is known to be gone only once somebody has used it.
+    bool IsElsewhere() const { return handset_->vanished() || handset_->appearances() != appearance_; }
     bool HasLost() {
-      if (handset_->vanished() || handset_->appearances() != appearance_) gone_ = true;
+      gone_ = gone_ || (state_->tells_late && IsElsewhere());
       return gone_;
     }
 
