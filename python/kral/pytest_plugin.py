@@ -17,6 +17,8 @@ from kral.sim import SimulatedHandset
 
 # COM numbers that serial ports of the machine hardly reach.
 _numbers = itertools.cycle(range(200, 250))
+# A busy machine may leave a new process without a processor for a moment.
+_START_S = 5.0
 
 
 def pytest_configure(config: Any) -> None:
@@ -36,7 +38,7 @@ def handset(request: Any) -> Iterator[SimulatedHandset]:
         raise pytest.UsageError(f"the marker handset does not know {', '.join(named)}")
     with SimulatedHandset(next(_numbers), *options) as simulated:
         if files:
-            with connect(simulated.port) as phone:
+            with connect(simulated.port, _START_S) as phone:
                 for path, data in files.items():
                     if "/" in path.strip("/"):
                         phone.files.mkdir(path.rpartition("/")[0], parents=True)
@@ -47,5 +49,5 @@ def handset(request: Any) -> Iterator[SimulatedHandset]:
 @pytest.fixture
 def phone(handset: SimulatedHandset) -> Iterator[Phone]:  # pylint: disable=redefined-outer-name
     """A connection to the simulated handset."""
-    with connect(handset.port) as connected:
+    with connect(handset.port, _START_S) as connected:
         yield connected
