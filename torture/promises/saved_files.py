@@ -15,7 +15,7 @@ import signal
 import subprocess
 import threading
 import time
-from typing import List, Optional, Union
+from typing import Dict, List, Optional, Union
 
 from torture import calls
 from torture.bench import LINUX, WINDOWS, Bench, check
@@ -24,7 +24,7 @@ from torture.peer.codec import frame
 from torture.peer.line import PtyLine
 from torture.peer.phone import Phone, log
 from torture.windows.process import Process, windows_path
-from torture.written_files import GROWS, NONE, REPLACED, WRITERS, Writer
+from torture.written_files import GROWS, NONE, REPLACED, SERIES, WRITERS, Writer
 
 NUMBER = 11
 TITLE = "Killed, full disk, hostile names: nothing lost"
@@ -39,12 +39,16 @@ _MOMENTS_SHORT = 3
 _LONGEST_S = 60.0
 _OLD = b"what was there before" * 50
 _OLD_SLOTS = b"1 COM1\n"
+_CAPTURE_BEGIN = b"KRALCAP\x1a"
 _NEW = bytes(range(256)) * 150
 # With every signal; the others are stopped by one that lets them tidy up, and by the one that does not.
 _EVERY_SIGNAL = ("get", "put", "back-up", "capture")
 _SIGNALS = ("INT", "TERM", "HUP", "QUIT", "KILL")
 # These leave a program no time to tidy up.
 _AT_ONCE_DEAD = ("QUIT", "KILL")
+# An exit code, and the bytes without which a file is none.
+_BAD_FILE, _LONGEST_HEAD = 10, 256
+_TOO_LITTLE = (b"cannot be written", b"lines are lost", b"does not hold everything", b"of the packets are not in")
 _LIBC = ctypes.CDLL(None)
 _PR_CAPBSET_DROP, _CAP_DAC_OVERRIDE = 24, 1
 _NAMES = ("../evil", "../../evil", "/evil", "..", ".", "a/../../evil", "evil\\..\\evil", "\x1b[31mevil", "evil\n",
@@ -61,7 +65,6 @@ class _Desk:
         self.writer = WRITERS.get(name.split("/")[0], Writer(()))
         self.folder = bench.folder / name.replace("/", "-")
         self.folder.mkdir()
-        self.target = self.folder / "target"
         self.source = self.folder / "source"
         self.phone = calls.prepare(Phone(calls.SERIAL))
         self.phone.files.put("/data/large", _NEW)
@@ -82,12 +85,15 @@ class _Desk:
             process = self.run(self.writer.command(self.port, words))
             text = finish(process)
             check(process.returncode == 0, f"{' '.join(words)} exited with {process.returncode}: {text[-300:]!r}")
-        self._inputs |= {path.name for path in self.folder.iterdir()} - {"target"}
-        if self.writer.kind != GROWS or "capture" not in self.writer.words:
+        self._inputs |= {path.name for path in self.folder.iterdir()} - set(self.targets())
+        if "capture" not in self.writer.words:
             self.line.drop_pieces()
 
     def reset(self) -> None:
-        self.target.write_bytes(_OLD_SLOTS if self.writer.words[:1] == ("ports",) else _OLD)
+        for name in self.targets():
+            (self.folder / name).unlink()
+        for name in self.writer.before:
+            (self.folder / name).write_bytes(_OLD_SLOTS if self.writer.words[:1] == ("ports",) else _OLD)
         self.source.write_bytes(_NEW)
         self.phone.files.put("/data/target", _OLD)
 
@@ -120,12 +126,17 @@ class _Desk:
               f"undisturbed it exited with {process.returncode}: {text.decode()[-300:]}")
         return time.monotonic() - begin
 
-    def old(self) -> bytes:
+    def targets(self) -> Dict[str, bytes]:
+        """What it writes, as far as it is there."""
+        found = sorted(path for path in self.folder.glob(self.writer.writes) if not path.name.endswith(".tmp"))
+        return {path.name: path.read_bytes() for path in found}
+
+    def old(self) -> Dict[str, bytes]:
         self.reset()
-        return self.target.read_bytes()
+        return self.targets()
 
     def left_over(self) -> List[str]:
-        known = self._inputs | {"target", *self.writer.stays}
+        known = self._inputs | {*self.targets(), *self.writer.stays}
         return sorted(path.name for path in self.folder.iterdir() if path.name not in known)
 
 
@@ -135,7 +146,7 @@ def cases(bench: Bench) -> List[str]:
     # A caller of the library that is no tool of ours has nothing that tidies up.
     killed = [f"{name}/{what}" for name, writer in WRITERS.items() for what in _SIGNALS
               if name in _EVERY_SIGNAL or what == "KILL" or (what == "TERM" and not writer.call)]
-    full = [f"{name}/{what}" for name, writer in WRITERS.items() if writer.kind == REPLACED
+    full = [f"{name}/{what}" for name, writer in WRITERS.items() if writer.kind != NONE
             for what in ("full", "read-only")]
     return killed + full + ["names/get"]
 
@@ -168,7 +179,7 @@ def finish(process: _Program) -> bytes:
 
 def _killed(bench: Bench, desk: _Desk, operation: str, what: str) -> None:
     seconds = desk.whole_run()
-    whole = desk.target.read_bytes()
+    whole = desk.targets()
     numbers = bench.random(f"{operation}/{what}")
     moments = _MOMENTS if bench.driver is None else _MOMENTS_WINDOWS
     for _ in range(_MOMENTS_SHORT if bench.short else moments):
@@ -185,28 +196,75 @@ def _killed(bench: Bench, desk: _Desk, operation: str, what: str) -> None:
         bench.count("of them in time", int(process.returncode != desk.writer.exit_code))
 
 
-def _judge(desk: _Desk, what: str, whole: bytes, where: str) -> None:
-    target = desk.target.read_bytes()
+def _judge(desk: _Desk, what: str, whole: Dict[str, bytes], where: str) -> None:
+    targets = desk.targets()
     left = desk.left_over()
     old = desk.old()
+    at_once = what in _AT_ONCE_DEAD
     if desk.writer.kind == NONE:
-        check(desk.source.read_bytes() == _NEW and target == old, f"a file of the PC has changed; {where}")
+        check(desk.source.read_bytes() == _NEW and targets == old, f"a file of the PC has changed; {where}")
         on_handset = desk.phone.files.files.get("/data/target")
         # Killed at once, the tool cannot remove the part that is there.
-        check(what in _AT_ONCE_DEAD or on_handset in (None, _OLD, _NEW),
+        check(at_once or on_handset in (None, _OLD, _NEW),
               f"{len(on_handset or b'')} bytes of {len(_NEW)} are on the handset; {where}")
-    elif desk.writer.kind == GROWS:
-        check(target == old or _no_digits(whole[:8]).startswith(_no_digits(target[:8])),
-              f"what is there does not begin as it should; {where}")
+    elif desk.writer.kind == REPLACED:
+        _judge_replaced(targets, old, whole, where)
     else:
-        check(target == old or same(target, whole),
-              f"the target has {len(target)} bytes, neither the old nor the new ones; {where}")
-    if "capture" in desk.writer.words and target != old and len(target) >= 16:
-        desk.target.write_bytes(target)
-        check(_is_readable(desk), f"the capture cannot be read; {where}")
-    check(what in _AT_ONCE_DEAD or not left, f"{left} are left; {where}")
+        _judge_grown(desk, targets, old, whole, where, may_be_cut=at_once)
+    check(at_once or not left, f"{left} are left; {where}")
     for name in left:
         (desk.folder / name).unlink()
+
+
+def _judge_replaced(targets: Dict[str, bytes], old: Dict[str, bytes], whole: Dict[str, bytes], where: str, *,
+                    disk: Optional[int] = None) -> None:
+    """`disk`: a file that is longer has not come."""
+    check(set(old) <= set(targets), f"{set(old) - set(targets)} are no longer there; {where}")
+    for name, bytes_there in targets.items():
+        may_be_new = name in whole and (disk is None or len(whole[name]) <= disk)
+        check(bytes_there == old.get(name) or (may_be_new and _same(bytes_there, whole[name])),
+              f"{name} has {len(bytes_there)} bytes, neither the old nor the new ones; {where}")
+
+
+def _judge_grown(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes], whole: Dict[str, bytes], where: str, *,
+                 may_be_cut: bool) -> None:
+    begin = _no_digits(next(iter(whole.values()))[:8]) if desk.writer.kind == GROWS else _CAPTURE_BEGIN
+    new = {name: there for name, there in targets.items() if there != old.get(name)}
+    if desk.writer.kind == SERIES:
+        _judge_series(desk, targets, old, where)
+    for name, there in new.items():
+        check(begin.startswith(_no_digits(there[:8])), f"{name} does not begin as it should; {where}")
+        # Only the last of a series may still have been written.
+        if "capture" in desk.writer.words and (len(there) >= 16 or name != max(new)):
+            _check_capture(desk, there, f"{name}; {where}", may_be_cut=may_be_cut and name == max(new))
+
+
+def _judge_series(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes], where: str) -> None:
+    """All of former runs is there, or what is to be kept of all, the latest, and no number is missing."""
+    numbers = [int(name.rpartition("-")[2]) for name in targets]
+    check(numbers == list(range(numbers[0], numbers[0] + len(numbers))), f"{list(targets)} are there; {where}")
+    check(all(targets.get(name, there) == there for name, there in old.items()), f"one of before is another; {where}")
+    if desk.writer.keep == 0:
+        check(set(old) <= set(targets), f"one of before is no longer there; {where}")
+    else:  # the next file begins before the oldest goes
+        check(desk.writer.keep <= len(targets) <= desk.writer.keep + 1, f"{list(targets)} are there; {where}")
+
+
+def _check_capture(desk: _Desk, capture: bytes, where: str, *, may_be_cut: bool) -> None:
+    file = desk.folder / "looked-at"
+    file.write_bytes(capture)
+    process = desk.run(desk.writer.command(desk.port, ("log", "play", file.name)))
+    text = finish(process)
+    file.unlink()
+    check(process.returncode == 0, f"the capture cannot be read: {text[-200:]!r}; {where}")
+    check(may_be_cut or b"is cut" not in text, f"the capture is cut; {where}")
+
+
+def _same(first: bytes, second: bytes) -> bool:
+    """But for the times in a report."""
+    if first.startswith(b"<!DOCTYPE html>"):
+        return re.sub(rb"[0-9.]+", b"0", first) == re.sub(rb"[0-9.]+", b"0", second)
+    return same(first, second)
 
 
 def _no_digits(text: bytes) -> bytes:
@@ -214,40 +272,69 @@ def _no_digits(text: bytes) -> bytes:
     return re.sub(rb"[0-9]", b"0", text)
 
 
-def _is_readable(desk: _Desk) -> bool:
-    process = desk.run(desk.writer.command(desk.port, ("log", "play", "target")))
-    finish(process)
-    return process.returncode == 0
-
-
 def _full_disk(bench: Bench, desk: _Desk) -> None:
-    """No file may become longer than so many bytes; the last limit is all but enough."""
+    """No file may become longer than so many bytes; the last limit is all but enough, for what has one length."""
     desk.whole_run()
-    whole = desk.target.read_bytes()
-    limits = {0, 1, 100, 516, 4096, len(whole) // 2, len(whole) - 1}
-    for disk in sorted(limit for limit in limits if limit < len(whole)):
-        _refused(desk, f"room for {disk} of {len(whole)} bytes", disk=disk)
+    whole = {name: there for name, there in desk.targets().items() if there != _OLD}
+    length = max(map(len, whole.values()))
+    # What grows is not of the same length twice.
+    limits = {0, 1, 100, 516, 4096, length // 2, *([length - 1] if desk.writer.kind == REPLACED else [])}
+    for disk in sorted(limit for limit in limits if limit < length):
+        what = f"room for {disk} of {length} bytes"
+        if desk.writer.kind == REPLACED:
+            _refused(desk, whole, what, disk=disk)
+        else:
+            _has_too_little(desk, whole, what, disk)
         bench.count("full disks")
+
+
+def _has_too_little(desk: _Desk, whole: Dict[str, bytes], what: str, disk: int) -> None:
+    """What there is room for is there, and it is told that it is not all."""
+    desk.reset()
+    process = desk.start(disk=disk)
+    text = finish(process)
+    where = f"{what}, exit code {process.returncode}: {text.decode()[-200:]}"
+    is_all = "capture" in desk.writer.words
+    # What accompanies a command is refused if it cannot even begin.
+    expected = ([] if is_all else [desk.writer.exit_code]) + ([_BAD_FILE] if is_all or disk < _LONGEST_HEAD else [])
+    check(process.returncode in expected, f"another exit code; {where}")
+    check(any(said in text for said in _TOO_LITTLE), f"it does not say that something is missing; {where}")
+    _judge_grown(desk, desk.targets(), desk.old(), whole, where, may_be_cut=True)
 
 
 def _read_only_folder(bench: Bench, desk: _Desk) -> None:
     desk.whole_run()
+    whole = desk.targets()
     desk.reset()
     desk.folder.chmod(0o555)
     try:
-        _refused(desk, "a folder that may not be written")
+        if desk.writer.kind == GROWS:
+            _written_anyway(desk, whole)
+        else:
+            _refused(desk, whole, "a folder that may not be written", disk=-1)
     finally:
         desk.folder.chmod(0o755)
     bench.count("read-only folders")
 
 
-def _refused(desk: _Desk, what: str, *, disk: Optional[int] = None) -> None:
+def _written_anyway(desk: _Desk, whole: Dict[str, bytes]) -> None:
+    process = desk.start()
+    text = finish(process)
+    targets = desk.targets()
+    where = f"a folder that may not be written, exit code {process.returncode}: {text.decode()[-200:]}"
+    check(process.returncode == desk.writer.exit_code, f"another exit code; {where}")
+    desk.folder.chmod(0o755)
+    _judge_grown(desk, targets, desk.old(), whole, where, may_be_cut=False)
+
+
+def _refused(desk: _Desk, whole: Dict[str, bytes], what: str, *, disk: int) -> None:
+    """Files cannot be longer than `disk`; with -1 none can be made."""
     old = desk.old()
-    process = desk.start(disk=disk)
+    process = desk.start(disk=disk if disk >= 0 else None)
     text = finish(process)
     where = f"{what}, exit code {process.returncode}: {text.decode()[-200:]}"
     check(process.returncode is not None and process.returncode > 0, f"it says that all is well; {where}")
-    check(desk.target.read_bytes() == old, f"the old file is lost; {where}")
+    _judge_replaced(desk.targets(), old, whole, where, disk=disk)
     check(not desk.left_over(), f"{desk.left_over()} are left; {where}")
 
 
