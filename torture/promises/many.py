@@ -1,14 +1,15 @@
 """Fifty handsets in one process, a thread for each: connects, requests, disconnects, every answer of the right one."""
 from __future__ import annotations
 
+import contextlib
 import random
 import struct
+import threading
 from typing import Any, Dict, List
 
 import kral
 from torture import calls
 from torture.bench import CONTEXTS, LINUX, MODES, WINDOWS, Bench, check, connected
-from torture.peer.line import Line
 from torture.peer.phone import Phone
 
 NUMBER = 8
@@ -22,6 +23,10 @@ _ROUNDS_SHORT = 2
 _REQUESTS = 60
 _REQUESTS_SHORT = 20
 _FIRST_SERIAL = 0x80000100
+# All begin a round at the same moment, with short connects. One that runs alone waits for no longer.
+_IN_STEP = threading.Barrier(CONTEXTS)
+_LONGEST_STEP_S = 30.0
+_SHORT_CONNECTS = 10
 
 
 def cases(bench: Bench) -> List[str]:
@@ -51,9 +56,22 @@ def _expected(serial: int) -> Dict[str, Any]:
     }
 
 
-def _round(bench: Bench, line: Line, serial: int, numbers: random.Random) -> None:
+def _connect_shortly(bench: Bench, port: int, serial: int, mode: int) -> None:
+    phone = _phone(serial)
+    with contextlib.suppress(threading.BrokenBarrierError):
+        _IN_STEP.wait(_LONGEST_STEP_S)
+    for _ in range(_SHORT_CONNECTS):
+        with connected(bench.line(phone, port), mode, _TIME_OUT_MS) as handle:
+            result, value = calls.CALLS["serial"].run(handle)
+            check(result == 1 and value == serial, f"handset {serial:X}, a short connect: {result}, {value!r}")
+        bench.count("connects")
+
+
+def _round(bench: Bench, port: int, serial: int, numbers: random.Random) -> None:
     expected = _expected(serial)
     mode = numbers.choice(list(MODES.values()))
+    _connect_shortly(bench, port, serial, mode)
+    line = bench.line(_phone(serial), port)
     with connected(line, mode, _TIME_OUT_MS) as handle:
         for _ in range(_REQUESTS_SHORT if bench.short else _REQUESTS):
             name = numbers.choice(list(expected))
@@ -71,5 +89,9 @@ def run(bench: Bench, case: str) -> None:
     serial = _FIRST_SERIAL + int(case)
     numbers = bench.random(case)
     with bench.port() as port:
-        for _ in range(_ROUNDS_SHORT if bench.short else _ROUNDS):
-            _round(bench, bench.line(_phone(serial), port), serial, numbers)
+        try:
+            for _ in range(_ROUNDS_SHORT if bench.short else _ROUNDS):
+                _round(bench, port, serial, numbers)
+        except BaseException:
+            _IN_STEP.abort()
+            raise
