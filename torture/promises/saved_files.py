@@ -6,6 +6,7 @@ no room on the disk. What it was to replace is then the old or the new file, who
 from __future__ import annotations
 
 import ctypes
+import json
 import os
 import pathlib
 import re
@@ -15,7 +16,7 @@ import signal
 import subprocess
 import threading
 import time
-from typing import Dict, List, Optional, Union
+from typing import Dict, List, Optional, Tuple, Union
 
 from torture import calls
 from torture.bench import LINUX, WINDOWS, Bench, check
@@ -97,7 +98,7 @@ class _Desk:
         self.source.write_bytes(_NEW)
         self.phone.files.put("/data/target", _OLD)
 
-    def run(self, command: List[str], *, disk: Optional[int] = None) -> _Program:
+    def run(self, command: List[str], *, disk: Optional[int] = None, stdout: int = subprocess.DEVNULL) -> _Program:
         if self._driver is not None:
             tool = self.folder.parent / "kral.exe"
             if not tool.exists():
@@ -110,11 +111,13 @@ class _Desk:
             if disk is not None:
                 signal.signal(signal.SIGXFSZ, signal.SIG_IGN)
                 resource.setrlimit(resource.RLIMIT_FSIZE, (disk, disk))
-        return subprocess.Popen(command, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL, stderr=subprocess.PIPE,
+        return subprocess.Popen(command, stdin=subprocess.DEVNULL, stdout=stdout, stderr=subprocess.PIPE,
                                 preexec_fn=limit, cwd=self.folder, env={**os.environ, "KRAL_SLOTS": "target"})
 
     def start(self, *, disk: Optional[int] = None) -> _Program:
-        return self.run(self.writer.command(self.port), disk=disk)
+        is_counted = "capture" in self.writer.words and self._driver is None
+        return self.run(self.writer.command(self.port), disk=disk,
+                        stdout=subprocess.PIPE if is_counted else subprocess.DEVNULL)
 
     def whole_run(self) -> float:
         """Seconds that it takes when nothing disturbs it; the target is then the new one."""
@@ -171,10 +174,22 @@ def run(bench: Bench, case: str) -> None:
 
 
 def finish(process: _Program) -> bytes:
+    return outputs(process)[1]
+
+
+def outputs(process: _Program) -> Tuple[Optional[bytes], bytes]:
+    """What it printed, where that is looked at, and what it said."""
     try:
-        return process.communicate(timeout=_LONGEST_S)[1]
+        return process.communicate(timeout=_LONGEST_S)
     finally:
         process.kill()
+
+
+def _packets_told(output: bytes) -> int:
+    """What a capture that came to its end says is in its files."""
+    told = re.match(rb"([0-9]+) packets? in ", output)
+    check(told is not None, f"a capture ended with {output!r}")
+    return int(told[1]) if told else 0
 
 
 def _killed(bench: Bench, desk: _Desk, operation: str, what: str) -> None:
@@ -188,15 +203,16 @@ def _killed(bench: Bench, desk: _Desk, operation: str, what: str) -> None:
         moment = numbers.uniform(0, seconds)
         killer = threading.Timer(moment, process.send_signal, [getattr(signal, f"SIG{what}")])
         killer.start()
-        text = finish(process)
+        told, text = outputs(process)
         killer.cancel()
+        packets = _packets_told(told) if process.returncode == 0 and told is not None else None
         where = f"SIG{what} after {moment * 1000:.0f} of {seconds * 1000:.0f} ms, exit code {process.returncode}"
-        _judge(desk, what, whole, f"{where}: {text.decode(errors='replace')[-200:]}")
+        _judge(desk, what, whole, f"{where}: {text.decode(errors='replace')[-200:]}", packets)
         bench.count("kills")
         bench.count("of them in time", int(process.returncode != desk.writer.exit_code))
 
 
-def _judge(desk: _Desk, what: str, whole: Dict[str, bytes], where: str) -> None:
+def _judge(desk: _Desk, what: str, whole: Dict[str, bytes], where: str, told: Optional[int] = None) -> None:
     targets = desk.targets()
     left = desk.left_over()
     old = desk.old()
@@ -211,6 +227,10 @@ def _judge(desk: _Desk, what: str, whole: Dict[str, bytes], where: str) -> None:
         _judge_replaced(targets, old, whole, where)
     else:
         _judge_grown(desk, targets, old, whole, where, may_be_cut=at_once)
+        # Of those that are kept the first ones have gone.
+        if told is not None and desk.writer.keep == 0:
+            there = sum(_packets_in(desk, capture) for name, capture in targets.items() if capture != old.get(name))
+            check(there == told, f"{there} packets are there, not {told}; {where}")
     check(at_once or not left, f"{left} are left; {where}")
     for name in left:
         (desk.folder / name).unlink()
@@ -248,6 +268,15 @@ def _judge_series(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes],
         check(set(old) <= set(targets), f"one of before is no longer there; {where}")
     else:  # the next file begins before the oldest goes
         check(desk.writer.keep <= len(targets) <= desk.writer.keep + 1, f"{list(targets)} are there; {where}")
+
+
+def _packets_in(desk: _Desk, capture: bytes) -> int:
+    file = desk.folder / "looked-at"
+    file.write_bytes(capture)
+    process = desk.run(desk.writer.command(desk.port, ("--json", "log", "play", file.name)), stdout=subprocess.PIPE)
+    told, _ = outputs(process)
+    file.unlink()
+    return int(json.loads((told or b"").splitlines()[-1])["packets"])
 
 
 def _check_capture(desk: _Desk, capture: bytes, where: str, *, may_be_cut: bool) -> None:

@@ -36,13 +36,13 @@ class Process:
         self._handle, thread = struct.unpack_from("<II", info)
         driver.call("kernel32!CloseHandle", word(thread))
 
-    def communicate(self, timeout: float) -> Tuple[bytes, bytes]:
+    def communicate(self, timeout: float) -> Tuple[None, bytes]:
         waited, _ = self._driver.call("kernel32!WaitForSingleObject", word(self._handle), word(round(timeout * 1000)))
         if waited & 0xFFFFFFFF:
             raise Fault("a program does not end")
         _, (code,) = self._driver.call("kernel32!GetExitCodeProcess", word(self._handle), "b" + bytes(4).hex())
         self.returncode, = struct.unpack("<I", code)
-        return b"", b""
+        return None, b""
 
     def send_signal(self, number: int) -> None:
         assert number == signal.SIGKILL
