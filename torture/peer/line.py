@@ -25,6 +25,8 @@ from torture.peer.phone import Phone
 
 Behaviour = Callable[[bytes, "Line"], None]
 WORKS: Behaviour = lambda request, line: line.reply(request)  # noqa: E731
+# So often in turn a full driver takes nothing.
+_REFUSALS = 6
 
 
 class Line:
@@ -187,12 +189,20 @@ class PtyLine(Line):
     def block(self) -> None:
         """Nothing that the library writes is taken any more, and the driver's buffer is full."""
         self.reads = False
+        self._wake()
         other = os.open(self.device, os.O_RDWR | os.O_NOCTTY | os.O_NONBLOCK)
         try:
-            while True:
-                os.write(other, bytes(4096))
-        except BlockingIOError:
-            pass
+            # Where it has no room for much it may have some for a little, and goes on moving what it took: full is
+            # what takes not even a byte, and stays so.
+            refused = 0
+            while refused < _REFUSALS:
+                try:
+                    os.write(other, bytes(1 if refused else 4096))
+                    refused = min(refused, 1)
+                except BlockingIOError:
+                    refused += 1
+                    if refused > 1:
+                        time.sleep(0.005)
         finally:
             os.close(other)
 
