@@ -53,6 +53,7 @@ Failure Explain(Diag_FTM& phone, const Reply& reply, const char* command, uint32
       return Failure(KRAL_ERROR_LINK, "no undamaged answer to %s within %u ms: frames came with a wrong check", command,
                      time_out_ms);
     case ReplyKind::kGone:
+    case ReplyKind::kGoneUnsent:
       return Failure(KRAL_ERROR_LOST, "the handset on COM%d went away during %s", phone.port(), command);
     case ReplyKind::kAborted:
       return Failure(KRAL_ERROR_ABORTED, "%s was aborted", command);

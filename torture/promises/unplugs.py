@@ -155,7 +155,8 @@ def run(bench: Bench, case: str) -> None:
             # Made while the port's own name is still taken, so it gets another.
             pair = os.openpty() if where == "other" else None
             if name == "at-once":
-                return _at_once(line)
+                _at_once(line)
+                return
             if name in _OPERATIONS:
                 _in_flight(bench, line, name)
             else:
