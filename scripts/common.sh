@@ -15,6 +15,10 @@ as_root() {
   if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
 }
 
+# be_patient: programs that are started in this folder wait longer for a sign of life than the 80 ms of a handset that
+# has a machine to itself.
+be_patient() { echo "ConnectDelay 2000" >WLANEVKConfig.txt; }
+
 # need_packages PACKAGE...: installs what is missing with apt-get, and does not touch apt when nothing is.
 need_packages() {
   local missing=() package
