@@ -214,6 +214,8 @@ def connect(port: int, wait: float = 0.0) -> Phone:
     deadline = time.monotonic() + wait
     while True:
         connection = open_connection("KRAL_ConnectServer", port)
+        # An interrupt leaves an answer on its way, which the next request must not take for its own.
+        connection.ask("KRAL_SetResynchronise", 1)
         if connection.ask("KRAL_IsPhoneConnected"):
             return Phone(connection, port)
         failure = _no_handset(connection, port)
