@@ -143,9 +143,13 @@ class _Desk:
         return sorted(path.name for path in self.folder.iterdir() if path.name not in known)
 
 
+# Not tried on Windows yet: there what looks at a capture of theirs has taken more than a minute on a busy machine.
+_LINUX_ONLY = ("manual", "report", "compressed", "rotated", "kept")
+
+
 def cases(bench: Bench) -> List[str]:
     if bench.driver is not None:  # where programs are killed, and no signal asks them to end
-        return [f"{name}/KILL" for name, writer in WRITERS.items() if not writer.call]
+        return [f"{name}/KILL" for name, writer in WRITERS.items() if not writer.call and name not in _LINUX_ONLY]
     # A caller of the library that is no tool of ours has nothing that tidies up.
     killed = [f"{name}/{what}" for name, writer in WRITERS.items() for what in _SIGNALS
               if name in _EVERY_SIGNAL or what == "KILL" or (what == "TERM" and not writer.call)]
