@@ -57,6 +57,7 @@ _NAMES = ("../evil", "../../evil", "/evil", "..", ".", "a/../../evil", "evil\\..
 
 
 _Program = Union["subprocess.Popen[bytes]", Process]
+_Played = Tuple[Optional[int], Optional[bytes], bytes]
 
 
 class _Desk:
@@ -274,22 +275,24 @@ def _judge_series(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes],
         check(desk.writer.keep <= len(targets) <= desk.writer.keep + 1, f"{list(targets)} are there; {where}")
 
 
-def _packets_in(desk: _Desk, capture: bytes) -> int:
+def _play(desk: _Desk, capture: bytes, *options: str, stdout: int = subprocess.DEVNULL) -> _Played:
+    """The exit code of playing it, and what outputs() gives."""
     file = desk.folder / "looked-at"
     file.write_bytes(capture)
-    process = desk.run(desk.writer.command(desk.port, ("--json", "log", "play", file.name)), stdout=subprocess.PIPE)
-    told, _ = outputs(process)
+    process = desk.run(desk.writer.command(desk.port, (*options, "log", "play", file.name)), stdout=stdout)
+    told, text = outputs(process)
     file.unlink()
+    return process.returncode, told, text
+
+
+def _packets_in(desk: _Desk, capture: bytes) -> int:
+    _, told, _ = _play(desk, capture, "--json", stdout=subprocess.PIPE)
     return int(json.loads((told or b"").splitlines()[-1])["packets"])
 
 
 def _check_capture(desk: _Desk, capture: bytes, where: str, *, may_be_cut: bool) -> None:
-    file = desk.folder / "looked-at"
-    file.write_bytes(capture)
-    process = desk.run(desk.writer.command(desk.port, ("log", "play", file.name)))
-    text = finish(process)
-    file.unlink()
-    check(process.returncode == 0, f"the capture cannot be read: {text[-200:]!r}; {where}")
+    code, _, text = _play(desk, capture)
+    check(code == 0, f"the capture cannot be read: {text[-200:]!r}; {where}")
     check(may_be_cut or b"is cut" not in text, f"the capture is cut; {where}")
 
 

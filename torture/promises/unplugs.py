@@ -135,10 +135,10 @@ def _idle(bench: Bench, line: PtyLine, waits: bool) -> None:
 
 def _at_once(line: PtyLine) -> None:
     """Pulled in the moment after an answer, and plugged in again before anybody has looked at the port."""
-    for time_of_many in range(_REPLUGS):
+    for replugs in range(_REPLUGS):
         result, value = calls.CALLS["serial"].run(line.handle)
         check(result == 1 and value == calls.SERIAL,
-              f"after {time_of_many} times at once: {result}, {last_error(line.handle)}")
+              f"after {replugs} times at once: {result}, {last_error(line.handle)}")
         line.unplug()
         line.drop_pieces()
         line.plug()
