@@ -104,7 +104,9 @@ class _Desk:
             tool = self.folder.parent / "kral.exe"
             if not tool.exists():
                 shutil.copy(command[0], tool)
-            return Process(self._driver, [windows_path(tool), *command[1:]], self.folder, {"KRAL_SLOTS": "target"})
+            words = [windows_path(pathlib.Path(word)) if word.startswith("/") else word for word in command[1:]]
+            return Process(self._driver, [windows_path(tool), *words], self.folder, {"KRAL_SLOTS": "target"},
+                           stdout=stdout)
 
         def limit() -> None:
             # The owner of a folder that may not be written is refused as others are, whoever that is.
@@ -116,9 +118,8 @@ class _Desk:
                                 preexec_fn=limit, cwd=self.folder, env={**os.environ, "KRAL_SLOTS": "target"})
 
     def start(self, *, disk: Optional[int] = None) -> _Program:
-        is_counted = "capture" in self.writer.words and self._driver is None
         return self.run(self.writer.command(self.port), disk=disk,
-                        stdout=subprocess.PIPE if is_counted else subprocess.DEVNULL)
+                        stdout=subprocess.PIPE if "capture" in self.writer.words else subprocess.DEVNULL)
 
     def whole_run(self) -> float:
         """Seconds that it takes when nothing disturbs it; the target is then the new one."""
@@ -144,13 +145,9 @@ class _Desk:
         return sorted(path.name for path in self.folder.iterdir() if path.name not in known)
 
 
-# Not tried on Windows yet: there what looks at a capture of theirs has taken more than a minute on a busy machine.
-_LINUX_ONLY = ("manual", "report", "compressed", "rotated", "kept")
-
-
 def cases(bench: Bench) -> List[str]:
     if bench.driver is not None:  # where programs are killed, and no signal asks them to end
-        return [f"{name}/KILL" for name, writer in WRITERS.items() if not writer.call and name not in _LINUX_ONLY]
+        return [f"{name}/KILL" for name, writer in WRITERS.items() if not writer.call]
     # A caller of the library that is no tool of ours has nothing that tidies up.
     killed = [f"{name}/{what}" for name, writer in WRITERS.items() for what in _SIGNALS
               if name in _EVERY_SIGNAL or what == "KILL" or (what == "TERM" and not writer.call)]
