@@ -266,7 +266,8 @@ TEST_F(EfsFaults, AWriteThatFailedMayHaveOpenedAFile) {
     uint32_t error = 0;
     EXPECT_TRUE(test::Eventually([&] {
       return handset().efs().open_descriptors() == 0 || (KRAL_EfsMkDir(slow, "/after", &error), false);
-    })) << failures;
+    })) << failures
+        << LogText();
   }
   EXPECT_EQ(failing, 0);
   KRAL_DisconnectServer(slow);
