@@ -57,7 +57,6 @@ _NAMES = ("../evil", "../../evil", "/evil", "..", ".", "a/../../evil", "evil\\..
 
 
 _Program = Union["subprocess.Popen[bytes]", Process]
-_Played = Tuple[Optional[int], Optional[bytes], bytes]
 
 
 class _Desk:
@@ -228,11 +227,9 @@ def _judge(desk: _Desk, what: str, whole: Dict[str, bytes], where: str, told: Op
     elif desk.writer.kind == REPLACED:
         _judge_replaced(targets, old, whole, where)
     else:
-        _judge_grown(desk, targets, old, whole, where, may_be_cut=at_once)
+        there = _judge_grown(desk, targets, old, whole, where, may_be_cut=at_once)
         # Of those that are kept the first ones have gone.
-        if told is not None and desk.writer.keep == 0:
-            there = sum(_packets_in(desk, capture) for name, capture in targets.items() if capture != old.get(name))
-            check(there == told, f"{there} packets are there, not {told}; {where}")
+        check(told in (None, there) or desk.writer.keep > 0, f"{there} packets are there, not {told}; {where}")
     check(at_once or not left, f"{left} are left; {where}")
     for name in left:
         (desk.folder / name).unlink()
@@ -249,16 +246,19 @@ def _judge_replaced(targets: Dict[str, bytes], old: Dict[str, bytes], whole: Dic
 
 
 def _judge_grown(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes], whole: Dict[str, bytes], where: str, *,
-                 may_be_cut: bool) -> None:
+                 may_be_cut: bool) -> int:
+    """The packets of captures that are new."""
     begin = _no_digits(next(iter(whole.values()))[:8]) if desk.writer.kind == GROWS else _CAPTURE_BEGIN
     new = {name: there for name, there in targets.items() if there != old.get(name)}
     if desk.writer.kind == SERIES:
         _judge_series(desk, targets, old, where)
+    packets = 0
     for name, there in new.items():
         check(begin.startswith(_no_digits(there[:8])), f"{name} does not begin as it should; {where}")
         # Only the last of a series may still have been written.
         if "capture" in desk.writer.words and (len(there) >= 16 or name != max(new)):
-            _check_capture(desk, there, f"{name}; {where}", may_be_cut=may_be_cut and name == max(new))
+            packets += _check_capture(desk, there, f"{name}; {where}", may_be_cut=may_be_cut and name == max(new))
+    return packets
 
 
 def _judge_series(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes], where: str) -> None:
@@ -272,25 +272,16 @@ def _judge_series(desk: _Desk, targets: Dict[str, bytes], old: Dict[str, bytes],
         check(desk.writer.keep <= len(targets) <= desk.writer.keep + 1, f"{list(targets)} are there; {where}")
 
 
-def _play(desk: _Desk, capture: bytes, *options: str, stdout: int = subprocess.DEVNULL) -> _Played:
-    """The exit code of playing it, and what outputs() gives."""
+def _check_capture(desk: _Desk, capture: bytes, where: str, *, may_be_cut: bool) -> int:
+    """How many packets are in it."""
     file = desk.folder / "looked-at"
     file.write_bytes(capture)
-    process = desk.run(desk.writer.command(desk.port, (*options, "log", "play", file.name)), stdout=stdout)
+    process = desk.run(desk.writer.command(desk.port, ("--json", "log", "play", file.name)), stdout=subprocess.PIPE)
     told, text = outputs(process)
     file.unlink()
-    return process.returncode, told, text
-
-
-def _packets_in(desk: _Desk, capture: bytes) -> int:
-    _, told, _ = _play(desk, capture, "--json", stdout=subprocess.PIPE)
-    return int(json.loads((told or b"").splitlines()[-1])["packets"])
-
-
-def _check_capture(desk: _Desk, capture: bytes, where: str, *, may_be_cut: bool) -> None:
-    code, _, text = _play(desk, capture)
-    check(code == 0, f"the capture cannot be read: {text[-200:]!r}; {where}")
+    check(process.returncode == 0, f"the capture cannot be read: {text[-200:]!r}; {where}")
     check(may_be_cut or b"is cut" not in text, f"the capture is cut; {where}")
+    return int(json.loads((told or b"").splitlines()[-1])["packets"])
 
 
 def _same(first: bytes, second: bytes) -> bool:
