@@ -34,8 +34,6 @@ SHORT_WINDOWS = 2
 PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 2
 _MOMENTS = 50
-# A program takes seconds to start there.
-_MOMENTS_WINDOWS = 10
 _MOMENTS_SHORT = 3
 _LONGEST_S = 60.0
 _OLD = b"what was there before" * 50
@@ -197,8 +195,7 @@ def _killed(bench: Bench, desk: _Desk, operation: str, what: str) -> None:
     seconds = desk.whole_run()
     whole = desk.targets()
     numbers = bench.random(f"{operation}/{what}")
-    moments = _MOMENTS if bench.driver is None else _MOMENTS_WINDOWS
-    for _ in range(_MOMENTS_SHORT if bench.short else moments):
+    for _ in range(_MOMENTS_SHORT if bench.short else _MOMENTS):
         desk.reset()
         process = desk.start()
         moment = numbers.uniform(0, seconds)
