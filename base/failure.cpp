@@ -90,8 +90,8 @@ bool Fail(const Failure& failure) noexcept {
   return false;
 }
 
-bool IsFailureNoted() noexcept {
-  return call_under_way != nullptr && call_under_way->noted();
+uint32_t NotedFailure() noexcept {
+  return call_under_way != nullptr && call_under_way->noted() ? call_under_way->record().code : KRAL_ERROR_NONE;
 }
 
 Failure FileFailure(std::string_view file, const char* what, uint32_t system_error) {
@@ -108,7 +108,7 @@ KeepFailure::~KeepFailure() {
   if (keeps_) --call_under_way->keepers_;
 }
 
-FailureMark::FailureMark() noexcept : noted_(IsFailureNoted()) {
+FailureMark::FailureMark() noexcept : noted_(NotedFailure() != KRAL_ERROR_NONE) {
   if (noted_) record_ = call_under_way->record_;
 }
 

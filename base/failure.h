@@ -42,8 +42,8 @@ class Failure {
 // Notes it for the exported call under way on this thread, if there is one. Always false, for `return Fail(...)`.
 bool Fail(const Failure& failure) noexcept;
 
-// Whether the call under way has noted one; false where none is under way.
-bool IsFailureNoted() noexcept;
+// The code of what the call under way has noted last. KRAL_ERROR_NONE where it has noted nothing, or none is under way.
+uint32_t NotedFailure() noexcept;
 
 // A file of this machine: "cannot be read", "cannot be written", ...
 Failure FileFailure(std::string_view file, const char* what, uint32_t system_error = 0);

@@ -56,7 +56,7 @@ bool Run(Diag_FTM& phone, const std::string& file, const std::function<uint32_t(
   const uint32_t result = job();
   Put(status, result);
   if (result == KRAL_PKV_STATUS_DONE) return true;
-  if (IsFailureNoted() && IsToldByWhatWasNoted(result, settings.counts)) return false;
+  if (NotedFailure() != KRAL_ERROR_NONE && IsToldByWhatWasNoted(result, settings.counts)) return false;
   return Fail(Judgement(result, file.c_str(), settings.counts).Status(KRAL_ERROR_STATUS_RESULT, result));
 }
 

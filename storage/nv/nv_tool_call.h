@@ -31,7 +31,7 @@ uint32_t OnTool(KRAL_HANDLE handle, const char* function, Operation&& operation)
               return NvError::kUnknown;
             }
             const NvError told = tool ? operation(*tool, phone) : NvError::kNoConnection;
-            if (told != NvError::kNone && !IsFailureNoted()) Fail(ToolFailure(told));
+            if (told != NvError::kNone && NotedFailure() == KRAL_ERROR_NONE) Fail(ToolFailure(told));
             return told;
           });
   return static_cast<uint32_t>(error);

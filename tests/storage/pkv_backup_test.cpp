@@ -186,12 +186,14 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   const pkv::PkvSet good = Read("good.pkv");
   ShortenTimeOuts(120);
   for (const auto& row : kRows) {
-    for (uint64_t packet : {2, 8, 14}) {
+    for (uint64_t packet : {1, 2, 8, 14}) {
       SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
       handset().faults().Add(row.fault, When::Nth(packet).Of("26"));
+      handset().faults().Add(row.fault, When::Nth(packet).Of("7C"));
       EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u) << ErrorText();
       handset().faults().Clear();
       EXPECT_EQ(Read().items, good.items);
+      EXPECT_EQ(Read().properties.values, good.properties.values);
 
       for (uint16_t id = 1; id < 12; ++id) handset().nv().Erase(id);
       handset().faults().Add(row.fault, When::Nth(packet % 2 + 1).Of("4B 30"));
