@@ -20,7 +20,7 @@ bool IsAborted(Diag_FTM& phone) {
 
 void Pause(Diag_FTM& phone, uint32_t milliseconds) {
   constexpr uint32_t kLookAroundMs = 50;
-  while (milliseconds > 0 && !IsAborted(phone)) {
+  while (milliseconds > 0 && !IsAborted(phone) && !phone.device_gone()) {
     const uint32_t piece = std::min(milliseconds, kLookAroundMs);
     phone.clock().SleepMs(piece);
     milliseconds -= piece;
@@ -126,6 +126,8 @@ bool ControlMode(Diag_FTM& phone, uint16_t mode) {
   // Not the last word: a handset may switch without answering, so the read-back decides where there is one.
   const Reply reply = Send(phone, kModeControl, sent_mode);
   const bool sent = static_cast<bool>(reply);
+  // Whoever is plugged in next was not told to switch: its mode says nothing.
+  if (reply.kind() == ReplyKind::kGone || reply.kind() == ReplyKind::kGoneUnsent) return false;
   // A silent handset may have switched: then the read-back says what came of it. Any other failure is the reason.
   std::optional<KeepFailure> reason;
   if (!sent && reply.kind() != ReplyKind::kNone) reason.emplace();

@@ -118,6 +118,10 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
     const u32 elapsed = phone.clock().TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
+    if (HasAbort(phone)) {
+      reply = ReplyKind::kAborted;
+      break;
+    }
     const Reply other(reply.kind(), reply.code(), {});
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own);
     // Where nothing more comes, that was the answer.

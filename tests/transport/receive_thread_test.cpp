@@ -201,6 +201,32 @@ TEST_F(Conversation, IsEndedByAnAbort) {
   EXPECT_EQ(reply.kind(), ReplyKind::kAborted);
 }
 
+TEST_F(Conversation, IsEndedByAnAbortWhileOtherAnswersCome) {
+  constexpr int kMost = 400;
+  ASSERT_TRUE(Begins());
+  wire.OnWrite({});
+  std::atomic<bool> abort{false};
+  std::atomic<int> told{0};
+  engine->transport.SetAbort(&abort);
+  std::thread other([&] {
+    for (; told < kMost && !abort; ++told) {
+      wire.ToHost(PlainFrame({5, 9}));
+      abort = told > 4;
+      std::this_thread::sleep_for(milliseconds(5));
+    }
+    for (; told < kMost; ++told) {
+      wire.ToHost(PlainFrame({5, 9}));
+      std::this_thread::sleep_for(milliseconds(5));
+    }
+  });
+  const Reply reply =
+      engine->transport.SendSync(Bytes{5}, room, 5, 60000, 0, [](std::span<const uint8_t>) { return false; });
+  EXPECT_LT(told, kMost);
+  told = kMost;
+  other.join();
+  EXPECT_EQ(reply.kind(), ReplyKind::kAborted);
+}
+
 TEST_F(Conversation, IsEndedByTheDevicesEnd) {
   ASSERT_TRUE(Begins());
   EXPECT_EQ(AskWhile([this] { wire.Vanish(true); }).kind(), ReplyKind::kGone);

@@ -16,6 +16,8 @@ constexpr uint32_t kSettleMs = 20;
 
 // A caller that tells of bytes may have missed some: while they are awaited its transport is looked at all the same.
 constexpr uint32_t kLookEveryMs = 20;
+// For the answer that may be on its way when its request is aborted.
+constexpr std::chrono::milliseconds kMomentBehindAbort{80};
 
 bool IsUnframed(PacketMode mode) {
   return mode == PacketMode::kUnframed1 || mode == PacketMode::kUnframed2;
@@ -89,8 +91,13 @@ void CKralThreadInterface::ForgetReplies() {
 Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
                                       const ReplyTest& is_own) {
   const uint32_t start = clock_.TickMs();
+  std::optional<uint32_t> aborted_at;
   for (uint32_t waited = 0;; waited = clock_.TickMs() - start) {
     if (waited > 0 && waited >= time_out_ms) return WhyNoReply();  // nothing but earlier replies
+    // A handset that goes on telling other things does not make the abort wait.
+    if (aborted() && !aborted_at) aborted_at = clock_.TickMs();
+    if (aborted_at && std::chrono::milliseconds(clock_.TickMs() - *aborted_at) >= kMomentBehindAbort)
+      return WhyNoReply();
     const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
     if (!record || record->empty()) return WhyNoReply();
     const auto bytes = CopyRecord(*record, room);
@@ -108,9 +115,8 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
 }
 
 std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
-  constexpr std::chrono::milliseconds kMoment{80};
   auto record = PopWithin(time_out);
-  if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMoment));
+  if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMomentBehindAbort));
   return record;
 }
 
