@@ -105,6 +105,7 @@ class _Station:
         calls.read_item(self._line.handle)
         pull.join()
         self._line.drop_pieces()
+        self._phone.files.start_anew()
         self._line.plug()
         result, value = calls.CALLS["serial"].run(self._line.handle)
         self._must(result, "the first request of a port that is back")

@@ -12,6 +12,7 @@ _TRUNCATE = 0x200
 _FILE = 0x81B6
 _ITEM = 0xE1B6
 _FOLDER = 0x41FF
+_OUT_OF_SYNC = 1
 
 
 def _text(request: bytes, at: int) -> str:
@@ -38,11 +39,17 @@ class FileSystem:
             2: self._open, 3: self._close, 4: self._read, 5: self._write, 8: self._unlink, 9: self._make_folder,
             11: self._open_folder, 12: self._read_folder, 13: self._close_folder, 15: self._status, 19: self._room,
             38: self._put_item, 39: self._get_item,
+            48: lambda request: _words(_OK, _OUT_OF_SYNC), 49: lambda request: _words(_OK, _OUT_OF_SYNC),
         }
 
     def answer(self, request: bytes, command: int) -> Optional[bytes]:
         handler = self._commands.get(command)
         return request[:4] + handler(request) if handler else b"\x13" + request
+
+    def start_anew(self) -> None:
+        """What was open is so no longer."""
+        self.open_files.clear()
+        self._open_folders.clear()
 
     def put(self, path: str, data: bytes, item: bool = False) -> None:
         self.files[path] = data

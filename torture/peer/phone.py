@@ -20,6 +20,9 @@ _DONE = 0
 _NEVER_WRITTEN = 5
 _LAST_ITEMS = {0: 80, 1: 1001, 4: 1104, 11: 508}
 EVENTS = 300
+# What is told in each mode.
+_STATES = {0: 2, 1: 3, 3: 1, 4: 5, 5: 6}
+_ONLINE = 5
 
 
 class Phone:
@@ -29,6 +32,7 @@ class Phone:
         self.items: Dict[Tuple[int, int], bytes] = {(0, 0): struct.pack("<I", serial).ljust(_ITEM_SIZE, b"\0")}
         self.memory: Dict[int, int] = {}
         self.switches = 0x1234
+        self.state = _ONLINE
         self.files = FileSystem()
         self.log_masks: Dict[int, bytes] = {}
         self.event_mask = bytes((EVENTS + 7) // 8)
@@ -43,7 +47,7 @@ class Phone:
             32: lambda request: request,
             38: self._read_item,
             39: self._write_item,
-            41: lambda request: request,
+            41: self._switch,
             42: lambda request: b"\x2a" + bytes(range(40)),
             43: lambda request: request,
             47: lambda request: b"\x2f" + struct.pack("<H", self.switches),
@@ -87,7 +91,7 @@ class Phone:
         if subsystem == _STATUS:
             return request + bytes(range(30))
         if subsystem == _MODE:
-            return request[:4] + struct.pack("<II", 0, 5)
+            return request[:4] + struct.pack("<II", 0, self.state)
         return b"\x13" + request
 
     def _peek(self, request: bytes, width: int) -> bytes:
@@ -122,6 +126,10 @@ class Phone:
             results += struct.pack("<BHB", size, number, _DONE) + value
             at += 4 + size
         return request[:8] + struct.pack("<H", _DONE) + results
+
+    def _switch(self, request: bytes) -> bytes:
+        self.state = _STATES.get(request[1], self.state)
+        return request
 
     def _set_switches(self, request: bytes) -> bytes:
         self.switches, = struct.unpack_from("<H", request, 1)

@@ -16,16 +16,22 @@ from torture.peer.phone import Phone
 
 NUMBER = 2
 TITLE = "An unplug is reported within 500 ms; the next request works once the port is back"
-SHORT = 42
+SHORT = 112
+SHORT_WINDOWS = 42
 PLATFORMS = (LINUX, WINDOWS)
 AT_ONCE = 4
 _ALLOWED_MS = 500
 _TIME_OUT_MS = 5000
 _LOST = 9
 # The requests that are answered before the handset goes away in the middle of an operation.
-_ANSWERED = {"write": 5, "read": 5, "list": 3, "back-up": 20}
+_ANSWERED = {"write": 5, "read": 5, "list": 3, "back-up": 20, "sync": 2, "switched": 1}
+# What goes on for long behind an answer, with nothing asked: then it goes away behind the last of them.
+_BEHIND = "switched"
 _BYTES = bytes(range(256)) * 40
 _REPLUGS = 50
+_OFFLINE = 1
+# The delay that follows the switch.
+_OFFLINE_DELAY, _OFFLINE_DELAY_MS = 13, 3000
 
 
 def _back_up(handle: int) -> calls.Outcome:
@@ -50,11 +56,16 @@ _OPERATIONS: Dict[str, Callable[[int], calls.Outcome]] = {
     "read": lambda handle: calls.read_file(handle, "/data/large", 20000),
     "list": lambda handle: calls.list_folder(handle, b"/many"),
     "back-up": _back_up,
+    "switch": lambda handle: (kral.api().KRAL_DIAG_CONTROL_F(handle, _OFFLINE), None),
+    _BEHIND: lambda handle: (kral.api().KRAL_DIAG_CONTROL_F(handle, _OFFLINE), None),
+    "boot-mode": lambda handle: (kral.api().KRAL_ChangeFTM_BootMode(handle, 1, 1), None),
+    "sync": lambda handle: (kral.api().KRAL_EFS2_SyncWithWait(handle, b"/", _TIME_OUT_MS), None),
 }
 
 
 def cases(bench: Bench) -> List[str]:
-    busy = [f"{name}/{mode}/{where}" for name in _OPERATIONS for mode in MODES for where in ("same", "other")]
+    busy = [f"{name}/{mode}/{where}" for name in _OPERATIONS for mode in MODES
+            for where in ("same", "other", "stranger")]
     return busy + [f"{name}/{mode}/{where}" for name in ("idle", "wait-log") for mode in MODES
                    for where in ("same", "other")] + [f"at-once/{mode}/same" for mode in MODES]
 
@@ -65,16 +76,30 @@ def _state(handle: int) -> int:
     return state.value
 
 
-def _phone() -> Phone:
-    phone = calls.prepare(Phone(calls.SERIAL))
+def _phone(serial: int = calls.SERIAL) -> Phone:
+    phone = calls.prepare(Phone(serial))
     phone.files.put("/data/large", _BYTES)
     for i in range(20):
         phone.files.put(f"/many/{i}", b"x")
     return phone
 
 
-def _in_flight(bench: Bench, line: PtyLine, name: str) -> None:
-    """The cable is pulled while a request has no answer yet."""
+def _plug_stranger(line: PtyLine, asked: List[bytes]) -> None:
+    """Another handset comes on the same port soon, and notes what it is asked."""
+    def behaviour(request: bytes, _: Line) -> None:
+        asked.append(request)
+        line.reply(request)
+
+    time.sleep(0.1)
+    line.phone = _phone(calls.SERIAL + 1)
+    line.phone.answer(bytes((41, _OFFLINE, 0)))  # where the other one was to go
+    line.behaviour = behaviour
+    line.drop_pieces()
+    line.plug()
+
+
+def _in_flight(bench: Bench, line: PtyLine, name: str, *, comes_stranger: bool) -> None:
+    """The cable is pulled while a request has no answer yet, or behind an answer."""
     left = [_ANSWERED.get(name, 0)]
     asked = threading.Event()
 
@@ -82,28 +107,34 @@ def _in_flight(bench: Bench, line: PtyLine, name: str) -> None:
         if left[0] > 0:
             left[0] -= 1
             line.reply(request)
-        else:
-            asked.set()
+            if left[0] > 0 or name != _BEHIND:
+                return
+        asked.set()
 
     line.behaviour = behaviour
     since: List[float] = []
+    of_stranger: List[bytes] = []
 
     def pull() -> None:
         if asked.wait(5):
             time.sleep(0.02)
             since.append(time.monotonic())
             line.unplug()
+            if comes_stranger:
+                _plug_stranger(line, of_stranger)
 
     puller = threading.Thread(target=pull)
     puller.start()
     result, _ = _OPERATIONS[name](line.handle)
     end = time.monotonic()
     code, text = last_error(line.handle)
+    took_over = list(of_stranger)
     puller.join()
     check(bool(since), f"{name} ended with {result} before anything was pulled")
     _judge(bench, since[0], end)
     check(result == 0, f"{name} succeeded without a handset")
     check(code == _LOST, f"the failure has code {code} ({text})")
+    check(not took_over, f"the handset that came next was asked {[request.hex() for request in took_over]}")
 
 
 def _judge(bench: Bench, since: float, end: float) -> None:
@@ -150,6 +181,7 @@ def run(bench: Bench, case: str) -> None:
         line = PtyLine(_phone(), bench.ports, port)
         with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
             kral.api().KRAL_DIAG_SetPhoneLoggingState(handle, 1)
+            kral.api().KRAL_ConfigureTimeOut(handle, _OFFLINE_DELAY, _OFFLINE_DELAY_MS)
             result, value = calls.CALLS["serial"].run(handle)
             check(result == 1 and value == calls.SERIAL, f"a handset that works gave {result}, {value!r}")
             # Made while the port's own name is still taken, so it gets another.
@@ -158,11 +190,13 @@ def run(bench: Bench, case: str) -> None:
                 _at_once(line)
                 return
             if name in _OPERATIONS:
-                _in_flight(bench, line, name)
+                _in_flight(bench, line, name, comes_stranger=where == "stranger")
             else:
                 _idle(bench, line, name == "wait-log")
             line.behaviour = WORKS
             line.drop_pieces()
-            line.plug(pair)
+            if where != "stranger":
+                line.plug(pair)
             result, value = calls.CALLS["serial"].run(handle)
-            check(result == 1 and value == calls.SERIAL, f"after the port came back: {result}, {last_error(handle)}")
+            expected = calls.SERIAL + (where == "stranger")
+            check(result == 1 and value == expected, f"after the port came back: {result}, {last_error(handle)}")
