@@ -9,11 +9,10 @@
 
 #include "base/failure.h"
 #include "commands/core/core_diag.h"
+#include "storage/items/phone_items.h"
 
 namespace kral::items {
 namespace {
-
-constexpr int kTries = 3;
 
 // What gets lost on the way is asked for again: a backup would not say whose it is. A refusal stays one.
 bool IsTold(const std::function<bool()>& ask) {

@@ -12,8 +12,6 @@
 namespace kral::items {
 namespace {
 
-constexpr int kTries = 3;
-
 constexpr size_t kElementSize = nv::kDataSize - 1;  // a write has the index in front
 
 std::vector<uint8_t> WireData(const pkv::PkvNvItem& item, bool element) {

@@ -18,6 +18,8 @@
 
 namespace kral::items {
 
+inline constexpr int kTries = 3;  // of a request whose answer does not come
+
 class PhoneItems {
  public:
   enum class Answer {
