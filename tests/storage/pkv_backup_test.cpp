@@ -186,7 +186,7 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   const pkv::PkvSet good = Read("good.pkv");
   ShortenTimeOuts(120);
   for (const auto& row : kRows) {
-    for (uint64_t packet : {1, 2, 8, 14}) {
+    for (uint64_t packet : {1u, 2u, 8u, 14u}) {
       SCOPED_TRACE(testing::Message() << row.name << " at packet " << packet);
       handset().faults().Add(row.fault, When::Nth(packet).Of("26"));
       handset().faults().Add(row.fault, When::Nth(packet).Of("7C"));
