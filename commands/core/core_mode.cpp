@@ -47,6 +47,10 @@ void WaitAfterSwitch(Diag_FTM& phone, const SwitchDelay& delay) {
   Pause(phone, milliseconds);
 }
 
+bool IsReadBack(uint16_t mode) {
+  return mode <= kModeLowPower && mode != kModeReset;
+}
+
 bool HasReached(uint16_t mode, uint32_t state) {
   switch (mode) {
     case kModeOfflineAnalog:
@@ -127,7 +131,7 @@ bool ControlMode(Diag_FTM& phone, uint16_t mode) {
   const Reply reply = Send(phone, kModeControl, sent_mode);
   const bool sent = static_cast<bool>(reply);
   // Whoever is plugged in next was not told to switch: its mode says nothing.
-  if (reply.kind() == ReplyKind::kGone || reply.kind() == ReplyKind::kGoneUnsent) return false;
+  if (reply.kind() == ReplyKind::kGone && IsReadBack(sent_mode)) return false;
   // A silent handset may have switched: then the read-back says what came of it. Any other failure is the reason.
   std::optional<KeepFailure> reason;
   if (!sent && reply.kind() != ReplyKind::kNone) reason.emplace();

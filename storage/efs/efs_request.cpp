@@ -118,7 +118,7 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
     const u32 elapsed = phone.clock().TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
-    if (HasAbort(phone)) {
+    if (IsAborted(phone, "request")) {
       reply = ReplyKind::kAborted;
       break;
     }

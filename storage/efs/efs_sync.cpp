@@ -53,7 +53,7 @@ bool SyncWithWait(Diag_FTM& phone, const char* path, u32 time_out_ms) {
     reply = AskState(phone, kSyncStatus, "_EFS2_DIAG_GET_SYNC_STATUS", path, answer);
     if (reply.kind() == ReplyKind::kOther || answer.error != kDone) return false;
     // Whoever is plugged in next was not asked to write anything out.
-    if (reply.kind() == ReplyKind::kGone || reply.kind() == ReplyKind::kGoneUnsent) return false;
+    if (reply.kind() == ReplyKind::kGone) return false;
     // An answer that got lost may come with the next one.
     if (!reply || answer.state != kInSync) continue;
     phone.log().WriteLine(kLogRet, "KRAL_EFS2_SyncWithWait::sync is complete is received at %d ms",

@@ -48,6 +48,10 @@ def _wait_log(handle: int) -> calls.Outcome:
     return result, None
 
 
+def _switch(handle: int) -> calls.Outcome:
+    return kral.api().KRAL_DIAG_CONTROL_F(handle, _OFFLINE), None
+
+
 _OPERATIONS: Dict[str, Callable[[int], calls.Outcome]] = {
     **{name: calls.CALLS[name].run for name in ("get-switches", "version", "serial", "peek", "read-item", "write-item",
                                                 "channel", "file-status")},
@@ -56,8 +60,8 @@ _OPERATIONS: Dict[str, Callable[[int], calls.Outcome]] = {
     "read": lambda handle: calls.read_file(handle, "/data/large", 20000),
     "list": lambda handle: calls.list_folder(handle, b"/many"),
     "back-up": _back_up,
-    "switch": lambda handle: (kral.api().KRAL_DIAG_CONTROL_F(handle, _OFFLINE), None),
-    _BEHIND: lambda handle: (kral.api().KRAL_DIAG_CONTROL_F(handle, _OFFLINE), None),
+    "switch": _switch,
+    _BEHIND: _switch,
     "boot-mode": lambda handle: (kral.api().KRAL_ChangeFTM_BootMode(handle, 1, 1), None),
     "sync": lambda handle: (kral.api().KRAL_EFS2_SyncWithWait(handle, b"/", _TIME_OUT_MS), None),
 }

@@ -12,7 +12,8 @@ from torture.windows.driver import Driver, Fault, text, word
 _NO_WINDOW = 0x08000000
 _USE_HANDLES = 0x100
 _STARTUP_INFO = struct.Struct("<I40xI8x3I")  # size, flags, handles of input, output and errors
-_INHERITED = struct.pack("<III", 12, 0, 1).hex()
+_INHERITED = struct.pack("<III", 12, 0, 1).hex()  # security attributes: size, nothing special, for children too
+# Access, share and creation, as CreateFile takes them.
 _READ, _WRITE, _SHARED, _ANEW, _THERE = 0x80000000, 0x40000000, 3, 2, 3
 _EXIT_CODE = 137
 
