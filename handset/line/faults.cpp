@@ -50,6 +50,9 @@ Fault Lose() {
 Fault Duplicate() {
   return {Kind::kDuplicate};
 }
+Fault Repeat() {
+  return {Kind::kRepeat};
+}
 Fault Corrupt() {
   return {Kind::kCorrupt};
 }
@@ -159,6 +162,10 @@ std::vector<Outgoing> FaultPlan::Deliver(const Strike& strike, ByteView packet, 
     outgoing.hold = Outgoing::Hold::kUntilNextReply;
   }
   std::vector<Outgoing> copies(strike.Has(Kind::kDuplicate) ? 2 : 1, outgoing);
+  if (strike.Has(Kind::kRepeat)) {
+    outgoing.hold = Outgoing::Hold::kUntilNextRequest;
+    copies.push_back(std::move(outgoing));
+  }
   return copies;
 }
 

@@ -52,6 +52,7 @@ struct Fault {
     kLose,
     kCorrupt,
     kDuplicate,
+    kRepeat,
     kWrongCode,
     kLeadingNoise,
     kRefuse,
@@ -73,6 +74,7 @@ Fault Lag(uint32_t milliseconds);
 Fault AfterNextRequest();  // comes too late: when the next request has arrived
 Fault Lose();              // the request was carried out, its reply is gone
 Fault Duplicate();
+Fault Repeat();  // a second time when the next request has arrived, in front of the reply to that
 // --- Content ---
 Fault Corrupt();                     // a wrong frame check; of unframed bytes, the last one inverted
 Fault WrongCode(uint8_t code);       // another first byte

@@ -114,7 +114,10 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
   };
   Reply reply = phone.Send(packet, time_out_ms, 0, own);
   // A reply with another first byte ends a request of the engine; here it may be late as well, and ours behind it.
-  while (reply.kind() == ReplyKind::kOther && reply.refusal() == 0) {
+  const auto is_for_another = [&] {
+    return reply.kind() == ReplyKind::kOther && (reply.refusal() == 0 || RefusesAnother(reply, packet.request()));
+  };
+  while (is_for_another()) {
     phone.log().WriteLine(kLogErr, "EFS2 reply belongs to another request");
     const u32 elapsed = phone.clock().TickMs() - start;
     if (elapsed >= time_out_ms) break;  // of a handset that never stops talking
@@ -125,7 +128,10 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     const Reply other(reply.kind(), reply.code(), {});
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own);
     // Where nothing more comes, that was the answer.
-    if (reply.kind() == ReplyKind::kNone) Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
+    if (reply.kind() == ReplyKind::kNone) {
+      Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
+      if (other.refusal() != 0) reply = other;
+    }
   }
   if (reply.kind() == ReplyKind::kAborted) phone.state<Settings>().gave_up = true;
   return reply;

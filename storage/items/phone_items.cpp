@@ -30,7 +30,7 @@ PhoneItems::Answer PhoneItems::Try(const std::function<Reply()>& ask) {
       return Answer::kLost;
     }
     const Reply reply = ask();
-    refusal_ = reply.refusal();
+    refusal_ = RefusesAnother(reply, phone_.packet().request()) ? uint8_t{0} : reply.refusal();
     has_answered_ = has_answered_ || reply.came();
     if (reply) return Answer::kAnswered;
     if (reply.kind() == ReplyKind::kGone) return Answer::kLost;

@@ -207,6 +207,25 @@ TEST_F(PkvBackup, NoFaultOfTheLineSpoilsABackupOrARestore) {
   }
 }
 
+TEST_F(PkvBackup, ARefusalThatComesAgainIsNotTheNextRequests) {
+  Furnish();
+  ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);
+  const pkv::PkvSet good = Read();
+  // The second one is in front of the status of the first folder, and of the next item.
+  for (const char* const request : {"7C", "26 03 00"}) {
+    SCOPED_TRACE(request);
+    handset().faults().Add(handset::Refuse(19), When::Nth(1).Of(request));
+    handset().faults().Add(handset::Repeat(), When::Nth(1).Of(request));
+    const bool is_item = std::string(request) != "7C";
+    EXPECT_EQ(Run(KRAL_BackupNVFromMobileToPKV), is_item ? KRAL_PKV_STATUS_INCOMPLETE : 0u) << ErrorText();
+    handset().faults().Clear();
+    EXPECT_EQ(Read().items.size() + (is_item ? 1 : 0), good.items.size());
+    EXPECT_EQ(Read().files, good.files);
+  }
+  EXPECT_EQ(g_results["3"].first, KRAL_PKV_REFUSED);
+  EXPECT_NE(g_results["4"].first, KRAL_PKV_REFUSED);
+}
+
 TEST_F(PkvBackup, ALostRequestForAFolderIsMadeAgain) {
   Furnish();
   ASSERT_EQ(Run(KRAL_BackupNVFromMobileToPKV), 0u);

@@ -24,7 +24,7 @@ struct Kind {
   std::string_view meaning;
 };
 
-constexpr std::array<Kind, 13> kKinds{{
+constexpr std::array<Kind, 14> kKinds{{
     {"corrupt", "", [](std::uint32_t) { return handset::Corrupt(); }, "wrong frame check"},
     {"delay", "ms", [](std::uint32_t value) { return handset::Delay(value); }, "late reply"},
     {"duplicate", "", [](std::uint32_t) { return handset::Duplicate(); }, "the reply comes twice"},
@@ -38,6 +38,7 @@ constexpr std::array<Kind, 13> kKinds{{
      "bytes of no meaning in front"},
     {"refuse", "code", [](std::uint32_t value) { return handset::Refuse(static_cast<std::uint8_t>(value)); },
      "refused with 19, 20, 21 or 24"},
+    {"repeat", "", [](std::uint32_t) { return handset::Repeat(); }, "the reply comes again after the next request"},
     {"split", "bytes", [](std::uint32_t value) { return handset::Split(value); }, "the reply comes in pieces"},
     {"wrong", "code", [](std::uint32_t value) { return handset::WrongCode(static_cast<std::uint8_t>(value)); },
      "another first byte"},
