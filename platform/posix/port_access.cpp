@@ -9,18 +9,13 @@
 
 #include <algorithm>
 #include <array>
-#include <charconv>
-#include <filesystem>
-#include <fstream>
-#include <system_error>
 #include <vector>
 
 #include "platform/posix/port_sources.h"
+#include "platform/posix/system_files.h"
 
 namespace kral {
 namespace {
-
-namespace fs = std::filesystem;
 
 bool IsMember(gid_t group) {
   const int count = ::getgroups(0, nullptr);
@@ -54,29 +49,21 @@ PortAccess DescribePortAccess(const std::string& device) {
   struct stat status {};
   if (::stat(device.c_str(), &status) != 0) return access;
   if ((status.st_mode & (S_IRGRP | S_IWGRP)) == (S_IRGRP | S_IWGRP)) DescribeGroup(status.st_gid, access);
-  std::error_code error;
-  const auto tty = fs::canonical(device, error).filename();
-  const auto file = CurrentPortSources().tty_class / tty / "device" / "latency_timer";
-  uint32_t milliseconds = 0;
-  if (!error && std::ifstream(file) >> milliseconds) {
-    access.latency_ms = milliseconds;
+  const auto tty = RealPath(device);
+  if (!tty) return access;
+  const auto file = CurrentPortSources().tty_class / tty->filename() / "device" / "latency_timer";
+  if (const auto milliseconds = NumberIn<uint32_t>(FirstLineOf(file))) {
+    access.latency_ms = *milliseconds;
     access.latency_file = file.string();
   }
   return access;
 }
 
 uint32_t FindProcess(const std::string& name) {
-  std::error_code error;
-  fs::directory_iterator entry(CurrentPortSources().processes, error);
-  if (error) return 0;
-  for (const fs::directory_iterator end; !error && entry != end; entry.increment(error)) {
-    const std::string folder = entry->path().filename().string();
-    uint32_t id = 0;
-    const auto [stop, problem] = std::from_chars(folder.data(), folder.data() + folder.size(), id);
-    if (problem != std::errc() || stop != folder.data() + folder.size()) continue;
-    std::ifstream stream(entry->path() / "comm");
-    std::string running;
-    if (std::getline(stream, running) && running == name) return id;
+  const auto processes = CurrentPortSources().processes;
+  for (const std::string& folder : NamesIn(processes).value_or(std::vector<std::string>())) {
+    const auto id = NumberIn<uint32_t>(folder);
+    if (id && FirstLineOf(processes / folder / "comm") == name) return *id;
   }
   return 0;
 }

@@ -6,15 +6,15 @@
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
-#include <charconv>
-#include <fstream>
+#include <cstdio>
 #include <optional>
-#include <sstream>
 #include <string_view>
-#include <system_error>
+#include <vector>
 
 #include "platform/posix/port_sources.h"
+#include "platform/posix/system_files.h"
 
 namespace kral {
 namespace {
@@ -24,50 +24,35 @@ namespace fs = std::filesystem;
 constexpr unsigned int kFirstTerminalSlave = 136;  // device numbers of pseudo terminals
 constexpr unsigned int kLastTerminalSlave = 143;
 
-std::string FirstLine(const fs::path& file) {
-  std::ifstream stream(file);
-  std::string line;
-  std::getline(stream, line);
-  return line;
-}
-
-template <class Number>
-std::optional<Number> NumberIn(std::string_view text, int base) {
-  Number number{};
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number, base);
-  if (error != std::errc() || end != text.data() + text.size()) return std::nullopt;
-  return number;
-}
-
 uint16_t HexIn(const fs::path& file) {
-  return NumberIn<uint16_t>(FirstLine(file), 16).value_or(0);
+  return NumberIn<uint16_t>(FirstLineOf(file), 16).value_or(0);
+}
+
+bool Exists(const fs::path& path) {
+  return ::access(path.c_str(), F_OK) == 0;
 }
 
 // The tty of the system that a port is: links lead to it.
 std::string TtyName(const std::string& device) {
-  std::error_code error;
-  const fs::path real = fs::canonical(device, error);
-  return fs::path(error ? fs::path(device) : real).filename().string();
+  return RealPath(device).value_or(device).filename().string();
 }
 
 // The interface is a folder of the device's, and the tty is somewhere below it.
 void DescribeUsb(const PortSources& sources, PortInfo& info) {
-  std::error_code error;
-  fs::path folder = fs::canonical(sources.tty_class / TtyName(info.device) / "device", error);
-  if (error) return;
+  fs::path folder = RealPath(sources.tty_class / TtyName(info.device) / "device").value_or(fs::path());
   std::string interface_text;
   for (; folder.has_relative_path(); folder = folder.parent_path()) {
-    if (fs::exists(folder / "bInterfaceNumber", error)) {
+    if (Exists(folder / "bInterfaceNumber")) {
       info.usb_interface = static_cast<uint8_t>(HexIn(folder / "bInterfaceNumber"));
-      interface_text = FirstLine(folder / "interface");
+      interface_text = FirstLineOf(folder / "interface");
     }
-    if (!fs::exists(folder / "idVendor", error)) continue;
+    if (!Exists(folder / "idVendor")) continue;
     info.usb_path = folder.filename().string();
     info.vendor = HexIn(folder / "idVendor");
     info.product = HexIn(folder / "idProduct");
-    info.serial = FirstLine(folder / "serial");
+    info.serial = FirstLineOf(folder / "serial");
     for (const std::string& part :
-         {FirstLine(folder / "manufacturer"), FirstLine(folder / "product"), interface_text}) {
+         {FirstLineOf(folder / "manufacturer"), FirstLineOf(folder / "product"), interface_text}) {
       if (!part.empty()) info.description += (info.description.empty() ? "" : " ") + part;
     }
     return;
@@ -78,30 +63,27 @@ void DescribeUsb(const PortSources& sources, PortInfo& info) {
 
 // "3: FLOCK  ADVISORY  WRITE 1234 00:18:5 0 EOF": process, and device and inode of the file.
 std::optional<uint32_t> HolderOfLock(const fs::path& processes, const struct stat& device) {
-  std::ifstream locks(processes / "locks");
-  for (std::string line; std::getline(locks, line);) {
-    std::istringstream words(line);
-    std::string number, kind, mode, access, process, file;
-    words >> number >> kind >> mode >> access >> process >> file;
-    if (kind != "FLOCK") continue;
-    std::ostringstream wanted;
-    wanted.width(2);
-    wanted.fill('0');
-    wanted << std::hex << major(device.st_dev) << ':';
-    wanted.width(2);
-    wanted << minor(device.st_dev) << ':' << std::dec << device.st_ino;
-    if (file == wanted.str()) return NumberIn<uint32_t>(process, 10).value_or(0);
+  enum Word : size_t { kKind = 1, kProcess = 4, kFile = 5 };
+  std::array<char, 64> wanted{};
+  std::snprintf(wanted.data(), wanted.size(), "%02x:%02x:%ju", major(device.st_dev), minor(device.st_dev),
+                static_cast<uintmax_t>(device.st_ino));
+  const std::string locks = TextOf(processes / "locks");
+  std::string_view left = locks;
+  while (const auto line = TakeUntil('\n', left)) {
+    const auto words = WordsOf(*line);
+    if (words.size() <= kFile || words[kKind] != "FLOCK" || words[kFile] != wanted.data()) continue;
+    return NumberIn<uint32_t>(words[kProcess]).value_or(0);
   }
   return std::nullopt;
 }
 
 bool HasOpen(const fs::path& process, const struct stat& device) {
-  std::error_code error;
-  fs::directory_iterator entry(process / "fd", error);
-  if (error) return false;  // not ours to look into, or it has just ended
-  for (const fs::directory_iterator end; !error && entry != end; entry.increment(error)) {
+  const auto names = NamesIn(process / "fd");
+  if (!names) return false;  // not ours to look into, or it has just ended
+  for (const std::string& name : *names) {
     struct stat open {};
-    if (::stat(entry->path().c_str(), &open) == 0 && S_ISCHR(open.st_mode) && open.st_rdev == device.st_rdev) {
+    if (::stat((process / "fd" / name).c_str(), &open) == 0 && S_ISCHR(open.st_mode) &&
+        open.st_rdev == device.st_rdev) {
       return true;
     }
   }
@@ -109,12 +91,9 @@ bool HasOpen(const fs::path& process, const struct stat& device) {
 }
 
 std::optional<uint32_t> HolderOfDescriptor(const fs::path& processes, const struct stat& device) {
-  std::error_code error;
-  fs::directory_iterator entry(processes, error);
-  if (error) return std::nullopt;
-  for (const fs::directory_iterator end; !error && entry != end; entry.increment(error)) {
-    const auto process = NumberIn<uint32_t>(entry->path().filename().string(), 10);
-    if (process && HasOpen(entry->path(), device)) return process;
+  for (const std::string& name : NamesIn(processes).value_or(std::vector<std::string>())) {
+    const auto process = NumberIn<uint32_t>(name);
+    if (process && HasOpen(processes / name, device)) return process;
   }
   return std::nullopt;
 }
@@ -126,26 +105,25 @@ bool IsPseudoTerminal(const struct stat& device) {
 }
 
 // Whether a line of the table of terminal drivers, "usbserial /dev/ttyUSB 188 0-511 serial", is that of the device.
-bool IsDriverOf(const std::string& line, const struct stat& device) {
-  std::istringstream words(line);
-  std::string name, node, kind, minors;
-  words >> name >> node >> kind >> minors;
-  const size_t dash = minors.find('-');
-  const auto first = NumberIn<unsigned int>(std::string_view(minors).substr(0, dash), 10);
-  const auto last = dash == std::string::npos ? first : NumberIn<unsigned int>(minors.substr(dash + 1), 10);
-  return NumberIn<unsigned int>(kind, 10) == major(device.st_rdev) && first && last &&
-         minor(device.st_rdev) >= *first && minor(device.st_rdev) <= *last;
+bool IsDriverOf(std::string_view line, const struct stat& device) {
+  enum Word : size_t { kMajor = 2, kMinors = 3 };
+  const auto words = WordsOf(line);
+  if (words.size() <= kMinors || NumberIn<unsigned int>(words[kMajor]) != major(device.st_rdev)) return false;
+  std::string_view minors = words[kMinors];
+  const auto first = NumberIn<unsigned int>(*TakeUntil('-', minors));
+  const auto last = minors.empty() ? first : NumberIn<unsigned int>(minors);
+  return first && last && minor(device.st_rdev) >= *first && minor(device.st_rdev) <= *last;
 }
 
 // A device, but no terminal, /dev/null for instance: as far as the system tells.
 bool IsOtherDevice(const fs::path& processes, const struct stat& device) {
   if (IsPseudoTerminal(device)) return false;
-  std::ifstream drivers(processes / "tty" / "drivers");
-  bool tells = false;
-  for (std::string line; std::getline(drivers, line); tells = true) {
-    if (IsDriverOf(line, device)) return false;
+  const std::string drivers = TextOf(processes / "tty" / "drivers");
+  std::string_view left = drivers;
+  while (const auto line = TakeUntil('\n', left)) {
+    if (IsDriverOf(*line, device)) return false;
   }
-  return tells;
+  return !drivers.empty();
 }
 
 void FindHolder(const PortSources& sources, const struct stat& device, PortInfo& info) {
@@ -155,7 +133,7 @@ void FindHolder(const PortSources& sources, const struct stat& device, PortInfo&
   info.process = *holder;
   const bool is_ours = *holder == static_cast<uint32_t>(::getpid());
   info.obstacle = is_ours ? PortObstacle::kInUseHere : PortObstacle::kInUse;
-  if (info.process != 0) info.process_name = FirstLine(sources.processes / std::to_string(info.process) / "comm");
+  if (info.process != 0) info.process_name = FirstLineOf(sources.processes / std::to_string(info.process) / "comm");
 }
 
 void FindObstacle(const PortSources& sources, PortInfo& info) {

@@ -1,18 +1,17 @@
 // COM numbers on Linux: names given by the user first, then the tty devices of the system by fixed ranges.
 #include "platform/port_list.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
-#include <charconv>
 #include <cstdlib>
-#include <fstream>
 #include <optional>
 #include <set>
 #include <string_view>
-#include <system_error>
 
 #include "platform/posix/port_sources.h"
+#include "platform/posix/system_files.h"
 
 namespace kral {
 namespace {
@@ -35,10 +34,8 @@ constexpr std::array<TtyRange, 3> kTtyRanges = {{{"ttyS", 1, 64}, {"ttyUSB", 65,
 
 // A decimal number written the one way that std::to_string writes it.
 std::optional<int> Decimal(std::string_view text) {
-  int value = 0;
-  const auto [stop, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-  if (error != std::errc() || std::to_string(value) != text) return std::nullopt;
-  return value;
+  const auto value = NumberIn<int>(text);
+  return value && std::to_string(*value) == text ? value : std::nullopt;
 }
 
 std::optional<int> NumberAfter(std::string_view prefix, std::string_view text) {
@@ -60,24 +57,9 @@ std::optional<int> ComNumberOfTty(std::string_view name) {
 
 // A tty with hardware behind it. The kernel keeps serial entries for chips that are not there, as type 0 (unknown).
 bool HasHardware(const fs::path& tty) {
-  std::error_code error;
-  if (!fs::exists(tty / "device", error)) return false;
+  if (::access((tty / "device").c_str(), F_OK) != 0) return false;
   if (!tty.filename().string().starts_with("ttyS")) return true;
-  int type = 0;
-  std::ifstream(tty / "type") >> type;
-  return type != 0;
-}
-
-// Calls visit(name) for every entry; false when the folder cannot be read.
-template <class Visit>
-bool ForEachName(const fs::path& folder, Visit visit) {
-  std::error_code error;
-  fs::directory_iterator entry(folder, error);
-  if (error) return false;
-  for (const fs::directory_iterator end; !error && entry != end; entry.increment(error)) {
-    visit(entry->path().filename().string());
-  }
-  return !error;
+  return NumberIn<int>(FirstLineOf(tty / "type")).value_or(0) != 0;
 }
 
 std::string Variable(const char* name) {
@@ -120,16 +102,17 @@ bool ListComPorts(const PortSources& sources, std::vector<uint16_t>& ports) {
   std::set<int> found;
   for (const auto& [number, device] : sources.variables) found.insert(number);
   for (const fs::path& folder : sources.link_folders) {
-    ForEachName(folder, [&found](const std::string& name) {
+    for (const std::string& name : NamesIn(folder).value_or(std::vector<std::string>())) {
       if (const auto number = NumberAfter("com", name); IsComNumber(number)) found.insert(*number);
-    });
+    }
   }
-  const bool read = ForEachName(sources.tty_class, [&](const std::string& name) {
+  const auto ttys = NamesIn(sources.tty_class);
+  for (const std::string& name : ttys.value_or(std::vector<std::string>())) {
     const auto number = ComNumberOfTty(name);
     if (number && HasHardware(sources.tty_class / name)) found.insert(*number);
-  });
+  }
   // Named ports are a list, too: a container often has no sysfs.
-  if (!read && found.empty()) return false;
+  if (!ttys && found.empty()) return false;
   ports.assign(found.begin(), found.end());
   return true;
 }
@@ -147,8 +130,8 @@ std::string ComPortDevice(const PortSources& sources, int number, uint32_t& plac
   for (const fs::path& folder : sources.link_folders) {
     if (place > last) return {};
     const auto link = folder / ("com" + std::to_string(number));
-    std::error_code error;
-    if (fs::exists(fs::symlink_status(link, error))) return link.string();
+    struct stat status {};
+    if (::lstat(link.c_str(), &status) == 0) return link.string();
     ++place;
   }
   place = kTtyPlace;

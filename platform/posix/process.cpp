@@ -1,36 +1,32 @@
 // Processes, found through /proc.
 #include "platform/process.h"
 
+#include <limits.h>
 #include <signal.h>
 #include <sys/types.h>
+#include <unistd.h>
 
-#include <charconv>
-#include <filesystem>
-#include <optional>
+#include <array>
 #include <string>
-#include <system_error>
+#include <string_view>
+#include <vector>
+
+#include "platform/posix/system_files.h"
 
 namespace kral {
-namespace {
-
-std::optional<pid_t> ProcessId(const std::string& folder_name) {
-  pid_t id = 0;
-  const char* end = folder_name.data() + folder_name.size();
-  const auto [stop, error] = std::from_chars(folder_name.data(), end, id);
-  if (error != std::errc() || stop != end || id <= 0) return std::nullopt;
-  return id;
-}
-
-}  // namespace
 
 void TerminateProcessByName(const char* executable) {
-  std::error_code error;
-  for (std::filesystem::directory_iterator entry("/proc", error), end; !error && entry != end; entry.increment(error)) {
-    const auto id = ProcessId(entry->path().filename().string());
-    if (!id) continue;
-    std::error_code unreadable;  // another user's process, or one that has just ended
-    const auto image = std::filesystem::read_symlink(entry->path() / "exe", unreadable);
-    if (unreadable || image.filename() != executable) continue;
+  const std::filesystem::path processes = "/proc";
+  for (const std::string& folder : NamesIn(processes).value_or(std::vector<std::string>())) {
+    const auto id = NumberIn<pid_t>(folder);
+    if (!id || *id <= 0) continue;
+    // Nothing of another user's process, or of one that has just ended. Not RealPath: the file may have been replaced.
+    std::array<char, PATH_MAX> image{};
+    const ssize_t size = ::readlink((processes / folder / "exe").c_str(), image.data(), image.size());
+    if (size <= 0) continue;
+    if (std::filesystem::path(std::string_view(image.data(), static_cast<size_t>(size))).filename() != executable) {
+      continue;
+    }
     ::kill(*id, SIGKILL);
     return;
   }
