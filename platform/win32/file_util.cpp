@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "platform/folder.h"
+#include "platform/temporary_name.h"
 #include "platform/win32/last_error.h"
 #include "platform/win32/wide_text.h"
 #include "platform/win32/win_handle.h"
@@ -213,8 +214,9 @@ std::error_code AtomicFile::Open(const std::string& path) {
   state.failed = FindTarget(path, state.path);
   if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
-    state.temporary =
-        state.path + L"." + std::to_wstring(::GetCurrentProcessId()) + L"." + std::to_wstring(attempt) + L".tmp";
+    const std::wstring ending =
+        L"." + std::to_wstring(::GetCurrentProcessId()) + L"." + std::to_wstring(attempt) + L".tmp";
+    state.temporary = TemporaryName(state.path, state.path.find_last_of(L"/\\:") + 1, ending);
     state.file = WinHandle(
         ::CreateFileW(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (state.file.valid()) {

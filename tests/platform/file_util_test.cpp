@@ -1,6 +1,7 @@
 // Whole files: limits of reading, and a target that changes in one step or not at all.
 #include "platform/file_util.h"
 
+#include "platform/temporary_name.h"
 #include "tests/support/temp_folder.h"
 #include "tests/support/test.h"
 
@@ -94,6 +95,22 @@ TEST(AtomicFileTest, TheTargetChangesWithTheCommitOnly) {
   EXPECT_EQ(FilesIn(folder.Path("")), 1u);
   EXPECT_TRUE(file.Write(Of("late")));
   EXPECT_TRUE(file.Commit());
+}
+
+TEST(AtomicFileTest, ANameMayBeAsLongAsTheSystemTakes) {
+  const test::TempFolder folder;
+  const std::string umlaut = "\xC3\xBC";
+  const std::string name(kLongestName, 'n');
+  AtomicFile file;
+  ASSERT_FALSE(file.Open(folder.Add(name, "old")));
+  EXPECT_EQ(FilesIn(folder.Path("")), 2u);
+  ASSERT_FALSE(file.Write(Of("new")));
+  ASSERT_FALSE(file.Commit());
+  EXPECT_EQ(folder.Content(name), "new");
+  EXPECT_EQ(TemporaryName(std::string("d/n"), 2, std::string(".tmp")), "d/n.tmp");
+  // A character stays whole.
+  const std::string in_front = "d/" + std::string(250, 'n');
+  EXPECT_EQ(TemporaryName(in_front + umlaut, 2, std::string(".tmp")), in_front + ".tmp");
 }
 
 TEST(AtomicFileTest, WithoutACommitNothingIsLeft) {
