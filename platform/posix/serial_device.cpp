@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
 #include <termios.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -84,6 +85,7 @@ class Tty final : public SerialDevice {
   bool WaitQueueBelow(size_t level, steady_clock::time_point deadline) const;
   DeviceResult SetLine(int line, bool high);
 
+  const pid_t owner_ = ::getpid();  // children of a fork have a copy of all this
   FileDescriptor fd_;
   WakeEvent wake_;
   std::atomic<bool> gone_{false};
@@ -94,6 +96,7 @@ class Tty final : public SerialDevice {
 // A close with bytes still queued may block for half a minute in the kernel: give them the time of a write, no more,
 // and none where they have just had it.
 Tty::~Tty() {
+  if (::getpid() != owner_) return;  // the line goes on being the parent's
   const size_t queued = Queued();
   const auto time = stalled_ ? milliseconds(0) : milliseconds(queued) + kWriteConstant;
   if (queued > 0 && !WaitQueueBelow(1, steady_clock::now() + time)) ::tcflush(fd_.get(), TCOFLUSH);

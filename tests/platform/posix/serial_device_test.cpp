@@ -113,6 +113,18 @@ TEST_F(SerialDeviceTest, AChildOfAForkDoesNotKeepThePortBusy) {
   ::waitpid(child, nullptr, 0);
 }
 
+TEST_F(SerialDeviceTest, AChildOfAForkThatClosesDoesNotFreeTheParentsPort) {
+  const pid_t child = ::fork();
+  ASSERT_GE(child, 0);
+  if (child == 0) {
+    near_.reset();
+    ::_exit(0);
+  }
+  ASSERT_EQ(::waitpid(child, nullptr, 0), child);
+  EXPECT_FALSE(Open());
+  EXPECT_EQ(opened_, DeviceError::kBusy);
+}
+
 TEST_F(SerialDeviceTest, WhatIsNoSerialDeviceIsNoSuchPort) {
   const test::TempFolder folder;
   for (const auto& path : {folder.Add("file", "text"), folder.Path("missing"), std::string("/dev/null")}) {
