@@ -57,22 +57,20 @@ bool BatchWriter::Start(const std::function<CaptureSink()>& open, std::shared_pt
   if (state_ == CaptureState::kRunning || (state_ == CaptureState::kEnding && !ended_.WaitFor(0))) return false;
   thread_.Join();
   state_ = CaptureState::kNone;
+  bool started = false;
+  const AtExit close_what_is_not_written([&] {
+    if (!started) sink_ = {};
+  });
   sink_ = open();
-  if (!sink_ || !OnBegin()) {
-    sink_ = {};
-    return false;
-  }
+  if (!sink_ || !OnBegin()) return false;
   {
     const MutexLock lock(mutex_);
     stop_requested_ = false;
   }
   ended_.Reset();
-  if (!thread_.Start([this] { Run(); }, std::move(owner))) {
-    sink_ = {};
-    return false;
-  }
-  state_ = CaptureState::kRunning;
-  return true;
+  started = thread_.Start([this] { Run(); }, std::move(owner));
+  if (started) state_ = CaptureState::kRunning;
+  return started;
 }
 
 BatchWriter::Added BatchWriter::Add(std::span<const uint8_t> head, std::span<const uint8_t> body) {

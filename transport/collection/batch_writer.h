@@ -92,7 +92,7 @@ class BatchWriter {
 
   // Of the file just opened, on the thread that starts it; false when it takes not even its beginning.
   virtual bool OnBegin() = 0;
-  // On the writer's thread. The records of a batch count as pending until it comes back.
+  // On the writer's thread, which an exception would end. The records of a batch count as pending until it comes back.
   virtual void OnBatch(const Batch& batch) = 0;
   virtual void OnEnd() {}  // behind the last batch, on the same thread
 

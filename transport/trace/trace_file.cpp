@@ -1,4 +1,5 @@
 // Records become blocks of a pcapng file; the file's outcome is counted record by record.
+#include <new>
 #include <utility>
 
 #include "transport/line/hdlc_frame.h"
@@ -36,17 +37,30 @@ bool TraceFile::Begin(const TraceOrigin& origin, const Write& write) {
 }
 
 void TraceFile::Take(std::span<const uint8_t> pieces, const Write& write) {
-  for (TrafficPiece piece; piece.Take(pieces);) splitter_.Take(piece);
+  for (TrafficPiece piece; piece.Take(pieces);) {
+    try {
+      splitter_.Take(piece);
+    } catch (const std::bad_alloc&) {
+      outcome_.unmade += splitter_.Lose(piece);
+    }
+  }
   WriteOut(write);
 }
 
 void TraceFile::End(uint64_t microseconds, uint64_t lost_before, const Write& write) {
   splitter_.Finish(microseconds);
   WriteOut(write);
-  const uint64_t lost = lost_before + outcome_.unwritten + splitter_.cut() - cut_told_;
-  pcapng::AppendStatistics(buffer_, kFrameInterface, microseconds, received_[kFrameInterface] + lost, lost);
-  pcapng::AppendStatistics(buffer_, kByteInterface, microseconds, received_[kByteInterface], 0);
+  AppendStatistics(microseconds, lost_before + outcome_.unwritten + outcome_.unmade + splitter_.cut() - cut_told_);
   WriteOut(write);
+}
+
+void TraceFile::AppendStatistics(uint64_t microseconds, uint64_t lost) {
+  try {
+    pcapng::AppendStatistics(buffer_, kFrameInterface, microseconds, received_[kFrameInterface] + lost, lost);
+    pcapng::AppendStatistics(buffer_, kByteInterface, microseconds, received_[kByteInterface], 0);
+  } catch (const std::bad_alloc&) {
+    buffer_.clear();  // a trace can be read without them
+  }
 }
 
 TraceFile::Outcome TraceFile::TakeOutcome() {
@@ -55,7 +69,19 @@ TraceFile::Outcome TraceFile::TakeOutcome() {
   return std::exchange(outcome_, {});
 }
 
+// Whole, or not at all.
 void TraceFile::Append(const TrafficRecord& record) {
+  const size_t before = buffer_.size();
+  try {
+    AppendBlock(record);
+    done_.push_back({buffer_.size(), record.kind});
+  } catch (const std::bad_alloc&) {
+    buffer_.resize(before);
+    ++outcome_.unmade;
+  }
+}
+
+void TraceFile::AppendBlock(const TrafficRecord& record) {
   const bool is_frame = IsFrame(record.kind);
   pcapng::PacketBlock block;
   block.interface = is_frame ? kFrameInterface : kByteInterface;
@@ -66,7 +92,6 @@ void TraceFile::Append(const TrafficRecord& record) {
   block.comment = record.comment;
   block.data = record.bytes;
   pcapng::AppendPacket(buffer_, block);
-  done_.push_back({buffer_.size(), record.kind});
 }
 
 // Behind a block that is cut nothing more can be read: a file that took no more stays as it is.

@@ -11,16 +11,6 @@
 namespace kral {
 namespace {
 
-// How many frames end in these bytes, and whether they leave one unfinished. Flags side by side end nothing.
-uint32_t CountEnds(std::span<const uint8_t> bytes, bool& in_frame) {
-  uint32_t ends = 0;
-  for (const uint8_t byte : bytes) {
-    if (byte == kFrameFlag && in_frame) ++ends;
-    in_frame = byte != kFrameFlag;
-  }
-  return ends;
-}
-
 }  // namespace
 
 TraceWriter::~TraceWriter() {
@@ -66,8 +56,9 @@ void TraceWriter::Count(const TraceFile::Outcome& outcome) {
   frames_ += outcome.frames;
   bad_ += outcome.bad;
   others_ += outcome.others;
-  lost_ += outcome.cut + outcome.unwritten;
+  lost_ += outcome.cut + outcome.unwritten + outcome.unmade;
   if (outcome.unwritten != 0) TellLoss("the file cannot be written any more");
+  if (outcome.unmade != 0) TellLoss("out of memory");
 }
 
 void TraceWriter::TellLoss(const char* reason) {
@@ -121,7 +112,8 @@ bool TraceWriter::Save(const TraceOrigin& origin, const std::function<CaptureSin
   if (earlier.kind == TrafficPiece::Kind::kEarlier) file.Take(earlier.Head(), sink);
   for (const auto& piece : pieces) file.Take(piece, sink);
   file.End(MicrosecondsNow(), 0, sink);
-  return file.TakeOutcome().unwritten == 0;
+  const TraceFile::Outcome outcome = file.TakeOutcome();
+  return outcome.unwritten == 0 && outcome.unmade == 0;
 }
 
 TraceCounters TraceWriter::counters() const {
@@ -194,8 +186,7 @@ TrafficPiece TraceWriter::GapPiece(TrafficPiece piece) {
 
 void TraceWriter::Lose(const TrafficPiece& piece) {
   Gap& gap = gaps_[static_cast<size_t>(piece.direction)];
-  const bool framed = piece.content == PortContent::kFrames;
-  const uint32_t frames = framed ? CountEnds(piece.bytes, gap.in_frame) : 1;
+  const uint32_t frames = piece.CountLost(gap.in_frame);
   gap.bytes += std::max<size_t>(piece.bytes.size(), 1);
   gap.frames += frames;
   lost_ += frames;
@@ -208,8 +199,9 @@ void TraceWriter::Keep(const TrafficPiece& piece) {
     const auto head = piece.Head();
     std::vector<uint8_t> kept(head.begin(), head.end());
     kept.insert(kept.end(), piece.bytes.begin(), piece.bytes.end());
-    latest_size_ += kept.size();
+    const size_t size = kept.size();
     latest_.push_back(std::move(kept));
+    latest_size_ += size;
   } catch (const std::bad_alloc&) {
     latest_cut_ = true;  // like what is thrown out
   }

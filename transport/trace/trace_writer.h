@@ -49,13 +49,14 @@ class TraceFile {
   void Take(std::span<const uint8_t> pieces, const Write& write);
   void End(uint64_t microseconds, uint64_t lost_before, const Write& write);
 
-  // What became of the last Take and End.
+  // What became of the last Take and End, which no lack of memory keeps from going on.
   struct Outcome {
     uint64_t frames = 0;
     uint64_t bad = 0;
     uint64_t others = 0;
     uint64_t cut = 0;        // frames of which a gap has left only the end
     uint64_t unwritten = 0;  // records that the file did not take
+    uint64_t unmade = 0;     // frames and others that there was no memory for
   };
   Outcome TakeOutcome();
 
@@ -66,6 +67,8 @@ class TraceFile {
   };
 
   void Append(const TrafficRecord& record);
+  void AppendBlock(const TrafficRecord& record);
+  void AppendStatistics(uint64_t microseconds, uint64_t lost);
   void WriteOut(const Write& write);
 
   TrafficSplitter splitter_;

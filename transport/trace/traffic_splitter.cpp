@@ -2,6 +2,8 @@
 #include "transport/trace/traffic_splitter.h"
 
 #include <algorithm>
+#include <cstring>
+#include <new>
 #include <utility>
 
 #include "base/little_endian.h"
@@ -61,6 +63,17 @@ bool TrafficPiece::Take(std::span<const uint8_t>& heads_and_bytes) {
   return true;
 }
 
+// Flags side by side end nothing.
+uint32_t TrafficPiece::CountLost(bool& in_frame) const {
+  if (content != PortContent::kFrames) return 1;
+  uint32_t ends = 0;
+  for (const uint8_t byte : bytes) {
+    if (byte == kFrameFlag && in_frame) ++ends;
+    in_frame = byte != kFrameFlag;
+  }
+  return ends;
+}
+
 void TrafficSplitter::Reset() {
   sides_ = {};
   remark_.clear();
@@ -75,11 +88,44 @@ void TrafficSplitter::Take(const TrafficPiece& piece) {
     side = {};
     side.content = piece.content;
   }
+  MakeRoom(side, piece.bytes.size());
   if (piece.content == PortContent::kBytes) {
     Give(TrafficRecord::Kind::kBytes, piece, piece.bytes, "");
   } else {
     TakeFrames(side, piece);
   }
+}
+
+uint32_t TrafficSplitter::Lose(const TrafficPiece& piece) {
+  if (piece.kind != TrafficPiece::Kind::kBytes) return 1;
+  Side& side = At(piece.direction);
+  bool in_frame = !side.wire.empty() || side.behind_gap;
+  const uint32_t lost = piece.CountLost(in_frame);
+  if (piece.content != PortContent::kFrames) return lost;
+  side.wire.clear();
+  side.escape = false;
+  side.behind_gap = in_frame;
+  side.counts_cut = true;
+  Remark("frames are missing here: out of memory");
+  return lost;
+}
+
+// All that a piece needs, before anything of it is taken.
+void TrafficSplitter::MakeRoom(Side& side, size_t more) {
+  const size_t needed = side.wire.size() + more;
+  if (needed > side.wire.capacity()) side.wire.reserve(std::max(needed, 2 * side.wire.capacity()));
+  frame_.reserve(side.wire.capacity());
+}
+
+// Gaps without a frame between them are one to the reader.
+void TrafficSplitter::Remark(const char* text) {
+  if (remark_.ends_with(text)) return;
+  try {
+    remark_.reserve(remark_.size() + std::strlen(text) + 2);
+  } catch (const std::bad_alloc&) {
+    return;  // what passed matters more than what is said of it
+  }
+  remark_.append(remark_.empty() ? "" : "; ").append(text);
 }
 
 void TrafficSplitter::TakeFrames(Side& side, const TrafficPiece& piece) {
@@ -139,10 +185,6 @@ void TrafficSplitter::Flush(Side& side, const TrafficPiece& piece, const char* c
 }
 
 void TrafficSplitter::TakeEvent(const TrafficPiece& piece) {
-  // Gaps without a frame between them are one to the reader.
-  const auto remark = [this](const std::string& text) {
-    if (!remark_.ends_with(text)) remark_ += (remark_.empty() ? "" : "; ") + text;
-  };
   Side& side = At(piece.direction);
   switch (piece.kind) {
     case TrafficPiece::Kind::kOpened:
@@ -150,7 +192,7 @@ void TrafficSplitter::TakeEvent(const TrafficPiece& piece) {
         Flush(each, piece, "an unfinished frame");
         each.behind_gap = false;
       }
-      remark("the port was opened");
+      Remark("the port was opened");
       break;
     case TrafficPiece::Kind::kGivenUp:
       Flush(side, piece, "an unfinished frame");
@@ -167,12 +209,12 @@ void TrafficSplitter::TakeEvent(const TrafficPiece& piece) {
       side.escape = false;
       side.behind_gap = piece.of != 0;
       side.counts_cut = true;
-      remark("frames are missing here: the disk is too slow");
+      Remark("frames are missing here: the disk is too slow");
       break;
     case TrafficPiece::Kind::kEarlier:
       side.behind_gap = piece.of != 0;
       side.counts_cut = false;
-      remark("earlier traffic is not kept");
+      Remark("earlier traffic is not kept");
       break;
     case TrafficPiece::Kind::kBytes:
       break;
@@ -187,9 +229,8 @@ void TrafficSplitter::Finish(uint64_t microseconds) {
 
 void TrafficSplitter::Give(TrafficRecord::Kind kind, const TrafficPiece& piece, std::span<const uint8_t> bytes,
                            const char* comment) {
-  TrafficRecord record{kind, piece.direction, piece.microseconds, bytes, std::exchange(remark_, {})};
-  if (*comment != '\0') record.comment += (record.comment.empty() ? "" : "; ") + std::string(comment);
-  sink_(record);
+  if (*comment != '\0') Remark(comment);
+  sink_({kind, piece.direction, piece.microseconds, bytes, std::exchange(remark_, {})});
 }
 
 }  // namespace kral

@@ -38,6 +38,8 @@ struct TrafficPiece {
   std::array<uint8_t, kHeadSize> Head() const;
   // Takes one from the front of such heads with their bytes, which it points to. False at the end.
   bool Take(std::span<const uint8_t>& heads_and_bytes);
+  // What is lost with it: frames that end in it, or itself. `in_frame` tells, and is told, whether one has begun.
+  uint32_t CountLost(bool& in_frame) const;
 };
 
 struct TrafficRecord {
@@ -56,7 +58,10 @@ class TrafficSplitter {
 
   explicit TrafficSplitter(Sink sink) : sink_(std::move(sink)) {}
 
+  // Throws when there is no memory for a piece. It is to be given to Lose then, which makes it a gap and counts what is
+  // lost with it.
   void Take(const TrafficPiece& piece);
+  uint32_t Lose(const TrafficPiece& piece);
   void Finish(uint64_t microseconds);  // what has begun and not ended
   void Reset();
 
@@ -72,6 +77,8 @@ class TrafficSplitter {
     bool counts_cut = false;
   };
 
+  void MakeRoom(Side& side, size_t more);
+  void Remark(const char* text);
   Side& At(PortDirection direction) { return sides_[direction == PortDirection::kSent ? 1 : 0]; }
   void TakeFrames(Side& side, const TrafficPiece& piece);
   void EndFrame(Side& side, const TrafficPiece& piece);
