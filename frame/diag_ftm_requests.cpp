@@ -102,10 +102,11 @@ Reply Diag_FTM::Synchronise(uint32_t time_out_ms) {
     answer_owed_ = false;
     return ReplyKind::kExpected;
   }
+  if (reply.kind() == ReplyKind::kAborted) return Noted(reply, loopback, time_out_ms);
   const KeepFailure keep;  // the request whose answer is owed, rather than a loopback that nobody asked for
   Noted(reply, loopback, time_out_ms);
   // What went wrong is the loopback's. Of the request itself nothing has been sent, and nothing has come.
-  const bool is_the_lines = reply.kind() == ReplyKind::kGone || reply.kind() == ReplyKind::kAborted || reply.not_sent();
+  const bool is_the_lines = reply.kind() == ReplyKind::kGone || reply.not_sent();
   return is_the_lines ? reply.kind() : ReplyKind::kNotSent;
 }
 

@@ -9,10 +9,9 @@
 namespace kral::efs {
 namespace {
 
-// How long the answers to tries that were given up are waited for once the line is free: the handset answers in order,
-// so they come at once or never.
-constexpr std::chrono::milliseconds kLateAnswer{80};
-constexpr int kMostLateReplies = 64;  // a handset that never stops talking is not listened to for ever
+// How long the answer to a try that was given up is waited for once the line is free, whatever else comes: the handset
+// answers in order, so it comes at once or never.
+constexpr u32 kLateAnswerMs = 80;
 
 struct Kind {
   u16 open;
@@ -46,11 +45,15 @@ void NoteLateReply(Diag_FTM& phone, std::span<const u8> reply) {
 
 bool AwaitLateAnswers(Diag_FTM& phone, const OpenHandles& handles, u32 count) {
   const u32 left = handles.unanswered - std::min(count, handles.unanswered);
+  const u32 longest_ms = (handles.unanswered - left) * kLateAnswerMs;
+  const u32 start = phone.clock().TickMs();
   // Through a phone server no reply comes unasked.
-  for (int i = 0; i < kMostLateReplies && handles.unanswered > left && !phone.server_mode(); ++i) {
-    const auto record = phone.responses().PopWithin(kLateAnswer);
+  while (handles.unanswered > left && !phone.server_mode()) {
+    const u32 elapsed = phone.clock().TickMs() - start;
+    const auto record = phone.responses().PopWithin(std::chrono::milliseconds(longest_ms - std::min(elapsed, longest_ms)));
     if (!record) break;
     NoteLateReply(phone, *record);
+    if (phone.clock().TickMs() - start >= longest_ms) break;
   }
   if (handles.unanswered <= left) return true;
   phone.log().WriteLine(kLogErr, "EFS2 answer to an opening request is lost: the handset may keep a handle open");

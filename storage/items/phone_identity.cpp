@@ -43,6 +43,7 @@ void AppendIdentity(Diag_FTM& phone, pkv::PkvProperties& properties) {
     std::snprintf(text.data(), text.size(), "%08X", static_cast<unsigned>(serial));
     properties.values.emplace_back("ESN", text.data());
   }
+  if (NotedFailure() == KRAL_ERROR_ABORTED) return;
   std::array<std::array<char, CDiagPacket::kCapacity>, 2> texts{};
   uint32_t hardware = 0;
   uint32_t model = 0;

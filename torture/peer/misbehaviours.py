@@ -14,7 +14,7 @@ _EVERY = 0.02
 _LASTS = 3.0
 
 
-def _again(line: Line, make: Callable[[], bytes]) -> None:
+def again(line: Line, make: Callable[[], bytes]) -> None:
     """The same for longer than any time-out."""
     for i in range(int(_LASTS / _EVERY)):
         line.send(make(), i * _EVERY)
@@ -32,20 +32,20 @@ def misbehaviours(numbers: random.Random, late_by: float) -> Dict[str, Behaviour
     """By name. `late_by` is when a late answer comes, in seconds after its request."""
 
     def noise(request: bytes, line: Line) -> None:
-        _again(line, lambda: numbers.randbytes(_GARBAGE).replace(b"\x7e", b"\x7f"))
+        again(line, lambda: numbers.randbytes(_GARBAGE).replace(b"\x7e", b"\x7f"))
 
     def noise_with_flags(request: bytes, line: Line) -> None:
-        _again(line, lambda: b"\x7e".join(numbers.randbytes(20) for _ in range(_GARBAGE // 20)))
+        again(line, lambda: b"\x7e".join(numbers.randbytes(20) for _ in range(_GARBAGE // 20)))
 
     def other_code(request: bytes, line: Line) -> None:
-        _again(line, lambda: frame(b"\x99" + request[1:]))
+        again(line, lambda: frame(b"\x99" + request[1:]))
 
     def other_answer(request: bytes, line: Line) -> None:
         """The right code, and all else is wrong."""
-        _again(line, lambda: frame(request[:1] + numbers.randbytes(len(_answer(request, line)))))
+        again(line, lambda: frame(request[:1] + numbers.randbytes(len(_answer(request, line)))))
 
     def bad_check(request: bytes, line: Line) -> None:
-        _again(line, lambda: frame(_answer(request, line), spoil=0x1234))
+        again(line, lambda: frame(_answer(request, line), spoil=0x1234))
 
     def logs(request: bytes, line: Line) -> None:
         line.source = lambda: frame(log(0x1000, bytes(100))) * 8

@@ -56,6 +56,7 @@ Reply CKralThreadInterface::SendSync(std::span<const uint8_t> request, std::span
     LogWritten(time_out_ms, start);
     if (delay_ms != 0) clock_.SleepMs(delay_ms);
     const uint32_t read_start = clock_.TickMs();
+    aborted_at_.reset();
     reply = AwaitNext(room, expected_code, time_out_ms, is_own);
     const bool has_time = reply.came() && (reply || clock_.TickMs() - read_start <= time_out_ms);
     if (reply.kind() == ReplyKind::kGone) {
@@ -91,13 +92,9 @@ void CKralThreadInterface::ForgetReplies() {
 Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_code, uint32_t time_out_ms,
                                       const ReplyTest& is_own) {
   const uint32_t start = clock_.TickMs();
-  std::optional<uint32_t> aborted_at;
   for (uint32_t waited = 0;; waited = clock_.TickMs() - start) {
     if (waited > 0 && waited >= time_out_ms) return WhyNoReply();  // nothing but earlier replies
-    // A handset that goes on telling other things does not make the abort wait.
-    if (aborted() && !aborted_at) aborted_at = clock_.TickMs();
-    if (aborted_at && std::chrono::milliseconds(clock_.TickMs() - *aborted_at) >= kMomentBehindAbort)
-      return WhyNoReply();
+    if (IsMomentBehindAbortOver()) return WhyNoReply();
     const auto record = AwaitRecord(std::chrono::milliseconds(time_out_ms - waited));
     if (!record || record->empty()) return WhyNoReply();
     const auto bytes = CopyRecord(*record, room);
@@ -112,6 +109,13 @@ Reply CKralThreadInterface::AwaitNext(std::span<uint8_t> room, uint8_t expected_
     }
     log_.WriteLine(kLogErr, "Received reply (0x%X) to an earlier request", expected_code);
   }
+}
+
+// A handset that goes on telling other things does not make the abort wait, however often these are asked for.
+bool CKralThreadInterface::IsMomentBehindAbortOver() {
+  if (!aborted()) return false;
+  if (!aborted_at_) aborted_at_ = clock_.TickMs();
+  return std::chrono::milliseconds(clock_.TickMs() - *aborted_at_) >= kMomentBehindAbort;
 }
 
 std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {

@@ -1,0 +1,143 @@
+"""An abort ends what is under way on a handset within 250 ms, whatever the handset does meanwhile."""
+from __future__ import annotations
+
+import ctypes
+import threading
+import time
+from typing import Callable, Dict, List
+
+import kral
+from torture import calls
+from torture.bench import LINUX, MODES, WINDOWS, Bench, check, connected, last_error, set_time_outs
+from torture.peer.codec import frame
+from torture.peer.line import WORKS, Behaviour, Line, PtyLine
+from torture.peer.misbehaviours import again, begin, misbehaviours
+from torture.peer.phone import Phone
+
+NUMBER = 18
+TITLE = "An abort is back within 250 ms"
+SHORT = 36
+PLATFORMS = (LINUX, WINDOWS)
+AT_ONCE = 6
+_ALLOWED_MS = 250
+_TIME_OUT_MS = 4000
+_BEHIND_MS = 500
+_MOST_ANSWERED = 3
+_TALKS_S = 0.1
+_HANGS_S = 30.0
+_ALL = 0xFFFFFFFF
+_LARGE = bytes(range(256)) * 400
+
+
+def _back_up(handle: int) -> None:
+    status = ctypes.c_uint32()
+    kral.api().KRAL_PKV_ConfigureBackup(handle, 1, 900, 1)
+    kral.api().KRAL_BackupNVFromMobileToPKV(handle, f"aborted{handle}.pkv".encode(), ctypes.byref(status))
+
+
+def _abort_files(handle: int) -> None:
+    kral.api().KRAL_AbortEFS_Operation(handle)
+
+
+class _Job:
+    """That asks the handset who it is."""
+
+    def __init__(self) -> None:
+        self._number = 0
+        self._started = threading.Event()
+
+    def run(self, handle: int) -> None:
+        api = kral.api()
+        self._number = api.KRAL_VENTRIMS_Create()
+        check(bool(api.KRAL_VENTRIMS_AddIdentity(self._number) and
+                   api.KRAL_VENTRIMS_AddHandle(self._number, handle, None) and
+                   api.KRAL_VENTRIMS_Start(self._number)), f"no job: {last_error(0)}")
+        self._started.set()
+        api.KRAL_VENTRIMS_Wait(self._number, int(_HANGS_S * 1000))
+        api.KRAL_VENTRIMS_Free(self._number)
+
+    def abort(self, handle: int) -> None:
+        self._started.wait()
+        kral.api().KRAL_VENTRIMS_Abort(self._number, _ALL)
+
+
+_OPERATIONS: Dict[str, Callable[[int], object]] = {
+    "write": lambda handle: calls.write_file(handle, _LARGE),
+    "read": lambda handle: calls.read_file(handle, "/data/large", len(_LARGE)),
+    "list": calls.list_folder,
+    "sync": lambda handle: kral.api().KRAL_EFS2_SyncWithWait(handle, b"/", _TIME_OUT_MS),
+    "back-up": _back_up,
+}
+_JOB = "job"
+
+
+def _talkers(bench: Bench, case: str) -> Dict[str, Behaviour]:
+    numbers = bench.random(case)
+
+    def same_head(request: bytes, line: Line) -> None:
+        again(line, lambda: frame(request[:4] + numbers.randbytes(30)))
+
+    def other_files(request: bytes, line: Line) -> None:
+        again(line, lambda: frame(b"\x4b\x13\x63\0" + bytes(8)))
+    # A refusal, or a frame without its end, ends most of these by itself.
+    known = {name: behaviour for name, behaviour in misbehaviours(numbers, _HANGS_S).items()
+             if name not in ("refusal", "blocked", "head")}
+    return {**known, "same-head": same_head, "other-files": other_files}
+
+
+def cases(bench: Bench) -> List[str]:
+    return [f"{operation}/{name}/{mode}" for operation in [*_OPERATIONS, _JOB] for name in _talkers(bench, "")
+            for mode in MODES]
+
+
+class _Answers:
+    """To the first requests; what comes behind them meets the misbehaviour."""
+
+    def __init__(self, count: int, behaviour: Behaviour) -> None:
+        self._left, self._behaviour = count, behaviour
+        self.began = threading.Event()
+
+    def __call__(self, request: bytes, line: Line) -> None:
+        if self._left > 0:
+            self._left -= 1
+            return line.reply(request)
+        self._behaviour(request, line)
+        self.began.set()
+        return None
+
+
+def run(bench: Bench, case: str) -> None:
+    operation, name, mode = case.split("/")
+    job = _Job()
+    work: Callable[[int], object] = job.run if operation == _JOB else _OPERATIONS[operation]
+    abort = job.abort if operation == _JOB else _abort_files
+    phone = calls.prepare(Phone(calls.SERIAL))
+    phone.files.put("/data/large", _LARGE)
+    with bench.com_port() as port:
+        line = PtyLine(phone, bench.ports, port)
+        with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
+            answers = _Answers(bench.random(case).randrange(_MOST_ANSWERED + 1), _talkers(bench, case)[name])
+            begin(name, answers, line)
+            ended: List[float] = []
+            thread = threading.Thread(target=lambda: (work(handle), ended.append(time.monotonic())), daemon=True)
+            thread.start()
+            answers.began.wait(_HANGS_S)
+            time.sleep(_TALKS_S)
+            if not thread.is_alive():
+                return bench.count("ended before")
+            start = time.monotonic()
+            abort(handle)
+            thread.join(_HANGS_S)
+            check(bool(ended), "it hangs")
+            took = (ended[0] - start) * 1000
+            late = bench.lateness.between(start, ended[0]) * 1000
+            bench.count("aborts")
+            bench.note("longest, ms", took - late)
+            check(took - late <= _ALLOWED_MS, f"back after {took:.0f} ms; the machine was {late:.0f} ms late")
+            line.behaviour = WORKS
+            line.drop_pieces()
+            set_time_outs(handle, _BEHIND_MS)
+            # What has begun to come may take the first answer with it.
+            answers_behind = [calls.CALLS["serial"].run(handle) for _ in range(2)]
+            check((1, calls.SERIAL) in answers_behind, f"behind it: {answers_behind}, {last_error(handle)}")
+    return None
