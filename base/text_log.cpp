@@ -6,6 +6,7 @@
 #include <array>
 #include <cerrno>
 #include <cstdarg>
+#include <new>
 #include <system_error>
 #include <utility>
 
@@ -101,7 +102,14 @@ void DataLogFileHandler::WriteLine(uint32_t flag, const char* format, ...) {
 }
 
 void DataLogFileHandler::WriteBytes(uint32_t flag, const char* format, std::span<const uint8_t> bytes) {
-  if (Wants(flag)) WriteLine(flag, format, static_cast<int>(bytes.size()), HexDump(bytes).c_str());
+  if (!Wants(flag)) return;
+  std::string dump;
+  try {
+    dump = HexDump(bytes);
+  } catch (const std::bad_alloc&) {
+    // The line goes without them: no packet may be lost for the text log.
+  }
+  WriteLine(flag, format, static_cast<int>(bytes.size()), dump.c_str());
 }
 
 void DataLogFileHandler::WriteText(uint32_t flag, const char* text) {

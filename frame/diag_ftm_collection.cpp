@@ -16,6 +16,9 @@ TrafficCounters Diag_FTM::counters() {
   counters.packets_received = line.packets_received + player().played_in_all();
   counters.bad_fcs = line.bad_fcs;
   counters.oversized += line.oversized;
+  counters.collected += line.collected;
+  counters.dropped_responses += line.dropped_responses;
+  counters.dropped_asynchronous += line.dropped_asynchronous;
   counters.waiting = dispatcher().backlog();
   counters.most_waiting = dispatcher().greatest_backlog();
   return counters;

@@ -10,6 +10,7 @@ import struct
 from typing import Any, Callable, Dict, Tuple
 
 import kral
+from kral._api import KRAL_TRAFFIC_COUNTERS
 from torture.peer.phone import EVENTS, Phone
 
 SERIAL = 0x80000001
@@ -45,6 +46,12 @@ def prepare(phone: Phone) -> Phone:
 def _api(name: str) -> Callable[..., int]:
     function: Callable[..., int] = getattr(kral.api(), name)
     return function
+
+
+def counters(handle: int) -> KRAL_TRAFFIC_COUNTERS:
+    counted = KRAL_TRAFFIC_COUNTERS()
+    _api("KRAL_GetTrafficCounters")(handle, ctypes.byref(counted))
+    return counted
 
 
 def plain(name: str, *arguments: Any) -> Callable[[int], Outcome]:

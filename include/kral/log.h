@@ -145,7 +145,7 @@ typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t packets_received; /**< made of the bytes, answers included, or played from a file */
   uint64_t collected;        /**< packets put into the log queue */
   uint64_t events;           /**< events put into the event queue */
-  uint64_t dropped_logs;     /**< thrown out of the full log queue before they were read */
+  uint64_t dropped_logs;     /**< thrown out of the full log queue before they were read, or no memory for them */
   uint64_t dropped_events;   /**< ... out of the event queue */
   uint64_t dropped_answers;  /**< ... out of the queue of answers */
   uint64_t dropped_off;      /**< packets that came while collection was off */

@@ -8,7 +8,6 @@ import time
 from typing import List
 
 import kral
-from kral import _api
 from torture import calls
 from torture.bench import MODES, Bench, check, connected, wait_until
 from torture.peer.codec import FLAG, escape
@@ -81,12 +80,6 @@ class _Reader:
                 time.sleep(0.001)
 
 
-def _counters(handle: int) -> _api.KRAL_TRAFFIC_COUNTERS:
-    counters = _api.KRAL_TRAFFIC_COUNTERS()
-    kral.api().KRAL_GetTrafficCounters(handle, ctypes.byref(counters))
-    return counters
-
-
 def _command(bench: Bench, handle: int, number: int) -> None:
     name = _COMMANDS[number % len(_COMMANDS)]
     begin = time.monotonic()
@@ -124,11 +117,11 @@ def _flood(bench: Bench, handle: int, flood: _Flood, total: int) -> None:
     while flood.sent < total or number == 0:
         _command(bench, handle, number)
         number += 1
-    wait_until(lambda: int(_counters(handle).collected) >= total, 30, "the logs do not come")
+    wait_until(lambda: int(calls.counters(handle).collected) >= total, 30, "the logs do not come")
 
 
 def _judge(handle: int, reader: _Reader, total: int) -> None:
-    counters = _counters(handle)
+    counters = calls.counters(handle)
     check(counters.collected == total, f"{counters.collected} collected of {total} logs")
     check(reader.disorder == "", reader.disorder)
     check(reader.read + counters.dropped_logs == total,

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <new>
 #include <utility>
 
 #include "base/guarded_call.h"
@@ -34,7 +35,12 @@ CKralEventListener::CKralEventListener(PacketQueue& responses, PacketQueue& asyn
     : responses_(responses), asynchronous_(asynchronous), events_(events), log_(log) {}
 
 void CKralEventListener::OnPacket(std::span<const uint8_t> packet) {
-  TakePacket({packet.begin(), packet.end()});
+  try {
+    TakePacket({packet.begin(), packet.end()});
+  } catch (const std::bad_alloc&) {  // of the copy: nothing behind it lets one out
+    const bool is_answer = packet.empty() || !IsAsynchronousCode(packet[0]);
+    (is_answer ? responses_ : asynchronous_).Lose();
+  }
   OnBatchEnd();
 }
 
@@ -103,16 +109,22 @@ void CKralEventListener::QueueEvents(std::span<const uint8_t> event_report, cons
   const bool logging = log_.Wants(kLogAsync);
   EventReportReader reader(event_report);
   while (const auto event = reader.Next()) {
-    if (logging) {
-      log_.WriteLine(kLogAsync, "Event ID: %d, %s", event->id, EventText(event->id).c_str());
-      log_.WriteLine(kLogAsync, " Event payload data: %s", HexDump(event->payload).c_str());
-    }
+    if (logging) LogEvent(*event);
     if (callbacks.event != nullptr) {
       KRAL_EVENT record;
       std::memcpy(&record, event->record.bytes.data(), sizeof(record));
       CallGuarded([&] { callbacks.event(&record, callbacks.value); });
     }
     events_.Stage(event->record);
+  }
+}
+
+void CKralEventListener::LogEvent(const Event& event) {
+  try {
+    log_.WriteLine(kLogAsync, "Event ID: %d, %s", event.id, EventText(event.id).c_str());
+    log_.WriteLine(kLogAsync, " Event payload data: %s", HexDump(event.payload).c_str());
+  } catch (const std::bad_alloc&) {
+    // The text log goes without it.
   }
 }
 

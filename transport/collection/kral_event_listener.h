@@ -27,6 +27,8 @@ class NameTables;
 using RawPacketCallback = void (*)(uint32_t length, const uint8_t* bytes, uintptr_t value);
 
 // What takes collected traffic as it is queued. Each is called with the value, on the thread that brings the packet.
+struct Event;
+
 struct CollectionCallbacks {
   KRAL_RAW_PACKET_CALLBACK packet = nullptr;
   KRAL_EVENT_CALLBACK event = nullptr;
@@ -93,6 +95,7 @@ class CKralEventListener : public PacketListener, public PortWatcher {
   void QueueResponse(Packet packet, const char* format);
   void QueueAsynchronous(Packet packet);
   void QueueEvents(std::span<const uint8_t> event_report, const CollectionCallbacks& callbacks);
+  void LogEvent(const Event& event);
   CollectionCallbacks collection_callbacks();
   void NoteCallbacks() KRAL_REQUIRES(callback_mutex_);
   std::string EventText(uint16_t id) const;

@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <deque>
+#include <new>
 #include <optional>
 #include <type_traits>
 #include <utility>
@@ -37,12 +38,20 @@ class BoundedQueue {
   void Stage(Record record) {
     constexpr size_t kManyRecords = 512;
     bool many = false;
-    {
+    try {
       const MutexLock staging(staging_mutex_);
       staged_.push_back(std::move(record));
       many = staged_.size() >= kManyRecords;
+    } catch (const std::bad_alloc&) {
+      Lose();
     }
     if (many) WakeReaders();
+  }
+  // Counts a record that there is no memory for.
+  void Lose() {
+    const MutexLock lock(mutex_);
+    ++pushed_;
+    ++dropped_;
   }
   void Publish() {
     const MutexLock staging(staging_mutex_);
@@ -137,8 +146,8 @@ class BoundedQueue {
     ++pushed_;
     try {
       records_.push_back(std::move(record));
-    } catch (...) {
-      ++dropped_;  // out of memory
+    } catch (const std::bad_alloc&) {
+      ++dropped_;
       return;
     }
     if (records_.size() <= capacity_) return;

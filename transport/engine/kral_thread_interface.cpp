@@ -2,6 +2,7 @@
 // packets to the dispatcher. Requests are in kral_thread_requests.cpp, the thread's own work in receive_loop.cpp.
 #include "transport/engine/kral_thread_interface.h"
 
+#include <new>
 #include <utility>
 
 #include "base/text_log.h"
@@ -20,6 +21,10 @@ constexpr uint32_t kLastPacketsMs = 20;
 bool IsSame(const UserTransport& a, const UserTransport& b) {
   return a.handle == b.handle && a.context == b.context && a.send == b.send && a.receive == b.receive &&
          a.flush == b.flush;
+}
+
+bool IsAnswer(std::span<const uint8_t> packet) {
+  return packet.empty() || !IsAsynchronousCode(packet.front());
 }
 
 }  // namespace
@@ -48,8 +53,12 @@ void CKralThreadInterface::Attach(CKralEvents* dispatcher, PacketQueue* response
 void CKralThreadInterface::DispatcherFeed::OnPacket(std::span<const uint8_t> packet) {
   // The dispatcher begins on the first ones while a long chunk is still being split.
   constexpr size_t kManyPackets = 64;
-  gathered_.emplace_back(packet.begin(), packet.end());
-  const bool is_answer = packet.empty() || !IsAsynchronousCode(packet.front());
+  const bool is_answer = IsAnswer(packet);
+  try {
+    gathered_.emplace_back(packet.begin(), packet.end());
+  } catch (const std::bad_alloc&) {
+    Lose(packet);
+  }
   if (is_answer) {
     loop->turn().NoteReply();
   } else {
@@ -64,9 +73,19 @@ void CKralThreadInterface::DispatcherFeed::OnBatchEnd() {
   packets.fetch_add(gathered_.size(), std::memory_order_relaxed);
   if (dispatcher != nullptr && !dispatcher->DispatchHere(gathered_)) {
     loop->turn().NoteOther();
-    dispatcher->PushAll(gathered_, loop->on_thread());
+    try {
+      dispatcher->PushAll(gathered_, loop->on_thread());
+    } catch (const std::bad_alloc&) {
+      packets.fetch_sub(gathered_.size(), std::memory_order_relaxed);
+      for (const Packet& packet : gathered_) Lose(packet);
+    }
   }
   gathered_.clear();
+}
+
+void CKralThreadInterface::DispatcherFeed::Lose(std::span<const uint8_t> packet) {
+  packets.fetch_add(1, std::memory_order_relaxed);
+  (IsAnswer(packet) ? lost_answers : lost_others).fetch_add(1, std::memory_order_relaxed);
 }
 
 bool CKralThreadInterface::Open(uint32_t port_number, const UserTransport& user, std::shared_ptr<void> owner) {
@@ -255,6 +274,9 @@ TrafficCounters CKralThreadInterface::counters() const {
   TrafficCounters counters;
   counters.bytes_received = loop_.bytes_received();
   counters.packets_received = feed_.packets.load(std::memory_order_relaxed);
+  counters.dropped_responses = feed_.lost_answers.load(std::memory_order_relaxed);
+  counters.dropped_asynchronous = feed_.lost_others.load(std::memory_order_relaxed);
+  counters.collected = counters.dropped_asynchronous;
   counters.bad_fcs = splitter_.deframer().bad_fcs();
   counters.oversized = splitter_.deframer().oversized();
   return counters;

@@ -125,8 +125,12 @@ class CKralThreadInterface {
     CKralEvents* dispatcher = nullptr;
     ReceiveLoop* loop = nullptr;
     std::atomic<uint64_t> packets{0};
+    // That there was no memory for.
+    std::atomic<uint64_t> lost_answers{0};
+    std::atomic<uint64_t> lost_others{0};
 
    private:
+    void Lose(std::span<const uint8_t> packet);
     std::vector<Packet> gathered_;
   };
 
@@ -140,6 +144,7 @@ class CKralThreadInterface {
   void DropPartial();
 
   bool Transmit(std::span<const uint8_t> request, uint32_t time_out_ms);
+  bool IsMomentBehindAbortOver();
   std::optional<Packet> AwaitRecord(std::chrono::milliseconds time_out);
   std::optional<Packet> PopWithin(std::chrono::milliseconds time_out);
   Reply PollRecord(std::span<uint8_t> room, uint32_t time_out_ms);
@@ -158,7 +163,8 @@ class CKralThreadInterface {
   std::atomic<bool> connected_{false};
   std::atomic<bool> null_port_{false};
   std::atomic<bool> waits_ended_{false};      // since the port was opened
-  const std::atomic<bool>* abort_ = nullptr;  // both of whoever holds the request lock
+  const std::atomic<bool>* abort_ = nullptr;  // these three are of whoever holds the request lock
+  std::optional<uint32_t> aborted_at_;        // as the request that was sent last has seen it
   std::function<void(std::span<const uint8_t>)> unclaimed_;
   uint64_t garbled_before_ = 0;  // the request that was sent last
   std::atomic<bool> user_defined_{false};

@@ -11,7 +11,7 @@ struct TrafficCounters {
   uint64_t packets_received = 0;  // handed to the dispatcher
   uint64_t collected = 0;         // put into the asynchronous queue
   uint64_t events = 0;            // put into the event queue
-  // The oldest of a full queue; taken out of it before anybody read them.
+  // The oldest of a full queue, taken out of it before anybody read them; and what there was no memory for.
   uint64_t dropped_asynchronous = 0;
   uint64_t dropped_events = 0;
   uint64_t dropped_responses = 0;
