@@ -4,6 +4,7 @@ logs, and has its cable pulled, all at random. What a call gives must be right; 
 from __future__ import annotations
 
 import ctypes
+import dataclasses
 import os
 import pathlib
 import threading
@@ -11,7 +12,7 @@ import time
 from typing import Callable, Dict, List
 
 import kral
-from torture import calls
+from torture import calls, process
 from torture.bench import MODES, Bench, Broken, check, last_error, set_time_outs
 from torture.peer.codec import frame
 from torture.peer.line import PtyLine
@@ -24,10 +25,12 @@ _TIME_OUT_MS = 8000
 _FILE = 60000
 _LOGS = 2000
 _COMMANDS = ("serial", "read-item", "peek", "file-status", "channel", "read-file", "put-item", "log-ranges")
-# The first of the time fills allocators and caches.
-_WARM = 0.2
-# Of all that while, and of the allocator's noise.
-_ALLOWED_KIB = 4096
+# The least of these shares of the time is compared: what is under way at one moment is not in it. The first fills
+# caches.
+_BEFORE, _AFTER = (0.2, 0.4), (0.8, 1.0)
+_ALLOWED_KIB = 2048
+# The allocator keeps free memory for each of its arenas, and takes more of it as more coincides.
+_ALLOWED_OF_PROCESS_KIB = 16384
 _WATCH_S = 5.0
 _LONGEST_DEED_S = 120.0
 
@@ -135,16 +138,28 @@ class _Station:
         self._line.close()
 
 
+@dataclasses.dataclass(frozen=True)
+class _Sample:
+    share: float
+    allocated: int
+    of_process: int
+
+
+def _gained(samples: List[_Sample], what: str) -> int:
+    before, after = ([int(getattr(sample, what)) for sample in samples if begin <= sample.share <= end]
+                     for begin, end in (_BEFORE, _AFTER))
+    check(bool(before and after), "too short to tell what grew")
+    return min(after) - min(before)
+
+
 def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Thread], end: float) -> List[str]:
     """What grew, or hung."""
     begin = time.monotonic()
-    before: Dict[str, int] = {}
-    warm = begin + (end - begin) * _WARM
+    samples: List[_Sample] = []
     while any(thread.is_alive() for thread in threads):
         time.sleep(_WATCH_S)
         now, at = bench.state(), time.monotonic()
-        if not before and at > warm:
-            before = now
+        samples.append(_Sample((at - begin) / (end - begin), process.allocated(), now["memory"]))
         bench.note("most memory, KiB", now["memory"])
         bench.note("most descriptors", now["descriptors"])
         bench.note("most threads", now["threads"])
@@ -153,10 +168,11 @@ def _watch(bench: Bench, stations: List[_Station], threads: List[threading.Threa
             return [f"{len(hung)} handsets hang"]
         if at > end:
             break
-    after = bench.state()
-    bench.note("KiB gained", after["memory"] - before.get("memory", after["memory"]))
-    grown = after["memory"] - before.get("memory", after["memory"])
-    return [f"{grown} KiB more since a fifth of the time"] if grown > _ALLOWED_KIB else []
+    gained, of_process = (_gained(samples, what) for what in ("allocated", "of_process"))
+    bench.note("KiB in use gained", gained)
+    bench.note("KiB of the process gained", of_process)
+    grown = gained > _ALLOWED_KIB or of_process > _ALLOWED_OF_PROCESS_KIB
+    return [f"{gained} KiB more in use, {of_process} KiB in the process"] if grown else []
 
 
 def run(bench: Bench, minutes: float) -> List[str]:
