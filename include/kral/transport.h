@@ -149,10 +149,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_ConfigureCallBacks(KRAL_HANDLE handle, KRAL_RAW_
  *
  * A handset answers in order, and may answer late: after the time-out. Replies that repeat their request (NV items,
  * memory, subsystem requests) are compared with it, factory test commands up to their command id, and a late one is
- * passed over. Others repeat nothing (switches, error log, KRAL_SendSync): there a late reply would be taken for the next
- * request's. With this on the library sends a loopback with a number of its own first, and passes over everything in
- * front of its echo. When the echo does not come within the time-out of the request, that counts as not answered and is
- * not sent. An answer to KRAL_SendASync, or to KRAL_SendRAW after its time-out, counts as late, too. KRAL_SendRAW
+ * passed over. Others repeat nothing (switches, error log, KRAL_SendSync): there a late reply would be taken for the
+ * next request's. With this on the library sends a loopback with a number of its own first, and passes over everything
+ * in front of its echo. When the echo does not come within the time-out of the request, that counts as not answered and
+ * is not sent. An answer to KRAL_SendASync, or to KRAL_SendRAW after its time-out, counts as late, too. KRAL_SendRAW
  * itself and the download functions send no loopback.
  *
  * Off by default; always on in backups, restores, comparisons and the NV tool.

@@ -1,6 +1,6 @@
 // The small files and the folders in which Linux tells of its devices and processes. Where something cannot be read,
-// nothing is there; where there is no memory, all of these throw std::bad_alloc. (Streams and directory iterators of the
-// standard library take the one for the other, or end the process.)
+// nothing is there; where there is no memory, all of these throw std::bad_alloc. (Streams and directory iterators of
+// the standard library take the one for the other, or end the process.)
 #ifndef KRAL_PLATFORM_POSIX_SYSTEM_FILES_H
 #define KRAL_PLATFORM_POSIX_SYSTEM_FILES_H
 

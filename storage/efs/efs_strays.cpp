@@ -48,12 +48,12 @@ bool AwaitLateAnswers(Diag_FTM& phone, const OpenHandles& handles, u32 count) {
   const u32 longest_ms = (handles.unanswered - left) * kLateAnswerMs;
   const u32 start = phone.clock().TickMs();
   // Through a phone server no reply comes unasked.
-  while (handles.unanswered > left && !phone.server_mode()) {
-    const u32 elapsed = phone.clock().TickMs() - start;
-    const auto record = phone.responses().PopWithin(std::chrono::milliseconds(longest_ms - std::min(elapsed, longest_ms)));
+  u32 elapsed = 0;
+  while (handles.unanswered > left && elapsed < longest_ms && !phone.server_mode()) {
+    const auto record = phone.responses().PopWithin(std::chrono::milliseconds(longest_ms - elapsed));
     if (!record) break;
     NoteLateReply(phone, *record);
-    if (phone.clock().TickMs() - start >= longest_ms) break;
+    elapsed = phone.clock().TickMs() - start;
   }
   if (handles.unanswered <= left) return true;
   phone.log().WriteLine(kLogErr, "EFS2 answer to an opening request is lost: the handset may keep a handle open");

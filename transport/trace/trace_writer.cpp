@@ -9,9 +9,6 @@
 #include "transport/line/hdlc_frame.h"
 
 namespace kral {
-namespace {
-
-}  // namespace
 
 TraceWriter::~TraceWriter() {
   Stop();
