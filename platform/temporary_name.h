@@ -2,7 +2,10 @@
 #ifndef KRAL_PLATFORM_TEMPORARY_NAME_H
 #define KRAL_PLATFORM_TEMPORARY_NAME_H
 
+#include <array>
 #include <cstddef>
+#include <cstdio>
+#include <cstring>
 #include <string>
 
 namespace kral {
@@ -18,9 +21,12 @@ inline bool GoesOn(wchar_t unit) {
   return (static_cast<unsigned long>(unit) & 0xFC00U) == 0xDC00U;
 }
 
-// `path` with `ending` behind it. `name` is where the name begins in it, which is cut where it would be too long.
+// PATH.PROCESS.NUMBER.tmp. `name` is where the name begins in the path; it is cut where it would be too long.
 template <class String>
-String TemporaryName(const String& path, size_t name, const String& ending) {
+String TemporaryName(const String& path, size_t name, unsigned long process, int number) {
+  std::array<char, 48> text{};
+  std::snprintf(text.data(), text.size(), ".%lu.%d.tmp", process, number);
+  const String ending(text.data(), text.data() + std::strlen(text.data()));
   if (path.size() - name + ending.size() <= kLongestName) return path + ending;
   size_t end = name + kLongestName - ending.size();
   while (end > name && GoesOn(path[end])) --end;

@@ -198,8 +198,7 @@ std::error_code AtomicFile::Open(const std::string& path) {
   state.failed = FindTarget(path, state.path, mode);
   if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
-    const std::string ending = std::string(".") + std::to_string(::getpid()) + "." + std::to_string(attempt) + ".tmp";
-    state.temporary = TemporaryName(state.path, NameBegin(state.path), ending);
+    state.temporary = TemporaryName(state.path, NameBegin(state.path), static_cast<unsigned long>(::getpid()), attempt);
     state.file =
         FileDescriptor(::open(state.temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, mode.value_or(0666)));
     if (state.file.valid()) {

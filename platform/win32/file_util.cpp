@@ -214,9 +214,7 @@ std::error_code AtomicFile::Open(const std::string& path) {
   state.failed = FindTarget(path, state.path);
   if (state.failed) return state.failed;
   for (int attempt = 0; attempt < kNameAttempts; ++attempt) {
-    const std::wstring ending =
-        std::wstring(L".") + std::to_wstring(::GetCurrentProcessId()) + L"." + std::to_wstring(attempt) + L".tmp";
-    state.temporary = TemporaryName(state.path, state.path.find_last_of(L"/\\:") + 1, ending);
+    state.temporary = TemporaryName(state.path, state.path.find_last_of(L"/\\:") + 1, ::GetCurrentProcessId(), attempt);
     state.file = WinHandle(
         ::CreateFileW(state.temporary.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW, FILE_ATTRIBUTE_NORMAL, nullptr));
     if (state.file.valid()) {

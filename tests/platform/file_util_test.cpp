@@ -107,10 +107,10 @@ TEST(AtomicFileTest, ANameMayBeAsLongAsTheSystemTakes) {
   ASSERT_FALSE(file.Write(Of("new")));
   ASSERT_FALSE(file.Commit());
   EXPECT_EQ(folder.Content(name), "new");
-  EXPECT_EQ(TemporaryName(std::string("d/n"), 2, std::string(".tmp")), "d/n.tmp");
+  EXPECT_EQ(TemporaryName(std::string("d/n"), 2, 12, 3), "d/n.12.3.tmp");
   // A character stays whole.
-  const std::string in_front = "d/" + std::string(250, 'n');
-  EXPECT_EQ(TemporaryName(in_front + umlaut, 2, std::string(".tmp")), in_front + ".tmp");
+  const std::string in_front = "d/" + std::string(245, 'n');
+  EXPECT_EQ(TemporaryName(in_front + umlaut, 2, 12, 3), in_front + ".12.3.tmp");
 }
 
 TEST(AtomicFileTest, WithoutACommitNothingIsLeft) {
