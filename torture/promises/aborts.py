@@ -106,6 +106,17 @@ class _Answers:
         return None
 
 
+class _Deed(threading.Thread):
+    def __init__(self, work: Callable[[int], object], handle: int) -> None:
+        super().__init__(daemon=True)
+        self._work, self._handle = work, handle
+        self.ended = 0.0
+
+    def run(self) -> None:
+        self._work(self._handle)
+        self.ended = time.monotonic()
+
+
 def run(bench: Bench, case: str) -> None:
     operation, name, mode = case.split("/")
     job = _Job()
@@ -118,26 +129,29 @@ def run(bench: Bench, case: str) -> None:
         with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
             answers = _Answers(bench.random(case).randrange(_MOST_ANSWERED + 1), _talkers(bench, case)[name])
             begin(name, answers, line)
-            ended: List[float] = []
-            thread = threading.Thread(target=lambda: (work(handle), ended.append(time.monotonic())), daemon=True)
-            thread.start()
+            deed = _Deed(work, handle)
+            deed.start()
             answers.began.wait(_HANGS_S)
             time.sleep(_TALKS_S)
-            if not thread.is_alive():
-                return bench.count("ended before")
-            start = time.monotonic()
-            abort(handle)
-            thread.join(_HANGS_S)
-            check(bool(ended), "it hangs")
-            took = (ended[0] - start) * 1000
-            late = bench.lateness.between(start, ended[0]) * 1000
-            bench.count("aborts")
-            bench.note("longest, ms", took - late)
-            check(took - late <= _ALLOWED_MS, f"back after {took:.0f} ms; the machine was {late:.0f} ms late")
+            if deed.is_alive():
+                _abort(bench, deed, lambda: abort(handle))
+            else:
+                bench.count("ended before")
             line.behaviour = WORKS
             line.drop_pieces()
             set_time_outs(handle, _BEHIND_MS)
             # What has begun to come may take the first answer with it.
-            answers_behind = [calls.CALLS["serial"].run(handle) for _ in range(2)]
-            check((1, calls.SERIAL) in answers_behind, f"behind it: {answers_behind}, {last_error(handle)}")
-    return None
+            behind = [calls.CALLS["serial"].run(handle) for _ in range(2)]
+            check((1, calls.SERIAL) in behind, f"behind it: {behind}, {last_error(handle)}")
+
+
+def _abort(bench: Bench, deed: _Deed, abort: Callable[[], None]) -> None:
+    start = time.monotonic()
+    abort()
+    deed.join(_HANGS_S)
+    check(not deed.is_alive(), "it hangs")
+    took = (deed.ended - start) * 1000
+    late = bench.lateness.between(start, deed.ended) * 1000
+    bench.count("aborts")
+    bench.note("longest, ms", took - late)
+    check(took - late <= _ALLOWED_MS, f"back after {took:.0f} ms; the machine was {late:.0f} ms late")
