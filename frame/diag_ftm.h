@@ -80,7 +80,7 @@ class Diag_FTM {
 
   // One call of the caller's, under that lock: where the cable was pulled and plugged in again before it, sooner than
   // anybody has noticed, its first request goes to the device that is there now. Further ones, and those of jobs, fail
-  // as lost: half of a transfer must not go to whoever came back.
+  // as lost: half of a transfer must not go to whoever came back. Where whoever it is will do, IsPortOpen takes him.
   class Call {
    public:
     explicit Call(Diag_FTM& phone) : lock_(phone.request_lock_), phone_(phone) { phone_.at_calls_begin_ = true; }

@@ -26,6 +26,8 @@ bool MayComeLater(const Reply& reply) {
 template <class SendOnce>
 Reply Diag_FTM::OverOpenPort(SendOnce send) {
   const bool may_be_another = std::exchange(at_calls_begin_, false);
+  // Nor where the device has gone between two requests, and another one is there already.
+  if (!may_be_another && device_gone()) return ReplyKind::kGone;
   if (!IsPortOpen()) return ReplyKind::kPortClosed;
   Reply reply = send();
   if (reply.kind() == ReplyKind::kGoneUnsent && may_be_another && IsPortOpen()) reply = send();

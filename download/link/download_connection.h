@@ -27,6 +27,8 @@ class DownloadConnection {
 
   // Waits for a further reply to the request of the last exchange.
   Reply AwaitReply(uint8_t expected_code, uint32_t time_out_ms);
+  // Where the device has gone: takes the one that is there now, if there is one.
+  void TakeWhoIsThere() { phone_.IsPortOpen(); }
   // What has come and is coming in at this moment answers nothing that is still to be sent.
   void ForgetReplies() { phone_.transport().ForgetReplies(); }
 

@@ -62,6 +62,7 @@ std::optional<HelloReply> Hello(download::DownloadConnection& connection, const 
   const uint32_t nop_ms = std::min(kNopMs, settings.handshake_limit_ms);
   for (int i = 1; i <= kNops && !connection.aborted(); ++i) {
     log.WriteLine(kLogRet, "Sending NOP to flash programmer, %d", i);
+    connection.TakeWhoIsThere();  // a programmer comes as a new device
     connection.Exchange(kNopRequest, kNopReply, nop_ms);
   }
   std::optional<HelloReply> answer;
@@ -69,6 +70,7 @@ std::optional<HelloReply> Hello(download::DownloadConnection& connection, const 
   for (uint32_t i = 1; i <= tries && !answer && !connection.aborted(); ++i) {
     if (i > 1 && !connection.Pause(settings.hello_retry_delay_ms)) break;
     log.WriteLine(kLogRet, "Sending HELLO to flash programmer, %d", static_cast<int>(i));
+    connection.TakeWhoIsThere();
     answer = ExchangeHello(connection, variant, std::min(kHelloMs, settings.handshake_limit_ms));
   }
   const HelloReply limits = answer.value_or(HelloReply{});

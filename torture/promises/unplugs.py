@@ -5,7 +5,7 @@ import ctypes
 import os
 import threading
 import time
-from typing import Any, Callable, Dict, List
+from typing import Any, Callable, Dict, List, Optional
 
 import kral
 from kral import _api
@@ -30,6 +30,8 @@ _BEHIND = "switched"
 _BYTES = bytes(range(256)) * 40
 _REPLUGS = 50
 _OFFLINE = 1
+# Another handset, so many seconds after the cable was pulled: before or behind the library's look around.
+_STRANGERS = {"stranger": 0.1, "quick-stranger": 0.0}
 # The delay that follows the switch.
 _OFFLINE_DELAY, _OFFLINE_DELAY_MS = 13, 3000
 
@@ -69,7 +71,7 @@ _OPERATIONS: Dict[str, Callable[[int], calls.Outcome]] = {
 
 def cases(bench: Bench) -> List[str]:
     busy = [f"{name}/{mode}/{where}" for name in _OPERATIONS for mode in MODES
-            for where in ("same", "other", "stranger")]
+            for where in ("same", "other", *_STRANGERS)]
     return busy + [f"{name}/{mode}/{where}" for name in ("idle", "wait-log") for mode in MODES
                    for where in ("same", "other")] + [f"at-once/{mode}/same" for mode in MODES]
 
@@ -88,13 +90,13 @@ def _phone(serial: int = calls.SERIAL) -> Phone:
     return phone
 
 
-def _plug_stranger(line: PtyLine, asked: List[bytes]) -> None:
-    """Another handset comes on the same port soon, and notes what it is asked."""
+def _plug_stranger(line: PtyLine, asked: List[bytes], after: float) -> None:
+    """Another handset comes on the same port, and notes what it is asked."""
     def behaviour(request: bytes, _: Line) -> None:
         asked.append(request)
         line.reply(request)
 
-    time.sleep(0.1)
+    time.sleep(after)
     line.phone = _phone(calls.SERIAL + 1)
     line.phone.answer(bytes((41, _OFFLINE, 0)))  # where the other one was to go
     line.behaviour = behaviour
@@ -102,7 +104,7 @@ def _plug_stranger(line: PtyLine, asked: List[bytes]) -> None:
     line.plug()
 
 
-def _in_flight(bench: Bench, line: PtyLine, name: str, *, comes_stranger: bool) -> None:
+def _in_flight(bench: Bench, line: PtyLine, name: str, stranger: Optional[float]) -> None:
     """The cable is pulled while a request has no answer yet, or behind an answer."""
     left = [_ANSWERED.get(name, 0)]
     asked = threading.Event()
@@ -124,8 +126,8 @@ def _in_flight(bench: Bench, line: PtyLine, name: str, *, comes_stranger: bool) 
             time.sleep(0.02)
             since.append(time.monotonic())
             line.unplug()
-            if comes_stranger:
-                _plug_stranger(line, of_stranger)
+            if stranger is not None:
+                _plug_stranger(line, of_stranger, stranger)
 
     puller = threading.Thread(target=pull)
     puller.start()
@@ -194,13 +196,13 @@ def run(bench: Bench, case: str) -> None:
                 _at_once(line)
                 return
             if name in _OPERATIONS:
-                _in_flight(bench, line, name, comes_stranger=where == "stranger")
+                _in_flight(bench, line, name, _STRANGERS.get(where))
             else:
                 _idle(bench, line, name == "wait-log")
             line.behaviour = WORKS
             line.drop_pieces()
-            if where != "stranger":
+            if where not in _STRANGERS:
                 line.plug(pair)
             result, value = calls.CALLS["serial"].run(handle)
-            expected = calls.SERIAL + (where == "stranger")
+            expected = calls.SERIAL + (where in _STRANGERS)
             check(result == 1 and value == expected, f"after the port came back: {result}, {last_error(handle)}")
