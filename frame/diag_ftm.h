@@ -81,10 +81,17 @@ class Diag_FTM {
   // One call of the caller's, under that lock: where the cable was pulled and plugged in again before it, sooner than
   // anybody has noticed, its first request goes to the device that is there now. Further ones, and those of jobs, fail
   // as lost: half of a transfer must not go to whoever came back. Where whoever it is will do, IsPortOpen takes him.
+  // Between two requests of a job handsets come and go; it sees for itself who is there.
   class Call {
    public:
-    explicit Call(Diag_FTM& phone) : lock_(phone.request_lock_), phone_(phone) { phone_.at_calls_begin_ = true; }
-    ~Call() { phone_.at_calls_begin_ = false; }
+    explicit Call(Diag_FTM& phone) : lock_(phone.request_lock_), phone_(phone) {
+      phone_.at_calls_begin_ = true;
+      ++phone_.calls_;
+    }
+    ~Call() {
+      phone_.at_calls_begin_ = false;
+      --phone_.calls_;
+    }
     Call(const Call&) = delete;
     Call& operator=(const Call&) = delete;
 
@@ -228,6 +235,7 @@ class Diag_FTM {
   bool null_port_ = false;
   bool listener_registered_ = false;  // server mode
   bool at_calls_begin_ = false;       // no request of the caller's call has been sent
+  int calls_ = 0;                     // of the caller, under way: one may be made in a callback of another
   bool answer_owed_ = false;          // by the handset, to a request that was given up
   uint32_t owed_since_ = 0;
   uint32_t resynchronising_ = 0;

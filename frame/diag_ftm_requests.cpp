@@ -26,9 +26,12 @@ bool MayComeLater(const Reply& reply) {
 template <class SendOnce>
 Reply Diag_FTM::OverOpenPort(SendOnce send) {
   const bool may_be_another = std::exchange(at_calls_begin_, false);
-  // Nor where the device has gone between two requests, and another one is there already.
-  if (!may_be_another && device_gone()) return ReplyKind::kGone;
-  if (!IsPortOpen()) return ReplyKind::kPortClosed;
+  // Where the device has gone between two requests of a call, another one may be there already. One that goes in this
+  // moment is not opened afresh either: the request is not sent, then.
+  const bool goes_on = calls_ > 0 && !may_be_another && !server_mode();
+  const bool is_open = goes_on && transport().connected();
+  if (goes_on && !is_open && device_gone()) return ReplyKind::kGone;
+  if (!is_open && !IsPortOpen()) return ReplyKind::kPortClosed;
   Reply reply = send();
   if (reply.kind() == ReplyKind::kGoneUnsent && may_be_another && IsPortOpen()) reply = send();
   return reply.kind() == ReplyKind::kGoneUnsent ? ReplyKind::kGone : reply;

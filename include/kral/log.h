@@ -152,7 +152,7 @@ typedef struct KRAL_TRAFFIC_COUNTERS {
   uint64_t bad_fcs;          /**< answers with a wrong frame check sequence; logs and the like are not checked */
   uint64_t oversized;        /**< packets shorter than 2 or longer than 4,096 bytes, and runs of bytes without an end */
   uint64_t captured;         /**< packets written to capture files */
-  uint64_t capture_lost;     /**< packets that a full or slow disk has cost a capture file */
+  uint64_t capture_lost;     /**< packets that a full or slow disk, or no memory, has cost one */
   uint64_t capture_pending;  /**< packets taken for a capture file that are not in it yet */
   uint64_t waiting;          /**< packets received that still wait for callbacks and queues; 0 through a phone server */
   uint64_t most_waiting;     /**< the most that ever waited so */
@@ -568,7 +568,7 @@ typedef struct KRAL_TRACE_COUNTERS {
   uint64_t frames;     /**< written to files, bad ones included */
   uint64_t bad;        /**< of these; whose FCS does not fit */
   uint64_t others;     /**< runs of bytes that are no frame, written to files */
-  uint64_t lost;       /**< frames, and reads and writes without frames, that a full or slow disk has cost a file */
+  uint64_t lost;       /**< frames, and reads and writes without frames, that a full or slow disk, or no memory, has cost */
   uint64_t lost_bytes; /**< of those that the disk was too slow for */
   uint64_t pending;    /**< reads and writes that are taken for a file and not in it yet */
 } KRAL_TRACE_COUNTERS;

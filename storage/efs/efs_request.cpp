@@ -128,10 +128,7 @@ Reply ExchangePacket(Diag_FTM& phone, CDiagPacket& packet, u32 time_out_ms, cons
     const Reply other(reply.kind(), reply.code(), {});
     reply = phone.AwaitNext(packet, time_out_ms - elapsed, own);
     // Where nothing more comes, that was the answer.
-    if (reply.kind() == ReplyKind::kNone) {
-      Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
-      if (other.refusal() != 0) reply = other;
-    }
+    if (reply.kind() == ReplyKind::kNone) Fail(RequestFailure(phone, other, packet.request(), time_out_ms));
   }
   if (reply.kind() == ReplyKind::kAborted) phone.state<Settings>().gave_up = true;
   return reply;

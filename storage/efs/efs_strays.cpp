@@ -50,7 +50,8 @@ bool AwaitLateAnswers(Diag_FTM& phone, const OpenHandles& handles, u32 count) {
   // Through a phone server no reply comes unasked.
   u32 elapsed = 0;
   while (handles.unanswered > left && elapsed < longest_ms && !phone.server_mode()) {
-    const auto record = phone.responses().PopWithin(std::chrono::milliseconds(longest_ms - elapsed));
+    const u32 wait_ms = std::min(kLateAnswerMs, longest_ms - elapsed);
+    const auto record = phone.responses().PopWithin(std::chrono::milliseconds(wait_ms));
     if (!record) break;
     NoteLateReply(phone, *record);
     elapsed = phone.clock().TickMs() - start;

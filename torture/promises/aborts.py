@@ -4,14 +4,14 @@ from __future__ import annotations
 import ctypes
 import threading
 import time
-from typing import Callable, Dict, List
+from typing import Callable, Dict, List, Tuple
 
 import kral
 from torture import calls
 from torture.bench import LINUX, MODES, WINDOWS, Bench, check, connected, last_error, set_time_outs
 from torture.peer.codec import frame
 from torture.peer.line import WORKS, Behaviour, Line, PtyLine
-from torture.peer.misbehaviours import again, begin, misbehaviours
+from torture.peer.misbehaviours import again, begin, misbehaviours, silence
 from torture.peer.phone import Phone
 
 NUMBER = 18
@@ -22,8 +22,13 @@ AT_ONCE = 6
 _ALLOWED_MS = 250
 _TIME_OUT_MS = 4000
 _BEHIND_MS = 500
-_MOST_ANSWERED = 3
+_MOST_ANSWERED = 2
 _TALKS_S = 0.1
+# Files and folders are opened in vain, in three tries: the abort comes in the third.
+_OPENINGS = (b"\x4b\x13\x02\0", b"\x4b\x13\x0b\0")
+_THIRD = "third-try"
+_THIRD_MS = 300
+_THIRD_S = 0.75
 _HANGS_S = 30.0
 _ALL = 0xFFFFFFFF
 _LARGE = bytes(range(256)) * 400
@@ -69,6 +74,9 @@ _OPERATIONS: Dict[str, Callable[[int], object]] = {
     "back-up": _back_up,
 }
 _JOB = "job"
+_OPENING = ("write", "read")
+# What these operations may be ended by, before they are aborted.
+_ENDING = ("other-code", "other-answer", "same-head", "logs")
 
 
 def _talkers(bench: Bench, case: str) -> Dict[str, Behaviour]:
@@ -79,31 +87,32 @@ def _talkers(bench: Bench, case: str) -> Dict[str, Behaviour]:
 
     def other_files(request: bytes, line: Line) -> None:
         again(line, lambda: frame(b"\x4b\x13\x63\0" + bytes(8)))
-    # A refusal, or a frame without its end, ends most of these by itself.
+    # A refusal, or a frame without its end, ends most of these by itself; other answers and other codes end some.
     known = {name: behaviour for name, behaviour in misbehaviours(numbers, _HANGS_S).items()
              if name not in ("refusal", "blocked", "head")}
     return {**known, "same-head": same_head, "other-files": other_files}
 
 
 def cases(bench: Bench) -> List[str]:
-    return [f"{operation}/{name}/{mode}" for operation in [*_OPERATIONS, _JOB] for name in _talkers(bench, "")
-            for mode in MODES]
+    all_of_them = [f"{operation}/{name}/{mode}" for operation in [*_OPERATIONS, _JOB] for name in _talkers(bench, "")
+                   for mode in MODES]
+    return all_of_them + [f"{operation}/{_THIRD}/{mode}" for operation in _OPENING for mode in MODES]
 
 
 class _Answers:
-    """To the first requests; what comes behind them meets the misbehaviour."""
+    """To the first requests; what comes behind them and begins so meets the misbehaviour."""
 
-    def __init__(self, count: int, behaviour: Behaviour) -> None:
-        self._left, self._behaviour = count, behaviour
+    def __init__(self, count: int, behaviour: Behaviour, met_by: Tuple[bytes, ...] = (b"",)) -> None:
+        self._left, self._behaviour, self._met_by = count, behaviour, met_by
         self.began = threading.Event()
 
     def __call__(self, request: bytes, line: Line) -> None:
-        if self._left > 0:
+        if self._left > 0 or not request.startswith(self._met_by):
             self._left -= 1
-            return line.reply(request)
+            line.reply(request)
+            return
         self._behaviour(request, line)
         self.began.set()
-        return None
 
 
 class _Deed(threading.Thread):
@@ -111,9 +120,13 @@ class _Deed(threading.Thread):
         super().__init__(daemon=True)
         self._work, self._handle = work, handle
         self.ended = 0.0
+        self.error = ""
 
     def run(self) -> None:
-        self._work(self._handle)
+        try:
+            self._work(self._handle)
+        except Exception as error:  # pylint: disable=broad-except
+            self.error = str(error)
         self.ended = time.monotonic()
 
 
@@ -126,17 +139,21 @@ def run(bench: Bench, case: str) -> None:
     phone.files.put("/data/large", _LARGE)
     with bench.com_port() as port:
         line = PtyLine(phone, bench.ports, port)
-        with connected(line, MODES[mode], _TIME_OUT_MS) as handle:
-            answers = _Answers(bench.random(case).randrange(_MOST_ANSWERED + 1), _talkers(bench, case)[name])
+        with connected(line, MODES[mode], _THIRD_MS if name == _THIRD else _TIME_OUT_MS) as handle:
+            count = bench.random(case).randrange(_MOST_ANSWERED + 1)
+            answers = (_Answers(0, silence, _OPENINGS) if name == _THIRD
+                       else _Answers(count, _talkers(bench, case)[name]))
             begin(name, answers, line)
             deed = _Deed(work, handle)
             deed.start()
-            answers.began.wait(_HANGS_S)
-            time.sleep(_TALKS_S)
+            check(answers.began.wait(_HANGS_S), f"nothing is asked of the handset: {deed.error}")
+            time.sleep(_THIRD_S if name == _THIRD else _TALKS_S)
             if deed.is_alive():
                 _abort(bench, deed, lambda: abort(handle))
             else:
+                check(name in _ENDING, "it ended before it was aborted")
                 bench.count("ended before")
+            check(not deed.error, deed.error)
             line.behaviour = WORKS
             line.drop_pieces()
             set_time_outs(handle, _BEHIND_MS)

@@ -110,7 +110,8 @@ bool TraceWriter::Save(const TraceOrigin& origin, const std::function<CaptureSin
   for (const auto& piece : pieces) file.Take(piece, sink);
   file.End(MicrosecondsNow(), 0, sink);
   const TraceFile::Outcome outcome = file.TakeOutcome();
-  return outcome.unwritten == 0 && outcome.unmade == 0;
+  if (outcome.unmade != 0) throw std::bad_alloc();
+  return outcome.unwritten == 0;
 }
 
 TraceCounters TraceWriter::counters() const {
