@@ -565,10 +565,10 @@ KRAL_API uint8_t KRAL_CALL KRAL_SaveTrace(KRAL_HANDLE handle, const char* file_n
 
 /** What became of the traces of a handle, those of KRAL_SaveTrace not included. */
 typedef struct KRAL_TRACE_COUNTERS {
-  uint64_t frames;     /**< written to files, bad ones included */
-  uint64_t bad;        /**< of these; whose FCS does not fit */
-  uint64_t others;     /**< runs of bytes that are no frame, written to files */
-  uint64_t lost;       /**< frames, and reads and writes without frames, that a full or slow disk, or no memory, has cost */
+  uint64_t frames; /**< written to files, bad ones included */
+  uint64_t bad;    /**< of these; whose FCS does not fit */
+  uint64_t others; /**< runs of bytes that are no frame, written to files */
+  uint64_t lost;   /**< frames, and reads and writes without frames, that a full or slow disk, or no memory, has cost */
   uint64_t lost_bytes; /**< of those that the disk was too slow for */
   uint64_t pending;    /**< reads and writes that are taken for a file and not in it yet */
 } KRAL_TRACE_COUNTERS;
