@@ -300,6 +300,23 @@ TEST_F(JobMisfortune, AHelloThatDoesNotComeInTimeIsNotAwaitedOnceMore) {
   EXPECT_EQ(Result(0).progress.attempts, 1u);
 }
 
+TEST_F(JobMisfortune, ALoaderMayComeAsANewDevice) {
+  VirtualHandset& handset = AddSocket(11);
+  handset.SetStartMode({std::shared_ptr<void>(), &handset.loader()});
+  handset.faults().Add(handset::HangUp(), When::Nth(1).Of("3A"));
+  ports_.SetBeforeOpen([&](uint16_t) {
+    if (handset.vanished()) handset.PlugIn();
+  });
+  AddToJob(11);
+  SetOptions(KRAL_VENTRIMS_ENTER_LOADER, 0);
+  KRAL_VENTRIMS_AddProgrammer(job_, folder_.Add("programmer.hex", kProgrammerHex).c_str(),
+                              KRAL_VENTRIMS_PROGRAMMER_HEX);
+  AddImage(AddBytes("image.bin", Pattern(3000)));
+  RunToEnd();
+  EXPECT_EQ(Result(0).passed, 1u) << Result(0).error.text;
+  ports_.SetBeforeOpen({});
+}
+
 TEST_F(JobMisfortune, AProgrammerThatNeverSaysHelloIsGreetedOnce) {
   AddSocket(11).faults().Add(handset::Lose(), When::Always().Of("02").LongerThan(5));  // the hello
   AddToJob(11);
