@@ -1,15 +1,13 @@
 // Folders on Linux.
 #include "platform/folder.h"
 
-#include <dirent.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
-#include <memory>
 
 #include "platform/posix/last_error.h"
+#include "platform/posix/system_files.h"
 
 namespace kral {
 LocalFile LookAt(const std::string& path) {
@@ -20,16 +18,10 @@ LocalFile LookAt(const std::string& path) {
 }
 
 std::error_code ListFolder(const std::string& path, std::vector<FolderEntry>& entries) {
-  const std::unique_ptr<DIR, int (*)(DIR*)> folder(::opendir(path.c_str()), ::closedir);
-  if (!folder) return LastError();
+  std::vector<std::string> names;
+  if (const auto error = ReadNames(path, names)) return error;
   std::vector<FolderEntry> found;
-  for (;;) {
-    errno = 0;
-    const dirent* entry = ::readdir(folder.get());
-    if (entry == nullptr && errno != 0) return LastError();
-    if (entry == nullptr) break;
-    const std::string name = entry->d_name;
-    if (name == "." || name == "..") continue;
+  for (const std::string& name : names) {
     const std::string full = JoinPath(path, name);
     LocalFile file = LookAt(full);
     struct stat own {};

@@ -28,10 +28,6 @@ uint16_t HexIn(const fs::path& file) {
   return NumberIn<uint16_t>(FirstLineOf(file), 16).value_or(0);
 }
 
-bool Exists(const fs::path& path) {
-  return ::access(path.c_str(), F_OK) == 0;
-}
-
 // The tty of the system that a port is: links lead to it.
 std::string TtyName(const std::string& device) {
   return RealPath(device).value_or(device).filename().string();

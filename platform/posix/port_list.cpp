@@ -57,7 +57,7 @@ std::optional<int> ComNumberOfTty(std::string_view name) {
 
 // A tty with hardware behind it. The kernel keeps serial entries for chips that are not there, as type 0 (unknown).
 bool HasHardware(const fs::path& tty) {
-  if (::access((tty / "device").c_str(), F_OK) != 0) return false;
+  if (!Exists(tty / "device")) return false;
   if (!tty.filename().string().starts_with("ttyS")) return true;
   return NumberIn<int>(FirstLineOf(tty / "type")).value_or(0) != 0;
 }

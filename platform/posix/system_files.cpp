@@ -2,7 +2,6 @@
 #include "platform/posix/system_files.h"
 
 #include <dirent.h>
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -13,53 +12,55 @@
 #include <new>
 #include <utility>
 
-#include "platform/posix/file_descriptor.h"
+#include "platform/file_util.h"
+#include "platform/posix/last_error.h"
 
 namespace kral {
 namespace {
 
 namespace fs = std::filesystem;
 
-void ThrowIfNoMemory() {
-  if (errno == ENOMEM) throw std::bad_alloc();
+void ThrowIfNoMemory(const std::error_code& error) {
+  if (error == std::errc::not_enough_memory) throw std::bad_alloc();
 }
 
 }  // namespace
 
-std::optional<std::vector<std::string>> NamesIn(const fs::path& folder) {
+std::error_code ReadNames(const fs::path& folder, std::vector<std::string>& names) {
   const std::unique_ptr<DIR, int (*)(DIR*)> opened(::opendir(folder.c_str()), ::closedir);
-  if (!opened) {
-    ThrowIfNoMemory();
-    return std::nullopt;
-  }
-  std::vector<std::string> names;
+  if (!opened) return LastError();
   for (;;) {
     errno = 0;
     const dirent* const entry = ::readdir(opened.get());
-    if (entry == nullptr) break;
+    if (entry == nullptr) return LastError();
     const std::string_view name = entry->d_name;
     if (name != "." && name != "..") names.emplace_back(name);
   }
-  ThrowIfNoMemory();
-  return errno == 0 ? std::optional(std::move(names)) : std::nullopt;
+}
+
+std::optional<std::vector<std::string>> NamesIn(const fs::path& folder) {
+  std::vector<std::string> names;
+  const std::error_code error = ReadNames(folder, names);
+  ThrowIfNoMemory(error);
+  return error ? std::nullopt : std::optional(std::move(names));
+}
+
+bool Exists(const fs::path& path) {
+  return ::access(path.c_str(), F_OK) == 0;
 }
 
 // Their size is not known before: many of them are made while they are read.
 std::string TextOf(const fs::path& file) {
-  const FileDescriptor opened(::open(file.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
-  if (!opened.valid()) {
-    ThrowIfNoMemory();
-    return {};
-  }
   std::string text;
-  std::array<char, 4096> piece{};
-  for (;;) {
-    const ssize_t count = ::read(opened.get(), piece.data(), piece.size());
-    if (count < 0 && errno == EINTR) continue;
-    if (count < 0) ThrowIfNoMemory();
-    if (count <= 0) return text;
-    text.append(piece.data(), static_cast<size_t>(count));
+  FileReader reader;
+  std::error_code error = reader.Open(file.string());
+  std::array<uint8_t, 4096> piece{};
+  for (size_t count = piece.size(); !error && count == piece.size();) {
+    error = reader.Read(piece, count);
+    text.append(piece.begin(), piece.begin() + static_cast<std::ptrdiff_t>(count));
   }
+  ThrowIfNoMemory(error);
+  return text;
 }
 
 std::string FirstLineOf(const fs::path& file) {
@@ -71,7 +72,7 @@ std::string FirstLineOf(const fs::path& file) {
 std::optional<fs::path> RealPath(const fs::path& path) {
   const std::unique_ptr<char, void (*)(void*)> real(::realpath(path.c_str(), nullptr), std::free);
   if (real) return fs::path(real.get());
-  ThrowIfNoMemory();
+  ThrowIfNoMemory(LastError());
   return std::nullopt;
 }
 

@@ -16,6 +16,11 @@ namespace kral {
 
 // Without "." and "..", in the system's order; nothing when the folder cannot be read.
 std::optional<std::vector<std::string>> NamesIn(const std::filesystem::path& folder);
+// The same with the reason instead, also for a lack of memory that is the system's.
+std::error_code ReadNames(const std::filesystem::path& folder, std::vector<std::string>& names);
+
+// Links are followed.
+bool Exists(const std::filesystem::path& path);
 
 std::string TextOf(const std::filesystem::path& file);
 std::string FirstLineOf(const std::filesystem::path& file);

@@ -120,7 +120,7 @@ bool CKralThreadInterface::IsMomentBehindAbortOver() {
 
 std::optional<Packet> CKralThreadInterface::AwaitRecord(std::chrono::milliseconds time_out) {
   auto record = PopWithin(time_out);
-  if (!record && abort_ != nullptr && *abort_) record = responses_->PopWithin(std::min(time_out, kMomentBehindAbort));
+  if (!record && aborted()) record = responses_->PopWithin(std::min(time_out, kMomentBehindAbort));
   return record;
 }
 
@@ -146,7 +146,7 @@ ReplyKind CKralThreadInterface::WhyNotWritten() const {
 
 ReplyKind CKralThreadInterface::WhyNoReply() const {
   if (port_.gone()) return ReplyKind::kGone;
-  if (abort_ != nullptr && *abort_) return ReplyKind::kAborted;
+  if (aborted()) return ReplyKind::kAborted;
   return splitter_.deframer().bad_fcs() != garbled_before_ ? ReplyKind::kGarbled : ReplyKind::kNone;
 }
 

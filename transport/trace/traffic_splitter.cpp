@@ -88,7 +88,6 @@ void TrafficSplitter::Take(const TrafficPiece& piece) {
     side = {};
     side.content = piece.content;
   }
-  MakeRoom(side, piece.bytes.size());
   if (piece.content == PortContent::kBytes) {
     Give(TrafficRecord::Kind::kBytes, piece, piece.bytes, "");
   } else {
@@ -129,6 +128,7 @@ void TrafficSplitter::Remark(const char* text) {
 }
 
 void TrafficSplitter::TakeFrames(Side& side, const TrafficPiece& piece) {
+  MakeRoom(side, piece.bytes.size());
   std::span<const uint8_t> left = piece.bytes;
   while (!left.empty()) {
     const auto flag = std::ranges::find(left, kFrameFlag);
