@@ -7,7 +7,7 @@ from __future__ import annotations
 import ctypes
 import dataclasses
 import struct
-from typing import Any, Callable, Dict, Tuple
+from typing import Any, Callable, Dict, Optional, Tuple
 
 import kral
 from kral._api import KRAL_TRAFFIC_COUNTERS
@@ -136,6 +136,20 @@ def status_of(handle: int, path: str = FILE) -> Outcome:
     words = [ctypes.c_uint32() for _ in range(7)]
     result = _api("KRAL_EFS2_DIAG_STAT")(handle, path.encode(), *map(ctypes.byref, words))
     return result, (words[0].value, words[2].value)
+
+
+def back_up(handle: int, items: Tuple[int, int], file: bytes) -> int:
+    """The first and the last of the items, and the files that go with them."""
+    status = ctypes.c_uint32()
+    _api("KRAL_PKV_ConfigureBackup")(handle, *items, 1)
+    return _api("KRAL_BackupNVFromMobileToPKV")(handle, file, ctypes.byref(status))
+
+
+def next_log(handle: int, time_out_ms: int) -> Optional[bytes]:
+    size, area = ctypes.c_uint16(), ctypes.create_string_buffer(4096)
+    result = _api("KRAL_DIAG_WaitNextPhoneLog")(handle, ctypes.byref(size), ctypes.cast(area, ctypes.c_void_p),
+                                                time_out_ms)
+    return area.raw[:size.value] if result else None
 
 
 def list_folder(handle: int, path: bytes = b"/data") -> Outcome:

@@ -3,7 +3,6 @@ logs, and has its cable pulled, all at random. What a call gives must be right; 
 """
 from __future__ import annotations
 
-import ctypes
 import dataclasses
 import os
 import pathlib
@@ -71,10 +70,7 @@ class _Station:
 
     def _back_up(self) -> None:
         file = pathlib.Path(f"soak{self._port}.pkv")
-        status = ctypes.c_uint32()
-        kral.api().KRAL_PKV_ConfigureBackup(self._line.handle, 300, 340, 1)
-        self._must(kral.api().KRAL_BackupNVFromMobileToPKV(self._line.handle, os.fsencode(file), ctypes.byref(status)),
-                   "back up")
+        self._must(calls.back_up(self._line.handle, (300, 340), os.fsencode(file)), "back up")
         self._backup = self._backup or file.read_bytes()
         check(file.read_bytes() == self._backup, "a backup is another one")
 

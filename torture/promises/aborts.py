@@ -1,7 +1,6 @@
 """An abort ends what is under way on a handset within 250 ms, whatever the handset does meanwhile."""
 from __future__ import annotations
 
-import ctypes
 import threading
 import time
 from typing import Callable, Dict, List, Tuple
@@ -32,12 +31,6 @@ _THIRD_S = 0.75
 _HANGS_S = 30.0
 _ALL = 0xFFFFFFFF
 _LARGE = bytes(range(256)) * 400
-
-
-def _back_up(handle: int) -> None:
-    status = ctypes.c_uint32()
-    kral.api().KRAL_PKV_ConfigureBackup(handle, 1, 900, 1)
-    kral.api().KRAL_BackupNVFromMobileToPKV(handle, f"aborted{handle}.pkv".encode(), ctypes.byref(status))
 
 
 def _abort_files(handle: int) -> None:
@@ -71,7 +64,7 @@ _OPERATIONS: Dict[str, Callable[[int], object]] = {
     "read": lambda handle: calls.read_file(handle, "/data/large", len(_LARGE)),
     "list": calls.list_folder,
     "sync": lambda handle: kral.api().KRAL_EFS2_SyncWithWait(handle, b"/", _TIME_OUT_MS),
-    "back-up": _back_up,
+    "back-up": lambda handle: calls.back_up(handle, (1, 900), f"aborted{handle}.pkv".encode()),
 }
 _JOB = "job"
 _OPENING = ("write", "read")

@@ -118,9 +118,7 @@ class _Items:
 
     def back_up(self) -> bool:
         file = pathlib.Path(f"bits{self._line.handle}.pkv")
-        status = ctypes.c_uint32()
-        kral.api().KRAL_PKV_ConfigureBackup(self._line.handle, _ITEMS[0], _ITEMS[-1], 1)
-        result = kral.api().KRAL_BackupNVFromMobileToPKV(self._line.handle, os.fsencode(file), ctypes.byref(status))
+        result = calls.back_up(self._line.handle, (_ITEMS[0], _ITEMS[-1]), os.fsencode(file))
         if not self.reference:
             check(result == 1, "no backup over a good line")
             self.reference = file.read_bytes()

@@ -1,7 +1,6 @@
 """One good frame after garbage, and all is well."""
 from __future__ import annotations
 
-import ctypes
 import random
 from typing import Callable, List
 
@@ -49,12 +48,10 @@ def _garbage(numbers: random.Random) -> bytes:
 
 def _is_collected(handle: int, packet: bytes) -> bool:
     """Takes logs until this one has come."""
-    size, area = ctypes.c_uint16(), ctypes.create_string_buffer(_LONGEST_FRAME)
-    buffer = ctypes.cast(area, ctypes.c_void_p)
-    while kral.api().KRAL_DIAG_WaitNextPhoneLog(handle, ctypes.byref(size), buffer, _TIME_OUT_MS):
-        if area.raw[:size.value - 2] == packet:
-            return True
-    return False
+    collected = calls.next_log(handle, _TIME_OUT_MS)
+    while collected is not None and collected[:-2] != packet:
+        collected = calls.next_log(handle, _TIME_OUT_MS)
+    return collected is not None
 
 
 def run(bench: Bench, case: str) -> None:

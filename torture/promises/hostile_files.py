@@ -9,7 +9,7 @@ from typing import Any, Callable, Dict, List, Tuple
 import kral
 from kral import _api
 from torture import calls
-from torture.bench import MODES, Bench, check, connected
+from torture.bench import MODES, Bench, check, connected, last_error
 from torture.peer.line import CallerLine
 from torture.peer.misbehaviours import silence
 from torture.peer.mutations import mutate
@@ -42,10 +42,7 @@ def _corpus(name: str) -> List[bytes]:
 
 
 def _back_up(handle: int, file: bytes) -> List[bytes]:
-    status = ctypes.c_uint32()
-    kral.api().KRAL_PKV_ConfigureBackup(handle, 300, 310, 1)
-    result = kral.api().KRAL_BackupNVFromMobileToPKV(handle, file, ctypes.byref(status))
-    check(result == 1, f"no backup: status {status.value}")
+    check(calls.back_up(handle, (300, 310), file) == 1, f"no backup: {last_error(handle)}")
     return [pathlib.Path(os.fsdecode(file)).read_bytes()]
 
 

@@ -30,9 +30,8 @@ _LIES = 0.6
 
 def _back_up(handle: int) -> calls.Outcome:
     status = ctypes.c_uint32()
-    kral.api().KRAL_PKV_ConfigureBackup(handle, 300, 306, 1)
     name = f"liar{handle}.pkv".encode()
-    result = kral.api().KRAL_BackupNVFromMobileToPKV(handle, name, ctypes.byref(status))
+    result = calls.back_up(handle, (300, 306), name)
     return kral.api().KRAL_PKV_Verify(handle, name, ctypes.byref(status)) and result, None
 
 

@@ -112,9 +112,8 @@ def _logs(line: Line) -> Callable[[int], calls.Outcome]:
         while time.monotonic() < end and now.packets_received - before.packets_received < _LOGS or now.waiting:
             time.sleep(0.001)
             now = calls.counters(handle)
-        size, area, read = ctypes.c_uint16(), ctypes.create_string_buffer(4096), 0
-        buffer = ctypes.cast(area, ctypes.c_void_p)
-        while api.KRAL_DIAG_WaitNextPhoneLog(handle, ctypes.byref(size), buffer, 5):
+        read = 0
+        while calls.next_log(handle, 5) is not None:
             read += 1
         dropped = calls.counters(handle).dropped_logs - before.dropped_logs
         check(read + dropped == _LOGS, f"{_LOGS} logs were sent, {read} read and {dropped} counted as dropped")

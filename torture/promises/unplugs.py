@@ -37,17 +37,11 @@ _OFFLINE_DELAY, _OFFLINE_DELAY_MS = 13, 3000
 
 
 def _back_up(handle: int) -> calls.Outcome:
-    status = ctypes.c_uint32()
-    name = f"{threading.get_ident()}.pkv".encode()
-    kral.api().KRAL_PKV_ConfigureBackup(handle, 0, 40, 1)
-    return kral.api().KRAL_BackupNVFromMobileToPKV(handle, name, ctypes.byref(status)), None
+    return calls.back_up(handle, (0, 40), f"{threading.get_ident()}.pkv".encode()), None
 
 
 def _wait_log(handle: int) -> calls.Outcome:
-    size, area = ctypes.c_uint16(), (ctypes.c_uint8 * 4096)()
-    result = kral.api().KRAL_DIAG_WaitNextPhoneLog(handle, ctypes.byref(size), ctypes.cast(area, ctypes.c_void_p),
-                                                   _TIME_OUT_MS)
-    return result, None
+    return int(calls.next_log(handle, _TIME_OUT_MS) is not None), None
 
 
 def _switch(handle: int) -> calls.Outcome:
